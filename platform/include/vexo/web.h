@@ -1,0 +1,46 @@
+// One web request as the CGI environment gives it.
+#ifndef VEXO_WEB_H
+#define VEXO_WEB_H
+
+#include <json/value.h>
+
+#include <string>
+
+#include "vexo/export.h"
+
+namespace VEXO {
+
+class VEXO_API WebCGI {
+ public:
+    // Reads QUERY_STRING and HTTP_COOKIE, and the body of a POST of type application/x-www-form-urlencoded (at most 1
+    // MiB; a longer one is not read and bodyRefused() is true).
+    WebCGI();
+    ~WebCGI();
+    WebCGI(const WebCGI&) = delete;
+    WebCGI& operator=(const WebCGI&) = delete;
+
+    // The first value of the parameter, percent-decoded ("+" is a blank); `def` when absent. Query before body.
+    std::string GetParam(const std::string& name, const std::string& def) const;
+    bool HasParam(const std::string& name) const;
+    bool BodyRefused() const;
+    // The value of the first cookie of that name, `def` when absent.
+    std::string GetCookie(const std::string& name, const std::string& def) const;
+    // Keeps a Set-Cookie header for WriteHeader. False, and nothing kept, for a name that is no cookie token or a value
+    // or path with control bytes, ";" or ",".
+    bool AddCookieToHeader(const std::string& path, const std::string& name, const std::string& value);
+    // Writes the response header to standard output: the kept cookies and the content type, then the empty line.
+    void WriteHeader(const std::string& type);
+
+ private:
+    struct Impl;
+    Impl* impl_;
+};
+
+namespace WebAPIUtil {
+// Cuts `text` at each `separator` into an array of strings; empty pieces are kept. A null text gives an empty array.
+VEXO_API Json::Value ParseToArray(const char* text, const char* separator);
+}  // namespace WebAPIUtil
+
+}  // namespace VEXO
+
+#endif
