@@ -8,18 +8,18 @@
 
 enum {
     ORV_ERR_NONE = 0,
-    ORV_ERR_PARAMETER = 400,     /* a required argument is null or empty */
-    ORV_ERR_GENERAL = 401,       /* anything without a code of its own */
-    ORV_ERR_DIRECTORY = 402,     /* a directory cannot be entered or opened; a privilege service failed */
-    ORV_ERR_USER = 403,          /* unknown user */
-    ORV_ERR_GROUP = 404,         /* unknown group */
-    ORV_ERR_USER_GROUP = 405,    /* never set here, mapped only */
-    ORV_ERR_SERVER = 406,        /* the domain or directory server could not be reached */
-    ORV_ERR_DENIED = 407,        /* permission denied */
-    ORV_ERR_MISSING = 408,       /* the path or share does not exist */
-    ORV_ERR_DENIED_OTHER = 409,  /* never set here, mapped only */
-    ORV_ERR_REMOTE = 410,        /* the path lies on a network mount that does not answer */
-    ORV_ERR_READ_ONLY = 411,     /* read-only file system */
+    ORV_ERR_PARAMETER = 400,    /* a required argument is null or empty */
+    ORV_ERR_GENERAL = 401,      /* anything without a code of its own */
+    ORV_ERR_DIRECTORY = 402,    /* a directory cannot be entered or opened; a privilege service failed */
+    ORV_ERR_USER = 403,         /* unknown user */
+    ORV_ERR_GROUP = 404,        /* unknown group */
+    ORV_ERR_USER_GROUP = 405,   /* never set here, mapped only */
+    ORV_ERR_SERVER = 406,       /* the domain or directory server could not be reached */
+    ORV_ERR_DENIED = 407,       /* permission denied */
+    ORV_ERR_MISSING = 408,      /* the path or share does not exist */
+    ORV_ERR_DENIED_OTHER = 409, /* never set here, mapped only */
+    ORV_ERR_REMOTE = 410,       /* the path lies on a network mount */
+    ORV_ERR_READ_ONLY = 411,    /* read-only file system */
     ORV_ERR_LONG_PATH = 412,
     ORV_ERR_ENCRYPTED_LONG_PATH = 413, /* too long for an encrypted share */
     ORV_ERR_EXISTS = 414,
@@ -63,8 +63,8 @@ ORVEL_API int OrvLibSetErr(int code);
 ORVEL_API int OrvLibGetErr(void);
 
 /* The message key of `code`, "section:entry" of the browser's string tables. A code without a key of its own gives
- * `defaultKey`, or "error:error_error_system" when that is null; a code with one never consults `defaultKey`. The result
- * is static (or `defaultKey` itself) and never freed. Reads and changes no state. */
+ * `defaultKey`, or "error:error_error_system" when that is null; a code with one never consults `defaultKey`. The
+ * result is static (or `defaultKey` itself) and never freed. Reads and changes no state. */
 ORVEL_API const char* OrvParseErrorToKTRString(int code, const char* defaultKey);
 
 /* The library code for an errno value; it is not stored. `shareName` (may be null) decides whether a name that is too
