@@ -4,6 +4,9 @@
 
 #ifdef VEXO_FAULT_GATE
 
+#include <cerrno>
+
+#include "vexo/error.h"
 #include "vexo/export.h"
 
 namespace vexo::gate {
