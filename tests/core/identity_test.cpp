@@ -1,0 +1,176 @@
+#include "orvel/identity.h"
+
+#include <fcntl.h>
+#include <grp.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <vector>
+
+#include "fault_gate.h"
+#include "orvel/error_state.h"
+#include "support/appliance.h"
+#include "vexo/error.h"
+
+namespace {
+
+using support::announceLog;
+using support::inChild;
+
+std::vector<gid_t> groupList() {
+    std::vector<gid_t> groups(static_cast<std::size_t>(getgroups(0, nullptr)));
+    groups.resize(static_cast<std::size_t>(getgroups(static_cast<int>(groups.size()), groups.data())));
+    std::sort(groups.begin(), groups.end());
+    return groups;
+}
+
+bool canRead(const std::string& path) {
+    const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    if (fd >= 0) close(fd);
+    return fd >= 0;
+}
+
+class IdentityTest : public support::ApplianceTest {};
+
+TEST_F(IdentityTest, OrdinaryUserActsAsItself) {
+    SKIP_WITHOUT_ROOT();
+    addGroup("editors", 20110, {"alice"});
+    const std::string mine = shareRoot("photo") + "/mine", foreign = shareRoot("photo") + "/foreign",
+                      shared = shareRoot("photo") + "/shared";
+    for (const auto& path : {mine, foreign, shared}) support::writeFile(path, "x", 0600);
+    ASSERT_EQ(chown(mine.c_str(), support::kAliceUid, support::kUsersGid), 0);
+    ASSERT_EQ(chown(shared.c_str(), 0, 20110), 0);
+    ASSERT_EQ(chmod(shared.c_str(), 0640), 0);
+
+    inChild([&] {
+        EXPECT_EQ(OrvLibUGIDSet(nullptr, "alice"), 0);
+        EXPECT_EQ(geteuid(), support::kAliceUid);
+        EXPECT_EQ(getegid(), gid_t{support::kUsersGid});
+        EXPECT_EQ(groupList(), (std::vector<gid_t>{support::kUsersGid, 20110}));
+        EXPECT_TRUE(canRead(mine));
+        EXPECT_TRUE(canRead(shared));
+        EXPECT_FALSE(canRead(foreign));
+        return 0;
+    });
+}
+
+TEST_F(IdentityTest, AdministratorStaysRootWithTheGroupsOfItsOwn) {
+    SKIP_WITHOUT_ROOT();
+    inChild([&] {
+        EXPECT_EQ(OrvLibUGIDSet(nullptr, "carol"), 0);
+        EXPECT_EQ(geteuid(), 0U);
+        EXPECT_EQ(getegid(), gid_t{support::kUsersGid});
+        EXPECT_EQ(groupList(), (std::vector<gid_t>{support::kUsersGid, support::kAdminGid}));
+        return 0;
+    });
+}
+
+TEST_F(IdentityTest, RefusedArguments) {
+    struct Case {
+        const char* what;
+        int (*call)();
+        int code;
+        const char* log;  // null: nothing is logged
+    };
+    const Case cases[] = {
+        {"null user", [] { return OrvLibUGIDSet("s", nullptr); }, 400, "orveluser:"},
+        {"unknown user", [] { return OrvLibUGIDSet(nullptr, "nobody-here"); }, 403,
+         "Failed to get GID for user=nobody-here"},
+        {"unknown user with a session", [] { return OrvLibUGIDSet("nosuchsession", "nobody-here"); }, 403,
+         "Failed to get GID for user=nobody-here, sid=nosuchsession"},
+        {"gid: null user", [] { return OrvLibEGIDSet("s", nullptr, 1); }, 400, "bad parameter"},
+        {"gid: nothing known", [] { return OrvLibEGIDSet(nullptr, "alice", static_cast<gid_t>(-1)); }, 400,
+         "bad parameter"},
+        {"gid: unknown session", [] { return OrvLibEGIDSet("nosuchsession", "alice", static_cast<gid_t>(-1)); }, 401,
+         nullptr},
+        {"uid: null user", [] { return OrvLibEUIDSet("s", nullptr, 1); }, 400, "bad parameter"},
+        {"uid: nothing known", [] { return OrvLibEUIDSet(nullptr, "alice", static_cast<uid_t>(-1)); }, 400,
+         "bad parameter"},
+        {"uid: unknown user", [] { return OrvLibEUIDSet(nullptr, "nobody-here", 1); }, 401,
+         "VEXOGroupIsAdminGroupMem(nobody-here) failed. [0x1D00 "},
+        {"uid: unknown session", [] { return OrvLibEUIDSet("nosuchsession", "alice", static_cast<uid_t>(-1)); }, 401,
+         nullptr},
+    };
+    for (const auto& test : cases) {
+        SCOPED_TRACE(test.what);
+        OrvLibSetErr(0);
+        if (test.log != nullptr) announceLog(test.log);
+        EXPECT_EQ(test.call(), -1);
+        EXPECT_EQ(OrvLibGetErr(), test.code);
+    }
+}
+
+TEST_F(IdentityTest, TheAdministratorQuestionComesBeforeTheArguments) {
+    vexo::gate::reset();
+    announceLog("bad parameter");
+    EXPECT_EQ(OrvLibEUIDSet("s", nullptr, 1), -1);
+    EXPECT_EQ(vexo::gate::calls("VEXOGroupIsAdminGroupMem"), 1);
+}
+
+TEST_F(IdentityTest, SessionAnswersSpareTheUserSource) {
+    vexo::gate::reset();
+    vexo::gate::fail("VexoCgiGIDGet", VEXO_ERR_GENERAL);
+    vexo::gate::fail("VEXOUserGetUGID", VEXO_ERR_GENERAL);
+    announceLog("Failed to get GID for user=alice, sid=s");
+    EXPECT_EQ(OrvLibUGIDSet("s", "alice"), -1);
+    EXPECT_EQ(OrvLibGetErr(), 401) << "only an unknown user is 403";
+    EXPECT_EQ(vexo::gate::calls("VEXOUserGetUGID"), 1) << "asked once the session failed";
+}
+
+TEST_F(IdentityTest, FailedGroupListIsLoggedAndLeavesNoneOfRoots) {
+    SKIP_WITHOUT_ROOT();
+    inChild([&] {
+        const gid_t roots[] = {0, 4, 27};
+        EXPECT_EQ(setgroups(3, roots), 0);
+        vexo::gate::fail("VEXOUserInitGroups", VEXO_ERR_GENERAL, EPERM);
+        EXPECT_EQ(OrvLibUGIDSet(nullptr, "alice"), 0);
+        EXPECT_EQ(geteuid(), support::kAliceUid);
+        EXPECT_EQ(groupList(), std::vector<gid_t>{});
+        const auto log = support::takeLog();
+        EXPECT_EQ(log.size(), 1U);
+        EXPECT_NE(log.at(0).text.find("Failed to initgroup for user=alice, sid=(null)"), std::string::npos);
+        return 0;
+    });
+}
+
+TEST_F(IdentityTest, HandOver) {
+    SKIP_WITHOUT_ROOT();
+    const std::string file = shareRoot("photo") + "/f", link = shareRoot("photo") + "/link",
+                      target = shareRoot("photo") + "/target";
+    support::writeFile(file, "x");
+    support::writeFile(target, "x");
+    ASSERT_EQ(symlink(target.c_str(), link.c_str()), 0);
+
+    const auto ownerOf = [](const std::string& path) {
+        struct stat status = {};
+        EXPECT_EQ(lstat(path.c_str(), &status), 0);
+        return status.st_uid;
+    };
+    EXPECT_EQ(OrvLibChown2Admin(file.c_str(), "alice"), 0);
+    EXPECT_EQ(ownerOf(file), support::kAliceUid);
+    EXPECT_EQ(OrvLibChown2Admin(link.c_str(), "alice"), 0);
+    EXPECT_EQ(ownerOf(link), support::kAliceUid);
+    EXPECT_EQ(ownerOf(target), 0U) << "a link is never followed";
+    EXPECT_EQ(OrvLibChown2Admin(file.c_str(), "nobody-here"), -1);
+
+    announceLog("orveluser(");
+    EXPECT_EQ(OrvLibChown2Admin(nullptr, "alice"), -1);
+    announceLog("owner to admin fail(No such file or directory)");
+    EXPECT_EQ(OrvLibChown2Admin((shareRoot("photo") + "/none").c_str(), "alice"), -1);
+    vexo::gate::fail("VEXOGetFSType", VEXO_ERR_GENERAL, EIO);
+    announceLog("(orveluser) : failed to get file-system type dir = " + file);
+    EXPECT_EQ(OrvLibChown2Admin(file.c_str(), "alice"), -1);
+    vexo::gate::reset();
+
+    for (const char* type : {"vfat", "nfs", "iso9660"}) {
+        SCOPED_TRACE(type);
+        const std::string other = shareRoot("photo") + "/" + type + "-file";
+        support::writeFile(other, "x");
+        addMount(other, type);
+        EXPECT_EQ(OrvLibChown2Admin(other.c_str(), "bob"), 0);
+        EXPECT_EQ(ownerOf(other), 0U) << "owners are not kept there";
+    }
+}
+
+}  // namespace

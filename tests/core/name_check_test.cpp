@@ -1,0 +1,244 @@
+#include "orvel/name_check.h"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <string>
+
+#include "fault_gate.h"
+#include "orvel/error_state.h"
+#include "support/appliance.h"
+#include "vexo/error.h"
+
+namespace {
+
+using support::announceLog;
+
+class NameCheckTest : public support::ApplianceTest {};
+
+TEST_F(NameCheckTest, ReservedNames) {
+    struct Case {
+        const char* name;
+        int code;  // 0: may be used
+    };
+    const Case cases[] = {{nullptr, 400}, {"", 400},       {".", 418},       {"..", 418}, {"a:b", 418}, {"a/b", 418},
+                          {"._x", 418},   {"._", 418},     {"@vexoea", 418}, {"a b", 0},  {".x", 0},    {"_.x", 0},
+                          {"...", 0},     {"@vexoea2", 0}, {"a\xFF\nb", 0},  {"@tmp", 0}};
+    for (const auto& test : cases) {
+        SCOPED_TRACE(test.name == nullptr ? "(null)" : test.name);
+        OrvLibSetErr(0);
+        EXPECT_EQ(OrvCheckReservedName(test.name), test.code == 0);
+        EXPECT_EQ(OrvLibGetErr(), test.code);
+    }
+}
+
+TEST_F(NameCheckTest, FileNames) {
+    const std::string fat = addShare("usb", "read only = no\n");
+    addMount(fat, "vfat");
+    const std::string disk = shareRoot("photo");
+    struct Case {
+        const char* folder;
+        const char* name;
+        int code;
+    };
+    const Case cases[] = {
+        {nullptr, "a", 400},         {disk.c_str(), nullptr, 400}, {disk.c_str(), "", 400},
+        {disk.c_str(), "..", 418},   {disk.c_str(), "a?b", 0},     {fat.c_str(), "a?b", 419},
+        {fat.c_str(), "a\\b", 419},  {fat.c_str(), "a\rb", 419},   {fat.c_str(), "a\nb", 419},
+        {fat.c_str(), "a|b\"", 419}, {fat.c_str(), "a:b", 418},    {fat.c_str(), "plain.txt", 0},
+    };
+    for (const auto& test : cases) {
+        SCOPED_TRACE(test.name == nullptr ? "(null)" : test.name);
+        OrvLibSetErr(0);
+        EXPECT_EQ(OrvCheckFileName(test.folder, test.name), test.code == 0 ? 0 : -1);
+        EXPECT_EQ(OrvLibGetErr(), test.code);
+    }
+    vexo::gate::fail("VEXOGetFSType", VEXO_ERR_GENERAL, EIO);
+    announceLog("Failed to statfs " + disk + ", reason=Input/output error");
+    EXPECT_EQ(OrvCheckFileName(disk.c_str(), "a"), -1);
+    EXPECT_EQ(OrvLibGetErr(), 417);
+}
+
+TEST_F(NameCheckTest, Paths) {
+    const std::string disk = shareRoot("photo");
+    const std::string fat = addShare("usb", "read only = no\n"), dead = addShare("dead", "read only = no\n");
+    addMount(fat, "vfat");
+    addMount(dead + "/gone", "nfs");
+    support::writeFile(disk + "/file", "x");
+    ASSERT_EQ(mkfifo((disk + "/fifo").c_str(), 0600), 0);
+    ASSERT_EQ(symlink("file", (disk + "/link").c_str()), 0);
+
+    struct Case {
+        std::string path;
+        bool walkUp;
+        int code, platformError;
+        std::string existing;  // on success
+        const char* log = nullptr;
+    };
+    const std::string longName(256, 'n');
+    const Case cases[] = {
+        {"", true, 400, 0, "", nullptr},
+        {"relative/x", true, 400, VEXO_ERR_PARAMETER, "", nullptr},
+        {"/", true, 408, VEXO_ERR_MISSING, "", nullptr},
+        {"//x", true, 400, 0, "", nullptr},
+        {"//x", false, 400, 0, "", nullptr},
+        {"/no-such-volume/a", true, 408, VEXO_ERR_MISSING, "", nullptr},
+        {disk + "/file", false, 0, 0, disk + "/file", nullptr},
+        {disk + "/file/", true, 0, 0, disk + "/file", nullptr},
+        {disk + "/new/deeper", false, 408, VEXO_ERR_MISSING, "", nullptr},
+        {disk + "/new/deeper", true, 0, 0, disk, nullptr},
+        {disk + "/n?w/..", true, 0, 0, disk, nullptr},
+        {disk + "/" + longName, true, 0, 0, disk, nullptr},
+        {disk + "/" + longName, false, 401, VEXO_ERR_GENERAL, "", "Failed to lstat"},
+        {disk + "/fifo", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"},
+        {disk + "/link", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"},
+        {fat + "/a/b?c", true, 419, 0, fat, nullptr},
+        {fat + "/a/b", true, 0, 0, fat, nullptr},
+        {dead + "/gone", false, 410, VEXO_ERR_REMOTE_MOUNT, "", nullptr},
+    };
+    for (const auto& test : cases) {
+        SCOPED_TRACE(test.path + (test.walkUp ? " up" : ""));
+        OrvLibSetErr(0);
+        VLIBCErrSetEx(0, "", 0);
+        if (test.log != nullptr) announceLog(test.log);
+        std::string existing;
+        EXPECT_EQ(OrvCheckPath(test.path.c_str(), test.walkUp, ORV_NO_ACL_TEST, &existing), test.code == 0 ? 0 : -1);
+        EXPECT_EQ(OrvLibGetErr(), test.code);
+        EXPECT_EQ(existing, test.existing);
+        if (test.platformError != 0) EXPECT_EQ(VLIBCErrGet(), test.platformError);
+    }
+    EXPECT_EQ(OrvCheckPath(nullptr, true, ORV_NO_ACL_TEST, nullptr), -1);
+    EXPECT_EQ(OrvCheckPath((disk + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), 0);
+}
+
+TEST_F(NameCheckTest, FirstComponentAloneSparesTheFatTest) {
+    addMount("/tmp", "vfat");
+    EXPECT_EQ(OrvCheckPath("/tmp/orvel?missing/x", true, ORV_NO_ACL_TEST, nullptr), 0);
+}
+
+TEST_F(NameCheckTest, PathsBeyondTheLimitAreCut) {
+    const std::string disk = shareRoot("photo");
+    EXPECT_EQ(OrvCheckPath((disk + "/" + std::string(5000, 'x')).c_str(), true, ORV_NO_ACL_TEST, nullptr), 0);
+}
+
+TEST_F(NameCheckTest, PathPermissions) {
+    SKIP_WITHOUT_ROOT();
+    const std::string folder = shareRoot("photo") + "/closed";
+    support::makeFolder(folder, 0755);
+    support::makeFolder(folder + "/hidden", 0700);
+    support::makeFolder(folder + "/hidden/below", 0755);
+    support::asUser(support::kBobUid, support::kUsersGid, [&] {
+        constexpr int kWrite = 2;
+        EXPECT_EQ(OrvCheckPath((folder + "/new").c_str(), true, kWrite, nullptr), -1);
+        EXPECT_EQ(OrvLibGetErr(), 407);
+        EXPECT_EQ(OrvCheckPath(folder.c_str(), false, 1, nullptr), 0);
+        OrvLibSetErr(0);
+        EXPECT_EQ(OrvCheckPath((folder + "/hidden/below").c_str(), false, ORV_NO_ACL_TEST, nullptr), -1);
+        EXPECT_EQ(OrvLibGetErr(), 407);
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_DENIED);
+        OrvLibSetErr(77);
+        EXPECT_EQ(OrvCheckPath(folder.c_str(), false, 0, nullptr), -1);
+        EXPECT_EQ(OrvLibGetErr(), 77) << "no bits asked: fails with the code that was there";
+        const auto log = support::takeLog();
+        EXPECT_EQ(log.size(), 2U);
+        EXPECT_TRUE(log.at(0).text.ends_with("Can't access " + folder + ", errno=197 ")) << log.at(0).text;
+        return 0;
+    });
+}
+
+TEST_F(NameCheckTest, SupportedFileSystems) {
+    const std::string internal = shareRoot("photo"), usb = "/usbshare1", esata = "/esata1";
+    writeRootFile("/etc/vexo/volumes", "/usbshare1 4\n/esata1 8\n");
+    addMount("/usbshare1", "vfat");
+    addMount("/usbshare1/net", "nfs4");
+    addMount("/usbshare1/strange", "fuseblk");
+    addMount("/esata1", "cifs");
+    struct Case {
+        std::string path;
+        bool supported;
+    };
+    const Case cases[] = {{internal, true},          {usb, true},  {usb + "/a/b", true}, {usb + "/net/a", false},
+                          {usb + "/strange", false}, {esata, true}};
+    for (const auto& test : cases) {
+        EXPECT_EQ(OrvLibFileSystemSupported(test.path.c_str()), test.supported) << test.path;
+    }
+    announceLog("Bad parameters: relative");
+    EXPECT_TRUE(OrvLibFileSystemSupported("relative"));
+    vexo::gate::reset();
+    EXPECT_TRUE(OrvLibFileSystemSupported((usb + "/a").c_str()));
+    EXPECT_EQ(vexo::gate::calls("VEXOGetFSType"), 2);
+    vexo::gate::fail("VEXOGetFSType", VEXO_ERR_GENERAL, EIO);
+    announceLog("VEXOGetFSType got error");
+    EXPECT_FALSE(OrvLibFileSystemSupported(usb.c_str()));
+}
+
+TEST(Utf8Pattern, Table) {
+    struct Case {
+        const char* text;
+        bool valid;
+    };
+    const Case cases[] = {{nullptr, true},
+                          {"", true},
+                          {"plain", true},
+                          {"\xC3\xA9", true},
+                          {"\xC3\x28", false},
+                          {"\x80", false},
+                          {"a\xBF", false},
+                          {"\xE4\xBD\xA0", true},
+                          {"\xE4\xBD", false},
+                          {"\xF0\x9F\x98\x80", true},
+                          {"\xF8\x88\x80\x80\x80", true},
+                          {"\xFC\x84\x80\x80\x80\x80", true},
+                          {"\xFC\x84\x80\x80\x80", false},
+                          {"\xC0\x80", true},      // overlong
+                          {"\xED\xA0\x80", true},  // surrogate
+                          {"\xFE", false},
+                          {"\xFF", false}};
+    for (const auto& test : cases) EXPECT_EQ(IsUnicodeString(test.text), test.valid) << (test.text ? test.text : "");
+}
+
+class TmpDirTest : public NameCheckTest {
+ protected:
+    static mode_t modeOf(const std::string& path) {
+        struct stat status = {};
+        return stat(path.c_str(), &status) == 0 ? status.st_mode : 0;
+    }
+};
+
+TEST_F(TmpDirTest, MakesBothOpenToAllAndKeepsTheUmask) {
+    std::string volume = shareRoot("photo");
+    support::inChild([&] {
+        umask(077);
+        EXPECT_EQ(OrvCreateTmpDir(volume.data()), 0);
+        EXPECT_EQ(modeOf(volume + "/@tmp"), mode_t{S_IFDIR | 0777});
+        EXPECT_EQ(modeOf(volume + "/@tmp/orvel"), mode_t{S_IFDIR | 0777});
+        EXPECT_EQ(umask(022), 0U) << "it stays for later files of the folders";
+        EXPECT_EQ(OrvCreateTmpDir(volume.data()), 0);
+        EXPECT_EQ(umask(022), 022U) << "nothing made, nothing changed";
+        return 0;
+    });
+}
+
+TEST_F(TmpDirTest, WhatStandsInTheWay) {
+    const std::string root = shareRoot("photo");
+    support::inChild([&] {
+        std::string plain = root + "/plain", dangling = root + "/dangling", missing = root + "/missing";
+        support::writeFile(plain + "/@tmp", "a file");
+        support::makeFolder(dangling);
+        EXPECT_EQ(symlink("nowhere", (dangling + "/@tmp").c_str()), 0);
+        EXPECT_EQ(OrvCreateTmpDir(plain.data()), 0);
+        EXPECT_EQ(support::readFile(plain + "/@tmp"), "a file");
+        EXPECT_EQ(OrvCreateTmpDir(dangling.data()), 0) << "a dangling link is replaced";
+        EXPECT_EQ(modeOf(dangling + "/@tmp/orvel"), mode_t{S_IFDIR | 0777});
+        EXPECT_EQ(OrvCreateTmpDir(nullptr), -1);
+        EXPECT_EQ(OrvCreateTmpDir(missing.data()), -1);
+        const auto log = support::takeLog();
+        EXPECT_EQ(log.size(), 2U);
+        EXPECT_NE(log.at(1).text.find(")Failed to mkdir : " + missing + "/@tmp , reason=No such file or directory[2]"),
+                  std::string::npos);
+        return 0;
+    });
+}
+
+}  // namespace
