@@ -1,0 +1,86 @@
+// Files as the platform reads and writes them: owned descriptors, interrupted calls repeated, whole writes. Functions
+// that return bool leave errno on failure.
+#ifndef VEXO_LINUX_FILE_IO_H
+#define VEXO_LINUX_FILE_IO_H
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstddef>
+#include <ctime>
+#include <string>
+#include <string_view>
+#include <utility>
+
+namespace vexo {
+
+// Owns a file descriptor. Closing it leaves errno alone.
+class Descriptor {
+ public:
+    explicit Descriptor(int fd = -1) : fd_(fd) {}
+    ~Descriptor() { reset(); }
+    Descriptor(Descriptor&& other) noexcept : fd_(std::exchange(other.fd_, -1)) {}
+    Descriptor& operator=(Descriptor&& other) noexcept {
+        if (this != &other) {
+            reset();
+            fd_ = std::exchange(other.fd_, -1);
+        }
+        return *this;
+    }
+    [[nodiscard]] int get() const { return fd_; }
+    [[nodiscard]] int release() { return std::exchange(fd_, -1); }
+    explicit operator bool() const { return fd_ >= 0; }
+    void reset() {
+        const int savedErrno = errno;
+        if (fd_ >= 0) close(fd_);
+        fd_ = -1;
+        errno = savedErrno;
+    }
+
+ private:
+    int fd_;
+};
+
+// openat, close-on-exec and repeated when interrupted. Empty with errno on failure.
+[[nodiscard]] Descriptor openFile(int folder, const char* path, int flags, mode_t mode = 0);
+[[nodiscard]] inline Descriptor openFile(const std::string& path, int flags, mode_t mode = 0) {
+    return openFile(AT_FDCWD, path.c_str(), flags, mode);
+}
+
+// Appends what is left of `fd` to `out`; EFBIG when that is more than `limit` bytes.
+[[nodiscard]] bool readAll(int fd, std::string& out, size_t limit);
+[[nodiscard]] bool writeAll(int fd, std::string_view text);
+
+// Which version of a file was read, for whoever remembers what it held.
+class FileVersion {
+ public:
+    FileVersion() = default;  // of no file
+    // `status` as fstat gives it, made before the file is read.
+    explicit FileVersion(const struct stat& status);
+    // True when `status`, taken later, still shows the version that was read.
+    [[nodiscard]] bool isCurrent(const struct stat& status) const;
+
+ private:
+    dev_t device_ = 0;
+    ino_t inode_ = 0;
+    off_t size_ = 0;
+    timespec modified_{};
+    bool settled_ = false;  // no later write can leave the same time
+};
+
+// Reads a regular file (anything else: EINVAL, without waiting on a pipe) into `text`; `version` is what was read.
+[[nodiscard]] bool readRegularFile(const std::string& path, size_t limit, std::string& text, FileVersion& version);
+
+// Replaces `path` as a whole: a temporary beside it, written, synchronised and renamed. On failure the temporary is
+// gone and the old file as it was. A symbolic link at `path` is itself replaced.
+[[nodiscard]] bool replaceFile(const std::string& path, std::string_view text, mode_t mode);
+
+// True for what a central store may trust: of this type (S_IFREG, S_IFDIR), owned by root or the effective user,
+// writable by nobody else, and, for a file, under one name only.
+[[nodiscard]] bool isTrusted(const struct stat& status, mode_t type);
+
+}  // namespace vexo
+
+#endif
