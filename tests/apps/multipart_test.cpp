@@ -1,0 +1,129 @@
+#include "cgi/multipart.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+namespace {
+
+using Status = cgi::MultipartReader::Status;
+
+struct Part {
+    std::string name, fileName, data;
+    bool isFile = false, ended = false;
+};
+
+struct Collector final : cgi::PartSink {
+    bool partBegin(const cgi::PartHeader& header) override {
+        parts.push_back({header.name, header.fileName, "", header.isFile});
+        return header.name != "stop";
+    }
+    bool partData(std::string_view data) override {
+        parts.back().data += data;
+        largest = std::max(largest, data.size());
+        return true;
+    }
+    bool partEnd() override {
+        parts.back().ended = true;
+        return true;
+    }
+    std::vector<Part> parts;
+    std::size_t largest = 0;
+};
+
+Status readWhole(const std::string& body, Collector& collector, std::size_t piece) {
+    cgi::MultipartReader reader("XX", collector);
+    for (std::size_t at = 0; at < body.size(); at += piece) reader.feed(std::string_view(body).substr(at, piece));
+    return reader.status();
+}
+
+std::string field(const std::string& disposition, const std::string& data) {
+    return "--XX\r\nContent-Disposition: form-data; " + disposition + "\r\n\r\n" + data + "\r\n";
+}
+
+TEST(Multipart, PartsInPiecesOfAnySize) {
+    const std::string tricky = std::string("\r\n--X\r\n-\r\n--\r\r\n\n\0\r\n--Y", 22) + std::string(300, '\r');
+    const std::string body = "preamble\r\n" + field("name=\"path\"", "/photo/a b") +
+                             field("name=empty; filename=\"\"", "") +
+                             field("filename=\"C:\\dir\\\"q\\\".txt\"; name=\"file\"", tricky) +
+                             field("name=f; filename=\"../../x%22%0a.txt\"", "z") + "--XX--\r\nepilogue";
+    for (const std::size_t piece : {body.size(), std::size_t{1}, std::size_t{2}, std::size_t{3}, std::size_t{17}}) {
+        SCOPED_TRACE(piece);
+        Collector all;
+        ASSERT_EQ(readWhole(body, all, piece), Status::kDone);
+        ASSERT_EQ(all.parts.size(), 4U);
+        EXPECT_EQ(all.parts[0].data, "/photo/a b");
+        EXPECT_FALSE(all.parts[0].isFile);
+        EXPECT_EQ(all.parts[1].name, "empty");
+        EXPECT_TRUE(all.parts[1].isFile);
+        EXPECT_EQ(all.parts[1].data, "");
+        EXPECT_EQ(all.parts[2].fileName, "C:\\dir\"q\".txt");
+        EXPECT_EQ(all.parts[2].data, tricky);
+        EXPECT_EQ(all.parts[3].fileName, "x\"\n.txt") << "the last component alone";
+        for (const auto& part : all.parts) EXPECT_TRUE(part.ended);
+    }
+}
+
+TEST(Multipart, Malformed) {
+    struct Case {
+        const char* what;
+        std::string body;
+        Status status;
+    };
+    const Case cases[] = {
+        {"nothing", "", Status::kMore},
+        {"no delimiter", "just text", Status::kMore},
+        {"cut in the data", field("name=a", "data"), Status::kMore},
+        {"cut in the headers", "--XX\r\nContent-Disp", Status::kMore},
+        {"no name", field("filename=x", "data"), Status::kMalformed},
+        {"another disposition", "--XX\r\nContent-Disposition: attachment; name=a\r\n\r\nx\r\n--XX--",
+         Status::kMalformed},
+        {"no headers", "--XX\r\n\r\ndata\r\n--XX--", Status::kMalformed},
+        {"junk behind the delimiter", "--XXjunk\r\n\r\n", Status::kMalformed},
+        {"endless headers", "--XX\r\n" + std::string(20000, 'h'), Status::kMalformed},
+        {"too many parts",
+         [] {
+             std::string body;
+             for (int i = 0; i < 1001; ++i) body += field("name=a", "");
+             return body;
+         }(),
+         Status::kMalformed},
+        {"the sink stops", field("name=stop", "data"), Status::kStopped},
+    };
+    for (const auto& test : cases) {
+        SCOPED_TRACE(test.what);
+        Collector all;
+        EXPECT_EQ(readWhole(test.body, all, 5), test.status);
+    }
+}
+
+TEST(Multipart, MemoryStaysFlat) {
+    Collector all;
+    cgi::MultipartReader reader("XX", all);
+    reader.feed("--XX\r\nContent-Disposition: form-data; name=a; filename=b\r\n\r\n");
+    const std::string piece(4096, 'd');
+    for (int i = 0; i < 256; ++i) reader.feed(piece);
+    reader.feed("\r\n--XX--");
+    EXPECT_EQ(reader.status(), Status::kDone);
+    EXPECT_EQ(all.parts.at(0).data.size(), 256 * piece.size());
+    EXPECT_LT(all.largest, 2 * piece.size()) << "handed on as it comes";
+}
+
+TEST(Multipart, Boundary) {
+    struct Case {
+        std::string type, boundary;
+    };
+    const Case cases[] = {
+        {"multipart/form-data; boundary=abc", "abc"},
+        {"Multipart/Form-Data ;charset=x; BOUNDARY=\"a b;c\" ; x=y", "a b;c"},
+        {"multipart/form-data", ""},
+        {"multipart/form-data; boundary=", ""},
+        {"multipart/mixed; boundary=abc", ""},
+        {"multipart/form-data; boundary=" + std::string(71, 'b'), ""},
+        {"", ""},
+    };
+    for (const auto& test : cases) EXPECT_EQ(cgi::boundaryOf(test.type), test.boundary) << test.type;
+}
+
+}  // namespace
