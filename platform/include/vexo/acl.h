@@ -20,9 +20,19 @@ VEXO_BEGIN_C
 // then.
 VEXO_API int VEXOACLPermGet(const char* path, unsigned* permission);
 // The same for `name` inside the open folder `dirfd`, whose status the caller has at hand (`status` of the entry
-// itself, no link): what a listing of many entries calls. Asks the kernel only where the status does not settle the
-// answer.
+// itself, no link). Asks the kernel only where the status does not settle the answer; the folder's own answer is
+// remembered from call to call and told by two system calls to be the same still.
 VEXO_API int VEXOACLPermGetAt(int dirfd, const char* name, const _tag_VEXOSTAT_* status, unsigned* permission);
+
+// The same for many entries of one folder: what a listing calls. Open collects once what holds for all entries (the
+// effective identity, the mount, the folder's own bits), so it is opened after the switch of identity and lives no
+// longer than the listing. `dirfd` stays the caller's and open. Null with the slot (0x8100) on failure.
+typedef struct VEXOACLFOLDER* PVEXOACLFOLDER;
+VEXO_API PVEXOACLFOLDER VEXOACLFolderOpen(int dirfd);
+VEXO_API int VEXOACLFolderPermGet(PVEXOACLFOLDER folder, const char* name, const _tag_VEXOSTAT_* status,
+                                  unsigned* permission);
+VEXO_API void VEXOACLFolderClose(PVEXOACLFOLDER folder);  // null is accepted
+
 // >0 when the file system that holds `path` keeps ACLs, 0 when not, <0 failure. Remembered per device. Pass -1 and 2.
 VEXO_API int VEXOACLIsSupport(const char* path, int fd, int kind);
 // The same for the device of an entry whose status is known; `path` is used when the device is met for the first time.

@@ -21,9 +21,14 @@ struct _tag_VEXOSTAT_ {
     uint64_t st_device;  // major and minor as makedev() joins them
     uint64_t st_inode;
     uint32_t st_links;
+    uint32_t st_attributes;  // VEXO_ATTRIBUTE_... bits
 };
 
 enum { VEXO_STAT_BASIC = 1, VEXO_STAT_CREATE_TIME = 8 };
+
+// What decides about writing and removing besides mode and owner. Without KNOWN the file system does not tell, or the
+// entry is the root of another mount.
+enum { VEXO_ATTRIBUTE_KNOWN = 1, VEXO_ATTRIBUTE_IMMUTABLE = 2, VEXO_ATTRIBUTE_APPEND = 4 };
 
 VEXO_BEGIN_C
 // The status of `path` itself (a symbolic link is not followed). `flags`: 1 basic fields, 8 also the creation time (the
