@@ -1,0 +1,96 @@
+// CGI program "list": what a folder holds, and which shares there are.
+//
+// Parameters, from the query or a form:
+//   action           "shares" or "folder"
+//   path, path_raw   the folder (folder only)
+//   sort_by          as for OrvEnum, default "name"; sort_direction "asc" (default) or "desc"
+//   offset, limit    the page; limit 0, the default, means everything
+//   additional       words as for additionalBits
+//   pattern          comma-separated name patterns; filetype "dir", "file" or "all" (default)   (folder only)
+// "data" of the reply is {"total","offset","items"}.
+#include <optional>
+#include <string>
+
+#include "listing.h"
+#include "orvel/error_state.h"
+#include "reply.h"
+#include "request.h"
+#include "vexo/web.h"
+
+namespace orvel::cgi {
+namespace {
+
+std::optional<_tag_dir_entry_type_> typeParam(const VEXO::WebCGI& web) {
+    const std::string word = web.GetParam("filetype", "all");
+    if (word == "dir") return DIR_ENTRY_TYPE_DIR;
+    if (word == "file") return DIR_ENTRY_TYPE_FILE;
+    if (word == "all") return DIR_ENTRY_TYPE_ALL;
+    return std::nullopt;
+}
+
+std::optional<bool> ascendingParam(const VEXO::WebCGI& web) {
+    const std::string word = web.GetParam("sort_direction", "asc");
+    if (word == "asc") return true;
+    if (word == "desc") return false;
+    return std::nullopt;
+}
+
+// Nothing when a parameter is not what it should be.
+std::optional<ListRequest> parse(const VEXO::WebCGI& web, const User& user) {
+    const auto path = pathParam(web);
+    const auto offset = numberParam(web, "offset", 0);
+    const auto limit = numberParam(web, "limit", 0);
+    const auto type = typeParam(web);
+    const auto ascending = ascendingParam(web);
+    if (!path || !offset || !limit || !type || !ascending) return std::nullopt;
+    return ListRequest{.user = user.name,
+                       .sid = user.sid,
+                       .path = *path,
+                       .sortBy = web.GetParam("sort_by", "name"),
+                       .ascending = *ascending,
+                       .offset = *offset,
+                       .limit = *limit,
+                       .additional = additionalBits(web.GetParam("additional", "")),
+                       .pattern = web.GetParam("pattern", ""),
+                       .type = *type};
+}
+
+void serve(Output& out) {
+    dropForwardedFor();
+    User user;
+    const Status admitted = admit(user);
+    if (admitted != Status::kOk) return replyFailure(out, admitted, "", ORV_ERR_DENIED, "");
+
+    const VEXO::WebCGI web;
+    if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
+    const std::string action = web.GetParam("action", "");
+    const auto request = parse(web, user);
+    if (!request || (action != "shares" && action != "folder")) {
+        return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
+    }
+
+    const bool shares = action == "shares";
+    Listing listing;
+    int code = actAs(user.sid.c_str(), user.name, true);
+    if (code == ORV_ERR_NONE) code = shares ? listShares(*request, listing) : listFolder(*request, listing);
+    if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, request->path);
+
+    beginReply(out, Status::kOk, user.cookie);
+    out.text() += "{\"success\":true,\"data\":";
+    writeListing(*request, listing, shares ? appendShare : appendEntry, out);
+    out.text() += '}';
+}
+
+}  // namespace
+}  // namespace orvel::cgi
+
+int main() {
+    orvel::cgi::Output out(1);
+    try {
+        orvel::cgi::serve(out);
+    } catch (...) {
+        // Memory is out. A reply that has begun cannot become another one.
+        return 1;
+    }
+    return out.finish() ? 0 : 1;
+}

@@ -1,0 +1,127 @@
+#include "listing.h"
+
+#include <algorithm>
+#include <vector>
+
+#include "confined.h"
+#include "orvel/error_state.h"
+#include "orvel/file_info.h"
+#include "orvel/listing.h"
+#include "orvel/privilege.h"
+#include "orvel/search_criteria.h"
+
+namespace orvel::cgi {
+namespace {
+
+struct AdditionalWord {
+    std::string_view word;
+    int bit;
+};
+
+constexpr AdditionalWord kWords[] = {{"real_path", ADDITIONAL_REAL_PATH},
+                                     {"size", ADDITIONAL_SIZE},
+                                     {"owner", ADDITIONAL_OWNER},
+                                     {"time", ADDITIONAL_TIME},
+                                     {"perm", ADDITIONAL_PERM},
+                                     {"type", ADDITIONAL_TYPE},
+                                     {"mount_point_type", ADDITIONAL_MOUNT_POINT_TYPE},
+                                     {"volume_status", ADDITIONAL_VOLUME_STATUS},
+                                     {"sync_share", ADDITIONAL_SYNC_SHARE}};
+
+int bitOf(std::string_view word) {
+    for (const AdditionalWord& known : kWords) {
+        if (known.word == word) return known.bit;
+    }
+    return 0;
+}
+
+// Some failures of the library set no code.
+int lastError(int fallback) {
+    const int code = OrvLibGetErr();
+    return code != ORV_ERR_NONE ? code : fallback;
+}
+
+const char* sidOf(const ListRequest& request) {
+    return request.sid.empty() ? nullptr : request.sid.c_str();
+}
+
+// The criteria of one request; the library only borrows them.
+class NameCriteria {
+ public:
+    NameCriteria() = default;
+    ~NameCriteria() {
+        for (const FileSearch::FindComp* criterion : list_) delete criterion;
+    }
+    NameCriteria(const NameCriteria&) = delete;
+    NameCriteria& operator=(const NameCriteria&) = delete;
+
+    bool add(const std::string& patterns) {
+        return FileSearch::FindFactory::createFindOp(FileSearch::FIND_NAME, nullptr, patterns.c_str(), list_);
+    }
+    [[nodiscard]] const std::vector<FileSearch::FindComp*>& list() const { return list_; }
+
+ private:
+    std::vector<FileSearch::FindComp*> list_;
+};
+
+}  // namespace
+
+int additionalBits(std::string_view words) {
+    int bits = 0;
+    while (!words.empty()) {
+        const size_t end = std::min(words.find(','), words.size());
+        bits |= bitOf(words.substr(0, end));
+        words.remove_prefix(std::min(end + 1, words.size()));
+    }
+    return bits;
+}
+
+int listFolder(const ListRequest& request, Listing& listing) {
+    PathInfo info;
+    // The top level is the share listing's; the answer is that of the folder listing, which resolution would pre-empt.
+    if (request.path == "/") return ORV_ERR_DENIED;
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(request.user.c_str(), request.path, info)) return lastError(ORV_ERR_GENERAL);
+    OrvLibSetErr(ORV_ERR_NONE);
+    // A refusal sets no code, a look-up that failed does.
+    if (!CheckShareListPrivilege(request.user.c_str(), sidOf(request), info.path.c_str()))
+        return lastError(ORV_ERR_DENIED);
+
+    std::string realPath;
+    const int refusal = confinedFolder(info, linkPolicyOf(info.shareName), realPath);
+    if (refusal != ORV_ERR_NONE) return refusal;
+    if (!CheckDirListPrivilege(realPath.c_str())) return lastError(ORV_ERR_GENERAL);
+
+    NameCriteria criteria;
+    if (!request.pattern.empty() && !criteria.add(request.pattern)) return lastError(ORV_ERR_GENERAL);
+    OrvEnum enumeration;
+    const bool listed = enumeration.OrvLibDirEntryListEnum(
+        info.path.c_str(), realPath.c_str(), request.sortBy.c_str(), request.additional, request.offset, request.limit,
+        request.ascending, request.type, criteria.list(), listing.entries, &listing.total);
+    return listed ? ORV_ERR_NONE : lastError(ORV_ERR_GENERAL);
+}
+
+int listShares(const ListRequest& request, Listing& listing) {
+    OrvLibSetErr(ORV_ERR_NONE);
+    OrvEnum enumeration;
+    const bool listed = enumeration.OrvLibShareEntryListEnum(
+        request.user.c_str(), sidOf(request), false, request.sortBy.c_str(), request.additional, request.offset,
+        request.limit, request.ascending, listing.entries, &listing.total);
+    return listed ? ORV_ERR_NONE : lastError(ORV_ERR_GENERAL);
+}
+
+void writeListing(const ListRequest& request, const Listing& listing,
+                  void (*append)(const DIRENTRY_INFO&, int, std::string&), Output& out) {
+    out.text() += "{\"total\":" + std::to_string(listing.total) + ",\"offset\":" + std::to_string(request.offset) +
+                  ",\"items\":[";
+    bool first = true;
+    for (const DIRENTRY_INFO& entry : listing.entries) {
+        if (!first) out.text() += ',';
+        first = false;
+        append(entry, request.additional, out.text());
+        out.spill();
+    }
+    out.text() += "]}";
+}
+
+}  // namespace orvel::cgi

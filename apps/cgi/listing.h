@@ -1,0 +1,52 @@
+// A listing from a share-relative path to text, as the programs and the command-line tool ask for it.
+#ifndef ORVEL_CGI_LISTING_H
+#define ORVEL_CGI_LISTING_H
+
+#include <list>
+#include <string>
+#include <string_view>
+
+#include "orvel/dir_entry.h"
+#include "output.h"
+
+namespace orvel::cgi {
+
+struct ListRequest {
+    std::string user;
+    std::string sid;   // "" for none
+    std::string path;  // not used for the shares
+    std::string sortBy = "name";
+    bool ascending = true;
+    unsigned long offset = 0;
+    unsigned long limit = 0;  // 0: everything
+    int additional = 0;       // ADDITIONAL_... bits
+    std::string pattern;      // comma-separated name patterns, "" for every name
+    _tag_dir_entry_type_ type = DIR_ENTRY_TYPE_ALL;
+};
+
+struct Listing {
+    std::list<DIRENTRY_INFO> entries;  // the page
+    unsigned long total = 0;           // before the page was cut
+};
+
+// Words of a comma-separated list ("size,time") as ADDITIONAL_... bits; unknown words ask for nothing.
+int additionalBits(std::string_view words);
+
+// List a folder, or the home folder and the shares of the user. The process has the user's identity. 0 or a library
+// code; what a failure leaves in `listing` is to be thrown away.
+int listFolder(const ListRequest& request, Listing& listing);
+int listShares(const ListRequest& request, Listing& listing);
+
+// Appends the object of one entry, always valid UTF-8: a name or path that is none is shown readable, with "name_raw"
+// and "path_raw", its bytes percent-encoded, beside it. Entries of the share listing also tell the user's right
+// ("perm": "share_right", "ftp_privilege", "acl_enabled") and "sync_share".
+void appendEntry(const DIRENTRY_INFO& entry, int additional, std::string& out);
+void appendShare(const DIRENTRY_INFO& entry, int additional, std::string& out);
+
+// Appends {"total","offset","items"} with the entries written by `append`.
+void writeListing(const ListRequest& request, const Listing& listing,
+                  void (*append)(const DIRENTRY_INFO&, int, std::string&), Output& out);
+
+}  // namespace orvel::cgi
+
+#endif

@@ -1,0 +1,88 @@
+#include "request.h"
+
+#include <charconv>
+#include <cstdlib>
+
+#include "orvel/error_state.h"
+#include "orvel/identity.h"
+#include "orvel/share_path.h"
+#include "text.h"
+#include "vexo/filesystem.h"
+#include "vexo/session.h"
+#include "vexo/settings.h"
+#include "vexo/share.h"
+#include "vexo/user.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr const char* kApplication = "VEXO.QDS.App.Quorvane3.Instance";
+constexpr int kEveryCheck = 15;
+
+bool isTrustedProxy(const std::string& address) {
+    const std::string proxies = VexoConf::Info().Get("trusted_proxies", "");
+    for (const std::string& proxy : WebUtils::StringExplode(proxies, ",")) {
+        const size_t first = proxy.find_first_not_of(' ');
+        if (first == std::string::npos) continue;
+        const size_t last = proxy.find_last_not_of(' ');
+        if (proxy.compare(first, last - first + 1, address) == 0) return true;
+    }
+    return false;
+}
+
+// What goes wrong here shows again, with its code, when the path is resolved.
+void makeHome(const std::string& user) {
+    VEXOUSER* record = nullptr;
+    if (VEXOUserGet(user.c_str(), &record) < 0) return;
+    const bool enabled = VEXOServiceUserHomeIsEnabled(record->authType, record->uid) == 1;
+    VEXOUserFree(record);
+    std::string home;
+    if (enabled) OrvUserHomeFullPathGet(home, user);
+}
+
+}  // namespace
+
+void dropForwardedFor() {
+    const char* peer = getenv("REMOTE_ADDR");
+    if (peer != nullptr && isTrustedProxy(peer)) return;
+    unsetenv("HTTP_X_FORWARDED_FOR");
+    unsetenv("HTTP_CLIENT_IP");
+}
+
+Status admit(User& user) {
+    WebMan session;
+    if (!session.IsAuthorized(kApplication, kEveryCheck, CGI_POSITION_DESKTOP)) return Status::kNotLoggedIn;
+    user.name = session.GetLoginUserName();
+    user.sid = session.GetSessionId();
+    user.cookie = session.GetNewCookie();
+    return VLIBUserPrivilegeHas(user.name.c_str(), kApplication) == 1 ? Status::kOk : Status::kForbidden;
+}
+
+int actAs(const char* sid, const std::string& user, bool needsHome) {
+    if (needsHome) makeHome(user);
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (OrvLibUGIDSet(sid, user.c_str()) == 0) return ORV_ERR_NONE;
+    const int code = OrvLibGetErr();
+    return code != ORV_ERR_NONE ? code : ORV_ERR_GENERAL;
+}
+
+std::optional<unsigned long> parseNumber(std::string_view text) {
+    unsigned long number = 0;
+    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
+    if (error != std::errc() || end != text.data() + text.size()) return std::nullopt;
+    return number;
+}
+
+std::optional<unsigned long> numberParam(const VEXO::WebCGI& cgi, const char* name, unsigned long fallback) {
+    if (!cgi.HasParam(name)) return fallback;
+    return parseNumber(cgi.GetParam(name, ""));
+}
+
+std::optional<std::string> pathParam(const VEXO::WebCGI& cgi) {
+    if (cgi.HasParam("path_raw")) return percentDecode(cgi.GetParam("path_raw", ""));
+    std::string path = cgi.GetParam("path", "");
+    if (path.find('\0') != std::string::npos) return std::nullopt;
+    return path;
+}
+
+}  // namespace orvel::cgi

@@ -1,0 +1,43 @@
+// What every program does before its own work: who asks, as whom it acts, and what the parameters say.
+#ifndef ORVEL_CGI_REQUEST_H
+#define ORVEL_CGI_REQUEST_H
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "reply.h"
+#include "vexo/web.h"
+
+namespace orvel::cgi {
+
+// The logged-in user of a request.
+struct User {
+    std::string name;
+    std::string sid;     // login session
+    std::string cookie;  // what the reply must set, "" for nothing
+};
+
+// Removes the headers in which a proxy names its client from the environment, unless the request comes from an address
+// that the setting "trusted_proxies" lists (comma-separated): anybody can send them.
+void dropForwardedFor();
+
+// Logs the request in through the platform's session and asks for the file manager's application privilege. kOk with
+// `user` filled, kNotLoggedIn or kForbidden.
+Status admit(User& user);
+
+// Takes on the user's identity for the rest of the process; `sid` may be null. His home folder is made first when
+// `needsHome`, as the folder that holds all homes is not his to write in. 0, or the library code of the failure.
+int actAs(const char* sid, const std::string& user, bool needsHome);
+
+// A parameter that is a number: `fallback` when absent, nothing when it is anything but decimal digits that fit.
+std::optional<unsigned long> numberParam(const VEXO::WebCGI& cgi, const char* name, unsigned long fallback);
+std::optional<unsigned long> parseNumber(std::string_view text);
+
+// The share-relative path of a request: "path_raw", percent-encoded once more so that its bytes can be anything, or
+// "path". Nothing for a path that cannot be one: a NUL byte or a broken "%".
+std::optional<std::string> pathParam(const VEXO::WebCGI& cgi);
+
+}  // namespace orvel::cgi
+
+#endif
