@@ -30,11 +30,11 @@ struct PrivilegeReason {
     unsigned effectiveMask = 0;  // what binds this user; administrators are free of it
 
     std::string realPath;
-    bool exists = false;    // at least as far as the calling identity can see
-    int fsType = 11;        // the platform's number of the file system's type; 11 unknown
-    bool remote = false;    // on a network mount; nothing below it is looked at then
+    std::string fsType;     // name of the file system's type, "unknown" for one that the platform has no name for
+    bool remote = false;    // on a network mount: the file itself is not looked at, its server may be dead
     bool readOnly = false;  // on a read-only mount
-    unsigned aclBits = 0;   // of the calling identity, as GetACLPrivilege; 0 when the target does not exist
+    bool exists = false;    // as far as the calling identity can see
+    unsigned aclBits = 0;   // of the calling identity, as GetACLPrivilege; 0 when the file does not exist
 };
 
 // Fills `reason` for `user` and the share-relative `path`; `sid` as for OrvLibGetPrivilege. The permission bits are

@@ -62,7 +62,7 @@ class Descriptor {
 template <class Owner>
 class Acquire {
  public:
-    explicit Acquire(Owner& owner) : owner_(owner) {}
+    explicit Acquire(Owner& owner, typename Owner::pointer record = nullptr) : owner_(owner), record_(record) {}
     ~Acquire() { owner_.reset(record_); }
     Acquire(const Acquire&) = delete;
     Acquire& operator=(const Acquire&) = delete;
@@ -70,12 +70,18 @@ class Acquire {
 
  private:
     Owner& owner_;
-    typename Owner::pointer record_ = nullptr;
+    typename Owner::pointer record_;
 };
 
 template <class Owner>
 Acquire<Owner> acquire(Owner& owner) {
     return Acquire<Owner>(owner);
+}
+
+// Passes an owner to a function that changes the record in place and may move it: `VLIBCSzListPush(lend(list), text)`.
+template <class Owner>
+Acquire<Owner> lend(Owner& owner) {
+    return Acquire<Owner>(owner, owner.release());
 }
 
 }  // namespace orvel
