@@ -5,8 +5,8 @@
 #include <unordered_map>
 #include <utility>
 
+#include "failure.h"
 #include "fault_gate.h"
-#include "vexo/error.h"
 #include "vexo/list.h"
 
 struct _VLIBCSZHASH_ {
@@ -16,11 +16,6 @@ struct _VLIBCSZHASH_ {
 };
 
 namespace {
-
-int refuse(int code, int line) {
-    VLIBCErrSetEx(code, __FILE__, line);
-    return -1;
-}
 
 void insert(_VLIBCSZHASH_& hash, const char* key, const char* value) {
     if (hash.index.contains(key)) return;
@@ -41,7 +36,7 @@ PVLIBCSZHASH VLIBCSzHashAlloc(int capacity) {
     try {
         return new _VLIBCSZHASH_;
     } catch (const std::bad_alloc&) {
-        refuse(VEXO_ERR_GENERAL, __LINE__);
+        vexo::fail(VEXO_ERR_GENERAL);
         return nullptr;
     }
 }
@@ -49,12 +44,12 @@ PVLIBCSZHASH VLIBCSzHashAlloc(int capacity) {
 int VLIBCSzHashSetValue(PVLIBCSZHASH* hash, const char* key, const char* value) {
     VEXO_GATE("VLIBCSzHashSetValue", -1);
     if (hash == nullptr || *hash == nullptr || key == nullptr || value == nullptr) {
-        return refuse(VEXO_ERR_PARAMETER, __LINE__);
+        return vexo::fail(VEXO_ERR_PARAMETER);
     }
     try {
         insert(**hash, key, value);
     } catch (const std::bad_alloc&) {
-        return refuse(VEXO_ERR_GENERAL, __LINE__);
+        return vexo::fail(VEXO_ERR_GENERAL);
     }
     return 0;
 }
@@ -67,7 +62,7 @@ const char* VLIBCSzHashGetValue(PVLIBCSZHASH hash, const char* key) {
 
 int VLIBCSzHashEnumKey(PVLIBCSZHASH hash, PVLIBCSZLIST* out) {
     VEXO_GATE("VLIBCSzHashEnumKey", -1);
-    if (hash == nullptr || out == nullptr || *out == nullptr) return refuse(VEXO_ERR_PARAMETER, __LINE__);
+    if (hash == nullptr || out == nullptr || *out == nullptr) return vexo::fail(VEXO_ERR_PARAMETER);
     int keys = 0;
     for (const auto& [key, value] : hash->pairs) {
         if (VLIBCSzListPush(out, key.c_str()) < 0) return -1;

@@ -7,8 +7,8 @@
 #include <utility>
 #include <vector>
 
+#include "failure.h"
 #include "fault_gate.h"
-#include "vexo/error.h"
 #include "vexo/text.h"
 
 namespace {
@@ -21,11 +21,6 @@ struct List : VLIBCSZLIST {
 
 List& listOf(PVLIBCSZLIST list) {
     return *static_cast<List*>(list);
-}
-
-int refuse(int code, int line) {
-    VLIBCErrSetEx(code, __FILE__, line);
-    return -1;
 }
 
 // Each string is folded once, not at each comparison.
@@ -44,17 +39,17 @@ PVLIBCSZLIST VLIBCSzListAlloc(int capacity) {
     VEXO_GATE("VLIBCSzListAlloc", nullptr);
     static_cast<void>(capacity);
     auto* list = new (std::nothrow) List{};
-    if (list == nullptr) refuse(VEXO_ERR_GENERAL, __LINE__);
+    if (list == nullptr) vexo::fail(VEXO_ERR_GENERAL);
     return list;
 }
 
 int VLIBCSzListPush(PVLIBCSZLIST* list, const char* text) {
     VEXO_GATE("VLIBCSzListPush", -1);
-    if (list == nullptr || *list == nullptr || text == nullptr) return refuse(VEXO_ERR_PARAMETER, __LINE__);
+    if (list == nullptr || *list == nullptr || text == nullptr) return vexo::fail(VEXO_ERR_PARAMETER);
     try {
         listOf(*list).items.emplace_back(text);
     } catch (const std::bad_alloc&) {
-        return refuse(VEXO_ERR_GENERAL, __LINE__);
+        return vexo::fail(VEXO_ERR_GENERAL);
     }
     return ++(*list)->nItem;
 }
@@ -69,7 +64,7 @@ void VLIBCSzListSortItems(PVLIBCSZLIST list, int option) {
     try {
         sortWithoutCase(listOf(list).items);
     } catch (const std::bad_alloc&) {
-        refuse(VEXO_ERR_GENERAL, __LINE__);  // the order stays as it was
+        vexo::fail(VEXO_ERR_GENERAL);  // the order stays as it was
     }
 }
 
@@ -80,7 +75,7 @@ void VLIBCSzListFree(PVLIBCSZLIST list) {
 int VLIBCStrTok(char* text, const char* separators, PVLIBCSZLIST* out) {
     VEXO_GATE("VLIBCStrTok", -1);
     if (text == nullptr || separators == nullptr || out == nullptr || *out == nullptr) {
-        return refuse(VEXO_ERR_PARAMETER, __LINE__);
+        return vexo::fail(VEXO_ERR_PARAMETER);
     }
     int pieces = 0;
     char* rest = nullptr;

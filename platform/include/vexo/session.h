@@ -19,8 +19,9 @@ enum _tag_cgi_position {
 };
 
 VEXO_BEGIN_C
-// Ids of the user of session `sid`, from the session store and then the user source. 0xFFFFFFFF on failure: 0x1D00
-// unknown user, 0x0300 when the session is another user's or unknown.
+// Ids of the user of session `sid`, from the session store and then the user source; counts as a use of the session.
+// 0xFFFFFFFF on failure: 0x1D00 unknown user, 0x0300 when the session is another user's, unknown or ended, 0x0D00 for
+// a null argument or an empty user.
 VEXO_API uid_t VexoCgiUIDGet(const char* sid, const char* user);
 VEXO_API gid_t VexoCgiGIDGet(const char* sid, const char* user);
 VEXO_END_C
@@ -37,13 +38,16 @@ class VEXO_API WebMan {
 
     // True when the request is authenticated and its user known: the session named by the cookie when it is this user's
     // and still alive, else a new one (its cookie is then due, see GetNewCookie). `flags` and `position` select what
-    // the appliance's log-in page would ask; every authenticated session satisfies them here.
+    // the appliance's log-in page would ask; every authenticated session satisfies them here, and so it does for any
+    // `appId` (see VLIBUserPrivilegeHas). False with the slot: 0x0300 nobody let in or a store that is not ours, 0x1D00
+    // unknown user, 0x0D00 a user name with control bytes, else why the session could not be written.
     bool IsAuthorized(const char* appId, int flags, _tag_cgi_position position);
     // The session's user, "" before IsAuthorized succeeded.
     std::string GetLoginUserName() const;
     // The session identifier, "" before IsAuthorized succeeded.
     std::string GetSessionId() const;
-    // The header value of a cookie that the reply must set ("id=...; Path=/; HttpOnly; SameSite=Strict"), "" when none.
+    // The header value of a cookie that the reply must set ("id=...; Path=/; HttpOnly; SameSite=Strict", and "; Secure"
+    // in a request by HTTPS), "" when none.
     std::string GetNewCookie() const;
 
  private:

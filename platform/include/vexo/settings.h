@@ -22,7 +22,7 @@ VEXO_API int VLIBCSupportGet(const char* key);
 // Minutes until a session ends, setting "session_timeout"; -1 when unset or no number.
 VEXO_API int VLIBCConfGetKTRTimeout(void);
 // Adds every key of `file` (values unquoted) to the hash `*out`, which stays the caller's; a null `*out` becomes a new
-// hash, except on failure. `sep` separates key and value ("="). The number of keys read; 0 when there is none; -1 on
+// hash, except on failure. `sep` separates key and value ("="). The number of pairs read; 0 when there is none; -1 on
 // failure as above.
 VEXO_API int VLIBCFileGetKeys(const char* file, PVLIBCSZHASH* out, const char* sep);
 VEXO_END_C

@@ -12,14 +12,16 @@ namespace VEXO {
 
 class VEXO_API WebCGI {
  public:
-    // Reads QUERY_STRING and HTTP_COOKIE, and the body of a POST of type application/x-www-form-urlencoded (at most 1
-    // MiB; a longer one is not read and bodyRefused() is true).
+    // Reads QUERY_STRING and HTTP_COOKIE, and from standard input the body of a POST of type
+    // application/x-www-form-urlencoded: as many bytes as CONTENT_LENGTH says, at most 1 MiB. A longer one is not read;
+    // then, and for one that is cut short or holds a NUL byte, BodyRefused() is true and no field of it counts.
     WebCGI();
     ~WebCGI();
     WebCGI(const WebCGI&) = delete;
     WebCGI& operator=(const WebCGI&) = delete;
 
-    // The first value of the parameter, percent-decoded ("+" is a blank); `def` when absent. Query before body.
+    // The first value of the parameter, percent-decoded ("+" is a blank; "%00" and broken escapes stay as they are);
+    // `def` when absent. Query before body.
     std::string GetParam(const std::string& name, const std::string& def) const;
     bool HasParam(const std::string& name) const;
     bool BodyRefused() const;
@@ -37,7 +39,8 @@ class VEXO_API WebCGI {
 };
 
 namespace WebAPIUtil {
-// Cuts `text` at each `separator` into an array of strings; empty pieces are kept. A null text gives an empty array.
+// Cuts `text` at each `separator` into an array of strings; empty pieces are kept, so an empty text gives one of them.
+// A null text gives an empty array, a null or empty separator the whole text.
 VEXO_API Json::Value ParseToArray(const char* text, const char* separator);
 }  // namespace WebAPIUtil
 

@@ -1,0 +1,32 @@
+// The texts of a web request: forms and cookies. Pure.
+#ifndef VEXO_LINUX_CGI_TEXT_H
+#define VEXO_LINUX_CGI_TEXT_H
+
+#include <optional>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+namespace vexo {
+
+using FormFields = std::vector<std::pair<std::string, std::string>>;
+
+// Percent escapes to bytes, "+" to a blank. An escape that is none stays as it is, and so does "%00": no name or text
+// of the appliance holds a NUL, and a text that is cut there would be another one than the one that was checked.
+std::string decodeFormText(std::string_view text);
+
+// Appends the fields of "a=1&b=2", decoded, in their order. A piece without "=" is a field with an empty value.
+void parseForm(std::string_view text, FormFields& fields);
+
+// The value of the first cookie of that name in a Cookie header.
+std::optional<std::string> findCookie(std::string_view header, std::string_view name);
+
+// True for what may be the name of a cookie (a token).
+bool isCookieName(std::string_view text);
+// True for what may be a cookie's value or path: no control bytes, ";" or ",".
+bool isCookieText(std::string_view text);
+
+}  // namespace vexo
+
+#endif
