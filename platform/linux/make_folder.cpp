@@ -1,20 +1,17 @@
 // Making a folder with its missing parents, by descriptors, so that nobody can lead it elsewhere half-way.
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
 #include <cstring>
 #include <string>
 #include <string_view>
-#include <utility>
 
 #include "failure.h"
 #include "fault_gate.h"
+#include "file_io.h"
 #include "owner.h"
 #include "vexo/filesystem.h"
 
 namespace {
+
+using vexo::Descriptor;
 
 struct Attributes {
     uid_t uid;
@@ -37,25 +34,23 @@ bool handOver(int fd, const struct stat& status, const Attributes& attributes) {
            vexo::setMode(fd, (attributes.mode & 07777) | (status.st_mode & S_ISGID));
 }
 
-// Makes `name` inside `parent` and opens it. A descriptor, or -1 with errno and nothing left of what was made.
-int makeOne(int parent, const char* name, const Attributes& attributes) {
+// Makes `name` inside `parent` and opens it. Empty with errno, and nothing left of what was made, on failure.
+Descriptor makeOne(int parent, const char* name, const Attributes& attributes) {
     const bool made = mkdirat(parent, name, kModeUntilOwned) == 0;
-    if (!made && errno != EEXIST) return -1;
-    const int fd = openat(parent, name, (made ? O_RDONLY : O_PATH) | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+    if (!made && errno != EEXIST) return Descriptor();
+    Descriptor fd = vexo::openFile(parent, name, (made ? O_RDONLY : O_PATH) | O_DIRECTORY | O_NOFOLLOW);
     if (!made) return fd;
     struct stat status;
-    if (fd >= 0 && fstat(fd, &status) == 0 && (!isFresh(status) || handOver(fd, status, attributes))) return fd;
-    const int failure = errno;
-    if (fd >= 0) close(fd);
+    if (fd && fstat(fd.get(), &status) == 0 && (!isFresh(status) || handOver(fd.get(), status, attributes))) return fd;
+    const vexo::KeepErrno keep;
     unlinkat(parent, name, AT_REMOVEDIR);
-    errno = failure;
-    return -1;
+    return Descriptor();
 }
 
 // Opens `name` inside `parent`, made when it is missing and may be made.
-int enter(int parent, const char* name, bool mayMake, const Attributes& attributes) {
-    const int fd = openat(parent, name, O_PATH | O_DIRECTORY | O_CLOEXEC);
-    if (fd >= 0 || errno != ENOENT || !mayMake) return fd;
+Descriptor enter(int parent, const char* name, bool mayMake, const Attributes& attributes) {
+    Descriptor fd = vexo::openFile(parent, name, O_PATH | O_DIRECTORY);
+    if (fd || errno != ENOENT || !mayMake) return fd;
     return makeOne(parent, name, attributes);
 }
 
@@ -74,20 +69,16 @@ int VEXOFSMkdirP(const char* path, const char** stopAt, int recursive, uid_t uid
     if (path == nullptr || *path == '\0') return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     const int before = errno;
     const char* rest = path;
-    int folder = open(*path == '/' ? "/" : ".", O_PATH | O_DIRECTORY | O_CLOEXEC);
-    while (folder >= 0) {
-        const std::string_view component = nextComponent(rest);
-        if (component.empty()) break;
+    Descriptor folder = vexo::openFile(*path == '/' ? "/" : ".", O_PATH | O_DIRECTORY);
+    while (folder) {
+        const std::string component(nextComponent(rest));
+        if (component.empty()) {
+            errno = before;  // looking for what exists left a "missing" there
+            return 0;
+        }
         const bool last = rest[strspn(rest, "/")] == '\0';
-        const int next = enter(folder, std::string(component).c_str(), recursive != 0 || last, {uid, gid, mode});
-        const int failure = errno;
-        close(std::exchange(folder, next));
-        if (next >= 0) continue;
-        if (stopAt != nullptr) *stopAt = component.data();
-        return vexo::fail(vexo::errorOfErrno(failure), failure);
+        folder = enter(folder.get(), component.c_str(), recursive != 0 || last, {uid, gid, mode});
+        if (!folder && stopAt != nullptr) *stopAt = rest - component.size();
     }
-    if (folder < 0) return vexo::fail(vexo::errorOfErrno(errno));
-    close(folder);
-    errno = before;  // looking for what exists left a "missing" there
-    return 0;
+    return vexo::fail(vexo::errorOfErrno(errno));
 }

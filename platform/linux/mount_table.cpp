@@ -1,15 +1,12 @@
 #include "mount_table.h"
 
-#include <fcntl.h>
 #include <poll.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <array>
-#include <cerrno>
+#include <utility>
 
 #include "failure.h"
+#include "file_io.h"
 #include "vexo/filesystem.h"
 #include "vexo/system_root.h"
 
@@ -63,22 +60,9 @@ int typeOf(std::string_view name) {
     return VEXO_FS_UNKNOWN;
 }
 
-bool readAll(int fd, std::string& text) {
-    std::array<char, 16384> buffer;
-    for (;;) {
-        const ssize_t got = read(fd, buffer.data(), buffer.size());
-        if (got == 0) return true;
-        if (got > 0) {
-            text.append(buffer.data(), static_cast<size_t>(got));
-        } else if (errno != EINTR) {
-            return false;
-        }
-    }
-}
+constexpr size_t kLimit = size_t{16} << 20;  // far beyond any table, so that a wrong file cannot fill the memory
 
-const MountTable* failed(int fd) {
-    const KeepErrno keep;
-    if (fd >= 0) close(fd);
+const MountTable* failed() {
     fail(VEXO_ERR_FILE);
     return nullptr;
 }
@@ -86,41 +70,31 @@ const MountTable* failed(int fd) {
 // The machine's table. Its descriptor stays open, since the kernel marks it when mounts change.
 const MountTable* kernelTable() {
     static MountTable table;
-    static int kept = -1;
+    static Descriptor kept;
     static pid_t owner = 0;
-    const bool ours = kept >= 0 && owner == getpid();
-    pollfd mark{kept, POLLPRI, 0};
-    if (ours && poll(&mark, 1, 0) == 0) return &table;
-    // Opened anew rather than rewound: a forked child shares the mark with its parent, and may have closed the number
-    // and given it to another file, so only the process that opened it closes it.
-    if (ours) close(kept);
-    kept = -1;
+    // A forked child shares the mark with its parent, and may have closed the number and given it to another file: it
+    // opens its own and leaves the old one alone.
+    if (owner != getpid()) static_cast<void>(kept.release());
+    pollfd mark{kept.get(), POLLPRI, 0};
+    if (kept && poll(&mark, 1, 0) == 0) return &table;
+    kept.reset();
     std::string text;
-    const int fd = open("/proc/self/mounts", O_RDONLY | O_CLOEXEC);
-    if (fd < 0 || !readAll(fd, text)) return failed(fd);
+    Descriptor fd = openFile("/proc/self/mounts", O_RDONLY);
+    if (!fd || !readAll(fd.get(), text, kLimit)) return failed();
     table = parseMountTable(text);
-    kept = fd;
+    kept = std::move(fd);
     owner = getpid();
     return &table;
-}
-
-bool sameVersion(const struct stat& a, const struct stat& b) {
-    return a.st_dev == b.st_dev && a.st_ino == b.st_ino && a.st_size == b.st_size &&
-           a.st_mtim.tv_sec == b.st_mtim.tv_sec && a.st_mtim.tv_nsec == b.st_mtim.tv_nsec;
 }
 
 // The table of the system root, a plain file.
 const MountTable* fileTable(const std::string& path, const struct stat& now) {
     static MountTable table;
-    static struct stat version {};
-    if (sameVersion(version, now)) return &table;
+    static FileVersion version;
+    if (version.isCurrent(now)) return &table;
     std::string text;
-    struct stat opened;
-    const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
-    if (fd < 0 || fstat(fd, &opened) != 0 || !readAll(fd, text)) return failed(fd);
-    close(fd);
+    if (!readRegularFile(path, kLimit, text, version)) return failed();
     table = parseMountTable(text);
-    version = opened;
     return &table;
 }
 
@@ -145,7 +119,7 @@ const MountTable* mountTable() {
     const std::string path = VEXO::SystemPath("/proc/mounts");
     struct stat status;
     if (stat(path.c_str(), &status) != 0) {
-        if (errno != ENOENT && errno != ENOTDIR) return failed(-1);
+        if (errno != ENOENT && errno != ENOTDIR) return failed();
         return kernelTable();
     }
     return fileTable(path, status);
