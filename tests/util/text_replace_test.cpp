@@ -1,0 +1,137 @@
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <random>
+#include <vector>
+
+#include "orvel/text.h"
+#include "support/appliance.h"
+
+namespace {
+
+class TextReplace : public support::ApplianceTest {};
+
+struct Replaced {
+    int result;
+    std::string text;
+    bool operator==(const Replaced&) const = default;
+};
+
+void PrintTo(const Replaced& value, std::ostream* out) {
+    *out << value.result << " \"" << value.text << "\"";
+}
+
+Replaced take(int result, char* out) {
+    Replaced replaced{result, out == nullptr ? "(null)" : out};
+    free(out);  // NOLINT(cppcoreguidelines-no-malloc): the caller's part of the contract
+    return replaced;
+}
+
+Replaced replaceOne(const char* source, const char* search, const char* replacement) {
+    char* out = nullptr;
+    const int result = OrvLibStrReplace(source, search, replacement, &out);
+    return take(result, out);
+}
+
+Replaced replaceTwo(const char* source, const char* s1, const char* r1, const char* s2, const char* r2) {
+    char* out = nullptr;
+    const int result = OrvLibTwoStrReplace(source, s1, r1, s2, r2, &out);
+    return take(result, out);
+}
+
+// Two buffers of the working size, rewritten by the formatter at each occurrence.
+std::string stepwise(const std::string& source, const std::string& search, const std::string& replacement) {
+    int count = 0;
+    for (auto at = source.find(search); at != std::string::npos; at = source.find(search, at + search.size())) ++count;
+    const int plain = static_cast<int>(source.size()) + 1;
+    const int size = count * (static_cast<int>(replacement.size()) - static_cast<int>(search.size())) + plain;
+    std::vector<char> work(std::max(size, plain));
+    std::vector<char> next(work.size());
+    snprintf(work.data(), work.size(), "%s", source.c_str());
+    const char* from = work.data();
+    while (const char* hit = strstr(from, search.c_str())) {
+        snprintf(next.data(), next.size(), "%s%s%s", work.data(), replacement.c_str(), hit + search.size());
+        snprintf(work.data(), work.size(), "%s", next.data());
+        from = std::min(hit + replacement.size(), static_cast<const char*>(work.data()) + strlen(work.data()));
+    }
+    return work.data();
+}
+
+TEST_F(TextReplace, One) {
+    EXPECT_EQ(replaceOne("abc", "x", "y"), (Replaced{0, "abc"}));
+    EXPECT_EQ(replaceOne("a\\\\b", "\\\\", "\\"), (Replaced{1, "a\\\\b"}));
+    EXPECT_EQ(replaceOne("a\\\\b\\\\", "\\\\", "\\"), (Replaced{1, "a\\\\b\\\\"}));
+    EXPECT_EQ(replaceOne("abc", "b", "x"), (Replaced{1, "abc"}));
+    EXPECT_EQ(replaceOne("abc", "b", "xy"), (Replaced{1, "abcx"}));
+    EXPECT_EQ(replaceOne("ab", "b", "xyz"), (Replaced{1, "abxy"}));
+    EXPECT_EQ(replaceOne("ab", "b", "xbyb"), (Replaced{1, "abxby"}));
+    EXPECT_EQ(replaceOne("a%s%n", "%s", "%d%d"), (Replaced{1, "a%s%n%d"}));
+
+    for (const auto& [source, search, replacement] : {std::tuple{"", "a", "b"},
+                                                      {"a", "", "b"},
+                                                      {"a", "a", ""},
+                                                      {static_cast<const char*>(nullptr), "a", "b"},
+                                                      {"a", static_cast<const char*>(nullptr), "b"},
+                                                      {"a", "a", static_cast<const char*>(nullptr)}}) {
+        EXPECT_EQ(replaceOne(source, search, replacement), (Replaced{-1, "(null)"}));
+    }
+    EXPECT_EQ(OrvLibStrReplace("a", "a", "b", nullptr), -1);
+}
+
+TEST_F(TextReplace, OneAnswersLikeTheStepwiseForm) {
+    std::mt19937 random(3);
+    const auto word = [&](unsigned longest) {
+        std::string text;
+        for (unsigned left = 1 + random() % longest; left > 0; --left) text += "ab%"[random() % 3];
+        return text;
+    };
+    for (int i = 0; i < 50000; ++i) {
+        const std::string source = word(9);
+        const std::string search = word(2);
+        const std::string replacement = word(5);
+        ASSERT_EQ(replaceOne(source.c_str(), search.c_str(), replacement.c_str()).text,
+                  stepwise(source, search, replacement))
+            << source << " " << search << " " << replacement;
+    }
+}
+
+TEST_F(TextReplace, OneIsLinear) {
+    const std::string source(2000000, 'a');
+    EXPECT_EQ(replaceOne(source.c_str(), "a", "bb").text.size(), 4000000U);
+}
+
+TEST_F(TextReplace, NoMemoryForTheResult) {
+#ifdef __SANITIZE_ADDRESS__
+    GTEST_SKIP() << "AddressSanitizer ends the program at an allocation this large";
+#else
+    const std::string many(20000000, 'a');  // more than an address space in all
+    support::announceLog("): failed to calloc, errno=Cannot allocate memory");
+    EXPECT_EQ(replaceOne(many.c_str(), "a", many.c_str()), (Replaced{-1, "(null)"}));
+    support::announceLog("orvelmisc(");
+    EXPECT_EQ(replaceTwo(many.c_str(), "a", many.c_str(), "b", "c"), (Replaced{-1, "(null)"}));
+#endif
+}
+
+TEST_F(TextReplace, Two) {
+    EXPECT_EQ(replaceTwo("xyz", "a", "1", "b", "2"), (Replaced{0, "xyz"}));
+    EXPECT_EQ(replaceTwo("%%", "a", "1", "b", "2"), (Replaced{0, "%%"}));
+    EXPECT_EQ(replaceTwo("abba", "a", "1", "b", "2"), (Replaced{1, "1221"}));
+    EXPECT_EQ(replaceTwo("ab", "a", "<aa>", "b", "()"), (Replaced{1, "<aa>()"}));
+    EXPECT_EQ(replaceTwo("aab", "a", "1", "aab", "2"), (Replaced{-1, "(null)"}));  // the first is tried first
+    EXPECT_EQ(replaceTwo("abab", "ab", "1", "b", "2"), (Replaced{1, "11"}));
+    // Anything but occurrences: no advance.
+    EXPECT_EQ(replaceTwo("a.b", "a", "1", "b", "2"), (Replaced{-1, "(null)"}));
+    // The formatter's part, without its dangers.
+    EXPECT_EQ(replaceTwo("a", "a", "100%%", "b", "2"), (Replaced{1, "100%"}));
+    EXPECT_EQ(replaceTwo("a%s%n", "a", "%s", "%s%n", "%5$n"), (Replaced{1, "%s%5$n"}));
+
+    EXPECT_EQ(replaceTwo("a", "", "1", "b", "2"), (Replaced{-1, "(null)"}));
+    EXPECT_EQ(replaceTwo("a", "a", "1", "b", ""), (Replaced{-1, "(null)"}));
+    EXPECT_EQ(replaceTwo(nullptr, "a", "1", "b", "2"), (Replaced{-1, "(null)"}));
+    EXPECT_EQ(OrvLibTwoStrReplace("a", "a", "1", "b", "2", nullptr), -1);
+}
+
+}  // namespace
