@@ -2,14 +2,17 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <memory>
 #include <numeric>
 
 #include "core/boundary.h"
+#include "core/owned.h"
 #include "enum/entry_fill.h"
 #include "enum/entry_order.h"
 #include "enum/folder_scan.h"
 #include "enum/page.h"
 #include "orvel/listing.h"
+#include "orvel/privilege.h"
 #include "vexo/acl.h"
 #include "vexo/error.h"
 
@@ -38,12 +41,14 @@ class FailureKeeper {
     int line_ = VLIBCErrorGetLine();
 };
 
+using PermissionFolder = std::unique_ptr<VEXOACLFOLDER, Releaser<VEXOACLFolderClose>>;
+
 // Builds the full records of scanned entries.
 class RecordBuilder {
  public:
     RecordBuilder(int folder, const char* path, const char* realPath, int additional, const ScannedFolder& scanned,
                   OrvelMountStatus& mounts, OrvelUserEnum& names)
-        : folder_(folder),
+        : permissions_((additional & ADDITIONAL_PERM) != 0 ? VEXOACLFolderOpen(folder) : nullptr),
           path_(std::string(path) + "/"),
           realPath_(std::string(realPath) + "/"),
           realPrefix_(realPath_.size()),
@@ -70,13 +75,15 @@ class RecordBuilder {
 
  private:
     void fillPermissions(const _tag_VEXOSTAT_& status, DIRENTRY_INFO& info) {
-        unsigned bits = 0;
-        const int result = VEXOACLPermGetAt(folder_, info.name.c_str(), &status, &bits);
-        info.aclPrivilege = result < 0 ? 0x1FFF : bits;
+        // The folder's quick answer; where it has none, the full question decides and reports.
+        if (!permissions_ ||
+            VEXOACLFolderPermGet(permissions_.get(), info.name.c_str(), &status, &info.aclPrivilege) < 0) {
+            info.aclPrivilege = GetACLPrivilege(realPath_.c_str());
+        }
         info.isAclMode = VEXOACLIsSupportOnDevice(realPath_.c_str(), status.st_device) > 0 ? 1 : 0;
     }
 
-    int folder_;
+    PermissionFolder permissions_;
     std::string path_;
     std::string realPath_;  // of the folder, then of the entry at hand
     size_t realPrefix_;
@@ -128,11 +135,11 @@ bool OrvEnum::OrvLibDirEntryListEnum(const char* path, const char* realPath, con
         }
         *total = 0;
         const int wanted = orvel::widened(additional, sortBy);
-        const orvel::Directory folder = orvel::openFolder(realPath);
+        const orvel::Descriptor folder = orvel::openFolder(realPath);
         if (!folder) return false;
         orvel::ScannedFolder scanned;
         const bool complete = orvel::scanFolder(folder.get(), {realPath, type, wanted, criteria}, mounts_, scanned);
-        orvel::RecordBuilder builder(dirfd(folder.get()), path, realPath, wanted, scanned, mounts_, names_);
+        orvel::RecordBuilder builder(folder.get(), path, realPath, wanted, scanned, mounts_, names_);
         if (!complete) {
             const orvel::FailureKeeper keeper;
             orvel::appendAll(builder, scanned.entries.size(), entries);

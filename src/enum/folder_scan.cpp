@@ -1,5 +1,6 @@
 #include "enum/folder_scan.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <syslog.h>
 
@@ -9,6 +10,7 @@
 
 #include "core/boundary.h"
 #include "enum/entry_fill.h"
+#include "enum/folder_reader.h"
 #include "util/printable.h"
 #include "vexo/filesystem.h"
 
@@ -50,19 +52,18 @@ bool acceptedBy(const std::vector<FileSearch::FindComp*>& criteria, const char* 
 // Reads one folder, entry by entry.
 class Scan {
  public:
-    Scan(DIR* folder, const ScanRequest& request, OrvelMountStatus& mounts, ScannedFolder& out)
+    Scan(int folder, const ScanRequest& request, OrvelMountStatus& mounts, ScannedFolder& out)
         : folder_(folder), request_(request), flags_(statusFlags(request.additional)), mounts_(mounts), out_(out) {}
 
     bool run() {
-        for (;;) {
-            errno = 0;
-            const dirent* entry = readdir(folder_);
-            if (entry == nullptr) break;
-            if (VEXOEAIsHiddenFile(entry->d_name) == 1 || !acceptedBy(request_.criteria, entry->d_name)) continue;
-            if (!take(entry->d_name, entry->d_type)) return false;
-        }
-        if (errno == 0) return true;
-        reportFolder(errno, request_.realPath, true);  // half a folder must not pass for the whole
+        bool failed = false;
+        const int systemCode = FolderReader().forEach(folder_, [&](const char* name, unsigned char dType) {
+            if (VEXOEAIsHiddenFile(name) == 1 || !acceptedBy(request_.criteria, name)) return true;
+            failed = !take(name, dType);
+            return !failed;
+        });
+        if (systemCode == 0) return !failed;
+        reportFolder(systemCode, request_.realPath, true);  // half a folder must not pass for the whole
         return false;
     }
 
@@ -79,7 +80,7 @@ class Scan {
             case TypeVerdict::AskStatus:
                 break;
         }
-        if (VLIBCFileLStatAt(dirfd(folder_), name, flags_, &entry.status) < 0) return takeFailed(name, entry);
+        if (VLIBCFileLStatAt(folder_, name, flags_, &entry.status) < 0) return takeFailed(name, entry);
         if (!passes(entry.status.st_mode, request_.filter)) return true;
         entry.isDirectory = S_ISDIR(entry.status.st_mode);
         entry.hasStatus = true;
@@ -110,7 +111,7 @@ class Scan {
         out_.entries.push_back(entry);
     }
 
-    DIR* folder_;
+    int folder_;
     const ScanRequest& request_;
     unsigned flags_;
     OrvelMountStatus& mounts_;
@@ -119,18 +120,18 @@ class Scan {
 
 }  // namespace
 
-Directory openFolder(const char* realPath) {
+Descriptor openFolder(const char* realPath) {
     // Entering proves that the folder may be entered, which opening alone does not.
     if (chdir(realPath) != 0 || chdir("/") != 0) {
         reportFolder(errno, realPath, false);
-        return nullptr;
+        return Descriptor();
     }
-    Directory folder(opendir(realPath));
+    Descriptor folder(open(realPath, O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC));
     if (!folder) reportFolder(errno, realPath, true);
     return folder;
 }
 
-bool scanFolder(DIR* folder, const ScanRequest& request, OrvelMountStatus& mounts, ScannedFolder& scanned) {
+bool scanFolder(int folder, const ScanRequest& request, OrvelMountStatus& mounts, ScannedFolder& scanned) {
     return Scan(folder, request, mounts, scanned).run();
 }
 

@@ -14,9 +14,9 @@
 
 namespace orvel {
 
-// Enters and opens the folder, and leaves the working directory at "/". Null with the library code set: 410 network
+// Enters and opens the folder, and leaves the working directory at "/". Nothing with the library code set: 410 network
 // mount that does not answer, 407 denied, 408 missing, 402 else (logged).
-Directory openFolder(const char* realPath);
+Descriptor openFolder(const char* realPath);
 
 // An entry of which only its place in the order is needed, until it turns out to be on the page.
 struct ScannedEntry {
@@ -43,7 +43,7 @@ struct ScanRequest {
 // Appends every entry that the listing keeps, in reading order. False when one entry's failure ends the listing
 // (logged, the code set as FillFileInfo does) or the folder cannot be read on; `scanned` holds the entries before it
 // then.
-bool scanFolder(DIR* folder, const ScanRequest& request, OrvelMountStatus& mounts, ScannedFolder& scanned);
+bool scanFolder(int folder, const ScanRequest& request, OrvelMountStatus& mounts, ScannedFolder& scanned);
 
 }  // namespace orvel
 
