@@ -3,7 +3,7 @@
 #include <cstdlib>
 #include <string>
 
-#include "cgi/multipart.h"
+#include "multipart.h"
 
 namespace {
 

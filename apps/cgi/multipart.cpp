@@ -1,4 +1,4 @@
-#include "cgi/multipart.h"
+#include "multipart.h"
 
 #include <strings.h>
 
