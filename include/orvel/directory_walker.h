@@ -30,12 +30,6 @@ class ORVEL_API OrvDirectoryWalkerCallBack {
     virtual bool operator()(const std::string& displayPath, const std::string& context, const std::string& realPath,
                             const std::string& name, _tag_VEXOSTAT_& status, const std::string* extra) = 0;
     virtual ~OrvDirectoryWalkerCallBack();
-
-    OrvDirectoryWalkerCallBack(const OrvDirectoryWalkerCallBack&) = delete;
-    OrvDirectoryWalkerCallBack& operator=(const OrvDirectoryWalkerCallBack&) = delete;
-
- protected:
-    OrvDirectoryWalkerCallBack() = default;
 };
 
 // Common to the three walks: entries come in the order in which the file system delivers them, hidden names left out; a
