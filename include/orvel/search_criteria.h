@@ -187,6 +187,9 @@ class ORVEL_API FindFactory {
     // False with the library code 400 (a required argument is null), 403 (unknown user), 404 (unknown group), 401 (no
     // memory); what stood in `out` is left. Success stores no code.
     static bool createFindOp(_tag_FIND_FIELD_ field, const char* op, const char* value, std::vector<FindComp*>& out);
+
+ private:
+    static std::unique_ptr<FindNameComp> createNames(const char* list, std::string (*toPattern)(const std::string&));
 };
 
 class ORVEL_API FindTypeCompFactory {
