@@ -44,7 +44,14 @@ const char* decodeFolded(const char* at, const char* end, UChar32& code) {
 // The next position from which the elements behind a run, the first of them `first`, can match; `end` when none.
 const char* skipToCandidate(const char* at, const char* end, UChar32 first) {
     if (first < 0) return at;  // no single character that it could begin with
+    const UChar32 upper = first >= 'a' && first <= 'z' ? first - ('a' - 'A') : first;
     while (at < end) {
+        const auto byte = static_cast<unsigned char>(*at);
+        if (byte < 0x80) {
+            if (byte == first || byte == upper) break;
+            ++at;
+            continue;
+        }
         UChar32 code = 0;
         const char* next = decodeFolded(at, end, code);
         if (code == first) break;
