@@ -7,8 +7,8 @@
 
 namespace {
 
-struct Recorder final : cgi::PartSink {
-    bool partBegin(const cgi::PartHeader& header) override {
+struct Recorder final : orvel::cgi::PartSink {
+    bool partBegin(const orvel::cgi::PartHeader& header) override {
         text += "[" + header.name + "|" + (header.isFile ? "f" : "-") + "|" + header.fileName + "|";
         return true;
     }
@@ -25,7 +25,7 @@ struct Recorder final : cgi::PartSink {
 
 std::string read(std::string_view body, std::size_t piece) {
     Recorder recorder;
-    cgi::MultipartReader reader("b", recorder);
+    orvel::cgi::MultipartReader reader("b", recorder);
     for (std::size_t at = 0; at < body.size(); at += piece) reader.feed(body.substr(at, piece));
     recorder.text += std::to_string(static_cast<int>(reader.status()));
     return recorder.text;
@@ -35,7 +35,7 @@ std::string read(std::string_view body, std::size_t piece) {
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     const std::string_view body(reinterpret_cast<const char*>(data), size);
-    static_cast<void>(cgi::boundaryOf(body));
+    static_cast<void>(orvel::cgi::boundaryOf(body));
     const std::string whole = read(body, size + 1);
     // A body cut short gives out what it has as it comes; only complete ones must agree to the byte.
     if (whole.ends_with("1") && (read(body, 1) != whole || read(body, 7) != whole)) std::abort();

@@ -6,7 +6,7 @@
 #include <array>
 #include <utility>
 
-namespace cgi {
+namespace orvel::cgi {
 namespace {
 
 constexpr std::size_t kLongestHeaders = 16 * 1024;
@@ -205,4 +205,4 @@ bool MultipartReader::readBody() {
     return true;
 }
 
-}  // namespace cgi
+}  // namespace orvel::cgi

@@ -1,12 +1,12 @@
 // Reader of multipart/form-data bodies, as a stream: memory stays flat whatever the size of a part.
-#ifndef ORVEL_APPS_CGI_MULTIPART_H
-#define ORVEL_APPS_CGI_MULTIPART_H
+#ifndef ORVEL_CGI_MULTIPART_H
+#define ORVEL_CGI_MULTIPART_H
 
 #include <cstddef>
 #include <string>
 #include <string_view>
 
-namespace cgi {
+namespace orvel::cgi {
 
 // What a part says of itself. Names are bytes as sent.
 struct PartHeader {
@@ -60,6 +60,6 @@ std::string boundaryOf(std::string_view contentType);
 // Reads the header lines of one part (without the empty line that ends them). False when they name no form field.
 bool parsePartHeader(std::string_view lines, PartHeader& header);
 
-}  // namespace cgi
+}  // namespace orvel::cgi
 
 #endif

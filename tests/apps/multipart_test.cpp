@@ -7,15 +7,15 @@
 
 namespace {
 
-using Status = cgi::MultipartReader::Status;
+using Status = orvel::cgi::MultipartReader::Status;
 
 struct Part {
     std::string name, fileName, data;
     bool isFile = false, ended = false;
 };
 
-struct Collector final : cgi::PartSink {
-    bool partBegin(const cgi::PartHeader& header) override {
+struct Collector final : orvel::cgi::PartSink {
+    bool partBegin(const orvel::cgi::PartHeader& header) override {
         parts.push_back({header.name, header.fileName, "", header.isFile});
         return header.name != "stop";
     }
@@ -33,7 +33,7 @@ struct Collector final : cgi::PartSink {
 };
 
 Status readWhole(const std::string& body, Collector& collector, std::size_t piece) {
-    cgi::MultipartReader reader("XX", collector);
+    orvel::cgi::MultipartReader reader("XX", collector);
     for (std::size_t at = 0; at < body.size(); at += piece) reader.feed(std::string_view(body).substr(at, piece));
     return reader.status();
 }
@@ -100,7 +100,7 @@ TEST(Multipart, Malformed) {
 
 TEST(Multipart, MemoryStaysFlat) {
     Collector all;
-    cgi::MultipartReader reader("XX", all);
+    orvel::cgi::MultipartReader reader("XX", all);
     reader.feed("--XX\r\nContent-Disposition: form-data; name=a; filename=b\r\n\r\n");
     const std::string piece(4096, 'd');
     for (int i = 0; i < 256; ++i) reader.feed(piece);
@@ -123,7 +123,7 @@ TEST(Multipart, Boundary) {
         {"multipart/form-data; boundary=" + std::string(71, 'b'), ""},
         {"", ""},
     };
-    for (const auto& test : cases) EXPECT_EQ(cgi::boundaryOf(test.type), test.boundary) << test.type;
+    for (const auto& test : cases) EXPECT_EQ(orvel::cgi::boundaryOf(test.type), test.boundary) << test.type;
 }
 
 }  // namespace
