@@ -13,6 +13,7 @@
 
 #include "listing.h"
 #include "orvel/error_state.h"
+#include "orvel/share_path.h"
 #include "reply.h"
 #include "request.h"
 #include "vexo/web.h"
@@ -71,7 +72,7 @@ void serve(Output& out) {
 
     const bool shares = action == "shares";
     Listing listing;
-    int code = actAs(user.sid.c_str(), user.name, true);
+    int code = actAs(user.sid.c_str(), user.name, shares || IsDirUserHome(request->path, nullptr));
     if (code == ORV_ERR_NONE) code = shares ? listShares(*request, listing) : listFolder(*request, listing);
     if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, request->path);
 

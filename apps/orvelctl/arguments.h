@@ -1,0 +1,40 @@
+// The words of a command line: options by name, the rest by position.
+#ifndef ORVEL_ORVELCTL_ARGUMENTS_H
+#define ORVEL_ORVELCTL_ARGUMENTS_H
+
+#include <map>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+namespace orvel::ctl {
+
+// The command line is not what the command takes; the text says why.
+class UsageError : public std::runtime_error {
+ public:
+    using std::runtime_error::runtime_error;
+};
+
+class Arguments {
+ public:
+    // `valued` options take the next word ("--user alice"), `flags` none. Throws UsageError for an unknown option, a
+    // missing value, or another number of positions than `positions`.
+    Arguments(const std::vector<std::string>& words, const std::vector<std::string>& valued,
+              const std::vector<std::string>& flags, size_t positions);
+
+    [[nodiscard]] const std::string& position(size_t index) const { return positions_[index]; }
+    [[nodiscard]] bool has(const std::string& option) const { return options_.count(option) != 0; }
+    [[nodiscard]] std::string value(const std::string& option, const std::string& fallback) const;
+    // Throws UsageError when the option is missing.
+    [[nodiscard]] std::string required(const std::string& option) const;
+    // Throws UsageError when the value is no number.
+    [[nodiscard]] unsigned long number(const std::string& option, unsigned long fallback) const;
+
+ private:
+    std::map<std::string, std::string> options_;
+    std::vector<std::string> positions_;
+};
+
+}  // namespace orvel::ctl
+
+#endif

@@ -1,0 +1,62 @@
+// orvelctl: the library without a web server.
+#include <cstdio>
+#include <cstdlib>
+#include <exception>
+#include <string>
+#include <vector>
+
+#include "arguments.h"
+#include "command.h"
+
+namespace {
+
+struct Command {
+    const char* name;
+    int (*run)(const std::vector<std::string>&);
+    const char* usage;
+};
+
+constexpr Command kCommands[] = {
+    {"ls", orvel::ctl::ls,
+     "ls PATH --user U [--json] [--sort KEY] [--desc] [--offset N] [--limit N]\n"
+     "       [--additional WORDS] [--pattern P] [--type dir|file|all]   what a folder holds; \"/\" for the shares"},
+    {"why", orvel::ctl::why,
+     "why PATH --user U                                  which rule decides what U may do there"},
+    {"demo", orvel::ctl::demo,
+     "demo FOLDER [--keep | --remove]                    makes a demo appliance, keeps one that is whole, removes one"},
+};
+
+int usage(const char* reason) {
+    if (reason != nullptr) fprintf(stderr, "orvelctl: %s\n", reason);
+    fprintf(stderr, "usage: orvelctl [--root FOLDER] COMMAND ...\n");
+    for (const Command& command : kCommands) fprintf(stderr, "  %s\n", command.usage);
+    fprintf(stderr, "FOLDER of --root is the appliance's system root; else the variable VEXO_ROOT names it.\n");
+    return 2;
+}
+
+int run(std::vector<std::string> words) {
+    if (words.size() >= 2 && words[0] == "--root") {
+        setenv("VEXO_ROOT", words[1].c_str(), 1);  // read at the first call of the platform
+        words.erase(words.begin(), words.begin() + 2);
+    }
+    if (words.empty()) return usage(nullptr);
+    const std::string name = words[0];
+    words.erase(words.begin());
+    for (const Command& command : kCommands) {
+        if (name == command.name) return command.run(words);
+    }
+    return usage(("unknown command " + name).c_str());
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    try {
+        return run({argv + 1, argv + argc});
+    } catch (const orvel::ctl::UsageError& error) {
+        return usage(error.what());
+    } catch (const std::exception& error) {
+        fprintf(stderr, "orvelctl: %s\n", error.what());
+        return 1;
+    }
+}
