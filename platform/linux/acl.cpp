@@ -152,19 +152,6 @@ bool removableByPath(std::string path) {
     return vexo::mayRemove(currentIdentity(), removalFacts(AT_FDCWD, parent.c_str()), status);
 }
 
-// The folder of the last call of VEXOACLPermGetAt, and by what it is known again.
-struct Remembered {
-    VEXOACLFOLDER folder{};
-    ino_t inode = 0;
-    timespec change{};  // also tells that its mode or owner changed
-};
-
-bool isRemembered(const Remembered& remembered, const struct stat& now) {
-    return remembered.inode == now.st_ino && remembered.folder.facts.device == now.st_dev &&
-           remembered.change.tv_sec == now.st_ctim.tv_sec && remembered.change.tv_nsec == now.st_ctim.tv_nsec &&
-           remembered.folder.who.euid == geteuid();
-}
-
 // Which devices keep ACLs, as far as they were met. A listing asks for each entry, mostly of one device.
 struct DeviceSupport {
     unsigned long long device;
@@ -186,22 +173,6 @@ int VEXOACLPermGet(const char* path, unsigned* permission) {
     _tag_VEXOSTAT_ status;
     const bool dangling = failure == ENOENT && vexo::readStatus(AT_FDCWD, path, AT_SYMLINK_NOFOLLOW, false, status);
     return vexo::fail(dangling ? VEXO_ERR_ACL_TARGET_MISSING : missingOrOther(failure), failure);
-}
-
-int VEXOACLPermGetAt(int dirfd, const char* name, const _tag_VEXOSTAT_* status, unsigned* permission) {
-    static Remembered remembered;
-    VEXO_GATE("VEXOACLPermGetAt", -1);
-    if (name == nullptr || status == nullptr || permission == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
-    struct stat now;
-    if (fstat(dirfd, &now) != 0) return vexo::fail(VEXO_ERR_GENERAL);
-    if (!isRemembered(remembered, now)) {
-        remembered.inode = 0;
-        if (!openFolder(dirfd, remembered.folder)) return vexo::fail(VEXO_ERR_GENERAL);
-        remembered.inode = now.st_ino;
-        remembered.change = now.st_ctim;
-    }
-    remembered.folder.dirfd = dirfd;
-    return permissionInFolder(remembered.folder, name, *status, permission);
 }
 
 PVEXOACLFOLDER VEXOACLFolderOpen(int dirfd) {

@@ -19,14 +19,11 @@ VEXO_BEGIN_C
 // rule). 0, or <0 with the slot: 0x0600 or 0xD700 missing, 0x8100 else. A denial is no failure: the bits are missing
 // then.
 VEXO_API int VEXOACLPermGet(const char* path, unsigned* permission);
-// The same for `name` inside the open folder `dirfd`, whose status the caller has at hand (`status` of the entry
-// itself, no link). Asks the kernel only where the status does not settle the answer; the folder's own answer is
-// remembered from call to call and told by two system calls to be the same still.
-VEXO_API int VEXOACLPermGetAt(int dirfd, const char* name, const _tag_VEXOSTAT_* status, unsigned* permission);
-
-// The same for many entries of one folder: what a listing calls. Open collects once what holds for all entries (the
-// effective identity, the mount, the folder's own bits), so it is opened after the switch of identity and lives no
-// longer than the listing. `dirfd` stays the caller's and open. Null with the slot (0x8100) on failure.
+// The same for the entries of one open folder whose status the caller has at hand (`status` of the entry itself, no
+// link followed): what a listing calls. The kernel is asked only where the status does not settle the answer. Open
+// collects once what holds for all entries (the effective identity, the mount, the folder's own bits), so it is opened
+// after the switch of identity and lives no longer than the listing. `dirfd` stays the caller's and open. Null with the
+// slot (0x8100) on failure.
 typedef struct VEXOACLFOLDER* PVEXOACLFOLDER;
 VEXO_API PVEXOACLFOLDER VEXOACLFolderOpen(int dirfd);
 VEXO_API int VEXOACLFolderPermGet(PVEXOACLFOLDER folder, const char* name, const _tag_VEXOSTAT_* status,

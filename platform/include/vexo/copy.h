@@ -1,0 +1,39 @@
+// Copying one file.
+#ifndef VEXO_COPY_H
+#define VEXO_COPY_H
+
+#include <sys/types.h>
+
+#include "vexo/export.h"
+
+enum {
+    VEXO_COPY_OVERWRITE = 0x1,   // an existing file at the target is replaced
+    VEXO_COPY_KEEP_TIMES = 0x2,  // the copy takes over the times of access and modification
+};
+
+struct VEXOCOPYOPT {
+    uid_t uid;             // owner of the copy; -1 leaves the caller's
+    gid_t gid;             // the same for the group
+    int (*isCancelled)();  // asked before each piece of at most 4 MiB, nonzero ends the copy; null: never
+    unsigned switches;     // VEXO_COPY_... bits
+};
+
+VEXO_BEGIN_C
+// Copies the regular file `source` to `target`, both paths of at most 4,095 bytes, with the caller's effective
+// identity. `options` may be null: the caller's own file, never cancelled, no switches.
+//
+// The target appears whole or not at all: the data goes to a file beside it, which takes its place in one step. A new
+// file has the mode 0644, or what the folder's default ACL says; one that replaces another takes over that one's
+// permissions (its ACL too), not its owner. Holes of the source stay holes; data is shared with the source where the
+// file system can.
+//
+// 0, or -1 with errno and the slot, the target as it was and nothing beside it: 0x0600 the source or the target's
+// folder is missing, 0x0700 a path is no path of a file (the source is a folder, link, pipe...; the target has no
+// name), 0x0300 denied, 0x0800 source and target are one file, 0xA000 a file is at the target already and is not to be
+// replaced, 0xA200 something other than a file is there, 0xC300 the name is too long, 0xA500 the target's file system
+// is FAT and cannot hold the name, 0xA300 nor a file of this size, 0x2900 no space, 0x2400 quota, 0x8400 read-only file
+// system, 0xA400 cancelled, 0x0D00 a null or empty path, 0x8100 else (the source shrank or could not be read).
+VEXO_API int VEXOFileCopy(const char* source, const char* target, const struct VEXOCOPYOPT* options);
+VEXO_END_C
+
+#endif

@@ -1,0 +1,176 @@
+#include <fcntl.h>
+#include <linux/limits.h>
+#include <sys/stat.h>
+#include <sys/xattr.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "copy_data.h"
+#include "failure.h"
+#include "fault_gate.h"
+#include "file_io.h"
+#include "mount_table.h"
+#include "owner.h"
+#include "part_file.h"
+#include "vexo/copy.h"
+#include "vexo/filesystem.h"
+
+namespace {
+
+using vexo::Descriptor;
+
+constexpr const char* kAcl = "system.posix_acl_access";
+constexpr uid_t kKeepUser = static_cast<uid_t>(-1);
+constexpr gid_t kKeepGroup = static_cast<gid_t>(-1);
+constexpr mode_t kNewFile = 0666;
+constexpr mode_t kUmask = 022;  // the process's own may be 0, left so by the making of temporary folders
+
+struct Copy {
+    Descriptor source;
+    struct stat sourceStatus {};
+    Descriptor folder;  // the target's
+    std::string name;   // the target's
+    bool exists = false;
+    struct stat oldStatus {};  // what is at the target, when it exists
+    VEXOCOPYOPT options{};
+};
+
+// The umask for as long as one file is created. A folder's default ACL takes its place.
+class Umask {
+ public:
+    explicit Umask(mode_t mask) : saved_(umask(mask)) {}
+    ~Umask() { umask(saved_); }
+    Umask(const Umask&) = delete;
+    Umask& operator=(const Umask&) = delete;
+
+ private:
+    mode_t saved_;
+};
+
+int openSource(const char* path, Copy& copy) {
+    // Not waiting for the writer of a pipe; a link as last component is refused by the kernel.
+    copy.source = vexo::openFile(AT_FDCWD, path, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
+    if (!copy.source && (errno == ENXIO || errno == ENODEV)) return vexo::fail(VEXO_ERR_BAD_PATH);  // socket, device
+    if (!copy.source || fstat(copy.source.get(), &copy.sourceStatus) != 0) {
+        return vexo::fail(vexo::errorOfErrno(errno));
+    }
+    if (S_ISREG(copy.sourceStatus.st_mode)) return 0;
+    return vexo::fail(VEXO_ERR_BAD_PATH, S_ISDIR(copy.sourceStatus.st_mode) ? EISDIR : EINVAL);
+}
+
+int openTarget(const char* path, Copy& copy) {
+    const std::string_view whole = path;
+    const size_t slash = whole.rfind('/');
+    const std::string folder(slash == std::string_view::npos ? "." : whole.substr(0, slash + 1));
+    copy.name = whole.substr(slash + 1);  // npos + 1 is 0
+    if (copy.name.empty() || copy.name == "." || copy.name == "..") return vexo::fail(VEXO_ERR_BAD_PATH, EINVAL);
+    copy.folder = vexo::openFile(folder, O_PATH | O_DIRECTORY);
+    return copy.folder ? 0 : vexo::fail(vexo::errorOfErrno(errno));
+}
+
+bool isOnFat(const char* path) {
+    const vexo::MountTable* table = vexo::mountTable();
+    const vexo::Mount* mount = table == nullptr ? nullptr : vexo::mountHolding(*table, path);
+    return mount != nullptr && mount->type == VEXO_FS_FAT;
+}
+
+int checkTarget(const char* path, Copy& copy) {
+    if (copy.name.find_first_of("\\/:*?\"><|\r\n") != std::string::npos && isOnFat(path)) {
+        return vexo::fail(VEXO_ERR_FAT_NAME, EINVAL);
+    }
+    if (fstatat(copy.folder.get(), copy.name.c_str(), &copy.oldStatus, AT_SYMLINK_NOFOLLOW) != 0) {
+        return errno == ENOENT ? 0 : vexo::fail(vexo::errorOfErrno(errno));
+    }
+    copy.exists = true;
+    const struct stat& old = copy.oldStatus;
+    if (old.st_dev == copy.sourceStatus.st_dev && old.st_ino == copy.sourceStatus.st_ino) {
+        return vexo::fail(VEXO_ERR_EXISTS, EEXIST);
+    }
+    if (!S_ISREG(old.st_mode)) return vexo::fail(VEXO_ERR_TARGET_EXISTS_OTHER, EEXIST);
+    const bool mayReplace = (copy.options.switches & VEXO_COPY_OVERWRITE) != 0;
+    return mayReplace ? 0 : vexo::fail(VEXO_ERR_TARGET_EXISTS, EEXIST);
+}
+
+// Gives `part` the permissions of the file that it replaces. The ACL goes along with the mode: with it, the group bits
+// are a mask, and alone they could grant the group what the ACL withheld.
+bool takeOverPermissions(const Copy& copy, int part) {
+    const Descriptor old = vexo::openFile(copy.folder.get(), copy.name.c_str(), O_PATH | O_NOFOLLOW);
+    const std::string self = "/proc/self/fd/" + std::to_string(old.get());
+    std::vector<char> acl(XATTR_SIZE_MAX);
+    const ssize_t size = old ? getxattr(self.c_str(), kAcl, acl.data(), acl.size()) : -1;
+    if (size > 0) return fsetxattr(part, kAcl, acl.data(), static_cast<size_t>(size), 0) == 0;
+    return vexo::setMode(part, copy.oldStatus.st_mode & 0777);
+}
+
+bool create(const Copy& copy, vexo::PartFile& part) {
+    // A part that replaces a file is closed to others until it has that file's permissions.
+    const Umask mask(kUmask);
+    return part.create(copy.exists ? 0600 : kNewFile) && vexo::setOwner(part.get(), copy.options.uid, copy.options.gid);
+}
+
+// What a network file system could not write yet is reported when a descriptor closes.
+bool reportDelayedFailure(int fd) {
+    const int second = fcntl(fd, F_DUPFD_CLOEXEC, 0);
+    return second >= 0 && close(second) == 0;
+}
+
+bool fill(const Copy& copy, int part) {
+    const VEXOCOPYOPT& options = copy.options;
+    const struct stat& from = copy.sourceStatus;
+    if (!vexo::copyData(copy.source.get(), part, from.st_size, options.isCancelled)) return false;
+    if (copy.exists && !takeOverPermissions(copy, part)) return false;
+    if ((options.switches & VEXO_COPY_KEEP_TIMES) != 0) {
+        const std::array<timespec, 2> times = {from.st_atim, from.st_mtim};
+        if (futimens(part, times.data()) != 0) return false;
+    }
+    // A power cut must leave the old content or the new one, not an empty file.
+    if (copy.exists && fdatasync(part) != 0) return false;
+    if (!reportDelayedFailure(part)) return false;
+    if (options.isCancelled == nullptr || options.isCancelled() == 0) return true;
+    errno = ECANCELED;
+    return false;
+}
+
+bool publish(const Copy& copy, vexo::PartFile& part) {
+    const char* name = copy.name.c_str();
+    if (part.publish(name, copy.exists)) return true;
+    // Put there since the target was looked at.
+    const bool mayReplace = (copy.options.switches & VEXO_COPY_OVERWRITE) != 0;
+    return errno == EEXIST && mayReplace && !copy.exists && part.publish(name, true);
+}
+
+int errorOfPublishing(int systemCode) {
+    switch (systemCode) {
+        case EEXIST:
+            return VEXO_ERR_TARGET_EXISTS;
+        case EISDIR:
+            return VEXO_ERR_TARGET_EXISTS_OTHER;
+        case EINVAL:  // all else was valid, so it is the name that the file system cannot hold
+            return VEXO_ERR_FAT_NAME;
+        default:
+            return vexo::errorOfErrno(systemCode);
+    }
+}
+
+}  // namespace
+
+int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* options) {
+    VEXO_GATE("VEXOFileCopy", -1);
+    if (source == nullptr || target == nullptr || *source == '\0' || *target == '\0') {
+        return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    }
+    const int before = errno;
+    Copy copy;
+    copy.options = options != nullptr ? *options : VEXOCOPYOPT{kKeepUser, kKeepGroup, nullptr, 0};
+    if (openSource(source, copy) != 0 || openTarget(target, copy) != 0 || checkTarget(target, copy) != 0) return -1;
+    vexo::PartFile part(copy.folder.get());
+    if (!create(copy, part) || !fill(copy, part.get())) return vexo::fail(vexo::errorOfErrno(errno));
+    if (!publish(copy, part)) return vexo::fail(errorOfPublishing(errno));
+    errno = before;
+    return 0;
+}

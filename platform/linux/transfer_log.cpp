@@ -1,0 +1,78 @@
+#include <sys/file.h>
+
+#include <cerrno>
+#include <ctime>
+#include <string>
+
+#include "failure.h"
+#include "fault_gate.h"
+#include "file_io.h"
+#include "raise.h"
+#include "transfer_entry.h"
+#include "vexo/filesystem.h"
+#include "vexo/system_root.h"
+#include "vexo/xferlog.h"
+
+namespace {
+
+using vexo::Descriptor;
+
+constexpr const char* kFolder = "/var/log/vexo";
+constexpr const char* kFile = "/var/log/vexo/xfer.log";
+
+Descriptor openLog() {
+    const std::string path = VEXO::SystemPath(kFile);
+    constexpr int flags = O_WRONLY | O_APPEND | O_CREAT | O_NOFOLLOW | O_NONBLOCK;
+    Descriptor log = vexo::openFile(AT_FDCWD, path.c_str(), flags, 0600);
+    if (log || errno != ENOENT) return log;
+    constexpr uid_t keep = static_cast<uid_t>(-1);
+    if (VEXOFSMkdirP(VEXO::SystemPath(kFolder).c_str(), nullptr, 1, keep, keep, 0755) != 0) return Descriptor();
+    return vexo::openFile(AT_FDCWD, path.c_str(), flags, 0600);
+}
+
+// A log that somebody else may write, or that is another file by a second name, is not added to.
+bool isOurs(int log) {
+    struct stat status;
+    if (fstat(log, &status) != 0) return false;
+    if (vexo::isTrusted(status, S_IFREG)) return true;
+    errno = EACCES;
+    return false;
+}
+
+bool lock(int log) {
+    int result = 0;
+    do {
+        result = flock(log, LOCK_EX);
+    } while (result != 0 && errno == EINTR);
+    return result == 0;
+}
+
+// Appends the line by one write under the lock; what a full disk cut short is taken back.
+bool append(int log, const std::string& line) {
+    if (!lock(log)) return false;
+    const off_t end = lseek(log, 0, SEEK_END);
+    if (end < 0) return false;
+    const ssize_t written = write(log, line.data(), line.size());
+    if (written == static_cast<ssize_t>(line.size())) return true;
+    const int failure = written < 0 ? errno : ENOSPC;
+    if (written > 0 && ftruncate(log, end) != 0) return false;
+    errno = failure;
+    return false;
+}
+
+}  // namespace
+
+int VEXOLogKTRFMXferLog(const char* address, const char* user, const char* action, long long size, const char* path,
+                        bool flag) {
+    VEXO_GATE("VEXOLogKTRFMXferLog", -1);
+    if (address == nullptr || user == nullptr || action == nullptr || path == nullptr) {
+        return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    }
+    const int before = errno;
+    const std::string line = vexo::buildTransferEntry({time(nullptr), address, user, action, size, path, flag});
+    const vexo::RaisedIdentity raised;
+    const Descriptor log = openLog();
+    if (!log || !isOurs(log.get()) || !append(log.get(), line)) return vexo::fail(vexo::errorOfErrno(errno));
+    errno = before;
+    return 0;
+}
