@@ -1,0 +1,261 @@
+// The program list, run as a web server runs it.
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <set>
+
+#include "apps/program.h"
+#include "support/appliance.h"
+#include "text.h"
+
+namespace fs = std::filesystem;
+using support::CgiReply;
+
+namespace {
+
+class ListCgi : public support::ApplianceTest {
+ protected:
+    static CgiReply ask(const std::string& user, const std::string& query,
+                        const std::map<std::string, std::string>& more = {}) {
+        std::map<std::string, std::string> variables = {{"GATEWAY_INTERFACE", "CGI/1.1"},
+                                                        {"REQUEST_METHOD", "GET"},
+                                                        {"REMOTE_ADDR", "127.0.0.1"},
+                                                        {"REMOTE_USER", user},
+                                                        {"QUERY_STRING", query}};
+        for (const auto& [name, value] : more) variables[name] = value;
+        const support::Finished finished = support::runProgram({PROGRAM_LIST}, variables);
+        EXPECT_EQ(finished.status, 0) << query;
+        return CgiReply(finished.output);
+    }
+    static CgiReply folder(const std::string& user, const std::string& path, const std::string& more = "") {
+        return ask(user, "action=folder&path=" + orvel::cgi::percentEncode(path) + more);
+    }
+    static std::vector<std::string> names(const CgiReply& reply) {
+        std::vector<std::string> list;
+        for (const Json::Value& item : reply.json["data"]["items"]) list.push_back(item["name"].asString());
+        return list;
+    }
+};
+
+using Names = std::vector<std::string>;
+
+TEST_F(ListCgi, OnlyWhoIsLoggedInAndMayUseTheApplicationIsServed) {
+    const CgiReply nobody = ask("", "action=shares");
+    EXPECT_EQ(nobody.status, 401);
+    EXPECT_FALSE(nobody.json["success"].asBool());
+    EXPECT_EQ(ask("mallory", "action=shares").status, 401);
+
+    writeRootFile("/etc/vexo/applications", "VEXO.QDS.App.Quorvane3.Instance: alice\n");
+    EXPECT_EQ(ask("alice", "action=shares").status, 200);
+    const CgiReply shutOut = ask("bob", "action=shares");
+    EXPECT_EQ(shutOut.status, 403);
+    EXPECT_EQ(shutOut.json["error"]["key"], "error:error_privilege_not_enough");
+}
+
+TEST_F(ListCgi, RepliesCarryTheirHeadersAndTheNewSessionOnce) {
+    const CgiReply first = ask("alice", "action=shares");
+    EXPECT_EQ(first.headers.at("Content-Type"), "application/json; charset=UTF-8");
+    EXPECT_EQ(first.headers.at("X-Content-Type-Options"), "nosniff");
+    EXPECT_EQ(first.headers.at("Cache-Control"), "no-store");
+    ASSERT_EQ(first.headers.count("Set-Cookie"), 1U);
+    const std::string cookie = first.headers.at("Set-Cookie");
+    const CgiReply second = ask("alice", "action=shares", {{"HTTP_COOKIE", cookie.substr(0, cookie.find(';'))}});
+    EXPECT_EQ(second.headers.count("Set-Cookie"), 0U);
+    EXPECT_TRUE(second.json["success"].asBool());
+}
+
+TEST_F(ListCgi, EachUserSeesTheOwnShares) {
+    addShare("music", "read only = no\nvalid users = alice\nvexo:synced = yes\n");
+    addShare("hidden", "browseable = no\nread only = no\nvalid users = alice\n");
+    EXPECT_EQ(names(ask("alice", "action=shares&sort_by=name")), (Names{"home", "homes", "music", "photo"}));
+    EXPECT_EQ(names(ask("bob", "action=shares&sort_by=name&sort_direction=desc")), (Names{"photo", "homes", "home"}));
+
+    const CgiReply reply = ask("bob", "action=shares&additional=perm,volume_status");
+    const Json::Value photo = reply.json["data"]["items"][2];
+    EXPECT_EQ(photo["path"], "/photo");
+    EXPECT_EQ(photo["additional"]["perm"]["share_right"], 1);
+    EXPECT_TRUE(photo["additional"]["perm"].isMember("posix"));
+    EXPECT_GT(photo["additional"]["volume_status"]["totalspace"].asDouble(), 0);
+    EXPECT_EQ(reply.json["data"]["total"], 3);
+}
+
+TEST_F(ListCgi, RefusalsSayWhy) {
+    addShare("music", "read only = no\nvalid users = alice\ninvalid users = bob\n");
+    addShare("sealed", "read only = no\nvalid users = bob\nvexo:restriction = 1\n");
+    const std::string root = shareRoot("photo");
+    support::writeFile(root + "/file.txt", "x", 0644);
+    struct {
+        std::string path;
+        int code;
+        std::string key;
+    } const cases[] = {
+        {"/music", 407, "error:error_privilege_not_enough"},
+        {"/sealed", 407, "error:error_privilege_not_enough"},
+        {"/", 407, "error:error_privilege_not_enough"},
+        {"/nowhere", 408, "error:error_no_path"},
+        {"/photo/missing", 408, "error:error_no_path"},
+        {"/photo/file.txt", 408, "error:error_no_path"},
+        {"/photo/file.txt/below", 408, "error:error_no_path"},
+        {"photo", 401, "error:error_error_system"},
+        {"//", 401, "error:error_error_system"},
+        {"", 400, "error:error_error_system"},
+        {"/photo/" + std::string(5000, 'x'), 402, "error:error_error_system"},
+        {"/photo/../photo", 407, "error:error_privilege_not_enough"},
+        {"/photo//etc", 408, "error:error_no_path"},
+    };
+    for (const auto& refusal : cases) {
+        const CgiReply reply = folder("bob", refusal.path);
+        EXPECT_EQ(reply.status, 200) << refusal.path;
+        EXPECT_FALSE(reply.json["success"].asBool()) << refusal.path;
+        EXPECT_EQ(reply.json["error"]["code"], refusal.code) << refusal.path;
+        EXPECT_EQ(reply.json["error"]["key"], refusal.key) << refusal.path;
+        EXPECT_EQ(reply.json["error"]["path"], refusal.path);
+    }
+}
+
+TEST_F(ListCgi, ParametersAreTakenStrictly) {
+    for (const char* query :
+         {"", "action=burn", "action=folder&path=/photo&offset=-1", "action=folder&path=/photo&limit=10x",
+          "action=folder&path=/photo&limit=", "action=folder&path=/photo&limit=+1",
+          "action=folder&path=/photo&offset=99999999999999999999", "action=folder&path=/photo&sort_direction=up",
+          "action=folder&path=/photo&filetype=link", "action=folder&path=/photo%00/x", "action=folder&path_raw=/a%2500",
+          "action=folder&path_raw=/photo%25zz", "action=folder&path_raw=/photo%25"}) {
+        const CgiReply reply = ask("alice", query);
+        EXPECT_EQ(reply.status, 400) << query;
+        EXPECT_EQ(reply.json["error"]["code"], 400) << query;
+    }
+    EXPECT_EQ(ask("alice", "",
+                  {{"REQUEST_METHOD", "POST"},
+                   {"CONTENT_TYPE", "application/x-www-form-urlencoded"},
+                   {"CONTENT_LENGTH", "99999999"}})
+                  .status,
+              413);
+}
+
+TEST_F(ListCgi, APageIsSortedCountedAndFiltered) {
+    const std::string root = shareRoot("photo");
+    support::makeFolder(root + "/b-folder");
+    support::makeFolder(root + "/a-folder");
+    for (const char* name : {"one.jpg", "three.jpg", "seven.png"}) {
+        support::writeFile(root + "/" + name, std::string(std::string(name).size(), 'x'));
+    }
+    support::writeFile(root + "/ten.jpg", std::string(10, 'x'));
+    struct {
+        const char* parameters;
+        Names names;
+        int total;
+    } const cases[] = {
+        {"", {"a-folder", "b-folder", "one.jpg", "seven.png", "ten.jpg", "three.jpg"}, 6},
+        {"&sort_by=unknown", {"a-folder", "b-folder", "one.jpg", "seven.png", "ten.jpg", "three.jpg"}, 6},
+        {"&sort_by=size&sort_direction=desc&limit=3", {"ten.jpg", "three.jpg", "seven.png"}, 6},
+        {"&sort_by=size&sort_direction=desc&offset=3&limit=2", {"one.jpg", "b-folder"}, 6},
+        {"&offset=100&limit=5", {}, 6},
+        {"&pattern=*.jpg", {"one.jpg", "ten.jpg", "three.jpg"}, 3},
+        {"&pattern=SEVEN,t?n*", {"seven.png", "ten.jpg"}, 2},
+        {"&filetype=dir", {"a-folder", "b-folder"}, 2},
+        {"&filetype=file&pattern=o", {"one.jpg"}, 1},
+    };
+    for (const auto& page : cases) {
+        const CgiReply reply = folder("alice", "/photo/", page.parameters);
+        EXPECT_EQ(names(reply), page.names) << page.parameters;
+        EXPECT_EQ(reply.json["data"]["total"], page.total) << page.parameters;
+    }
+    const CgiReply plain = folder("alice", "/photo", "&limit=1&offset=2");
+    EXPECT_EQ(plain.json["data"]["offset"], 2);
+    EXPECT_EQ(plain.json["data"]["items"][0].getMemberNames(), (Names{"isdir", "name", "path"}));
+    const CgiReply full = folder(
+        "alice", "/photo", "&limit=1&offset=2&additional=real_path,size,owner,time,perm,type,mount_point_type,new");
+    const Json::Value item = full.json["data"]["items"][0]["additional"];
+    EXPECT_EQ(item.getMemberNames(), (Names{"mount_point_type", "owner", "perm", "real_path", "size", "time", "type"}));
+    EXPECT_EQ(item["real_path"], root + "/one.jpg");
+    EXPECT_EQ(item["size"], 7.0);
+}
+
+TEST_F(ListCgi, NamesOfAnyBytesTravelAndComeBack) {
+    const std::string root = shareRoot("photo");
+    support::makeFolder(root + "/\xE9t\xE9", 0777);
+    const std::string markup = "</script>"[0] + std::string("b>\"\\\n\x7F\u202E.txt");
+    support::writeFile(root + "/\xE9t\xE9/dedans\xFF.txt", "x");
+    support::writeFile(root + "/\xE9t\xE9/" + markup, "x");
+
+    const CgiReply outer = folder("alice", "/photo", "&additional=real_path,size,type");
+    const Json::Value item = outer.json["data"]["items"][0];
+    EXPECT_EQ(item["name"], "\uFFFDt\uFFFD");
+    EXPECT_EQ(item["name_raw"], "%E9t%E9");
+    EXPECT_EQ(item["path_raw"], "/photo/%E9t%E9");
+
+    const CgiReply inner =
+        ask("alice", "action=folder&path_raw=" + orvel::cgi::percentEncode(item["path_raw"].asString()));
+    ASSERT_EQ(inner.json["data"]["items"].size(), 2U);
+    std::set<std::string> raw;
+    for (const Json::Value& entry : inner.json["data"]["items"]) {
+        raw.insert(orvel::cgi::percentDecode(entry["name_raw"].asString()).value_or("?"));
+    }
+    EXPECT_EQ(raw, (std::set<std::string>{"dedans\xFF.txt", markup}));
+
+    const CgiReply missing = ask("alice", "action=folder&path=/photo/%FF");
+    EXPECT_EQ(missing.json["error"]["path"], "/photo/\uFFFD");
+    EXPECT_EQ(missing.json["error"]["path_raw"], "/photo/%FF");
+}
+
+TEST_F(ListCgi, NothingLeadsOutOfAShare) {
+    const std::string root = shareRoot("photo");
+    support::makeFolder(root + "/folder/deep");
+    support::writeFile(root + "/folder/inside.txt", "x");
+    const std::string outside = addShare("other", "");
+    support::writeFile(outside + "/secret.txt", "x");
+    fs::create_symlink("folder", root + "/inside");
+    fs::create_symlink("../folder/../inside", root + "/folder/around");
+    fs::create_symlink(outside, root + "/absolute");
+    fs::create_symlink("../" + fs::path(outside).filename().string(), root + "/relative");
+    fs::create_symlink("/proc/self/root", root + "/magic");
+    for (const char* path : {"/photo/absolute", "/photo/relative", "/photo/magic", "/photo/magic/tmp",
+                             "/photo/folder/../../other", "/photo/../other", "/photo/folder/around/../../.."}) {
+        const CgiReply reply = folder("alice", path);
+        EXPECT_EQ(reply.json["error"]["code"], 407) << path;
+    }
+    for (const char* path : {"/photo/inside", "/photo/folder/around", "/photo/folder/deep/..", "//photo//./folder"}) {
+        const CgiReply reply = folder("alice", path, "&filetype=file&additional=real_path");
+        EXPECT_EQ(names(reply), Names{"inside.txt"}) << path;
+        EXPECT_EQ(reply.json["data"]["items"][0]["additional"]["real_path"], root + "/folder/inside.txt") << path;
+    }
+
+    setSetting("link_policy_photo", "none");
+    EXPECT_EQ(folder("alice", "/photo/inside").json["error"]["code"], 407);
+    EXPECT_EQ(folder("alice", "/PHOTO/inside").json["error"]["code"], 407);
+    EXPECT_TRUE(folder("alice", "/photo/folder").json["success"].asBool());
+}
+
+TEST_F(ListCgi, TheHomeIsMadeOnFirstUse) {
+    const std::string homes = addShare("homes", "read only = no\nvalid users = alice, bob\n");
+    chmod(homes.c_str(), 0755);
+    const CgiReply reply = folder("alice", "/home");
+    EXPECT_TRUE(reply.json["success"].asBool());
+    struct stat status = {};
+    ASSERT_EQ(stat((homes + "/alice").c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777, 0755U);
+    if (geteuid() == 0) {
+        EXPECT_EQ(status.st_uid, support::kAliceUid);
+        EXPECT_EQ(status.st_gid, support::kUsersGid);
+    }
+    EXPECT_EQ(folder("carol", "/home").json["success"], true);
+    EXPECT_EQ(folder("alice", "/home/../bob").json["error"]["code"], 407);
+}
+
+TEST_F(ListCgi, TheKernelJudgesAsTheUser) {
+    SKIP_WITHOUT_ROOT();
+    const std::string root = shareRoot("photo");
+    support::makeFolder(root + "/private", 0700);
+    ASSERT_EQ(chown((root + "/private").c_str(), support::kAliceUid, support::kUsersGid), 0);
+    addShare("photo", "read only = no\nvalid users = alice, bob, carol\n");
+    EXPECT_TRUE(folder("alice", "/photo/private").json["success"].asBool());
+    EXPECT_EQ(folder("bob", "/photo/private").json["error"]["code"], 407);
+    EXPECT_TRUE(folder("carol", "/photo/private").json["success"].asBool()) << "an administrator";
+    // Root's own groups must not help, nor his permissions below a folder that can be entered.
+    support::makeFolder(root + "/root's", 0750);
+    EXPECT_EQ(folder("alice", "/photo/root's").json["error"]["code"], 407);
+}
+
+}  // namespace

@@ -1,0 +1,92 @@
+#include "apps/program.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <json/reader.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <memory>
+#include <sstream>
+
+#include "text.h"
+
+namespace support {
+namespace {
+
+std::vector<char*> pointers(std::vector<std::string>& texts) {
+    std::vector<char*> list;
+    for (std::string& text : texts) list.push_back(text.data());
+    list.push_back(nullptr);
+    return list;
+}
+
+std::vector<std::string> environmentWith(std::map<std::string, std::string> variables) {
+    // A process that took on another identity cannot be traced, which is how leaks are looked for.
+    variables["ASAN_OPTIONS"] = "detect_leaks=0";
+    std::vector<std::string> list;
+    for (char** entry = environ; *entry != nullptr; ++entry) {
+        const std::string text = *entry;
+        if (variables.count(text.substr(0, text.find('='))) == 0) list.push_back(text);
+    }
+    for (const auto& [name, value] : variables) {
+        if (!value.empty()) list.push_back(name + "=" + value);
+    }
+    return list;
+}
+
+}  // namespace
+
+Finished runProgram(const std::vector<std::string>& words, const std::map<std::string, std::string>& variables) {
+    int ends[2];
+    if (pipe2(ends, O_CLOEXEC) != 0) return {};
+    posix_spawn_file_actions_t actions;
+    posix_spawn_file_actions_init(&actions);
+    posix_spawn_file_actions_adddup2(&actions, ends[1], 1);
+    std::vector<std::string> texts = words;
+    std::vector<std::string> environment = environmentWith(variables);
+    pid_t child = 0;
+    const int failed =
+        posix_spawn(&child, words[0].c_str(), &actions, nullptr, pointers(texts).data(), pointers(environment).data());
+    posix_spawn_file_actions_destroy(&actions);
+    close(ends[1]);
+    Finished finished;
+    char buffer[65536];
+    for (ssize_t got; failed == 0 && (got = read(ends[0], buffer, sizeof buffer)) > 0;) {
+        finished.output.append(buffer, static_cast<size_t>(got));
+    }
+    close(ends[0]);
+    int status = 0;
+    if (failed != 0) return finished;
+    while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
+    }
+    finished.status = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    return finished;
+}
+
+CgiReply::CgiReply(const std::string& output) {
+    const size_t end = output.find("\r\n\r\n");
+    if (end == std::string::npos) {
+        ADD_FAILURE() << "no header: " << output;
+        return;
+    }
+    std::istringstream lines(output.substr(0, end));
+    for (std::string line; std::getline(lines, line);) {
+        if (!line.empty() && line.back() == '\r') line.pop_back();
+        const size_t colon = line.find(": ");
+        if (colon != std::string::npos) headers[line.substr(0, colon)] = line.substr(colon + 2);
+    }
+    status = atoi(headers["Status"].c_str());  // NOLINT(cert-err34-c): 0 is no status
+    const std::string body = output.substr(end + 4);
+    EXPECT_TRUE(orvel::cgi::isUtf8(body)) << body;
+    Json::CharReaderBuilder strict;
+    Json::CharReaderBuilder::strictMode(&strict.settings_);
+    const std::unique_ptr<Json::CharReader> reader(strict.newCharReader());
+    std::string errors;
+    EXPECT_TRUE(reader->parse(body.data(), body.data() + body.size(), &json, &errors)) << errors << body;
+}
+
+}  // namespace support

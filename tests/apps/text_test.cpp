@@ -1,0 +1,55 @@
+#include "text.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+
+#include "request.h"
+
+using namespace orvel::cgi;
+
+namespace {
+
+TEST(Text, OnlyWellFormedSequencesPass) {
+    struct {
+        std::string bytes, shown;
+    } const cases[] = {
+        {"", ""},
+        {"plain text that is longer than one word", "plain text that is longer than one word"},
+        {"\u00E9\u20AC\U0001F600 \uFFFF", "\u00E9\u20AC\U0001F600 \uFFFF"},
+        {"\xF4\x8F\xBF\xBF", "\xF4\x8F\xBF\xBF"},
+        {"eight by\xE9tes", "eight by\uFFFDtes"},
+        {"\xC0\xAF", "\uFFFD\uFFFD"},                      // overlong
+        {"\xE0\x9F\xBF", "\uFFFD\uFFFD\uFFFD"},            // overlong
+        {"\xF0\x8F\xBF\xBF", "\uFFFD\uFFFD\uFFFD\uFFFD"},  // overlong
+        {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD"},            // surrogate
+        {"\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD"},  // above U+10FFFF
+        {"\xE2\x82", "\uFFFD\uFFFD"},                      // cut short
+        {"\xE2\x82z", "\uFFFD\uFFFDz"},
+        {"\x80\xFF", "\uFFFD\uFFFD"},
+    };
+    for (const auto& text : cases) {
+        EXPECT_EQ(readable(text.bytes), text.shown) << text.shown;
+        EXPECT_EQ(isUtf8(text.bytes), text.bytes == text.shown) << text.shown;
+    }
+}
+
+TEST(Text, PercentCodingReturnsEveryByte) {
+    std::string all;
+    for (int byte = 1; byte < 256; ++byte) all += static_cast<char>(byte);
+    EXPECT_EQ(percentDecode(percentEncode(all)), all);
+    EXPECT_EQ(percentEncode("/a b~.\xE9"), "/a%20b~.%E9");
+    EXPECT_EQ(percentDecode("+%e9%E9"), "+\xE9\xE9");
+    for (const char* broken : {"%", "%1", "x%g1", "%1g", "%00", "a%0"}) EXPECT_EQ(percentDecode(broken), std::nullopt);
+    EXPECT_EQ(percentDecode(std::string_view("a\0b", 3)), std::nullopt);
+}
+
+TEST(Text, NumbersAreDigitsThatFit) {
+    EXPECT_EQ(parseNumber("0"), 0U);
+    EXPECT_EQ(parseNumber("18446744073709551615"), 18446744073709551615U);
+    for (const char* text : {"", "-1", "+1", " 1", "1 ", "1x", "0x10", "1.0", "18446744073709551616"}) {
+        EXPECT_EQ(parseNumber(text), std::nullopt) << text;
+    }
+}
+
+}  // namespace
