@@ -1,0 +1,155 @@
+// One web request: its fields, cookies and header, and what of a body is refused.
+#include "vexo/web.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <functional>
+#include <string>
+#include <vector>
+
+#include "cgi_text.h"
+#include "support/appliance.h"
+
+namespace {
+
+TEST(CgiText, FormText) {
+    struct Case {
+        const char *encoded, *decoded;
+    };
+    for (const auto& [encoded, decoded] :
+         {Case{"", ""}, Case{"a+b%20c%2Bd", "a b c+d"}, Case{"%2fphoto%2F%C3%A9", "/photo/\xC3\xA9"},
+          Case{"%FF", "\xFF"}, Case{"%00", "%00"}, Case{"a%2", "a%2"}, Case{"%", "%"}, Case{"%zz%41", "%zzA"},
+          Case{"%2541", "%41"}}) {
+        EXPECT_EQ(vexo::decodeFormText(encoded), decoded) << encoded;
+    }
+    vexo::FormFields fields;
+    vexo::parseForm("a=1&&b=x%3Dy=z&c&=d&a=2", fields);
+    const vexo::FormFields expected = {{"a", "1"}, {"b", "x=y=z"}, {"c", ""}, {"", "d"}, {"a", "2"}};
+    EXPECT_EQ(fields, expected);
+}
+
+TEST(CgiText, Cookies) {
+    struct Case {
+        const char *header, *value;
+    };
+    for (const auto& [header, value] : {Case{"id=1", "1"}, Case{"x=0;  id = 1 ;id=2", "1"}, Case{"id=a=b", "a=b"},
+                                        Case{"id=", ""}, Case{"id; id=1", "1"}}) {
+        EXPECT_EQ(vexo::findCookie(header, "id"), value) << header;
+    }
+    for (const char* header : {"", "id", "xid=1; ID=2", ";;=;"}) EXPECT_FALSE(vexo::findCookie(header, "id")) << header;
+}
+
+TEST(CgiText, ParseToArray) {
+    struct Case {
+        const char *text, *separator;
+        std::vector<std::string> pieces;
+    };
+    const Case cases[] = {{"a,b,,c", ",", {"a", "b", "", "c"}}, {",", ",", {"", ""}}, {"", ",", {""}},
+                          {"a::b:c", "::", {"a", "b:c"}},       {"a,b", "", {"a,b"}}, {"a,b", nullptr, {"a,b"}}};
+    for (const auto& [text, separator, pieces] : cases) {
+        const Json::Value array = VEXO::WebAPIUtil::ParseToArray(text, separator);
+        ASSERT_EQ(array.size(), pieces.size()) << text;
+        for (Json::ArrayIndex i = 0; i < array.size(); ++i) EXPECT_EQ(array[i].asString(), pieces[i]) << text;
+    }
+    const Json::Value none = VEXO::WebAPIUtil::ParseToArray(nullptr, ",");
+    EXPECT_TRUE(none.isArray());
+    EXPECT_EQ(none.size(), 0U);
+}
+
+class WebRequest : public support::ApplianceTest {
+ protected:
+    // Runs `body` in a process that was started as a CGI program with this body of the request.
+    static void post(const std::string& type, const std::string& length, const std::string& text,
+                     const std::function<void()>& body) {
+        const std::string file = systemRoot() + "/body";
+        support::writeFile(file, text);
+        SCOPED_TRACE(type + " " + length);
+        support::inChild([&] {
+            setenv("REQUEST_METHOD", "POST", 1);
+            setenv("CONTENT_TYPE", type.c_str(), 1);
+            setenv("CONTENT_LENGTH", length.c_str(), 1);
+            setenv("QUERY_STRING", "a=query&only=query", 1);
+            setenv("HTTP_COOKIE", "id=abc; lang=\"de\"", 1);
+            dup2(open(file.c_str(), O_RDONLY | O_CLOEXEC), STDIN_FILENO);
+            body();
+            return 0;
+        });
+    }
+};
+
+TEST_F(WebRequest, FieldsOfQueryAndBody) {
+    const std::string form = "a=body&b=%2Fphoto";
+    for (const char* type : {"application/x-www-form-urlencoded", "APPLICATION/X-www-form-urlencoded; charset=UTF-8"}) {
+        post(type, std::to_string(form.size()), form + "ignored", [] {
+            const VEXO::WebCGI web;
+            EXPECT_FALSE(web.BodyRefused());
+            EXPECT_EQ(web.GetParam("a", "none"), "query") << "query before body";
+            EXPECT_EQ(web.GetParam("b", "none"), "/photo");
+            EXPECT_EQ(web.GetParam("c", "none"), "none");
+            EXPECT_TRUE(web.HasParam("only"));
+            EXPECT_FALSE(web.HasParam("photo"));
+            EXPECT_EQ(web.GetCookie("id", "none"), "abc");
+            EXPECT_EQ(web.GetCookie("lang", "none"), "\"de\"");
+            EXPECT_EQ(web.GetCookie("sid", "none"), "none");
+        });
+    }
+    for (const char* type : {"multipart/form-data; boundary=x", "application/x-www-form-urlencodedx", ""}) {
+        post(type, std::to_string(form.size()), form, [] {
+            const VEXO::WebCGI web;
+            EXPECT_FALSE(web.BodyRefused());
+            EXPECT_FALSE(web.HasParam("b"));
+            char next = 0;
+            EXPECT_EQ(read(STDIN_FILENO, &next, 1), 1) << "another body is the program's to read";
+            EXPECT_EQ(next, 'a');
+        });
+    }
+}
+
+TEST_F(WebRequest, ABodyThatIsNotWholeOrTooLongIsRefused) {
+    struct Case {
+        std::string length, text;
+        bool refused;
+    };
+    const size_t limit = size_t{1} << 20;
+    const std::string longest = "b=" + std::string(limit - 2, 'x');
+    for (const auto& [length, text, refused] :
+         {Case{"", "b=1", false}, Case{"0", "", false}, Case{std::to_string(limit), longest, false},
+          Case{std::to_string(limit + 1), longest + "x", true}, Case{"99999999999999999999", "b=1", true},
+          Case{"-1", "b=1", true}, Case{"3x", "b=1", true}, Case{"4", "b=1", true},
+          Case{"4", std::string("b=\0x", 4), true}}) {
+        post("application/x-www-form-urlencoded", length, text, [&, expected = refused] {
+            const VEXO::WebCGI web;
+            EXPECT_EQ(web.BodyRefused(), expected);
+            EXPECT_EQ(web.HasParam("b"), !expected && !length.empty() && length != "0");
+            EXPECT_EQ(web.GetParam("a", "none"), "query");
+        });
+    }
+}
+
+TEST_F(WebRequest, HeaderWithCookies) {
+    const std::string file = systemRoot() + "/reply";
+    support::inChild([&] {
+        VEXO::WebCGI web;
+        EXPECT_TRUE(web.AddCookieToHeader("/", "link-1", "a b"));
+        EXPECT_TRUE(web.AddCookieToHeader("", "x", ""));
+        for (const char* name : {"", "a b", "a=b", "a;b", "a\n", "\xC3\xA9"}) {
+            EXPECT_FALSE(web.AddCookieToHeader("/", name, "v")) << name;
+        }
+        for (const char* text : {"a\r\nSet-Cookie: x=y", "a;b", "a,b", "\x7F"}) {
+            EXPECT_FALSE(web.AddCookieToHeader("/", "n", text)) << text;
+            EXPECT_FALSE(web.AddCookieToHeader(text, "n", "v")) << text;
+        }
+        fflush(stdout);
+        dup2(open(file.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600), STDOUT_FILENO);
+        web.WriteHeader("text/html; charset=UTF-8");
+        fflush(stdout);
+        return 0;
+    });
+    EXPECT_EQ(support::readFile(file),
+              "Set-Cookie: link-1=a b; Path=/\r\nSet-Cookie: x=\r\nContent-Type: text/html; charset=UTF-8\r\n\r\n");
+}
+
+}  // namespace
