@@ -1,0 +1,129 @@
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <climits>
+#include <cstring>
+
+#include "fault_gate.h"
+#include "orvel/error_state.h"
+#include "orvel/privilege.h"
+#include "support/appliance.h"
+#include "support/log_texts.h"
+#include "vexo/error.h"
+
+namespace {
+
+using Texts = std::vector<std::string>;
+using support::takeLogTexts;
+
+class AclPrivilegeTest : public support::ApplianceTest {};
+
+std::string workingFolder() {
+    char path[PATH_MAX];
+    return getcwd(path, sizeof path) != nullptr ? path : "";
+}
+
+TEST_F(AclPrivilegeTest, FailuresOfThePlatform) {
+    struct Case {
+        int platform, result, code;
+        bool accessLogs, getLogs;
+    };
+    const Case cases[] = {
+        {0x8400, -1, 411, false, true},  {0x0600, -1, 408, false, false}, {0xA000, -1, 408, false, true},
+        {0xD700, -1, 408, false, false}, {0x0300, 0, 7, false, false},    {0xD800, 0, 7, false, false},
+        {0x8100, -1, 7, true, true},     {0x1400, -1, 7, true, true},
+    };
+    for (const Case& c : cases) {
+        char reason[8];
+        snprintf(reason, sizeof reason, "%X", static_cast<unsigned>(c.platform));
+        vexo::gate::reset();
+        vexo::gate::fail("VEXOACLPermGet", c.platform);
+        OrvLibSetErr(7);
+        EXPECT_EQ(ACLAccess("/tmp", 31), c.result) << reason;
+        EXPECT_EQ(OrvLibGetErr(), c.code) << reason;
+        const std::string start = "orveldir:# Failed to get the ACL Privilege: file = /tmp, ";
+        EXPECT_EQ(takeLogTexts(), c.accessLogs ? Texts{start + "reason=[" + reason + "]"} : Texts{});
+
+        EXPECT_EQ(GetACLPrivilege("/tmp"), 0x1FFFU);
+        const std::string line = start + "euid = " + std::to_string(geteuid()) + ", reason=[" + reason + "]";
+        EXPECT_EQ(takeLogTexts(), c.getLogs ? Texts{line} : Texts{}) << reason;
+    }
+}
+
+TEST_F(AclPrivilegeTest, ArgumentsAndMissingFiles) {
+    OrvLibSetErr(7);
+    EXPECT_EQ(ACLAccess(nullptr, 1), -1);
+    EXPECT_EQ(ACLAccess("/tmp", 0), -1);
+    EXPECT_EQ(OrvLibGetErr(), 7);
+    const std::string none = shareRoot("photo") + "/none";
+    EXPECT_EQ(ACLAccess(none.c_str(), 1), -1);
+    EXPECT_EQ(OrvLibGetErr(), 408);
+    EXPECT_EQ(GetACLPrivilege(none.c_str()), 0x1FFFU);
+    EXPECT_EQ(takeLogTexts(), Texts{});
+}
+
+TEST_F(AclPrivilegeTest, PermissionsOfTheCaller) {
+    SKIP_WITHOUT_ROOT();
+    const std::string folder = shareRoot("photo") + "/d", file = folder + "/f";
+    support::makeFolder(folder, 0755);
+    support::writeFile(file, "x", 0644);
+    ASSERT_EQ(chown(file.c_str(), support::kAliceUid, support::kUsersGid), 0);
+    support::asUser(support::kAliceUid, support::kUsersGid, [&] {
+        EXPECT_EQ(GetACLPrivilege(file.c_str()), 0xEU) << "no delete: the folder is not hers";
+        EXPECT_EQ(ACLAccess(file.c_str(), ORV_ACCESS_READ | ORV_ACCESS_WRITE | ORV_ACCESS_APPEND), 0);
+        VLIBCErrSetEx(0, "", 0);
+        EXPECT_EQ(ACLAccess(file.c_str(), ORV_ACCESS_READ | ORV_ACCESS_DELETE), -1);
+        EXPECT_EQ(OrvLibGetErr(), 407);
+        EXPECT_EQ(VLIBCErrGet(), 0x0300);
+        return 0;
+    });
+    support::asUser(support::kBobUid, support::kUsersGid, [&] {
+        EXPECT_EQ(ACLAccess(file.c_str(), ORV_ACCESS_READ), 0);
+        EXPECT_EQ(ACLAccess(file.c_str(), ORV_ACCESS_WRITE), -1);
+        return 0;
+    });
+}
+
+TEST_F(AclPrivilegeTest, EnteringAFolder) {
+    const std::string root = shareRoot("photo");
+    support::writeFile(root + "/file", "x");
+    EXPECT_FALSE(CheckDirListPrivilege(nullptr));
+    struct Case {
+        std::string path;
+        int code, failure;
+    };
+    const Case cases[] = {{root + "/none", 408, ENOENT},
+                          {root + "/file", 408, ENOTDIR},
+                          {root + "/" + std::string(300, 'x'), 402, ENAMETOOLONG}};
+    for (const Case& c : cases) {
+        OrvLibSetErr(7);
+        EXPECT_FALSE(CheckDirListPrivilege(c.path.c_str()));
+        EXPECT_EQ(OrvLibGetErr(), c.code);
+        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# Failed to chdir " + c.path + ". [" + strerror(c.failure) + "]"});
+    }
+    OrvLibSetErr(7);
+    EXPECT_TRUE(CheckDirListPrivilege(root.c_str()));
+    EXPECT_EQ(OrvLibGetErr(), 0);
+    EXPECT_EQ(workingFolder(), root) << "callers go on from inside the folder";
+}
+
+TEST_F(AclPrivilegeTest, FoldersThatAreClosed) {
+    SKIP_WITHOUT_ROOT();
+    const std::string closed = shareRoot("photo") + "/closed", unread = shareRoot("photo") + "/unread";
+    support::makeFolder(closed, 0700);
+    support::makeFolder(unread, 0711);
+    support::asUser(support::kBobUid, support::kUsersGid, [&] {
+        EXPECT_FALSE(CheckDirListPrivilege(closed.c_str()));
+        EXPECT_EQ(OrvLibGetErr(), 407);
+        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# Failed to chdir " + closed + ". [Permission denied]"});
+        EXPECT_FALSE(CheckDirListPrivilege(unread.c_str()));
+        EXPECT_EQ(OrvLibGetErr(), 407);
+        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# Failed to opendir " + unread + ". [Permission denied]"});
+        EXPECT_EQ(workingFolder(), unread);
+        return 0;
+    });
+}
+
+}  // namespace

@@ -1,0 +1,115 @@
+#include "orvel/error_state.h"
+
+#include <cerrno>
+#include <string>
+
+#include "support/appliance.h"
+#include "support/log_texts.h"
+
+namespace {
+
+class ErrorStateTest : public support::ApplianceTest {};
+
+TEST_F(ErrorStateTest, EveryCodeHasItsKey) {
+    struct Case {
+        int code;
+        const char* key;
+    };
+    const Case cases[] = {
+        {400, "error_error_system"},
+        {401, "error_error_system"},
+        {402, "error_error_system"},
+        {403, "error_invalid_user_group"},
+        {404, "error_invalid_user_group"},
+        {405, "error_invalid_user_group"},
+        {406, "error_testjoin"},
+        {407, "error_privilege_not_enough"},
+        {408, "error_no_path"},
+        {409, "error_privilege_not_enough"},
+        {410, "conn_rv_fail"},
+        {411, "error_fs_ro"},
+        {412, "error_long_path"},
+        {413, "error_encryption_long_path"},
+        {414, "error_file_exist"},
+        {415, "error_quota_not_enough"},
+        {416, "error_space_not_enough"},
+        {417, "error_io"},
+        {418, "error_reserved_name"},
+        {419, "error_fat_reserved_name"},
+        {420, "error_error_system"},
+        {421, "error_folder_busy"},
+        {1004, "error_overwrite_fail"},
+        {1005, "error_select_conflict"},
+        {1006, "mvcp_filename_illegal"},
+        {1007, "mvcp_file_too_big"},
+        {1400, "error_error_system"},
+        {1401, "error_invalid_archive"},
+        {1402, "error_invalid_archive_data"},
+        {1403, "extract_passwd_missing"},
+        {1404, "error_error_system"},
+        {1405, "error_error_system"},
+    };
+    for (const Case& c : cases) {
+        EXPECT_EQ(OrvParseErrorToKTRString(c.code, "other:key"), std::string("error:") + c.key) << c.code;
+    }
+    for (const int code : {0, -1, 399, 422, 1003, 1008, 1399, 1406, 1800, 1803, 1804, 1805}) {
+        EXPECT_STREQ(OrvParseErrorToKTRString(code, "other:key"), "other:key") << code;
+        EXPECT_STREQ(OrvParseErrorToKTRString(code, nullptr), "error:error_error_system") << code;
+    }
+}
+
+TEST_F(ErrorStateTest, SetReturnsItsArgument) {
+    for (const int code : {408, 0, -5}) {
+        EXPECT_EQ(OrvLibSetErr(code), code);
+        EXPECT_EQ(OrvLibGetErr(), code);
+    }
+}
+
+TEST_F(ErrorStateTest, TranslatorsMapButDoNotStore) {
+    struct Case {
+        int from, to;
+    };
+    const Case errnos[] = {{EPERM, 407},     {ENOENT, 408},  {EIO, 417},    {EACCES, 407}, {EBUSY, 420},
+                           {EEXIST, 414},    {ENOTDIR, 408}, {ENOSPC, 416}, {EROFS, 411},  {ENAMETOOLONG, 412},
+                           {ENOTEMPTY, 414}, {EDQUOT, 415},  {ENOMEM, 401}, {0, 401},      {ELOOP, 401}};
+    OrvLibSetErr(7);
+    for (const Case& c : errnos) EXPECT_EQ(OrvParseErrnoToError(c.from, nullptr, nullptr), c.to) << c.from;
+    const Case platform[] = {{0x0300, 407}, {0x0600, 408}, {0x0700, 408}, {0x2400, 415}, {0x2900, 416}, {0x8400, 411},
+                             {0xA500, 419}, {0xC300, 412}, {0x2500, 401}, {0x1400, 401}, {0, 401}};
+    for (const Case& c : platform) EXPECT_EQ(OrvParseVexoErrToError(c.from, nullptr), c.to) << c.from;
+    EXPECT_EQ(OrvLibGetErr(), 7);
+}
+
+TEST_F(ErrorStateTest, BusyAsksTheMountTable) {
+    addMount("/volume1/disc", "iso9660", "ro");
+    EXPECT_EQ(OrvParseErrnoToError(EBUSY, "photo", "/volume1/disc"), 421);
+    EXPECT_EQ(OrvParseErrnoToError(EBUSY, "photo", "/volume1/disc/sub"), 420);
+    EXPECT_EQ(OrvParseErrnoToError(ENOENT, nullptr, "/volume1/disc"), 408) << "asked for EBUSY alone";
+}
+
+TEST_F(ErrorStateTest, LongPathAsksWhetherTheShareIsEncrypted) {
+    addShare("secret", "valid users = alice\nvexo:encrypted = yes\n");
+    struct Case {
+        const char* share;
+        int code;
+        int left;  // in the error variable
+        std::vector<std::string> log;
+    };
+    const Case cases[] = {
+        {"secret", 413, 0, {}},
+        {"photo", 412, 0, {}},
+        {"home", 412, 0, {}},
+        {"nowhere", 412, 408, {"orveldir:# VEXOShareGet fail nowhere"}},
+        {"no\nwhere", 412, 408, {"orveldir:# VEXOShareGet fail no\\x0Awhere"}},
+    };
+    for (const Case& c : cases) {
+        OrvLibSetErr(0);
+        EXPECT_EQ(OrvParseErrnoToError(ENAMETOOLONG, c.share, nullptr), c.code) << c.share;
+        EXPECT_EQ(OrvLibGetErr(), c.left) << c.share;
+        EXPECT_EQ(support::takeLogTexts(), c.log);
+        EXPECT_EQ(OrvParseVexoErrToError(0xC300, c.share), c.code) << c.share;
+        EXPECT_EQ(support::takeLogTexts(), c.log);
+    }
+}
+
+}  // namespace

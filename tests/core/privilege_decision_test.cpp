@@ -1,0 +1,91 @@
+#include "core/privilege_decision.h"
+
+#include <gtest/gtest.h>
+
+#include "core/user_kind.h"
+#include "orvel/privilege.h"
+
+namespace {
+
+using orvel::UploadVerdict;
+
+TEST(PrivilegeDecision, NoAccessBeatsReadWriteBeatsReadOnly) {
+    for (unsigned lists = 0; lists < 8; ++lists) {
+        const bool no = (lists & 1) != 0, write = (lists & 2) != 0, read = (lists & 4) != 0;
+        const int expected = no ? 0 : write ? 2 : read ? 1 : 0;
+        EXPECT_EQ(orvel::privilegeOf(orvel::ruleOf({no, write, read})), expected) << lists;
+    }
+    EXPECT_EQ(orvel::ruleOf({true, true, true}), PrivilegeRule::kNoAccess);
+    EXPECT_EQ(orvel::ruleOf({false, false, false}), PrivilegeRule::kNoList);
+}
+
+TEST(PrivilegeDecision, ServiceAnswersAndMasks) {
+    struct Case {
+        int answer, privilege;
+    };
+    for (const Case& c : {Case{0, 0}, Case{1, 1}, Case{2, 2}, Case{3, 0}, Case{-1, 0}, Case{4, 0}}) {
+        EXPECT_EQ(orvel::privilegeFromService(c.answer), c.privilege) << c.answer;
+    }
+    EXPECT_EQ(orvel::effectiveMask(true, 7), 0U);
+    EXPECT_EQ(orvel::effectiveMask(false, 7), 7U);
+}
+
+TEST(PrivilegeDecision, WhatAMaskForbids) {
+    for (unsigned mask = 0; mask < 8; ++mask) {
+        const bool one = (mask & 1) != 0, two = (mask & 2) != 0, four = (mask & 4) != 0;
+        for (const int privilege : {0, 1, 2}) {
+            EXPECT_EQ(orvel::mayList(privilege, mask), privilege != 0 && !one);
+            EXPECT_EQ(orvel::mayDownload(privilege, mask), privilege != 0 && !one && !four);
+            const UploadVerdict expected = privilege != 2 ? UploadVerdict::kRefused
+                                           : one || two   ? UploadVerdict::kGranted
+                                                          : UploadVerdict::kAskTarget;
+            EXPECT_EQ(orvel::judgeUpload(privilege, mask), expected) << privilege << " " << mask;
+        }
+    }
+}
+
+TEST(PrivilegeDecision, RequestedPermissions) {
+    struct Case {
+        int requested;
+        unsigned bit;
+    };
+    const Case cases[] = {{ORV_ACCESS_READ, 0x4},
+                          {ORV_ACCESS_WRITE, 0x2},
+                          {ORV_ACCESS_EXECUTE, 0x1},
+                          {ORV_ACCESS_DELETE, 0x200},
+                          {ORV_ACCESS_APPEND, 0x8}};
+    for (const Case& c : cases) {
+        EXPECT_TRUE(orvel::aclGrants(c.bit, c.requested)) << c.requested;
+        EXPECT_FALSE(orvel::aclGrants(0x1FFF & ~c.bit, c.requested)) << c.requested;
+        EXPECT_FALSE(orvel::aclGrants(c.bit, 31)) << c.requested;
+    }
+    EXPECT_TRUE(orvel::aclGrants(0x20F, 31));
+    EXPECT_TRUE(orvel::aclGrants(0, 32)) << "a bit that asks for nothing";
+}
+
+TEST(PrivilegeDecision, UserKinds) {
+    EXPECT_EQ(orvel::userKindOf("eve@corp\\x"), orvel::UserKind::kDomain);
+    EXPECT_EQ(orvel::userKindOf("@"), orvel::UserKind::kDirectory);
+    EXPECT_EQ(orvel::userKindOf(""), orvel::UserKind::kLocal);
+}
+
+TEST(PermissionText, LettersAndDigits) {
+    struct Case {
+        unsigned mode;
+        const char* text;
+        int digits;
+    };
+    const Case cases[] = {{0755, "rwxr-xr-x", 755}, {0640, "rw-r-----", 640}, {0750, "rwxr-x---", 750},
+                          {0, "---------", 0},      {0777, "rwxrwxrwx", 777}, {0104755, "rwxr-xr-x", 755},
+                          {0007, "------rwx", 7},   {0421, "r---w---x", 421}, {~0U, "rwxrwxrwx", 777}};
+    for (const Case& c : cases) {
+        EXPECT_EQ(GetPrivilegeStr(c.mode), c.text);
+        EXPECT_EQ(GetPrivilege(c.mode), c.digits) << c.text;
+        EXPECT_EQ(GetPrivilege(c.text), c.digits) << c.text;
+    }
+    EXPECT_EQ(GetPrivilege("rwx"), 700);
+    EXPECT_EQ(GetPrivilege("wxrsssRWX-and more"), 0);
+    EXPECT_EQ(GetPrivilege(static_cast<const char*>(nullptr)), 0);
+}
+
+}  // namespace

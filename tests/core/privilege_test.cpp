@@ -1,0 +1,319 @@
+#include "orvel/privilege.h"
+
+#include <unistd.h>
+
+#include "fault_gate.h"
+#include "orvel/error_state.h"
+#include "orvel/privilege_reason.h"
+#include "support/appliance.h"
+#include "support/fault_sweep.h"
+#include "support/log_texts.h"
+#include "vexo/error.h"
+
+namespace {
+
+using Texts = std::vector<std::string>;
+using support::takeLogTexts;
+
+struct Answer {
+    int result = 99, privilege = 99, mask = 99;
+};
+
+Answer ask(const char* path, const char* user, const char* sid = nullptr) {
+    Answer out;
+    out.result = OrvLibGetPrivilege(path, user, sid, &out.privilege, &out.mask);
+    return out;
+}
+
+class PrivilegeTest : public support::ApplianceTest {
+ protected:
+    void SetUp() override {
+        ApplianceTest::SetUp();
+        addUser("CORP\\eve", 20010, support::kUsersGid);
+        addUser("fay@corp", 20011, support::kUsersGid);
+        addGroup("editors", 20110, {"bob", "CORP\\eve"});
+        addShare("mixed",
+                 "invalid users = bob\nwrite list = bob, alice, CORP\\eve\nread list = alice, "
+                 "fay@corp\nvexo:restriction = 5\n");
+        addShare("drop", "write list = alice, carol\nread list = bob\nvexo:restriction = 2\n");
+        addShare("quiet", "write list = alice, carol\nread list = bob\nvexo:restriction = 1\n");
+        addShare("view", "write list = alice\nread list = bob, @editors\nvexo:restriction = 4\n");
+    }
+};
+
+TEST_F(PrivilegeTest, ListsAndMasks) {
+    struct Case {
+        const char* path;
+        const char* user;
+        int privilege, mask;
+    };
+    const Case cases[] = {
+        {"/photo", "alice", 2, 0},
+        {"/photo/x/../y", "bob", 1, 0},
+        {"/photo", "carol", 0, 0},
+        {"/mixed", "bob", 0, 5},
+        {"/mixed", "alice", 2, 5},
+        {"/mixed", "carol", 0, 0},  // an administrator: no privilege by membership, but no mask either
+        {"/drop", "carol", 2, 0},
+        {"/mixed", "CORP\\eve", 2, 5},  // without a session the lists judge
+        {"/mixed", "fay@corp", 1, 5},
+        {"/view", "bob", 1, 4},
+        {"photo/x", "alice", 2, 0},
+    };
+    for (const Case& c : cases) {
+        const Answer out = ask(c.path, c.user);
+        EXPECT_EQ(out.result, 0) << c.path << " " << c.user;
+        EXPECT_EQ(out.privilege, c.privilege) << c.path << " " << c.user;
+        EXPECT_EQ(out.mask, c.mask) << c.path << " " << c.user;
+    }
+    int privilege = 99;
+    EXPECT_EQ(OrvLibGetPrivilege("/photo", "bob", nullptr, &privilege, nullptr), 0);
+    EXPECT_EQ(privilege, 1);
+}
+
+TEST_F(PrivilegeTest, RefusedLookups) {
+    struct Case {
+        const char* path;
+        const char* user;
+        int code;
+        Texts log;
+    };
+    const Case cases[] = {
+        {nullptr, "alice", 401, {"orveldir(#): bad parameter!"}},
+        {"photo", "alice", 401, {"orveldir(#): bad path name=photo", "orveldir(#): OrvLibGetTokOfPath photo fail"}},
+        {"/", "alice", 401, {"orveldir(#) error path", "orveldir(#): OrvLibGetTokOfPath / fail"}},
+        {"/no\nne/x", "alice", 408, {"orveldir(#): VEXOShareGet no\\x0Ane fail"}},
+        {"/home", "alice", 408, {"orveldir(#): VEXOShareGet home fail"}},
+    };
+    for (const Case& c : cases) {
+        OrvLibSetErr(0);
+        const Answer out = ask(c.path, c.user);
+        EXPECT_EQ(out.result, -1);
+        EXPECT_EQ(out.privilege, -1);
+        EXPECT_EQ(out.mask, 99);
+        EXPECT_EQ(OrvLibGetErr(), c.code);
+        EXPECT_EQ(takeLogTexts(), c.log);
+    }
+    int mask = 99;
+    EXPECT_EQ(OrvLibGetPrivilege("/photo", "alice", nullptr, nullptr, &mask), -1);
+    EXPECT_EQ(takeLogTexts(), Texts{"orveldir(#): bad parameter!"});
+}
+
+TEST_F(PrivilegeTest, TheAdministratorQuestionComesFirst) {
+    struct Case {
+        const char* path;
+        const char* user;
+        const char* log;
+    };
+    const Case cases[] = {{nullptr, nullptr, "VEXOGroupIsAdminGroupMem((null)) failed. [0x0D00 "},
+                          {"/photo", "nobody-here", "VEXOGroupIsAdminGroupMem(nobody-here) failed. [0x1D00 "},
+                          {nullptr, "nobody-here", "VEXOGroupIsAdminGroupMem(nobody-here) failed. [0x1D00 "}};
+    for (const Case& c : cases) {
+        EXPECT_EQ(ask(c.path, c.user).result, -1);
+        EXPECT_EQ(OrvLibGetErr(), 401);
+        const Texts log = takeLogTexts();
+        ASSERT_EQ(log.size(), 1U);
+        EXPECT_TRUE(log[0].starts_with(std::string("orveldir:# ") + c.log)) << log[0];
+        EXPECT_TRUE(log[0].ends_with("]")) << log[0];
+    }
+    EXPECT_EQ(vexo::gate::calls("VEXOShareGet"), 0);
+}
+
+TEST_F(PrivilegeTest, DomainAndDirectoryUsersWithASession) {
+    for (const char* user : {"CORP\\eve", "fay@corp"}) {
+        const bool domain = user[0] == 'C';
+        const char* service = domain ? "VexoCgiDomGetPrivilege" : "VexoCgiLDAPGetPrivilege";
+        vexo::gate::reset();
+        EXPECT_EQ(ask("/mixed", user, "sid").privilege, domain ? 2 : 1) << user;
+        EXPECT_EQ(vexo::gate::calls(service), 1);
+        vexo::gate::fail(service, VEXO_ERR_GENERAL);
+        const Answer out = ask("/mixed", user, "sid");
+        EXPECT_EQ(out.result, -1);
+        EXPECT_EQ(out.privilege, -1);
+        EXPECT_EQ(OrvLibGetErr(), 402);
+    }
+    vexo::gate::reset();
+    EXPECT_EQ(ask("/photo", "alice", "sid").privilege, 2) << "a local user never asks a service";
+    EXPECT_EQ(vexo::gate::calls("VexoCgiDomGetPrivilege") + vexo::gate::calls("VexoCgiLDAPGetPrivilege"), 0);
+}
+
+TEST_F(PrivilegeTest, HasPrivilegeIsExact) {
+    EXPECT_EQ(OrvLibHasPrivilege("/photo", "alice", nullptr, 2), 1);
+    EXPECT_EQ(OrvLibHasPrivilege("/photo", "alice", nullptr, 1), 0);
+    OrvLibSetErr(408);
+    EXPECT_EQ(OrvLibHasPrivilege("/photo", "bob", nullptr, 1), 1);
+    EXPECT_EQ(OrvLibGetErr(), 0);
+
+    EXPECT_EQ(OrvLibHasPrivilege(nullptr, "alice", nullptr, 1), -1);
+    EXPECT_EQ(OrvLibGetErr(), 401);
+    EXPECT_EQ(takeLogTexts(), Texts{"orveldir(#): bad parameter! username=alice, path=(null)"});
+    EXPECT_EQ(OrvLibHasPrivilege("/none", "alice", nullptr, 0), -1);
+    EXPECT_EQ(OrvLibGetErr(), 408);
+    EXPECT_EQ(takeLogTexts(),
+              (Texts{"orveldir(#): VEXOShareGet none fail", "orveldir(#): failed to get privilege of alice at /none"}));
+}
+
+TEST_F(PrivilegeTest, ListingAndDownloading) {
+    const Texts refused = {"orveldir:# No privilege in path "};
+    struct Case {
+        const char* path;
+        const char* user;
+        bool list, download;
+    };
+    const Case cases[] = {
+        {"/photo/x", "alice", true, true}, {"/photo", "bob", true, true},   {"/photo", "carol", false, false},
+        {"/quiet", "bob", false, false},   {"/quiet", "carol", true, true}, {"/view", "bob", true, false},
+        {"/drop", "bob", true, true},      {"/mixed", "bob", false, false},
+    };
+    for (const Case& c : cases) {
+        OrvLibSetErr(7);
+        EXPECT_EQ(CheckShareListPrivilege(c.user, nullptr, c.path), c.list) << c.path << c.user;
+        EXPECT_EQ(OrvLibGetErr(), 7) << "a refused listing sets no code";
+        const std::string line = refused[0] + c.path;
+        EXPECT_EQ(takeLogTexts(), c.list ? Texts{} : Texts{line});
+        EXPECT_EQ(CheckShareDownloadPrivilege(c.user, nullptr, c.path), c.download) << c.path << c.user;
+        EXPECT_EQ(OrvLibGetErr(), c.download ? 7 : 407);
+        EXPECT_EQ(takeLogTexts(), c.download ? Texts{} : Texts{line});
+    }
+}
+
+TEST_F(PrivilegeTest, ListingAndDownloadingAtTheEdges) {
+    for (const auto check : {CheckShareListPrivilege, CheckShareDownloadPrivilege}) {
+        const bool list = check == CheckShareListPrivilege;
+        OrvLibSetErr(7);
+        vexo::gate::reset();
+        for (const char* home : {"home", "/home", "/home/x"}) EXPECT_TRUE(check(nullptr, nullptr, home));
+        EXPECT_EQ(vexo::gate::calls("*"), 0) << "homes ask nothing";
+        EXPECT_FALSE(check("alice", nullptr, nullptr));
+        EXPECT_EQ(OrvLibGetErr(), list ? 7 : 400);
+        EXPECT_EQ(takeLogTexts(), Texts{});
+        EXPECT_FALSE(check("alice", nullptr, "/none"));
+        EXPECT_EQ(OrvLibGetErr(), 408);
+        EXPECT_EQ(takeLogTexts(), (Texts{"orveldir(#): VEXOShareGet none fail",
+                                         "orveldir:# Gailed to check privilege of path /none, reason=[408] "}));
+    }
+}
+
+TEST_F(PrivilegeTest, Uploads) {
+    for (const char* share : {"photo", "drop", "quiet"}) support::writeFile(shareRoot(share) + "/there", "x");
+    struct Case {
+        const char* path;
+        const char* user;
+        int mode;
+        bool granted;
+        int modeAfter, code;
+        Texts log;
+    };
+    const Case cases[] = {
+        {"/photo/new", "alice", 0, true, 0, 7, {}},
+        {"/photo/there", "alice", 1, true, 1, 7, {}},
+        {"/photo/there", "alice", 0, false, 0, 414, {"orveldir:# Share no modify privilege, path=/photo/there"}},
+        {"/photo/new", "bob", 0, false, 0, 407, {"orveldir:# Share no upload privilege, path=/photo/new"}},
+        {"/photo/new", "bob", 2, false, 2, 407, {"orveldir:# Share no upload privilege, path=/photo/new"}},
+        {"/drop/there", "alice", 0, true, 2, 7, {}},
+        {"/quiet/there", "alice", 1, true, 2, 7, {}},
+        {"/quiet/there", "carol", 1, true, 1, 7, {}},  // an administrator is free of the mask
+        {"/drop/there", "bob", 0, false, 0, 407, {"orveldir:# Share no upload privilege, path=/drop/there"}},
+        {"/none/x",
+         "alice",
+         0,
+         false,
+         0,
+         408,
+         {"orveldir(#): VEXOShareGet none fail", "orveldir:# Failed to get privilege, path= /none/x, reason=[408] "}},
+        {nullptr, "alice", 0, false, 0, 400, {}},
+        {"/home/x", nullptr, 0, false, 0, 400, {"orveldir:# Failed to get path info:/home/x, reason=[190]"}},
+        {"/home/x", nullptr, 2, true, 2, 7, {}},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(std::string(c.path != nullptr ? c.path : "null") + " mode " + std::to_string(c.mode));
+        OrvLibSetErr(7);
+        auto mode = static_cast<_tag__type_>(c.mode);
+        EXPECT_EQ(CheckShareUploadPrivilege(c.user, nullptr, c.path, mode), c.granted);
+        EXPECT_EQ(mode, c.modeAfter);
+        EXPECT_EQ(OrvLibGetErr(), c.code);
+        EXPECT_EQ(takeLogTexts(), c.log);
+    }
+}
+
+TEST_F(PrivilegeTest, UploadsIntoTheHome) {
+    support::writeFile(shareRoot("homes") + "/bob/there", "x");
+    auto mode = OVERWRITE_MODE_ERROR;
+    EXPECT_TRUE(CheckShareUploadPrivilege("bob", nullptr, "/home/new", mode));
+    EXPECT_FALSE(CheckShareUploadPrivilege("bob", nullptr, "/home/there", mode));
+    EXPECT_EQ(OrvLibGetErr(), 414);
+    EXPECT_EQ(vexo::gate::calls("VEXOGroupIsAdminGroupMem"), 0) << "no share privilege is asked";
+    takeLogTexts();
+}
+
+// A fault never gives more than the user has, and always leaves a code when it is one.
+TEST_F(PrivilegeTest, LookupUnderEveryFault) {
+    struct Case {
+        const char* user;
+        const char* sid;
+        int privilege;
+    };
+    for (const Case& c : {Case{"alice", nullptr, 2}, Case{"CORP\\eve", "sid", 2}, Case{"carol", nullptr, 0}}) {
+        const int faults = support::sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
+            OrvLibSetErr(0);
+            const Answer out = ask("/mixed/x", c.user, c.sid);
+            if (out.result == 0) {
+                EXPECT_LE(out.privilege, c.privilege);
+            } else {
+                EXPECT_NE(nth, 0);
+                EXPECT_EQ(out.privilege, -1);
+                EXPECT_EQ(out.mask, 99);
+                const int code = OrvLibGetErr();
+                EXPECT_TRUE(code == 401 || code == 402 || code == 408) << code;
+            }
+        });
+        EXPECT_GE(faults, 4) << c.user;
+    }
+}
+
+TEST_F(PrivilegeTest, Explanations) {
+    PrivilegeReason reason;
+    support::writeFile(shareRoot("mixed") + "/a", "x");
+    addMount(shareRoot("view"), "nfs", "ro");
+    ASSERT_TRUE(ExplainPrivilege("/mixed/a", "bob", nullptr, reason));
+    EXPECT_EQ(reason.rule, PrivilegeRule::kNoAccess);
+    EXPECT_TRUE(reason.inNoAccessList && reason.inReadWriteList && !reason.inReadOnlyList);
+    EXPECT_EQ(reason.privilege, 0);
+    EXPECT_EQ(reason.shareName, "mixed");
+    EXPECT_EQ(reason.shareRoot, shareRoot("mixed"));
+    EXPECT_EQ(reason.realPath, shareRoot("mixed") + "/a");
+    EXPECT_EQ(reason.shareMask, 5U);
+    EXPECT_EQ(reason.effectiveMask, 5U);
+    EXPECT_EQ(reason.fsType, "ext4");
+    EXPECT_TRUE(reason.exists);
+    EXPECT_FALSE(reason.remote || reason.readOnly);
+    EXPECT_EQ(reason.aclBits, GetACLPrivilege(reason.realPath.c_str()));
+
+    ASSERT_TRUE(ExplainPrivilege("/drop/none", "carol", nullptr, reason));
+    EXPECT_TRUE(reason.administrator);
+    EXPECT_EQ(reason.rule, PrivilegeRule::kReadWrite);
+    EXPECT_EQ(reason.shareMask, 2U);
+    EXPECT_EQ(reason.effectiveMask, 0U);
+    EXPECT_FALSE(reason.exists);
+
+    ASSERT_TRUE(ExplainPrivilege("/view", "bob", nullptr, reason));
+    EXPECT_TRUE(reason.remote && reason.readOnly);
+    EXPECT_FALSE(reason.exists) << "a server that may be dead is not asked";
+
+    ASSERT_TRUE(ExplainPrivilege("/mixed", "fay@corp", "sid", reason));
+    EXPECT_EQ(reason.rule, PrivilegeRule::kService);
+    EXPECT_EQ(reason.privilege, 1);
+
+    support::makeFolder(shareRoot("homes") + "/alice");
+    ASSERT_TRUE(ExplainPrivilege("/home/x", "alice", nullptr, reason));
+    EXPECT_EQ(reason.rule, PrivilegeRule::kHome);
+    EXPECT_EQ(reason.shareRoot, shareRoot("homes") + "/alice");
+
+    EXPECT_FALSE(ExplainPrivilege("/none", "alice", nullptr, reason));
+    EXPECT_EQ(OrvLibGetErr(), 408);
+    EXPECT_FALSE(ExplainPrivilege(nullptr, "alice", nullptr, reason));
+    EXPECT_EQ(OrvLibGetErr(), 401);
+    takeLogTexts();
+}
+
+}  // namespace

@@ -1,0 +1,97 @@
+#include <algorithm>
+
+#include "fault_gate.h"
+#include "orvel/error_state.h"
+#include "orvel/privilege.h"
+#include "support/appliance.h"
+#include "support/fault_sweep.h"
+#include "support/log_texts.h"
+#include "vexo/error.h"
+
+namespace {
+
+using Texts = std::vector<std::string>;
+using support::takeLogTexts;
+
+class ShareListTest : public support::ApplianceTest {
+ protected:
+    void SetUp() override {
+        ApplianceTest::SetUp();
+        addShare("Zoo", "write list = alice\nread list = bob\n");
+        addShare("attic", "read list = alice, bob\n");
+        addShare("barn", "write list = alice\nbrowseable = no\n");
+        addShare("cave", "invalid users = alice\nwrite list = alice, bob\n");
+        addShare("dune", "write list = fay@corp\n");
+    }
+    static Texts names(PVLIBCSZLIST list) {
+        Texts out;
+        for (int i = 0; list != nullptr && i < list->nItem; ++i) out.emplace_back(VLIBCSzListGet(list, i));
+        VLIBCSzListFree(list);
+        return out;
+    }
+};
+
+TEST_F(ShareListTest, OnlyTheListsDecide) {
+    struct Case {
+        const char* user;
+        int sort, writable;
+        Texts names;
+    };
+    const Case cases[] = {
+        {"alice", 0, 0, {"photo", "homes", "Zoo", "attic"}},
+        {"alice", 1, 0, {"attic", "homes", "photo", "Zoo"}},
+        {"alice", 7, 1, {"homes", "photo", "Zoo"}},
+        {"bob", 1, 0, {"attic", "cave", "homes", "photo", "Zoo"}},
+        {"bob", 0, 1, {"homes", "cave"}},
+        {"carol", 0, 0, {"homes"}},  // an administrator is nothing special here
+        {"fay@corp", 0, 0, {"dune"}},
+        {"unknown", 0, 0, {}},
+        {"", 0, 0, {}},
+    };
+    for (const Case& c : cases) {
+        OrvLibSetErr(7);
+        const PVLIBCSZLIST list = OrvLibValidShareGen(c.user, c.sort, c.writable);
+        EXPECT_NE(list, nullptr);
+        EXPECT_EQ(names(list), c.names) << c.user << c.sort << c.writable;
+        EXPECT_EQ(OrvLibGetErr(), 0);
+    }
+}
+
+TEST_F(ShareListTest, Failures) {
+    EXPECT_EQ(OrvLibValidShareGen(nullptr, 0, 0), nullptr);
+    EXPECT_EQ(OrvLibGetErr(), 401);
+    EXPECT_EQ(takeLogTexts(), Texts{"orveldir(#) bad parameter"});
+    struct Case {
+        const char* operation;
+        Texts log;
+    };
+    const Case cases[] = {{"VLIBCSzListAlloc", {"orveldir(#) malloc fail"}},
+                          {"VEXOShareDBOpen", {"orveldir:# VEXOShareDBOpenFile Error[8100]\n"}},
+                          {"VLIBCSzListPush", {}}};
+    for (const Case& c : cases) {
+        OrvLibSetErr(0);
+        vexo::gate::reset();
+        vexo::gate::fail(c.operation, VEXO_ERR_GENERAL, 0, 1);
+        EXPECT_EQ(OrvLibValidShareGen("alice", 1, 0), nullptr) << c.operation;
+        EXPECT_EQ(OrvLibGetErr(), 401);
+        EXPECT_EQ(takeLogTexts(), c.log);
+    }
+}
+
+// A share that is not the user's never shows, whatever fails.
+TEST_F(ShareListTest, EnumerationUnderEveryFault) {
+    const Texts whole = {"photo", "homes", "Zoo", "attic"};
+    const int faults = support::sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
+        OrvLibSetErr(7);
+        const PVLIBCSZLIST list = OrvLibValidShareGen("alice", 0, 0);
+        EXPECT_EQ(OrvLibGetErr(), list == nullptr ? 401 : 0);
+        const Texts got = names(list);
+        for (const std::string& name : got) EXPECT_NE(std::find(whole.begin(), whole.end(), name), whole.end()) << name;
+        if (nth == 0) {
+            EXPECT_EQ(got, whole);
+        }
+    });
+    EXPECT_GE(faults, 4);
+}
+
+}  // namespace

@@ -1,0 +1,331 @@
+#include "orvel/share_path.h"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <climits>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+
+#include "fault_gate.h"
+#include "orvel/error_state.h"
+#include "support/appliance.h"
+#include "support/fault_sweep.h"
+#include "support/log_texts.h"
+#include "vexo/error.h"
+
+namespace {
+
+using Texts = std::vector<std::string>;
+using support::takeLogTexts;
+
+struct Resolved {
+    int result = -1;
+    std::string real = "unset", share = "unset", volume = "unset", root = "unset";
+};
+
+Resolved resolve(const char* path, const std::string& user) {
+    Resolved out;
+    out.result = OrvFullPathGet(path, out.real, out.share, out.volume, out.root, user);
+    return out;
+}
+
+class SharePathTest : public support::ApplianceTest {};
+
+TEST_F(SharePathTest, Components) {
+    const std::string deep = "/" + std::string(4093, 'a') + "bc";
+    struct Case {
+        std::string path;
+        const char* first;
+        const char* last;
+        Texts log;
+    };
+    const Case cases[] = {
+        {"/a/b/c", "a", "c", {}},
+        {"//a//b//", "a", "b", {}},
+        {"a/b", "a", "b", {}},
+        {"/\xff\xfe/..", "\xff\xfe", "..", {}},
+        {"/only", "only", "only", {}},
+        {"photo", nullptr, nullptr, {"orveldir(#): bad path name=photo"}},
+        {"", nullptr, nullptr, {"orveldir(#): bad path name="}},
+        {"/", nullptr, nullptr, {"orveldir(#) error path"}},
+        {"//", nullptr, nullptr, {"orveldir(#) error path"}},
+    };
+    for (const Case& c : cases) {
+        for (const int first : {1, 0}) {
+            std::string path = c.path;
+            const std::unique_ptr<char, decltype(&free)> found(OrvLibGetTokOfPath(path.data(), first), free);
+            EXPECT_STREQ(found.get(), first != 0 ? c.first : c.last) << c.path;
+            EXPECT_EQ(path, c.path) << "the argument stays";
+            EXPECT_EQ(takeLogTexts(), c.log);
+        }
+    }
+    std::string path = deep;
+    const std::unique_ptr<char, decltype(&free)> cut(OrvLibGetTokOfPath(path.data(), 1), free);
+    EXPECT_EQ(std::string(cut.get()), std::string(4093, 'a')) << "4,094 bytes are split";
+    EXPECT_EQ(OrvLibGetTokOfPath(nullptr, 1), nullptr);
+    EXPECT_EQ(takeLogTexts(), Texts{"orveldir(#): bad parameter!"});
+    vexo::gate::fail("VLIBCSzListAlloc", 0x8100);
+    EXPECT_EQ(OrvLibGetTokOfPath(path.data(), 1), nullptr);
+    EXPECT_EQ(takeLogTexts(), Texts{"orveldir(#): VLIBCSzListAlloc() failed!"});
+    EXPECT_EQ(OrvLibGetErr(), 0);
+}
+
+TEST_F(SharePathTest, SharesResolve) {
+    const std::string root = shareRoot("photo"), longRest = "/" + std::string(5000, 'x');
+    struct Case {
+        std::string path, rest;
+    };
+    const Case cases[] = {
+        {"/photo", ""},
+        {"/photo/2012/a.jpg", "/2012/a.jpg"},
+        {"/photo/", "/"},
+        {"//photo/a", "/a"},
+        {"photo/a", "/a"},
+        {"/photo//a/../b/./", "//a/../b/./"},
+        {"/photo/\xff\n", "/\xff\n"},
+        {"/photo" + longRest, longRest},
+    };
+    for (const Case& c : cases) {
+        const Resolved out = resolve(c.path.c_str(), "alice");
+        EXPECT_EQ(out.result, 1) << c.path;
+        EXPECT_EQ(out.real, root + c.rest);
+        EXPECT_EQ(out.share, "photo");
+        EXPECT_EQ(out.root, root);
+        EXPECT_EQ(out.volume, "/tmp");
+    }
+    EXPECT_EQ(resolve("/homes/alice/docs", "bob").real, shareRoot("homes") + "/alice/docs");
+    EXPECT_NE(access((shareRoot("homes") + "/alice").c_str(), F_OK), 0) << "an ordinary share here";
+}
+
+TEST_F(SharePathTest, RefusedPaths) {
+    struct Case {
+        const char* path;
+        const char* user;
+        int code;
+        const char* share;  // what the output holds afterwards
+        Texts log;
+    };
+    const Texts noComponent = {"orveldir:# OrvLibGetTokOfPath fail"};
+    const Case cases[] = {
+        {nullptr, "alice", 400, "unset", {}},
+        {"", "alice", 400, "unset", {}},
+        {"/photo", "", 400, "unset", {}},
+        {"photo", "alice", 401, "unset", {"orveldir(#): bad path name=photo", noComponent[0]}},
+        {"//", "alice", 401, "unset", {"orveldir(#) error path", noComponent[0]}},
+        {"/nowhere/x", "alice", 408, "nowhere", {"orveldir:# VEXOShareGet fail"}},
+        {"/home",
+         "nobody",
+         403,
+         "home",
+         {"orveldir:# Failed to get user (nobody)", "orveldir:# OrvUserHomeFullPathGet fail"}},
+    };
+    for (const Case& c : cases) {
+        const Resolved out = resolve(c.path, c.user);
+        EXPECT_EQ(out.result, 0);
+        EXPECT_EQ(OrvLibGetErr(), c.code) << c.log.size();
+        EXPECT_EQ(out.share, c.share);
+        EXPECT_EQ(out.real, "unset");
+        EXPECT_EQ(takeLogTexts(), c.log);
+    }
+    vexo::gate::fail("VEXOShareGet", 0x8100);
+    EXPECT_EQ(resolve("/photo", "alice").result, 0);
+    EXPECT_EQ(OrvLibGetErr(), 401) << "a share that is there, but cannot be read";
+    EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# VEXOShareGet fail"});
+}
+
+TEST_F(SharePathTest, HomeIsMadeOnFirstUse) {
+    SKIP_WITHOUT_ROOT();
+    const std::string home = shareRoot("homes") + "/alice";
+    const Resolved out = resolve("/home/docs", "alice");
+    EXPECT_EQ(out.result, 1);
+    EXPECT_EQ(out.real, home + "/docs");
+    EXPECT_EQ(out.share, "home");
+    EXPECT_EQ(out.root, home);
+    EXPECT_EQ(out.volume, "/tmp");
+    struct stat status {};
+    ASSERT_EQ(stat(home.c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777, 0755U);
+    EXPECT_EQ(status.st_uid, support::kAliceUid);
+    EXPECT_EQ(status.st_gid, support::kUsersGid);
+}
+
+TEST_F(SharePathTest, HomeIsCanonicalAndAnExistingOneStays) {
+    const std::string place = shareRoot("photo") + "/elsewhere", home = shareRoot("homes") + "/alice";
+    support::makeFolder(place, 0700);
+    support::makeFolder(home, 0711);
+    std::string path = "before";
+    EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 1);
+    EXPECT_EQ(path, home);
+    struct stat status {};
+    ASSERT_EQ(stat(home.c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777, 0711U);
+    EXPECT_EQ(status.st_uid, geteuid());
+    ASSERT_EQ(rmdir(home.c_str()), 0);
+    ASSERT_EQ(symlink(place.c_str(), home.c_str()), 0);
+    EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 1);
+    EXPECT_EQ(path, place);
+}
+
+TEST_F(SharePathTest, HomeThatCannotBeHad) {
+    const std::string home = shareRoot("homes") + "/alice";
+    std::string path = "before";
+    support::writeFile(home, "a file stands in the way");
+    EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 0);
+    EXPECT_EQ(OrvLibGetErr(), 408);
+    const std::string start = "orveldir:# Fail to mkdir for home [" + home + "]. (stop at ";
+    EXPECT_EQ(takeLogTexts(), Texts{start + "alice): Not a directory"});
+
+    ASSERT_EQ(unlink(home.c_str()), 0);
+    support::makeFolder(home);
+    vexo::gate::fail("VEXOFSMkdirP", 0x8100, EROFS);
+    EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 0);
+    EXPECT_EQ(takeLogTexts(), Texts{start + "(null)): Read-only file system"});
+    vexo::gate::reset();
+
+    setSetting("userhome_enable", "no");
+    EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 0);
+    EXPECT_EQ(OrvLibGetErr(), 408);
+    EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# 20001, User home isn't enalbed"});
+    EXPECT_EQ(path, "before");
+}
+
+TEST_F(SharePathTest, CanonicalPaths) {
+    const std::string root = shareRoot("photo");
+    support::makeFolder(root + "/a");
+    support::writeFile(root + "/file", "x");
+    ASSERT_EQ(symlink("a", (root + "/link").c_str()), 0);
+    char resolved[PATH_MAX];
+    EXPECT_EQ(OrvLibRealFullPathGet((root + "//link/./../a").c_str(), resolved, 1), 1);
+    EXPECT_EQ(std::string(resolved), root + "/a");
+
+    struct Case {
+        std::string path;
+        int failure, code;
+    };
+    const Case cases[] = {{root + "/none", ENOENT, 408},
+                          {root + "/file/x", ENOTDIR, 401},
+                          {"/" + std::string(5000, 'x'), ENAMETOOLONG, 401},
+                          {"", ENOENT, 408}};
+    for (const Case& c : cases) {
+        EXPECT_EQ(OrvLibRealFullPathGet(c.path.c_str(), resolved, 4095), 0);
+        EXPECT_EQ(errno, c.failure);
+        EXPECT_EQ(OrvLibGetErr(), c.code) << c.path;
+        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# readpath(" + c.path + ") fail (" + strerror(c.failure) + ")"});
+    }
+    OrvLibSetErr(0);
+    EXPECT_EQ(OrvLibRealFullPathGet(root.c_str(), resolved, 0), 0);
+    EXPECT_EQ(OrvLibRealFullPathGet(root.c_str(), nullptr, 4095), 0);
+    EXPECT_EQ(OrvLibRealFullPathGet(nullptr, resolved, 4095), 0);
+    EXPECT_EQ(OrvLibGetErr(), 400);
+}
+
+TEST_F(SharePathTest, DeniedCanonicalPath) {
+    SKIP_WITHOUT_ROOT();
+    support::makeFolder(shareRoot("photo") + "/closed/x", 0755);
+    ASSERT_EQ(chmod((shareRoot("photo") + "/closed").c_str(), 0700), 0);
+    support::asUser(support::kBobUid, support::kUsersGid, [&] {
+        char resolved[PATH_MAX];
+        EXPECT_EQ(OrvLibRealFullPathGet((shareRoot("photo") + "/closed/x").c_str(), resolved, 4095), 0);
+        EXPECT_EQ(OrvLibGetErr(), 407);
+        support::takeLog();
+        return 0;
+    });
+}
+
+TEST_F(SharePathTest, TranslationFillsAtMostOneByteLess) {
+    const std::string full = shareRoot("photo") + "/2012/a.jpg";
+    char path[] = "/photo/2012/a.jpg";
+    for (const int size : {-1, 0, 1, 2, 3, 10, static_cast<int>(full.size()), static_cast<int>(full.size()) + 1,
+                           static_cast<int>(full.size()) + 2, 4096}) {
+        std::vector<char> out(5000, '#');
+        EXPECT_EQ(OrvLibTransFullPath(path, out.data(), size), 0);
+        const std::string whole(out.begin(), out.end());
+        if (size < 2) {
+            EXPECT_EQ(whole, std::string(5000, '#')) << size;
+            continue;
+        }
+        const std::string kept = full.substr(0, static_cast<size_t>(size) - 2);
+        EXPECT_EQ(whole.substr(0, kept.size() + 2), kept + '\0' + '#') << size;
+    }
+    EXPECT_EQ(OrvLibGetErr(), 0);
+}
+
+TEST_F(SharePathTest, TranslationsThatFail) {
+    char out[100] = "out", missing[] = "/nowhere/x", slashes[] = "//", home[] = "/home/a";
+    struct Case {
+        char* path;
+        char* out;
+        int platform;
+        Texts log;
+    };
+    const Case cases[] = {
+        {nullptr, out, 0x0D00, {"orveldir(#) bad parameter, oldpath=(null), new path=out"}},
+        {missing, nullptr, 0x0D00, {"orveldir(#) bad parameter, oldpath=/nowhere/x, new path=(null)"}},
+        {slashes, out, 0x8100, {"orveldir(#) error path", "orveldir(#) OrvLibGetTokOfPath fail"}},
+        {missing, out, 0x1400, {}},
+        {home, out, 0x1400, {}},
+    };
+    for (const Case& c : cases) {
+        VLIBCErrSetEx(0, "", 0);
+        EXPECT_EQ(OrvLibTransFullPath(c.path, c.out, sizeof out), -1);
+        EXPECT_EQ(VLIBCErrGet(), c.platform);
+        EXPECT_EQ(takeLogTexts(), c.log);
+        EXPECT_STREQ(out, "out");
+    }
+    vexo::gate::fail("VEXOShareGet", 0x8100);
+    char photo[] = "/photo";
+    EXPECT_EQ(OrvLibTransFullPath(photo, out, sizeof out), -1);
+    EXPECT_EQ(VLIBCErrGet(), 0x1400) << "whatever the look-up said";
+    EXPECT_EQ(OrvLibGetErr(), 0);
+}
+
+TEST_F(SharePathTest, EncryptedShares) {
+    addShare("secret", "valid users = alice\nvexo:encrypted = yes\n");
+    struct Case {
+        const char* share;
+        int result;
+        bool encrypted;
+        int code;
+        Texts log;
+    };
+    const Case cases[] = {{"secret", 1, true, 0, {}},
+                          {"photo", 1, false, 0, {}},
+                          {"home", 1, false, 0, {}},
+                          {"/home/x", 1, false, 0, {}},
+                          {"none", 0, false, 408, {"orveldir:# VEXOShareGet fail none"}}};
+    for (const Case& c : cases) {
+        OrvLibSetErr(0);
+        bool encrypted = true;
+        EXPECT_EQ(OrvLibCheckEncryptShare(c.share, &encrypted), c.result) << c.share;
+        EXPECT_EQ(encrypted, c.encrypted) << c.share;
+        EXPECT_EQ(OrvLibGetErr(), c.code) << c.share;
+        EXPECT_EQ(takeLogTexts(), c.log);
+    }
+    EXPECT_EQ(OrvLibCheckEncryptShare("photo", nullptr), 0);
+}
+
+// Whatever fails, the result is either right or a failure with a code, and nothing is kept open.
+TEST_F(SharePathTest, ResolutionUnderEveryFault) {
+    const std::string home = shareRoot("homes") + "/alice";
+    support::makeFolder(home);
+    for (const char* path : {"/photo/x", "/home/x"}) {
+        const std::string expected = path[1] == 'p' ? shareRoot("photo") + "/x" : home + "/x";
+        const int faults = support::sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
+            OrvLibSetErr(0);
+            const Resolved out = resolve(path, "alice");
+            if (out.result == 1) {
+                EXPECT_EQ(out.real, expected);
+            } else {
+                EXPECT_NE(nth, 0);
+                EXPECT_EQ(out.real, "unset");
+                const int code = OrvLibGetErr();
+                EXPECT_TRUE(code == 401 || code == 403 || code == 408) << code;
+            }
+        });
+        EXPECT_GE(faults, 3) << path;
+    }
+}
+
+}  // namespace

@@ -1,0 +1,210 @@
+#include "orvel/file_info.h"
+
+#include <gtest/gtest.h>
+#include <json/value.h>
+#include <json/writer.h>
+
+#include <cstdint>
+#include <limits>
+
+#include "orvel/dir_entry.h"
+
+namespace {
+
+std::string compact(const Json::Value& value) {
+    Json::StreamWriterBuilder builder;
+    builder["indentation"] = "";
+    builder["emitUTF8"] = true;
+    return Json::writeString(builder, value);
+}
+
+DIRENTRY_INFO sample() {
+    DIRENTRY_INFO info;
+    info.name = "a.jpg";
+    info.path = "/photo/a.jpg";
+    info.realPath = "/volume1/photo/a.jpg";
+    info.type = "JPG";
+    info.size = 12;
+    info.mode = 0100644;
+    info.aclPrivilege = 0x20F;
+    info.isAclMode = 1;
+    info.mtime = 1;
+    info.ctime = 2;
+    info.crtime = 3;
+    info.atime = std::numeric_limits<uint32_t>::max();
+    info.uid = 20001;
+    info.owner = "alice";
+    info.gid = std::numeric_limits<uint32_t>::max();
+    info.group = "users";
+    info.mountPointType = "iso";
+    info.freeSpace = 4096;
+    info.totalSpace = std::numeric_limits<uint64_t>::max();
+    info.readOnly = true;
+    return info;
+}
+
+TEST(FileInfo, EachBitGivesItsMember) {
+    struct Case {
+        int bits;
+        const char* additional;  // null: no such member
+    };
+    const Case cases[] = {
+        {0, nullptr},
+        {0x100, nullptr},
+        {0x01, R"({"real_path":"/volume1/photo/a.jpg"})"},
+        {0x02, R"({"size":12.0})"},
+        {0x04, R"({"owner":{"gid":4294967295,"group":"users","uid":20001,"user":"alice"}})"},
+        {0x08, R"({"time":{"atime":4294967295,"crtime":3,"ctime":2,"mtime":1}})"},
+        {0x10, R"({"perm":{"acl":{"append":true,"del":true,"exec":true,"read":true,"write":true},)"
+               R"("is_acl_mode":true,"posix":644}})"},
+        {0x20, R"({"type":"JPG"})"},
+        {0x40, R"({"mount_point_type":"iso"})"},
+        {0x80, R"({"volume_status":{"freespace":4096.0,"readonly":true,"totalspace":1.8446744073709552e+19}})"},
+    };
+    for (const Case& c : cases) {
+        Json::Value out;
+        DumpFileInfo(c.bits, sample(), out);
+        const std::string rest = R"("isdir":false,"name":"a.jpg","path":"/photo/a.jpg"})";
+        const std::string additional =
+            c.additional != nullptr ? R"("additional":)" + std::string(c.additional) + "," : std::string();
+        EXPECT_EQ(compact(out), "{" + additional + rest) << c.bits;
+    }
+}
+
+TEST(FileInfo, ReadAndWriteShowOneBit) {
+    for (unsigned bit = 1; bit < 0x2000; bit <<= 1) {
+        DIRENTRY_INFO info = sample();
+        info.aclPrivilege = bit;
+        info.isAclMode = 0;
+        Json::Value out;
+        DumpFileInfo(ADDITIONAL_PERM, info, out);
+        const Json::Value& perm = out["additional"]["perm"];
+        EXPECT_FALSE(perm["is_acl_mode"].asBool());
+        const Json::Value& acl = perm["acl"];
+        EXPECT_EQ(acl["exec"].asBool(), bit == 0x1) << bit;
+        EXPECT_EQ(acl["write"].asBool(), bit == 0x4) << bit;
+        EXPECT_EQ(acl["read"].asBool(), bit == 0x4) << bit;
+        EXPECT_EQ(acl["append"].asBool(), bit == 0x8) << bit;
+        EXPECT_EQ(acl["del"].asBool(), bit == 0x200) << bit;
+    }
+}
+
+TEST(FileInfo, WhatTheCallerPutThere) {
+    Json::Value out;
+    out["name"] = "old";
+    out["mine"] = 1;
+    Json::Value& additional = out["additional"];
+    for (const char* key : {"owner", "time", "perm", "volume_status"}) additional[key]["mine"] = 2;
+    additional["perm"]["acl"]["mine"] = 3;
+    additional["other"] = 4;
+    DumpFileInfo(0xFF, sample(), out);
+    EXPECT_EQ(out["name"], "a.jpg");
+    EXPECT_EQ(out["mine"], 1);
+    EXPECT_EQ(additional["other"], 4);
+    EXPECT_EQ(additional["perm"]["mine"], 2) << "kept, the others are made anew";
+    EXPECT_FALSE(additional["perm"]["acl"].isMember("mine"));
+    for (const char* key : {"owner", "time", "volume_status"}) EXPECT_FALSE(additional[key].isMember("mine")) << key;
+
+    // Wrong kinds in the way become objects instead of an exception.
+    Json::Value clean;
+    DumpFileInfo(0xFF, sample(), clean);
+    for (Json::Value wrong : {Json::Value(), Json::Value("text"), Json::Value(5), Json::Value(Json::arrayValue)}) {
+        Json::Value additionalWrong, permWrong;
+        additionalWrong["additional"] = wrong;
+        permWrong["additional"]["perm"] = wrong;
+        for (Json::Value* value : {&wrong, &additionalWrong, &permWrong}) {
+            DumpFileInfo(0xFF, sample(), *value);
+            EXPECT_EQ(compact(*value), compact(clean));
+        }
+    }
+}
+
+void expectSameText(int bits, const DIRENTRY_INFO& info) {
+    Json::Value object;
+    DumpFileInfo(bits, info, object);
+    std::string text = "before,";
+    AppendFileInfoText(bits, info, text);
+    EXPECT_EQ(text, "before," + compact(object)) << bits;
+}
+
+TEST(FileInfoText, EqualsTheObjectsTextForEveryBitSet) {
+    for (int bits = 0; bits < 0x200; ++bits) expectSameText(bits, sample());
+    expectSameText(-1, DIRENTRY_INFO());
+}
+
+// What jsoncpp does with bytes that are no UTF-8 is to pass them on: the result is no UTF-8 either, which is why
+// callers look at names first.
+TEST(FileInfoText, EqualsTheObjectsTextForEveryName) {
+    std::string everyByte;
+    for (int byte = 0; byte < 256; ++byte) everyByte += static_cast<char>(byte);
+    const std::string names[] = {
+        "",
+        "plain",
+        "\"quoted\"",
+        "back\\slash",
+        "a/b",
+        "\n\r\t\b\f",
+        "\x7f",
+        "tab\tand \x1f",
+        std::string("\0", 1),
+        std::string("a\0b", 3),
+        "\xc3\xa9",
+        "\xe6\x97\xa5\xe6\x9c\xac",
+        "\xf0\x9f\x93\xb7",
+        "\xff\xfe\x80 broken",
+        "\xc3",
+        "\xed\xa0\x80 surrogate",
+        "\xe2\x80\xa8 </script>",
+        everyByte,
+        std::string(5000, '\1'),
+    };
+    for (const std::string& name : names) {
+        DIRENTRY_INFO info = sample();
+        for (std::string* field :
+             {&info.name, &info.path, &info.realPath, &info.type, &info.owner, &info.group, &info.mountPointType}) {
+            *field = name;
+        }
+        expectSameText(0xFF, info);
+    }
+    std::string text;
+    DIRENTRY_INFO info;
+    info.name = "\xff\xc3\"";
+    AppendFileInfoText(0, info, text);
+    EXPECT_EQ(text, "{\"isdir\":false,\"name\":\"\xff\xc3\\\"\",\"path\":\"\"}");
+}
+
+TEST(FileInfoText, EqualsTheObjectsTextForEverySize) {
+    constexpr int64_t kExact = int64_t{1} << 53;
+    const int64_t sizes[] = {0,
+                             1,
+                             -1,
+                             9,
+                             kExact - 1,
+                             kExact,
+                             kExact + 1,
+                             kExact + 3,
+                             99999999999999999,
+                             100000000000000000,  // where 17 digits end
+                             99999999999999991,
+                             100000000000000001,
+                             123456789012345678,
+                             std::numeric_limits<int64_t>::max(),
+                             std::numeric_limits<int64_t>::min(),
+                             std::numeric_limits<int64_t>::min() + 1};
+    for (const int64_t size : sizes) {
+        DIRENTRY_INFO info = sample();
+        info.size = size;
+        info.freeSpace = static_cast<uint64_t>(size);
+        info.totalSpace = static_cast<uint64_t>(size) / 3;
+        expectSameText(0xFF, info);
+    }
+    for (int shift = 0; shift < 64; ++shift) {
+        DIRENTRY_INFO info = sample();
+        info.size = static_cast<int64_t>((uint64_t{1} << shift) - 1);
+        info.mode = 1U << (shift % 32);
+        info.aclPrivilege = 1U << (shift % 32);
+        expectSameText(0xFF, info);
+    }
+}
+
+}  // namespace

@@ -1,0 +1,102 @@
+#include <json/value.h>
+
+#include "orvel/error_state.h"
+#include "orvel/file_info.h"
+#include "support/appliance.h"
+#include "support/log_texts.h"
+#include "vexo/error.h"
+
+namespace {
+
+using Texts = std::vector<std::string>;
+using support::takeLogTexts;
+
+class PathInfoTest : public support::ApplianceTest {};
+
+TEST_F(PathInfoTest, TrailingSlashesGo) {
+    for (const char* path : {"/photo/2012", "/photo/2012/", "/photo/2012///"}) {
+        PathInfo info;
+        EXPECT_TRUE(PathInfoFactory::create("alice", path, info)) << path;
+        EXPECT_EQ(info.path, "/photo/2012");
+        EXPECT_EQ(info.realPath, shareRoot("photo") + "/2012");
+        EXPECT_EQ(info.shareName, "photo");
+        EXPECT_EQ(info.volumePath, "/tmp");
+        EXPECT_EQ(info.shareRoot, shareRoot("photo"));
+        PathInfo again = info;
+        EXPECT_TRUE(PathInfoFactory::create("alice", again.path, again)) << "its own path is an argument";
+        EXPECT_EQ(again.realPath, info.realPath);
+    }
+}
+
+TEST_F(PathInfoTest, FailuresLeaveBothNumbers) {
+    struct Case {
+        const char* user;
+        const char* path;
+        int code, platform;
+        std::string kept;  // info.path afterwards
+        Texts log;
+    };
+    const Case cases[] = {
+        {nullptr, "/photo", 400, 0x0D00, "", {}},
+        {"alice", "", 400, 0x0D00, "", {}},
+        {"", "/photo", 400, 0x0D00, "/photo", {"orvelenum:# Fail to get the Full Path, /photo"}},
+        {"alice",
+         "/none//",
+         408,
+         0xBE00,
+         "/none",
+         {"orveldir:# VEXOShareGet fail", "orvelenum:# Fail to get the Full Path, /none//"}},
+        {"alice",
+         "///",
+         401,
+         0x8000,
+         "///",
+         {"orveldir(#) error path", "orveldir:# OrvLibGetTokOfPath fail",
+          "orvelenum:# Fail to get the Full Path, ///"}},
+        {"nobody",
+         "/home/x",
+         403,
+         0x8000,
+         "/home/x",
+         {"orveldir:# Failed to get user (nobody)", "orveldir:# OrvUserHomeFullPathGet fail",
+          "orvelenum:# Fail to get the Full Path, /home/x"}},
+    };
+    for (const Case& c : cases) {
+        PathInfo info;
+        EXPECT_FALSE(PathInfoFactory::create(c.user, c.path, info)) << c.path;
+        EXPECT_EQ(OrvLibGetErr(), c.code) << c.path;
+        EXPECT_EQ(VLIBCErrGet(), c.platform) << c.path;
+        EXPECT_EQ(info.path, c.kept);
+        EXPECT_EQ(info.realPath, "");
+        EXPECT_EQ(takeLogTexts(), c.log);
+    }
+}
+
+TEST_F(PathInfoTest, JoinedPaths) {
+    Json::Value paths(Json::arrayValue);
+    std::string out = "before";
+    EXPECT_TRUE(ParseJsonPathToString(paths, out));
+    EXPECT_EQ(out, "");
+    for (const char* path : {"/a/b", "x/c", "d"}) paths.append(path);
+    EXPECT_TRUE(ParseJsonPathToString(paths, out));
+    EXPECT_EQ(out, "/a/b, /c, d");
+    paths.append(5);
+    paths.append(Json::Value());
+    paths.append(Json::Value(Json::objectValue));
+    paths.append("");
+    paths.append("/\xff");
+    EXPECT_TRUE(ParseJsonPathToString(paths, out));
+    EXPECT_EQ(out, "/a/b, /c, d, , /\xff");
+
+    for (const Json::Value& wrong :
+         {Json::Value(), Json::Value("text"), Json::Value(3), Json::Value(Json::objectValue)}) {
+        out = "before";
+        OrvLibSetErr(0);
+        EXPECT_FALSE(ParseJsonPathToString(wrong, out));
+        EXPECT_EQ(out, "before");
+        EXPECT_EQ(OrvLibGetErr(), 401);
+        EXPECT_EQ(takeLogTexts(), Texts{"orvelmisc:# Wrong JSON format"});
+    }
+}
+
+}  // namespace
