@@ -1,0 +1,75 @@
+// The text of share definitions (the grammar of smb.conf) taken apart into sections. Pure: files come in as text.
+#ifndef VEXO_LINUX_SHARE_DEFINITIONS_H
+#define VEXO_LINUX_SHARE_DEFINITIONS_H
+
+#include <array>
+#include <cstddef>
+#include <functional>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace vexo {
+
+// The options that mean something here; all others are skipped.
+enum class ShareOption {
+    path,
+    available,
+    printable,
+    browseable,
+    readOnly,
+    validUsers,
+    invalidUsers,
+    readList,
+    writeList,
+    restriction,
+    encrypted,
+    index,
+    synced,
+    ftp,
+    acl,
+};
+constexpr size_t kShareOptions = static_cast<size_t>(ShareOption::acl) + 1;
+
+struct OptionValue {
+    std::string text;
+    bool stated = false;  // there is a value, be it an empty one
+    bool own = false;     // stated by the section itself, so that no `copy` replaces it
+};
+using OptionValues = std::array<OptionValue, kShareOptions>;
+
+struct DefinitionSection {
+    std::string name;  // as first written
+    OptionValues values;
+    std::string fault;  // why the section cannot be trusted to mean what its author meant; "" when it can
+    [[nodiscard]] const OptionValue& value(ShareOption option) const { return values[static_cast<size_t>(option)]; }
+};
+
+struct Definitions {
+    std::vector<DefinitionSection> sections;  // in order of their first header; [global] is not among them
+    std::vector<std::string> problems;        // what is wrong outside every section, one line of text each
+};
+
+// Gives the text of an included file, or nothing when it cannot be read.
+using IncludeReader = std::function<std::optional<std::string>(const std::string& file)>;
+
+// Sections of one name (without case) are one section. A section starts with what [global] said up to its first
+// header. An included file continues the section that includes it.
+[[nodiscard]] Definitions parseDefinitions(std::string_view text, const IncludeReader& include);
+
+// `text` without the blanks at its ends.
+[[nodiscard]] std::string_view trimmed(std::string_view text);
+
+// The entries of a list: separated by comma, semicolon and blanks, except inside double quotes. "" is an empty entry.
+[[nodiscard]] std::vector<std::string> splitList(std::string_view text);
+
+// What a boolean says ("yes", "true", "on", "1" and their opposites, without case); nothing for any other text.
+[[nodiscard]] std::optional<bool> parseBoolean(std::string_view text);
+
+// A name as it is compared without case.
+[[nodiscard]] std::string foldedName(std::string_view name);
+
+}  // namespace vexo
+
+#endif
