@@ -1,0 +1,126 @@
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <string>
+#include <vector>
+
+#include "orvel/directory_walker.h"
+#include "orvel/error_state.h"
+#include "support/appliance.h"
+#include "support/log_texts.h"
+#include "support/system_faults.h"
+
+namespace {
+
+using support::makeFolder;
+using support::writeFile;
+
+class SubDirectoriesTest : public support::ApplianceTest {
+ protected:
+    void SetUp() override {
+        ApplianceTest::SetUp();
+        root_ = shareRoot("photo");
+    }
+    // False with this code; nothing is added.
+    static void expectFailure(const std::string& path, int code) {
+        std::vector<_tag_SUBDIR_ENTRY_INFO_> found{{"kept", "/kept", 0, 0, 0, 0, 0, false, ""}};
+        OrvLibSetErr(1);
+        EXPECT_FALSE(OrvLibEnumSubDir(path, found));
+        EXPECT_EQ(OrvLibGetErr(), code) << path;
+        EXPECT_EQ(found.size(), 1U);
+    }
+
+    std::string root_;
+};
+
+TEST_F(SubDirectoriesTest, Failures) {
+    expectFailure("", 400);
+    EXPECT_EQ(support::takeLogTexts(), std::vector<std::string>{"orveldir:# Bad parameter"});
+    writeFile(root_ + "/file", "x");
+    expectFailure(root_ + "/missing", 408);
+    expectFailure(root_ + "/file", 408);
+    expectFailure(root_ + "/" + std::string(5000, 'p'), 402);
+    makeFolder(root_ + "/sub");
+    const support::ReadingFault fault(root_, EIO, 2);
+    expectFailure(root_, 402);
+}
+
+TEST_F(SubDirectoriesTest, DeniedToAnUnprivilegedUser) {
+    SKIP_WITHOUT_ROOT();
+    for (const mode_t mode : {0000, 0444, 0111}) {
+        makeFolder(root_ + "/closed", mode);
+        const auto body = [&] {
+            expectFailure(root_ + "/closed", 407);
+            return 0;
+        };
+        EXPECT_EQ(support::asUser(support::kBobUid, support::kUsersGid, body), 0);
+    }
+}
+
+TEST_F(SubDirectoriesTest, ListsFoldersSortedWithoutCase) {
+    for (const char* folder : {"/b", "/A", "/c\xFF", "/Ä", "/@tmp", "/@vexoea", "/.dot", "/B/inner"}) {
+        makeFolder(root_ + folder, 0750);
+    }
+    writeFile(root_ + "/file", "x");
+    ASSERT_EQ(symlink("A", (root_ + "/link").c_str()), 0);
+    const timespec times[2] = {{1, 0}, {1234567890, 0}};
+    ASSERT_EQ(utimensat(-1, (root_ + "/A").c_str(), times, 0), 0);
+
+    std::vector<_tag_SUBDIR_ENTRY_INFO_> found{{"ab", "elsewhere", 0, 0, 0, 0, 0, false, ""}};
+    OrvLibSetErr(1);
+    ASSERT_TRUE(OrvLibEnumSubDir(root_, found));
+    EXPECT_EQ(OrvLibGetErr(), 0);
+    std::string names;
+    for (const auto& one : found) names += (one.name == "B" ? "b" : one.name) + ",";
+    EXPECT_EQ(names, ".dot,A,ab,b,b,c\xFF,Ä,") << "what the vector held is sorted with the rest";
+
+    struct stat status;
+    ASSERT_EQ(lstat((root_ + "/A").c_str(), &status), 0);
+    const auto& folder = found[1];
+    EXPECT_EQ(folder.path, root_ + "/A");
+    EXPECT_EQ(folder.size, status.st_size);
+    EXPECT_EQ(folder.mode, S_IFDIR | 0750U);
+    EXPECT_EQ(folder.mtime, 1234567890);
+    EXPECT_TRUE(folder.uid == status.st_uid && folder.gid == status.st_gid);
+    EXPECT_TRUE(!folder.isMountPoint && folder.mountType.empty());
+
+    char now[4096];
+    EXPECT_EQ(std::string(getcwd(now, sizeof now)), root_);
+    found.clear();
+    EXPECT_TRUE(OrvLibEnumSubDir(root_ + "/A", found));
+    EXPECT_TRUE(found.empty());
+}
+
+TEST_F(SubDirectoriesTest, MountPoints) {
+    for (const char* folder : {"/disk", "/server", "/local"}) makeFolder(root_ + folder);
+    addMount(root_ + "/disk", "ext4");
+    addMount(root_ + "/server", "nfs4");
+    struct Case {
+        const char* dead;  // whose status cannot be read
+        std::string expected;
+    };
+    const Case cases[] = {
+        {"/none", "disk:ext4 local: server:nfs4 "},
+        {"/server", "disk:ext4 local: server:remotefail(0) "},
+        {"/disk", "local: server:nfs4 "},
+        {"/local", "disk:ext4 server:nfs4 "},
+    };
+    for (const Case& c : cases) {
+        const support::StatusFault fault(root_ + c.dead, EHOSTDOWN);
+        std::vector<_tag_SUBDIR_ENTRY_INFO_> found;
+        ASSERT_TRUE(OrvLibEnumSubDir(root_, found));
+        std::string text;
+        for (const auto& one : found) {
+            text += one.name + ":" + one.mountType;
+            EXPECT_EQ(one.isMountPoint, !one.mountType.empty());
+            EXPECT_EQ(one.path, root_ + "/" + one.name);
+            const bool allZero = one.size == 0 && one.mode == 0 && one.mtime == 0 && one.uid == 0 && one.gid == 0;
+            text += allZero ? "(0) " : " ";
+        }
+        EXPECT_EQ(text, c.expected);
+    }
+}
+
+}  // namespace
