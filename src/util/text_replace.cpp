@@ -19,12 +19,9 @@ namespace {
 
 constexpr const char* kSource = "orvelmisc";
 
-long long countOccurrences(const char* text, std::string_view search) {
+long long countOccurrences(std::string_view text, std::string_view search) {
     long long count = 0;
-    for (const char* hit = strstr(text, search.data()); hit != nullptr;
-         hit = strstr(hit + search.size(), search.data())) {
-        ++count;
-    }
+    for (auto hit = text.find(search); hit != text.npos; hit = text.find(search, hit + search.size())) ++count;
     return count;
 }
 
@@ -88,10 +85,10 @@ int replaceOne(const char* source, std::string_view search, std::string_view rep
     // buffer changes no more.
     std::size_t resume = 0;
     while (length < capacity) {
-        const char* hit = strstr(text + resume, search.data());
-        if (hit == nullptr) break;
-        const auto position = static_cast<std::size_t>(hit - text);
-        const std::string_view rest(hit + search.size(), length - position - search.size());
+        const std::string_view all(text, length);
+        const std::size_t position = all.find(search, resume);
+        if (position == all.npos) break;
+        const std::string_view rest = all.substr(position + search.size());
         length = append(text, length, capacity, replacement);
         length = append(text, length, capacity, rest);
         resume = std::min(position + replacement.size(), length);
