@@ -20,6 +20,7 @@ using OwnedList = std::unique_ptr<VLIBCSZLIST, FreeList>;
 
 std::vector<std::string> textsOf(PVLIBCSZLIST list) {
     std::vector<std::string> out;
+    out.reserve(static_cast<size_t>(list->nItem));
     for (int i = 0; i < list->nItem; ++i) out.emplace_back(VLIBCSzListGet(list, i));
     return out;
 }
