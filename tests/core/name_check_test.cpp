@@ -106,7 +106,9 @@ TEST_F(NameCheckTest, Paths) {
         EXPECT_EQ(OrvCheckPath(test.path.c_str(), test.walkUp, ORV_NO_ACL_TEST, &existing), test.code == 0 ? 0 : -1);
         EXPECT_EQ(OrvLibGetErr(), test.code);
         EXPECT_EQ(existing, test.existing);
-        if (test.platformError != 0) EXPECT_EQ(VLIBCErrGet(), test.platformError);
+        if (test.platformError != 0) {
+            EXPECT_EQ(VLIBCErrGet(), test.platformError);
+        }
     }
     EXPECT_EQ(OrvCheckPath(nullptr, true, ORV_NO_ACL_TEST, nullptr), -1);
     EXPECT_EQ(OrvCheckPath((disk + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), 0);

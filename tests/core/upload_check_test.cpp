@@ -1,0 +1,131 @@
+#include "orvel/upload_check.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <string>
+
+#include "fault_gate.h"
+#include "orvel/error_state.h"
+#include "support/appliance.h"
+#include "vexo/error.h"
+
+namespace {
+
+using support::announceLog;
+
+constexpr auto kError = static_cast<_tag__type_>(0);
+
+class UploadCheckTest : public support::ApplianceTest {};
+
+TEST(UploadErrors, Table) {
+    const int codes[] = {401, 1803, 401, 401, 415, 412, 401, 1802, 1801, 1800, 1800, 408, 411, 416, 407, 401};
+    for (int error = -15; error <= 0; ++error) {
+        EXPECT_EQ(ConvUploadErrnoToAPIErr(static_cast<_tag_cgi_upload_errno_>(error)), codes[error + 15]) << error;
+    }
+}
+
+TEST_F(UploadCheckTest, CopyFailuresHaveCodesOfTheirOwn) {
+    struct Case {
+        int platformError, code;
+    };
+    const Case cases[] = {{0x0300, 407},  {0x0600, 408}, {0x0700, 408}, {0x0800, 414}, {0x2400, 415},
+                          {0x2900, 416},  {0x8400, 411}, {0xA000, 414}, {0xA200, 414}, {0xA300, 1805},
+                          {0xA400, 1804}, {0xA500, 419}, {0xC300, 412}, {0x8100, 401}, {0x1234, 401}};
+    for (const auto& test : cases) {
+        vexo::gate::fail("VEXOFileCopy", test.platformError);
+        announceLog("Failed to copy /a to /b, reason=[");
+        EXPECT_FALSE(MoveFile("alice", "/a", "/b", nullptr));
+        EXPECT_EQ(OrvLibGetErr(), test.code) << test.platformError;
+        vexo::gate::reset();
+    }
+    OrvLibSetErr(7);
+    EXPECT_FALSE(MoveFile("alice", nullptr, "/b", nullptr));
+    EXPECT_FALSE(MoveFile("alice", "/a", nullptr, nullptr));
+    announceLog("Failed to get user data");
+    EXPECT_FALSE(MoveFile("nobody-here", "/a", "/b", nullptr));
+    EXPECT_EQ(OrvLibGetErr(), 7) << "these set no code";
+}
+
+TEST_F(UploadCheckTest, MoveGivesTheFileToItsUser) {
+    SKIP_WITHOUT_ROOT();
+    const std::string source = shareRoot("photo") + "/src", target = shareRoot("photo") + "/dst";
+    support::writeFile(source, "data", 0600);
+    ASSERT_TRUE(MoveFile("alice", source.c_str(), target.c_str(), nullptr));
+    struct stat status = {};
+    ASSERT_EQ(stat(target.c_str(), &status), 0);
+    EXPECT_EQ(status.st_uid, support::kAliceUid);
+    EXPECT_EQ(status.st_gid, gid_t{support::kUsersGid});
+    EXPECT_EQ(support::readFile(target), "data");
+
+    announceLog("reason=[A400]");
+    EXPECT_FALSE(MoveFile("alice", source.c_str(), (target + "2").c_str(), [] { return 1; }));
+    EXPECT_EQ(OrvLibGetErr(), 1804);
+    EXPECT_NE(access((target + "2").c_str(), F_OK), 0);
+}
+
+// CheckFile changes the identity for good: each case in a process of its own.
+TEST_F(UploadCheckTest, CheckedInOrder) {
+    SKIP_WITHOUT_ROOT();
+    const std::string root = shareRoot("photo");
+    support::writeFile(root + "/there", "x", 0666);
+    support::makeFolder(root + "/closed", 0755);
+    addShare("fixed", "read only = no\nvexo:restriction = 2\n");
+    struct Case {
+        const char *what, *user, *path;
+        int mode, result, stored;
+        bool switched;
+        const char* log;
+        int modeAfter = 0;
+    };
+    const Case cases[] = {
+        {"no path", "alice", "photo", 0, 401, 401, false, "Failed to get fullpath of: photo"},
+        {"unknown share", "alice", "/none/a", 0, 408, 408, false, "Failed to get fullpath of: /none/a"},
+        {"no user", nullptr, "/photo/a", 0, 400, 400, false, "Failed to get fullpath of: /photo/a"},
+        {"read-only share", "bob", "/photo/a", 0, 407, 407, false, "No upload privilege to path /photo/a"},
+        {"existing target", "alice", "/photo/there", 0, 414, 414, false, "No upload privilege to path /photo/there"},
+        {"existing target, chosen", "alice", "/photo/there", 2, 0, 0, true, nullptr, 2},
+        {"new folders", "alice", "/photo/new/deeper/a", 0, 0, 0, true, nullptr},
+        {"closed folder", "alice", "/photo/closed/a", 0, 407, 407, true, "reason=[197]"},
+        {"no modifying", "alice", "/fixed/a", 0, 0, 0, true, nullptr, 2},
+        {"home", "alice", "/home/a", 0, 0, 0, true, nullptr},
+    };
+    for (const auto& test : cases) {
+        SCOPED_TRACE(test.what);
+        support::inChild([&] {
+            OrvLibSetErr(0);
+            auto mode = static_cast<_tag__type_>(test.mode);
+            EXPECT_EQ(CheckFile(test.path, test.user, nullptr, mode), test.result);
+            if (test.result != 0) {
+                EXPECT_EQ(OrvLibGetErr(), test.stored);
+            }
+            EXPECT_EQ(geteuid() != 0, test.switched);
+            EXPECT_EQ(static_cast<int>(mode), test.modeAfter);
+            std::string log;
+            for (const auto& line : support::takeLog()) log += line.text + "\n";
+            if (test.log != nullptr) {
+                EXPECT_NE(log.find(test.log), std::string::npos) << log;
+            }
+            return 0;
+        });
+    }
+}
+
+TEST_F(UploadCheckTest, ASwitchThatLeavesRootIsRefused) {
+    SKIP_WITHOUT_ROOT();
+    addUser("toor", 0, 0);
+    addShare("open", "read only = no\n");
+    support::inChild([] {
+        OrvLibSetErr(5);
+        auto mode = kError;
+        EXPECT_EQ(CheckFile("/open/a", "toor", nullptr, mode), 401);
+        std::string log;
+        for (const auto& line : support::takeLog()) log += line.text + "\n";
+        EXPECT_NE(log.find("left the process at uid 0"), std::string::npos) << log;
+        EXPECT_NE(log.find("Failed to set UGID for user=toor, sid=(null)"), std::string::npos) << log;
+        return 0;
+    });
+}
+
+}  // namespace
