@@ -1,0 +1,338 @@
+// Permissions: the listing's short cut against the kernel's verdict and against what really succeeds, over a table of
+// identities, folders, modes, owners and ACLs.
+#include "vexo/acl.h"
+
+#include <fcntl.h>
+#include <grp.h>
+#include <gtest/gtest.h>
+#include <linux/capability.h>
+#include <linux/fs.h>
+#include <sys/ioctl.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/xattr.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "acl_rules.h"
+#include "file_io.h"
+#include "platform/private_mounts.h"
+#include "support/appliance.h"
+#include "vexo/error.h"
+
+namespace {
+
+using support::kAliceUid;
+using support::kBobUid;
+using support::kCarolUid;
+using support::kUsersGid;
+
+// An entry of an ACL as the kernel stores it behind a 4-byte version.
+struct AclEntry {
+    uint16_t tag, permission;
+    uint32_t id;
+};
+enum : uint16_t { kOwnerTag = 1, kUserTag = 2, kGroupObjectTag = 4, kGroupTag = 8, kMaskTag = 16, kOtherTag = 32 };
+constexpr uint32_t kNoId = 0xFFFFFFFF;
+
+bool setAcl(const std::string& path, const std::vector<AclEntry>& entries) {
+    std::string blob("\2\0\0\0", 4);
+    for (const AclEntry& entry : entries) blob.append(reinterpret_cast<const char*>(&entry), sizeof entry);
+    return setxattr(path.c_str(), "system.posix_acl_access", blob.data(), blob.size(), 0) == 0;
+}
+
+struct Acting {
+    const char* name;
+    uid_t uid;
+    gid_t gid;
+    std::vector<gid_t> groups;
+    uint32_t capabilities;  // effective ones; all is "as the ids give them"
+};
+constexpr uint32_t kAsIds = 0xFFFFFFFF;
+
+// Root's real identity stays, as in the programs: access(2) would answer for root.
+bool become(const Acting& who) {
+    if (setgroups(who.groups.size(), who.groups.data()) != 0 || setegid(who.gid) != 0) return false;
+    if (seteuid(who.uid) != 0) return false;
+    if (who.capabilities == kAsIds) return true;
+    __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
+    __user_cap_data_struct data[2] = {};
+    if (syscall(SYS_capget, &header, data) != 0) return false;
+    data[0].effective = who.capabilities;
+    data[1].effective = 0;
+    return syscall(SYS_capset, &header, data) == 0;
+}
+
+class AclTest : public support::ApplianceTest {
+ protected:
+    unsigned byPath(const std::string& path) {
+        unsigned permission = 0xFFFF;
+        EXPECT_EQ(VEXOACLPermGet(path.c_str(), &permission), 0) << path << strerror(errno);
+        return permission;
+    }
+    // What opening, searching and renaming forth and back within the folder show; `asked` are the bits that this tells.
+    static unsigned byDoing(const std::string& path, bool isFolder, unsigned& asked) {
+        unsigned permission = 0;
+        asked = VEXO_ACL_READ | VEXO_ACL_DELETE | (isFolder ? VEXO_ACL_EXECUTE : VEXO_ACL_WRITE | VEXO_ACL_APPEND);
+        if (vexo::openFile(path, O_RDONLY)) permission |= VEXO_ACL_READ;
+        if (isFolder && vexo::openFile(path + "/.", O_PATH)) permission |= VEXO_ACL_EXECUTE;
+        if (!isFolder && vexo::openFile(path, O_WRONLY)) permission |= VEXO_ACL_WRITE | VEXO_ACL_APPEND;
+        const std::string away = path + ".away";
+        if (rename(path.c_str(), away.c_str()) == 0) {
+            permission |= VEXO_ACL_DELETE;
+            EXPECT_EQ(rename(away.c_str(), path.c_str()), 0);
+        }
+        return permission;
+    }
+    void compare(const std::string& folder, const std::vector<std::string>& names) {
+        const vexo::Descriptor opened = vexo::openFile(folder, O_PATH | O_DIRECTORY);
+        const PVEXOACLFOLDER permissions = VEXOACLFolderOpen(opened.get());
+        ASSERT_NE(permissions, nullptr);
+        for (const std::string& name : names) {
+            const std::string path = folder + "/" + name;
+            SCOPED_TRACE(path);
+            _tag_VEXOSTAT_ status;
+            if (VLIBCFileLStatAt(opened.get(), name.c_str(), 1, &status) != 0) continue;  // the folder is closed to it
+            unsigned inFolder = 0xFFFF;
+            EXPECT_EQ(VEXOACLFolderPermGet(permissions, name.c_str(), &status, &inFolder), 0);
+            EXPECT_EQ(inFolder, byPath(path));
+            unsigned asked = 0;
+            const unsigned done = byDoing(path, S_ISDIR(status.st_mode), asked);
+            EXPECT_EQ(inFolder & asked, done);
+        }
+        VEXOACLFolderClose(permissions);
+    }
+    std::vector<std::string> fill(const std::string& folder);
+    std::string root_ = shareRoot("photo");
+};
+
+// Files and folders of all the modes, owners and ACLs that tell different rules apart.
+std::vector<std::string> AclTest::fill(const std::string& folder) {
+    std::vector<std::string> names;
+    for (const mode_t mode : {0000, 0644, 0600, 0755, 0070, 0007, 0604, 0640, 0664, 0775, 0711, 0111, 0010, 04755}) {
+        for (const uid_t owner : {uid_t{0}, uid_t{kAliceUid}, uid_t{kBobUid}}) {
+            for (const int acl : {0, 1, 2}) {
+                const bool isFolder = (names.size() & 1) != 0;
+                names.push_back(std::to_string(mode) + "-" + std::to_string(owner) + "-" + std::to_string(acl));
+                const std::string path = folder + "/" + names.back();
+                isFolder ? support::makeFolder(path) : support::writeFile(path, "#!/bin/sh\n");
+                EXPECT_EQ(chown(path.c_str(), owner, kUsersGid), 0);
+                const auto bits = [&](unsigned shift) { return static_cast<uint16_t>((mode >> shift) & 7); };
+                if (acl ==
+                    1) {  // more than the mode shows for carol, less for the owning group; the mask is the mode's
+                    EXPECT_TRUE(setAcl(path, {{kOwnerTag, bits(6), kNoId},
+                                              {kUserTag, 7, kCarolUid},
+                                              {kGroupObjectTag, 0, kNoId},
+                                              {kMaskTag, bits(3), kNoId},
+                                              {kOtherTag, bits(0), kNoId}}));
+                } else if (acl == 2) {  // less for carol
+                    EXPECT_TRUE(setAcl(path, {{kOwnerTag, bits(6), kNoId},
+                                              {kUserTag, 0, kCarolUid},
+                                              {kGroupObjectTag, 7, kNoId},
+                                              {kGroupTag, 5, support::kAdminGid},
+                                              {kMaskTag, 7, kNoId},
+                                              {kOtherTag, bits(0), kNoId}}));
+                } else {
+                    EXPECT_EQ(chmod(path.c_str(), mode), 0);
+                }
+            }
+        }
+    }
+    return names;
+}
+
+TEST_F(AclTest, FolderFormAgreesWithTheKernelAndWithTheDeed) {
+    SKIP_WITHOUT_ROOT();
+    const std::vector<Acting> identities = {
+        {"root", 0, 0, {0}, kAsIds},
+        {"root without capabilities", 0, 0, {0}, 0},
+        {"alice", kAliceUid, 1, {}, kAsIds},
+        {"bob of the group", kBobUid, kUsersGid, {kUsersGid}, kAsIds},
+        {"carol, named in ACLs", kCarolUid, 1, {1}, kAsIds},
+        {"carol of both groups", kCarolUid, 1, {kUsersGid, support::kAdminGid}, kAsIds},
+        {"a stranger", 29999, 29999, {}, kAsIds},
+        {"a stranger who reads all", 29999, 29999, {}, 1U << CAP_DAC_READ_SEARCH},
+        {"a stranger who overrides", 29999, 29999, {}, 1U << CAP_DAC_OVERRIDE},
+        {"a stranger who owns all", 29999, 29999, {}, 1U << CAP_FOWNER},
+    };
+    const struct {
+        const char* name;
+        mode_t mode;
+        uid_t owner;
+    } folders[] = {{"open", 0777, 0},
+                   {"sticky", 01777, 0},
+                   {"alices sticky", 01777, kAliceUid},
+                   {"unwritable", 0755, 0},
+                   {"unreadable", 0733, 0},
+                   {"unsearchable", 0766, 0},
+                   {"unsearchable sticky group", 01771, kBobUid}};
+    std::vector<std::string> names;
+    for (const auto& folder : folders) {
+        const std::string path = root_ + "/" + folder.name;
+        support::makeFolder(path);
+        names = fill(path);
+        ASSERT_EQ(chown(path.c_str(), folder.owner, kUsersGid), 0);
+        ASSERT_EQ(chmod(path.c_str(), folder.mode), 0);
+    }
+    for (const Acting& who : identities) {
+        const int result = support::inChild([&] {
+            if (!become(who)) return 97;
+            for (const auto& folder : folders) {
+                SCOPED_TRACE(std::string(who.name) + " in " + folder.name);
+                compare(root_ + "/" + folder.name, names);
+            }
+            return 0;
+        });
+        EXPECT_EQ(result, 0) << who.name;
+    }
+}
+
+TEST_F(AclTest, AttributesAndMountsJudgeToo) {
+    SKIP_WITHOUT_ROOT();
+    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+        std::vector<std::string> names;
+        for (const char* name : {"read-only", "no-execute", "bound"}) {
+            const std::string folder = root_ + "/" + name;
+            support::makeFolder(folder, 0777);
+            EXPECT_EQ(mount("none", folder.c_str(), "tmpfs", 0, "size=4m,mode=0777"), 0);
+            names = fill(folder);
+        }
+        EXPECT_EQ(mount("none", (root_ + "/read-only").c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
+        EXPECT_EQ(mount("none", (root_ + "/no-execute").c_str(), nullptr, MS_REMOUNT | MS_NOEXEC, nullptr), 0);
+        // A folder of the same device whose mount is read-only while the one around it is not.
+        const std::string inner = root_ + "/bound/inner";
+        support::makeFolder(inner, 0777);
+        EXPECT_EQ(mount(inner.c_str(), inner.c_str(), nullptr, MS_BIND, nullptr), 0);
+        EXPECT_EQ(mount("none", inner.c_str(), nullptr, MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
+        EXPECT_EQ(byPath(inner) & VEXO_ACL_WRITE, 0U);
+        const vexo::Descriptor around = vexo::openFile(root_ + "/bound", O_PATH | O_DIRECTORY);
+        const PVEXOACLFOLDER permissions = VEXOACLFolderOpen(around.get());
+        _tag_VEXOSTAT_ status;
+        unsigned inFolder = 0;
+        EXPECT_EQ(VLIBCFileLStatAt(around.get(), "inner", 1, &status), 0);
+        EXPECT_EQ(VEXOACLFolderPermGet(permissions, "inner", &status, &inFolder), 0);
+        EXPECT_EQ(inFolder, byPath(inner));
+        VEXOACLFolderClose(permissions);
+        for (const char* name : {"read-only", "no-execute"}) compare(root_ + "/" + name, names);
+        EXPECT_EQ(seteuid(kAliceUid), 0);
+        compare(root_ + "/read-only", names);
+        return 0;
+    }));
+}
+
+TEST_F(AclTest, ImmutableAndAppendOnly) {
+    SKIP_WITHOUT_ROOT();
+    const auto mark = [](const std::string& path, int flags) {
+        const vexo::Descriptor fd = vexo::openFile(path, O_RDONLY);
+        return ioctl(fd.get(), FS_IOC_SETFLAGS, &flags) == 0;
+    };
+    const std::vector<std::string> names = {"plain", "fixed", "growing"};
+    for (const std::string& name : names) support::writeFile(root_ + "/" + name, "", 0666);
+    support::makeFolder(root_ + "/log", 0777);
+    support::writeFile(root_ + "/log/plain", "", 0666);
+    if (!mark(root_ + "/fixed", FS_IMMUTABLE_FL)) GTEST_SKIP() << "no immutable files here: " << strerror(errno);
+    EXPECT_TRUE(mark(root_ + "/growing", FS_APPEND_FL));
+    EXPECT_TRUE(mark(root_ + "/log", FS_APPEND_FL));
+    EXPECT_EQ(byPath(root_ + "/fixed"), unsigned{VEXO_ACL_READ});
+    EXPECT_EQ(byPath(root_ + "/growing") & VEXO_ACL_DELETE, 0U);
+    compare(root_, {"plain", "fixed"});  // appending succeeds on the third where writing from the start does not
+    compare(root_ + "/log", {"plain"});
+    for (const char* name : {"/fixed", "/growing", "/log"}) EXPECT_TRUE(mark(root_ + name, 0));
+}
+
+TEST_F(AclTest, OwnEntriesAndRootsAreSettledWithoutTheKernel) {
+    const vexo::Identity root{0, true, true, true};
+    const vexo::Identity alice{kAliceUid, false, false, false};
+    vexo::FolderFacts folder{};
+    folder.device = 5;
+    folder.plain = true;
+    _tag_VEXOSTAT_ file{};
+    file.st_device = 5;
+    file.st_attributes = VEXO_ATTRIBUTE_KNOWN;
+    file.st_mode = S_IFREG | 0640;
+    file.st_uid = kAliceUid;
+    EXPECT_EQ(vexo::settle(alice, folder, file).open, 0U);
+    EXPECT_EQ(vexo::settle(alice, folder, file).granted, 6U);
+    EXPECT_EQ(vexo::settle(root, folder, file).granted, 6U);
+    file.st_uid = kBobUid;
+    EXPECT_EQ(vexo::settle(alice, folder, file).open, 4U);  // by the group or an ACL, nothing else can grant more
+    file.st_mode = S_IFREG | 0600;
+    EXPECT_EQ(vexo::settle(alice, folder, file).open, 0U);
+    // Whatever makes the status no proof leaves every bit to the kernel.
+    const auto unsettled = [&](auto&& change) {
+        vexo::FolderFacts otherFolder = folder;
+        _tag_VEXOSTAT_ other = file;
+        change(otherFolder, other);
+        return vexo::settle(root, otherFolder, other).open == 7U;
+    };
+    EXPECT_TRUE(unsettled([](auto& f, auto&) { f.plain = false; }));
+    EXPECT_TRUE(unsettled([](auto&, auto& e) { e.st_device = 6; }));
+    EXPECT_TRUE(unsettled([](auto&, auto& e) { e.st_attributes = 0; }));
+    EXPECT_TRUE(unsettled([](auto&, auto& e) { e.st_mode = S_IFLNK | 0777; }));
+    EXPECT_TRUE(unsettled([](auto&, auto& e) { e.st_gid = 65534; }));
+}
+
+TEST_F(AclTest, FailuresAndOddPaths) {
+    ASSERT_EQ(symlink("gone", (root_ + "/dangling").c_str()), 0);
+    ASSERT_EQ(symlink("a", (root_ + "/link").c_str()), 0);
+    ASSERT_EQ(symlink("loop", (root_ + "/loop").c_str()), 0);
+    support::writeFile(root_ + "/a", "", 0444);
+    const struct {
+        std::string path;
+        int systemCode, code;
+    } cases[] = {{root_ + "/missing", ENOENT, VEXO_ERR_MISSING},
+                 {root_ + "/a/below", ENOTDIR, VEXO_ERR_MISSING},
+                 {root_ + "/dangling", ENOENT, VEXO_ERR_ACL_TARGET_MISSING},
+                 {root_ + "/loop", ELOOP, VEXO_ERR_GENERAL}};
+    for (const auto& c : cases) {
+        unsigned permission = 0;
+        VLIBCErrSetEx(0, "", 0);
+        EXPECT_LT(VEXOACLPermGet(c.path.c_str(), &permission), 0) << c.path;
+        EXPECT_EQ(errno, c.systemCode);
+        EXPECT_EQ(VLIBCErrGet(), c.code);
+    }
+    unsigned permission = 0;
+    EXPECT_LT(VEXOACLPermGet(nullptr, &permission), 0);
+    EXPECT_LT(VEXOACLPermGet("/", nullptr), 0);
+    errno = 0;
+    for (const char* never : {"/", "/..", "."}) EXPECT_EQ(byPath(never) & VEXO_ACL_DELETE, 0U) << never;
+    EXPECT_EQ(byPath(root_ + "//") & VEXO_ACL_DELETE, byPath(root_) & VEXO_ACL_DELETE);
+    ASSERT_EQ(chdir(root_.c_str()), 0);
+    EXPECT_NE(byPath("a") & VEXO_ACL_DELETE, 0U);
+    EXPECT_NE(byPath("link") & VEXO_ACL_DELETE, 0U);  // the link goes, not its target
+    EXPECT_EQ(errno, 0);
+    EXPECT_EQ(VEXOACLFolderOpen(-1), nullptr);
+    VEXOACLFolderClose(nullptr);
+}
+
+TEST_F(AclTest, ADeniedFolderIsNoFailure) {
+    SKIP_WITHOUT_ROOT();
+    support::makeFolder(root_ + "/closed", 0700);
+    support::writeFile(root_ + "/closed/a", "", 0666);
+    const auto body = [&] {
+        EXPECT_EQ(byPath(root_ + "/closed/a"), 0U);
+        return 0;
+    };
+    EXPECT_EQ(support::asUser(kAliceUid, kUsersGid, body), 0);
+}
+
+TEST_F(AclTest, SupportIsAskedOncePerDevice) {
+    support::writeFile(root_ + "/a", "");
+    _tag_VEXOSTAT_ status;
+    ASSERT_EQ(VLIBCFileLStat((root_ + "/a").c_str(), 1, &status), 0);
+    const bool kept = getxattr((root_ + "/a").c_str(), "system.posix_acl_access", nullptr, 0) >= 0 || errno == ENODATA;
+    errno = 0;
+    EXPECT_EQ(VEXOACLIsSupport((root_ + "/a").c_str(), -1, 2) > 0, kept);
+    EXPECT_EQ(VEXOACLIsSupportOnDevice("/nowhere", status.st_device) > 0, kept);  // known, so the path is not needed
+    EXPECT_EQ(VEXOACLIsSupport("/proc/self/stat", -1, 2), 0);
+    EXPECT_EQ(errno, 0);
+    EXPECT_LT(VEXOACLIsSupport((root_ + "/missing").c_str(), -1, 2), 0);
+    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_MISSING);
+    EXPECT_LT(VEXOACLIsSupport(nullptr, -1, 2), 0);
+}
+
+}  // namespace
