@@ -21,7 +21,8 @@ struct PrivilegeReason {
     std::string shareRoot;  // for a home, the home folder
     PrivilegeRule rule = PrivilegeRule::kNoList;
     bool administrator = false;
-    // Which of the share's lists the user is in; all three are asked, though the first in this order decides.
+    // Which of the share's lists the user is in; all three are asked, though the first in this order decides. A
+    // membership that could not be looked up counts as one in the no-access list.
     bool inNoAccessList = false;
     bool inReadWriteList = false;
     bool inReadOnlyList = false;

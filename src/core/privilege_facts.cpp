@@ -29,12 +29,18 @@ constexpr int kServerNotReached = -2;
     return true;
 }
 
+// Membership that could not be looked up (the platform's slot tells) counts in the list that denies, and in no other.
+[[nodiscard]] bool isDenied(const char* user, PVLIBCSZLIST list) {
+    VLIBCErrSetEx(0, kSource, __LINE__);
+    return BlSDKUserIsInList(user, list) != 0 || VLIBCErrGet() != 0;
+}
+
 }  // namespace
 
 ListMembership listsOf(const char* user, const VEXOSHARE& share, AskLists extent) {
     const bool all = extent == AskLists::kAll;
     ListMembership lists;
-    lists.noAccess = BlSDKUserIsInList(user, share.naList) != 0;
+    lists.noAccess = isDenied(user, share.naList);
     if (all || !lists.noAccess) lists.readWrite = BlSDKUserIsInList(user, share.rwList) != 0;
     if (all || !(lists.noAccess || lists.readWrite)) lists.readOnly = BlSDKUserIsInList(user, share.roList) != 0;
     return lists;

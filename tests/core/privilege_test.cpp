@@ -33,11 +33,11 @@ class PrivilegeTest : public support::ApplianceTest {
         addUser("fay@corp", 20011, support::kUsersGid);
         addGroup("editors", 20110, {"bob", "CORP\\eve"});
         addShare("mixed",
-                 "invalid users = bob\nwrite list = bob, alice, CORP\\eve\nread list = alice, "
-                 "fay@corp\nvexo:restriction = 5\n");
-        addShare("drop", "write list = alice, carol\nread list = bob\nvexo:restriction = 2\n");
-        addShare("quiet", "write list = alice, carol\nread list = bob\nvexo:restriction = 1\n");
-        addShare("view", "write list = alice\nread list = bob, @editors\nvexo:restriction = 4\n");
+                 "invalid users = bob\nwrite list = bob, alice, CORP\\eve\nread list = alice\nvalid users = fay@corp\n"
+                 "vexo:restriction = 5\n");
+        addShare("drop", "write list = alice, carol\nvalid users = bob\nvexo:restriction = 2\n");
+        addShare("quiet", "write list = alice, carol\nvalid users = bob\nvexo:restriction = 1\n");
+        addShare("view", "write list = alice\nvalid users = bob, @editors\nvexo:restriction = 4\n");
     }
 };
 
@@ -131,6 +131,10 @@ TEST_F(PrivilegeTest, DomainAndDirectoryUsersWithASession) {
         EXPECT_EQ(out.result, -1);
         EXPECT_EQ(out.privilege, -1);
         EXPECT_EQ(OrvLibGetErr(), 402);
+        vexo::gate::reset();
+        vexo::gate::fail("DirectoryServer", VEXO_ERR_GENERAL);
+        EXPECT_EQ(ask("/mixed", user, "sid").result, -1);
+        EXPECT_EQ(OrvLibGetErr(), 406) << "the server was not reached";
     }
     vexo::gate::reset();
     EXPECT_EQ(ask("/photo", "alice", "sid").privilege, 2) << "a local user never asks a service";

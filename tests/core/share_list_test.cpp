@@ -17,11 +17,11 @@ class ShareListTest : public support::ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
-        addShare("Zoo", "write list = alice\nread list = bob\n");
-        addShare("attic", "read list = alice, bob\n");
-        addShare("barn", "write list = alice\nbrowseable = no\n");
-        addShare("cave", "invalid users = alice\nwrite list = alice, bob\n");
-        addShare("dune", "write list = fay@corp\n");
+        addShare("Zoo", "write list = alice\nvalid users = bob\n");
+        addShare("attic", "valid users = alice, bob\n");
+        addShare("barn", "write list = alice\nvalid users = alice\nbrowseable = no\n");
+        addShare("cave", "invalid users = alice\nwrite list = alice, bob\nvalid users = bob\n");
+        addShare("dune", "write list = fay@corp\nvalid users = fay@corp\n");
     }
     static Texts names(PVLIBCSZLIST list) {
         Texts out;
@@ -66,8 +66,7 @@ TEST_F(ShareListTest, Failures) {
         Texts log;
     };
     const Case cases[] = {{"VLIBCSzListAlloc", {"orveldir(#) malloc fail"}},
-                          {"VEXOShareDBOpen", {"orveldir:# VEXOShareDBOpenFile Error[8100]\n"}},
-                          {"VLIBCSzListPush", {}}};
+                          {"VEXOShareDBOpen", {"orveldir:# VEXOShareDBOpenFile Error[8100]\n"}}};
     for (const Case& c : cases) {
         OrvLibSetErr(0);
         vexo::gate::reset();
@@ -76,6 +75,23 @@ TEST_F(ShareListTest, Failures) {
         EXPECT_EQ(OrvLibGetErr(), 401);
         EXPECT_EQ(takeLogTexts(), c.log);
     }
+}
+
+// The platform's own pushes come first; from some call on the one that fails is a push of a name.
+TEST_F(ShareListTest, NamesThatFindNoMemory) {
+    int failed = 0;
+    const int faults = support::sweepFaults(
+        VEXO_ERR_GENERAL,
+        [&](int) {
+            OrvLibSetErr(7);
+            const PVLIBCSZLIST list = OrvLibValidShareGen("alice", 0, 0);
+            if (list == nullptr) ++failed;
+            EXPECT_EQ(OrvLibGetErr(), list == nullptr ? 401 : 0);
+            VLIBCSzListFree(list);
+        },
+        "VLIBCSzListPush");
+    EXPECT_GE(faults, failed);
+    EXPECT_EQ(failed, 4) << "one for each share in the list";
 }
 
 // A share that is not the user's never shows, whatever fails.

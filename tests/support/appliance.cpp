@@ -17,6 +17,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <sstream>
 
 #include "fault_gate.h"
 #include "orvel/error_state.h"
@@ -65,6 +66,16 @@ class SystemRootFolder {
 };
 
 const SystemRootFolder root;
+
+// A key stands once: of several lines the platform would read the first.
+void replaceSetting(std::string& text, const std::string& key, const std::string& value) {
+    std::string kept;
+    std::istringstream lines(text);
+    for (std::string line; std::getline(lines, line);) {
+        if (!line.starts_with(key + "=")) kept += line + "\n";
+    }
+    text = kept + key + "=\"" + value + "\"\n";
+}
 
 }  // namespace
 
@@ -212,12 +223,12 @@ void ApplianceTest::writeAccounts() {
 }
 
 void ApplianceTest::setSetting(const std::string& key, const std::string& value) {
-    settings_ += key + "=\"" + value + "\"\n";
+    replaceSetting(settings_, key, value);
     writeRootFile("/etc/vexoinfo.conf", settings_);
 }
 
 void ApplianceTest::setDefaultSetting(const std::string& key, const std::string& value) {
-    defaults_ += key + "=\"" + value + "\"\n";
+    replaceSetting(defaults_, key, value);
     writeRootFile("/etc.defaults/vexoinfo.conf", defaults_);
 }
 
