@@ -21,7 +21,7 @@ int becomeUser(const std::string& user, bool needsHome);
 // Says on standard error why a path was refused. Returns 1.
 int refused(std::string_view path, int code);
 
-// `bytes` for a terminal: readable, control characters as "\xNN".
+// `bytes` for a terminal: readable; what would steer it, or turn the direction of text, as "\xNN" for each byte.
 std::string terminalText(std::string_view bytes);
 
 }  // namespace orvel::ctl

@@ -1,6 +1,7 @@
 #include <unistd.h>
 
 #include <cstdio>
+#include <string_view>
 
 #include "command.h"
 #include "orvel/error_state.h"
@@ -8,6 +9,20 @@
 #include "text.h"
 
 namespace orvel::ctl {
+namespace {
+
+// Length of the character at the end of `text` when it steers the terminal instead of showing itself: a control, or one
+// that turns the direction of the text around it. 0 for any other.
+size_t hiddenAtEnd(std::string_view text) {
+    const auto last = static_cast<unsigned char>(text.back());
+    if (last < 0x20 || last == 0x7F) return 1;
+    const std::string_view lead = text.substr(0, text.size() - 1);
+    if (last >= 0x80 && last <= 0x9F && lead.ends_with("\xC2")) return 2;       // U+0080 to U+009F
+    if (last >= 0xAA && last <= 0xAE && lead.ends_with("\xE2\x80")) return 3;   // U+202A to U+202E
+    return last >= 0xA6 && last <= 0xA9 && lead.ends_with("\xE2\x81") ? 3 : 0;  // U+2066 to U+2069
+}
+
+}  // namespace
 
 int becomeUser(const std::string& user, bool needsHome) {
     if (geteuid() != 0) {
@@ -27,13 +42,14 @@ std::string terminalText(std::string_view bytes) {
     static constexpr char digits[] = "0123456789ABCDEF";
     std::string out;
     for (const char c : cgi::readable(bytes)) {
-        const auto byte = static_cast<unsigned char>(c);
-        // U+0080 to U+009F are controls too; their first byte is what no other character has before such a trail.
-        const bool control = byte < 0x20 || byte == 0x7F || (byte < 0xA0 && !out.empty() && out.back() == '\xC2');
-        if (control) {
+        out += c;
+        const size_t length = hiddenAtEnd(out);
+        if (length == 0) continue;
+        const std::string hidden = out.substr(out.size() - length);
+        out.resize(out.size() - length);
+        for (const char part : hidden) {
+            const auto byte = static_cast<unsigned char>(part);
             out += {'\\', 'x', digits[byte >> 4], digits[byte & 15]};
-        } else {
-            out += c;
         }
     }
     return out;

@@ -19,6 +19,7 @@ namespace {
 
 std::vector<char*> pointers(std::vector<std::string>& texts) {
     std::vector<char*> list;
+    list.reserve(texts.size() + 1);
     for (std::string& text : texts) list.push_back(text.data());
     list.push_back(nullptr);
     return list;
@@ -33,7 +34,7 @@ std::vector<std::string> environmentWith(std::map<std::string, std::string> vari
         if (variables.count(text.substr(0, text.find('='))) == 0) list.push_back(text);
     }
     for (const auto& [name, value] : variables) {
-        if (!value.empty()) list.push_back(name + "=" + value);
+        if (!value.empty()) list.emplace_back(name).append("=").append(value);
     }
     return list;
 }

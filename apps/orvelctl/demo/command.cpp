@@ -43,6 +43,7 @@ void writeSystem(const std::string& folder, const std::string& tag, const Record
 }
 
 void make(const std::string& folder) {
+    umask(022);
     const appliance::Identities ids = appliance::identitiesFor(geteuid(), getegid());
     if (ids.real) requireReachable(folder);
     const std::string tag = appliance::randomHex(4);
@@ -51,12 +52,13 @@ void make(const std::string& folder) {
                      .roots = appliance::shareRoots(tag),
                      .people = people(ids)};
     if (!fs::is_empty(folder)) throw std::runtime_error(folder + " is not empty, and no demo of yours");
-    umask(022);
     chmod(folder.c_str(), 0755);
     // The record comes first, so that a demo that was never finished can be removed.
     writeRecord(folder, record);
     writeSystem(folder, tag, record, ids);
+    const mode_t before = umask(0);
     makeShares(tag, ids);
+    umask(before);
     record.whole = true;
     writeRecord(folder, record);
 }

@@ -30,11 +30,12 @@ void fillYear(Tree& tree, int year, Numbers& numbers) {
     const std::string folder = std::to_string(year);
     tree.folder(folder);
     for (int month = 1; month <= 12; month += 3) {
-        const std::string quarter = folder + "/" + digits(month, 2);
+        std::string quarter = folder + "/";
+        quarter += digits(month, 2);
         tree.folder(quarter);
         for (int i = 1; i <= 8; ++i) {
             const time_t day = kStart + (year - 2012) * 365 * kDay + month * 30 * kDay;
-            tree.file(quarter + "/P" + folder + digits(month, 2) + digits(i, 2) + ".jpg",
+            tree.file(quarter + "/P" + digits(year * 10000 + month * 100 + i, 8) + ".jpg",
                       200000 + static_cast<int64_t>(numbers.below(6000000)),
                       day + static_cast<time_t>(numbers.below(28)) * kDay);
         }

@@ -15,22 +15,25 @@ struct DemoShare {
     void (*fill)(Tree&);
 };
 
+// In smb.conf(5) terms `valid users` may read, or write where the share is not read-only; `write list` may write.
 constexpr DemoShare kShares[] = {
     {"homes", "comment = home folders, made on first use\nread only = no\nvalid users = alice, bob, admin\n",
      fillHomes},
     {"photo", "read only = no\nvalid users = alice, @administrators\nread list = bob\nvexo:synced = yes\n", fillPhoto},
-    {"music", "write list = alice, admin\nread list = bob\n", fillMusic},
-    {"projects", "write list = alice, @administrators\ninvalid users = bob\n", fillProjects},
+    {"music", "valid users = alice, bob, admin\nwrite list = alice, admin\n", fillMusic},
+    {"projects", "read only = no\nvalid users = @users\ninvalid users = bob\n", fillProjects},
     {"worldwide", "read only = no\nvalid users = alice, bob, admin\n", fillWorldwide},
     {"warehouse", "read only = no\nvalid users = @users\n", fillWarehouse},
-    {"sealed", "comment = no listing, no download\nwrite list = alice, admin\nread list = bob\nvexo:restriction = 1\n",
+    {"sealed", "comment = no listing, no download\nread only = no\nvalid users = @users\nvexo:restriction = 1\n",
      fillSample},
     {"archive",
-     "comment = existing files stay as they are\nwrite list = alice, admin\nread list = bob\nvexo:restriction = 2\n",
+     "comment = existing files stay as they are\nread only = no\nvalid users = alice, admin\nread list = bob\n"
+     "vexo:restriction = 2\n",
      fillSample},
-    {"preview", "comment = no download\nwrite list = alice, admin\nread list = bob\nvexo:restriction = 4\n",
+    {"preview",
+     "comment = no download\nread only = no\nvalid users = alice, admin\nread list = bob\nvexo:restriction = 4\n",
      fillSample},
-    {"backstage", "comment = hidden\nbrowseable = no\nwrite list = alice, admin\n", fillSample},
+    {"backstage", "comment = hidden\nbrowseable = no\nread only = no\nvalid users = alice, admin\n", fillSample},
 };
 
 constexpr std::string_view kPrefix = "/tmp/orvel-demo-";

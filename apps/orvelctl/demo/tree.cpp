@@ -14,8 +14,20 @@ namespace {
     throw std::system_error(errno, std::generic_category(), what);
 }
 
-// No time of its own: now.
-constexpr time_t kNow = 0;
+class NewFile {
+ public:
+    NewFile(int folder, const std::string& path, mode_t mode)
+        : fd_(openat(folder, path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, mode)) {
+        if (fd_ < 0) fail(path);
+    }
+    ~NewFile() { close(fd_); }
+    NewFile(const NewFile&) = delete;
+    NewFile& operator=(const NewFile&) = delete;
+    [[nodiscard]] int fd() const { return fd_; }
+
+ private:
+    int fd_;
+};
 
 }  // namespace
 
@@ -26,25 +38,25 @@ Tree::Tree(const std::string& root, const Identities& ids) : root_(root), ids_(i
 }
 
 Tree::~Tree() {
-    if (fd_ >= 0) ::close(fd_);
+    if (fd_ >= 0) close(fd_);
 }
 
 void Tree::folder(const std::string& path, mode_t mode) {
-    if (mkdirat(fd_, path.c_str(), 0700) != 0) fail(path);
-    if (fchmodat(fd_, path.c_str(), mode, 0) != 0) fail(path);
+    if (mkdirat(fd_, path.c_str(), mode) != 0) fail(path);
     own(path);
 }
 
 void Tree::file(const std::string& path, int64_t size, time_t modified, mode_t mode) {
-    const int fd = openat(fd_, path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
-    if (fd < 0 || ftruncate(fd, size) != 0) fail(path);
-    close(fd, path, modified, mode);
+    const NewFile file(fd_, path, mode);
+    const timespec times[2] = {{modified, 0}, {modified, 0}};
+    if (ftruncate(file.fd(), size) != 0 || futimens(file.fd(), times) != 0) fail(path);
+    own(path);
 }
 
 void Tree::textFile(const std::string& path, const std::string& text) {
-    const int fd = openat(fd_, path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
-    if (fd < 0 || write(fd, text.data(), text.size()) != static_cast<ssize_t>(text.size())) fail(path);
-    close(fd, path, kNow, 0664);
+    const NewFile file(fd_, path, 0664);
+    if (write(file.fd(), text.data(), text.size()) != static_cast<ssize_t>(text.size())) fail(path);
+    own(path);
 }
 
 void Tree::link(const std::string& path, const std::string& target) {
@@ -60,13 +72,6 @@ void Tree::finish(uid_t uid, mode_t mode) {
 void Tree::own(const std::string& path) const {
     if (!ids_.real) return;
     if (fchownat(fd_, path.c_str(), owner_, ids_.users, AT_SYMLINK_NOFOLLOW) != 0) fail(path);
-}
-
-void Tree::close(int fd, const std::string& path, time_t modified, mode_t mode) const {
-    const timespec times[2] = {{modified, 0}, {modified, 0}};
-    if (fchmod(fd, mode) != 0 || (modified != kNow && futimens(fd, times) != 0)) fail(path);
-    ::close(fd);
-    own(path);
 }
 
 }  // namespace orvel::ctl::appliance

@@ -12,7 +12,8 @@
 
 namespace orvel::ctl::appliance {
 
-// Throws std::system_error when something cannot be made, also when it is there already.
+// Throws std::system_error when something cannot be made, also when it is there already. Modes are exact where the
+// process's umask is 0.
 class Tree {
  public:
     Tree(const std::string& root, const Identities& ids);
@@ -34,7 +35,6 @@ class Tree {
 
  private:
     void own(const std::string& path) const;
-    void close(int fd, const std::string& path, time_t modified, mode_t mode) const;
     std::string root_;
     Identities ids_;
     uid_t owner_;
