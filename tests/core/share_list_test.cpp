@@ -77,6 +77,26 @@ TEST_F(ShareListTest, Failures) {
     }
 }
 
+TEST_F(ShareListTest, AMalformedSectionHidesNoOther) {
+    const std::string good = "[good]\npath = " + shareRoot("good") + "\nread only = no\nvalid users = alice\n";
+    const std::string bad[] = {
+        "[no path]\nvalid users = alice\n",
+        "[deep]\npath = /tmp/a/b\nvalid users = alice\n",
+        "[relative]\npath = tmp/x\nvalid users = alice\n",
+        "[unclosed\npath = /tmp/x\n",
+        "[odd]\na line without meaning\n= value\n[]\npath = /tmp/y\nvalid users = alice\n",
+        "[" + std::string(5000, 'x') + "]\npath = /tmp/z\nvalid users = alice\n",
+        "[bytes]\n\xff\xfe = \x01\n",
+    };
+    for (const std::string& section : bad) {
+        for (const std::string& text : {section + good, good + section}) {
+            writeRootFile("/etc/vexo/shares.conf", text);
+            EXPECT_EQ(names(OrvLibValidShareGen("alice", 0, 1)), Texts{"good"}) << text;
+            takeLogTexts();
+        }
+    }
+}
+
 // The platform's own pushes come first; from some call on the one that fails is a push of a name.
 TEST_F(ShareListTest, NamesThatFindNoMemory) {
     int failed = 0;
