@@ -26,7 +26,7 @@ constexpr std::size_t kLongest = 4095;
 // Reads a setting, cut to size - 1 characters, into `value` ("" when there is none). False when the read failed.
 template <int size>
 bool readSetting(const char* key, std::string& value) {
-    char buffer[size] = "";
+    char buffer[size] = {};
     const bool ok = VLIBCFileGetKeyValue(kSettings, key, buffer, size, 0) >= 0;
     value = ok ? buffer : "";
     return ok;
