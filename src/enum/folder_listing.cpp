@@ -120,6 +120,9 @@ void appendAll(RecordBuilder& builder, size_t count, std::list<DIRENTRY_INFO>& e
 }  // namespace
 }  // namespace orvel
 
+OrvEnum::OrvEnum() = default;
+OrvEnum::~OrvEnum() = default;
+
 bool OrvEnum::OrvLibDirEntryListEnum(const char* path, const char* realPath, const char* sortBy, int additional,
                                      unsigned long offset, unsigned long limit, bool ascending,
                                      _tag_dir_entry_type_ type, std::vector<FileSearch::FindComp*> criteria,

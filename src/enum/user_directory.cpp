@@ -22,7 +22,7 @@ std::string OrvelUserEnum::GetGroupNameByGID(unsigned int gid) {
 bool OrvelUserEnum::UpdateUserInfoMap(unsigned int uid, bool /*flag*/) {
     return orvel::guardedQuietly(false, [&] {
         orvel::UserRecord user;
-        if (VEXOUserGetByUID(uid, orvel::acquire(user)) < 0 || !user) return false;
+        if (VEXOUserGetByUID(uid, orvel::acquire(user)) < 0) return false;
         users_[uid].name = user->szName;
         return true;
     });
@@ -31,7 +31,7 @@ bool OrvelUserEnum::UpdateUserInfoMap(unsigned int uid, bool /*flag*/) {
 bool OrvelUserEnum::UpdateGroupInfoMap(unsigned int gid, bool /*flag*/) {
     return orvel::guardedQuietly(false, [&] {
         orvel::GroupRecord group;
-        if (VEXOGroupGetByGID(gid, orvel::acquire(group)) < 0 || !group) return false;
+        if (VEXOGroupGetByGID(gid, orvel::acquire(group)) < 0) return false;
         groups_[gid].name = group->szName;
         return true;
     });

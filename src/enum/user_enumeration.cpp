@@ -8,6 +8,7 @@
 
 #include "core/boundary.h"
 #include "core/owned.h"
+#include "enum/group_ids.h"
 #include "orvel/listing.h"
 #include "util/printable.h"
 
@@ -43,6 +44,24 @@ std::optional<unsigned int> parseId(const char* text) {
 
 }  // namespace
 
+bool orvel::appendGroupIds(PVLIBCSZLIST list, std::list<unsigned int>& gids) {
+    for (int i = 0; i < list->nItem; ++i) {
+        const char* text = VLIBCSzListGet(list, i);
+        if (text == nullptr) {
+            syslog(LOG_ERR, "%s:%d Get NULL from VEXOGroupInfoGetgroupList", kSource, __LINE__);
+            return false;
+        }
+        const auto gid = parseId(text);
+        if (!gid) {
+            syslog(LOG_ERR, "%s:%d Get Error Formate from VEXOGroupInfoGetgroupList (%s)", kSource, __LINE__,
+                   printable(text).c_str());
+            return false;
+        }
+        gids.push_back(*gid);
+    }
+    return true;
+}
+
 bool OrvEnum::EnumAllUsers(std::map<unsigned int, _tag_USER_INFO_>& users, AUTH_TYPE type) {
     return orvel::guardedQuietly(false, [&] {
         const orvel::UserDatabase database(VEXOUserDBOpen());
@@ -74,20 +93,6 @@ bool OrvEnum::EnumUserGroups(std::list<unsigned int>& gids, std::string user) {
         // The outcome is the list alone: a failed look-up leaves it empty and means no groups.
         VEXOGroupInfoGetgroupList(user.c_str(), &raw, 0);
         const orvel::StringList list(raw);
-        for (int i = 0; i < list->nItem; ++i) {
-            const char* text = VLIBCSzListGet(list.get(), i);
-            if (text == nullptr) {
-                syslog(LOG_ERR, "%s:%d Get NULL from VEXOGroupInfoGetgroupList", kSource, __LINE__);
-                return false;
-            }
-            const auto gid = parseId(text);
-            if (!gid) {
-                syslog(LOG_ERR, "%s:%d Get Error Formate from VEXOGroupInfoGetgroupList (%s)", kSource, __LINE__,
-                       orvel::printable(text).c_str());
-                return false;
-            }
-            gids.push_back(*gid);
-        }
-        return true;
+        return orvel::appendGroupIds(list.get(), gids);
     });
 }

@@ -1,0 +1,523 @@
+#include "orvel/listing.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <climits>
+
+#include "fault_gate.h"
+#include "orvel/error_state.h"
+#include "orvel/privilege.h"
+#include "orvel/search_criteria.h"
+#include "support/appliance.h"
+#include "vexo/acl.h"
+#include "vexo/error.h"
+#include "vexo/stat.h"
+
+namespace {
+
+using support::announceLog;
+using support::kAliceUid;
+using support::kBobUid;
+using support::kUsersGid;
+using support::writeFile;
+using Names = std::vector<std::string>;
+
+constexpr int kEverything = 0x7F;
+
+Names namesOf(const std::list<DIRENTRY_INFO>& entries) {
+    Names names;
+    for (const auto& entry : entries) names.push_back(entry.name);
+    return names;
+}
+
+class ListingTest : public support::ApplianceTest {
+ protected:
+    void SetUp() override {
+        ApplianceTest::SetUp();
+        real_ = shareRoot("photo");
+    }
+
+    bool list(const char* sortBy = "name", int additional = 0, unsigned long offset = 0, unsigned long limit = 0,
+              bool ascending = true, _tag_dir_entry_type_ type = DIR_ENTRY_TYPE_ALL) {
+        entries_.clear();
+        return listing_.OrvLibDirEntryListEnum("/photo", real_.c_str(), sortBy, additional, offset, limit, ascending,
+                                               type, criteria_, entries_, &total_);
+    }
+    Names listed(const char* sortBy = "name", int additional = 0, unsigned long offset = 0, unsigned long limit = 0,
+                 bool ascending = true, _tag_dir_entry_type_ type = DIR_ENTRY_TYPE_ALL) {
+        EXPECT_TRUE(list(sortBy, additional, offset, limit, ascending, type)) << OrvLibGetErr();
+        return namesOf(entries_);
+    }
+    void file(const std::string& name, const std::string& text = "") { writeFile(real_ + "/" + name, text); }
+    void folder(const std::string& name) { support::makeFolder(real_ + "/" + name); }
+    // Two folders and four files that every column orders differently.
+    void makeMixedFolder();
+
+    std::string real_;
+    OrvEnum listing_;
+    std::vector<FileSearch::FindComp*> criteria_;
+    std::list<DIRENTRY_INFO> entries_;
+    unsigned long total_ = 99;
+};
+
+void ListingTest::makeMixedFolder() {
+    folder("beta");
+    folder("Alpha");
+    file("c.txt", "123");
+    file("B.jpg", "1");
+    file("a", "12345");
+    file("d.TXT", "12");
+    struct Facts {
+        const char* name;
+        mode_t mode;
+        time_t time;
+    };
+    for (const auto& [name, mode, time] :
+         {Facts{"beta", 0755, 5}, Facts{"Alpha", 0777, 4}, Facts{"c.txt", 0600, 300}, Facts{"B.jpg", 0644, 200},
+          Facts{"a", 0640, 100}, Facts{"d.TXT", 0400, 400}}) {
+        const std::string path = real_ + "/" + name;
+        ASSERT_EQ(chmod(path.c_str(), mode), 0);
+        const timespec times[2] = {{1000 - time, 0}, {time, 0}};
+        ASSERT_EQ(utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
+    }
+}
+
+TEST_F(ListingTest, Arguments) {
+    struct Case {
+        const char *path, *real;
+        bool withTotal;
+        int code;
+    };
+    for (const auto& [path, real, withTotal, code] :
+         {Case{nullptr, "/tmp", true, 400}, Case{"", "/tmp", true, 400}, Case{"/photo", nullptr, true, 400},
+          Case{"/photo", "", true, 400}, Case{"/photo", "/tmp", false, 400}, Case{"/", "/tmp", true, 407},
+          Case{"/", "", true, 400}}) {
+        OrvLibSetErr(0);
+        total_ = 99;
+        EXPECT_FALSE(listing_.OrvLibDirEntryListEnum(path, real, "name", 0, 0, 0, true, DIR_ENTRY_TYPE_ALL, {},
+                                                     entries_, withTotal ? &total_ : nullptr));
+        EXPECT_EQ(OrvLibGetErr(), code);
+        EXPECT_EQ(total_, 99U);
+    }
+}
+
+TEST_F(ListingTest, FolderThatCannotBeListed) {
+    struct Case {
+        const char* what;
+        std::string real;
+        bool remote;
+        int code;
+        bool logged;
+    };
+    file("plain");
+    const Case cases[] = {
+        {"missing", real_ + "/none", false, ORV_ERR_MISSING, false},
+        {"missing, network mount", real_ + "/none2", true, ORV_ERR_REMOTE, false},
+        {"a file", real_ + "/plain", false, ORV_ERR_DIRECTORY, true},
+        {"a file, network mount", real_ + "/plain", true, ORV_ERR_DIRECTORY, true},
+        {"below a file", real_ + "/plain/x", false, ORV_ERR_DIRECTORY, true},
+        {"name too long", real_ + "/" + std::string(300, 'x'), false, ORV_ERR_DIRECTORY, true},
+        {"path too long", std::string(5000, '/') + "tmp", false, ORV_ERR_DIRECTORY, true},
+    };
+    for (const auto& [what, real, remote, code, logged] : cases) {
+        if (remote) addMount(real, "nfs");
+        if (logged) announceLog("Failed to access " + real);
+        OrvLibSetErr(0);
+        total_ = 99;
+        EXPECT_FALSE(listing_.OrvLibDirEntryListEnum("/photo", real.c_str(), "name", 0, 0, 0, true, DIR_ENTRY_TYPE_ALL,
+                                                     {}, entries_, &total_));
+        EXPECT_EQ(OrvLibGetErr(), code) << what;
+        EXPECT_EQ(total_, 0U) << what;
+    }
+}
+
+TEST_F(ListingTest, FolderOfAnotherUser) {
+    SKIP_WITHOUT_ROOT();
+    for (const mode_t mode : {0, 0444, 0111}) {  // neither entering nor opening alone is enough
+        ASSERT_EQ(chmod(real_.c_str(), mode), 0);
+        support::asUser(kBobUid, kUsersGid, [&] {
+            EXPECT_FALSE(list());
+            EXPECT_EQ(OrvLibGetErr(), ORV_ERR_DENIED);
+            return 0;
+        });
+    }
+    ASSERT_EQ(chmod(real_.c_str(), 0755), 0);
+    writeFile(real_ + "/secret", "x", 0);
+    support::asUser(kBobUid, kUsersGid, [&] {
+        EXPECT_EQ(listed("name", kEverything), Names{"secret"}) << "a status needs no right to read the file";
+        EXPECT_EQ(entries_.front().aclPrivilege, 0U);
+        return 0;
+    });
+}
+
+TEST_F(ListingTest, KeepsFilesAndFoldersOnly) {
+    folder("folder");
+    folder("@tmp");
+    folder("@vexoea");
+    folder("@tmpx");
+    file("file");
+    file(".hidden-by-dot");
+    ASSERT_EQ(symlink("file", (real_ + "/link-file").c_str()), 0);
+    ASSERT_EQ(symlink("folder", (real_ + "/link-folder").c_str()), 0);
+    ASSERT_EQ(symlink("nowhere", (real_ + "/link-broken").c_str()), 0);
+    ASSERT_EQ(mkfifo((real_ + "/fifo").c_str(), 0666), 0);
+    sockaddr_un address = {AF_UNIX, {}};
+    snprintf(address.sun_path, sizeof address.sun_path, "%s/socket", real_.c_str());
+    const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
+    ASSERT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+    close(fd);
+
+    const Names folders{"@tmpx", "folder"};
+    const Names files{".hidden-by-dot", "file"};
+    const Names all{"@tmpx", "folder", ".hidden-by-dot", "file"};
+    for (const int additional : {0, 1, kEverything}) {
+        EXPECT_EQ(listed("name", additional), all) << additional;
+        EXPECT_EQ(listed("name", additional, 0, 0, true, DIR_ENTRY_TYPE_DIR), folders) << additional;
+        EXPECT_EQ(listed("name", additional, 0, 0, true, DIR_ENTRY_TYPE_FILE), files) << additional;
+        EXPECT_EQ(listed("name", additional, 0, 0, true, static_cast<_tag_dir_entry_type_>(3)), all) << additional;
+    }
+    char cwd[PATH_MAX];
+    EXPECT_STREQ(getcwd(cwd, sizeof cwd), "/");
+}
+
+TEST_F(ListingTest, NamesAreBytes) {
+    const Names names{"%s%n", std::string(255, 'a'), "\xC3\xA4.\xC3\xA4", "new\nline", "\x80\xFF"};
+    for (const auto& name : names) file(name);
+    auto found = listed(nullptr, kEverything);
+    EXPECT_TRUE(std::is_permutation(found.begin(), found.end(), names.begin(), names.end()));
+    for (const auto& entry : entries_) {
+        EXPECT_EQ(entry.path, "/photo/" + entry.name);
+        EXPECT_EQ(entry.realPath, real_ + "/" + entry.name);
+        EXPECT_EQ(entry.type, entry.name == names[2] ? "\xC3\xA4" : "") << "upper case of the C locale";
+    }
+}
+
+// What the listing fills, by descriptor and folder, is what FillFileInfo fills, by path.
+TEST_F(ListingTest, RecordsEqualThoseOfFillFileInfo) {
+    makeMixedFolder();
+    folder("mounted");
+    folder("image");
+    addMount(real_ + "/mounted", "cifs");
+    addMount(real_ + "/image", "udf");
+    const auto compare = [&] {
+        for (int additional = 0; additional <= kEverything; ++additional) {
+            EXPECT_TRUE(list("name", additional));
+            EXPECT_EQ(entries_.size(), 8U);
+            for (const auto& entry : entries_) {
+                DIRENTRY_INFO info;
+                EXPECT_EQ(listing_.FillFileInfo(("/photo/" + entry.name).c_str(), (real_ + "/" + entry.name).c_str(),
+                                                entry.name.c_str(), DIR_ENTRY_TYPE_ALL,
+                                                entry.isDirectory ? DT_DIR : DT_REG, additional, info),
+                          0);
+                const auto fields = [](const DIRENTRY_INFO& i) {
+                    return std::tie(i.name, i.path, i.realPath, i.type, i.size, i.mode, i.aclPrivilege, i.isAclMode,
+                                    i.mtime, i.ctime, i.crtime, i.atime, i.uid, i.owner, i.gid, i.group, i.isDirectory,
+                                    i.mountPointType, i.shareAccessRight, i.freeSpace);
+                };
+                EXPECT_EQ(fields(entry), fields(info)) << entry.name << " " << additional;
+            }
+        }
+        return 0;
+    };
+    compare();
+    if (geteuid() == 0) support::asUser(kBobUid, kUsersGid, compare);
+}
+
+TEST_F(ListingTest, Properties) {
+    file("report.tar.gz", "12345");
+    const std::string path = real_ + "/report.tar.gz";
+    if (geteuid() == 0) {
+        ASSERT_EQ(chown(path.c_str(), kAliceUid, kUsersGid), 0);
+    }
+    ASSERT_EQ(chmod(path.c_str(), 0640), 0);
+    const timespec times[2] = {{1000, 0}, {0x1'0000'0005, 0}};
+    ASSERT_EQ(utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
+    folder("disc.d");
+    addMount(real_ + "/disc.d", "iso9660");
+    struct stat status;
+    ASSERT_EQ(stat(path.c_str(), &status), 0);
+
+    ASSERT_EQ(listed("name", kEverything), (Names{"disc.d", "report.tar.gz"}));
+    const auto& disc = entries_.front();
+    EXPECT_TRUE(disc.isDirectory);
+    EXPECT_EQ(disc.mountPointType, "iso");
+    EXPECT_EQ(disc.type, "") << "folders have no type";
+    const auto& info = entries_.back();
+    EXPECT_FALSE(info.isDirectory);
+    EXPECT_EQ(info.type, "GZ");
+    EXPECT_EQ(info.size, 5);
+    EXPECT_EQ(info.mode, 0100640U);
+    EXPECT_EQ(info.aclPrivilege, GetACLPrivilege(path.c_str()));
+    EXPECT_EQ(info.isAclMode, VEXOACLIsSupport(path.c_str(), -1, 2) > 0 ? 1 : 0);
+    EXPECT_EQ(info.atime, 1000U);
+    EXPECT_EQ(info.mtime, static_cast<uint32_t>(status.st_mtime));
+    EXPECT_EQ(info.ctime, static_cast<uint32_t>(status.st_ctime));
+    EXPECT_NE(info.crtime, 0U);
+    EXPECT_EQ(info.uid, status.st_uid);
+    EXPECT_EQ(info.mountPointType, "");
+    EXPECT_EQ(info.shareAccessRight, 4U);
+    if (geteuid() == 0) {
+        EXPECT_EQ(info.owner, "alice");
+        EXPECT_EQ(info.group, "users");
+    }
+
+    ASSERT_TRUE(list("name", 0));
+    const auto& bare = entries_.back();
+    EXPECT_EQ(bare.realPath + bare.type + bare.owner + bare.group + bare.mountPointType, "");
+    EXPECT_EQ(bare.size + bare.mode + bare.mtime + bare.uid + bare.gid, 0);
+    ASSERT_TRUE(list("size", 0));
+    EXPECT_EQ(entries_.back().size, 5) << "the sort column is filled";
+    EXPECT_EQ(entries_.back().mode, 0U);
+}
+
+TEST_F(ListingTest, OwnersAndMountsAreAskedOncePerListing) {
+    for (const char* name : {"a", "b", "c", "d"}) file(name);
+    ASSERT_TRUE(list("name", kEverything));
+    EXPECT_EQ(vexo::gate::calls("VEXOUserGetByUID"), 1);
+    EXPECT_EQ(vexo::gate::calls("VEXOGroupGetByGID"), 1);
+    EXPECT_EQ(vexo::gate::calls("VLIBCFileLStatAt"), 4);
+    EXPECT_EQ(vexo::gate::calls("VEXOACLFolderOpen"), 1);
+    EXPECT_EQ(vexo::gate::calls("VEXOACLPermGet"), 0);
+}
+
+TEST_F(ListingTest, NoStatusIsReadWithoutNeed) {
+    file("a");
+    folder("b");
+    for (const int additional : {0, int{ADDITIONAL_REAL_PATH}}) {
+        EXPECT_EQ(listed("name", additional), (Names{"b", "a"}));
+        EXPECT_EQ(entries_.back().realPath, additional == 0 ? "" : real_ + "/a");
+    }
+    EXPECT_EQ(vexo::gate::calls("VLIBCFileLStatAt"), 0);
+}
+
+TEST_F(ListingTest, ReadingOrderWithoutASortKey) {
+    makeMixedFolder();
+    auto order = listed(nullptr);
+    std::reverse(order.begin(), order.end());
+    EXPECT_EQ(listed(nullptr, 0, 0, 0, false), order) << "reversed also without a key";
+}
+
+TEST_F(ListingTest, Columns) {
+    makeMixedFolder();
+    struct Case {
+        const char* key;
+        Names order;
+    };
+    const Case cases[] = {
+        {"name", {"Alpha", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
+        {"anything", {"Alpha", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
+        {"size", {"Alpha", "beta", "B.jpg", "d.TXT", "c.txt", "a"}},
+        {"mtime", {"Alpha", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
+        {"atime", {"beta", "Alpha", "d.TXT", "c.txt", "B.jpg", "a"}},
+        {"posix", {"beta", "Alpha", "d.TXT", "c.txt", "a", "B.jpg"}},
+        {"type", {"Alpha", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
+    };
+    for (const auto& [key, order] : cases) {
+        EXPECT_EQ(listed(key), order) << key;
+        auto reversed = order;
+        std::reverse(reversed.begin(), reversed.end());
+        EXPECT_EQ(listed(key, 0, 0, 0, false), reversed) << key;
+        for (const unsigned long offset : {0UL, 1UL, 4UL, 6UL, ULONG_MAX}) {
+            for (const unsigned long limit : {1UL, 3UL, ULONG_MAX}) {
+                for (const bool ascending : {true, false}) {
+                    const auto& whole = ascending ? order : reversed;
+                    const size_t begin = std::min<size_t>(offset, whole.size());
+                    const size_t end = begin + std::min<size_t>(limit, whole.size() - begin);
+                    EXPECT_EQ(listed(key, 0, offset, limit, ascending),
+                              Names(whole.begin() + begin, whole.begin() + end))
+                        << key << " " << offset << " " << limit;
+                    EXPECT_EQ(total_, 6U) << "counted before the page is cut";
+                }
+            }
+        }
+        EXPECT_EQ(listed(key, 0, 3, 0), order) << "limit 0 ignores the offset";
+    }
+}
+
+TEST_F(ListingTest, EntriesThatTheCallerHadTakePart) {
+    for (const char* name : {"a", "c", "e"}) file(name);
+    for (const bool ascending : {true, false}) {
+        entries_.clear();
+        for (const char* name : {"d", "b"}) {
+            entries_.emplace_back().name = name;
+        }
+        ASSERT_TRUE(listing_.OrvLibDirEntryListEnum("/photo", real_.c_str(), "name", 0, 1, 3, ascending,
+                                                    DIR_ENTRY_TYPE_ALL, {}, entries_, &total_));
+        EXPECT_EQ(namesOf(entries_), (ascending ? Names{"b", "c", "d"} : Names{"d", "c", "b"}));
+        EXPECT_EQ(total_, 5U);
+    }
+}
+
+class Accepting : public FileSearch::FindComp {
+ public:
+    explicit Accepting(std::string part) : part_(std::move(part)) {}
+    bool operator()(const char* path, const _tag_VEXOSTAT_& status) override {
+        asked.emplace_back(path);
+        EXPECT_EQ(status.st_mode, 0U);
+        EXPECT_EQ(status.st_size + status.st_modify, 0);
+        return asked.back().find(part_) != std::string::npos;
+    }
+    Names asked;
+
+ private:
+    std::string part_;
+};
+
+TEST_F(ListingTest, AllCriteriaMustAcceptTheName) {
+    for (const char* name : {"ax", "bx", "ay", "@tmp"}) file(name);
+    Accepting first("a"), second("x");
+    criteria_ = {&first, &second};
+    EXPECT_EQ(listed("name", kEverything), Names{"ax"});
+    std::sort(first.asked.begin(), first.asked.end());
+    EXPECT_EQ(first.asked, (Names{"ax", "ay", "bx"})) << "hidden names are not asked about";
+    EXPECT_EQ(second.asked.size(), 2U) << "the first refusal decides";
+    EXPECT_EQ(vexo::gate::calls("VLIBCFileLStatAt"), 1);
+    EXPECT_EQ(total_, 1U);
+}
+
+struct StatusFault {
+    int systemCode;
+    bool remote;
+    int result;  // of FillFileInfo
+    int code;
+    bool unreachable, logged;
+};
+const StatusFault kStatusFaults[] = {
+    {ENOENT, false, 1, 0, false, false},
+    {EIO, false, -1, 0, false, true},
+    {ENXIO, false, -1, 0, false, true},
+    {EHOSTDOWN, false, -1, 0, false, true},
+    {ENOENT, true, 1, 0, true, false},
+    {EIO, true, 1, 0, true, false},
+    {ENXIO, true, 1, 0, true, false},
+    {EHOSTDOWN, true, 1, 0, true, false},
+    {EACCES, true, -1, ORV_ERR_DENIED, false, true},
+    {EPERM, false, -1, ORV_ERR_DENIED, false, true},
+    {ELOOP, false, -1, ORV_ERR_GENERAL, false, true},
+    {ESTALE, true, -1, ORV_ERR_GENERAL, false, true},
+};
+
+TEST_F(ListingTest, FailingStatusOfOneEntry) {
+    for (const auto& fault : kStatusFaults) {
+        ApplianceTest::SetUp();
+        folder("dir");
+        const std::string child = real_ + "/dir";
+        if (fault.remote) addMount(child, "nfs4");
+        const std::string context = std::string(strerror(fault.systemCode)) + (fault.remote ? ", remote" : "");
+        const std::string line = "Failed to stat " + child + ". " + strerror(fault.systemCode);
+        OrvEnum fresh;
+
+        if (fault.logged) announceLog(line);
+        vexo::gate::fail("VLIBCFileLStat", VEXO_ERR_GENERAL, fault.systemCode);
+        DIRENTRY_INFO info;
+        EXPECT_EQ(fresh.FillFileInfo("/photo/dir", child.c_str(), "dir", DIR_ENTRY_TYPE_ALL, DT_UNKNOWN, 0x02, info),
+                  fault.result)
+            << context;
+        EXPECT_EQ(OrvLibGetErr(), fault.code) << context;
+        EXPECT_EQ(info.mountPointType, fault.unreachable ? "remotefail" : "") << context;
+        EXPECT_EQ(info.isDirectory, fault.unreachable) << context;
+
+        OrvLibSetErr(0);
+        if (fault.logged) announceLog(line);
+        vexo::gate::fail("VLIBCFileLStatAt", VEXO_ERR_GENERAL, fault.systemCode);
+        std::list<DIRENTRY_INFO> entries;
+        EXPECT_EQ(fresh.OrvLibDirEntryListEnum("/photo", real_.c_str(), "name", kEverything, 0, 0, true,
+                                               DIR_ENTRY_TYPE_ALL, {}, entries, &total_),
+                  fault.result != -1)
+            << context;
+        EXPECT_EQ(OrvLibGetErr(), fault.code) << context;
+        ASSERT_EQ(entries.size(), fault.unreachable ? 1U : 0U) << context;
+        EXPECT_EQ(total_, entries.size());
+        if (fault.unreachable) {
+            EXPECT_EQ(entries.front().mountPointType, "remotefail");
+            EXPECT_TRUE(entries.front().isDirectory);
+            EXPECT_EQ(entries.front().realPath, child);
+            EXPECT_EQ(entries.front().mode + entries.front().aclPrivilege, 0U);
+        }
+        ApplianceTest::TearDown();
+    }
+}
+
+TEST_F(ListingTest, EntriesBeforeTheFailureStay) {
+    for (const char* name : {"a", "b", "c"}) file(name);
+    const auto order = listed(nullptr);
+    vexo::gate::reset();
+    vexo::gate::fail("VLIBCFileLStatAt", VEXO_ERR_DENIED, EACCES, 3);
+    vexo::gate::fail("VEXOUserGetByUID", VEXO_ERR_USER_MISSING, ENOENT);
+    announceLog("Failed to stat " + real_ + "/" + order[2]);
+    EXPECT_FALSE(list("name", kEverything, 1, 1));
+    EXPECT_EQ(OrvLibGetErr(), ORV_ERR_DENIED);
+    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_DENIED) << "what failed, not what was tried after";
+    EXPECT_EQ(namesOf(entries_), Names(order.begin(), order.begin() + 2)) << "in reading order, not paged";
+    EXPECT_EQ(entries_.front().realPath, real_ + "/" + order[0]);
+    EXPECT_NE(entries_.front().mode, 0U);
+    EXPECT_EQ(total_, 0U);
+}
+
+TEST_F(ListingTest, PermissionsThatCannotBeAsked) {
+    file("a");
+    struct Case {
+        int code;
+        bool logged;
+    };
+    for (const auto& [code, logged] : {Case{VEXO_ERR_GENERAL, true}, Case{VEXO_ERR_READ_ONLY, true},
+                                       Case{VEXO_ERR_DENIED, false}, Case{VEXO_ERR_NO_ACL, false}}) {
+        vexo::gate::reset();
+        vexo::gate::fail("VEXOACLFolderPermGet", code);
+        vexo::gate::fail("VEXOACLPermGet", code);
+        if (logged) announceLog("Failed to get the ACL Privilege: file = " + real_ + "/a");
+        ASSERT_TRUE(list("name", ADDITIONAL_PERM));
+        EXPECT_EQ(entries_.front().aclPrivilege, 0x1FFFU);
+    }
+    vexo::gate::reset();
+    vexo::gate::fail("VEXOACLFolderOpen", VEXO_ERR_GENERAL);
+    vexo::gate::fail("VEXOACLIsSupport", VEXO_ERR_GENERAL);
+    ASSERT_TRUE(list("name", ADDITIONAL_PERM));
+    EXPECT_EQ(entries_.front().aclPrivilege, GetACLPrivilege((real_ + "/a").c_str()));
+    EXPECT_EQ(entries_.front().isAclMode, 0);
+}
+
+TEST_F(ListingTest, FillFileInfoByTypeOfEntry) {
+    file("f");
+    folder("d");
+    ASSERT_EQ(mkfifo((real_ + "/p").c_str(), 0666), 0);
+    struct Case {
+        const char* name;
+        unsigned char dType;
+        _tag_dir_entry_type_ filter;
+        int additional, result, statusCalls;
+    };
+    constexpr auto kAll = DIR_ENTRY_TYPE_ALL;
+    constexpr auto kDirs = DIR_ENTRY_TYPE_DIR;
+    constexpr auto kFiles = DIR_ENTRY_TYPE_FILE;
+    for (const auto& [name, dType, filter, additional, result, statusCalls] :
+         {Case{"f", DT_REG, kAll, 1, 0, 0}, Case{"f", DT_REG, kAll, 2, 0, 1}, Case{"f", DT_REG, kDirs, 2, 1, 0},
+          Case{"d", DT_DIR, kFiles, 1, 1, 0}, Case{"d", DT_DIR, kDirs, 0, 0, 0}, Case{"p", DT_FIFO, kAll, 2, 1, 0},
+          Case{"f", DT_LNK, kAll, 0, 1, 0}, Case{"f", DT_UNKNOWN, kAll, 0, 0, 1}, Case{"f", DT_UNKNOWN, kDirs, 0, 1, 1},
+          Case{"d", DT_UNKNOWN, kFiles, 0, 1, 1}, Case{"d", DT_UNKNOWN, kDirs, 0, 0, 1},
+          Case{"p", DT_UNKNOWN, kAll, 0, 1, 1},
+          // What readdir said may be out of date when the status is read.
+          Case{"p", DT_REG, kAll, 2, 1, 1}, Case{"d", DT_REG, kFiles, 2, 1, 1}, Case{"d", DT_REG, kAll, 2, 0, 1}}) {
+        vexo::gate::reset();
+        DIRENTRY_INFO info;
+        const std::string real = real_ + "/" + name;
+        EXPECT_EQ(listing_.FillFileInfo("/x", real.c_str(), "shown", filter, dType, additional, info), result) << name;
+        EXPECT_EQ(vexo::gate::calls("VLIBCFileLStat"), statusCalls) << name << int{dType};
+        EXPECT_EQ(info.name, "shown");
+        EXPECT_EQ(info.path, "/x");
+        EXPECT_EQ(info.realPath, (additional & 1) != 0 ? real : "");
+        EXPECT_TRUE(result != 0 || info.isDirectory == (*name == 'd'));
+    }
+    DIRENTRY_INFO info;
+    EXPECT_EQ(listing_.FillFileInfo(nullptr, "/tmp", "x", DIR_ENTRY_TYPE_ALL, DT_DIR, 0, info), -1);
+    EXPECT_EQ(OrvLibGetErr(), ORV_ERR_PARAMETER);
+}
+
+}  // namespace
