@@ -17,7 +17,8 @@ ApplicationList parseApplications(std::string_view text) {
         if (colon == std::string_view::npos || identifier.empty()) {
             list.malformed.push_back(number);
             // Whoever wrote it meant a restriction: it must not leave the application to everybody.
-            list.users.try_emplace(std::string(identifier.substr(0, identifier.find_first_of(" \t"))));
+            if (!identifier.empty())
+                list.users.try_emplace(std::string(identifier.substr(0, identifier.find_first_of(" \t"))));
             continue;
         }
         std::vector<std::string>& users = list.users[std::string(identifier)];
