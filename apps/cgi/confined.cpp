@@ -21,57 +21,23 @@
 namespace orvel::cgi {
 namespace {
 
-class Descriptor {
- public:
-    explicit Descriptor(int fd) : fd_(fd) {}
-    ~Descriptor() {
-        if (fd_ >= 0) close(fd_);
-    }
-    Descriptor(const Descriptor&) = delete;
-    Descriptor& operator=(const Descriptor&) = delete;
-    [[nodiscard]] int get() const { return fd_; }
-
- private:
-    int fd_;
-};
-
 struct ReleaseShare {
     void operator()(SDK::Share* share) const { SDK::Share::Release(share); }
 };
 
-int openBeneath(int root, const char* path, LinkPolicy policy) {
-    open_how how = {};
-    how.flags = O_PATH | O_DIRECTORY | O_CLOEXEC;
-    how.resolve = RESOLVE_BENEATH | RESOLVE_NO_MAGICLINKS;
-    if (policy == LinkPolicy::kNone) how.resolve |= RESOLVE_NO_SYMLINKS;
-    // The kernel gives up with EAGAIN when a folder is moved while it passes "..".
-    for (int attempt = 0;; ++attempt) {
-        const long fd = syscall(SYS_openat2, root, path, &how, sizeof how);
-        if (fd >= 0 || errno != EAGAIN || attempt == 100) return static_cast<int>(fd);
-    }
+Descriptor openRoot(const PathInfo& info) {
+    return Descriptor(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
 }
 
-// The path of an open folder, "" on failure.
-std::string pathOf(int fd) {
-    char path[PATH_MAX];
-    const std::string link = "/proc/self/fd/" + std::to_string(fd);
-    const ssize_t length = readlink(link.c_str(), path, sizeof path);
-    return length > 0 && length < static_cast<ssize_t>(sizeof path) ? std::string(path, static_cast<size_t>(length))
-                                                                    : "";
+// What follows the share root, "." for the root itself.
+std::string restOf(const PathInfo& info) {
+    std::string rest = info.realPath.substr(info.shareRoot.size());
+    rest.erase(0, std::min(rest.find_first_not_of('/'), rest.size()));
+    return rest.empty() ? "." : rest;
 }
 
 bool isServerDown(int error) {
     return error == EHOSTDOWN || error == ENXIO || error == EIO || error == ENOENT;
-}
-
-// Why the folder could not be opened, in the library's own terms.
-int refusalCode(int error, const std::string& realPath) {
-    if (error == EXDEV || error == ELOOP) return ORV_ERR_DENIED;
-    if (isServerDown(error) && VEXOFSIsInMountTable(realPath.c_str()) != -1 && VEXOFSIsRemoteFS() == 1) {
-        return ORV_ERR_REMOTE;
-    }
-    if (!CheckDirListPrivilege(realPath.c_str())) return OrvLibGetErr();
-    return ORV_ERR_DIRECTORY;
 }
 
 }  // namespace
@@ -87,19 +53,52 @@ LinkPolicy linkPolicyOf(const std::string& shareName) {
     return VexoConf::Info().Get("link_policy_" + name, "inside") == "inside" ? LinkPolicy::kInside : LinkPolicy::kNone;
 }
 
-int confinedFolder(const PathInfo& info, LinkPolicy policy, std::string& realPath) {
-    const Descriptor root(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    if (root.get() < 0) return refusalCode(errno, info.shareRoot);
-    std::string_view rest = std::string_view(info.realPath).substr(info.shareRoot.size());
-    rest.remove_prefix(std::min(rest.find_first_not_of('/'), rest.size()));
-    const Descriptor folder(openBeneath(root.get(), rest.empty() ? "." : std::string(rest).c_str(), policy));
-    if (folder.get() < 0) return refusalCode(errno, info.realPath);
+Descriptor openBeneath(const Descriptor& root, const std::string& path, LinkPolicy policy, int flags) {
+    open_how how = {};
+    how.flags = static_cast<unsigned>(flags) | O_CLOEXEC;
+    how.resolve = RESOLVE_BENEATH | RESOLVE_NO_MAGICLINKS;
+    if (policy == LinkPolicy::kNone) how.resolve |= RESOLVE_NO_SYMLINKS;
+    // The kernel gives up with EAGAIN when a folder is moved while it passes "..".
+    for (int attempt = 0;; ++attempt) {
+        const long fd = syscall(SYS_openat2, root.get(), path.c_str(), &how, sizeof how);
+        if (fd >= 0 || errno != EAGAIN || attempt == 100) return Descriptor(static_cast<int>(fd));
+    }
+}
 
-    const std::string canonicalRoot = pathOf(root.get());
-    const std::string canonical = pathOf(folder.get());
+std::string realPathOf(const Descriptor& folder) {
+    char path[PATH_MAX];
+    const ssize_t length = readlink(folder.path().c_str(), path, sizeof path);
+    const bool whole = length > 0 && length < static_cast<ssize_t>(sizeof path);
+    return whole ? std::string(path, static_cast<size_t>(length)) : "";
+}
+
+int refusalCode(int error, const std::string& realPath) {
+    if (error == EXDEV || error == ELOOP) return ORV_ERR_DENIED;
+    if (isServerDown(error) && VEXOFSIsInMountTable(realPath.c_str()) != -1 && VEXOFSIsRemoteFS() == 1) {
+        return ORV_ERR_REMOTE;
+    }
+    const int code = OrvParseErrnoToError(error, nullptr, nullptr);
+    return code != ORV_ERR_GENERAL ? code : ORV_ERR_DIRECTORY;
+}
+
+int confinedFolder(const PathInfo& info, LinkPolicy policy, std::string& realPath) {
+    const Descriptor root = openRoot(info);
+    if (!root) return refusalCode(errno, info.shareRoot);
+    const Descriptor folder = openBeneath(root, restOf(info), policy, O_PATH | O_DIRECTORY);
+    if (!folder) return refusalCode(errno, info.realPath);
+
+    const std::string canonicalRoot = realPathOf(root);
+    const std::string canonical = realPathOf(folder);
     if (canonicalRoot.empty() || !canonical.starts_with(canonicalRoot)) return ORV_ERR_DIRECTORY;
     realPath = info.shareRoot + canonical.substr(canonicalRoot.size());
     return ORV_ERR_NONE;
+}
+
+int confinedOpen(const PathInfo& info, LinkPolicy policy, int flags, Descriptor& opened) {
+    const Descriptor root = openRoot(info);
+    if (!root) return refusalCode(errno, info.shareRoot);
+    opened = openBeneath(root, restOf(info), policy, flags);
+    return opened ? ORV_ERR_NONE : refusalCode(errno, info.realPath);
 }
 
 }  // namespace orvel::cgi

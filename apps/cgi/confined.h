@@ -1,9 +1,10 @@
-// A folder of a share, opened so that nothing in its path leads out of the share.
+// Files and folders of a share, opened so that nothing in their path leads out of the share.
 #ifndef ORVEL_CGI_CONFINED_H
 #define ORVEL_CGI_CONFINED_H
 
 #include <string>
 
+#include "descriptor.h"
 #include "orvel/file_info.h"
 
 namespace orvel::cgi {
@@ -23,6 +24,18 @@ LinkPolicy linkPolicyOf(const std::string& shareName);
 // The library opens the result once more, by path: whoever swaps a folder of it for a link in between is bound by what
 // the kernel lets the calling identity read.
 int confinedFolder(const PathInfo& info, LinkPolicy policy, std::string& realPath);
+
+// Opens what `info` resolved to, as the calling identity, with the flags of open(2). 0 or a code as above.
+int confinedOpen(const PathInfo& info, LinkPolicy policy, int flags, Descriptor& opened);
+
+// Opens `path` beneath the open folder `root`; invalid, with errno, on failure.
+Descriptor openBeneath(const Descriptor& root, const std::string& path, LinkPolicy policy, int flags);
+
+// The path of an open folder, free of links; "" when it is longer than 4,095 bytes.
+std::string realPathOf(const Descriptor& folder);
+
+// The library code for a confined opening that failed with `error`.
+int refusalCode(int error, const std::string& realPath);
 
 }  // namespace orvel::cgi
 

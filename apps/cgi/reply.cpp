@@ -38,16 +38,39 @@ void beginReply(Output& out, Status status, const std::string& cookie) {
     out.text() += "\r\n";
 }
 
-void replyFailure(Output& out, Status status, const std::string& cookie, int code, std::string_view path) {
-    Json::Value reply;
-    reply["success"] = false;
-    Json::Value& error = reply["error"];
-    error["code"] = code;
-    error["key"] = OrvParseErrorToKTRString(code, nullptr);
-    error["path"] = readable(path);
-    if (!isUtf8(path)) error["path_raw"] = percentEncode(path);
+void putPath(Json::Value& object, const char* key, std::string_view path) {
+    object[key] = readable(path);
+    if (!isUtf8(path)) object[std::string(key) + "_raw"] = percentEncode(path);
+}
+
+void reply(Output& out, Status status, const std::string& cookie, int code, std::string_view path,
+           const Json::Value& data) {
+    Json::Value whole;
+    whole["success"] = code == ORV_ERR_NONE;
+    if (!data.isNull()) whole["data"] = data;
+    if (code != ORV_ERR_NONE) {
+        Json::Value& error = whole["error"];
+        error["code"] = code;
+        error["key"] = OrvParseErrorToKTRString(code, nullptr);
+        putPath(error, "path", path);
+    }
     beginReply(out, status, cookie);
-    appendJson(reply, out.text());
+    appendJson(whole, out.text());
+}
+
+void replyFailure(Output& out, Status status, const std::string& cookie, int code, std::string_view path) {
+    reply(out, status, cookie, code, path, Json::Value());
+}
+
+int runProgram(void (*serve)(Output& out)) {
+    Output out(1);
+    try {
+        serve(out);
+    } catch (...) {
+        // Memory is out. A reply that has begun cannot become another one.
+        return 1;
+    }
+    return out.finish() ? 0 : 1;
 }
 
 }  // namespace orvel::cgi

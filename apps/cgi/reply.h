@@ -5,6 +5,8 @@
 #ifndef ORVEL_CGI_REPLY_H
 #define ORVEL_CGI_REPLY_H
 
+#include <json/forwards.h>
+
 #include <string>
 #include <string_view>
 
@@ -26,8 +28,17 @@ enum class Status {
 // Writes the header. `cookie` is the value of a Set-Cookie line, "" for none.
 void beginReply(Output& out, Status status, const std::string& cookie);
 
-// The whole reply of a failure.
+// The whole reply: of a success when `code` is 0, else of the failure with that library code at `path`. Either way with
+// `data` unless it is null: what a request did before it failed.
+void reply(Output& out, Status status, const std::string& cookie, int code, std::string_view path,
+           const Json::Value& data);
 void replyFailure(Output& out, Status status, const std::string& cookie, int code, std::string_view path);
+
+// Sets `key` to `path`, readable, and where it is no UTF-8 `key` + "_raw" to its bytes, percent-encoded.
+void putPath(Json::Value& object, const char* key, std::string_view path);
+
+// The main function of a program: what `serve` writes is its reply. Returns the exit status.
+int runProgram(void (*serve)(Output& out));
 
 }  // namespace orvel::cgi
 

@@ -6,6 +6,7 @@
 #include "orvel/error_state.h"
 #include "orvel/identity.h"
 #include "orvel/share_path.h"
+#include "orvel/upload_check.h"
 #include "text.h"
 #include "vexo/filesystem.h"
 #include "vexo/session.h"
@@ -17,7 +18,6 @@ namespace orvel::cgi {
 namespace {
 
 constexpr const char* kApplication = "VEXO.QDS.App.Quorvane3.Instance";
-constexpr int kEveryCheck = 15;
 
 bool isTrustedProxy(const std::string& address) {
     const std::string proxies = VexoConf::Info().Get("trusted_proxies", "");
@@ -51,11 +51,12 @@ void dropForwardedFor() {
 
 Status admit(User& user) {
     WebMan session;
-    if (!session.IsAuthorized(kApplication, kEveryCheck, CGI_POSITION_DESKTOP)) return Status::kNotLoggedIn;
+    const bool authorized = IsAuthorized(session, kApplication);
     user.name = session.GetLoginUserName();
     user.sid = session.GetSessionId();
     user.cookie = session.GetNewCookie();
-    return VLIBUserPrivilegeHas(user.name.c_str(), kApplication) == 1 ? Status::kOk : Status::kForbidden;
+    if (authorized) return Status::kOk;
+    return user.name.empty() ? Status::kNotLoggedIn : Status::kForbidden;
 }
 
 int actAs(const char* sid, const std::string& user, bool needsHome) {

@@ -36,7 +36,7 @@ enum {
 };
 
 // How an upload treats a target that exists. Any nonzero value means that the caller has chosen.
-enum _tag__type_ : int { OVERWRITE_MODE_ERROR = 0, OVERWRITE_MODE_SKIP = 1, OVERWRITE_MODE_OVERWRITE = 2 };
+enum _tag__type_ : int { OVERWRITE_MODE_ERROR = 0, OVERWRITE_MODE_OVERWRITE = 1, OVERWRITE_MODE_SKIP = 2 };
 
 // The privilege of `user` on the share of `path`. `sid` is the login session; null: domain and directory users are
 // judged by the share's lists, like local ones. Returns 0 with `*privilege` (0, 1 or 2) and `*restrictionMask` (0 for

@@ -76,7 +76,7 @@ bool mayUpload(const char* user, const char* sid, const char* path, _tag__type_&
     UploadVerdict verdict = UploadVerdict::kAskTarget;
     if (!IsDirUserHome(path, nullptr) && !judgeShareUpload(user, sid, path, verdict)) return false;
     if (verdict == UploadVerdict::kGranted) {
-        overwriteMode = OVERWRITE_MODE_OVERWRITE;  // kept: the target is not looked at
+        overwriteMode = OVERWRITE_MODE_SKIP;  // existing files stay as they are; the target is not looked at
         return true;
     }
     return overwriteMode != OVERWRITE_MODE_ERROR || targetIsFree(user, path);

@@ -86,12 +86,5 @@ void serve(Output& out) {
 }  // namespace orvel::cgi
 
 int main() {
-    orvel::cgi::Output out(1);
-    try {
-        orvel::cgi::serve(out);
-    } catch (...) {
-        // Memory is out. A reply that has begun cannot become another one.
-        return 1;
-    }
-    return out.finish() ? 0 : 1;
+    return orvel::cgi::runProgram(orvel::cgi::serve);
 }

@@ -1,0 +1,220 @@
+// CGI program "upload": files into a share.
+//
+// As a raw body (PUT, or POST of any type but a form), from the query:
+//   path, path_raw   the file
+// As a form (POST multipart/form-data), from the query or from fields ahead of the files:
+//   path, path_raw   the folder; each file goes into it under its own name
+// And for both:
+//   overwrite        "error" (default), "skip" or "overwrite": what an existing file means
+//
+// "data" of the reply is {"files":[{"path","size","skipped"}]}. The first file that cannot be stored ends the request;
+// those before it stay, and are told in "data" beside the error. Folders that do not exist are made.
+#include <json/value.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdint>
+#include <cstdlib>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "multipart.h"
+#include "orvel/error_state.h"
+#include "orvel/upload_check.h"
+#include "reply.h"
+#include "request.h"
+#include "text.h"
+#include "upload/store.h"
+#include "vexo/web.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr size_t kPiece = size_t{256} * 1024;
+constexpr size_t kLongestField = 64 * 1024;
+
+std::optional<_tag__type_> modeOf(const std::string& word) {
+    if (word == "error") return OVERWRITE_MODE_ERROR;
+    if (word == "skip") return OVERWRITE_MODE_SKIP;
+    if (word == "overwrite") return OVERWRITE_MODE_OVERWRITE;
+    return std::nullopt;
+}
+
+struct Outcome {
+    Status status = Status::kOk;
+    int code = ORV_ERR_NONE;
+    std::string path;  // of the failure
+    std::vector<Json::Value> files;
+
+    bool fail(int libraryCode, const std::string& where, Status httpStatus = Status::kOk) {
+        status = httpStatus;
+        code = libraryCode;
+        path = where;
+        return false;
+    }
+    bool refuse(_tag_cgi_upload_errno_ error, const std::string& where) {
+        return fail(ConvUploadErrnoToAPIErr(error), where, Status::kBadRequest);
+    }
+    bool stored(const Upload& upload) {
+        Json::Value file;
+        putPath(file, "path", upload.path());
+        file["size"] = static_cast<Json::Int64>(upload.size());
+        file["skipped"] = upload.skipped();
+        files.push_back(file);
+        return true;
+    }
+};
+
+// Reads the announced body piece by piece. False when `take` refused one; the body's own end is told by `whole`.
+template <class Take>
+bool readBody(long long length, bool& whole, Take take) {
+    std::string piece(kPiece, '\0');
+    long long left = length;
+    while (left > 0 && isCancelled() == 0) {
+        const size_t wanted = std::min(kPiece, static_cast<size_t>(left));
+        const ssize_t got = read(0, piece.data(), wanted);
+        if (got < 0 && errno == EINTR) continue;
+        if (got <= 0) break;  // the client hung up
+        left -= got;
+        if (!take(std::string_view(piece.data(), static_cast<size_t>(got)))) return false;
+    }
+    whole = left == 0;
+    return true;
+}
+
+void storeRaw(const User& user, const VEXO::WebCGI& web, long long length, Outcome& outcome) {
+    const auto path = pathParam(web);
+    const auto mode = modeOf(web.GetParam("overwrite", "error"));
+    if (!path || !mode) {
+        outcome.fail(ORV_ERR_PARAMETER, web.GetParam("path", ""), Status::kBadRequest);
+        return;
+    }
+    Upload upload(user, *path, *mode);
+    int code = upload.begin();
+    bool whole = false;
+    if (code == ORV_ERR_NONE) {
+        readBody(length, whole, [&](std::string_view data) { return (code = upload.write(data)) == ORV_ERR_NONE; });
+    }
+    if (code == ORV_ERR_NONE && !whole) {
+        outcome.refuse(CGI_UPLOAD_SIZE, upload.path());
+        return;
+    }
+    if (code == ORV_ERR_NONE) code = upload.finish();
+    static_cast<void>(code == ORV_ERR_NONE ? outcome.stored(upload) : outcome.fail(code, upload.path()));
+}
+
+// Takes the parts of a form: fields until the first file, then files.
+class FormStore final : public PartSink {
+ public:
+    FormStore(const User& user, const VEXO::WebCGI& web, Outcome& outcome)
+        : user_(user), folder_(pathParam(web)), mode_(web.GetParam("overwrite", "error")), outcome_(outcome) {}
+
+    bool partBegin(const PartHeader& header) override {
+        field_ = header.isFile ? "" : header.name;
+        value_.clear();
+        if (!header.isFile || header.fileName.empty()) return true;  // a form's file field that was left empty
+        const auto mode = modeOf(mode_);
+        if (!folder_ || folder_->empty() || !mode) return outcome_.refuse(CGI_UPLOAD_FIELD, folder_.value_or(""));
+        upload_ = std::make_unique<Upload>(user_, *folder_ + "/" + header.fileName, *mode);
+        return proceed(upload_->begin());
+    }
+
+    bool partData(std::string_view data) override {
+        if (upload_ != nullptr) return proceed(upload_->write(data));
+        if (field_.empty()) return true;
+        value_ += data;
+        return value_.size() <= kLongestField || outcome_.refuse(CGI_UPLOAD_FIELD, "");
+    }
+
+    bool partEnd() override {
+        if (upload_ != nullptr) {
+            if (!proceed(upload_->finish())) return false;
+            outcome_.stored(*upload_);
+            upload_.reset();
+            return true;
+        }
+        if (value_.find('\0') != std::string::npos) return outcome_.refuse(CGI_UPLOAD_FIELD, "");
+        if (field_ == "path") folder_ = value_;
+        if (field_ == "path_raw") folder_ = percentDecode(value_);
+        if (field_ == "overwrite") mode_ = value_;
+        return true;
+    }
+
+ private:
+    bool proceed(int code) { return code == ORV_ERR_NONE || outcome_.fail(code, upload_->path()); }
+
+    const User& user_;
+    std::optional<std::string> folder_;
+    std::string mode_;
+    Outcome& outcome_;
+    std::string field_, value_;
+    std::unique_ptr<Upload> upload_;
+};
+
+void storeForm(const User& user, const VEXO::WebCGI& web, const std::string& boundary, long long length,
+               Outcome& outcome) {
+    FormStore store(user, web, outcome);
+    MultipartReader reader(boundary, store);
+    bool whole = false;
+    readBody(length, whole, [&](std::string_view data) {
+        const auto status = reader.feed(data);
+        return status == MultipartReader::Status::kMore || status == MultipartReader::Status::kDone;
+    });
+    if (outcome.code != ORV_ERR_NONE) return;
+    if (reader.status() == MultipartReader::Status::kMalformed) outcome.refuse(CGI_UPLOAD_BAD_FORM, "");
+    if (reader.status() == MultipartReader::Status::kMore) outcome.refuse(CGI_UPLOAD_TORN_FORM, "");
+}
+
+std::string variable(const char* name) {
+    const char* value = getenv(name);
+    return value == nullptr ? "" : value;
+}
+
+// Nothing for a length that is missing, no number or more than a file can have.
+std::optional<long long> bodyLength() {
+    const auto length = parseNumber(variable("CONTENT_LENGTH"));
+    if (!length || *length > static_cast<unsigned long>(INT64_MAX)) return std::nullopt;
+    return static_cast<long long>(*length);
+}
+
+void receive(const User& user, const VEXO::WebCGI& web, Outcome& outcome) {
+    const std::string method = variable("REQUEST_METHOD"), type = variable("CONTENT_TYPE");
+    const auto length = bodyLength();
+    const bool posted = method == "POST";
+    if (!posted && method != "PUT") {
+        outcome.fail(ORV_ERR_PARAMETER, "", Status::kBadRequest);
+    } else if (!length) {
+        outcome.refuse(CGI_UPLOAD_SIZE, "");
+    } else if (const std::string boundary = boundaryOf(type); posted && !boundary.empty()) {
+        storeForm(user, web, boundary, *length, outcome);
+    } else if (posted && (type.starts_with("multipart/") || type.starts_with("application/x-www-form-urlencoded"))) {
+        outcome.refuse(CGI_UPLOAD_BAD_FORM, "");
+    } else {
+        storeRaw(user, web, *length, outcome);
+    }
+}
+
+void serve(Output& out) {
+    dropForwardedFor();
+    User user;
+    const Status admitted = admit(user);
+    if (admitted != Status::kOk) return replyFailure(out, admitted, "", ORV_ERR_DENIED, "");
+
+    const VEXO::WebCGI web;
+    Outcome outcome;
+    receive(user, web, outcome);
+    Json::Value data;
+    data["files"] = Json::Value(Json::arrayValue);
+    for (const Json::Value& file : outcome.files) data["files"].append(file);
+    reply(out, outcome.status, user.cookie, outcome.code, outcome.path, data);
+}
+
+}  // namespace
+}  // namespace orvel::cgi
+
+int main() {
+    return orvel::cgi::runProgram(orvel::cgi::serve);
+}

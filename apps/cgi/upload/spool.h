@@ -1,0 +1,39 @@
+// The temporary place of an upload, on the volume that it goes to.
+#ifndef ORVEL_CGI_UPLOAD_SPOOL_H
+#define ORVEL_CGI_UPLOAD_SPOOL_H
+
+#include <string>
+#include <string_view>
+
+#include "descriptor.h"
+
+namespace orvel::cgi {
+
+// A file without a name where the file system can make one, so that it goes away with the process, however that ends;
+// else one with a name of its own in a folder that only the user can enter.
+class Spool {
+ public:
+    Spool() = default;
+    ~Spool();
+    Spool(const Spool&) = delete;
+    Spool& operator=(const Spool&) = delete;
+
+    // Makes the file below the volume's temporary folder, as the calling identity. 0 or a library code.
+    int open(const std::string& volumePath);
+    // Appends. 0 or a library code.
+    int write(std::string_view data);
+    // A path under which the finished file can be read; "" on failure. It is gone with this object.
+    std::string publish();
+    [[nodiscard]] long long size() const { return size_; }
+
+ private:
+    int openFolder(const std::string& volumePath);
+
+    Descriptor folder_, file_;
+    std::string name_;  // "" while the file has none
+    long long size_ = 0;
+};
+
+}  // namespace orvel::cgi
+
+#endif

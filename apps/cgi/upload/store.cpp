@@ -1,0 +1,95 @@
+#include "upload/store.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <csignal>
+
+#include "orvel/activity_log.h"
+#include "orvel/error_state.h"
+#include "orvel/file_info.h"
+#include "orvel/name_check.h"
+#include "orvel/upload_check.h"
+
+namespace orvel::cgi {
+namespace {
+
+volatile std::sig_atomic_t terminated = 0;
+
+int lastCode() {
+    const int code = OrvLibGetErr();
+    return code != ORV_ERR_NONE ? code : ORV_ERR_GENERAL;
+}
+
+// The volume's temporary folder is made while the process still may; where it cannot be, the spool says so.
+void prepareVolume(std::string volumePath) {
+    static_cast<void>(OrvCreateTmpDir(volumePath.data()));
+    umask(022);  // that of every other file
+}
+
+}  // namespace
+
+int isCancelled() {
+    static const bool watching = [] {
+        struct sigaction action {};
+        action.sa_handler = [](int) { terminated = 1; };
+        return sigaction(SIGTERM, &action, nullptr) == 0;
+    }();
+    return watching && terminated != 0 ? 1 : 0;
+}
+
+int Upload::begin() {
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(user_.name.c_str(), path_, info_)) return lastCode();
+    path_ = info_.path;
+    prepareVolume(info_.volumePath);
+    int code = CheckFile(path_, user_.name.c_str(), user_.sid.c_str(), mode_);
+    if (code != ORV_ERR_NONE) return code;
+
+    Target target;
+    code = openTarget(info_, linkPolicyOf(info_.shareName), user_.name, true, target);
+    if (code != ORV_ERR_NONE) return code;
+    if (OrvCheckFileName(realPathOf(target.folder).c_str(), target.name.c_str()) != 0) return lastCode();
+    struct stat status {};
+    const bool there = fstatat(target.folder.get(), target.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
+    if (there && !S_ISREG(status.st_mode)) return ORV_ERR_EXISTS;
+    skipped_ = there && mode_ == OVERWRITE_MODE_SKIP;
+    return skipped_ ? ORV_ERR_NONE : spool_.open(info_.volumePath);
+}
+
+int Upload::write(std::string_view data) {
+    if (isCancelled() != 0) return ORV_ERR_UPLOAD_CANCELLED;
+    return skipped_ ? ORV_ERR_NONE : spool_.write(data);
+}
+
+// Unless an existing file may be replaced, the name is taken first, by an empty file that nobody else can have made:
+// what came into being since begin() is not replaced either.
+int Upload::finish() {
+    if (skipped_) return ORV_ERR_NONE;
+    Target target;
+    int code = openTarget(info_, linkPolicyOf(info_.shareName), user_.name, true, target);
+    if (code != ORV_ERR_NONE) return code;
+    const char* name = target.name.c_str();
+    bool reserved = false;
+    if (mode_ != OVERWRITE_MODE_OVERWRITE) {
+        const Descriptor mark(
+            openat(target.folder.get(), name, O_CREAT | O_EXCL | O_WRONLY | O_NOFOLLOW | O_CLOEXEC, 0666));
+        if (!mark && errno == EEXIST && mode_ == OVERWRITE_MODE_SKIP) {
+            skipped_ = true;
+            return ORV_ERR_NONE;
+        }
+        if (!mark) return OrvParseErrnoToError(errno, info_.shareName.c_str(), nullptr);
+        reserved = true;
+    }
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!MoveFile(user_.name.c_str(), spool_.publish().c_str(), target.folder.path(target.name).c_str(), isCancelled)) {
+        code = lastCode();
+        if (reserved) unlinkat(target.folder.get(), name, 0);
+        return code;
+    }
+    OrvLibDoLog(user_.name, path_, size(), ORVEL_ACTION_UPLOAD, false);
+    return ORV_ERR_NONE;
+}
+
+}  // namespace orvel::cgi

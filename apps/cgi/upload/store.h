@@ -1,0 +1,49 @@
+// Where the data of an upload goes: the checks before it comes, the place it takes after.
+#ifndef ORVEL_CGI_UPLOAD_STORE_H
+#define ORVEL_CGI_UPLOAD_STORE_H
+
+#include <string>
+#include <string_view>
+
+#include "orvel/privilege.h"
+#include "request.h"
+#include "target.h"
+#include "upload/spool.h"
+
+namespace orvel::cgi {
+
+// Set by SIGTERM (the web server's word that the client is gone): the upload ends and leaves nothing.
+int isCancelled();
+
+// One file on its way to one path: begin, write as the data comes, finish. Each answers 0 or a library code, after
+// which the object is only destroyed; nothing is left behind then.
+class Upload {
+ public:
+    Upload(const User& user, std::string path, _tag__type_ mode) : user_(user), path_(std::move(path)), mode_(mode) {}
+
+    // Asks every rule and takes on the user's identity.
+    int begin();
+    int write(std::string_view data);
+    // Puts the file in place and logs it.
+    int finish();
+
+    // An existing file was left as it is, as asked for; what is written is not kept. Known after begin().
+    [[nodiscard]] bool skipped() const { return skipped_; }
+    [[nodiscard]] const std::string& path() const { return path_; }
+    [[nodiscard]] long long size() const { return spool_.size(); }
+
+ private:
+    int reserve(bool& reserved);
+    [[nodiscard]] bool exists() const;
+
+    const User& user_;
+    std::string path_;
+    _tag__type_ mode_;
+    bool skipped_ = false;
+    PathInfo info_;
+    Spool spool_;
+};
+
+}  // namespace orvel::cgi
+
+#endif
