@@ -1,0 +1,153 @@
+// The transfer log: its lines and its file.
+#include <gtest/gtest.h>
+#include <json/reader.h>
+#include <json/value.h>
+#include <sys/mount.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <filesystem>
+#include <functional>
+#include <memory>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "platform/private_mounts.h"
+#include "support/appliance.h"
+#include "transfer_entry.h"
+#include "vexo/error.h"
+#include "vexo/xferlog.h"
+
+namespace {
+
+namespace fs = std::filesystem;
+
+class TransferLogTest : public support::ApplianceTest {
+ protected:
+    static Json::Value parse(const std::string& line) {
+        Json::Value value;
+        std::string faults;
+        const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());
+        EXPECT_TRUE(reader->parse(line.data(), line.data() + line.size(), &value, &faults)) << faults << line;
+        return value;
+    }
+    std::vector<std::string> lines() {
+        std::vector<std::string> all;
+        std::istringstream in(support::readFile(log_));
+        for (std::string line; std::getline(in, line);) all.push_back(line);
+        return all;
+    }
+    std::string log_ = systemRoot() + "/var/log/vexo/xfer.log";
+};
+
+TEST_F(TransferLogTest, AnEntryIsOneLineWhateverTheTexts) {
+    EXPECT_EQ(vexo::buildTransferEntry({1767323045, "::1", "alice", "upload", 12, "/photo/a", false}),
+              "{\"time\":\"2026-01-02T03:04:05Z\",\"address\":\"::1\",\"user\":\"alice\",\"action\":\"upload\","
+              "\"size\":12,\"path\":\"/photo/a\",\"flag\":false}\n");
+    const std::string odd = "/photo/\"q\\\n\x01\x7F\xC3\xA4 \xE2\x80\xA8%";
+    const Json::Value value = parse(vexo::buildTransferEntry({0, "a", "b", "c", -1, odd, true}));
+    EXPECT_EQ(value["path"].asString(), odd);
+    EXPECT_FALSE(value.isMember("path_raw"));
+    EXPECT_EQ(value["size"].asInt64(), -1);
+    EXPECT_TRUE(value["flag"].asBool());
+    const std::string broken = "/photo/\xFF\"\xE4%.jpg";
+    const std::string line = vexo::buildTransferEntry({0, "a", "b", "c", 0, broken, false});
+    EXPECT_EQ(parse(line)["path"].asString(), "/photo/\xEF\xBF\xBD\"\xEF\xBF\xBD%.jpg");
+    EXPECT_EQ(parse(line)["path_raw"].asString(), "/photo/%FF%22%E4%25.jpg");
+    EXPECT_EQ(line.find('\n'), line.size() - 1);
+}
+
+TEST_F(TransferLogTest, EntriesOfManyProcessesAreAllThereAndWhole) {
+    const mode_t before = umask(0);
+    constexpr int kWriters = 4;
+    constexpr int kEach = 200;
+    const std::string path = "/photo/" + std::string(3000, 'p');
+    std::vector<pid_t> children;
+    for (int writer = 0; writer < kWriters; ++writer) {
+        children.push_back(fork());
+        if (children.back() != 0) continue;
+        int failures = 0;
+        for (int i = 0; i < kEach; ++i)
+            failures += VEXOLogKTRFMXferLog("::1", "u", "upload", i, path.c_str(), true) != 0;
+        _exit(failures);
+    }
+    for (const pid_t child : children) {
+        int status = 0;
+        EXPECT_EQ(waitpid(child, &status, 0), child);
+        EXPECT_EQ(status, 0);
+    }
+    umask(before);
+    const auto all = lines();
+    EXPECT_EQ(all.size(), size_t{kWriters * kEach});
+    for (const std::string& line : all) EXPECT_EQ(parse(line)["path"].asString(), path);
+    struct stat status {};
+    ASSERT_EQ(stat(log_.c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode, mode_t{S_IFREG | 0600});
+    ASSERT_EQ(stat(fs::path(log_).parent_path().c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode, mode_t{S_IFDIR | 0755});
+}
+
+TEST_F(TransferLogTest, ASwitchedProgramStillLogsAndStaysSwitched) {
+    SKIP_WITHOUT_ROOT();
+    const auto body = [] {
+        if (setegid(support::kUsersGid) != 0 || seteuid(support::kAliceUid) != 0) return 97;
+        EXPECT_EQ(VEXOLogKTRFMXferLog("::1", "alice", "mkdir", 0, "/photo/a", true), 0);
+        EXPECT_EQ(geteuid(), uid_t{support::kAliceUid});
+        EXPECT_EQ(getegid(), gid_t{support::kUsersGid});
+        return 0;
+    };
+    EXPECT_EQ(support::inChild(body), 0);
+    ASSERT_EQ(lines().size(), 1U);
+    struct stat status {};
+    ASSERT_EQ(stat(log_.c_str(), &status), 0);
+    EXPECT_EQ(status.st_uid, 0U);
+}
+
+TEST_F(TransferLogTest, ALogThatOthersCouldHaveForgedIsNotWritten) {
+    const auto attempt = [] { return VEXOLogKTRFMXferLog("::1", "u", "delete", 0, "/photo/a", false); };
+    const std::string elsewhere = systemRoot() + "/elsewhere";
+    support::writeFile(elsewhere, "");
+    support::makeFolder(fs::path(log_).parent_path());
+    const struct {
+        const char* name;
+        std::function<void()> lay;
+    } traps[] = {{"link", [&] { fs::create_symlink(elsewhere, log_); }},
+                 {"second name", [&] { fs::create_hard_link(elsewhere, log_); }},
+                 {"writable by others", [&] { support::writeFile(log_, "", 0666); }},
+                 {"pipe", [&] { EXPECT_EQ(mkfifo(log_.c_str(), 0600), 0); }}};
+    for (const auto& trap : traps) {
+        SCOPED_TRACE(trap.name);
+        trap.lay();
+        EXPECT_EQ(attempt(), -1);
+        EXPECT_NE(errno, 0);
+        EXPECT_EQ(support::readFile(elsewhere), "");
+        ASSERT_EQ(unlink(log_.c_str()), 0);
+    }
+    EXPECT_EQ(attempt(), 0);
+    EXPECT_EQ(VEXOLogKTRFMXferLog(nullptr, "u", "delete", 0, "/photo/a", false), -1);
+    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_PARAMETER);
+    EXPECT_EQ(lines().size(), 1U);
+}
+
+TEST_F(TransferLogTest, AFullDiskLeavesNoTornLine) {
+    SKIP_WITHOUT_ROOT();
+    const std::string folder = fs::path(log_).parent_path();
+    support::makeFolder(folder);
+    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+        EXPECT_EQ(mount("none", folder.c_str(), "tmpfs", 0, "size=16k,mode=0755"), 0);
+        const std::string path = "/photo/" + std::string(3000, 'p');
+        size_t written = 0;
+        while (VEXOLogKTRFMXferLog("::1", "u", "upload", 0, path.c_str(), true) == 0 && written < 100) ++written;
+        EXPECT_EQ(errno, ENOSPC);
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_NO_SPACE);
+        EXPECT_GE(written, 1U);
+        EXPECT_EQ(lines().size(), written);
+        for (const std::string& line : lines()) EXPECT_EQ(parse(line)["path"].asString(), path);
+        return 0;
+    }));
+}
+
+}  // namespace
