@@ -18,6 +18,8 @@ std::string_view statusLine(Status status) {
             return "Status: 401 Unauthorized\r\n";
         case Status::kForbidden:
             return "Status: 403 Forbidden\r\n";
+        case Status::kNotFound:
+            return "Status: 404 Not Found\r\n";
         case Status::kTooLarge:
             return "Status: 413 Content Too Large\r\n";
         case Status::kBroken:

@@ -21,6 +21,7 @@ enum class Status {
     kBadRequest = 400,
     kNotLoggedIn = 401,
     kForbidden = 403,
+    kNotFound = 404,
     kTooLarge = 413,
     kBroken = 500
 };

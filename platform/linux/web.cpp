@@ -89,6 +89,14 @@ std::string WebCGI::GetParam(const std::string& name, const std::string& def) co
     return value == nullptr ? def : *value;
 }
 
+std::vector<std::string> WebCGI::GetParams(const std::string& name) const {
+    std::vector<std::string> values;
+    for (const auto& [field, value] : impl_->fields) {
+        if (field == name) values.push_back(value);
+    }
+    return values;
+}
+
 bool WebCGI::HasParam(const std::string& name) const {
     return impl_->find(name) != nullptr;
 }

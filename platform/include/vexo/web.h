@@ -5,6 +5,7 @@
 #include <json/value.h>
 
 #include <string>
+#include <vector>
 
 #include "vexo/export.h"
 
@@ -23,6 +24,8 @@ class VEXO_API WebCGI {
     // The first value of the parameter, percent-decoded ("+" is a blank; "%00" and broken escapes stay as they are);
     // `def` when absent. Query before body.
     std::string GetParam(const std::string& name, const std::string& def) const;
+    // Every value of the parameter, in the order of the request.
+    std::vector<std::string> GetParams(const std::string& name) const;
     bool HasParam(const std::string& name) const;
     bool BodyRefused() const;
     // The value of the first cookie of that name, `def` when absent.

@@ -1,0 +1,150 @@
+#include "download/archive.h"
+
+#include <archive.h>
+#include <archive_entry.h>
+#include <dirent.h>
+#include <fcntl.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <ctime>
+#include <memory>
+
+#include "vexo/filesystem.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr size_t kPiece = size_t{256} * 1024;
+constexpr int kDeepest = 256;  // descriptors stay open on the way down
+
+struct CloseDirectory {
+    void operator()(DIR* directory) const { closedir(directory); }
+};
+struct FreeEntry {
+    void operator()(archive_entry* entry) const { archive_entry_free(entry); }
+};
+
+// The names of a folder in byte order; false with errno.
+bool namesIn(const Descriptor& folder, std::vector<std::string>& names) {
+    const int fd = openat(folder.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    const std::unique_ptr<DIR, CloseDirectory> directory(fd < 0 ? nullptr : fdopendir(fd));
+    if (directory == nullptr) return false;
+    for (;;) {
+        errno = 0;
+        const dirent* entry = readdir(directory.get());
+        if (entry == nullptr) break;
+        if (VEXOEAIsHiddenFile(entry->d_name) == 0) names.emplace_back(entry->d_name);
+    }
+    std::sort(names.begin(), names.end());
+    return errno == 0;
+}
+
+}  // namespace
+
+ZipStream::ZipStream(int fd) : archive_(archive_write_new()) {
+    if (archive_ == nullptr || archive_write_set_format_zip(archive_) != ARCHIVE_OK ||
+        archive_write_set_options(archive_, "zip:hdrcharset=UTF-8") < ARCHIVE_WARN ||
+        archive_write_set_bytes_per_block(archive_, static_cast<int>(kPiece)) != ARCHIVE_OK ||
+        archive_write_set_bytes_in_last_block(archive_, 1) != ARCHIVE_OK ||
+        archive_write_open_fd(archive_, fd) != ARCHIVE_OK) {
+        broken_ = true;
+    }
+}
+
+ZipStream::~ZipStream() {
+    archive_write_free(archive_);
+}
+
+bool ZipStream::broken() {
+    broken_ = true;
+    return false;
+}
+
+void ZipStream::leaveOut(const std::string& name, const std::string& reason) {
+    leftOut_.push_back(name + ": " + reason);
+}
+
+bool ZipStream::begin(const std::string& name, const struct stat& status, long long size) {
+    const std::unique_ptr<archive_entry, FreeEntry> entry(archive_entry_new());
+    if (entry == nullptr) return broken();
+    archive_entry_set_pathname(entry.get(), name.c_str());
+    archive_entry_set_mode(entry.get(), status.st_mode & (S_IFMT | 0777));
+    archive_entry_set_mtime(entry.get(), status.st_mtim.tv_sec, status.st_mtim.tv_nsec);
+    if (size >= 0) archive_entry_set_size(entry.get(), size);
+    return archive_write_header(archive_, entry.get()) >= ARCHIVE_WARN || broken();
+}
+
+bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
+    struct stat status {};
+    if (fstat(file.get(), &status) != 0) return leaveOut(name, strerror(errno)), true;
+    if (!begin(name, status, status.st_size)) return false;
+    std::string piece(kPiece, '\0');
+    long long left = status.st_size;  // a file that grows meanwhile is cut there
+    while (left > 0) {
+        const ssize_t got = read(file.get(), piece.data(), std::min<size_t>(kPiece, static_cast<size_t>(left)));
+        if (got < 0 && errno == EINTR) continue;
+        if (got <= 0) {
+            leaveOut(name, got < 0 ? strerror(errno) : "became shorter while it was read");
+            break;
+        }
+        if (archive_write_data(archive_, piece.data(), static_cast<size_t>(got)) < 0) return broken();
+        left -= got;
+        bytes_ += got;
+    }
+    return archive_write_finish_entry(archive_) >= ARCHIVE_WARN || broken();
+}
+
+bool ZipStream::addChild(const Descriptor& folder, const std::string& child, const std::string& name) {
+    struct stat status {};
+    if (fstatat(folder.get(), child.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+        leaveOut(name, strerror(errno));
+        return true;
+    }
+    if (!S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode)) return true;
+    const Descriptor opened(
+        openat(folder.get(), child.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+    if (opened) return add(opened, name);
+    leaveOut(name, strerror(errno));
+    return true;
+}
+
+bool ZipStream::addFolder(const Descriptor& folder, const std::string& name) {
+    struct stat status {};
+    std::vector<std::string> names;
+    if (fstat(folder.get(), &status) != 0 || !begin(name + "/", status, -1)) return !broken_;
+    if (depth_ == kDeepest) return leaveOut(name, "too deep"), true;
+    if (!namesIn(folder, names)) leaveOut(name, strerror(errno));
+    ++depth_;
+    const bool going = std::all_of(names.begin(), names.end(), [&](const std::string& child) {
+        return addChild(folder, child, name + "/" + child);
+    });
+    --depth_;
+    return going;
+}
+
+bool ZipStream::add(const Descriptor& opened, const std::string& name) {
+    if (broken_) return false;
+    struct stat status {};
+    if (fstat(opened.get(), &status) != 0) return leaveOut(name, strerror(errno)), true;
+    if (S_ISDIR(status.st_mode)) return addFolder(opened, name);
+    if (S_ISREG(status.st_mode)) return addFile(opened, name);
+    return leaveOut(name, "neither a file nor a folder"), true;
+}
+
+bool ZipStream::finish() {
+    if (!leftOut_.empty() && !broken_) {
+        std::string text = "These could not be included:\n";
+        for (const std::string& line : leftOut_) text += line + "\n";
+        struct stat status {};
+        status.st_mode = S_IFREG | 0644;
+        status.st_mtim.tv_sec = time(nullptr);
+        if (begin("_not_included.txt", status, static_cast<long long>(text.size()))) {
+            broken_ = archive_write_data(archive_, text.data(), text.size()) < 0;
+        }
+    }
+    return !broken_ && archive_write_close(archive_) == ARCHIVE_OK;
+}
+
+}  // namespace orvel::cgi

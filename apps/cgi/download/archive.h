@@ -1,0 +1,49 @@
+// Several files and folders as one zip, written as it is made.
+#ifndef ORVEL_CGI_DOWNLOAD_ARCHIVE_H
+#define ORVEL_CGI_DOWNLOAD_ARCHIVE_H
+
+#include <sys/stat.h>
+
+#include <string>
+#include <vector>
+
+#include "descriptor.h"
+
+struct archive;
+
+namespace orvel::cgi {
+
+// A stream to a descriptor. What cannot be read is left out and told in a last member, "_not_included.txt". Members are
+// deflated, times and permissions kept; symbolic links and anything else but files and folders stay out.
+class ZipStream {
+ public:
+    explicit ZipStream(int fd);
+    ~ZipStream();
+    ZipStream(const ZipStream&) = delete;
+    ZipStream& operator=(const ZipStream&) = delete;
+
+    // Adds the open file or folder, with everything below it, under `name`. False when the reader is gone: stop.
+    bool add(const Descriptor& opened, const std::string& name);
+    // Notes that `name` is left out.
+    void leaveOut(const std::string& name, const std::string& reason);
+    // Writes the end. False when not everything arrived.
+    bool finish();
+    [[nodiscard]] long long bytes() const { return bytes_; }  // of the members, as they were
+
+ private:
+    bool addFile(const Descriptor& file, const std::string& name);
+    bool addFolder(const Descriptor& folder, const std::string& name);
+    bool addChild(const Descriptor& folder, const std::string& child, const std::string& name);
+    bool begin(const std::string& name, const struct stat& status, long long size);
+    bool broken();
+
+    struct archive* archive_;
+    std::vector<std::string> leftOut_;
+    long long bytes_ = 0;
+    bool broken_ = false;
+    int depth_ = 0;
+};
+
+}  // namespace orvel::cgi
+
+#endif
