@@ -25,6 +25,7 @@ namespace {
 using vexo::Descriptor;
 
 constexpr const char* kAcl = "system.posix_acl_access";
+constexpr const char* kDefaultAcl = "system.posix_acl_default";
 constexpr uid_t kKeepUser = static_cast<uid_t>(-1);
 constexpr gid_t kKeepGroup = static_cast<gid_t>(-1);
 constexpr mode_t kNewFile = 0666;
@@ -157,6 +158,34 @@ int errorOfPublishing(int systemCode) {
     }
 }
 
+// A new file in a folder with a default ACL gets its permissions from there, which only making it anew does.
+bool hasDefaultAcl(const Copy& copy) {
+    const std::string self = "/proc/self/fd/" + std::to_string(copy.folder.get());
+    return getxattr(self.c_str(), kDefaultAcl, nullptr, 0) > 0;
+}
+
+// Whether the source itself can become the target, as its owner allows.
+bool mayTake(const Copy& copy) {
+    struct stat folder {};
+    const struct stat& from = copy.sourceStatus;
+    return (copy.options.switches & VEXO_COPY_TAKE) != 0 && fstat(copy.folder.get(), &folder) == 0 &&
+           folder.st_dev == from.st_dev && from.st_nlink == 1 && (from.st_uid == geteuid() || geteuid() == 0) &&
+           (copy.exists || !hasDefaultAcl(copy));
+}
+
+// Moves the source into place. False with errno; nothing has changed then but the source's owner and permissions.
+bool take(const char* source, const Copy& copy) {
+    const int file = copy.source.get();
+    const bool permitted = copy.exists ? takeOverPermissions(copy, file) : vexo::setMode(file, kNewFile & ~kUmask);
+    if (!permitted || !vexo::setOwner(file, copy.options.uid, copy.options.gid)) return false;
+    if (copy.exists && fdatasync(file) != 0) return false;
+    if (copy.options.isCancelled != nullptr && copy.options.isCancelled() != 0) {
+        errno = ECANCELED;
+        return false;
+    }
+    return renameat2(AT_FDCWD, source, copy.folder.get(), copy.name.c_str(), copy.exists ? 0 : RENAME_NOREPLACE) == 0;
+}
+
 }  // namespace
 
 int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* options) {
@@ -168,6 +197,14 @@ int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* opti
     Copy copy;
     copy.options = options != nullptr ? *options : VEXOCOPYOPT{kKeepUser, kKeepGroup, nullptr, 0};
     if (openSource(source, copy) != 0 || openTarget(target, copy) != 0 || checkTarget(target, copy) != 0) return -1;
+    if (mayTake(copy)) {
+        if (take(source, copy)) {
+            errno = before;
+            return 0;
+        }
+        if (errno == ECANCELED) return vexo::fail(VEXO_ERR_CANCELLED);
+        // A file system that cannot, or a target that came into being meanwhile: copied like any other.
+    }
     vexo::PartFile part(copy.folder.get());
     if (!create(copy, part) || !fill(copy, part.get())) return vexo::fail(vexo::errorOfErrno(errno));
     if (!publish(copy, part)) return vexo::fail(errorOfPublishing(errno));

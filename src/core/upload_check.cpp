@@ -90,8 +90,10 @@ bool moveFile(const char* user, const char* source, const char* target, int (*is
         syslog(LOG_ERR, "%s (%d) Failed to get user data", kSource, __LINE__);
         return false;
     }
-    const VEXOCOPYOPT options = {
-        .uid = record->uid, .gid = record->gid, .isCancelled = isCancelled, .switches = VEXO_COPY_OVERWRITE};
+    const VEXOCOPYOPT options = {.uid = record->uid,
+                                 .gid = record->gid,
+                                 .isCancelled = isCancelled,
+                                 .switches = VEXO_COPY_OVERWRITE | VEXO_COPY_TAKE};
     if (VEXOFileCopy(source, target, &options) == 0) return true;
     const int platformError = VLIBCErrGet();
     syslog(LOG_ERR, "%s:%d Failed to copy %s to %s, reason=[%X]", kSource, __LINE__, printable(source).c_str(),

@@ -59,6 +59,7 @@ TEST_F(UploadCheckTest, MoveGivesTheFileToItsUser) {
     EXPECT_EQ(status.st_gid, gid_t{support::kUsersGid});
     EXPECT_EQ(support::readFile(target), "data");
 
+    support::writeFile(source, "data", 0600);
     announceLog("reason=[A400]");
     EXPECT_FALSE(MoveFile("alice", source.c_str(), (target + "2").c_str(), [] { return 1; }));
     EXPECT_EQ(OrvLibGetErr(), 1804);

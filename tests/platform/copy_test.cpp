@@ -148,6 +148,36 @@ TEST_F(CopyTest, ReplacingTakesOverThePermissions) {
     EXPECT_EQ(memcmp(got, acl, sizeof acl), 0);
 }
 
+TEST_F(CopyTest, ASourceThatIsGivenAwayBecomesTheTarget) {
+    const VEXOCOPYOPT give = {getuid(), getgid(), nullptr, VEXO_COPY_OVERWRITE | VEXO_COPY_TAKE};
+    const std::string source = root_ + "/source", target = root_ + "/in/taken", data = readFile(source);
+    chmod(source.c_str(), 0600);
+    const ino_t inode = statusOf(source).st_ino;
+    ASSERT_EQ(VEXOFileCopy(source.c_str(), target.c_str(), &give), 0);
+    EXPECT_EQ(statusOf(target).st_ino, inode);
+    EXPECT_EQ(statusOf(target).st_mode & 0777, 0644U) << "as a new file has them";
+    EXPECT_FALSE(fs::exists(source));
+
+    // One that replaces a file takes over its permissions; one with a second name is copied, and so is any when not
+    // given.
+    writeFile(source, "second", 0600);
+    chmod(target.c_str(), 0640);
+    ASSERT_EQ(VEXOFileCopy(source.c_str(), target.c_str(), &give), 0);
+    EXPECT_EQ(readFile(target), "second");
+    EXPECT_EQ(statusOf(target).st_mode & 0777, 0640U);
+    writeFile(source, "third");
+    fs::create_hard_link(source, root_ + "/other name");
+    ASSERT_EQ(VEXOFileCopy(source.c_str(), target.c_str(), &give), 0);
+    EXPECT_EQ(readFile(target), "third");
+    EXPECT_TRUE(fs::exists(source));
+
+    const VEXOCOPYOPT cancelled = {getuid(), getgid(), [] { return 1; }, VEXO_COPY_TAKE};
+    fs::remove(root_ + "/other name");
+    EXPECT_EQ(VEXOFileCopy(source.c_str(), (target + "2").c_str(), &cancelled), -1);
+    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_CANCELLED);
+    EXPECT_TRUE(fs::exists(source));
+}
+
 TEST_F(CopyTest, HolesStayHoles) {
     const std::string sparse = root_ + "/sparse";
     {

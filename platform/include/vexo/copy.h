@@ -9,6 +9,7 @@
 enum {
     VEXO_COPY_OVERWRITE = 0x1,   // an existing file at the target is replaced
     VEXO_COPY_KEEP_TIMES = 0x2,  // the copy takes over the times of access and modification
+    VEXO_COPY_TAKE = 0x4,        // the source is the caller's to give: on one file system it becomes the target itself
 };
 
 struct VEXOCOPYOPT {
