@@ -65,9 +65,9 @@ TEST(FileInfo, EachBitGivesItsMember) {
         Json::Value out;
         DumpFileInfo(c.bits, sample(), out);
         const std::string rest = R"("isdir":false,"name":"a.jpg","path":"/photo/a.jpg"})";
-        const std::string additional =
-            c.additional != nullptr ? R"("additional":)" + std::string(c.additional) + "," : std::string();
-        EXPECT_EQ(compact(out), "{" + additional + rest) << c.bits;
+        std::string expected = "{";
+        if (c.additional != nullptr) expected.append(R"("additional":)").append(c.additional).append(",");
+        EXPECT_EQ(compact(out), expected + rest) << c.bits;
     }
 }
 
