@@ -75,6 +75,10 @@ bool walk(Order order, _enum_ignore_err_ mode, const std::string& root, Recorder
     }
 }
 
+std::string below(std::string folder, const std::string& name) {
+    return folder.append("/").append(name);
+}
+
 // What the orders mean, told by a plain recursion over readdir.
 void expectLevel(Order order, const std::string& real, const std::string& display, Lines& lines) {
     std::vector<std::string> names;
@@ -86,16 +90,16 @@ void expectLevel(Order order, const std::string& real, const std::string& displa
     Lines folders;
     for (const auto& name : names) {
         struct stat status {};
-        ASSERT_EQ(lstat((real + "/" + name).c_str(), &status), 0);
-        lines.push_back((order == Order::kWalk ? "+" : "") + display + "/" + name);
+        ASSERT_EQ(lstat(below(real, name).c_str(), &status), 0);
+        lines.push_back((order == Order::kWalk ? "+" : "") + below(display, name));
         if (S_ISDIR(status.st_mode) && order >= Order::kFirstFolder) folders.push_back(name);
         if (S_ISDIR(status.st_mode) && order < Order::kFirstFolder) {
-            expectLevel(order, real + "/" + name, display + "/" + name, lines);
+            expectLevel(order, below(real, name), below(display, name), lines);
         }
-        if (order == Order::kWalk) lines.push_back("-" + display + "/" + name);
+        if (order == Order::kWalk) lines.push_back("-" + below(display, name));
     }
     if (order == Order::kFirstFolderOnly) return;
-    for (const auto& name : folders) expectLevel(Order::kTopDown, real + "/" + name, display + "/" + name, lines);
+    for (const auto& name : folders) expectLevel(Order::kTopDown, below(real, name), below(display, name), lines);
 }
 
 class DirectoryWalkerTest : public support::ApplianceTest {
@@ -126,7 +130,7 @@ TEST_F(DirectoryWalkerTest, OrdersOnAHostileTree) {
     const std::string longName(255, 'n');
     for (const std::string& name : {longName, std::string("line\nbreak"), std::string("\xFF\xFE\x80")}) {
         makeFolder(root_ + "/a/" + name);
-        writeFile(root_ + "/a/" + name + "/" + name, "x");
+        writeFile(below(below(root_ + "/a", name), name), "x");
     }
     for (const char* hidden : {"/@tmp", "/@vexoea", "/b/@tmp"}) writeFile(root_ + hidden + "/inside", "x");
     for (const char* bin : {"/#recycle", "/b/#recycle"}) writeFile(root_ + bin + "/thrown away", "x");
@@ -369,8 +373,8 @@ TEST_F(DirectoryWalkerTest, FolderReplacedDuringTheWalk) {
                 lines_.clear();
                 EXPECT_EQ(walk(order, mode, root, only_), mode == ENUM_IGNORE_ALL_ERR);
                 EXPECT_EQ(lines_, Lines{"show/victim"});
-                const std::string why = byLink ? "Not a directory" : "Stale file handle";
-                const Lines log{"orveldir:# Failed to chdir " + root + "/victim. [" + why + "]"};
+                const Lines log{"orveldir:# Failed to chdir " + root + "/victim. " +
+                                (byLink ? "[Not a directory]" : "[Stale file handle]")};
                 EXPECT_EQ(support::takeLogTexts(), mode == ENUM_IGNORE_ALL_ERR ? Lines{} : log);
             }
         }
@@ -467,9 +471,10 @@ TEST_F(DirectoryWalkerTest, FoldersMovedAboveADeepWalk) {
         bool alsoAbove;
         _enum_ignore_err_ mode;
     };
-    for (const auto& [alsoAbove, mode] :
+    for (const Case& c :
          {Case{false, ENUM_IGNORE_NO_ERR}, Case{true, ENUM_IGNORE_ALL_ERR}, Case{true, ENUM_IGNORE_NO_ERR}}) {
-        SCOPED_TRACE(std::to_string(alsoAbove) + std::to_string(mode));
+        const bool alsoAbove = c.alsoAbove;
+        SCOPED_TRACE(std::to_string(alsoAbove) + std::to_string(c.mode));
         const DeepTree tree(kDepth);
         const std::string eleven = tree.root() + levels(11), five = tree.root() + levels(5);
         before_.action = [&](const std::string& path, const std::string&) {
@@ -478,12 +483,12 @@ TEST_F(DirectoryWalkerTest, FoldersMovedAboveADeepWalk) {
             return !alsoAbove || rename(five.c_str(), (tree.elsewhere() + "/five").c_str()) == 0;
         };
         lines_.clear();
-        const bool done = walk(Order::kWalk, mode, tree.root(), before_, &after_);
+        const bool done = walk(Order::kWalk, c.mode, tree.root(), before_, &after_);
         const auto files =
             std::count_if(lines_.begin(), lines_.end(), [](const auto& l) { return l[0] == '+' && l.ends_with("/f"); });
         // Lost are the files of levels 5 to 10, where the file system delivers them behind the folder.
         EXPECT_GE(files, alsoAbove && done ? kDepth - 6 : 0);
-        EXPECT_EQ(done, mode == ENUM_IGNORE_ALL_ERR || files == kDepth);
+        EXPECT_EQ(done, c.mode == ENUM_IGNORE_ALL_ERR || files == kDepth);
         const Lines lost{"orveldir:# Failed to open " + tree.root() + levels(10) + ", error No such file or directory"};
         EXPECT_EQ(support::takeLogTexts(), done ? Lines{} : lost);
         EXPECT_EQ(std::count(lines_.begin(), lines_.end(), "-show/d"), done ? 1 : 0);
