@@ -81,11 +81,18 @@ int refusalCode(int error, const std::string& realPath) {
     return code != ORV_ERR_GENERAL ? code : ORV_ERR_DIRECTORY;
 }
 
+// The listing of a folder knows fewer reasons than other operations.
+static int folderRefusalCode(int error, const std::string& realPath) {
+    const int code = refusalCode(error, realPath);
+    const bool known = code == ORV_ERR_DENIED || code == ORV_ERR_MISSING || code == ORV_ERR_REMOTE;
+    return known ? code : ORV_ERR_DIRECTORY;
+}
+
 int confinedFolder(const PathInfo& info, LinkPolicy policy, std::string& realPath) {
     const Descriptor root = openRoot(info);
-    if (!root) return refusalCode(errno, info.shareRoot);
+    if (!root) return folderRefusalCode(errno, info.shareRoot);
     const Descriptor folder = openBeneath(root, restOf(info), policy, O_PATH | O_DIRECTORY);
-    if (!folder) return refusalCode(errno, info.realPath);
+    if (!folder) return folderRefusalCode(errno, info.realPath);
 
     const std::string canonicalRoot = realPathOf(root);
     const std::string canonical = realPathOf(folder);

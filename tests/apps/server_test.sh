@@ -41,9 +41,10 @@ done
 
 password() { awk -v user="$1" '$1 == "user" && $2 == user { print $4 }' "$log"; }
 list() { # user, query...
-    local user=$1
+    local user=$1 fields=()
     shift
-    curl -s -u "$user:$(password "$user")" -G "http://127.0.0.1:$port/cgi-bin/list" "${@/#/-d}"
+    for field; do fields+=(--data-urlencode "$field"); done
+    curl -s -u "$user:$(password "$user")" -G "http://127.0.0.1:$port/cgi-bin/list" "${fields[@]}"
 }
 names() { grep -o '"name":"[^"]*"' <<<"$1" | cut -d'"' -f4 | tr '\n' ' '; }
 sizes() { grep -o '"size":[0-9.e+]*' <<<"$1" | cut -d: -f2 | sed 's/\.0$//'; }

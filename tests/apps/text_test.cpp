@@ -4,8 +4,6 @@
 
 #include <string>
 
-#include "request.h"
-
 using namespace orvel::cgi;
 
 namespace {
@@ -42,14 +40,6 @@ TEST(Text, PercentCodingReturnsEveryByte) {
     EXPECT_EQ(percentDecode("+%e9%E9"), "+\xE9\xE9");
     for (const char* broken : {"%", "%1", "x%g1", "%1g", "%00", "a%0"}) EXPECT_EQ(percentDecode(broken), std::nullopt);
     EXPECT_EQ(percentDecode(std::string_view("a\0b", 3)), std::nullopt);
-}
-
-TEST(Text, NumbersAreDigitsThatFit) {
-    EXPECT_EQ(parseNumber("0"), 0U);
-    EXPECT_EQ(parseNumber("18446744073709551615"), 18446744073709551615U);
-    for (const char* text : {"", "-1", "+1", " 1", "1 ", "1x", "0x10", "1.0", "18446744073709551616"}) {
-        EXPECT_EQ(parseNumber(text), std::nullopt) << text;
-    }
 }
 
 }  // namespace
