@@ -3,6 +3,7 @@
 #define ORVEL_TESTS_APPS_PROGRAM_H
 
 #include <json/value.h>
+#include <json/writer.h>  // failures print values
 
 #include <map>
 #include <string>
