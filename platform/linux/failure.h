@@ -3,22 +3,21 @@
 #define VEXO_LINUX_FAILURE_H
 
 #include <cerrno>
-#include <source_location>
 
 #include "vexo/error.h"
 
 namespace vexo {
 
 // Fills the slot with `code` and the caller's place, and gives -1 to return. errno stays as it is.
-inline int fail(int code, const std::source_location& where = std::source_location::current()) {
-    VLIBCErrSetEx(code, where.file_name(), static_cast<int>(where.line()));
+inline int fail(int code, const char* file = __builtin_FILE(), int line = __builtin_LINE()) {
+    VLIBCErrSetEx(code, file, line);
     return -1;
 }
 
 // The same for a failure found here rather than in the kernel: errno becomes `systemCode`.
-inline int fail(int code, int systemCode, const std::source_location& where = std::source_location::current()) {
+inline int fail(int code, int systemCode, const char* file = __builtin_FILE(), int line = __builtin_LINE()) {
     errno = systemCode;
-    return fail(code, where);
+    return fail(code, file, line);
 }
 
 // The platform error number that an operation which makes or writes files reports for an errno value.
