@@ -65,6 +65,7 @@ TEST_F(HomePathTest, DomainAndDirectoryUsersByTheirHomeFolder) {
     for (const Case& c : cases) {
         EXPECT_EQ(IsDirUserHome(c.path, c.user), c.home) << c.path << " for " << (c.user != nullptr ? c.user : "null");
     }
+    EXPECT_EQ(vexo::gate::calls("VEXOFSMkdirP"), 0);
 }
 
 TEST_F(HomePathTest, AskingMakesTheHomeOfADomainUser) {

@@ -124,6 +124,8 @@ TEST_F(PrivilegeTest, DomainAndDirectoryUsersWithASession) {
         const bool domain = user[0] == 'C';
         const char* service = domain ? "VexoCgiDomGetPrivilege" : "VexoCgiLDAPGetPrivilege";
         vexo::gate::reset();
+        EXPECT_EQ(ask("/mixed", user, nullptr).privilege, domain ? 2 : 1) << user;
+        EXPECT_EQ(vexo::gate::calls(service), 0);
         EXPECT_EQ(ask("/mixed", user, "sid").privilege, domain ? 2 : 1) << user;
         EXPECT_EQ(vexo::gate::calls(service), 1);
         vexo::gate::fail(service, VEXO_ERR_GENERAL);
