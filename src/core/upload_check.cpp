@@ -140,6 +140,11 @@ int ConvUploadErrnoToAPIErr(_tag_cgi_upload_errno_ err) {
     return ORV_ERR_GENERAL;
 }
 
+int CheckFile(std::string path, const char* user, const char* sid, _tag__type_& overwriteMode) {
+    return orvel::guarded(static_cast<int>(ORV_ERR_GENERAL),
+                          [&] { return orvel::checkFile(path, user, sid, overwriteMode); });
+}
+
 bool MoveFile(const char* user, const char* source, const char* target, int (*isCancelled)()) {
     return orvel::guarded(false, [&] { return orvel::moveFile(user, source, target, isCancelled); });
 }
