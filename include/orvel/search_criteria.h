@@ -18,6 +18,10 @@
 #include "vexo/index.h"
 #include "vexo/stat.h"
 
+namespace orvel {
+class Wildcard;
+}
+
 namespace FileSearch {
 
 // Zero-fills `c`, then sets type, op, both links and the value, cut at 4,095 bytes (a number is written in decimal).
@@ -65,12 +69,11 @@ class ORVEL_API FindNameComp : public FindComp {
     // the two may be deleted in any order.
     void orComp(FindNameComp* other);
 
- private:
-    friend class FindFactory;
-    void adopt(std::unique_ptr<FindNameComp> other);  // orComp, and `other` lives as long as this criterion
+    // The same, and `other` lives as long as this criterion.
+    void adopt(std::unique_ptr<FindNameComp> other);
 
-    struct Pattern;
-    std::unique_ptr<Pattern> pattern_;  // compiled once
+ private:
+    std::unique_ptr<orvel::Wildcard> pattern_;  // compiled once
     std::vector<FindNameComp*> alternatives_;
     std::vector<std::unique_ptr<FindNameComp>> adopted_;
     std::vector<std::shared_ptr<__tag_FI_SQL_COND>> orChain_;  // keeps what the primary condition's or-links reach
@@ -187,9 +190,6 @@ class ORVEL_API FindFactory {
     // False with the library code 400 (a required argument is null), 403 (unknown user), 404 (unknown group), 401 (no
     // memory); what stood in `out` is left. Success stores no code.
     static bool createFindOp(_tag_FIND_FIELD_ field, const char* op, const char* value, std::vector<FindComp*>& out);
-
- private:
-    static std::unique_ptr<FindNameComp> createNames(const char* list, std::string (*toPattern)(const std::string&));
 };
 
 class ORVEL_API FindTypeCompFactory {

@@ -68,10 +68,8 @@ std::string extensionPattern(const std::string& element) {
     return "*." + element;
 }
 
-}  // namespace
-
 // One criterion whose alternatives are the elements of `list`; null when it has none.
-std::unique_ptr<FindNameComp> FindFactory::createNames(const char* list, std::string (*toPattern)(const std::string&)) {
+std::unique_ptr<FindNameComp> createNames(const char* list, std::string (*toPattern)(const std::string&)) {
     std::unique_ptr<FindNameComp> head;
     for (const Json::Value& element : VEXO::WebAPIUtil::ParseToArray(list, ",")) {
         if (!element.isString()) continue;
@@ -84,6 +82,8 @@ std::unique_ptr<FindNameComp> FindFactory::createNames(const char* list, std::st
     }
     return head;
 }
+
+}  // namespace
 
 bool FindFactory::createFindOp(_tag_FIND_FIELD_ field, const char* op, const char* value, Criteria& out) {
     return orvel::guarded(false, [&] {

@@ -32,11 +32,6 @@ std::string_view lastComponent(std::string_view path) {
 
 }  // namespace
 
-struct FindNameComp::Pattern {
-    explicit Pattern(std::string_view text) : wildcard(text, kEscape) {}
-    orvel::Wildcard wildcard;
-};
-
 FindNameComp::FindNameComp(const char* pattern) {
     std::string text = pattern == nullptr ? "" : pattern;
     if (!text.empty()) {
@@ -44,7 +39,7 @@ FindNameComp::FindNameComp(const char* pattern) {
         if (isPlainSubstring(text)) text = "*" + text + "*";
         setSqlCond(*primary_, FI_COL_NAME, FI_OP_WILDCARD, text, nullptr, nullptr);
     }
-    pattern_ = std::make_unique<Pattern>(std::string_view(text).substr(0, kPatternLimit));
+    pattern_ = std::make_unique<orvel::Wildcard>(std::string_view(text).substr(0, kPatternLimit), kEscape);
 }
 
 FindNameComp::~FindNameComp() = default;
@@ -53,7 +48,7 @@ bool FindNameComp::operator()(const char* path, const _tag_VEXOSTAT_& st) {
     const char* given = path == nullptr ? "" : path;
     const bool byAlternative = std::any_of(alternatives_.begin(), alternatives_.end(),
                                            [&](FindNameComp* other) { return (*other)(given, st); });
-    return byAlternative || pattern_->wildcard.match(lastComponent(given));
+    return byAlternative || pattern_->match(lastComponent(given));
 }
 
 void FindNameComp::orComp(FindNameComp* other) {

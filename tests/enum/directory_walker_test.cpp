@@ -12,6 +12,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <functional>
+#include <optional>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -303,15 +304,11 @@ TEST_F(Failures, OfReading) {
     makeFolder(root_ + "/a/sub");
     makeFolder(root_ + "/z");
     for (const int nth : {1, 2}) {  // at once, and behind what the first reading brought
-        support::ReadingFault* fault = nullptr;
-        const auto cause = [&](const std::string& root) {
-            delete fault;
-            fault = new support::ReadingFault(root + "/a", EIO, nth);
-        };
+        std::optional<support::ReadingFault> fault;
+        const auto cause = [&](const std::string& root) { fault.emplace(root + "/a", EIO, nth); };
         Lines entries{"show/a", "show/a/sub", "show/z"};
         if (nth == 1) entries.erase(entries.begin() + 1);
         check({"EIO", cause, false, "", "Failed to open " + root_ + "/a, error Input/output error", entries});
-        delete fault;
     }
     support::ReadingFault gone(root_ + "/a", ENOENT);
     EXPECT_TRUE(walk(Order::kTopDown, ENUM_IGNORE_NO_ERR, root_, only_)) << "a folder removed meanwhile has no entries";
