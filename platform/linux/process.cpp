@@ -90,14 +90,11 @@ int VLIBCExec(const char* program, ...) {
     VEXO_GATE("VLIBCExec", -1);
     if (program == nullptr || *program != '/') return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     const int before = errno;
-    std::vector<char*> arguments;
+    std::vector<char*> arguments{const_cast<char*>(program)};  // posix_spawn only reads them
     va_list rest;
     va_start(rest, program);
-    for (const char* argument = program; argument != nullptr; argument = va_arg(rest, const char*)) {
-        arguments.push_back(const_cast<char*>(argument));  // posix_spawn only reads them
-    }
+    while (arguments.back() != nullptr) arguments.push_back(va_arg(rest, char*));
     va_end(rest);
-    arguments.push_back(nullptr);
     pid_t child = -1;
     const int failure = start(arguments, child);
     if (failure != 0) return vexo::fail(errorOfStart(failure), failure);

@@ -93,7 +93,7 @@ class AclTest : public support::ApplianceTest {
         const PVEXOACLFOLDER permissions = VEXOACLFolderOpen(opened.get());
         ASSERT_NE(permissions, nullptr);
         for (const std::string& name : names) {
-            const std::string path = folder + "/" + name;
+            const std::string path = std::string(folder).append("/").append(name);
             SCOPED_TRACE(path);
             _tag_VEXOSTAT_ status;
             if (VLIBCFileLStatAt(opened.get(), name.c_str(), 1, &status) != 0) continue;  // the folder is closed to it
