@@ -43,7 +43,7 @@ int findHome(const std::string& user, char* path, int size) {
 
 std::string homeOf(const std::string& user) {
     const KeepErrno keep;
-    const std::string root = rootOfHomes();
+    std::string root = rootOfHomes();
     if (root.empty()) return root;
     const AccountName name = splitAccountName(user);
     return root + (name.type == AUTH_DOMAIN ? "/@" + name.domain : "") + '/' + name.name;

@@ -65,6 +65,7 @@ std::vector<std::string> groupsOf(const char* user) {
     const List owner(list);
     if (count < 0) return {"failure"};
     std::vector<std::string> out;
+    out.reserve(static_cast<size_t>(list->nItem));
     for (int i = 0; i < list->nItem; ++i) out.emplace_back(VLIBCSzListGet(list, i));
     EXPECT_EQ(count, list->nItem);
     return out;

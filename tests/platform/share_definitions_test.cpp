@@ -234,8 +234,8 @@ INSTANTIATE_TEST_SUITE_P(Files, SambaGrammar, ::testing::ValuesIn(kFixtures), []
 });
 
 // What readShare says of the section [photo].
-vexo::ShareReading read(const std::string& text, const std::string& before = {}) {
-    for (const auto& section : vexo::parseDefinitions(before + "[photo]\n" + text, kNoIncludes).sections) {
+vexo::ShareReading read(const std::string& text, std::string before = {}) {
+    for (const auto& section : vexo::parseDefinitions(before.append("[photo]\n").append(text), kNoIncludes).sections) {
         if (section.name == "photo") return vexo::readShare(section);
     }
     return {std::nullopt, "no section"};

@@ -1,6 +1,7 @@
 // Shares on a running appliance: records, rights from the lists, files that change, homes.
 #include "vexo/share.h"
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -24,6 +25,7 @@ using support::kAliceUid;
 using support::kUsersGid;
 
 constexpr const char* kDefinitions = "/etc/vexo/shares.conf";
+constexpr useconds_t kTick = 20000;  // longer than the clock that stamps files stands still
 
 struct Release {
     void operator()(PVEXOSHARE share) const { VEXOShareFree(share); }
@@ -34,6 +36,7 @@ using Loaded = std::unique_ptr<SDK::Share, Release>;
 
 std::vector<std::string> items(PVLIBCSZLIST list) {
     std::vector<std::string> out;
+    out.reserve(static_cast<size_t>(list->nItem));
     for (int i = 0; i < list->nItem; ++i) out.emplace_back(VLIBCSzListGet(list, i));
     return out;
 }
@@ -192,6 +195,7 @@ TEST_F(ShareTest, ChangesAreSeen) {
     support::writeFile(systemRoot() + "/etc/vexo/more.conf", "[d]\npath = /v/d\n");
     EXPECT_EQ(allNames(), (std::vector<std::string>{"a", "d"})) << "same inode and size, within one tick of the clock";
     define("[e]\npath = /v/e\n[global]\ninclude = later.conf\n");
+    usleep(kTick);
     announceLog("share definitions: line 4: the included file cannot be read");
     EXPECT_EQ(allNames(), std::vector<std::string>{"e"});
     EXPECT_EQ(allNames(), std::vector<std::string>{"e"});
@@ -200,6 +204,22 @@ TEST_F(ShareTest, ChangesAreSeen) {
     writeRootFile("/etc/other.conf", "[g]\npath = /v/g\n");
     setSetting("share_definitions", "/etc/other.conf");
     EXPECT_EQ(allNames(), std::vector<std::string>{"g"});
+}
+
+// Reading again is the exception: inode, size and time decide, not the text.
+TEST_F(ShareTest, UnchangedFilesAreNotReadAgain) {
+    define("[a]\npath = /v/a\n");
+    usleep(kTick);
+    EXPECT_EQ(allNames(), std::vector<std::string>{"a"});
+    const std::string file = systemRoot() + kDefinitions;
+    struct stat before {};
+    ASSERT_EQ(stat(file.c_str(), &before), 0);
+    support::writeFile(file, "[b]\npath = /v/b\n");
+    const timespec times[] = {before.st_atim, before.st_mtim};
+    ASSERT_EQ(utimensat(AT_FDCWD, file.c_str(), times, 0), 0);
+    EXPECT_EQ(allNames(), std::vector<std::string>{"a"});
+    ASSERT_EQ(utimensat(AT_FDCWD, file.c_str(), nullptr, 0), 0);
+    EXPECT_EQ(allNames(), std::vector<std::string>{"b"});
 }
 
 TEST_F(ShareTest, ACursorKeepsWhatItBegan) {
