@@ -97,15 +97,16 @@ TEST_F(SubDirectoriesTest, MountPoints) {
     for (const char* folder : {"/disk", "/server", "/local"}) makeFolder(root_ + folder);
     addMount(root_ + "/disk", "ext4");
     addMount(root_ + "/server", "nfs4");
+    writeFile(root_ + "/file", "x");
+    addMount(root_ + "/file", "nfs4");
     struct Case {
         const char* dead;  // whose status cannot be read
         std::string expected;
     };
     const Case cases[] = {
-        {"/none", "disk:ext4 local: server:nfs4 "},
-        {"/server", "disk:ext4 local: server:remotefail(0) "},
-        {"/disk", "local: server:nfs4 "},
-        {"/local", "disk:ext4 server:nfs4 "},
+        {"/none", "disk:ext4 local: server:nfs4 "}, {"/server", "disk:ext4 local: server:remotefail(0) "},
+        {"/disk", "local: server:nfs4 "},           {"/local", "disk:ext4 server:nfs4 "},
+        {"/file", "disk:ext4 local: server:nfs4 "},  // what the folder calls a file is not asked for its status
     };
     for (const Case& c : cases) {
         const support::StatusFault fault(root_ + c.dead, EHOSTDOWN);
