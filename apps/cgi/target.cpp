@@ -3,7 +3,9 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <climits>
 #include <string_view>
 #include <vector>
 
@@ -46,6 +48,26 @@ int lastCode() {
     return code != ORV_ERR_NONE ? code : ORV_ERR_GENERAL;
 }
 
+// Cuts the path into the target's name and the folders above it, and opens the deepest of them that exists: the first
+// `existing` ones.
+int enter(const PathInfo& info, LinkPolicy policy, std::vector<std::string>& folders, size_t& existing,
+          Target& target) {
+    folders = componentsOf(std::string_view(info.realPath).substr(info.shareRoot.size()));
+    target.name = info.realPath.substr(info.realPath.rfind('/') + 1);
+    if (folders.empty()) return ORV_ERR_PARAMETER;
+    // These are names of folders above, not of anything that could be made.
+    if (target.name == "." || target.name == "..") return ORV_ERR_RESERVED_NAME;
+    folders.pop_back();
+
+    const Descriptor root(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    if (!root) return refusalCode(errno, info.shareRoot);
+    for (existing = folders.size();; --existing) {
+        target.folder = openBeneath(root, joined(folders, existing), policy, O_PATH | O_DIRECTORY);
+        if (target.folder) return ORV_ERR_NONE;
+        if (errno != ENOENT || existing == 0) return refusalCode(errno, info.realPath);
+    }
+}
+
 }  // namespace
 
 int makeFolder(const Descriptor& folder, const std::string& name, const std::string& user, Descriptor& made) {
@@ -58,30 +80,52 @@ int makeFolder(const Descriptor& folder, const std::string& name, const std::str
     return ORV_ERR_NONE;
 }
 
-int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, bool makeFolders, Target& target) {
-    std::vector<std::string> components = componentsOf(std::string_view(info.realPath).substr(info.shareRoot.size()));
-    if (components.empty() || components.back() == "..") return ORV_ERR_PARAMETER;
-    target.name = components.back();
-    components.pop_back();
-
-    const Descriptor root(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    if (!root) return refusalCode(errno, info.shareRoot);
-    size_t existing = components.size();
-    for (;; --existing) {
-        target.folder = openBeneath(root, joined(components, existing), policy, O_PATH | O_DIRECTORY);
-        if (target.folder) break;
-        if (errno != ENOENT || !makeFolders || existing == 0) return refusalCode(errno, info.realPath);
-    }
-    for (; existing < components.size(); ++existing) {
+int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target) {
+    std::vector<std::string> folders;
+    size_t existing = 0;
+    int code = enter(info, policy, folders, existing, target);
+    if (code != ORV_ERR_NONE) return code;
+    if (existing < folders.size() && missing == Missing::kRefuse) return ORV_ERR_MISSING;
+    for (; existing < folders.size(); ++existing) {
         Descriptor made;
-        const int code = makeFolder(target.folder, components[existing], user, made);
-        // Another request made it meanwhile: entered like any other that exists.
-        if (code == ORV_ERR_EXISTS)
-            made = openBeneath(target.folder, components[existing], policy, O_PATH | O_DIRECTORY);
-        if (!made) return code;
+        code = makeFolder(target.folder, folders[existing], user, made);
+        if (code == ORV_ERR_NONE) {
+            target.made.push_back({std::move(target.folder), folders[existing]});
+        } else if (code == ORV_ERR_EXISTS) {
+            // Another request made it meanwhile: entered like any other that exists.
+            made = openBeneath(target.folder, folders[existing], policy, O_PATH | O_DIRECTORY);
+        }
+        if (!made) {
+            removeMadeFolders(target);
+            return code;
+        }
         target.folder = std::move(made);
     }
     return ORV_ERR_NONE;
+}
+
+int previewTarget(const PathInfo& info, LinkPolicy policy, Target& target) {
+    std::vector<std::string> folders;
+    size_t existing = 0;
+    const int code = enter(info, policy, folders, existing, target);
+    if (code != ORV_ERR_NONE) return code;
+    const bool whole = existing == folders.size();
+    const std::string deepest = realPathOf(target.folder);
+    folders.push_back(target.name);
+    for (; existing < folders.size(); ++existing) {
+        const std::string& name = folders[existing];
+        OrvLibSetErr(ORV_ERR_NONE);
+        if (OrvCheckFileName(deepest.c_str(), name.c_str()) != 0) return lastCode();
+        if (name.size() > NAME_MAX) return OrvParseErrnoToError(ENAMETOOLONG, info.shareName.c_str(), nullptr);
+    }
+    if (!whole) target.folder = Descriptor();
+    return ORV_ERR_NONE;
+}
+
+void removeMadeFolders(Target& target) {
+    for (; !target.made.empty(); target.made.pop_back()) {
+        unlinkat(target.made.back().parent.get(), target.made.back().name.c_str(), AT_REMOVEDIR);
+    }
 }
 
 }  // namespace orvel::cgi

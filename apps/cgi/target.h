@@ -3,6 +3,7 @@
 #define ORVEL_CGI_TARGET_H
 
 #include <string>
+#include <vector>
 
 #include "confined.h"
 #include "descriptor.h"
@@ -10,15 +11,33 @@
 
 namespace orvel::cgi {
 
+// A folder that was made on the way to a target.
+struct MadeFolder {
+    Descriptor parent;
+    std::string name;
+};
+
 struct Target {
     Descriptor folder;  // opened O_PATH, beneath the share root
     std::string name;   // one component; need not exist
+    std::vector<MadeFolder> made;
 };
 
-// Opens the folder that holds what `info` resolved to, as the calling identity. With `makeFolders` missing ones are
-// made on the way, each with a name that may be used, owned by `user` also when the process acts as root. 0; 400 for a
-// share root or a path that ends in "..", else a code as for confinedFolder, of OrvCheckFileName or of the making.
-int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, bool makeFolders, Target& target);
+// What openTarget does about folders that are missing.
+enum class Missing { kRefuse, kMake };
+
+// Opens the folder that holds what `info` resolved to, as the calling identity. Missing ones are made on the way when
+// asked for, each with a name that may be used, owned by `user` also when the process acts as root. 0; 400 for a share
+// root, 418 for a path that ends in "." or "..", else a code as for confinedFolder, of OrvCheckFileName or of the
+// making; after a failure no folder made here is left.
+int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target);
+
+// Asks what openTarget would ask without making anything. The same codes; on 0, `target.folder` is open only when it
+// exists already.
+int previewTarget(const PathInfo& info, LinkPolicy policy, Target& target);
+
+// Removes the folders made on the way, as far as they are empty: for when the target was not made after all.
+void removeMadeFolders(Target& target);
 
 // Makes the folder `name` in `folder`, owned as above, and opens it O_PATH. EEXIST gives 414.
 int makeFolder(const Descriptor& folder, const std::string& name, const std::string& user, Descriptor& made);

@@ -7,10 +7,12 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <clocale>
 #include <cstring>
 #include <ctime>
 #include <memory>
 
+#include "text.h"
 #include "vexo/filesystem.h"
 
 namespace orvel::cgi {
@@ -44,6 +46,7 @@ bool namesIn(const Descriptor& folder, std::vector<std::string>& names) {
 }  // namespace
 
 ZipStream::ZipStream(int fd) : archive_(archive_write_new()) {
+    setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted from
     if (archive_ == nullptr || archive_write_set_format_zip(archive_) != ARCHIVE_OK ||
         archive_write_set_options(archive_, "zip:hdrcharset=UTF-8") < ARCHIVE_WARN ||
         archive_write_set_bytes_per_block(archive_, static_cast<int>(kPiece)) != ARCHIVE_OK ||
@@ -69,7 +72,8 @@ void ZipStream::leaveOut(const std::string& name, const std::string& reason) {
 bool ZipStream::begin(const std::string& name, const struct stat& status, long long size) {
     const std::unique_ptr<archive_entry, FreeEntry> entry(archive_entry_new());
     if (entry == nullptr) return broken();
-    archive_entry_set_pathname(entry.get(), name.c_str());
+    // A name that is no UTF-8 cannot be told apart from others by what is readable of it.
+    archive_entry_set_pathname(entry.get(), isUtf8(name) ? name.c_str() : percentEncode(name).c_str());
     archive_entry_set_mode(entry.get(), status.st_mode & (S_IFMT | 0777));
     archive_entry_set_mtime(entry.get(), status.st_mtim.tv_sec, status.st_mtim.tv_nsec);
     if (size >= 0) archive_entry_set_size(entry.get(), size);

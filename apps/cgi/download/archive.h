@@ -15,6 +15,7 @@ namespace orvel::cgi {
 
 // A stream to a descriptor. What cannot be read is left out and told in a last member, "_not_included.txt". Members are
 // deflated, times and permissions kept; symbolic links and anything else but files and folders stay out.
+// Names are UTF-8; one that is not is percent-encoded.
 class ZipStream {
  public:
     explicit ZipStream(int fd);

@@ -45,9 +45,20 @@ int lastCode(int fallback) {
 
 struct Source {
     PathInfo info;
+    std::string name;  // for the client to save it under
     Descriptor opened;
     struct stat status {};
 };
+
+std::string lastComponent(const std::string& path) {
+    return path.substr(path.rfind('/') + 1);
+}
+
+// That of the path, unless it is none to save something under: ".." would lead out of the client's own folder.
+std::string nameOf(const PathInfo& info, const Descriptor& found) {
+    const std::string name = lastComponent(info.path);
+    return name != "." && name != ".." ? name : lastComponent(realPathOf(found));
+}
 
 // Resolves, asks and opens one path as the user. 0 or a library code.
 int openSource(const User& user, const std::string& path, Source& source) {
@@ -57,11 +68,15 @@ int openSource(const User& user, const std::string& path, Source& source) {
     if (!CheckShareDownloadPrivilege(user.name.c_str(), user.sid.c_str(), source.info.path.c_str())) {
         return lastCode(ORV_ERR_DENIED);
     }
-    const int code =
-        confinedOpen(source.info, linkPolicyOf(source.info.shareName), O_RDONLY | O_NONBLOCK | O_NOCTTY, source.opened);
+    // Looked at before it is opened for reading: opening a device can already do something.
+    Descriptor found;
+    const int code = confinedOpen(source.info, linkPolicyOf(source.info.shareName), O_PATH, found);
     if (code != ORV_ERR_NONE) return code;
-    if (fstat(source.opened.get(), &source.status) != 0) return OrvParseErrnoToError(errno, nullptr, nullptr);
-    return S_ISREG(source.status.st_mode) || S_ISDIR(source.status.st_mode) ? ORV_ERR_NONE : ORV_ERR_DENIED;
+    if (fstat(found.get(), &source.status) != 0) return refusalCode(errno, source.info.realPath);
+    if (!S_ISREG(source.status.st_mode) && !S_ISDIR(source.status.st_mode)) return ORV_ERR_DENIED;
+    source.name = nameOf(source.info, found);
+    source.opened = Descriptor(open(found.path().c_str(), O_RDONLY | O_CLOEXEC));
+    return source.opened ? ORV_ERR_NONE : refusalCode(errno, source.info.realPath);
 }
 
 // A refusal must not be taken for the file: unlike in other programs it shows in the HTTP status.
@@ -76,10 +91,6 @@ Status httpStatusOf(int code) {
         default:
             return Status::kBroken;
     }
-}
-
-std::string lastComponent(const std::string& path) {
-    return path.substr(path.rfind('/') + 1);
 }
 
 void putHeader(Output& out, const std::string& line) {
@@ -112,10 +123,12 @@ void serveFile(Output& out, const User& user, const Source& source) {
     const struct stat& status = source.status;
     const std::int64_t modified = status.st_mtim.tv_sec;
     const std::string tag = entityTag(status.st_ino, status.st_size, modified, status.st_mtim.tv_nsec);
-    const bool current = isCurrent(variable("HTTP_IF_NONE_MATCH"), variable("HTTP_IF_MODIFIED_SINCE"), tag, modified);
+    const std::string method = variable("REQUEST_METHOD");
+    const bool current = method != "POST" &&
+                         isCurrent(variable("HTTP_IF_NONE_MATCH"), variable("HTTP_IF_MODIFIED_SINCE"), tag, modified);
     ByteRange range = {0, status.st_size - 1};
     RangeAnswer answer = RangeAnswer::kWhole;
-    if (!current && rangeCounts(variable("HTTP_IF_RANGE"), tag, modified)) {
+    if (!current && method == "GET" && rangeCounts(variable("HTTP_IF_RANGE"), tag, modified)) {
         answer = judgeRange(variable("HTTP_RANGE"), status.st_size, range);
     }
 
@@ -124,7 +137,7 @@ void serveFile(Output& out, const User& user, const Source& source) {
                    : answer == RangeAnswer::kPart          ? "Status: 206 Partial Content"
                    : answer == RangeAnswer::kUnsatisfiable ? "Status: 416 Range Not Satisfiable"
                                                            : "Status: 200 OK");
-    putCommon(out, user.cookie, lastComponent(source.info.path), "application/octet-stream");
+    putCommon(out, user.cookie, source.name, "application/octet-stream");
     putHeader(out, "Accept-Ranges: bytes");
     putHeader(out, "ETag: " + tag);
     putHeader(out, "Last-Modified: " + httpDate(modified));
@@ -136,7 +149,7 @@ void serveFile(Output& out, const User& user, const Source& source) {
     }
     if (!current) putHeader(out, "Content-Length: " + (body ? std::to_string(range.length()) : "0"));
     out.text() += "\r\n";
-    if (!body || variable("REQUEST_METHOD") == "HEAD" || !out.finish()) return;
+    if (!body || method == "HEAD" || !out.finish()) return;
     const std::int64_t sent = sendBytes(source.opened.get(), range);
     OrvLibDoLog(user.name, source.info.path, sent, ORVEL_ACTION_DOWNLOAD, false);
 }
@@ -160,7 +173,7 @@ void serveZip(Output& out, const User& user, std::vector<Source>& sources, const
     std::vector<std::string> used;
     for (Source& source : sources) {
         const long long before = zip.bytes();
-        if (!zip.add(source.opened, freeName(used, lastComponent(source.info.path)))) return;
+        if (!zip.add(source.opened, freeName(used, source.name))) return;
         OrvLibDoLog(user.name, source.info.path, zip.bytes() - before, ORVEL_ACTION_DOWNLOAD,
                     S_ISDIR(source.status.st_mode));
     }
@@ -203,7 +216,7 @@ void serve(Output& out) {
         if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), user.cookie, code, (*paths)[i]);
     }
     if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, user, sources[0]);
-    const std::string only = sources.size() == 1 ? lastComponent(sources[0].info.path) : "download";
+    const std::string only = sources.size() == 1 ? sources[0].name : "download";
     serveZip(out, user, sources, web.GetParam("name", only));
 }
 

@@ -1,7 +1,8 @@
 #include "download/range.h"
 
+#include <strings.h>
+
 #include <algorithm>
-#include <cctype>
 #include <charconv>
 #include <cstdio>
 #include <ctime>
@@ -11,12 +12,12 @@
 namespace orvel::cgi {
 namespace {
 
-// Digits alone; -1 for anything else, also for a number that does not fit.
+// Digits alone; -1 for anything else. A number that does not fit lies behind the end of any file, as the largest does.
 std::int64_t number(std::string_view text) {
+    if (text.empty() || text.find_first_not_of("0123456789") != std::string_view::npos) return -1;
     std::int64_t value = 0;
-    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
-    const bool digits = std::all_of(text.begin(), text.end(), [](unsigned char c) { return std::isdigit(c) != 0; });
-    return !text.empty() && digits && error == std::errc() && end == text.data() + text.size() ? value : -1;
+    const auto result = std::from_chars(text.data(), text.data() + text.size(), value);
+    return result.ec == std::errc() ? value : INT64_MAX;
 }
 
 std::string_view trimmed(std::string_view text) {
@@ -40,7 +41,9 @@ bool anyTagIs(std::string_view list, std::string_view tag) {
 
 RangeAnswer judgeRange(std::string_view header, std::int64_t size, ByteRange& range) {
     constexpr std::string_view unit = "bytes=";
-    if (!header.starts_with(unit) || header.find(',') != std::string_view::npos) return RangeAnswer::kWhole;
+    if (header.size() < unit.size() || strncasecmp(header.data(), unit.data(), unit.size()) != 0 ||
+        header.find(',') != std::string_view::npos)
+        return RangeAnswer::kWhole;
     const std::string_view text = trimmed(header.substr(unit.size()));
     const size_t dash = text.find('-');
     if (dash == std::string_view::npos) return RangeAnswer::kWhole;
@@ -75,7 +78,8 @@ bool isCurrent(std::string_view ifNoneMatch, std::string_view ifModifiedSince, s
 
 bool rangeCounts(std::string_view ifRange, std::string_view tag, std::int64_t modified) {
     const std::string_view condition = trimmed(ifRange);
-    return condition.empty() || condition == tag || parseHttpDate(condition) == modified;
+    const std::int64_t date = parseHttpDate(condition);
+    return condition.empty() || condition == tag || (date >= 0 && date == modified);
 }
 
 std::string httpDate(std::int64_t seconds) {
@@ -89,10 +93,14 @@ std::string httpDate(std::int64_t seconds) {
 }
 
 std::int64_t parseHttpDate(std::string_view text) {
-    struct tm parts {};
     const std::string copy(trimmed(text));
-    const char* end = strptime(copy.c_str(), "%a, %d %b %Y %H:%M:%S GMT", &parts);
-    return end != nullptr && *end == '\0' ? timegm(&parts) : -1;
+    // The second and third are what old clients send.
+    for (const char* format : {"%a, %d %b %Y %H:%M:%S GMT", "%a, %d-%b-%y %H:%M:%S GMT", "%a %b %d %H:%M:%S %Y"}) {
+        struct tm parts {};
+        const char* end = strptime(copy.c_str(), format, &parts);
+        if (end != nullptr && *end == '\0') return timegm(&parts);
+    }
+    return -1;
 }
 
 std::string attachment(std::string_view name) {

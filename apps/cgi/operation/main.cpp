@@ -4,6 +4,8 @@
 //   action           "mkdir", "rename" or "subfolders"; more of each at its function
 //   path, path_raw   what it is done to
 // Actions that change something must be posted.
+#include <sys/stat.h>
+
 #include <cstdlib>
 #include <string_view>
 
@@ -65,6 +67,7 @@ int perform(Operation& operation, const Action& action) {
 }
 
 void serve(Output& out) {
+    umask(022);  // whatever the web server's is
     dropForwardedFor();
     User user;
     const Status admitted = admit(user);

@@ -8,13 +8,17 @@ namespace orvel::cgi {
 
 int makeFolderOperation(Operation& operation) {
     const bool parents = operation.web.GetParam("parents", "false") == "true";
+    const Missing missing = parents ? Missing::kMake : Missing::kRefuse;
     const PathInfo& info = operation.info;
     Target target;
-    int code = openTarget(info, linkPolicyOf(info.shareName), operation.user.name, parents, target);
+    int code = openTarget(info, linkPolicyOf(info.shareName), operation.user.name, missing, target);
     if (code != ORV_ERR_NONE) return code;
     Descriptor made;
     code = makeFolder(target.folder, target.name, operation.user.name, made);
-    if (code != ORV_ERR_NONE) return code;
+    if (code != ORV_ERR_NONE) {
+        removeMadeFolders(target);
+        return code;
+    }
     OrvLibDoLog(operation.user.name, info.path, 0, ORVEL_ACTION_MKDIR, true);
     putPath(operation.data, "path", info.path);
     return ORV_ERR_NONE;

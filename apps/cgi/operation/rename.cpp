@@ -28,7 +28,7 @@ bool isSameFile(int folder, const std::string& a, const std::string& b) {
     }, second{};
     return fstatat(folder, a.c_str(), &first, AT_SYMLINK_NOFOLLOW) == 0 &&
            fstatat(folder, b.c_str(), &second, AT_SYMLINK_NOFOLLOW) == 0 && first.st_dev == second.st_dev &&
-           first.st_ino == second.st_ino && first.st_nlink == 1;
+           first.st_ino == second.st_ino && (S_ISDIR(first.st_mode) || first.st_nlink == 1);
 }
 
 // Never replaces anything. Where case does not count (FAT), the new name may be the old file itself.
@@ -48,7 +48,7 @@ int renameOperation(Operation& operation) {
     const auto name = nameParam(operation.web);
     if (!name) return ORV_ERR_PARAMETER;
     Target target;
-    const int code = openTarget(info, linkPolicyOf(info.shareName), operation.user.name, false, target);
+    const int code = openTarget(info, linkPolicyOf(info.shareName), operation.user.name, Missing::kRefuse, target);
     if (code != ORV_ERR_NONE) return code;
     OrvLibSetErr(ORV_ERR_NONE);
     if (OrvCheckFileName(realPathOf(target.folder).c_str(), name->c_str()) != 0) return lastCode(ORV_ERR_GENERAL);

@@ -198,6 +198,7 @@ void receive(const User& user, const VEXO::WebCGI& web, Outcome& outcome) {
 }
 
 void serve(Output& out) {
+    static_cast<void>(isCancelled());  // from here on
     dropForwardedFor();
     User user;
     const Status admitted = admit(user);

@@ -41,18 +41,20 @@ int isCancelled() {
 
 int Upload::begin() {
     OrvLibSetErr(ORV_ERR_NONE);
+    if (path_.find('\0') != std::string::npos) return ORV_ERR_PARAMETER;  // would be cut there
     if (!PathInfoFactory::create(user_.name.c_str(), path_, info_)) return lastCode();
     path_ = info_.path;
+    if (!OrvCheckReservedName(path_.substr(path_.rfind('/') + 1).c_str())) return lastCode();
     prepareVolume(info_.volumePath);
     int code = CheckFile(path_, user_.name.c_str(), user_.sid.c_str(), mode_);
     if (code != ORV_ERR_NONE) return code;
 
     Target target;
-    code = openTarget(info_, linkPolicyOf(info_.shareName), user_.name, true, target);
+    code = previewTarget(info_, linkPolicyOf(info_.shareName), target);
     if (code != ORV_ERR_NONE) return code;
-    if (OrvCheckFileName(realPathOf(target.folder).c_str(), target.name.c_str()) != 0) return lastCode();
     struct stat status {};
-    const bool there = fstatat(target.folder.get(), target.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
+    const bool there =
+        target.folder && fstatat(target.folder.get(), target.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
     if (there && !S_ISREG(status.st_mode)) return ORV_ERR_EXISTS;
     skipped_ = there && mode_ == OVERWRITE_MODE_SKIP;
     return skipped_ ? ORV_ERR_NONE : spool_.open(info_.volumePath);
@@ -65,27 +67,31 @@ int Upload::write(std::string_view data) {
 
 // Unless an existing file may be replaced, the name is taken first, by an empty file that nobody else can have made:
 // what came into being since begin() is not replaced either.
+int Upload::reserve(const Target& target, bool& reserved) {
+    if (mode_ == OVERWRITE_MODE_OVERWRITE) return ORV_ERR_NONE;
+    const Descriptor mark(
+        openat(target.folder.get(), target.name.c_str(), O_CREAT | O_EXCL | O_WRONLY | O_NOFOLLOW | O_CLOEXEC, 0666));
+    reserved = static_cast<bool>(mark);
+    skipped_ = !mark && errno == EEXIST && mode_ == OVERWRITE_MODE_SKIP;
+    return mark || skipped_ ? ORV_ERR_NONE : OrvParseErrnoToError(errno, info_.shareName.c_str(), nullptr);
+}
+
 int Upload::finish() {
     if (skipped_) return ORV_ERR_NONE;
     Target target;
-    int code = openTarget(info_, linkPolicyOf(info_.shareName), user_.name, true, target);
+    int code = openTarget(info_, linkPolicyOf(info_.shareName), user_.name, Missing::kMake, target);
     if (code != ORV_ERR_NONE) return code;
-    const char* name = target.name.c_str();
     bool reserved = false;
-    if (mode_ != OVERWRITE_MODE_OVERWRITE) {
-        const Descriptor mark(
-            openat(target.folder.get(), name, O_CREAT | O_EXCL | O_WRONLY | O_NOFOLLOW | O_CLOEXEC, 0666));
-        if (!mark && errno == EEXIST && mode_ == OVERWRITE_MODE_SKIP) {
-            skipped_ = true;
-            return ORV_ERR_NONE;
-        }
-        if (!mark) return OrvParseErrnoToError(errno, info_.shareName.c_str(), nullptr);
-        reserved = true;
-    }
+    code = reserve(target, reserved);
+    if (skipped_) return ORV_ERR_NONE;
     OrvLibSetErr(ORV_ERR_NONE);
-    if (!MoveFile(user_.name.c_str(), spool_.publish().c_str(), target.folder.path(target.name).c_str(), isCancelled)) {
+    if (code == ORV_ERR_NONE &&
+        !MoveFile(user_.name.c_str(), spool_.publish().c_str(), target.folder.path(target.name).c_str(), isCancelled)) {
         code = lastCode();
-        if (reserved) unlinkat(target.folder.get(), name, 0);
+        if (reserved) unlinkat(target.folder.get(), target.name.c_str(), 0);
+    }
+    if (code != ORV_ERR_NONE) {
+        removeMadeFolders(target);
         return code;
     }
     OrvLibDoLog(user_.name, path_, size(), ORVEL_ACTION_UPLOAD, false);

@@ -12,7 +12,8 @@
 
 namespace orvel::cgi {
 
-// Set by SIGTERM (the web server's word that the client is gone): the upload ends and leaves nothing.
+// Set by SIGTERM (the web server's word that the client is gone): the upload ends and leaves nothing. The first call
+// begins to watch for it.
 int isCancelled();
 
 // One file on its way to one path: begin, write as the data comes, finish. Each answers 0 or a library code, after
@@ -33,8 +34,7 @@ class Upload {
     [[nodiscard]] long long size() const { return spool_.size(); }
 
  private:
-    int reserve(bool& reserved);
-    [[nodiscard]] bool exists() const;
+    int reserve(const Target& target, bool& reserved);
 
     const User& user_;
     std::string path_;
