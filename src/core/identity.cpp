@@ -99,7 +99,8 @@ int setGroup(const char* sid, const char* user, gid_t gid) {
         OrvLibSetErr(ORV_ERR_GENERAL);
         return -1;
     }
-    static_cast<void>(setegid(gid));  // kept unchecked: an ordinary user's process goes on as itself
+    // Kept unchecked, as for the uid: an ordinary user's process goes on as itself.
+    [[maybe_unused]] const int ignored = setegid(gid);
     return 0;
 }
 
@@ -117,15 +118,14 @@ int setUser(const char* sid, const char* user, uid_t uid) {
         return -1;
     }
     if (administrator == 1) {
-        static_cast<void>(seteuid(0));
-        return 0;
+        uid = 0;
     }
     if (uid == kUnknownUid) uid = VexoCgiUIDGet(sid, user);
     if (uid == kUnknownUid) {
         OrvLibSetErr(ORV_ERR_GENERAL);
         return -1;
     }
-    static_cast<void>(seteuid(uid));  // kept unchecked, as above
+    [[maybe_unused]] const int ignored = seteuid(uid);
     return 0;
 }
 
