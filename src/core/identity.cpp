@@ -160,7 +160,9 @@ int handOver(const char* file, const char* user) {
 
 }  // namespace
 
-bool stillRoot(const char* user) { return geteuid() == 0 && VEXOGroupIsAdminGroupMem(user) != 1; }
+bool stillRoot(const char* user) {
+    return geteuid() == 0 && VEXOGroupIsAdminGroupMem(user) != 1;
+}
 
 }  // namespace orvel
 

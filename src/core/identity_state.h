@@ -4,8 +4,8 @@
 
 namespace orvel {
 
-// True when the process acts as root for a user who is no administrator: a switch that reported success, since it does not
-// check, but changed nothing.
+// True when the process acts as root for a user who is no administrator: a switch that reported success, since it does
+// not check, but changed nothing.
 [[nodiscard]] bool stillRoot(const char* user);
 
 }  // namespace orvel
