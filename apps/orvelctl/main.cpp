@@ -52,7 +52,8 @@ int run(std::vector<std::string> words) {
 
 int main(int argc, char** argv) {
     try {
-        return run({argv + 1, argv + argc});
+        const int status = run({argv + 1, argv + argc});
+        return fflush(stdout) == 0 ? status : 1;
     } catch (const orvel::ctl::UsageError& error) {
         return usage(error.what());
     } catch (const std::exception& error) {

@@ -74,7 +74,8 @@ void print(const std::string& folder, const Record& record) {
 
 int demo(const std::vector<std::string>& words) {
     const Arguments arguments(words, {}, {"--keep", "--remove"}, 1);
-    const std::string folder = fs::absolute(arguments.position(0)).lexically_normal();
+    const fs::path given = fs::absolute(arguments.position(0));
+    const std::string folder = fs::weakly_canonical(given.has_filename() ? given : given.parent_path());
     const auto found = appliance::readRecord(folder);
     if (arguments.has("--remove")) {
         if (!found) throw std::runtime_error(folder + " holds no demo of yours");
