@@ -1,19 +1,17 @@
 #include <fcntl.h>
-#include <linux/limits.h>
 #include <sys/stat.h>
-#include <sys/xattr.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
 #include <string>
 #include <string_view>
-#include <vector>
 
 #include "copy_data.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "file_io.h"
+#include "file_permissions.h"
 #include "mount_table.h"
 #include "owner.h"
 #include "part_file.h"
@@ -24,12 +22,10 @@ namespace {
 
 using vexo::Descriptor;
 
-constexpr const char* kAcl = "system.posix_acl_access";
-constexpr const char* kDefaultAcl = "system.posix_acl_default";
 constexpr uid_t kKeepUser = static_cast<uid_t>(-1);
 constexpr gid_t kKeepGroup = static_cast<gid_t>(-1);
 constexpr mode_t kNewFile = 0666;
-constexpr mode_t kUmask = 022;  // the process's own may be 0, left so by the making of temporary folders
+constexpr mode_t kUmask = 022;
 
 struct Copy {
     Descriptor source;
@@ -39,18 +35,6 @@ struct Copy {
     bool exists = false;
     struct stat oldStatus {};  // what is at the target, when it exists
     VEXOCOPYOPT options{};
-};
-
-// The umask for as long as one file is created. A folder's default ACL takes its place.
-class Umask {
- public:
-    explicit Umask(mode_t mask) : saved_(umask(mask)) {}
-    ~Umask() { umask(saved_); }
-    Umask(const Umask&) = delete;
-    Umask& operator=(const Umask&) = delete;
-
- private:
-    mode_t saved_;
 };
 
 int openSource(const char* path, Copy& copy) {
@@ -97,20 +81,13 @@ int checkTarget(const char* path, Copy& copy) {
     return mayReplace ? 0 : vexo::fail(VEXO_ERR_TARGET_EXISTS, EEXIST);
 }
 
-// Gives `part` the permissions of the file that it replaces. The ACL goes along with the mode: with it, the group bits
-// are a mask, and alone they could grant the group what the ACL withheld.
-bool takeOverPermissions(const Copy& copy, int part) {
-    const Descriptor old = vexo::openFile(copy.folder.get(), copy.name.c_str(), O_PATH | O_NOFOLLOW);
-    const std::string self = "/proc/self/fd/" + std::to_string(old.get());
-    std::vector<char> acl(XATTR_SIZE_MAX);
-    const ssize_t size = old ? getxattr(self.c_str(), kAcl, acl.data(), acl.size()) : -1;
-    if (size > 0) return fsetxattr(part, kAcl, acl.data(), static_cast<size_t>(size), 0) == 0;
-    return vexo::setMode(part, copy.oldStatus.st_mode & 0777);
+bool takeOverPermissions(const Copy& copy, int file) {
+    return vexo::takeOverPermissions(copy.folder.get(), copy.name.c_str(), copy.oldStatus.st_mode, file);
 }
 
 bool create(const Copy& copy, vexo::PartFile& part) {
     // A part that replaces a file is closed to others until it has that file's permissions.
-    const Umask mask(kUmask);
+    const vexo::Umask mask(kUmask);
     return part.create(copy.exists ? 0600 : kNewFile) && vexo::setOwner(part.get(), copy.options.uid, copy.options.gid);
 }
 
@@ -158,22 +135,25 @@ int errorOfPublishing(int systemCode) {
     }
 }
 
-// A new file in a folder with a default ACL gets its permissions from there, which only making it anew does.
-bool hasDefaultAcl(const Copy& copy) {
-    const std::string self = "/proc/self/fd/" + std::to_string(copy.folder.get());
-    return getxattr(self.c_str(), kDefaultAcl, nullptr, 0) > 0;
-}
-
-// Whether the source itself can become the target, as its owner allows.
+// Whether the source itself can become the target, as its owner allows. A new file in a folder with a default ACL gets
+// its permissions from there, which only making it anew does.
 bool mayTake(const Copy& copy) {
     struct stat folder {};
     const struct stat& from = copy.sourceStatus;
     return (copy.options.switches & VEXO_COPY_TAKE) != 0 && fstat(copy.folder.get(), &folder) == 0 &&
            folder.st_dev == from.st_dev && from.st_nlink == 1 && (from.st_uid == geteuid() || geteuid() == 0) &&
-           (copy.exists || !hasDefaultAcl(copy));
+           (copy.exists || !vexo::hasDefaultAcl(copy.folder.get()));
 }
 
-// Moves the source into place. False with errno; nothing has changed then but the source's owner and permissions.
+// Removes the source's name, unless somebody put another file there: what became the target was told by its descriptor.
+void dropName(const char* source, const Copy& copy) {
+    struct stat now {};
+    if (lstat(source, &now) == 0 && now.st_dev == copy.sourceStatus.st_dev && now.st_ino == copy.sourceStatus.st_ino) {
+        unlink(source);
+    }
+}
+
+// Makes the source the target. False with errno; nothing has changed then but the source's owner and permissions.
 bool take(const char* source, const Copy& copy) {
     const int file = copy.source.get();
     const bool permitted = copy.exists ? takeOverPermissions(copy, file) : vexo::setMode(file, kNewFile & ~kUmask);
@@ -183,7 +163,10 @@ bool take(const char* source, const Copy& copy) {
         errno = ECANCELED;
         return false;
     }
-    return renameat2(AT_FDCWD, source, copy.folder.get(), copy.name.c_str(), copy.exists ? 0 : RENAME_NOREPLACE) == 0;
+    vexo::PartFile part(copy.folder.get());
+    if (!part.adopt(file) || !publish(copy, part)) return false;
+    dropName(source, copy);
+    return true;
 }
 
 }  // namespace

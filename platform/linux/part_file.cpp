@@ -35,6 +35,11 @@ bool PartFile::create(mode_t mode) {
     return createNamed(mode);
 }
 
+bool PartFile::adopt(int fd) {
+    fd_ = Descriptor(fcntl(fd, F_DUPFD_CLOEXEC, 0));
+    return static_cast<bool>(fd_);
+}
+
 bool PartFile::createNamed(mode_t mode) {
     for (int attempt = 0; attempt < kAttempts; ++attempt) {
         std::string name = drawName();

@@ -22,6 +22,8 @@ class PartFile {
 
     // Creates it, open for reading and writing. False with errno.
     [[nodiscard]] bool create(mode_t mode);
+    // Takes the open file `fd` for it, whatever its name: publishing gives it one more. False with errno.
+    [[nodiscard]] bool adopt(int fd);
     [[nodiscard]] int get() const { return fd_.get(); }
     // Gives it the name `name` in the folder, in place of the file of that name when `replace`; else EEXIST when there
     // is one. False with errno.

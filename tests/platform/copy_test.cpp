@@ -96,6 +96,36 @@ class CopyTest : public support::ApplianceTest {
     std::string root_;
 };
 
+// Stand-ins for what others do in the middle of a copy.
+int cancels() {
+    return 1;
+}
+int appears() {
+    writeFile(place + "/in/a", "theirs");
+    return 0;
+}
+int becomesFolder() {
+    EXPECT_EQ(unlink((place + "/in/a").c_str()), 0);
+    support::makeFolder(place + "/in/a");
+    return 0;
+}
+int shrinks() {
+    return truncate((place + "/source").c_str(), 100);
+}
+int swapsSource() {
+    fs::remove(place + "/source");
+    writeFile(place + "/source", "theirs");
+    return 0;
+}
+int dies() {
+    return raise(SIGKILL);
+}
+
+const support::Refusal kNoNameless{SYS_openat, EOPNOTSUPP, 2, O_TMPFILE & ~O_DIRECTORY};
+const support::Refusal kNoClone{SYS_ioctl, EOPNOTSUPP};
+const support::Refusal kNoKernelCopy{SYS_copy_file_range, EXDEV};
+const support::Refusal kNoExclusiveRename{SYS_renameat2, EINVAL, 4, 1};
+
 TEST_F(CopyTest, TheTargetIsANewFileOfTheGivenOwner) {
     const mode_t before = umask(0);  // as the making of temporary folders leaves it
     const timespec times[] = {{1000000000, 1}, {1100000000, 2}};
@@ -171,8 +201,22 @@ TEST_F(CopyTest, ASourceThatIsGivenAwayBecomesTheTarget) {
     EXPECT_EQ(readFile(target), "third");
     EXPECT_TRUE(fs::exists(source));
 
-    const VEXOCOPYOPT cancelled = {getuid(), getgid(), [] { return 1; }, VEXO_COPY_TAKE};
+    // Where a file cannot have two names it is copied too.
     fs::remove(root_ + "/other name");
+    const auto withoutLinks = [&] {
+        if (!support::refuseCalls({{SYS_linkat, EPERM}, kNoNameless})) return 97;
+        EXPECT_EQ(VEXOFileCopy(source.c_str(), (target + "3").c_str(), &give), 0);
+        return readFile(target + "3") == "third" && fs::exists(source) ? 0 : 1;
+    };
+    EXPECT_EQ(support::inChild(withoutLinks), 0);
+
+    // Another file put under the source's name in the middle is neither taken nor removed.
+    const VEXOCOPYOPT swapped = {getuid(), getgid(), swapsSource, VEXO_COPY_OVERWRITE | VEXO_COPY_TAKE};
+    ASSERT_EQ(VEXOFileCopy(source.c_str(), target.c_str(), &swapped), 0);
+    EXPECT_EQ(readFile(target), "third");
+    EXPECT_EQ(readFile(source), "theirs");
+
+    const VEXOCOPYOPT cancelled = {getuid(), getgid(), [] { return 1; }, VEXO_COPY_TAKE};
     EXPECT_EQ(VEXOFileCopy(source.c_str(), (target + "2").c_str(), &cancelled), -1);
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_CANCELLED);
     EXPECT_TRUE(fs::exists(source));
@@ -242,31 +286,6 @@ TEST_F(CopyTest, SourcesAndTargetsThatAreRefused) {
     // The names that only FAT refuses are names elsewhere.
     EXPECT_EQ(VEXOFileCopy(source.c_str(), (root_ + "/what?").c_str(), nullptr), 0);
 }
-
-// Stand-ins for what others do in the middle of a copy.
-int cancels() {
-    return 1;
-}
-int appears() {
-    writeFile(place + "/in/a", "theirs");
-    return 0;
-}
-int becomesFolder() {
-    EXPECT_EQ(unlink((place + "/in/a").c_str()), 0);
-    support::makeFolder(place + "/in/a");
-    return 0;
-}
-int shrinks() {
-    return truncate((place + "/source").c_str(), 100);
-}
-int dies() {
-    return raise(SIGKILL);
-}
-
-const support::Refusal kNoNameless{SYS_openat, EOPNOTSUPP, 2, O_TMPFILE & ~O_DIRECTORY};
-const support::Refusal kNoClone{SYS_ioctl, EOPNOTSUPP};
-const support::Refusal kNoKernelCopy{SYS_copy_file_range, EXDEV};
-const support::Refusal kNoExclusiveRename{SYS_renameat2, EINVAL, 4, 1};
 
 TEST_F(CopyTest, EachWayGivesTheSameAndLeavesNothing) {
     const std::string source = root_ + "/source";

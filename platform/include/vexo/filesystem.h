@@ -62,7 +62,9 @@ namespace WebUtils {
 
 VEXO_API bool IsMountPoint(std::string path);         // by the mount table
 VEXO_API std::string getMountType(std::string path);  // type name of the mount at exactly `path`; "" when there is none
-VEXO_API std::string GetModifyTime(const char* path);  // seconds since the epoch in decimal; "0" when it cannot be read
+// Seconds since the epoch in decimal; "0" when it cannot be read. The path is taken as it stands: that of an
+// appliance's folder goes through VEXO::SystemPath first.
+VEXO_API std::string GetModifyTime(const char* path);
 VEXO_API std::vector<std::string> StringExplode(const std::string& text,
                                                 const std::string& delimiter);  // no empty pieces
 
