@@ -406,7 +406,7 @@ const StatusFault kStatusFaults[] = {
 
 TEST_F(ListingTest, FailingStatusOfOneEntry) {
     for (const auto& fault : kStatusFaults) {
-        ApplianceTest::SetUp();
+        SetUp();
         folder("dir");
         const std::string child = real_ + "/dir";
         if (fault.remote) addMount(child, "nfs4");
@@ -441,7 +441,7 @@ TEST_F(ListingTest, FailingStatusOfOneEntry) {
             EXPECT_EQ(entries.front().realPath, child);
             EXPECT_EQ(entries.front().mode + entries.front().aclPrivilege, 0U);
         }
-        ApplianceTest::TearDown();
+        TearDown();
     }
 }
 
