@@ -40,7 +40,7 @@ void handOver(const Descriptor& made, const std::string& user) {
     uid_t uid = 0;
     gid_t gid = 0;
     if (geteuid() != 0 || VEXOUserGetUGID(user.c_str(), &uid, &gid) != 0) return;
-    static_cast<void>(fchownat(made.get(), "", uid, gid, AT_EMPTY_PATH));  // FAT keeps no owners
+    [[maybe_unused]] const int ignored = fchownat(made.get(), "", uid, gid, AT_EMPTY_PATH);  // FAT keeps no owners
 }
 
 int lastCode() {
