@@ -20,10 +20,9 @@ namespace {
 constexpr const char* kSource = "orvelupload";
 constexpr const char* kApplication = "VEXO.QDS.App.Quorvane3.Instance";
 constexpr int kSessionFlags = 15;
-constexpr int kWriteAcl = 2;
 
 bool isAuthorized(WebMan& webMan, const char* appId) {
-    if (!webMan.IsAuthorized(appId, kSessionFlags, static_cast<_tag_cgi_position>(1))) return false;
+    if (!webMan.IsAuthorized(appId, kSessionFlags, CGI_POSITION_DESKTOP)) return false;
     return VLIBUserPrivilegeHas(webMan.GetLoginUserName().c_str(), kApplication) != 0;
 }
 
@@ -43,7 +42,9 @@ int checkFile(const std::string& path, const char* user, const char* sid, _tag__
                printable(sid).c_str());
         return ORV_ERR_GENERAL;
     }
-    if (OrvCheckPath(realPath.c_str(), true, kWriteAcl, nullptr) != 0) {
+    if (OrvCheckPath(realPath.c_str(), true, ORV_ACCESS_WRITE, nullptr) != 0) {
+        // A look-up of permissions can fail without a code, and 0 would mean that the target is acceptable.
+        if (OrvLibGetErr() == ORV_ERR_NONE) OrvLibSetErr(ORV_ERR_GENERAL);
         syslog(LOG_ERR, "%s:%d Invalid path:%s, reason=[%X]", kSource, __LINE__, printable(realPath).c_str(),
                static_cast<unsigned>(OrvLibGetErr()));
         return OrvLibGetErr();

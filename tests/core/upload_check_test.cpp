@@ -113,6 +113,25 @@ TEST_F(UploadCheckTest, CheckedInOrder) {
     }
 }
 
+// The look-up of permissions can fail without a code; what was stored before is answered then, but never "acceptable".
+TEST_F(UploadCheckTest, ARefusalIsNeverZero) {
+    for (const int before : {0, 7}) {
+        support::inChild([&] {
+            OrvLibSetErr(before);
+            vexo::gate::fail("VEXOACLPermGet", VEXO_ERR_GENERAL);
+            auto mode = kError;
+            const int expected = before == 0 ? 401 : before;
+            EXPECT_EQ(CheckFile("/photo/a", "alice", nullptr, mode), expected);
+            EXPECT_EQ(OrvLibGetErr(), expected);
+            const auto log = support::takeLog();
+            EXPECT_FALSE(log.empty());
+            const std::string reason = before == 0 ? "reason=[191]" : "reason=[7]";
+            EXPECT_TRUE(!log.empty() && log.back().text.ends_with(reason)) << reason;
+            return 0;
+        });
+    }
+}
+
 TEST_F(UploadCheckTest, ASwitchThatLeavesRootIsRefused) {
     SKIP_WITHOUT_ROOT();
     addUser("toor", 0, 0);
