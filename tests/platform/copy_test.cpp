@@ -113,7 +113,7 @@ int shrinks() {
     return truncate((place + "/source").c_str(), 100);
 }
 int swapsSource() {
-    fs::remove(place + "/source");
+    fs::rename(place + "/source", place + "/moved");
     writeFile(place + "/source", "theirs");
     return 0;
 }
@@ -173,9 +173,13 @@ TEST_F(CopyTest, ReplacingTakesOverThePermissions) {
     EXPECT_EQ(names(root_ + "/in"), std::set<std::string>{"a"});
     // A new file gets what the folder's default ACL says.
     ASSERT_EQ(setxattr((root_ + "/in").c_str(), "system.posix_acl_default", acl, sizeof acl, 0), 0);
-    ASSERT_EQ(VEXOFileCopy((root_ + "/source").c_str(), (root_ + "/in/b").c_str(), nullptr), 0);
-    EXPECT_EQ(getxattr((root_ + "/in/b").c_str(), "system.posix_acl_access", got, sizeof got), ssize_t{sizeof acl});
-    EXPECT_EQ(memcmp(got, acl, sizeof acl), 0);
+    for (const unsigned switches : {0U, unsigned{VEXO_COPY_TAKE}}) {
+        const VEXOCOPYOPT how = options(switches);
+        const std::string made = root_ + "/in/" + std::to_string(switches);
+        ASSERT_EQ(VEXOFileCopy((root_ + "/source").c_str(), made.c_str(), &how), 0);
+        EXPECT_EQ(getxattr(made.c_str(), "system.posix_acl_access", got, sizeof got), ssize_t{sizeof acl});
+        EXPECT_EQ(memcmp(got, acl, sizeof acl), 0);
+    }
 }
 
 TEST_F(CopyTest, ASourceThatIsGivenAwayBecomesTheTarget) {
