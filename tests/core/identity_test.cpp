@@ -6,12 +6,15 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cstdlib>
+#include <string>
 #include <vector>
 
 #include "fault_gate.h"
 #include "orvel/error_state.h"
 #include "support/appliance.h"
 #include "vexo/error.h"
+#include "vexo/session.h"
 
 namespace {
 
@@ -108,14 +111,76 @@ TEST_F(IdentityTest, TheAdministratorQuestionComesBeforeTheArguments) {
     EXPECT_EQ(vexo::gate::calls("VEXOGroupIsAdminGroupMem"), 1);
 }
 
-TEST_F(IdentityTest, SessionAnswersSpareTheUserSource) {
+// A session of `user`, as a request that the web server let in gets it.
+std::string sessionOf(const char* user) {
+    setenv("REMOTE_USER", user, 1);
+    WebMan web;
+    EXPECT_TRUE(web.IsAuthorized("app", 15, CGI_POSITION_DESKTOP));
+    unsetenv("REMOTE_USER");
+    return web.GetSessionId();
+}
+
+TEST_F(IdentityTest, TheSessionTellsBothIds) {
+    SKIP_WITHOUT_ROOT();
+    const std::string sid = sessionOf("alice");
+    inChild([&] {
+        vexo::gate::reset();
+        EXPECT_EQ(OrvLibUGIDSet(sid.c_str(), "alice"), 0);
+        EXPECT_EQ(vexo::gate::calls("VexoCgiGIDGet"), 1);
+        EXPECT_EQ(vexo::gate::calls("VexoCgiUIDGet"), 1) << "the uid is not read from the user source";
+        EXPECT_EQ(geteuid(), support::kAliceUid);
+        EXPECT_EQ(getegid(), gid_t{support::kUsersGid});
+        return 0;
+    });
+    inChild([&] {
+        vexo::gate::fail("VexoCgiUIDGet", VEXO_ERR_GENERAL);
+        EXPECT_EQ(OrvLibUGIDSet(sid.c_str(), "alice"), -1);
+        EXPECT_EQ(OrvLibGetErr(), 401);
+        const auto log = support::takeLog();
+        EXPECT_EQ(log.size(), 1U);
+        EXPECT_TRUE(log.at(0).text.ends_with(" Failed to set UID for user=alice, sid=" + sid)) << log.at(0).text;
+        return 0;
+    });
+}
+
+// Whatever fails, success means that nothing of root is left.
+TEST_F(IdentityTest, SwitchUnderEveryFault) {
+    SKIP_WITHOUT_ROOT();
+    const std::string session = sessionOf("alice");
+    for (const char* sid : {static_cast<const char*>(nullptr), session.c_str()}) {
+        constexpr int kLimit = 50;
+        int nth = 1;
+        while (nth < kLimit && inChild([&] {
+                                   SCOPED_TRACE("call " + std::to_string(nth) + " fails");
+                                   const gid_t roots[] = {0, 4};
+                                   EXPECT_EQ(setgroups(2, roots), 0);
+                                   vexo::gate::reset();
+                                   vexo::gate::fail("*", VEXO_ERR_GENERAL, EIO, nth);
+                                   OrvLibSetErr(0);
+                                   if (OrvLibUGIDSet(sid, "alice") != 0) {
+                                       EXPECT_EQ(OrvLibGetErr(), 401);
+                                   } else {
+                                       EXPECT_EQ(geteuid(), support::kAliceUid);
+                                       EXPECT_EQ(getegid(), gid_t{support::kUsersGid});
+                                       for (const gid_t gid : groupList()) EXPECT_EQ(gid, gid_t{support::kUsersGid});
+                                   }
+                                   return vexo::gate::calls("*") >= nth ? 1 : 0;
+                               }) == 1) {
+            ++nth;
+        }
+        EXPECT_GE(nth - 1, 3);
+        EXPECT_LT(nth, kLimit);
+    }
+}
+
+TEST_F(IdentityTest, TheUserSourceIsAskedOnceTheSessionFailed) {
     vexo::gate::reset();
     vexo::gate::fail("VexoCgiGIDGet", VEXO_ERR_GENERAL);
     vexo::gate::fail("VEXOUserGetUGID", VEXO_ERR_GENERAL);
     announceLog("Failed to get GID for user=alice, sid=s");
     EXPECT_EQ(OrvLibUGIDSet("s", "alice"), -1);
     EXPECT_EQ(OrvLibGetErr(), 401) << "only an unknown user is 403";
-    EXPECT_EQ(vexo::gate::calls("VEXOUserGetUGID"), 1) << "asked once the session failed";
+    EXPECT_EQ(vexo::gate::calls("VEXOUserGetUGID"), 1);
 }
 
 TEST_F(IdentityTest, FailedGroupListIsLoggedAndLeavesNoneOfRoots) {
