@@ -111,6 +111,12 @@ TEST_F(NameCheckTest, Paths) {
         }
     }
     EXPECT_EQ(OrvCheckPath(nullptr, true, ORV_NO_ACL_TEST, nullptr), -1);
+    EXPECT_EQ(OrvLibGetErr(), 400);
+    vexo::gate::fail("VEXOGetFSType", VEXO_ERR_GENERAL, EIO);
+    announceLog("Failed to statfs " + disk + ", reason=Input/output error");
+    EXPECT_EQ(OrvCheckPath((disk + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), -1);
+    EXPECT_EQ(OrvLibGetErr(), 417);
+    vexo::gate::reset();
     EXPECT_EQ(OrvCheckPath((disk + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), 0);
 }
 

@@ -184,6 +184,20 @@ TEST_F(SharePathTest, HomeThatCannotBeHad) {
     EXPECT_EQ(takeLogTexts(), Texts{start + "(null)): Read-only file system"});
     vexo::gate::reset();
 
+    // The folder can be entered, but its canonical path is longer than a path can be.
+    const std::string part = "/" + std::string(199, 'd'), place = shareRoot("photo");
+    std::string half;
+    for (int i = 0; i < 12; ++i) half += part;
+    support::makeFolder(place + half);
+    ASSERT_EQ(symlink((place + half).c_str(), (place + "/half").c_str()), 0);
+    support::makeFolder(place + "/half" + half);
+    ASSERT_EQ(rmdir(home.c_str()), 0);
+    ASSERT_EQ(symlink((place + "/half" + half).c_str(), home.c_str()), 0);
+    EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 0);
+    EXPECT_EQ(OrvLibGetErr(), 401);
+    EXPECT_EQ(takeLogTexts(), (Texts{"orveldir:# readpath(" + home + ") fail (File name too long)",
+                                     "orveldir:# Failed to get real path (" + home + ")"}));
+
     setSetting("userhome_enable", "no");
     EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 0);
     EXPECT_EQ(OrvLibGetErr(), 408);
@@ -304,6 +318,7 @@ TEST_F(SharePathTest, EncryptedShares) {
         EXPECT_EQ(takeLogTexts(), c.log);
     }
     EXPECT_EQ(OrvLibCheckEncryptShare("photo", nullptr), 0);
+    EXPECT_EQ(OrvLibGetErr(), 400);
 }
 
 // Whatever fails, the result is either right or a failure with a code, and nothing is kept open.
