@@ -30,12 +30,14 @@ class ORVEL_API PathInfoFactory {
 
 // Writes the entry into the JSON object `out`: "name", "path", "isdir" and, below "additional", the properties whose
 // ADDITIONAL_... bits are set. Members that exist are overwritten, others stay; an "additional"/"perm" object that is
-// there already keeps its other members. A value in the way that is no object becomes one. Never fails.
+// there already keeps its other members. A value in the way that is no object becomes one. Fails only
+// when memory is out: 401 is stored, `out` holds a part.
 ORVEL_API void DumpFileInfo(int additional, const DIRENTRY_INFO& info, Json::Value& out);
 
 // Appends to `out` the compact text of the object that DumpFileInfo makes, byte for byte as jsoncpp writes it (no
 // indentation, UTF-8 as it stands, keys sorted) without building the object: for lists too long to hold as a tree.
-// Names that are no UTF-8 are the caller's business: their bytes pass through.
+// Names that are no UTF-8 are the caller's business: their bytes pass through. When memory is out `out` is unchanged
+// and 401 is stored.
 ORVEL_API void AppendFileInfoText(int additional, const DIRENTRY_INFO& info, std::string& out);
 
 // Joins the paths of a JSON array with ", ": each from its first "/" on, or whole when it has none; elements that are

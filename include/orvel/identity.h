@@ -11,9 +11,13 @@
 #include "orvel/export.h"
 
 // Switches to `user`: group list, effective gid, then effective uid. An administrator keeps the effective uid 0, with
-// the groups of his own. `sid` (may be null) is the login session; with it the ids come from the session. Returns 0; -1
-// with 400 null user, 401 lookup failed, 403 unknown user. After a failure the process may hold a part of the new
-// identity: end the request.
+// the groups of his own. `sid` (may be null) is the login session; with it the ids come from the session, and from the
+// user source only when the session does not tell the gid. Returns 0; -1 with 400 null user, 401 lookup failed, 403
+// unknown user. After a failure the process may hold a part of the new identity: end the request.
+//
+// 0 does not prove that the kernel allowed the change (kept: started by an ordinary user a process goes on as itself).
+// A user who is no administrator and was left at uid 0 is logged; a caller started as root looks at geteuid. A group
+// list that cannot be read is logged too, and leaves the process without supplementary groups.
 ORVEL_API int OrvLibUGIDSet(const char* sid, const char* user);
 
 // Sets the effective gid. `gid` may be (gid_t)-1, not known, when a `sid` is given; the session is then asked.

@@ -25,9 +25,11 @@ ORVEL_API int OrvCheckFileName(const char* dirRealPath, const char* name);
 // `aclBits` are the request bits of ACLAccess, or ORV_NO_ACL_TEST; 0 always fails, with the code that was there before.
 // `existingPart` (may be null) receives the existing part once it is known to be usable; it is left alone before that.
 // Returns 0; -1 with 400 (null, empty, not absolute, or beginning with "//"), 401, 407, 408 (missing, or only "/"), 410
-// (a network mount that does not answer), 411, 419. The platform error is set as well: 0x0D00 for a relative path,
-// 0x0300 with 407, 0x0600 with 408, 0x1100 with 410, 0x8100 with 401. Names are not tested for being reserved: that is
-// OrvCheckFileName's.
+// (a network mount that does not answer), 411, 419, the code of errno when the type of the file system cannot be told,
+// or the code that was there before when the permissions cannot be read (see ACLAccess). The platform error is set as
+// well: 0x0D00 for a relative path, 0x0300 with 407, 0x0600 with 408, 0x1100 with 410, 0x8100 with 401. Logged: what is
+// no file or folder, refused permissions, and failures of unknown cause. Names are not tested for being reserved: that
+// is OrvCheckFileName's.
 ORVEL_API int OrvCheckPath(const char* realPath, bool walkUp, int aclBits, std::string* existingPart);
 
 // May the file manager work on the volume of this path? Only external volumes can be refused: those whose file system
