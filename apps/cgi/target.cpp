@@ -48,23 +48,29 @@ int lastCode() {
     return code != ORV_ERR_NONE ? code : ORV_ERR_GENERAL;
 }
 
-// Cuts the path into the target's name and the folders above it, and opens the deepest of them that exists: the first
-// `existing` ones.
-int enter(const PathInfo& info, LinkPolicy policy, std::vector<std::string>& folders, size_t& existing,
-          Target& target) {
-    folders = componentsOf(std::string_view(info.realPath).substr(info.shareRoot.size()));
+// The folders above a target, of which the first `existing` ones exist.
+struct Way {
+    Descriptor root;
+    std::vector<std::string> folders;
+    size_t existing = 0;
+};
+
+// Cuts the path into the target's name and the folders above it, and opens the deepest of them that exists.
+int enter(const PathInfo& info, LinkPolicy policy, Way& way, Target& target) {
+    way.folders = componentsOf(std::string_view(info.realPath).substr(info.shareRoot.size()));
     target.name = info.realPath.substr(info.realPath.rfind('/') + 1);
-    if (folders.empty()) return ORV_ERR_PARAMETER;
+    if (way.folders.empty()) return ORV_ERR_PARAMETER;
     // These are names of folders above, not of anything that could be made.
     if (target.name == "." || target.name == "..") return ORV_ERR_RESERVED_NAME;
-    folders.pop_back();
+    if (info.realPath.size() >= PATH_MAX) return refusalCode(ENAMETOOLONG, info.realPath);  // could not be opened again
+    way.folders.pop_back();
 
-    const Descriptor root(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    if (!root) return refusalCode(errno, info.shareRoot);
-    for (existing = folders.size();; --existing) {
-        target.folder = openBeneath(root, joined(folders, existing), policy, O_PATH | O_DIRECTORY);
+    way.root = Descriptor(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    if (!way.root) return refusalCode(errno, info.shareRoot);
+    for (way.existing = way.folders.size();; --way.existing) {
+        target.folder = openBeneath(way.root, joined(way.folders, way.existing), policy, O_PATH | O_DIRECTORY);
         if (target.folder) return ORV_ERR_NONE;
-        if (errno != ENOENT || existing == 0) return refusalCode(errno, info.realPath);
+        if (errno != ENOENT || way.existing == 0) return refusalCode(errno, info.realPath);
     }
 }
 
@@ -81,19 +87,19 @@ int makeFolder(const Descriptor& folder, const std::string& name, const std::str
 }
 
 int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target) {
-    std::vector<std::string> folders;
-    size_t existing = 0;
-    int code = enter(info, policy, folders, existing, target);
+    Way way;
+    int code = enter(info, policy, way, target);
     if (code != ORV_ERR_NONE) return code;
-    if (existing < folders.size() && missing == Missing::kRefuse) return ORV_ERR_MISSING;
-    for (; existing < folders.size(); ++existing) {
+    if (way.existing < way.folders.size() && missing == Missing::kRefuse) return ORV_ERR_MISSING;
+    for (size_t i = way.existing; i < way.folders.size(); ++i) {
+        const std::string& name = way.folders[i];
         Descriptor made;
-        code = makeFolder(target.folder, folders[existing], user, made);
+        code = makeFolder(target.folder, name, user, made);
         if (code == ORV_ERR_NONE) {
-            target.made.push_back({std::move(target.folder), folders[existing]});
+            target.made.push_back({std::move(target.folder), name});
         } else if (code == ORV_ERR_EXISTS) {
             // Another request made it meanwhile: entered like any other that exists.
-            made = openBeneath(target.folder, folders[existing], policy, O_PATH | O_DIRECTORY);
+            made = openBeneath(target.folder, name, policy, O_PATH | O_DIRECTORY);
         }
         if (!made) {
             removeMadeFolders(target);
@@ -104,21 +110,22 @@ int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user,
     return ORV_ERR_NONE;
 }
 
-int previewTarget(const PathInfo& info, LinkPolicy policy, Target& target) {
-    std::vector<std::string> folders;
-    size_t existing = 0;
-    const int code = enter(info, policy, folders, existing, target);
+int previewTarget(const PathInfo& info, LinkPolicy policy, Target& target, std::string& within) {
+    Way way;
+    const int code = enter(info, policy, way, target);
     if (code != ORV_ERR_NONE) return code;
-    const bool whole = existing == folders.size();
-    const std::string deepest = realPathOf(target.folder);
-    folders.push_back(target.name);
-    for (; existing < folders.size(); ++existing) {
-        const std::string& name = folders[existing];
+    const std::string top = realPathOf(way.root), deepest = realPathOf(target.folder);
+    if (!deepest.starts_with(top) || top.empty()) return refusalCode(ENAMETOOLONG, info.realPath);
+    within = deepest.substr(top.size());
+    if (way.existing < way.folders.size()) target.folder = Descriptor();
+    way.folders.push_back(target.name);
+    for (size_t i = way.existing; i < way.folders.size(); ++i) {
+        const std::string& name = way.folders[i];
         OrvLibSetErr(ORV_ERR_NONE);
         if (OrvCheckFileName(deepest.c_str(), name.c_str()) != 0) return lastCode();
         if (name.size() > NAME_MAX) return OrvParseErrnoToError(ENAMETOOLONG, info.shareName.c_str(), nullptr);
+        within += "/" + name;
     }
-    if (!whole) target.folder = Descriptor();
     return ORV_ERR_NONE;
 }
 

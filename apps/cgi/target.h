@@ -33,8 +33,8 @@ enum class Missing { kRefuse, kMake };
 int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target);
 
 // Asks what openTarget would ask without making anything. The same codes; on 0, `target.folder` is open only when it
-// exists already.
-int previewTarget(const PathInfo& info, LinkPolicy policy, Target& target);
+// exists already, and `within` is the target's path below the share root with no link in front of its name.
+int previewTarget(const PathInfo& info, LinkPolicy policy, Target& target, std::string& within);
 
 // Removes the folders made on the way, as far as they are empty: for when the target was not made after all.
 void removeMadeFolders(Target& target);

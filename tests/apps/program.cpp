@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 #include <json/reader.h>
 #include <spawn.h>
+#include <sys/mman.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -25,6 +26,18 @@ std::vector<char*> pointers(std::vector<std::string>& texts) {
     return list;
 }
 
+// The text as an open file, to be read from its beginning; -1 on failure.
+int bodyOf(const std::string& text) {
+    const int file = memfd_create("body", MFD_CLOEXEC);
+    for (size_t at = 0; file >= 0 && at < text.size();) {
+        const ssize_t written = write(file, text.data() + at, text.size() - at);
+        if (written <= 0) break;
+        at += static_cast<size_t>(written);
+    }
+    if (file >= 0) lseek(file, 0, SEEK_SET);
+    return file;
+}
+
 std::vector<std::string> environmentWith(std::map<std::string, std::string> variables) {
     // A process that took on another identity cannot be traced, which is how leaks are looked for.
     variables["ASAN_OPTIONS"] = "detect_leaks=0";
@@ -41,11 +54,13 @@ std::vector<std::string> environmentWith(std::map<std::string, std::string> vari
 
 }  // namespace
 
-Finished runProgram(const std::vector<std::string>& words, const std::map<std::string, std::string>& variables) {
+Finished runProgram(const std::vector<std::string>& words, const Variables& variables, const std::string& input) {
     int ends[2];
-    if (pipe2(ends, O_CLOEXEC) != 0) return {};
+    const int body = bodyOf(input);
+    if (body < 0 || pipe2(ends, O_CLOEXEC) != 0) return {};
     posix_spawn_file_actions_t actions;
     posix_spawn_file_actions_init(&actions);
+    posix_spawn_file_actions_adddup2(&actions, body, 0);
     posix_spawn_file_actions_adddup2(&actions, ends[1], 1);
     std::vector<std::string> texts = words;
     std::vector<std::string> environment = environmentWith(variables);
@@ -54,6 +69,7 @@ Finished runProgram(const std::vector<std::string>& words, const std::map<std::s
         posix_spawn(&child, words[0].c_str(), &actions, nullptr, pointers(texts).data(), pointers(environment).data());
     posix_spawn_file_actions_destroy(&actions);
     close(ends[1]);
+    close(body);
     Finished finished;
     char buffer[65536];
     for (ssize_t got; failed == 0 && (got = read(ends[0], buffer, sizeof buffer)) > 0;) {
@@ -68,7 +84,21 @@ Finished runProgram(const std::vector<std::string>& words, const std::map<std::s
     return finished;
 }
 
-CgiReply::CgiReply(const std::string& output) {
+std::string runCgi(const std::string& program, const std::string& user, const std::string& method,
+                   const std::string& query, const std::string& input, const Variables& more) {
+    Variables variables = {{"GATEWAY_INTERFACE", "CGI/1.1"},
+                           {"REQUEST_METHOD", method},
+                           {"REMOTE_ADDR", "127.0.0.1"},
+                           {"REMOTE_USER", user},
+                           {"QUERY_STRING", query}};
+    if (method != "GET" && method != "HEAD") variables["CONTENT_LENGTH"] = std::to_string(input.size());
+    for (const auto& [name, value] : more) variables[name] = value;
+    const Finished finished = runProgram({program}, variables, input);
+    EXPECT_EQ(finished.status, 0) << query;
+    return finished.output;
+}
+
+RawReply::RawReply(const std::string& output) {
     const size_t end = output.find("\r\n\r\n");
     if (end == std::string::npos) {
         ADD_FAILURE() << "no header: " << output;
@@ -81,7 +111,10 @@ CgiReply::CgiReply(const std::string& output) {
         if (colon != std::string::npos) headers[line.substr(0, colon)] = line.substr(colon + 2);
     }
     status = atoi(headers["Status"].c_str());  // NOLINT(cert-err34-c): 0 is no status
-    const std::string body = output.substr(end + 4);
+    body = output.substr(end + 4);
+}
+
+CgiReply::CgiReply(const std::string& output) : RawReply(output) {
     EXPECT_TRUE(orvel::cgi::isUtf8(body)) << body;
     Json::CharReaderBuilder strict;
     Json::CharReaderBuilder::strictMode(&strict.settings_);

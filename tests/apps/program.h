@@ -16,14 +16,28 @@ struct Finished {
     std::string output;
 };
 
-// `variables` are added to this process's environment; an empty value removes one.
-Finished runProgram(const std::vector<std::string>& words, const std::map<std::string, std::string>& variables = {});
+using Variables = std::map<std::string, std::string>;
+
+// `variables` are added to this process's environment; an empty value removes one. `input` is what the program finds on
+// its standard input.
+Finished runProgram(const std::vector<std::string>& words, const Variables& variables = {},
+                    const std::string& input = "");
+
+// Runs a CGI program for a user who is logged in, with `input` as body of the request; expects it to end well.
+std::string runCgi(const std::string& program, const std::string& user, const std::string& method,
+                   const std::string& query, const std::string& input = "", const Variables& more = {});
+
+// A reply cut into its header lines and its body.
+struct RawReply {
+    explicit RawReply(const std::string& output);
+    int status = 0;
+    Variables headers;
+    std::string body;
+};
 
 // A reply taken apart. The constructor fails the test unless it is one: header lines, then JSON that is valid UTF-8.
-struct CgiReply {
+struct CgiReply : RawReply {
     explicit CgiReply(const std::string& output);
-    int status = 0;
-    std::map<std::string, std::string> headers;
     Json::Value json;
 };
 

@@ -118,7 +118,8 @@ class FormStore final : public PartSink {
         if (!header.isFile || header.fileName.empty()) return true;  // a form's file field that was left empty
         const auto mode = modeOf(mode_);
         if (!folder_ || folder_->empty() || !mode) return outcome_.refuse(CGI_UPLOAD_FIELD, folder_.value_or(""));
-        upload_ = std::make_unique<Upload>(user_, *folder_ + "/" + header.fileName, *mode);
+        const char* separator = folder_->ends_with('/') ? "" : "/";
+        upload_ = std::make_unique<Upload>(user_, *folder_ + separator + header.fileName, *mode);
         return proceed(upload_->begin());
     }
 

@@ -86,8 +86,8 @@ int Spool::openFolder(const std::string& volumePath) {
     const std::string path = volumePath + "/@tmp/orvel/upload-" + std::to_string(geteuid());
     if (mkdir(path.c_str(), 0700) != 0 && errno != EEXIST) return codeOfWrite(errno);
     folder_ = Descriptor(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-    if (!folder_) return codeOfWrite(errno);
-    return isOnlyOurs(folder_) ? ORV_ERR_NONE : ConvUploadErrnoToAPIErr(CGI_UPLOAD_DENIED);
+    if (!folder_ && errno != ENOTDIR && errno != ELOOP) return codeOfWrite(errno);
+    return folder_ && isOnlyOurs(folder_) ? ORV_ERR_NONE : ConvUploadErrnoToAPIErr(CGI_UPLOAD_DENIED);
 }
 
 int Spool::open(const std::string& volumePath) {

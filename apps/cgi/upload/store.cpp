@@ -10,6 +10,7 @@
 #include "orvel/error_state.h"
 #include "orvel/file_info.h"
 #include "orvel/name_check.h"
+#include "orvel/share_path.h"
 #include "orvel/upload_check.h"
 
 namespace orvel::cgi {
@@ -46,16 +47,27 @@ int Upload::begin() {
     path_ = info_.path;
     if (!OrvCheckReservedName(path_.substr(path_.rfind('/') + 1).c_str())) return lastCode();
     prepareVolume(info_.volumePath);
-    int code = CheckFile(path_, user_.name.c_str(), user_.sid.c_str(), mode_);
+    const char* user = user_.name.c_str();
+    if (!CheckShareUploadPrivilege(user, user_.sid.c_str(), path_.c_str(), mode_)) return lastCode();
+    const int code = actAs(user_.sid.c_str(), user_.name, IsDirUserHome(path_, nullptr));
     if (code != ORV_ERR_NONE) return code;
+    return inspect();
+}
 
+// What the path leads to, as the user. CheckFile takes a link for no folder, so it is asked about where the links in
+// the path lead, which is within the share.
+int Upload::inspect() {
     Target target;
-    code = previewTarget(info_, linkPolicyOf(info_.shareName), target);
+    std::string within;
+    int code = previewTarget(info_, linkPolicyOf(info_.shareName), target, within);
     if (code != ORV_ERR_NONE) return code;
     struct stat status {};
     const bool there =
         target.folder && fstatat(target.folder.get(), target.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
     if (there && !S_ISREG(status.st_mode)) return ORV_ERR_EXISTS;
+    const std::string share = path_.substr(0, path_.size() - (info_.realPath.size() - info_.shareRoot.size()));
+    code = CheckFile(share + within, user_.name.c_str(), user_.sid.c_str(), mode_);
+    if (code != ORV_ERR_NONE) return code;
     skipped_ = there && mode_ == OVERWRITE_MODE_SKIP;
     return skipped_ ? ORV_ERR_NONE : spool_.open(info_.volumePath);
 }

@@ -34,6 +34,7 @@ class Upload {
     [[nodiscard]] long long size() const { return spool_.size(); }
 
  private:
+    int inspect();
     int reserve(const Target& target, bool& reserved);
 
     const User& user_;

@@ -1,0 +1,330 @@
+// The program upload, run as a web server runs it.
+#include <gtest/gtest.h>
+#include <sched.h>
+#include <sys/mount.h>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "apps/program.h"
+#include "support/appliance.h"
+#include "text.h"
+
+namespace fs = std::filesystem;
+using support::CgiReply;
+
+namespace {
+
+class UploadCgi : public support::ApplianceTest {
+ protected:
+    void SetUp() override {
+        ApplianceTest::SetUp();
+        SKIP_WITHOUT_ROOT();
+    }
+    static CgiReply put(const std::string& user, const std::string& path, const std::string& body,
+                        const std::string& mode = "error", const support::Variables& more = {}) {
+        const std::string query = "path=" + orvel::cgi::percentEncode(path) + "&overwrite=" + mode;
+        return CgiReply(support::runCgi(PROGRAM_UPLOAD, user, "PUT", query, body, more));
+    }
+    static std::string part(const std::string& disposition, const std::string& data) {
+        return "--XX\r\nContent-Disposition: form-data; " + disposition + "\r\n\r\n" + data + "\r\n";
+    }
+    static CgiReply post(const std::string& user, const std::string& query, const std::string& body) {
+        return CgiReply(support::runCgi(PROGRAM_UPLOAD, user, "POST", query, body,
+                                        {{"CONTENT_TYPE", "multipart/form-data; boundary=XX"}}));
+    }
+    static int code(const CgiReply& reply) { return reply.json["error"]["code"].asInt(); }
+    // What uploads of this user left in the temporary place of the volume.
+    static std::vector<std::string> temporaries(unsigned uid) {
+        return namesIn("/tmp/@tmp/orvel/upload-" + std::to_string(uid));
+    }
+    static std::vector<std::string> namesIn(const std::string& folder) {
+        std::vector<std::string> names;
+        for (const auto& entry : fs::directory_iterator(folder)) names.push_back(entry.path().filename());
+        std::sort(names.begin(), names.end());
+        return names;
+    }
+    static void expectOwned(const std::string& path, unsigned uid, unsigned mode) {
+        struct stat status = {};
+        ASSERT_EQ(lstat(path.c_str(), &status), 0) << path;
+        EXPECT_EQ(status.st_uid, uid) << path;
+        EXPECT_EQ(status.st_gid, support::kUsersGid) << path;
+        EXPECT_EQ(status.st_mode & 07777, mode) << path;
+    }
+};
+
+using Names = std::vector<std::string>;
+
+TEST_F(UploadCgi, AFileBelongsToItsUserWithTheFoldersAboveIt) {
+    const std::string root = addShare("photo", "read only = no\nvalid users = alice, carol\n");
+    const std::string data("a\0\r\n\xFF", 5);
+    const mode_t mask = umask(0);
+    const CgiReply reply = put("alice", "/photo/new/deeper/a.bin", data);
+    umask(mask);
+    EXPECT_EQ(reply.status, 200);
+    EXPECT_EQ(reply.json["data"]["files"][0]["path"], "/photo/new/deeper/a.bin");
+    EXPECT_EQ(reply.json["data"]["files"][0]["size"], 5);
+    EXPECT_EQ(support::readFile(root + "/new/deeper/a.bin"), data);
+    expectOwned(root + "/new", support::kAliceUid, 0755);
+    expectOwned(root + "/new/deeper", support::kAliceUid, 0755);
+    expectOwned(root + "/new/deeper/a.bin", support::kAliceUid, 0644);
+
+    EXPECT_TRUE(put("carol", "/photo/admin/b", "").json["success"].asBool());
+    expectOwned(root + "/admin", support::kCarolUid, 0755);
+    expectOwned(root + "/admin/b", support::kCarolUid, 0644);
+    EXPECT_TRUE(put("bob", "/home/c", "x").json["success"].asBool());
+    expectOwned(shareRoot("homes") + "/bob/c", support::kBobUid, 0644);
+    for (const unsigned uid : {unsigned{support::kAliceUid}, 0U}) EXPECT_EQ(temporaries(uid), Names{});
+}
+
+TEST_F(UploadCgi, WhatExistsIsReplacedOnlyWhenAskedForAndAllowed) {
+    const std::string root = shareRoot("photo");
+    const std::string fixed = addShare("archive", "read only = no\nvalid users = alice\nvexo:restriction = 2\n");
+    struct {
+        const char* share;
+        const char* mode;
+        int code;
+        bool skipped;
+        const char* content;
+    } const cases[] = {
+        {"photo", "error", 414, false, "old"},   {"photo", "skip", 0, true, "old"},
+        {"photo", "overwrite", 0, false, "new"}, {"archive", "error", 0, true, "old"},
+        {"archive", "skip", 0, true, "old"},     {"archive", "overwrite", 0, true, "old"},
+    };
+    for (const auto& existing : cases) {
+        SCOPED_TRACE(std::string(existing.share) + " " + existing.mode);
+        const std::string file = shareRoot(existing.share) + "/f";
+        support::writeFile(file, "old", 0640);
+        ASSERT_EQ(chown(file.c_str(), support::kAliceUid, support::kUsersGid), 0);
+        const CgiReply reply = put("alice", std::string("/") + existing.share + "/f", "new", existing.mode);
+        EXPECT_EQ(code(reply), existing.code);
+        EXPECT_EQ(reply.json["data"]["files"][0]["skipped"].asBool(), existing.skipped);
+        EXPECT_EQ(support::readFile(file), existing.content);
+        expectOwned(file, support::kAliceUid, 0640);
+    }
+    EXPECT_EQ(code(put("alice", "/archive/other", "new")), 0);
+    EXPECT_EQ(temporaries(support::kAliceUid), Names{});
+}
+
+TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
+    const std::string root = shareRoot("photo");
+    const std::string fat = addShare("usb", "read only = no\n");
+    addMount(fat, "vfat");
+    support::makeFolder(root + "/folder", 0777);
+    support::makeFolder(root + "/root's", 0755);
+    support::writeFile(root + "/file", "x", 0666);
+    ASSERT_EQ(mkfifo((root + "/pipe").c_str(), 0666), 0);
+    ASSERT_EQ(mknod((root + "/device").c_str(), S_IFCHR | 0666, makedev(1, 3)), 0);
+    support::makeFolder(root + "/inner", 0777);
+    fs::create_symlink("folder", root + "/inside");
+    fs::create_symlink("/tmp", root + "/outside");
+    fs::create_symlink("nowhere", root + "/dangling");
+    const auto before = namesIn(root);
+    struct {
+        std::string user, path;
+        int code;
+    } const cases[] = {
+        {"bob", "/photo/x", 407},
+        {"alice", "/photo/root's/x", 407},
+        {"alice", "/photo/root's/new/x", 407},
+        {"alice", "/nowhere/x", 408},
+        {"alice", "/photo", 414},
+        {"alice", "/photo/folder", 414},
+        {"alice", "/photo/pipe", 414},
+        {"alice", "/photo/device", 414},
+        {"alice", "/photo/file/x", 408},
+        {"alice", "/photo/outside/orveltest-x", 407},
+        {"alice", "/photo/../orveltest-x", 407},
+        {"alice", "/photo/a:b", 418},
+        {"alice", "/photo/._x", 418},
+        {"alice", "/photo/@vexoea", 418},
+        {"alice", "/photo/new/@vexoea/x", 418},
+        {"alice", "/photo/folder/..", 418},
+        {"alice", "/photo/folder/.", 418},
+        {"alice", "/usb/a?b", 419},
+        {"alice", "/usb/new*/b", 419},
+        {"alice", "/photo/" + std::string(256, 'n'), 412},
+        {"alice", "/photo/new/" + std::string(256, 'n') + "/x", 412},
+        {"alice", "", 400},
+    };
+    for (const auto& refusal : cases) {
+        for (const char* mode : {"error", "overwrite"}) {
+            SCOPED_TRACE(refusal.path + " " + mode);
+            const bool shareRoot = refusal.path == "/photo" && std::string(mode) == "overwrite";
+            const CgiReply reply = put(refusal.user, refusal.path, "data", mode);
+            EXPECT_FALSE(reply.json["success"].asBool());
+            EXPECT_EQ(code(reply), shareRoot ? 400 : refusal.code);
+        }
+    }
+    std::string deep = "/photo";
+    while (deep.size() < 4200) deep += "/" + std::string(200, 'd');
+    EXPECT_EQ(code(put("alice", deep, "data")), 412);
+    EXPECT_EQ(code(put("alice", "/photo/dangling", "data", "overwrite")), 414);
+    EXPECT_EQ(namesIn(root), before);
+    EXPECT_EQ(namesIn(fat), Names{});
+    EXPECT_EQ(temporaries(support::kAliceUid), Names{});
+
+    EXPECT_EQ(code(put("alice", "/photo/inside/x", "data")), 0);
+    EXPECT_EQ(support::readFile(root + "/folder/x"), "data");
+    setSetting("link_policy_photo", "none");
+    EXPECT_EQ(code(put("alice", "/photo/inside/y", "data")), 407);
+}
+
+TEST_F(UploadCgi, ABodyThatIsNotWhatWasAnnouncedLeavesNothing) {
+    const std::string root = shareRoot("photo");
+    for (const char* length : {"-1", "", "x", "0x10", "+4", "4 ", "9223372036854775808", "99999999999999999999"}) {
+        const CgiReply reply = put("alice", "/photo/new/x", "data", "error", {{"CONTENT_LENGTH", length}});
+        EXPECT_EQ(reply.status, 400) << length;
+        EXPECT_EQ(code(reply), 1802) << length;
+    }
+    // The client hung up.
+    for (const char* length : {"5", "9223372036854775807"}) {
+        EXPECT_EQ(code(put("alice", "/photo/new/x", "data", "error", {{"CONTENT_LENGTH", length}})), 1802) << length;
+    }
+    EXPECT_EQ(CgiReply(support::runCgi(PROGRAM_UPLOAD, "alice", "GET", "path=/photo/x")).status, 400);
+    EXPECT_EQ(put("alice", "/photo/x", "data", "sometimes").status, 400);
+    EXPECT_EQ(put("", "/photo/x", "data").status, 401);
+    EXPECT_EQ(namesIn(root), Names{});
+    EXPECT_EQ(temporaries(support::kAliceUid), Names{});
+
+    EXPECT_EQ(code(put("alice", "/photo/x", "data", "error", {{"CONTENT_LENGTH", "3"}})), 0);
+    EXPECT_EQ(support::readFile(root + "/x"), "dat");
+}
+
+TEST_F(UploadCgi, AFormBringsSeveralFiles) {
+    const std::string root = shareRoot("photo");
+    const CgiReply reply = post("alice", "",
+                                part("name=path", "/photo/sub/") + part("name=b; filename=\"\"", "") +
+                                    part("name=a; filename=\"../../two\xFF%0A.txt\"", "22") +
+                                    part("name=a; filename=\"C:\\\\dir\\three\"", "333") + "--XX--\r\n");
+    EXPECT_EQ(code(reply), 418) << "a colon";
+    EXPECT_EQ(reply.json["error"]["path"], "/photo/sub/C:\\dir\\three");
+    EXPECT_EQ(reply.json["data"]["files"].size(), 1U);
+    EXPECT_EQ(reply.json["data"]["files"][0]["path_raw"], "/photo/sub/two%FF%0A.txt");
+    const CgiReply second = post("alice", "path=/photo/sub&overwrite=overwrite",
+                                 part("name=a; filename=\"dir/two\xFF%0a.txt\"", "2222") +
+                                     part("name=a; filename=\"\\\\three\"", "333") + "--XX--\r\n");
+    EXPECT_EQ(code(second), 0);
+    EXPECT_EQ(second.json["data"]["files"].size(), 2U);
+    EXPECT_EQ(support::readFile(root + "/sub/two\xFF\n.txt"), "2222");
+    EXPECT_EQ(namesIn(root + "/sub"), (Names{"\\three", "two\xFF\n.txt"}));
+    for (const std::string& name : namesIn(root + "/sub")) expectOwned(root + "/sub/" + name, support::kAliceUid, 0644);
+}
+
+TEST_F(UploadCgi, ABrokenFormKeepsOnlyItsWholeFiles) {
+    const std::string root = shareRoot("photo");
+    const std::string file = part("name=a; filename=\"one\"", "1");
+    struct {
+        std::string body;
+        int code;
+        Names left;
+    } const cases[] = {
+        {file, 1800, {}},
+        {file + "--XX", 1800, {"one"}},
+        {file + "--XXjunk\r\n", 1800, {"one"}},
+        {file + "--XX\r\nContent-Disposition: form-data; name=b; filename=two\r\n\r\n22222", 1800, {"one"}},
+        {"", 1800, {}},
+        {"no form at all", 1800, {}},
+        {"--XX\r\n\r\ndata\r\n--XX--", 1800, {}},
+        {"--XX\r\nContent-Disposition: form-data; filename=two\r\n\r\n2\r\n--XX--", 1800, {}},
+        {part("name=path", "/photo/%00") + part("name=path_raw", "%00") + file + "--XX--", 1801, {}},
+        {part("name=path", std::string("/photo\0/x", 9)) + file + "--XX--", 1801, {}},
+        {part("name=path", std::string(70000, '/')) + file + "--XX--", 1801, {}},
+        {part("name=overwrite", "perhaps") + file + "--XX--", 1801, {}},
+        {part("name=path", "") + file + "--XX--", 1801, {}},
+        {part("name=a; filename=\"" + std::string("a\0b", 3) + "\"", "1") + "--XX--", 400, {}},
+    };
+    for (const auto& form : cases) {
+        SCOPED_TRACE(form.body.substr(0, 200));
+        const CgiReply reply = post("alice", "path=/photo", form.body);
+        EXPECT_EQ(code(reply), form.code);
+        EXPECT_EQ(namesIn(root), form.left);
+        EXPECT_EQ(reply.json["data"]["files"].size(), form.left.size());
+        fs::remove(root + "/one");
+    }
+    EXPECT_EQ(temporaries(support::kAliceUid), Names{});
+    for (const char* type : {"multipart/form-data", "multipart/mixed; boundary=XX", "multipart/form-data; boundary="}) {
+        const CgiReply reply(
+            support::runCgi(PROGRAM_UPLOAD, "alice", "POST", "path=/photo", file, {{"CONTENT_TYPE", type}}));
+        EXPECT_EQ(code(reply), 1800) << type;
+    }
+}
+
+TEST_F(UploadCgi, FullAndReadOnlyFileSystems) {
+    const std::string root = shareRoot("photo");
+    put("alice", "/photo/first", "makes the temporary folders");
+    const std::string big(size_t{3} << 20, 'x');
+    struct {
+        std::string folder;
+        const char* options;
+        unsigned long flags;
+        int code;
+    } const cases[] = {
+        {root, "size=1m,mode=0777", 0, 416},
+        {"/tmp/@tmp/orvel", "size=1m,mode=0777", 0, 416},
+        {root, "mode=0777,usrquota_block_hardlimit=1M", 0, 415},
+        {"/tmp/@tmp/orvel", "mode=0777,usrquota_block_hardlimit=1M", 0, 415},
+        {root, "mode=0777", MS_RDONLY, 407},
+        {"/tmp/@tmp/orvel", "mode=0777", MS_RDONLY, 411},
+    };
+    for (const auto& full : cases) {
+        SCOPED_TRACE(full.folder + " " + full.options);
+        const int result = support::inChild([&] {
+            if (unshare(CLONE_NEWNS) != 0 || mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) return 2;
+            if (mount("full", full.folder.c_str(), "tmpfs", full.flags, full.options) != 0) return 3;
+            EXPECT_EQ(code(put("alice", "/photo/new/big", big)), full.code);
+            EXPECT_EQ(code(put("alice", "/photo/new/big", big, "overwrite")), full.code);
+            Names left;
+            for (const auto& entry : fs::recursive_directory_iterator(full.folder)) {
+                if (entry.is_regular_file() || full.folder == root) left.push_back(entry.path());
+            }
+            EXPECT_EQ(left, Names{});
+            return 0;
+        });
+        if (result == 2) GTEST_SKIP() << "needs the right to mount";
+        if (result == 3) std::cout << "SKIPPED: no file system with " << full.options << '\n';
+    }
+    EXPECT_EQ(namesIn(root), Names{"first"});
+}
+
+TEST_F(UploadCgi, TheTransferLogTellsWhatWasStored) {
+    const std::string log = systemRoot() + "/var/log/vexo/xfer.log";
+    put("alice", "/photo/silent", "data");
+    EXPECT_FALSE(fs::exists(log));
+    setSetting("pexlanderxferlog", "yes");
+    put("alice", "/photo/told", "data");
+    put("alice", "/photo/told", "data");
+    put("alice", "/photo/told", "data", "skip");
+    const std::string text = support::readFile(log);
+    EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 1) << text;
+    for (const char* piece : {"\"upload\"", "\"alice\"", "127.0.0.1", "\"/photo/told\""}) {
+        EXPECT_NE(text.find(piece), std::string::npos) << piece << text;
+    }
+}
+
+TEST_F(UploadCgi, WhatAKilledUploadLeftIsRemovedByALaterOne) {
+    put("alice", "/photo/first", "makes the temporary folder");
+    const std::string folder = "/tmp/@tmp/orvel/upload-" + std::to_string(support::kAliceUid);
+    for (const char* name : {"part-old", "part-new", "other"}) {
+        support::writeFile(folder + "/" + name, "x");
+        ASSERT_EQ(chown((folder + "/" + name).c_str(), support::kAliceUid, support::kUsersGid), 0);
+    }
+    const auto longAgo = fs::file_time_type::clock::now() - std::chrono::hours(2);
+    for (const char* name : {"part-old", "other"}) fs::last_write_time(folder + "/" + name, longAgo);
+    EXPECT_EQ(code(put("alice", "/photo/second", "data")), 0);
+    EXPECT_EQ(temporaries(support::kAliceUid), (Names{"other", "part-new"}));
+    fs::remove_all(folder);
+
+    // Nothing that others could have prepared is used.
+    fs::create_directory_symlink(shareRoot("photo"), folder);
+    EXPECT_EQ(code(put("alice", "/photo/third", "data")), 407);
+    fs::remove(folder);
+    support::makeFolder(folder, 0777);
+    EXPECT_EQ(code(put("alice", "/photo/third", "data")), 407);
+    fs::remove_all(folder);
+    EXPECT_EQ(namesIn(shareRoot("photo")), (Names{"first", "second"}));
+}
+
+}  // namespace
