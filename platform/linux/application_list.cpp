@@ -2,6 +2,7 @@
 
 #include <utility>
 
+#include "definition_lines.h"
 #include "share_definitions.h"
 
 namespace vexo {

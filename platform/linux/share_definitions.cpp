@@ -6,6 +6,7 @@
 #include <unordered_map>
 #include <utility>
 
+#include "definition_lines.h"
 #include "vexo/text.h"
 
 namespace vexo {
@@ -16,12 +17,6 @@ constexpr int kIncludedFiles = 128;
 constexpr size_t kGlobal = SIZE_MAX;
 constexpr size_t kNowhere = SIZE_MAX - 1;  // behind a header that names nothing
 
-constexpr std::string_view kBlanks = " \t\n\v\f\r";
-
-bool isBlank(char c) {
-    return kBlanks.find(c) != std::string_view::npos;
-}
-
 char lower(char c) {
     return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c;
 }
@@ -30,7 +25,7 @@ char lower(char c) {
 std::string withSingleBlanks(std::string_view text) {
     std::string out;
     for (const char c : trimmed(text)) {
-        if (!isBlank(c) || !isBlank(out.back())) out += c;
+        if (!isDefinitionBlank(c) || !isDefinitionBlank(out.back())) out += c;
     }
     return out;
 }
@@ -39,7 +34,7 @@ std::string withSingleBlanks(std::string_view text) {
 std::string foldedKey(std::string_view text) {
     std::string out;
     for (const char c : text) {
-        if (!isBlank(c)) out += lower(c);
+        if (!isDefinitionBlank(c)) out += lower(c);
     }
     return out;
 }
@@ -73,57 +68,13 @@ constexpr KnownKey kKeys[] = {
     {"vexo:acl", ShareOption::acl},
 };
 
-// Gives the lines of a text: comments and empty lines left out, continued lines joined.
-class Lines {
- public:
-    explicit Lines(std::string_view text) : rest_(text) {}
-
-    // The next line, without blanks at its ends, and the number it begins at; false at the end.
-    bool next(std::string& line, int& number) {
-        while (!rest_.empty()) {
-            number = number_ + 1;
-            std::string_view part = take();
-            const std::string_view start = trimmed(part);
-            if (start.empty() || start.front() == '#' || start.front() == ';') continue;  // a comment never continues
-            std::string joined;
-            while (continues(part)) {
-                joined += part.substr(0, part.find_last_of('\\'));
-                part = take();
-            }
-            joined += part;
-            line = trimmed(joined);
-            if (!line.empty()) return true;
-        }
-        return false;
-    }
-
- private:
-    // Only a backslash with a newline behind it, not the last byte of the text, continues the line.
-    [[nodiscard]] bool continues(std::string_view part) const {
-        const size_t last = part.find_last_not_of(kBlanks);
-        return ended_ && last != std::string_view::npos && part[last] == '\\';
-    }
-    std::string_view take() {
-        ++number_;
-        const size_t end = rest_.find('\n');
-        const std::string_view part = rest_.substr(0, end);
-        ended_ = end != std::string_view::npos;
-        rest_ = ended_ ? rest_.substr(end + 1) : std::string_view();
-        return part;
-    }
-
-    std::string_view rest_;
-    int number_ = 0;
-    bool ended_ = false;  // the part last taken had its newline
-};
-
 class Parser {
  public:
     explicit Parser(const IncludeReader& include) : include_(include) {}
 
     // `file` names an included text in what is said about its lines.
     void parse(std::string_view text, const std::string& file) {
-        Lines lines(text);
+        DefinitionLines lines(text);
         std::string line;
         int number = 0;
         while (lines.next(line, number)) {
@@ -255,12 +206,6 @@ Definitions parseDefinitions(std::string_view text, const IncludeReader& include
     return parser.result();
 }
 
-std::string_view trimmed(std::string_view text) {
-    const size_t first = text.find_first_not_of(kBlanks);
-    if (first == std::string_view::npos) return {};
-    return text.substr(first, text.find_last_not_of(kBlanks) - first + 1);
-}
-
 std::vector<std::string> splitList(std::string_view text) {
     std::vector<std::string> entries;
     std::string entry;
@@ -270,7 +215,7 @@ std::vector<std::string> splitList(std::string_view text) {
         if (c == '"') {
             quoted = !quoted;
             begun = true;
-        } else if (quoted || (c != ',' && c != ';' && !isBlank(c))) {
+        } else if (quoted || (c != ',' && c != ';' && !isDefinitionBlank(c))) {
             entry += c;
             begun = true;
         } else if (begun) {

@@ -58,9 +58,6 @@ using IncludeReader = std::function<std::optional<std::string>(const std::string
 // header. An included file continues the section that includes it.
 [[nodiscard]] Definitions parseDefinitions(std::string_view text, const IncludeReader& include);
 
-// `text` without the blanks at its ends.
-[[nodiscard]] std::string_view trimmed(std::string_view text);
-
 // The entries of a list: separated by comma, semicolon and blanks, except inside double quotes. "" is an empty entry.
 [[nodiscard]] std::vector<std::string> splitList(std::string_view text);
 
