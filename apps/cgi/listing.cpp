@@ -96,8 +96,9 @@ int listFolder(const ListRequest& request, Listing& listing) {
     if (!request.pattern.empty() && !criteria.add(request.pattern)) return lastError(ORV_ERR_GENERAL);
     OrvEnum enumeration;
     const bool listed = enumeration.OrvLibDirEntryListEnum(
-        info.path.c_str(), realPath.c_str(), request.sortBy.c_str(), request.additional, request.offset, request.limit,
-        request.ascending, request.type, criteria.list(), listing.entries, &listing.total);
+        info.path.c_str(), realPath.c_str(), request.sortBy.empty() ? "name" : request.sortBy.c_str(),
+        request.additional, request.offset, request.limit, request.ascending, request.type, criteria.list(),
+        listing.entries, &listing.total);
     return listed ? ORV_ERR_NONE : lastError(ORV_ERR_GENERAL);
 }
 
@@ -105,8 +106,8 @@ int listShares(const ListRequest& request, Listing& listing) {
     OrvLibSetErr(ORV_ERR_NONE);
     OrvEnum enumeration;
     const bool listed = enumeration.OrvLibShareEntryListEnum(
-        request.user.c_str(), sidOf(request), false, request.sortBy.c_str(), request.additional, request.offset,
-        request.limit, request.ascending, listing.entries, &listing.total);
+        request.user.c_str(), sidOf(request), false, request.sortBy.empty() ? nullptr : request.sortBy.c_str(),
+        request.additional, request.offset, request.limit, request.ascending, listing.entries, &listing.total);
     return listed ? ORV_ERR_NONE : lastError(ORV_ERR_GENERAL);
 }
 

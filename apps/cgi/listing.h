@@ -13,9 +13,9 @@ namespace orvel::cgi {
 
 struct ListRequest {
     std::string user;
-    std::string sid;   // "" for none
-    std::string path;  // not used for the shares
-    std::string sortBy = "name";
+    std::string sid;     // "" for none
+    std::string path;    // not used for the shares
+    std::string sortBy;  // "": folders by name, shares as they are defined, the home folder first
     bool ascending = true;
     unsigned long offset = 0;
     unsigned long limit = 0;  // 0: everything

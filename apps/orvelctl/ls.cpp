@@ -79,7 +79,7 @@ int ls(const std::vector<std::string>& words) {
         .user = arguments.required("--user"),
         .sid = "",
         .path = arguments.position(0),
-        .sortBy = arguments.value("--sort", "name"),
+        .sortBy = arguments.value("--sort", ""),
         .ascending = !arguments.has("--desc"),
         .offset = arguments.number("--offset", 0),
         .limit = arguments.number("--limit", 0),

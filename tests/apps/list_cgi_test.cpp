@@ -69,11 +69,12 @@ TEST_F(ListCgi, RepliesCarryTheirHeadersAndTheNewSessionOnce) {
 TEST_F(ListCgi, EachUserSeesTheOwnShares) {
     addShare("music", "read only = no\nvalid users = alice\nvexo:synced = yes\n");
     for (const char* user : {"alice", "bob"}) support::makeFolder(shareRoot("homes") + "/" + user);
+    EXPECT_EQ(names(ask("alice", "action=shares")), (Names{"home", "photo", "homes", "music"})) << "home first";
     addShare("hidden", "browseable = no\nread only = no\nvalid users = alice\n");
     EXPECT_EQ(names(ask("alice", "action=shares&sort_by=name")), (Names{"home", "homes", "music", "photo"}));
     EXPECT_EQ(names(ask("bob", "action=shares&sort_by=name&sort_direction=desc")), (Names{"photo", "homes", "home"}));
 
-    const CgiReply reply = ask("bob", "action=shares&additional=perm,volume_status");
+    const CgiReply reply = ask("bob", "action=shares&sort_by=name&additional=perm,volume_status");
     const Json::Value photo = reply.json["data"]["items"][2];
     EXPECT_EQ(photo["path"], "/photo");
     EXPECT_EQ(photo["additional"]["perm"]["share_right"], 1);

@@ -60,8 +60,8 @@ expect "the page" 200 "$(curl -s -o /dev/null -w '%{http_code}' -u "alice:$(pass
 
 shares_alice=$(names "$(list alice action=shares)")
 shares_bob=$(names "$(list bob action=shares)")
-expect "shares of alice" "archive home homes music photo preview projects sealed warehouse worldwide " "$shares_alice"
-expect "shares of bob" "archive home homes music photo preview sealed warehouse worldwide " "$shares_bob"
+expect "shares of alice" "home homes photo music projects worldwide warehouse sealed archive preview " "$shares_alice"
+expect "shares of bob" "home homes photo music worldwide warehouse sealed archive preview " "$shares_bob"
 
 photo=$(root_of photo)
 page=$(list alice action=folder path=/photo sort_by=size sort_direction=desc offset=50 limit=50 additional=size)

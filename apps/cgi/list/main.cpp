@@ -3,10 +3,10 @@
 // Parameters, from the query or a form:
 //   action           "shares" or "folder"
 //   path, path_raw   the folder (folder only)
-//   sort_by          as for OrvEnum, default "name"; sort_direction "asc" (default) or "desc"
-//   offset, limit    the page; limit 0, the default, means everything
-//   additional       words as for additionalBits
-//   pattern          comma-separated name patterns; filetype "dir", "file" or "all" (default)   (folder only)
+//   sort_by          as for OrvEnum; without it folders come by name, shares with the home folder first; sort_direction
+//   "asc" (default) or "desc" offset, limit    the page; limit 0, the default, means everything additional       words
+//   as for additionalBits pattern          comma-separated name patterns; filetype "dir", "file" or "all" (default)
+//   (folder only)
 // "data" of the reply is {"total","offset","items"}.
 #include <optional>
 #include <string>
@@ -47,7 +47,7 @@ std::optional<ListRequest> parse(const VEXO::WebCGI& web, const User& user) {
     return ListRequest{.user = user.name,
                        .sid = user.sid,
                        .path = *path,
-                       .sortBy = web.GetParam("sort_by", "name"),
+                       .sortBy = web.GetParam("sort_by", ""),
                        .ascending = *ascending,
                        .offset = *offset,
                        .limit = *limit,
