@@ -8,13 +8,11 @@
 #include <sys/statfs.h>
 #include <sys/statvfs.h>
 #include <sys/syscall.h>
-#include <sys/xattr.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
 #include <string>
-#include <vector>
 
 #include "acl_rules.h"
 #include "failure.h"
@@ -152,13 +150,6 @@ bool removableByPath(std::string path) {
     return vexo::mayRemove(currentIdentity(), removalFacts(AT_FDCWD, parent.c_str()), status);
 }
 
-// Which devices keep ACLs, as far as they were met. A listing asks for each entry, mostly of one device.
-struct DeviceSupport {
-    unsigned long long device;
-    int supported;
-};
-std::vector<DeviceSupport> knownDevices;
-
 }  // namespace
 
 int VEXOACLPermGet(const char* path, unsigned* permission) {
@@ -195,25 +186,4 @@ int VEXOACLFolderPermGet(PVEXOACLFOLDER folder, const char* name, const _tag_VEX
 
 void VEXOACLFolderClose(PVEXOACLFOLDER folder) {
     delete folder;
-}
-
-int VEXOACLIsSupport(const char* path, int /*fd*/, int /*kind*/) {
-    if (path == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
-    struct stat status;
-    if (stat(path, &status) != 0) return vexo::fail(vexo::errorOfErrno(errno));
-    return VEXOACLIsSupportOnDevice(path, status.st_dev);
-}
-
-int VEXOACLIsSupportOnDevice(const char* path, unsigned long long device) {
-    VEXO_GATE("VEXOACLIsSupport", -1);
-    for (const DeviceSupport& known : knownDevices) {
-        if (known.device == device) return known.supported;
-    }
-    if (path == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
-    const int before = errno;
-    const bool has = getxattr(path, "system.posix_acl_access", nullptr, 0) >= 0 || errno == ENODATA;
-    if (!has && errno != ENOTSUP) return vexo::fail(vexo::errorOfErrno(errno));
-    errno = before;
-    knownDevices.push_back({device, has ? 1 : 0});
-    return has ? 1 : 0;
 }
