@@ -45,6 +45,11 @@ bool namesIn(const Descriptor& folder, std::vector<std::string>& names) {
 
 }  // namespace
 
+// What is readable of a name that is no UTF-8 would not tell it apart from others.
+std::string memberName(const std::string& component) {
+    return isUtf8(component) ? component : percentEncode(component);
+}
+
 ZipStream::ZipStream(int fd) : archive_(archive_write_new()) {
     setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted from
     if (archive_ == nullptr || archive_write_set_format_zip(archive_) != ARCHIVE_OK ||
@@ -72,8 +77,7 @@ void ZipStream::leaveOut(const std::string& name, const std::string& reason) {
 bool ZipStream::begin(const std::string& name, const struct stat& status, long long size) {
     const std::unique_ptr<archive_entry, FreeEntry> entry(archive_entry_new());
     if (entry == nullptr) return broken();
-    // A name that is no UTF-8 cannot be told apart from others by what is readable of it.
-    archive_entry_set_pathname(entry.get(), isUtf8(name) ? name.c_str() : percentEncode(name).c_str());
+    archive_entry_set_pathname(entry.get(), name.c_str());
     archive_entry_set_mode(entry.get(), status.st_mode & (S_IFMT | 0777));
     archive_entry_set_mtime(entry.get(), status.st_mtim.tv_sec, status.st_mtim.tv_nsec);
     if (size >= 0) archive_entry_set_size(entry.get(), size);
@@ -122,7 +126,7 @@ bool ZipStream::addFolder(const Descriptor& folder, const std::string& name) {
     if (!namesIn(folder, names)) leaveOut(name, strerror(errno));
     ++depth_;
     const bool going = std::all_of(names.begin(), names.end(), [&](const std::string& child) {
-        return addChild(folder, child, name + "/" + child);
+        return addChild(folder, child, name + "/" + memberName(child));
     });
     --depth_;
     return going;

@@ -13,9 +13,11 @@ struct archive;
 
 namespace orvel::cgi {
 
+// The name of a file or folder within an archive, which knows UTF-8 alone: itself, or percent-encoded.
+std::string memberName(const std::string& component);
+
 // A stream to a descriptor. What cannot be read is left out and told in a last member, "_not_included.txt". Members are
 // deflated, times and permissions kept; symbolic links and anything else but files and folders stay out.
-// Names are UTF-8; one that is not is percent-encoded.
 class ZipStream {
  public:
     explicit ZipStream(int fd);
@@ -23,7 +25,8 @@ class ZipStream {
     ZipStream(const ZipStream&) = delete;
     ZipStream& operator=(const ZipStream&) = delete;
 
-    // Adds the open file or folder, with everything below it, under `name`. False when the reader is gone: stop.
+    // Adds the open file or folder, with everything below it, under `name` (UTF-8). False when the reader is gone:
+    // stop.
     bool add(const Descriptor& opened, const std::string& name);
     // Notes that `name` is left out.
     void leaveOut(const std::string& name, const std::string& reason);

@@ -173,7 +173,7 @@ void serveZip(Output& out, const User& user, std::vector<Source>& sources, const
     std::vector<std::string> used;
     for (Source& source : sources) {
         const long long before = zip.bytes();
-        if (!zip.add(source.opened, freeName(used, source.name))) return;
+        if (!zip.add(source.opened, freeName(used, memberName(source.name)))) return;
         OrvLibDoLog(user.name, source.info.path, zip.bytes() - before, ORVEL_ACTION_DOWNLOAD,
                     S_ISDIR(source.status.st_mode));
     }

@@ -1,0 +1,235 @@
+// The program download, run as a web server runs it. Archives are read back by libarchive's own reader.
+#include <archive.h>
+#include <archive_entry.h>
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
+#include <unistd.h>
+
+#include <clocale>
+#include <filesystem>
+
+#include "apps/program.h"
+#include "support/appliance.h"
+#include "text.h"
+
+namespace fs = std::filesystem;
+using orvel::cgi::percentEncode;
+using support::CgiReply;
+using support::RawReply;
+
+namespace {
+
+using Members = std::map<std::string, std::string>;
+
+// The members of a zip with their content; a folder's name ends in "/".
+Members membersOf(const std::string& zip) {
+    Members members;
+    setlocale(LC_CTYPE, "C.UTF-8");
+    archive* reader = archive_read_new();
+    archive_read_support_format_zip(reader);
+    EXPECT_EQ(archive_read_open_memory(reader, zip.data(), zip.size()), ARCHIVE_OK);
+    archive_entry* entry = nullptr;
+    while (archive_read_next_header(reader, &entry) == ARCHIVE_OK) {
+        const std::string name = archive_entry_pathname(entry);
+        EXPECT_EQ(members.count(name), 0U) << name;
+        char data[4096];
+        std::string& content = members[name];
+        for (la_ssize_t got; (got = archive_read_data(reader, data, sizeof data)) != 0;) {
+            if (got < 0) {
+                ADD_FAILURE() << archive_error_string(reader);
+                break;
+            }
+            content.append(data, static_cast<size_t>(got));
+        }
+    }
+    archive_read_free(reader);
+    return members;
+}
+
+class DownloadCgi : public support::ApplianceTest {
+ protected:
+    static std::string ask(const std::string& user, const std::string& query, const support::Variables& more = {},
+                           const std::string& method = "GET") {
+        return support::runCgi(PROGRAM_DOWNLOAD, user, method, query, "", more);
+    }
+    static RawReply fetch(const std::string& path, const support::Variables& more = {},
+                          const std::string& method = "GET") {
+        return RawReply(ask("alice", "path=" + percentEncode(path), more, method));
+    }
+    static Members zip(const std::string& query) {
+        const RawReply reply(ask("alice", query));
+        EXPECT_EQ(reply.status, 200);
+        EXPECT_EQ(reply.headers.at("Content-Type"), "application/zip");
+        return membersOf(reply.body);
+    }
+};
+
+TEST_F(DownloadCgi, AFileComesWholeOrInPart) {
+    const std::string data("0123456789\0\r\n\xFF", 14);
+    support::writeFile(shareRoot("photo") + "/f.html", data, 0644);
+    support::writeFile(shareRoot("photo") + "/empty", "", 0644);
+    const RawReply whole = fetch("/photo/f.html");
+    EXPECT_EQ(whole.status, 200);
+    EXPECT_EQ(whole.body, data);
+    EXPECT_EQ(whole.headers.at("Content-Length"), "14");
+    EXPECT_EQ(whole.headers.at("Content-Type"), "application/octet-stream");
+    EXPECT_EQ(whole.headers.at("X-Content-Type-Options"), "nosniff");
+    EXPECT_EQ(whole.headers.at("Accept-Ranges"), "bytes");
+    EXPECT_EQ(whole.headers.at("Content-Disposition"), "attachment; filename=\"f.html\"; filename*=UTF-8''f.html");
+    const std::string tag = whole.headers.at("ETag"), date = whole.headers.at("Last-Modified");
+    struct {
+        const char* method;
+        support::Variables headers;
+        int status;
+        std::string body, range;
+    } const cases[] = {
+        {"GET", {{"HTTP_RANGE", "bytes=2-4"}}, 206, "234", "bytes 2-4/14"},
+        {"GET", {{"HTTP_RANGE", "bytes=-2"}}, 206, "\n\xFF", "bytes 12-13/14"},
+        {"GET", {{"HTTP_RANGE", "bytes=9-"}}, 206, data.substr(9), "bytes 9-13/14"},
+        {"GET", {{"HTTP_RANGE", "bytes=14-"}}, 416, "", "bytes */14"},
+        {"GET", {{"HTTP_RANGE", "bytes=0-1,4-5"}}, 200, data, ""},
+        {"GET", {{"HTTP_RANGE", "bytes=2-4"}, {"HTTP_IF_RANGE", tag}}, 206, "234", "bytes 2-4/14"},
+        {"GET", {{"HTTP_RANGE", "bytes=2-4"}, {"HTTP_IF_RANGE", "\"old\""}}, 200, data, ""},
+        {"GET", {{"HTTP_IF_NONE_MATCH", tag}, {"HTTP_RANGE", "bytes=2-4"}}, 304, "", ""},
+        {"GET", {{"HTTP_IF_MODIFIED_SINCE", date}}, 304, "", ""},
+        {"HEAD", {}, 200, "", ""},
+        {"HEAD", {{"HTTP_RANGE", "bytes=2-4"}}, 200, "", ""},
+        {"POST", {{"HTTP_IF_NONE_MATCH", tag}}, 200, data, ""},
+    };
+    for (const auto& request : cases) {
+        const RawReply reply = fetch("/photo/f.html", request.headers, request.method);
+        SCOPED_TRACE(std::string(request.method) + " " + request.range + " " + std::to_string(request.status));
+        EXPECT_EQ(reply.status, request.status);
+        EXPECT_EQ(reply.body, request.body);
+        EXPECT_EQ(reply.headers.count("Content-Range") == 0 ? "" : reply.headers.at("Content-Range"), request.range);
+        if (request.status == 206) {
+            EXPECT_EQ(reply.headers.at("Content-Length"), std::to_string(request.body.size()));
+        }
+        if (request.status == 304) {
+            EXPECT_EQ(reply.headers.at("ETag"), tag);
+        }
+    }
+    EXPECT_EQ(fetch("/photo/empty").headers.at("Content-Length"), "0");
+    EXPECT_EQ(fetch("/photo/empty", {{"HTTP_RANGE", "bytes=0-"}}).status, 416);
+    support::writeFile(shareRoot("photo") + "/f.html", "another time", 0644);
+    EXPECT_EQ(fetch("/photo/f.html", {{"HTTP_IF_NONE_MATCH", tag}}).status, 200);
+}
+
+TEST_F(DownloadCgi, NamesOfAnyBytes) {
+    const std::string name = "\xE9 \"\n;.txt";
+    support::writeFile(shareRoot("photo") + "/" + name, "x", 0644);
+    const RawReply reply(ask("alice", "path_raw=" + percentEncode("/photo/" + percentEncode(name))));
+    EXPECT_EQ(reply.body, "x");
+    EXPECT_EQ(reply.headers.at("Content-Disposition"),
+              "attachment; filename=\"___ __;.txt\"; filename*=UTF-8''%EF%BF%BD%20%22%0A%3B.txt");
+}
+
+TEST_F(DownloadCgi, RefusalsShowInTheStatus) {
+    const std::string root = shareRoot("photo");
+    addShare("preview", "read only = no\nvalid users = alice\nvexo:restriction = 4\n");
+    support::writeFile(shareRoot("preview") + "/f", "secret", 0644);
+    support::writeFile(root + "/folder/f", "x", 0644);
+    ASSERT_EQ(mkfifo((root + "/pipe").c_str(), 0666), 0);
+    fs::create_symlink("folder/f", root + "/inside");
+    fs::create_symlink("/etc/passwd", root + "/outside");
+    fs::create_symlink("/etc", root + "/etc");
+    fs::create_symlink("../" + fs::path(shareRoot("preview")).filename().string(), root + "/next");
+    struct {
+        std::string user, query;
+        int status, code;
+    } const cases[] = {
+        {"", "path=/photo/folder/f", 401, 407},
+        {"alice", "", 400, 400},
+        {"alice", "path_raw=/photo/%25zz", 400, 400},
+        {"alice", "path=", 400, 400},
+        {"alice", "path=/nowhere/x", 404, 408},
+        {"alice", "path=/photo/x", 404, 408},
+        {"alice", "path=/photo/folder/f/x", 404, 408},
+        {"alice", "path=/preview/f", 403, 407},
+        {"alice", "path=/preview", 403, 407},
+        {"alice", "path=/photo/pipe", 403, 407},
+        {"alice", "path=/photo/outside", 403, 407},
+        {"alice", "path=/photo/etc/passwd", 403, 407},
+        {"alice", "path=/photo/next/f", 403, 407},
+        {"alice", "path=/photo/../etc/passwd", 403, 407},
+        {"alice", "path=/photo/folder/f&path=/photo/x", 404, 408},
+        {"alice", "path=/photo/folder/f&path=/photo/outside", 403, 407},
+    };
+    for (const auto& refusal : cases) {
+        SCOPED_TRACE(refusal.query);
+        const CgiReply reply(ask(refusal.user, refusal.query));
+        EXPECT_EQ(reply.status, refusal.status);
+        EXPECT_EQ(reply.json["error"]["code"], refusal.code);
+        EXPECT_EQ(reply.headers.at("Content-Type"), "application/json; charset=UTF-8");
+    }
+    EXPECT_EQ(fetch("/photo/inside").body, "x");
+    setSetting("link_policy_photo", "none");
+    EXPECT_EQ(fetch("/photo/inside").status, 403);
+}
+
+TEST_F(DownloadCgi, FoldersAndSeveralPathsComeAsZip) {
+    const std::string root = shareRoot("photo");
+    support::makeFolder(root + "/sub/empty");
+    for (const char* name : {"/sub/ü.txt", "/sub/日本", "/sub/\xE9", "/sub/\xE8"}) {
+        support::writeFile(root + name, name, 0644);
+    }
+    support::writeFile(root + "/sub/@tmp/x", "hidden", 0644);
+    support::writeFile(root + "/other/sub/big", std::string(300000, 'z'), 0644);
+    fs::create_symlink("/etc/passwd", root + "/sub/link");
+    ASSERT_EQ(mkfifo((root + "/sub/pipe").c_str(), 0666), 0);
+
+    const Members sub = {{"sub/", ""},
+                         {"sub/empty/", ""},
+                         {"sub/ü.txt", "/sub/ü.txt"},
+                         {"sub/日本", "/sub/日本"},
+                         {"sub/%E9", "/sub/\xE9"},
+                         {"sub/%E8", "/sub/\xE8"}};
+    EXPECT_EQ(zip("path=/photo/sub"), sub);
+    EXPECT_EQ(zip("path=/photo/sub/empty/.."), sub) << "no member leads out";
+    EXPECT_EQ(zip("path=/photo/sub/"), sub);
+    const Members two = zip("path=/photo/sub/empty&path=/photo/other/sub&path_raw=/photo/sub&name=both");
+    ASSERT_EQ(two.count("sub/big"), 1U);
+    EXPECT_EQ(two.at("sub/big"), std::string(300000, 'z'));
+    ASSERT_EQ(two.count("sub (2)/%E9"), 1U);
+    EXPECT_EQ(two.count("_not_included.txt"), 0U);
+    EXPECT_EQ(RawReply(ask("alice", "path=/photo/sub&name=my%22%0Aown")).headers.at("Content-Disposition"),
+              "attachment; filename=\"my__own.zip\"; filename*=UTF-8''my%22%0Aown.zip");
+    EXPECT_EQ(RawReply(ask("alice", "path=/photo")).headers.at("Content-Disposition"),
+              "attachment; filename=\"photo.zip\"; filename*=UTF-8''photo.zip");
+}
+
+TEST_F(DownloadCgi, AZipTellsWhatItLacks) {
+    SKIP_WITHOUT_ROOT();
+    const std::string root = shareRoot("photo");
+    support::writeFile(root + "/sub/readable", "x", 0644);
+    support::writeFile(root + "/sub/closed.txt", "secret", 0600);
+    support::writeFile(root + "/sub/closed/inner", "secret", 0644);
+    chmod((root + "/sub/closed").c_str(), 0700);
+    const Members members = zip("path=/photo/sub");
+    EXPECT_EQ(members.at("sub/readable"), "x");
+    EXPECT_EQ(members.size(), 3U);
+    EXPECT_EQ(members.at("_not_included.txt"),
+              "These could not be included:\nsub/closed: Permission denied\nsub/closed.txt: Permission denied\n");
+    EXPECT_EQ(fetch("/photo/sub/closed.txt").status, 403);
+    EXPECT_EQ(RawReply(ask("carol", "path=/photo/sub/closed.txt")).status, 403) << "not in the share's list";
+}
+
+TEST_F(DownloadCgi, TheTransferLogTellsWhatWasSent) {
+    const std::string log = systemRoot() + "/var/log/vexo/xfer.log";
+    support::writeFile(shareRoot("photo") + "/f", "0123456789", 0644);
+    fetch("/photo/f");
+    EXPECT_FALSE(fs::exists(log));
+    setSetting("pexlanderxferlog", "yes");
+    fetch("/photo/f", {{"HTTP_RANGE", "bytes=2-4"}});
+    fetch("/photo/f", {}, "HEAD");
+    fetch("/photo/missing");
+    zip("path=/photo/f&path=/photo");
+    const std::string text = support::readFile(log);
+    EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 3) << text;
+    EXPECT_NE(text.find("\"download\""), std::string::npos) << text;
+    EXPECT_NE(text.find("\"size\":3"), std::string::npos) << text;
+}
+
+}  // namespace

@@ -1,0 +1,187 @@
+// The program operation, run as a web server runs it.
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "apps/program.h"
+#include "support/appliance.h"
+#include "text.h"
+
+namespace fs = std::filesystem;
+using orvel::cgi::percentEncode;
+using support::CgiReply;
+
+namespace {
+
+class OperationCgi : public support::ApplianceTest {
+ protected:
+    static CgiReply ask(const std::string& user, const std::string& form, const std::string& method = "POST") {
+        if (method == "GET") return CgiReply(support::runCgi(PROGRAM_OPERATION, user, method, form));
+        return CgiReply(support::runCgi(PROGRAM_OPERATION, user, method, "", form,
+                                        {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
+    }
+    static int code(const CgiReply& reply) { return reply.json["error"]["code"].asInt(); }
+    static int mkdir(const std::string& user, const std::string& path, const std::string& more = "") {
+        return code(ask(user, "action=mkdir&path=" + percentEncode(path) + more));
+    }
+    static int rename(const std::string& user, const std::string& path, const std::string& name) {
+        return code(ask(user, "action=rename&path=" + percentEncode(path) + "&name=" + percentEncode(name)));
+    }
+};
+
+TEST_F(OperationCgi, RequestsAreTakenStrictly) {
+    EXPECT_EQ(ask("", "action=mkdir&path=/photo/x").status, 401);
+    for (const char* form : {"", "action=burn&path=/photo/x", "action=mkdir&path_raw=/photo/a%2500b",
+                             "action=mkdir&path_raw=/photo/%25zz"}) {
+        EXPECT_EQ(ask("alice", form).status, 400) << form;
+    }
+    EXPECT_EQ(ask("alice", "action=mkdir&path=/photo/x", "GET").status, 400) << "a link must change nothing";
+    EXPECT_FALSE(fs::exists(shareRoot("photo") + "/x"));
+    EXPECT_EQ(code(ask("alice", "action=mkdir&path=")), 400);
+}
+
+TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
+    SKIP_WITHOUT_ROOT();
+    const std::string root = addShare("photo", "read only = no\nvalid users = alice, carol\nread list = bob\n");
+    const std::string fat = addShare("usb", "read only = no\n");
+    addMount(fat, "vfat");
+    support::makeFolder(root + "/root's", 0755);
+    fs::create_symlink("/tmp", root + "/outside");
+    struct {
+        std::string user, path, more;
+        int code;
+    } const cases[] = {
+        {"alice", "/photo/a", "", 0},
+        {"alice", "/photo/a/", "", 414},
+        {"alice", "/photo/p/q/r", "", 408},
+        {"alice", "/photo/p/q/._r", "&parents=true", 418},
+        {"alice", "/photo/p/q/r", "&parents=true", 0},
+        {"carol", "/photo/c", "", 0},
+        {"bob", "/photo/b", "", 407},
+        {"bob", "/home/b", "", 0},
+        {"alice", "/photo/root's/x", "", 407},
+        {"alice", "/photo/outside/x", "", 407},
+        {"alice", "/photo/../x", "", 407},
+        {"alice", "/photo", "", 400},
+        {"alice", "/photo/a/..", "", 418},
+        {"alice", "/photo/a:b", "", 418},
+        {"alice", "/photo/@vexoea", "", 418},
+        {"alice", "/nowhere/x", "", 408},
+        {"alice", "/usb/a|b", "", 419},
+        {"alice", "/photo/" + std::string(256, 'n'), "", 412},
+    };
+    for (const auto& folder : cases) {
+        EXPECT_EQ(mkdir(folder.user, folder.path, folder.more), folder.code) << folder.path << folder.more;
+    }
+    const std::pair<std::string, unsigned> made[] = {{root + "/a", support::kAliceUid},
+                                                     {root + "/p", support::kAliceUid},
+                                                     {root + "/p/q/r", support::kAliceUid},
+                                                     {root + "/c", support::kCarolUid},
+                                                     {shareRoot("homes") + "/bob/b", support::kBobUid}};
+    for (const auto& [path, owner] : made) {
+        struct stat status = {};
+        ASSERT_EQ(stat(path.c_str(), &status), 0) << path;
+        EXPECT_EQ(status.st_uid, owner) << path;
+        EXPECT_EQ(status.st_gid, support::kUsersGid) << path;
+        EXPECT_EQ(status.st_mode & 07777, 0755U) << path;
+    }
+}
+
+TEST_F(OperationCgi, RenamingReplacesNothing) {
+    SKIP_WITHOUT_ROOT();
+    const std::string root = shareRoot("photo");
+    const std::string fat = addShare("usb", "read only = no\n");
+    addShare("archive", "read only = no\nvexo:restriction = 2\n");
+    addMount(fat, "vfat");
+    support::makeFolder(root + "/folder", 0777);
+    support::makeFolder(root + "/folder/empty", 0777);
+    support::makeFolder(root + "/root's", 0755);
+    for (const std::string file : {"/one", "/two", "/root's/f", "/folder/f"}) support::writeFile(root + file, file);
+    support::writeFile(fat + "/f", "x");
+    support::writeFile(shareRoot("archive") + "/f", "x");
+    fs::create_symlink("folder", root + "/inside");
+    fs::create_symlink("/etc", root + "/outside");
+    struct {
+        std::string user, path, name;
+        int code;
+    } const cases[] = {
+        {"alice", "/photo/one", "two", 414},
+        {"alice", "/photo/one", "folder", 414},
+        {"alice", "/photo/folder", "one", 414},
+        {"alice", "/photo/one", "one", 0},
+        {"alice", "/photo/folder", "folder", 0},
+        {"alice", "/photo/one", "", 400},
+        {"alice", "/photo/one", "..", 418},
+        {"alice", "/photo/one", "folder/one", 418},
+        {"alice", "/photo/one", "a:b", 418},
+        {"alice", "/photo/one", "._a", 418},
+        {"alice", "/photo/one", std::string(256, 'n'), 412},
+        {"alice", "/photo/missing", "x", 408},
+        {"alice", "/photo/missing/f", "x", 408},
+        {"alice", "/photo", "x", 400},
+        {"alice", "/photo/folder/..", "x", 418},
+        {"alice", "/photo/root's/f", "x", 407},
+        {"alice", "/photo/outside/passwd", "x", 407},
+        {"bob", "/photo/one", "x", 407},
+        {"alice", "/archive/f", "x", 407},
+        {"alice", "/usb/f", "a?", 419},
+        {"alice", "/photo/inside/f", "g\nh", 0},
+        {"alice", "/photo/outside", "link", 0},
+        {"alice", "/photo/one", "ONE", 0},
+    };
+    for (const auto& renaming : cases) {
+        EXPECT_EQ(rename(renaming.user, renaming.path, renaming.name), renaming.code)
+            << renaming.path << " to " << renaming.name;
+    }
+    EXPECT_EQ(support::readFile(root + "/ONE"), "/one");
+    EXPECT_EQ(support::readFile(root + "/two"), "/two");
+    EXPECT_EQ(support::readFile(root + "/folder/g\nh"), "/folder/f");
+    EXPECT_EQ(fs::read_symlink(root + "/link"), "/etc");
+    const CgiReply raw = ask("alice", "action=rename&path=/photo/two&name_raw=%25FF");
+    EXPECT_EQ(raw.json["data"]["path_raw"], "/photo/%FF");
+    EXPECT_TRUE(fs::exists(root + "/\xFF"));
+}
+
+TEST_F(OperationCgi, SubFoldersOfAFolder) {
+    const std::string root = shareRoot("photo");
+    for (const char* name : {"/b", "/a", "/a/deep", "/@tmp", "/\xFF"}) support::makeFolder(root + name);
+    support::writeFile(root + "/file", "x");
+    fs::create_symlink("/etc", root + "/outside");
+    const CgiReply reply = ask("bob", "action=subfolders&path=/photo", "GET");
+    std::vector<std::string> names;
+    for (const Json::Value& item : reply.json["data"]["items"]) names.push_back(item["path"].asString());
+    EXPECT_EQ(names, (std::vector<std::string>{"/photo/a", "/photo/b", "/photo/\uFFFD"}));
+    EXPECT_EQ(reply.json["data"]["items"][2]["name_raw"], "%FF");
+    EXPECT_EQ(reply.json["data"]["items"][2]["path_raw"], "/photo/%FF");
+
+    addShare("closed", "read only = no\nvalid users = alice\ninvalid users = bob\n");
+    addShare("sealed", "read only = no\nvexo:restriction = 1\n");
+    struct {
+        const char* path;
+        int code;
+    } const cases[] = {{"/closed", 407},        {"/sealed", 407},      {"/nowhere", 408},   {"/photo/missing", 408},
+                       {"/photo/outside", 407}, {"/photo/../..", 407}, {"/photo/file", 408}};
+    for (const auto& refusal : cases) {
+        const std::string query = std::string("action=subfolders&path=") + refusal.path;
+        EXPECT_EQ(code(ask("bob", query, "GET")), refusal.code) << refusal.path;
+    }
+}
+
+TEST_F(OperationCgi, TheTransferLogTellsWhatChanged) {
+    const std::string log = systemRoot() + "/var/log/vexo/xfer.log";
+    mkdir("alice", "/photo/silent");
+    EXPECT_FALSE(fs::exists(log));
+    setSetting("pexlanderxferlog", "yes");
+    mkdir("alice", "/photo/a");
+    mkdir("alice", "/photo/a");
+    rename("alice", "/photo/a", "b");
+    rename("alice", "/photo/a", "b");
+    ask("alice", "action=subfolders&path=/photo", "GET");
+    const std::string text = support::readFile(log);
+    EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 2) << text;
+    EXPECT_LT(text.find("\"mkdir\""), text.find("\"rename\"")) << text;
+}
+
+}  // namespace
