@@ -56,11 +56,10 @@ class ORVEL_API OrvEnum {
     // being read are dropped. A mount whose server does not answer is listed as a folder with mountPointType
     // "remotefail". With no bit but ADDITIONAL_REAL_PATH the status of entries is not read.
     //
-    // Returns false with 400 null or empty path, null total; 407 for "/" and for denied; 408 missing (also when it is
-    // no folder but could be entered); 410 a network mount that does not answer; 402 else (logged). A failing status of
-    // one entry ends the listing with 407 (denied), 401, or, for an I/O failure, no code; it is logged, and the entries
-    // read so far stay in `entries`. Leaves the working directory at "/". The name criteria, entries and total are
-    // touched as said, nothing else.
+    // Returns false with 400 null or empty path, null total; 407 for "/" and for denied; 408 missing; 410 a network
+    // mount that does not answer; 402 else, what is no folder included (logged). A failing status of one entry ends the
+    // listing with 407 (denied), 401, or, for an I/O failure, no code; it is logged, and the entries read so far stay
+    // in `entries`. Leaves the working directory at "/".
     bool OrvLibDirEntryListEnum(const char* path, const char* realPath, const char* sortBy, int additional,
                                 unsigned long offset, unsigned long limit, bool ascending, _tag_dir_entry_type_ type,
                                 std::vector<FileSearch::FindComp*> criteria, std::list<DIRENTRY_INFO>& entries,

@@ -42,6 +42,8 @@ class ListingTest : public support::ApplianceTest {
     void SetUp() override {
         ApplianceTest::SetUp();
         real_ = shareRoot("photo");
+        addUser("owner", geteuid(), getegid());  // whoever runs the tests has a name
+        addGroup("owners", getegid(), {});
     }
 
     bool list(const char* sortBy = "name", int additional = 0, unsigned long offset = 0, unsigned long limit = 0,
