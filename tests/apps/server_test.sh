@@ -2,47 +2,8 @@
 # script/server from end to end: a demo appliance made for the test, lighttpd, and curl as the browser.
 #   server_test.sh SERVER BUILD
 set -uo pipefail
-server=$1
-build=$2
-PATH=$PATH:/usr/sbin
-for program in lighttpd curl; do
-    command -v "$program" >/dev/null || { echo "FAILED: $program is not installed"; exit 1; }
-done
+. "$(dirname "$0")/served.sh"
 
-# A process that took on another identity cannot be traced, which is how leaks are looked for.
-export ASAN_OPTIONS=detect_leaks=0
-
-work=$(mktemp -d)
-chmod 755 "$work"
-demo=$work/demo
-log=$work/server.log
-pid=
-failures=0
-cleanup() {
-    [ -z "$pid" ] || { kill "$pid" 2>/dev/null; wait "$pid" 2>/dev/null; }
-    [ ! -e "$demo" ] || "$build/apps/orvelctl/orvelctl" demo "$demo" --remove >/dev/null
-    rm -rf "$work"
-}
-trap cleanup EXIT
-
-expect() { # what, wanted, got
-    if [ "$2" != "$3" ]; then
-        echo "FAILED: $1: wanted '$2', got '$3'"
-        failures=$((failures + 1))
-    fi
-}
-
-port=$((20000 + RANDOM % 20000))
-while (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null; do port=$((port + 1)); done
-"$server" --port "$port" --root "$demo" --build "$build" >"$log" 2>&1 &
-pid=$!
-for _ in $(seq 600); do
-    (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null && break
-    kill -0 "$pid" 2>/dev/null || { cat "$log"; echo "FAILED: the server ended"; exit 1; }
-    sleep 0.1
-done
-
-password() { awk -v user="$1" '$1 == "user" && $2 == user { print $4 }' "$log"; }
 list() { # user, query...
     local user=$1 fields=()
     shift
@@ -51,8 +12,6 @@ list() { # user, query...
 }
 names() { grep -o '"name":"[^"]*"' <<<"$1" | cut -d'"' -f4 | tr '\n' ' '; }
 sizes() { grep -o '"size":[0-9.e+]*' <<<"$1" | cut -d: -f2 | sed 's/\.0$//'; }
-root_of() { "$build/apps/orvelctl/orvelctl" --root "$demo" ls / --user alice --json --additional real_path 2>/dev/null |
-    grep -o "\"real_path\":\"[^\"]*-$1\"" | cut -d'"' -f4; }
 
 expect "without a password" 401 "$(curl -s -o /dev/null -w '%{http_code}' "http://127.0.0.1:$port/cgi-bin/list?action=shares")"
 expect "with a wrong one" 401 "$(curl -s -o /dev/null -w '%{http_code}' -u alice:x "http://127.0.0.1:$port/cgi-bin/list?action=shares")"
@@ -108,5 +67,4 @@ expect "what is left" mine "$(ls "$demo")"
 "$build/apps/orvelctl/orvelctl" demo "$demo" >/dev/null 2>&1 && expect "a folder in use" refused "made a demo"
 rm -r "$demo"
 
-[ "$failures" -eq 0 ] || { echo "--- server:"; cat "$log"; }
-exit "$((failures > 0))"
+finish

@@ -1,0 +1,50 @@
+# Sourced by tests that go through the web server, called as TEST SERVER BUILD: serves a demo appliance made for the test.
+# Gives $demo, $port, $log, $pid, $build, $work, expect, password, root_of and finish.
+server=$1
+build=$2
+PATH=$PATH:/usr/sbin
+for program in lighttpd curl; do
+    command -v "$program" >/dev/null || { echo "FAILED: $program is not installed"; exit 1; }
+done
+
+# A process that took on another identity cannot be traced, which is how leaks are looked for.
+export ASAN_OPTIONS=detect_leaks=0
+
+work=$(mktemp -d)
+chmod 755 "$work"
+demo=$work/demo
+log=$work/server.log
+pid=
+failures=0
+cleanup() {
+    [ -z "$pid" ] || { kill "$pid" 2>/dev/null; wait "$pid" 2>/dev/null; }
+    [ ! -e "$demo" ] || "$build/apps/orvelctl/orvelctl" demo "$demo" --remove >/dev/null
+    rm -rf "$work"
+}
+trap cleanup EXIT
+
+expect() { # what, wanted, got
+    if [ "$2" != "$3" ]; then
+        echo "FAILED: $1: wanted '$2', got '$3'"
+        failures=$((failures + 1))
+    fi
+}
+
+port=$((20000 + RANDOM % 20000))
+while (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null; do port=$((port + 1)); done
+"$server" --port "$port" --root "$demo" --build "$build" >"$log" 2>&1 &
+pid=$!
+for _ in $(seq 600); do
+    (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null && break
+    kill -0 "$pid" 2>/dev/null || { cat "$log"; echo "FAILED: the server ended"; exit 1; }
+    sleep 0.1
+done
+
+password() { awk -v user="$1" '$1 == "user" && $2 == user { print $4 }' "$log"; }
+# The real folder of a share of the demo.
+root_of() { "$build/apps/orvelctl/orvelctl" --root "$demo" ls / --user alice --json --additional real_path 2>/dev/null |
+    grep -o "\"real_path\":\"[^\"]*-$1\"" | cut -d'"' -f4; }
+finish() {
+    [ "$failures" -eq 0 ] || { echo "--- server:"; cat "$log"; }
+    exit "$((failures > 0))"
+}
