@@ -71,7 +71,7 @@ class ListingTest : public support::ApplianceTest {
 
 void ListingTest::makeMixedFolder() {
     folder("beta");
-    folder("Alpha");
+    folder("Alpha.zip");
     file("c.txt", "123");
     file("B.jpg", "1");
     file("a", "12345");
@@ -82,7 +82,7 @@ void ListingTest::makeMixedFolder() {
         time_t time;
     };
     for (const auto& [name, mode, time] :
-         {Facts{"beta", 0755, 5}, Facts{"Alpha", 0777, 4}, Facts{"c.txt", 0600, 300}, Facts{"B.jpg", 0644, 200},
+         {Facts{"beta", 0755, 5}, Facts{"Alpha.zip", 0777, 4}, Facts{"c.txt", 0600, 300}, Facts{"B.jpg", 0644, 200},
           Facts{"a", 0640, 100}, Facts{"d.TXT", 0400, 400}}) {
         const std::string path = real_ + "/" + name;
         ASSERT_EQ(chmod(path.c_str(), mode), 0);
@@ -313,13 +313,13 @@ TEST_F(ListingTest, Columns) {
         Names order;
     };
     const Case cases[] = {
-        {"name", {"Alpha", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
-        {"anything", {"Alpha", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
-        {"size", {"Alpha", "beta", "B.jpg", "d.TXT", "c.txt", "a"}},
-        {"mtime", {"Alpha", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
-        {"atime", {"beta", "Alpha", "d.TXT", "c.txt", "B.jpg", "a"}},
-        {"posix", {"beta", "Alpha", "d.TXT", "c.txt", "a", "B.jpg"}},
-        {"type", {"Alpha", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
+        {"name", {"Alpha.zip", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
+        {"anything", {"Alpha.zip", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
+        {"size", {"Alpha.zip", "beta", "B.jpg", "d.TXT", "c.txt", "a"}},
+        {"mtime", {"Alpha.zip", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
+        {"atime", {"beta", "Alpha.zip", "d.TXT", "c.txt", "B.jpg", "a"}},
+        {"posix", {"beta", "Alpha.zip", "d.TXT", "c.txt", "a", "B.jpg"}},
+        {"type", {"Alpha.zip", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
     };
     for (const auto& [key, order] : cases) {
         EXPECT_EQ(listed(key), order) << key;
