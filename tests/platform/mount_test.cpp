@@ -178,6 +178,13 @@ TEST_F(MountTest, VolumesAndTheirKinds) {
         EXPECT_EQ(info.kind, c.kind);
     }
     VOLUMEPATHINFO info;
+    // Anything but a regular file is no volumes file, and a pipe's writer is not waited for.
+    const std::string file = systemRoot() + "/etc/vexo/volumes";
+    ASSERT_EQ(unlink(file.c_str()), 0);
+    ASSERT_EQ(mkfifo(file.c_str(), 0600), 0);
+    EXPECT_GT(VolumePathParse("/volumeUSB1/a", &info), 0);
+    EXPECT_EQ(info.kind, VEXO_VOLUME_INTERNAL);
+    ASSERT_EQ(unlink(file.c_str()), 0);
     const std::string longOne = "/" + std::string(4096, 'v');
     for (const char* bad : {static_cast<const char*>(nullptr), "", "volume1/a", longOne.c_str()}) {
         VLIBCErrSetEx(0, "", 0);
