@@ -12,6 +12,7 @@
 
 #include <array>
 #include <cerrno>
+#include <exception>
 #include <string>
 
 #include "acl_rules.h"
@@ -152,7 +153,7 @@ bool removableByPath(std::string path) {
 
 }  // namespace
 
-int VEXOACLPermGet(const char* path, unsigned* permission) {
+int VEXOACLPermGet(const char* path, unsigned* permission) try {
     VEXO_GATE("VEXOACLPermGet", -1);
     if (path == nullptr || permission == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     unsigned granted = 0;
@@ -164,9 +165,11 @@ int VEXOACLPermGet(const char* path, unsigned* permission) {
     _tag_VEXOSTAT_ status;
     const bool dangling = failure == ENOENT && vexo::readStatus(AT_FDCWD, path, AT_SYMLINK_NOFOLLOW, false, status);
     return vexo::fail(dangling ? VEXO_ERR_ACL_TARGET_MISSING : missingOrOther(failure), failure);
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }
 
-PVEXOACLFOLDER VEXOACLFolderOpen(int dirfd) {
+PVEXOACLFOLDER VEXOACLFolderOpen(int dirfd) try {
     VEXO_GATE("VEXOACLFolderOpen", nullptr);
     VEXOACLFOLDER folder{};
     if (!openFolder(dirfd, folder)) {
@@ -174,6 +177,9 @@ PVEXOACLFOLDER VEXOACLFolderOpen(int dirfd) {
         return nullptr;
     }
     return new VEXOACLFOLDER(folder);
+} catch (const std::exception&) {
+    vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+    return nullptr;
 }
 
 int VEXOACLFolderPermGet(PVEXOACLFOLDER folder, const char* name, const _tag_VEXOSTAT_* status, unsigned* permission) {

@@ -3,6 +3,7 @@
 #include <sys/xattr.h>
 
 #include <cerrno>
+#include <exception>
 #include <vector>
 
 #include "failure.h"
@@ -27,7 +28,7 @@ int VEXOACLIsSupport(const char* path, int /*fd*/, int /*kind*/) {
     return VEXOACLIsSupportOnDevice(path, status.st_dev);
 }
 
-int VEXOACLIsSupportOnDevice(const char* path, unsigned long long device) {
+int VEXOACLIsSupportOnDevice(const char* path, unsigned long long device) try {
     VEXO_GATE("VEXOACLIsSupport", -1);
     for (const DeviceSupport& known : knownDevices) {
         if (known.device == device) return known.supported;
@@ -39,4 +40,6 @@ int VEXOACLIsSupportOnDevice(const char* path, unsigned long long device) {
     errno = before;
     knownDevices.push_back({device, has ? 1 : 0});
     return has ? 1 : 0;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

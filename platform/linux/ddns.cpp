@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <exception>
 #include <string>
 #include <string_view>
 
@@ -44,7 +45,7 @@ bool isHostName(std::string_view host) {
 
 }  // namespace
 
-int VEXODDNSConfigGet(const char* provider, VEXODDNS* entry) {
+int VEXODDNSConfigGet(const char* provider, VEXODDNS* entry) try {
     if (entry != nullptr) *entry = {};
     VEXO_GATE("VEXODDNSConfigGet", -1);
     if (provider == nullptr || entry == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
@@ -62,4 +63,6 @@ int VEXODDNSConfigGet(const char* provider, VEXODDNS* entry) {
     memcpy(entry->szProvider, name.data(), name.size());
     memcpy(entry->szHostname, host->data(), host->size());
     return 0;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

@@ -4,6 +4,7 @@
 
 #include <array>
 #include <cerrno>
+#include <exception>
 #include <string>
 #include <string_view>
 
@@ -171,7 +172,7 @@ bool take(const char* source, const Copy& copy) {
 
 }  // namespace
 
-int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* options) {
+int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* options) try {
     VEXO_GATE("VEXOFileCopy", -1);
     if (source == nullptr || target == nullptr || *source == '\0' || *target == '\0') {
         return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
@@ -193,4 +194,6 @@ int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* opti
     if (!publish(copy, part)) return vexo::fail(errorOfPublishing(errno));
     errno = before;
     return 0;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

@@ -1,5 +1,6 @@
 // File-system types by number, and what the mount table says about a path.
 #include <cerrno>
+#include <exception>
 
 #include "failure.h"
 #include "fault_gate.h"
@@ -15,16 +16,18 @@ int lastFoundType = VEXO_FS_NOT_A_MOUNT;
 
 }  // namespace
 
-int VEXOGetFSType(const char* path, int /*flags*/) {
+int VEXOGetFSType(const char* path, int /*flags*/) try {
     VEXO_GATE("VEXOGetFSType", -1);
     if (path == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     const vexo::MountTable* table = vexo::mountTable();
     if (table == nullptr) return -1;
     const vexo::Mount* mount = vexo::mountHolding(*table, path);
     return mount == nullptr ? int{VEXO_FS_UNKNOWN} : mount->type;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }
 
-int VEXOFSIsInMountTable(const char* path) {
+int VEXOFSIsInMountTable(const char* path) try {
     lastFoundType = VEXO_FS_NOT_A_MOUNT;
     VEXO_GATE("VEXOFSIsInMountTable", -1);
     if (path == nullptr || *path == '\0') return -1;
@@ -35,6 +38,8 @@ int VEXOFSIsInMountTable(const char* path) {
     if (mount == nullptr) return -1;
     lastFoundType = mount->type;
     return static_cast<int>(mount - table->data());
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL);
 }
 
 int VEXOFSIsRemoteFS() {

@@ -1,5 +1,6 @@
 // Making a folder with its missing parents, by descriptors, so that nobody can lead it elsewhere half-way.
 #include <cstring>
+#include <exception>
 #include <string>
 #include <string_view>
 
@@ -64,7 +65,7 @@ std::string_view nextComponent(const char*& rest) {
 
 }  // namespace
 
-int VEXOFSMkdirP(const char* path, const char** stopAt, int recursive, uid_t uid, gid_t gid, mode_t mode) {
+int VEXOFSMkdirP(const char* path, const char** stopAt, int recursive, uid_t uid, gid_t gid, mode_t mode) try {
     VEXO_GATE("VEXOFSMkdirP", -1);
     if (path == nullptr || *path == '\0') return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     const int before = errno;
@@ -81,4 +82,6 @@ int VEXOFSMkdirP(const char* path, const char** stopAt, int recursive, uid_t uid
         if (!folder && stopAt != nullptr) *stopAt = rest - component.size();
     }
     return vexo::fail(vexo::errorOfErrno(errno));
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

@@ -93,8 +93,10 @@ const MountTable* fileTable(const std::string& path, const struct stat& now) {
     static FileVersion version;
     if (version.isCurrent(now)) return &table;
     std::string text;
-    if (!readRegularFile(path, kLimit, text, version)) return failed();
+    FileVersion read;
+    if (!readRegularFile(path, kLimit, text, read)) return failed();
     table = parseMountTable(text);
+    version = read;  // last: a reading that memory cut short is not remembered
     return &table;
 }
 

@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdarg>
+#include <exception>
 #include <vector>
 
 #include "failure.h"
@@ -86,7 +87,7 @@ int errorOfStart(int failure) {
 
 }  // namespace
 
-int VLIBCExec(const char* program, ...) {
+int VLIBCExec(const char* program, ...) try {
     VEXO_GATE("VLIBCExec", -1);
     if (program == nullptr || *program != '/') return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     const int before = errno;
@@ -101,4 +102,6 @@ int VLIBCExec(const char* program, ...) {
     const int status = waitFor(child);
     if (status >= 0) errno = before;
     return status;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

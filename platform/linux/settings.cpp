@@ -52,12 +52,11 @@ const std::vector<vexo::Setting>* load(const char* file) {
     SettingsFile& entry = files[path];
     struct stat status {};
     if (stat(path.c_str(), &status) == 0 && entry.version.isCurrent(status)) return &entry.settings;
-    entry.settings.clear();
-    if (!vexo::readRegularFile(path, kMaxFile, entry.text, entry.version)) {
-        entry.version = {};
-        return nullptr;
-    }
+    entry = {};
+    vexo::FileVersion version;
+    if (!vexo::readRegularFile(path, kMaxFile, entry.text, version)) return nullptr;
     entry.settings = vexo::parseSettings(entry.text, kSeparator);
+    entry.version = version;  // last: a reading that memory cut short is not remembered
     return &entry.settings;
 }
 

@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <ctime>
+#include <exception>
 #include <string>
 
 #include "failure.h"
@@ -63,7 +64,7 @@ bool append(int log, const std::string& line) {
 }  // namespace
 
 int VEXOLogKTRFMXferLog(const char* address, const char* user, const char* action, long long size, const char* path,
-                        bool flag) {
+                        bool flag) try {
     VEXO_GATE("VEXOLogKTRFMXferLog", -1);
     if (address == nullptr || user == nullptr || action == nullptr || path == nullptr) {
         return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
@@ -75,4 +76,6 @@ int VEXOLogKTRFMXferLog(const char* address, const char* user, const char* actio
     if (!log || !isOurs(log.get()) || !append(log.get(), line)) return vexo::fail(vexo::errorOfErrno(errno));
     errno = before;
     return 0;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

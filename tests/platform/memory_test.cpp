@@ -1,0 +1,143 @@
+// Memory that runs out inside an operation: it fails like any other failure, and no exception leaves the platform.
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include <cstdlib>
+#include <functional>
+#include <new>
+
+#include "file_io.h"
+#include "support/appliance.h"
+#include "vexo/acl.h"
+#include "vexo/copy.h"
+#include "vexo/ddns.h"
+#include "vexo/error.h"
+#include "vexo/filesystem.h"
+#include "vexo/process.h"
+#include "vexo/settings.h"
+#include "vexo/xferlog.h"
+
+namespace {
+
+int untilRefusal = 0;  // 1: the next allocation is refused; 0 and below: none is
+
+}  // namespace
+
+// For the whole test program: the C++ allocator that can be told to refuse. Not inlined: the compiler would see free()
+// called on what an operator made.
+[[gnu::noinline]] void* operator new(size_t size) {
+    if (untilRefusal > 0 && --untilRefusal == 0) throw std::bad_alloc();
+    void* memory = malloc(size == 0 ? 1 : size);
+    if (memory == nullptr) throw std::bad_alloc();
+    return memory;
+}
+[[gnu::noinline]] void operator delete(void* memory) noexcept {
+    free(memory);
+}
+[[gnu::noinline]] void operator delete(void* memory, size_t /*size*/) noexcept {
+    free(memory);
+}
+
+namespace {
+
+using MemoryTest = support::ApplianceTest;
+
+// Runs `operation` with its allocation 1, 2, 3... refused, until one run needs no more of them; how many were refused.
+// `check` follows each run and is told whether it met a refusal.
+int refuseEach(const std::function<int()>& operation, const std::function<void(int result, bool refused)>& check) {
+    constexpr int kLimit = 1000;
+    for (int nth = 1; nth < kLimit; ++nth) {
+        SCOPED_TRACE("allocation " + std::to_string(nth) + " is refused");
+        VLIBCErrSetEx(0, "", 0);
+        int result = 0;
+        bool escaped = false;
+        untilRefusal = nth;
+        try {
+            result = operation();
+        } catch (const std::bad_alloc&) {
+            escaped = true;
+        }
+        const bool refused = untilRefusal == 0;
+        untilRefusal = 0;
+        EXPECT_FALSE(escaped);
+        if (escaped) return nth;
+        check(result, refused);
+        if (!refused) return nth - 1;
+    }
+    return kLimit;
+}
+
+TEST_F(MemoryTest, OperationsFailWithoutAnException) {
+    const std::string root = addShare("memory", "");
+    const std::string source = root + "/a source with a long name";
+    const std::string target = root + "/a target with a long name";
+    const std::string made = root + "/a folder with a long name/and one below it";
+    support::writeFile(source, "new");
+    support::writeFile(target, "old");
+    writeRootFile("/etc/vexo/volumes", "/a-volume-with-a-long-name usb\n");
+    writeRootFile("/etc/vexo/ddns.conf", "[provider]\nhostname=\"a.host.with.a.long.name\"\n");
+    const vexo::Descriptor folder = vexo::openFile(root, O_RDONLY | O_DIRECTORY);
+    unsigned permission = 0;
+    VOLUMEPATHINFO volume;
+    VEXODDNS entry;
+    const VEXOCOPYOPT overwrite{static_cast<uid_t>(-1), static_cast<gid_t>(-1), nullptr, VEXO_COPY_OVERWRITE};
+
+    const struct {
+        const char* name;
+        std::function<int()> run;  // <0 on failure
+    } operations[] = {
+        {"VEXOACLPermGet", [&] { return VEXOACLPermGet(source.c_str(), &permission); }},
+        {"VEXOACLFolderOpen",
+         [&] {
+             VEXOACLFOLDER* opened = VEXOACLFolderOpen(folder.get());
+             VEXOACLFolderClose(opened);
+             return opened == nullptr ? -1 : 0;
+         }},
+        {"VEXOGetFSType", [&] { return VEXOGetFSType(root.c_str(), 0); }},
+        {"VEXOFSIsInMountTable", [] { return VEXOFSIsInMountTable("/"); }},
+        {"VEXOFSMkdirP",
+         [&] { return VEXOFSMkdirP(made.c_str(), nullptr, 1, static_cast<uid_t>(-1), static_cast<gid_t>(-1), 0755); }},
+        {"VolumePathParse", [&] { return VolumePathParse("/a-volume-with-a-long-name/a", &volume); }},
+        {"VEXOFileCopy", [&] { return VEXOFileCopy(source.c_str(), target.c_str(), &overwrite); }},
+        {"VLIBCExec", [] { return VLIBCExec("/bin/true", nullptr); }},
+        {"VEXOLogKTRFMXferLog", [] { return VEXOLogKTRFMXferLog("::1", "alice", "download", 1, "/photo/a", false); }},
+        {"VEXODDNSConfigGet", [&] { return VEXODDNSConfigGet("provider", &entry); }},
+    };
+    for (const auto& operation : operations) {
+        SCOPED_TRACE(operation.name);
+        ASSERT_GE(operation.run(), 0);
+        const int before = support::openDescriptors();
+        const int refusals = refuseEach(operation.run, [](int result, bool refused) {
+            EXPECT_EQ(result < 0, refused);
+            if (refused) {
+                EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_GENERAL);
+            }
+        });
+        EXPECT_GT(refusals, 0);
+        EXPECT_EQ(support::openDescriptors(), before);
+    }
+}
+
+// What a file held must not be taken for nothing after a reading that failed half-way.
+TEST_F(MemoryTest, SettingsAreReadAgain) {
+    const std::string file = systemRoot() + "/etc/vexoinfo.conf";
+    char value[64];
+    setSetting("a_key_with_a_long_name", "a value with a long text");
+    const auto ask = [&] {
+        return VLIBCFileGetKeyValue("/etc/vexoinfo.conf", "a_key_with_a_long_name", value, sizeof value, 0);
+    };
+    for (int nth = 1; nth < 20; ++nth) {
+        SCOPED_TRACE(nth);
+        // Old enough to be remembered, and another version each time.
+        const timespec times[] = {{1000000 + nth, 0}, {1000000 + nth, 0}};
+        ASSERT_EQ(utimensat(AT_FDCWD, file.c_str(), times, 0), 0);
+        untilRefusal = nth;
+        const int first = ask();
+        const bool refused = untilRefusal == 0;
+        untilRefusal = 0;
+        EXPECT_EQ(first, refused ? -1 : 1);
+        EXPECT_EQ(ask(), 1);
+    }
+}
+
+}  // namespace
