@@ -29,6 +29,7 @@ const ColumnName* find(std::string_view sortBy) {
 }
 
 constexpr uint32_t kPermissionBits = 0x1FF;
+constexpr size_t kUsualKeyLength = 24;
 
 size_t commonLength(std::string_view a, std::string_view b) {
     const size_t limit = std::min(a.size(), b.size());
@@ -103,7 +104,7 @@ int64_t columnValue(Column column, const Figures& figures) {
 EntryOrder::EntryOrder(Column column, size_t expected) : column_(column) {
     items_.reserve(expected);
     keyEnds_.reserve(expected);
-    keys_.reserve(expected * 24);
+    keys_.reserve(expected * kUsualKeyLength);
 }
 
 void EntryOrder::add(const Figures& figures, std::string_view name, std::string_view type) {

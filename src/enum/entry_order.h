@@ -47,8 +47,8 @@ class EntryOrder {
  private:
     struct Item {
         int64_t value;
-        uint64_t prefix;  // of the name's key, behind what all keys begin with
-        uint32_t position;
+        uint64_t prefix;    // of the name's key, behind what all keys begin with
+        uint32_t position;  // four thousand million entries do not fit into memory
         bool isFile;
     };
     [[nodiscard]] std::string_view key(size_t position) const;
