@@ -9,6 +9,7 @@
 #include "orvel/listing.h"
 #include "orvel/privilege.h"
 #include "orvel/search_criteria.h"
+#include "reply.h"
 
 namespace orvel::cgi {
 namespace {
@@ -33,12 +34,6 @@ int bitOf(std::string_view word) {
         if (known.word == word) return known.bit;
     }
     return 0;
-}
-
-// Some failures of the library set no code.
-int lastError(int fallback) {
-    const int code = OrvLibGetErr();
-    return code != ORV_ERR_NONE ? code : fallback;
 }
 
 const char* sidOf(const ListRequest& request) {
@@ -81,25 +76,25 @@ int listFolder(const ListRequest& request, Listing& listing) {
     // The top level is the share listing's; the answer is that of the folder listing, which resolution would pre-empt.
     if (request.path == "/") return ORV_ERR_DENIED;
     OrvLibSetErr(ORV_ERR_NONE);
-    if (!PathInfoFactory::create(request.user.c_str(), request.path, info)) return lastError(ORV_ERR_GENERAL);
+    if (!PathInfoFactory::create(request.user.c_str(), request.path, info)) return lastCode();
     OrvLibSetErr(ORV_ERR_NONE);
     // A refusal sets no code, a look-up that failed does.
     if (!CheckShareListPrivilege(request.user.c_str(), sidOf(request), info.path.c_str()))
-        return lastError(ORV_ERR_DENIED);
+        return lastCode(ORV_ERR_DENIED);
 
     std::string realPath;
     const int refusal = confinedFolder(info, linkPolicyOf(info.shareName), realPath);
     if (refusal != ORV_ERR_NONE) return refusal;
-    if (!CheckDirListPrivilege(realPath.c_str())) return lastError(ORV_ERR_GENERAL);
+    if (!CheckDirListPrivilege(realPath.c_str())) return lastCode();
 
     NameCriteria criteria;
-    if (!request.pattern.empty() && !criteria.add(request.pattern)) return lastError(ORV_ERR_GENERAL);
+    if (!request.pattern.empty() && !criteria.add(request.pattern)) return lastCode();
     OrvEnum enumeration;
     const bool listed = enumeration.OrvLibDirEntryListEnum(
         info.path.c_str(), realPath.c_str(), request.sortBy.empty() ? "name" : request.sortBy.c_str(),
         request.additional, request.offset, request.limit, request.ascending, request.type, criteria.list(),
         listing.entries, &listing.total);
-    return listed ? ORV_ERR_NONE : lastError(ORV_ERR_GENERAL);
+    return listed ? ORV_ERR_NONE : lastCode();
 }
 
 int listShares(const ListRequest& request, Listing& listing) {
@@ -108,7 +103,7 @@ int listShares(const ListRequest& request, Listing& listing) {
     const bool listed = enumeration.OrvLibShareEntryListEnum(
         request.user.c_str(), sidOf(request), false, request.sortBy.empty() ? nullptr : request.sortBy.c_str(),
         request.additional, request.offset, request.limit, request.ascending, listing.entries, &listing.total);
-    return listed ? ORV_ERR_NONE : lastError(ORV_ERR_GENERAL);
+    return listed ? ORV_ERR_NONE : lastCode();
 }
 
 void writeListing(const ListRequest& request, const Listing& listing,

@@ -2,7 +2,6 @@
 
 #include <json/value.h>
 
-#include "orvel/error_state.h"
 #include "text.h"
 
 namespace orvel::cgi {
@@ -38,6 +37,11 @@ void beginReply(Output& out, Status status, const std::string& cookie) {
         "Cache-Control: no-store\r\n";
     if (!cookie.empty()) out.text() += "Set-Cookie: " + cookie + "\r\n";
     out.text() += "\r\n";
+}
+
+int lastCode(int fallback) {
+    const int code = OrvLibGetErr();
+    return code != ORV_ERR_NONE ? code : fallback;
 }
 
 void putPath(Json::Value& object, const char* key, std::string_view path) {

@@ -10,6 +10,7 @@
 #include <string>
 #include <string_view>
 
+#include "orvel/error_state.h"
 #include "output.h"
 
 namespace orvel::cgi {
@@ -34,6 +35,9 @@ void beginReply(Output& out, Status status, const std::string& cookie);
 void reply(Output& out, Status status, const std::string& cookie, int code, std::string_view path,
            const Json::Value& data);
 void replyFailure(Output& out, Status status, const std::string& cookie, int code, std::string_view path);
+
+// The library code of the failure just met, `fallback` where it set none (store 0 before the call).
+int lastCode(int fallback = ORV_ERR_GENERAL);
 
 // Sets `key` to `path`, readable, and where it is no UTF-8 `key` + "_raw" to its bytes, percent-encoded.
 void putPath(Json::Value& object, const char* key, std::string_view path);

@@ -11,6 +11,7 @@
 
 #include "orvel/error_state.h"
 #include "orvel/name_check.h"
+#include "reply.h"
 #include "vexo/user.h"
 
 namespace orvel::cgi {
@@ -41,11 +42,6 @@ void handOver(const Descriptor& made, const std::string& user) {
     gid_t gid = 0;
     if (geteuid() != 0 || VEXOUserGetUGID(user.c_str(), &uid, &gid) != 0) return;
     [[maybe_unused]] const int ignored = fchownat(made.get(), "", uid, gid, AT_EMPTY_PATH);  // FAT keeps no owners
-}
-
-int lastCode() {
-    const int code = OrvLibGetErr();
-    return code != ORV_ERR_NONE ? code : ORV_ERR_GENERAL;
 }
 
 // The folders above a target, of which the first `existing` ones exist.

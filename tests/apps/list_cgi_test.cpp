@@ -120,6 +120,14 @@ TEST_F(ListCgi, RefusalsSayWhy) {
     EXPECT_FALSE(ask("alice", "action=folder&path=/photo%00/x").json["success"].asBool());
 }
 
+TEST_F(ListCgi, RootsRightsAreAnAdministratorsAlone) {
+    SKIP_WITHOUT_ROOT();
+    addUser("toor", 0, 0);
+    addShare("open", "read only = no\n");
+    EXPECT_EQ(folder("toor", "/open").json["error"]["code"], 401);
+    EXPECT_TRUE(folder("alice", "/open").json["success"].asBool());
+}
+
 TEST_F(ListCgi, ParametersAreTakenStrictly) {
     for (const char* query :
          {"", "action=burn", "action=folder&path=/photo&offset=-1", "action=folder&path=/photo&limit=10x",

@@ -38,11 +38,6 @@ std::string variable(const char* name) {
     return value == nullptr ? "" : value;
 }
 
-int lastCode(int fallback) {
-    const int code = OrvLibGetErr();
-    return code != ORV_ERR_NONE ? code : fallback;
-}
-
 struct Source {
     PathInfo info;
     std::string name;  // for the client to save it under
@@ -63,7 +58,7 @@ std::string nameOf(const PathInfo& info, const Descriptor& found) {
 // Resolves, asks and opens one path as the user. 0 or a library code.
 int openSource(const User& user, const std::string& path, Source& source) {
     OrvLibSetErr(ORV_ERR_NONE);
-    if (!PathInfoFactory::create(user.name.c_str(), path, source.info)) return lastCode(ORV_ERR_GENERAL);
+    if (!PathInfoFactory::create(user.name.c_str(), path, source.info)) return lastCode();
     OrvLibSetErr(ORV_ERR_NONE);
     if (!CheckShareDownloadPrivilege(user.name.c_str(), user.sid.c_str(), source.info.path.c_str())) {
         return lastCode(ORV_ERR_DENIED);

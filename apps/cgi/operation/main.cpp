@@ -51,7 +51,7 @@ int judge(const Operation& operation, Need need) {
     if (need == Need::kList) return CheckShareListPrivilege(user, sid, path) ? ORV_ERR_NONE : lastCode(ORV_ERR_DENIED);
     if (IsDirUserHome(path, nullptr)) return ORV_ERR_NONE;
     int privilege = ORV_PRIVILEGE_UNKNOWN, mask = 0;
-    if (OrvLibGetPrivilege(path, user, sid, &privilege, &mask) != 0) return lastCode(ORV_ERR_GENERAL);
+    if (OrvLibGetPrivilege(path, user, sid, &privilege, &mask) != 0) return lastCode();
     const bool fixed = need == Need::kModify && (mask & ORV_MASK_NO_MODIFYING) != 0;
     return privilege == ORV_PRIVILEGE_READ_WRITE && !fixed ? ORV_ERR_NONE : ORV_ERR_DENIED;
 }
@@ -61,7 +61,7 @@ int perform(Operation& operation, const Action& action) {
     int code = actAs(user.sid.c_str(), user.name, IsDirUserHome(operation.path, nullptr));
     if (code != ORV_ERR_NONE) return code;
     OrvLibSetErr(ORV_ERR_NONE);
-    if (!PathInfoFactory::create(user.name.c_str(), operation.path, operation.info)) return lastCode(ORV_ERR_GENERAL);
+    if (!PathInfoFactory::create(user.name.c_str(), operation.path, operation.info)) return lastCode();
     code = judge(operation, action.need);
     return code == ORV_ERR_NONE ? action.run(operation) : code;
 }
@@ -86,11 +86,6 @@ void serve(Output& out) {
 }
 
 }  // namespace
-
-int lastCode(int fallback) {
-    const int code = OrvLibGetErr();
-    return code != ORV_ERR_NONE ? code : fallback;
-}
 
 }  // namespace orvel::cgi
 

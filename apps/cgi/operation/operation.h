@@ -27,9 +27,6 @@ int renameOperation(Operation& operation);
 // data: {"items":[{"name","path","mtime","mount_type"}]}, the sub-folders by name, "mount_type" only for mount points.
 int subfoldersOperation(Operation& operation);
 
-// The library code of the last failure, `fallback` where it set none.
-int lastCode(int fallback);
-
 }  // namespace orvel::cgi
 
 #endif

@@ -12,16 +12,12 @@
 #include "orvel/name_check.h"
 #include "orvel/share_path.h"
 #include "orvel/upload_check.h"
+#include "reply.h"
 
 namespace orvel::cgi {
 namespace {
 
 volatile std::sig_atomic_t terminated = 0;
-
-int lastCode() {
-    const int code = OrvLibGetErr();
-    return code != ORV_ERR_NONE ? code : ORV_ERR_GENERAL;
-}
 
 // The volume's temporary folder is made while the process still may; where it cannot be, the spool says so.
 void prepareVolume(std::string volumePath) {
