@@ -31,6 +31,14 @@ int untilRefusal = 0;  // 1: the next allocation is refused; 0 and below: none i
     if (memory == nullptr) throw std::bad_alloc();
     return memory;
 }
+// The sanitizers bring one of their own, whose memory is not freed as ours is.
+[[gnu::noinline]] void* operator new(size_t size, const std::nothrow_t& /*tag*/) noexcept {
+    try {
+        return operator new(size);
+    } catch (const std::bad_alloc&) {
+        return nullptr;
+    }
+}
 [[gnu::noinline]] void operator delete(void* memory) noexcept {
     free(memory);
 }
