@@ -86,7 +86,6 @@ void serve(Output& out) {
 }
 
 }  // namespace
-
 }  // namespace orvel::cgi
 
 int main() {
