@@ -78,15 +78,15 @@ reply=$(curl -s -u "bob:$(password bob)" -T "$work/large" "$url/upload?path=/pho
 expect "a large upload that is refused" 407 "$(code "$reply")"
 
 # Whatever ends an upload early leaves nothing.
-slow_upload() {
-    curl "${as_alice[@]}" --limit-rate 4M -T "$work/large" "$url/upload?path=/photo/gone/new/file" >"$work/reply" 2>&1 &
+slow_upload() { # further options of curl
+    curl "${as_alice[@]}" "$@" --limit-rate 4M -T "$work/large" "$url/upload?path=/photo/gone/new/file" >"$work/reply" 2>&1 &
     client=$!
     await "an upload begins" a_program_has_data
 }
 slow_upload
 kill "$client"
 nothing_left "the client hung up"
-slow_upload
+slow_upload -m 5 # curl waits for the reply, the server for the rest
 truncate -s 0 "$work/large"
 wait "$client"
 nothing_left "the source disappeared"
@@ -95,7 +95,7 @@ for signal in TERM KILL; do
     slow_upload
     kill -"$signal" "$(programs)"
     nothing_left "SIG$signal"
-    kill "$client"
+    kill "$client" 2>/dev/null
     wait "$client"
 done
 
