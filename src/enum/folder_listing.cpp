@@ -4,6 +4,7 @@
 #include <cstring>
 #include <memory>
 #include <numeric>
+#include <optional>
 
 #include "core/boundary.h"
 #include "core/owned.h"
@@ -142,9 +143,10 @@ bool OrvEnum::OrvLibDirEntryListEnum(const char* path, const char* realPath, con
         if (!folder) return false;
         orvel::ScannedFolder scanned;
         const bool complete = orvel::scanFolder(folder.get(), {realPath, type, wanted, criteria}, mounts_, scanned);
+        std::optional<orvel::FailureKeeper> keeper;
+        if (!complete) keeper.emplace();
         orvel::RecordBuilder builder(folder.get(), path, realPath, wanted, scanned, mounts_, names_);
         if (!complete) {
-            const orvel::FailureKeeper keeper;
             orvel::appendAll(builder, scanned.entries.size(), entries);
             return false;
         }

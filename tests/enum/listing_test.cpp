@@ -453,6 +453,7 @@ TEST_F(ListingTest, EntriesBeforeTheFailureStay) {
     vexo::gate::reset();
     vexo::gate::fail("VLIBCFileLStatAt", VEXO_ERR_DENIED, EACCES, 3);
     vexo::gate::fail("VEXOUserGetByUID", VEXO_ERR_USER_MISSING, ENOENT);
+    vexo::gate::fail("VEXOACLFolderOpen", VEXO_ERR_GENERAL, EIO);
     announceLog("Failed to stat " + real_ + "/" + order[2]);
     EXPECT_FALSE(list("name", kEverything, 1, 1));
     EXPECT_EQ(OrvLibGetErr(), ORV_ERR_DENIED);
