@@ -66,7 +66,7 @@ class ORVEL_API FindNameComp : public FindComp {
 
     // Makes `other` an alternative of this criterion, asked before it, and the root of its or-chain of conditions. Null
     // and the criterion itself do nothing. Takes no ownership: `other` must live as long as this criterion is asked;
-    // the two may be deleted in any order.
+    // the two may be deleted in any order. Neither may already be an alternative of the other.
     void orComp(FindNameComp* other);
 
     // The same, and `other` lives as long as this criterion.

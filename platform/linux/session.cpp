@@ -1,6 +1,7 @@
 #include "vexo/session.h"
 
 #include <cstdlib>
+#include <memory>
 #include <new>
 #include <string>
 
@@ -73,11 +74,13 @@ struct WebMan::Impl {
     std::string newCookie;
 };
 
-WebMan::WebMan() : impl_(new Impl) {
-    impl_->remoteUser = environment("REMOTE_USER");
-    impl_->address = environment("REMOTE_ADDR");
-    impl_->offeredSid = vexo::findCookie(environment("HTTP_COOKIE"), kSessionCookie).value_or("");
-    impl_->secure = environment("HTTPS") == "on";
+WebMan::WebMan() {
+    auto impl = std::make_unique<Impl>();
+    impl->remoteUser = environment("REMOTE_USER");
+    impl->address = environment("REMOTE_ADDR");
+    impl->offeredSid = vexo::findCookie(environment("HTTP_COOKIE"), kSessionCookie).value_or("");
+    impl->secure = environment("HTTPS") == "on";
+    impl_ = impl.release();
 }
 
 WebMan::~WebMan() {

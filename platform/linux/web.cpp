@@ -2,6 +2,7 @@
 
 #include <strings.h>
 #include <unistd.h>
+#include <memory>
 
 #include <algorithm>
 #include <cerrno>
@@ -74,10 +75,12 @@ struct WebCGI::Impl {
     }
 };
 
-WebCGI::WebCGI() : impl_(new Impl) {
-    vexo::parseForm(environment("QUERY_STRING"), impl_->fields);
-    impl_->cookies = environment("HTTP_COOKIE");
-    if (isFormPost()) impl_->bodyRefused = !readForm(impl_->fields);
+WebCGI::WebCGI() {
+    auto impl = std::make_unique<Impl>();
+    vexo::parseForm(environment("QUERY_STRING"), impl->fields);
+    impl->cookies = environment("HTTP_COOKIE");
+    if (isFormPost()) impl->bodyRefused = !readForm(impl->fields);
+    impl_ = impl.release();
 }
 
 WebCGI::~WebCGI() {

@@ -83,6 +83,15 @@ std::unique_ptr<FindNameComp> createNames(const char* list, std::string (*toPatt
     return head;
 }
 
+// Both criteria or, when memory is out, none.
+void appendExtensions(Criteria& out, const char* value) {
+    auto files = typeCriterion("file");
+    auto names = createNames(value, extensionPattern);
+    out.reserve(out.size() + 2);
+    append(out, std::move(files));
+    append(out, std::move(names));
+}
+
 }  // namespace
 
 bool FindFactory::createFindOp(_tag_FIND_FIELD_ field, const char* op, const char* value, Criteria& out) {
@@ -98,8 +107,7 @@ bool FindFactory::createFindOp(_tag_FIND_FIELD_ field, const char* op, const cha
                 append(out, typeCriterion(op));
                 break;
             case FIND_EXTENSION:
-                append(out, typeCriterion("file"));
-                append(out, createNames(value, extensionPattern));
+                appendExtensions(out, value);
                 break;
             case FIND_OWNER:
                 if (VEXOUserGetUGID(value, &uid, &gid) < 0) return fail(ORV_ERR_USER);

@@ -236,6 +236,15 @@ TEST_F(CriteriaTest, Times) {
     }
 }
 
+TEST_F(CriteriaTest, NegativeNumbersCountAsTheLargest) {
+    Criteria below, after, junk;
+    ASSERT_TRUE(below.add(FIND_SIZE, "less", "-5") && after.add(FIND_MTIME, "after", "-5"));
+    EXPECT_TRUE(below.match("/f", statusOf(S_IFREG, INT64_MAX - 1)));
+    EXPECT_FALSE(after.match("/f", statusOf(S_IFREG)));
+    ASSERT_TRUE(junk.add(FIND_SIZE, "more", "many"));
+    EXPECT_TRUE(junk.match("/f", statusOf(S_IFREG, 1))) << "no number is 0";
+}
+
 TEST_F(CriteriaTest, OwnersAndGroups) {
     Criteria criteria;
     ASSERT_TRUE(criteria.add(3, nullptr, "alice"));

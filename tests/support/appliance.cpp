@@ -30,7 +30,7 @@ namespace {
 std::vector<LogLine> capturedLog;
 std::vector<std::string> announced;
 
-void capture(int priority, const char* format, va_list args) {
+__attribute__((format(printf, 2, 0))) void capture(int priority, const char* format, va_list args) {
     char* text = nullptr;
     if (vasprintf(&text, format, args) < 0) return;
     capturedLog.push_back({priority, text});
