@@ -85,10 +85,9 @@ std::unique_ptr<FindNameComp> createNames(const char* list, std::string (*toPatt
 
 // Both criteria or, when memory is out, none.
 void appendExtensions(Criteria& out, const char* value) {
-    auto files = typeCriterion("file");
     auto names = createNames(value, extensionPattern);
     out.reserve(out.size() + 2);
-    append(out, std::move(files));
+    append(out, typeCriterion("file"));
     append(out, std::move(names));
 }
 

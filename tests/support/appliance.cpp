@@ -255,7 +255,7 @@ void syslog(int priority, const char* format, ...) {
     va_end(args);
 }
 
-void __syslog_chk(int priority, int, const char* format, ...) {
+__attribute__((format(printf, 3, 4))) void __syslog_chk(int priority, int, const char* format, ...) {
     va_list args;
     va_start(args, format);
     support::capture(priority, format, args);
