@@ -1,6 +1,7 @@
 #include <unistd.h>
 
 #include <cstdio>
+#include <cstdlib>
 #include <string_view>
 
 #include "command.h"
@@ -29,6 +30,7 @@ int becomeUser(const std::string& user, bool needsHome) {
         fprintf(stderr, "orvelctl: not root: share rights are those of %s, file permissions those of uid %u\n",
                 terminalText(user).c_str(), geteuid());
     }
+    setenv("REMOTE_USER", user.c_str(), 1);  // whom "%U" in share definitions stands for
     return cgi::actAs(nullptr, user, needsHome);
 }
 
