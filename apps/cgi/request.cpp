@@ -65,6 +65,13 @@ Status admit(User& user) {
     return user.name.empty() ? Status::kNotLoggedIn : Status::kForbidden;
 }
 
+bool begin(Output& out, User& user) {
+    dropForwardedFor();
+    const Status admitted = admit(user);
+    if (admitted != Status::kOk) replyFailure(out, admitted, "", ORV_ERR_DENIED, "");
+    return admitted == Status::kOk;
+}
+
 int actAs(const char* sid, const std::string& user, bool needsHome) {
     if (needsHome) makeHome(user);
     OrvLibSetErr(ORV_ERR_NONE);

@@ -26,6 +26,9 @@ void dropForwardedFor();
 // `user` filled, kNotLoggedIn or kForbidden.
 Status admit(User& user);
 
+// Both of the above, with which every program for logged-in users begins. False once the refusal is written to `out`.
+bool begin(Output& out, User& user);
+
 // Takes on the user's identity for the rest of the process; `sid` may be null. His home folder is made first when
 // `needsHome`, as the folder that holds all homes is not his to write in. 0, or the library code of the failure; a
 // process that is still root's although the user is no administrator is one, 401.

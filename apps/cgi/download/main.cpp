@@ -191,10 +191,8 @@ std::optional<std::vector<std::string>> pathsOf(const VEXO::WebCGI& web) {
 
 void serve(Output& out) {
     std::signal(SIGPIPE, SIG_IGN);
-    dropForwardedFor();
     User user;
-    const Status admitted = admit(user);
-    if (admitted != Status::kOk) return replyFailure(out, admitted, "", ORV_ERR_DENIED, "");
+    if (!begin(out, user)) return;
     const VEXO::WebCGI web;
     const auto paths = pathsOf(web);
     if (web.BodyRefused() || !paths) {

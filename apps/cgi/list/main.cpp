@@ -57,10 +57,8 @@ std::optional<ListRequest> parse(const VEXO::WebCGI& web, const User& user) {
 }
 
 void serve(Output& out) {
-    dropForwardedFor();
     User user;
-    const Status admitted = admit(user);
-    if (admitted != Status::kOk) return replyFailure(out, admitted, "", ORV_ERR_DENIED, "");
+    if (!begin(out, user)) return;
 
     const VEXO::WebCGI web;
     if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");

@@ -68,10 +68,8 @@ int perform(Operation& operation, const Action& action) {
 
 void serve(Output& out) {
     umask(022);  // whatever the web server's is
-    dropForwardedFor();
     User user;
-    const Status admitted = admit(user);
-    if (admitted != Status::kOk) return replyFailure(out, admitted, "", ORV_ERR_DENIED, "");
+    if (!begin(out, user)) return;
 
     const VEXO::WebCGI web;
     if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");

@@ -200,10 +200,8 @@ void receive(const User& user, const VEXO::WebCGI& web, Outcome& outcome) {
 
 void serve(Output& out) {
     static_cast<void>(isCancelled());  // from here on
-    dropForwardedFor();
     User user;
-    const Status admitted = admit(user);
-    if (admitted != Status::kOk) return replyFailure(out, admitted, "", ORV_ERR_DENIED, "");
+    if (!begin(out, user)) return;
 
     const VEXO::WebCGI web;
     Outcome outcome;
