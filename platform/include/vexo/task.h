@@ -1,8 +1,10 @@
 // Records of background work: one JSON document a task, in a folder for each user, read by later requests.
 //
-// A task's name is bytes of any kind but "", "." and ".." and is at most 200 bytes long. Readers see a document whole,
-// before or after an update; one that is torn, larger than 1 MiB, nested deeper than 64 levels or not ours reads as a
-// task without properties. The store is central: its operations reach it as root in a process that may become root.
+// A task's name is bytes of any kind but "", "." and ".." and is at most 200 bytes long, "/", "%" and a leading "."
+// counted thrice. Readers see a document whole, before or after an update; one that is torn, larger than 1 MiB or
+// nested deeper than 64 levels reads as a task without properties that nobody works on any more, created when the file
+// was last written. A file that others could have written, and a link, is no task. The store is central: its operations
+// reach it as root in a process that may become root.
 #ifndef VEXO_TASK_H
 #define VEXO_TASK_H
 
@@ -30,10 +32,11 @@ class VEXO_API Task {
     Json::Value getProperty(const char* name) const;
     // Sets a property: inside an update when that ends, else at once. False when it could not be written.
     bool setProperty(const char* name, const Json::Value& value);
-    // Opens an update: the document is locked and read anew. False when it is gone or cannot be locked.
+    // Opens an update: the document is locked and read anew. False when it is gone or cannot be locked, and inside an
+    // update. Other updates wait for its end, so it is kept short and not left open over a fork.
     bool beginUpdate();
-    // Writes what was set since and unlocks. False, the old document whole, when there is no update or it could not be
-    // written.
+    // Writes what was set since and unlocks. False when there is no update or it could not be written (one that could
+    // not be read again is not): the document is then as before, here as well.
     bool endUpdate();
 
     // Notes the calling process, by number and start time, as the one that does the work.
@@ -70,11 +73,12 @@ class VEXO_API TaskMgr {
     bool hasTask(const char* name) const;
     // The task (the caller's to delete), null when there is none.
     Task* getTask(const char* name) const;
-    // A new task without properties, created now (the caller's to delete); null with the slot set: 0x0800 exists,
-    // 0x0D00 a bad name, 0x2900 no space, 0x8100 else.
+    // A new task without properties, created now, the calling process noted as the one that works on it until another
+    // attaches itself (the caller's to delete). Null with the slot set: 0x0800 exists, 0x0D00 a bad name, 0x2900 no
+    // space, 0x8100 else.
     Task* createTask(const char* name);
     // Appends the names of all tasks that begin with `prefix` to the array `names`, sorted. False when they cannot be
-    // listed.
+    // listed, `names` as it was.
     bool getAllTaskId(const char* prefix, Json::Value& names) const;
 
  private:
