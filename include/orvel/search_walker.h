@@ -1,0 +1,150 @@
+// A running search: chosen folders and criteria in, a task with its results out. Shares that the file index covers are
+// answered from it, the others are walked; both give the same records.
+//
+// Failures are reported by result and by the platform's error number, and logged at LOG_ERR where a function does not
+// say otherwise; the library code is not set here (look-ups of privileges and paths set theirs). Constructing an object
+// may throw std::bad_alloc and nothing else.
+#ifndef ORVEL_SEARCH_WALKER_H
+#define ORVEL_SEARCH_WALKER_H
+
+#include <map>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "orvel/directory_walker.h"
+#include "orvel/export.h"
+#include "orvel/file_info.h"
+#include "orvel/file_record.h"
+#include "orvel/search_criteria.h"
+
+namespace FileSearch {
+
+// The chosen folders by share name, in ascending byte order; within a share in the order of their insertion.
+class ORVEL_API SearchShareDirMap {
+ public:
+    using Shares = std::map<std::string, std::vector<PathInfo>>;
+
+    // Adds the folder at a share-relative path. A folder that the user may not list, and a recycle bin, is passed over:
+    // true. A folder of the user's home goes under "homes": share name, path ("/homes/<user>/...") and share root are
+    // those of that share. False when the path cannot be resolved, with the platform error of PathInfoFactory::create.
+    // Side effect: the current directory may become the folder.
+    bool insertDir(const char* user, const char* sid, const std::string& folder);
+
+    // The folders chosen in a share; null when there are none. Valid until the next insertion.
+    [[nodiscard]] const std::vector<PathInfo>* findShare(const std::string& share) const;
+    [[nodiscard]] const Shares& shares() const { return shares_; }
+
+ private:
+    Shares shares_;
+};
+
+// Adds a record of each entry it is called for to a result database. Entries that are not in a share, and records that
+// cannot be stored, are logged and left out: true. False only when memory is out.
+class ORVEL_API OrvSearchCallBack : public OrvDirectoryWalkerCallBack {
+ public:
+    explicit OrvSearchCallBack(const char* taskDatabasePath);
+    ~OrvSearchCallBack() override;
+    // `context`: the share's root; `extra`: the share's name (null counts as "").
+    bool operator()(const std::string& displayPath, const std::string& context, const std::string& realPath,
+                    const std::string& name, _tag_VEXOSTAT_& status, const std::string* extra) override;
+
+ private:
+    FileRecord record_;
+    std::string database_;
+};
+
+// Tests each entry against the criteria and hands what matches on to the result callback. `criteria` must outlive it;
+// without any, every entry matches. The result is whether there is a cancel flag, not its value (kept: the walker reads
+// the flag itself), so without one a walk ends, as failed, after its first entry; false, too, when memory is out.
+class ORVEL_API OrvSearchCompWalkerCB : public OrvDirectoryWalkerCallBack {
+ public:
+    OrvSearchCompWalkerCB(const char* taskDatabasePath, const std::vector<FindComp*>& criteria, int* cancelFlag);
+    ~OrvSearchCompWalkerCB() override;
+    bool operator()(const std::string& displayPath, const std::string& context, const std::string& realPath,
+                    const std::string& name, _tag_VEXOSTAT_& status, const std::string* extra) override;
+
+ private:
+    std::unique_ptr<OrvSearchCallBack> results_;
+    const std::vector<FindComp*>& criteria_;
+    int* cancelFlag_;
+};
+
+// Verdicts on folders of one share, each asked for once: what lies in a folder is seen only where a walk of the calling
+// identity, from one of the chosen folders down, would come by and read names and statuses.
+class ORVEL_API DirPrivilegeMap {
+ public:
+    // `shareRoot`: real path; `chosen`: the folders chosen in the share.
+    DirPrivilegeMap(const std::string& shareRoot, const std::vector<PathInfo>& chosen);
+    ~DirPrivilegeMap();
+    DirPrivilegeMap(const DirPrivilegeMap&) = delete;
+    DirPrivilegeMap& operator=(const DirPrivilegeMap&) = delete;
+
+    // `folder`: path within the share, "" for its root. False, too, when memory is out. Logs nothing.
+    bool findDirPrivilege(std::string_view folder);
+
+ private:
+    [[nodiscard]] bool canWalk(std::string_view folder) const;
+
+    int root_;                                         // descriptor of the share's root
+    std::map<std::string, bool, std::less<>> chosen_;  // paths within the share
+    std::map<std::string, bool, std::less<>> verdicts_;
+};
+
+// Constructed, initialised once, walked once. The cancel flag is the caller's and may be raised at any time: any
+// nonzero value ends the search between folders and shares, 1 (what callers set) also within a walk. A null flag is
+// accepted, see OrvSearchCompWalkerCB.
+class ORVEL_API OrvSearchWalker {
+ public:
+    OrvSearchWalker(const char* user, const char* sid, int* cancelFlag);
+    ~OrvSearchWalker();
+    OrvSearchWalker(const OrvSearchWalker&) = delete;
+    OrvSearchWalker& operator=(const OrvSearchWalker&) = delete;
+
+    // Resolves the folders (share-relative paths), creates the task and its database on the volume of the first share,
+    // and chains the criteria, which must be at least one and outlive the walker. False with the platform error 0x0D00
+    // (no criteria), 0x0300 (no folder is left to search), that of a path that cannot be resolved, or of the database.
+    bool init(const std::vector<std::string>& folders, const std::vector<FindComp*>& criteria);
+    // The first step of init: fills the folder map. True, too, when the cancel flag ended it early.
+    bool BuildDirMap(const std::vector<std::string>& folders);
+
+    // Searches. `accessTimeCriteria`: those of the criteria that ask for access times, which an index cannot know. True
+    // when everything was searched or the search was cancelled; the results so far stay. False with the platform error
+    // 0x0D00 (not initialised, or the index failed), 0x0600 or 0x0300 (a chosen folder is missing or denied; not
+    // logged), 0x8100 (another failure of its status), 0x8000 (the walk failed). A chosen path that is no folder is
+    // passed over. Side effect: the current directory.
+    bool Walk(const std::vector<FindATimeComp*>& accessTimeCriteria);
+    // Takes the matches of one indexed share from the file index; called by Walk.
+    bool WalkDB(const std::string& shareName, const std::vector<PathInfo>& folders,
+                const std::vector<FindATimeComp*>& accessTimeCriteria);
+
+    // True: only the entries directly in the chosen folders. False from the start.
+    void setSearchCurrentDir(bool currentOnly) { currentFolderOnly_ = currentOnly; }
+    // "" before a successful init; then what OrvSearchDBTask takes, until the walker ends.
+    const char* getDBTaskId() const { return taskId_.c_str(); }
+    const char* getDBVol() const { return volume_.c_str(); }
+
+ private:
+    [[nodiscard]] bool cancelled() const { return cancelFlag_ != nullptr && *cancelFlag_ != 0; }
+    [[nodiscard]] bool prepare(const std::vector<std::string>& folders, const std::vector<FindComp*>& criteria);
+    [[nodiscard]] bool makeTask(const std::vector<FindComp*>& criteria);
+    [[nodiscard]] bool search(const std::vector<FindATimeComp*>& accessTimeCriteria);
+    [[nodiscard]] bool walkShare(const std::vector<PathInfo>& folders);
+    [[nodiscard]] bool walkFolder(const PathInfo& folder);
+    [[nodiscard]] bool askIndex(const std::string& shareName, const std::vector<PathInfo>& folders,
+                                const std::vector<FindATimeComp*>& accessTimeCriteria);
+
+    std::unique_ptr<OrvDirectoryWalker> walker_;
+    std::unique_ptr<OrvSearchCompWalkerCB> callback_;
+    int* cancelFlag_;
+    bool currentFolderOnly_ = false;
+    std::string user_, sid_;
+    std::string taskId_, volume_, database_;
+    __tag_FI_SQL_COND* root_ = nullptr;
+    SearchShareDirMap map_;
+};
+
+}  // namespace FileSearch
+
+#endif
