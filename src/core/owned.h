@@ -3,12 +3,15 @@
 #define ORVEL_CORE_OWNED_H
 
 #include <dirent.h>
+#include <sqlite3.h>
 #include <unistd.h>
 
 #include <cstdlib>
 #include <memory>
 #include <utility>
 
+#include "vexo/database.h"
+#include "vexo/language.h"
 #include "vexo/list.h"
 #include "vexo/share.h"
 #include "vexo/user.h"
@@ -31,6 +34,11 @@ using GroupRecord = std::unique_ptr<VEXOGROUP, Releaser<VEXOGroupFree>>;
 using UserDatabase = std::unique_ptr<VEXOUSERDB, Releaser<VEXOUserDBClose>>;
 using GroupDatabase = std::unique_ptr<VEXOGROUPDB, Releaser<VEXOGroupDBClose>>;
 using StringList = std::unique_ptr<VLIBCSZLIST, Releaser<VLIBCSzListFree>>;
+using StringHash = std::unique_ptr<_VLIBCSZHASH_, Releaser<VLIBCSzHashFree>>;
+using StringBundle = std::unique_ptr<VEXOSTRINGS, Releaser<VexoCgiStringBundleClose>>;
+using DatabaseConnection = std::unique_ptr<VEXODB, Releaser<VEXODBClose>>;
+using DatabaseResult = std::unique_ptr<VEXODBRESULT, Releaser<VEXODBFreeResult>>;
+using SqlText = std::unique_ptr<char, Releaser<sqlite3_free>>;
 using CString = std::unique_ptr<char, Releaser<std::free>>;
 using Directory = std::unique_ptr<DIR, Releaser<closedir>>;
 

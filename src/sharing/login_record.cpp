@@ -1,0 +1,87 @@
+#include "sharing/login_record.h"
+
+#include <algorithm>
+#include <charconv>
+#include <climits>
+#include <cstdint>
+#include <initializer_list>
+
+namespace orvel {
+namespace {
+
+// What ends a field: the comma, and for the sixth and the eighth also the end of a line.
+enum class Ends { kComma, kCommaOrLineEnd };
+
+template <Ends ends>
+bool endsField(char c) {
+    return c == ',' || (ends == Ends::kCommaOrLineEnd && (c == '\r' || c == '\n'));
+}
+
+// Takes the next field off `rest` as strtok_r does: separators in front of it are skipped, so no field is empty, and
+// the one behind it is taken along. False when nothing is left.
+template <Ends ends>
+bool takeField(std::string_view& rest, std::string_view& field) {
+    const char* const stop = rest.data() + rest.size();
+    const char* first = rest.data();
+    while (first != stop && endsField<ends>(*first)) ++first;
+    const char* last = first;
+    while (last != stop && !endsField<ends>(*last)) ++last;
+    field = {first, static_cast<std::size_t>(last - first)};
+    rest = last == stop ? std::string_view() : std::string_view(last + 1, static_cast<std::size_t>(stop - last - 1));
+    return !field.empty();
+}
+
+bool parseLine(std::string_view line, LoginRecord& record) {
+    if (!takeField<Ends::kComma>(line, record.address) || !takeField<Ends::kComma>(line, record.user) ||
+        !takeField<Ends::kComma>(line, record.session) || !takeField<Ends::kComma>(line, record.loginTime) ||
+        !takeField<Ends::kComma>(line, record.accessTime) || !takeField<Ends::kCommaOrLineEnd>(line, record.position)) {
+        return false;
+    }
+    if (!takeField<Ends::kComma>(line, record.neverExpires)) record.neverExpires = "0";
+    if (!takeField<Ends::kCommaOrLineEnd>(line, record.link)) record.link = "0";
+    return true;
+}
+
+}  // namespace
+
+bool nextLoginRecord(std::string_view& text, std::size_t longest, LoginRecord& record) {
+    while (!text.empty()) {
+        const std::size_t end = std::min(text.find('\n'), text.size());
+        // A NUL ends what is read of a line.
+        const std::string_view line = text.substr(0, end);
+        text.remove_prefix(std::min(end + 1, text.size()));
+        if (line.size() <= longest && parseLine(line.substr(0, line.find('\0')), record)) return true;
+    }
+    return false;
+}
+
+void appendLoginRecord(const LoginRecord& record, std::string& out) {
+    for (const std::string_view field : {record.address, record.user, record.session, record.loginTime,
+                                         record.accessTime, record.position, record.neverExpires}) {
+        out += field;
+        out += ',';
+    }
+    out += record.link;
+    out += '\n';
+}
+
+long numberOf(std::string_view field) {
+    field.remove_prefix(std::min(field.find_first_not_of(" \t\n\v\f\r"), field.size()));
+    const bool negative = field.starts_with('-');
+    if (field.starts_with('+')) {
+        field.remove_prefix(1);
+        if (field.starts_with('-')) return 0;
+    }
+    long number = 0;
+    const auto [end, error] = std::from_chars(field.data(), field.data() + field.size(), number);
+    if (error == std::errc::result_out_of_range) return negative ? LONG_MIN : LONG_MAX;
+    return number;
+}
+
+bool isFresh(long accessTime, long now, long timeout) {
+    if (accessTime < 1) return false;
+    return static_cast<std::int32_t>(static_cast<std::uint32_t>(now) - static_cast<std::uint32_t>(accessTime)) <=
+           timeout;
+}
+
+}  // namespace orvel

@@ -1,0 +1,105 @@
+#include "sharing/record_file.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstddef>
+
+#include "vexo/line_file.h"
+#include "vexo/system_root.h"
+
+namespace orvel {
+namespace {
+
+constexpr std::size_t kLargest = std::size_t{16} << 20;  // what the platform's line functions read
+
+bool isOurs(const struct stat& status) {
+    return S_ISREG(status.st_mode) && status.st_nlink == 1 && (status.st_uid == 0 || status.st_uid == geteuid()) &&
+           (status.st_mode & (S_IWGRP | S_IWOTH)) == 0;
+}
+
+Descriptor openFile(const std::string& path, int flags, mode_t mode = 0) {
+    int fd = -1;
+    do {
+        fd = open(path.c_str(), flags | O_NOFOLLOW | O_CLOEXEC, mode);
+    } while (fd < 0 && errno == EINTR);
+    return Descriptor(fd);
+}
+
+// Opens the file for reading once it is known to be ours; empty with errno.
+Descriptor openRecord(const char* name, struct stat& status) {
+    Descriptor file = openFile(VEXO::SystemPath(name), O_RDONLY | O_NONBLOCK | O_NOCTTY);
+    if (!file || fstat(file.get(), &status) != 0) return Descriptor();
+    if (!isOurs(status)) {
+        errno = EACCES;
+        return Descriptor();
+    }
+    return file;
+}
+
+bool writeAll(int fd, std::string_view text) {
+    while (!text.empty()) {
+        const ssize_t written = write(fd, text.data(), text.size());
+        if (written >= 0) {
+            text.remove_prefix(static_cast<std::size_t>(written));
+        } else if (errno != EINTR) {
+            return false;
+        }
+    }
+    return true;
+}
+
+}  // namespace
+
+bool readRecordFile(const char* name, std::string& text) {
+    struct stat status {};
+    const Descriptor file = openRecord(name, status);
+    if (!file) return false;
+    if (static_cast<std::size_t>(status.st_size) > kLargest) {
+        errno = EFBIG;
+        return false;
+    }
+    text.resize(static_cast<std::size_t>(status.st_size));
+    std::size_t have = 0;
+    while (have < text.size()) {
+        const ssize_t got = read(file.get(), text.data() + have, text.size() - have);
+        if (got < 0 && errno == EINTR) continue;
+        if (got < 0) return false;
+        if (got == 0) break;
+        have += static_cast<std::size_t>(got);
+    }
+    text.resize(have);
+    return true;
+}
+
+bool protectRecordFile() {
+    struct stat status {};
+    const Descriptor file = openRecord(kRecordFile, status);
+    return file && fchmod(file.get(), 0600) == 0;
+}
+
+RecordRewrite::RecordRewrite() : path_(VEXO::SystemPath(kRecordTemporary)) {
+    constexpr int kFlags = O_WRONLY | O_CREAT | O_EXCL;
+    file_ = openFile(path_, kFlags, 0600);
+    if (!file_ && errno == EEXIST && unlink(path_.c_str()) == 0) file_ = openFile(path_, kFlags, 0600);
+    left_ = static_cast<bool>(file_);
+}
+
+RecordRewrite::~RecordRewrite() {
+    if (left_) unlink(path_.c_str());
+}
+
+bool RecordRewrite::protect() {
+    return fchmod(file_.get(), 0600) == 0;
+}
+
+bool RecordRewrite::commit(std::string_view text) {
+    if (!writeAll(file_.get(), text) || close(file_.release()) != 0) return false;
+    if (VLIBCSysRename(kRecordTemporary, kRecordFile) != 0) return false;
+    left_ = false;
+    return true;
+}
+
+}  // namespace orvel
