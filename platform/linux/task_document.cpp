@@ -11,11 +11,12 @@ namespace {
 
 constexpr unsigned kDeepest = 64;  // levels, the document's own included
 
-// Whether the reader takes it: `levels` is how many more levels there may be, and its numbers have a text.
+// Whether the reader takes it: it counts plain values as levels, too (`levels` may be there yet), and knows no number
+// that is not finite.
 bool isReadable(const Json::Value& value, unsigned levels) {
+    if (levels == 0) return false;
     if (value.isDouble()) return std::isfinite(value.asDouble());
     if (!value.isArray() && !value.isObject()) return true;
-    if (levels == 0) return false;
     for (const Json::Value& member : value) {
         if (!isReadable(member, levels - 1)) return false;
     }
