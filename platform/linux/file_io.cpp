@@ -18,6 +18,22 @@ bool fillAndRename(int fd, const std::string& temporary, const std::string& path
            rename(temporary.c_str(), path.c_str()) == 0;
 }
 
+std::string folderOf(const std::string& path) {
+    return path.substr(0, path.rfind('/') + 1);
+}
+
+bool moveIntoPlace(int fd, const std::string& temporary, const std::string& path, std::string_view text, mode_t mode) {
+    if (!fillAndRename(fd, temporary, path, text, mode)) {
+        const int savedErrno = errno;
+        unlink(temporary.c_str());
+        errno = savedErrno;
+        return false;
+    }
+    const std::string folder = folderOf(path);
+    synchroniseFolder(folder.empty() ? "." : folder);
+    return true;
+}
+
 bool isBefore(const timespec& a, const timespec& b) {
     return a.tv_sec != b.tv_sec ? a.tv_sec < b.tv_sec : a.tv_nsec < b.tv_nsec;
 }
@@ -77,18 +93,16 @@ bool readRegularFile(const std::string& path, size_t limit, std::string& text, F
 }
 
 bool replaceFile(const std::string& path, std::string_view text, mode_t mode) {
-    const std::string folder = path.substr(0, path.rfind('/') + 1);
-    std::string temporary = folder + ".new-XXXXXX";
+    std::string temporary = folderOf(path) + ".new-XXXXXX";
     const Descriptor fd(mkostemp(temporary.data(), O_CLOEXEC));
-    if (!fd) return false;
-    if (!fillAndRename(fd.get(), temporary, path, text, mode)) {
-        const int savedErrno = errno;
-        unlink(temporary.c_str());
-        errno = savedErrno;
-        return false;
-    }
-    synchroniseFolder(folder.empty() ? "." : folder);
-    return true;
+    return fd && moveIntoPlace(fd.get(), temporary, path, text, mode);
+}
+
+bool replaceFileAlone(const std::string& path, std::string_view text, mode_t mode) {
+    const std::string temporary = path + ".new";
+    unlink(temporary.c_str());
+    const Descriptor fd = openFile(temporary, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
+    return fd && moveIntoPlace(fd.get(), temporary, path, text, mode);
 }
 
 bool isTrusted(const struct stat& status, mode_t type) {
@@ -105,7 +119,11 @@ FileVersion::FileVersion(const struct stat& status)
 }
 
 bool FileVersion::isCurrent(const struct stat& status) const {
-    return settled_ && device_ == status.st_dev && inode_ == status.st_ino && size_ == status.st_size &&
+    return settled_ && isSame(status);
+}
+
+bool FileVersion::isSame(const struct stat& status) const {
+    return device_ == status.st_dev && inode_ == status.st_ino && size_ == status.st_size &&
            modified_.tv_sec == status.st_mtim.tv_sec && modified_.tv_nsec == status.st_mtim.tv_nsec;
 }
 

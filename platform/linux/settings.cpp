@@ -12,8 +12,9 @@
 
 #include "failure.h"
 #include "fault_gate.h"
-#include "file_io.h"
+#include "settings_file.h"
 #include "settings_text.h"
+#include "trusted_file.h"
 #include "vexo/system_root.h"
 #include "vexo/text.h"
 
@@ -22,27 +23,12 @@ namespace {
 constexpr const char* kSettings = "/etc/vexoinfo.conf";
 constexpr const char* kDefaults = "/etc.defaults/vexoinfo.conf";
 constexpr const char* kSeparator = "=";
-constexpr size_t kMaxFile = size_t{16} << 20;
 
 struct SettingsFile {
     vexo::FileVersion version;
     std::string text;
     std::vector<vexo::Setting> settings;  // views of `text`
 };
-
-// Fills the slot for a file that could not be read, as errno says.
-int failToRead() {
-    switch (errno) {
-        case ENOENT:
-        case ENOTDIR:
-            return vexo::fail(VEXO_ERR_FILE);
-        case EACCES:
-        case EPERM:
-            return vexo::fail(VEXO_ERR_DENIED);
-        default:
-            return vexo::fail(VEXO_ERR_GENERAL);
-    }
-}
 
 // The settings of an appliance file, remembered while the file is unchanged; null with errno when it cannot be read.
 // Good until the next call for the same file.
@@ -54,7 +40,7 @@ const std::vector<vexo::Setting>* load(const char* file) {
     if (stat(path.c_str(), &status) == 0 && entry.version.isCurrent(status)) return &entry.settings;
     entry = {};
     vexo::FileVersion version;
-    if (!vexo::readRegularFile(path, kMaxFile, entry.text, version)) return nullptr;
+    if (!vexo::readSettingsFile(path, entry.text, version)) return nullptr;
     entry.settings = vexo::parseSettings(entry.text, kSeparator);
     entry.version = version;  // last: a reading that memory cut short is not remembered
     return &entry.settings;
@@ -87,7 +73,7 @@ int VLIBCFileGetKeyValue(const char* file, const char* key, char* value, int siz
     if (file == nullptr || key == nullptr || value == nullptr || size <= 0) return vexo::fail(VEXO_ERR_PARAMETER);
     value[0] = '\0';
     const auto* settings = load(file);
-    if (settings == nullptr) return failToRead();
+    if (settings == nullptr) return vexo::fail(vexo::errorOfFile(errno));
     const auto found = vexo::findSetting(*settings, key);
     return found ? copyValue(*found, value, size) : 0;
 } catch (const std::bad_alloc&) {
@@ -114,7 +100,7 @@ int VLIBCFileGetKeys(const char* file, PVLIBCSZHASH* out, const char* sep) try {
     if (file == nullptr || out == nullptr || sep == nullptr || *sep == '\0') return vexo::fail(VEXO_ERR_PARAMETER);
     std::string text;
     vexo::FileVersion version;
-    if (!vexo::readRegularFile(VEXO::SystemPath(file), kMaxFile, text, version)) return failToRead();
+    if (!vexo::readSettingsFile(VEXO::SystemPath(file), text, version)) return vexo::fail(vexo::errorOfFile(errno));
     const auto settings = vexo::parseSettings(text, sep);
     if (*out != nullptr) return addAll(settings, out);
     PVLIBCSZHASH made = VLIBCSzHashAlloc(static_cast<int>(settings.size()));

@@ -3,6 +3,7 @@
 #define VEXO_LINUX_SETTINGS_TEXT_H
 
 #include <optional>
+#include <string>
 #include <string_view>
 #include <vector>
 
@@ -22,6 +23,13 @@ std::vector<Setting> parseSettings(std::string_view text, std::string_view separ
 
 // The value that counts; empty when there is no such key.
 std::optional<std::string_view> findSetting(const std::vector<Setting>& settings, std::string_view key);
+
+// The line of a setting, without its end; empty for a key or a value that would not read back as it is.
+std::optional<std::string> buildSettingLine(std::string_view key, std::string_view value, bool quoted);
+
+// `text` with every line of `key` taken out, but with `line`, unless that is empty, in the place of the first of them
+// (with its line end), or else as a line of its own at the end. Every other byte stays.
+std::string changeSetting(std::string_view text, std::string_view key, std::string_view line);
 
 }  // namespace vexo
 

@@ -1,0 +1,138 @@
+#include "settings_file.h"
+
+#include <algorithm>
+#include <charconv>
+
+#include "failure.h"
+#include "trusted_file.h"
+
+namespace vexo {
+namespace {
+
+constexpr size_t kMaxFile = size_t{16} << 20;
+constexpr int kMaxReadings = 10;
+
+std::string pendingPath(const std::string& path) {
+    return path + ".pending";
+}
+
+// The change that was begun and not ended, if any.
+std::optional<PendingChange> readPending(const std::string& path) {
+    const KeepErrno keep;
+    const Descriptor fd = openTrusted(pendingPath(path), O_RDONLY);
+    std::string text;
+    if (!fd || !readAll(fd.get(), text, 2 * kMaxFile + 32)) return {};
+    return parsePendingChange(text);
+}
+
+void forgetPending(const std::string& path) {
+    const KeepErrno keep;
+    unlink(pendingPath(path).c_str());
+}
+
+bool writeFromStart(int fd, std::string_view text) {
+    off_t at = 0;
+    while (!text.empty()) {
+        const ssize_t written = pwrite(fd, text.data(), text.size(), at);
+        if (written < 0 && errno == EINTR) continue;
+        if (written < 0) return false;
+        at += written;
+        text.remove_prefix(static_cast<size_t>(written));
+    }
+    return true;
+}
+
+// Padded with newlines, so that no reader sees the end of the old text behind the new one.
+bool overwrite(int fd, std::string_view text, size_t oldSize) {
+    std::string padded(text);
+    padded.resize(std::max(text.size(), oldSize), '\n');
+    return writeFromStart(fd, padded) && ftruncate(fd, static_cast<off_t>(text.size())) == 0 && fdatasync(fd) == 0;
+}
+
+// Makes the announced change; one that the disk does not hold is taken back.
+bool carryOut(int fd, const std::string& path, const PendingChange& change) {
+    const bool done = overwrite(fd, change.after, change.before.size());
+    const KeepErrno keep;
+    if (done || overwrite(fd, change.before, change.before.size())) forgetPending(path);
+    return done;
+}
+
+// Lays the change beside the file.
+bool announce(int fd, const std::string& path, const PendingChange& change) {
+    struct stat status {};
+    if (fstat(fd, &status) != 0) return false;
+    const std::string text = buildPendingChange(change.before, change.after);
+    if (replaceFileAlone(pendingPath(path), text, status.st_mode & 0777)) return true;
+    // A full disk must not keep anybody from taking a right away: what does not grow goes without.
+    return (errno == ENOSPC || errno == EDQUOT) && change.after.size() <= change.before.size();
+}
+
+Descriptor openToChange(const std::string& path, bool create) {
+    Descriptor fd = openTrusted(path, O_RDWR);
+    if (fd || errno != ENOENT || !create) return fd;
+    fd = openTrusted(path, O_RDWR | O_CREAT | O_EXCL, 0644);
+    if (!fd && errno == EEXIST) return openTrusted(path, O_RDWR);
+    if (fd && fchmod(fd.get(), 0644) != 0) fd.reset();  // whatever the umask
+    return fd;
+}
+
+}  // namespace
+
+std::string buildPendingChange(std::string_view before, std::string_view after) {
+    std::string text = std::to_string(before.size()) + ' ' + std::to_string(after.size()) + '\n';
+    return text.append(before).append(after);
+}
+
+std::optional<PendingChange> parsePendingChange(std::string_view text) {
+    size_t before = 0;
+    size_t after = 0;
+    const char* const end = text.data() + text.size();
+    const auto first = std::from_chars(text.data(), end, before);
+    if (first.ec != std::errc() || first.ptr == end || *first.ptr != ' ') return {};
+    const auto second = std::from_chars(first.ptr + 1, end, after);
+    if (second.ec != std::errc() || second.ptr == end || *second.ptr != '\n') return {};
+    text.remove_prefix(static_cast<size_t>(second.ptr + 1 - text.data()));
+    if (before > text.size() || after != text.size() - before) return {};
+    return PendingChange{std::string(text.substr(0, before)), std::string(text.substr(before))};
+}
+
+bool isOnTheWay(std::string_view text, const PendingChange& change) {
+    const auto& [before, after] = change;
+    const auto [shortest, longest] = std::minmax(before.size(), after.size());
+    if (text.size() < shortest || text.size() > longest) return false;
+    for (size_t i = 0; i < text.size(); ++i) {
+        const bool isOld = i < before.size() && text[i] == before[i];
+        if (!isOld && text[i] != (i < after.size() ? after[i] : '\n')) return false;
+    }
+    return true;
+}
+
+bool readSettingsFile(const std::string& path, std::string& text, FileVersion& version) {
+    for (int readings = 0; readings < kMaxReadings; ++readings) {
+        if (!readRegularFile(path, kMaxFile, text, version)) return false;
+        const auto change = readPending(path);
+        if (change && isOnTheWay(text, *change)) {
+            text = change->after;
+            return true;
+        }
+        struct stat status {};
+        if (stat(path.c_str(), &status) != 0 || version.isSame(status)) return true;
+    }
+    return true;
+}
+
+bool changeSettingsFile(const std::string& path, bool create,
+                        const std::function<std::string(std::string_view)>& edit) {
+    const Descriptor fd = openToChange(path, create);
+    std::string text;
+    if (!fd || !readAll(fd.get(), text, kMaxFile)) return false;
+    if (const auto unfinished = readPending(path); unfinished && isOnTheWay(text, *unfinished)) {
+        if (!carryOut(fd.get(), path, *unfinished)) return false;
+        text = unfinished->after;
+    }
+    const PendingChange change{text, edit(text)};
+    if (change.after == change.before) return true;
+    return announce(fd.get(), path, change) && carryOut(fd.get(), path, change);
+}
+
+}  // namespace vexo
