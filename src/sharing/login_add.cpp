@@ -45,7 +45,7 @@ void waitOneSecond() {
 // One identifier for `key`; the generator is seeded with the uptime, so within a second each draw is the same. False
 // when none could be made.
 bool draw(const std::string& key, Drawn& drawn) {
-    struct sysinfo system {};
+    struct sysinfo system = {};
     if (sysinfo(&system) != 0) {
         syslog(LOG_ERR, "%s (%d) sysinfo Failed, reason=%s", kSource, __LINE__, strerror(errno));
         return false;

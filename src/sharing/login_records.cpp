@@ -164,7 +164,7 @@ int checkLocked(const Check& check) {
 }
 
 int checkSession(Check& check) {
-    struct sysinfo system {};
+    struct sysinfo system = {};
     if (sysinfo(&system) != 0) {
         syslog(LOG_ERR, "%s (%d) sysinfo Failed, reason=%s", kSource, __LINE__, strerror(errno));
         return kRefused;

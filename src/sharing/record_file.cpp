@@ -54,7 +54,7 @@ bool writeAll(int fd, std::string_view text) {
 }  // namespace
 
 bool readRecordFile(const char* name, std::string& text) {
-    struct stat status {};
+    struct stat status = {};
     const Descriptor file = openRecord(name, status);
     if (!file) return false;
     if (static_cast<std::size_t>(status.st_size) > kLargest) {
@@ -75,7 +75,7 @@ bool readRecordFile(const char* name, std::string& text) {
 }
 
 bool protectRecordFile() {
-    struct stat status {};
+    struct stat status = {};
     const Descriptor file = openRecord(kRecordFile, status);
     return file && fchmod(file.get(), 0600) == 0;
 }

@@ -52,10 +52,9 @@ class LockedFile {
     [[nodiscard]] bool lock() const {
         while (flock(file_.get(), LOCK_EX) != 0 && errno == EINTR) {
         }
-        struct stat locked {
-        }, current{};
-        return fstat(file_.get(), &locked) != 0 || lstat(path_.c_str(), &current) != 0 ||
-               (locked.st_dev == current.st_dev && locked.st_ino == current.st_ino);
+        struct stat locked = {}, current = {};
+        return fstat(file_.get(), &locked) == 0 && lstat(path_.c_str(), &current) == 0 &&
+               locked.st_dev == current.st_dev && locked.st_ino == current.st_ino;
     }
 
     std::string path_;
