@@ -9,6 +9,8 @@
 
 #include <map>
 #include <memory>
+#include <optional>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -87,8 +89,8 @@ class ORVEL_API DirPrivilegeMap {
  private:
     [[nodiscard]] bool canWalk(std::string_view folder) const;
 
-    int root_;                                         // descriptor of the share's root
-    std::map<std::string, bool, std::less<>> chosen_;  // paths within the share
+    int root_;                                   // descriptor of the share's root
+    std::set<std::string, std::less<>> chosen_;  // paths within the share
     std::map<std::string, bool, std::less<>> verdicts_;
 };
 
@@ -139,7 +141,8 @@ class ORVEL_API OrvSearchWalker {
     std::unique_ptr<OrvSearchCompWalkerCB> callback_;
     int* cancelFlag_;
     bool currentFolderOnly_ = false;
-    std::string user_, sid_;
+    std::string user_;
+    std::optional<std::string> sid_;
     std::string taskId_, volume_, database_;
     __tag_FI_SQL_COND* root_ = nullptr;
     SearchShareDirMap map_;

@@ -1,0 +1,79 @@
+// A search in a share that the file index covers.
+#include <unistd.h>
+
+#include "core/boundary.h"
+#include "orvel/search_walker.h"
+#include "vexo/user.h"
+
+namespace FileSearch {
+namespace {
+
+constexpr unsigned kStatusFlags = VEXO_STAT_BASIC | VEXO_STAT_CREATE_TIME;
+
+// One node for each folder; each links to the one before it as an alternative, so the last is the head. A node that
+// means any depth, and not the folder's own entries alone, has a second one as its and-link.
+class PathConditions {
+ public:
+    PathConditions(const std::vector<PathInfo>& folders, bool currentOnly)
+        : folders_(folders.size()), below_(currentOnly ? 0 : folders.size()) {
+        __tag_FI_SQL_COND* previous = nullptr;
+        for (std::size_t i = 0; i < folders.size(); ++i) {
+            __tag_FI_SQL_COND* andNext = nullptr;
+            if (!currentOnly) {
+                andNext = &below_[i];
+                setSqlCond(*andNext, FI_COL_PATH, FI_OP_BELOW, folders[i].path, nullptr, nullptr);
+            }
+            setSqlCond(folders_[i], FI_COL_PATH, FI_OP_PATH, folders[i].path, andNext, previous);
+            previous = &folders_[i];
+        }
+    }
+    [[nodiscard]] const __tag_FI_SQL_COND* head() const { return &folders_.back(); }
+
+ private:
+    std::vector<__tag_FI_SQL_COND> folders_, below_;
+};
+
+// Access times change without the index knowing, so the file itself is asked.
+BOOL testAccessTime(__tag_FI_FILE_INFO_DATA* record, void* criteria) {
+    return orvel::guardedQuietly(0, [&] {
+        const std::string path = std::string(record->szShareRoot) + "/" + record->szPath;
+        _tag_VEXOSTAT_ status{};
+        if (VLIBCFileLStat(path.c_str(), kStatusFlags, &status) < 0) return 0;
+        record->accessed = status.st_access;
+        for (FindATimeComp* one : *static_cast<const std::vector<FindATimeComp*>*>(criteria)) {
+            if (!(*one)(record->szName, status)) return 0;
+        }
+        return 1;
+    });
+}
+
+BOOL testFolder(const char* folder, void* verdicts) {
+    return static_cast<DirPrivilegeMap*>(verdicts)->findDirPrivilege(folder) ? 1 : 0;
+}
+
+// An administrator's search runs as root, whom no folder is closed to; one that does not is asked like everybody.
+bool seesEverything(const std::string& user) {
+    return geteuid() == 0 && VEXOGroupIsAdminGroupMem(user.c_str()) == 1;
+}
+
+}  // namespace
+
+bool OrvSearchWalker::WalkDB(const std::string& shareName, const std::vector<PathInfo>& folders,
+                             const std::vector<FindATimeComp*>& accessTimeCriteria) {
+    return orvel::guardedQuietly(false, [&] { return askIndex(shareName, folders, accessTimeCriteria); });
+}
+
+bool OrvSearchWalker::askIndex(const std::string& shareName, const std::vector<PathInfo>& folders,
+                               const std::vector<FindATimeComp*>& accessTimeCriteria) {
+    if (folders.empty()) return true;
+    const PathConditions paths(folders, currentFolderOnly_);
+    DirPrivilegeMap verdicts(folders.front().shareRoot, folders);
+    const bool asksTimes = !accessTimeCriteria.empty();
+    const bool asksFolders = !seesEverything(user_);
+    std::vector<FindATimeComp*> times = accessTimeCriteria;
+    return FILEIDXResultGetAndTableGen(shareName.c_str(), paths.head(), root_, database_.c_str(),
+                                       asksTimes ? testAccessTime : nullptr, &times, cancelFlag_,
+                                       asksFolders ? testFolder : nullptr, &verdicts) >= 0;
+}
+
+}  // namespace FileSearch

@@ -1,0 +1,48 @@
+#include "search/record_address.h"
+
+#include <syslog.h>
+
+#include <string_view>
+
+#include "orvel/search_criteria.h"
+#include "orvel/share_path.h"
+#include "search/share_address.h"
+#include "util/printable.h"
+
+namespace orvel {
+namespace {
+
+constexpr const char* kSource = "orvelsearch";
+constexpr std::string_view kAnythingBelow = "/*";
+
+}  // namespace
+
+bool deriveAddress(const std::string& share, const std::string& realPath, RecordAddress& out) {
+    std::size_t begin = 0;
+    out.share = IsDirUserHome(share, nullptr) ? kHomesShare : share;
+    const FileSearch::PathFault fault = splitRealPath(realPath, begin);
+    if (fault == FileSearch::PathFault::kNoShare) {
+        syslog(LOG_ERR, "%s:%d Fail to find the share name %s from %s", kSource, __LINE__, printable(out.share).c_str(),
+               printable(realPath).c_str());
+        return false;
+    }
+    // A path that a condition would cut names another record.
+    const std::size_t room = sizeof(__tag_FI_SQL_COND::szValue) - kAnythingBelow.size();
+    if (fault == FileSearch::PathFault::kNoPath || realPath.size() - begin >= room) {
+        syslog(LOG_ERR, "%s:%d Fail to find the path name %s", kSource, __LINE__, printable(realPath).c_str());
+        return false;
+    }
+    out.realPath = realPath;
+    out.shareRoot = realPath.substr(0, begin - 1);
+    out.within = realPath.substr(begin);
+    return true;
+}
+
+RecordCondition::RecordCondition(const RecordAddress& address, Reach reach) {
+    FileSearch::setSqlCond(share_, FI_COL_SHARE, FI_OP_EQUAL, address.share, nullptr, nullptr);
+    const bool itself = reach == Reach::kItself;
+    FileSearch::setSqlCond(path_, FI_COL_PATH, itself ? FI_OP_EQUAL : FI_OP_PATH,
+                           itself ? address.within : address.within + std::string(kAnythingBelow), &share_, nullptr);
+}
+
+}  // namespace orvel
