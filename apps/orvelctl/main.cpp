@@ -22,6 +22,9 @@ constexpr Command kCommands[] = {
      "       [--additional WORDS] [--pattern P] [--type dir|file|all]   what a folder holds; \"/\" for the shares"},
     {"why", orvel::ctl::why,
      "why PATH --user U                                  which rule decides what U may do there"},
+    {"index", orvel::ctl::index,
+     "index build|update|drop|status SHARE [--full]      the file index of a share; update compares the folders that\n"
+     "       changed, --full all of them: what changed within a file does not show on its folder"},
     {"demo", orvel::ctl::demo,
      "demo FOLDER [--keep | --remove]                    makes a demo appliance, keeps one that is whole, removes one"},
 };

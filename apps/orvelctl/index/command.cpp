@@ -1,0 +1,158 @@
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <cstdio>
+#include <ctime>
+#include <memory>
+#include <stdexcept>
+
+#include "arguments.h"
+#include "command.h"
+#include "index/indexer.h"
+#include "vexo/error.h"
+#include "vexo/filesystem.h"
+#include "vexo/index.h"
+#include "vexo/share.h"
+
+namespace orvel::ctl {
+namespace {
+
+int stopRequested = 0;  // a plain int: the walker reads it as one
+
+void stopOnSignals() {
+    struct sigaction action = {};
+    action.sa_handler = [](int) { stopRequested = 1; };
+    sigemptyset(&action.sa_mask);
+    for (const int signal : {SIGINT, SIGTERM, SIGHUP}) sigaction(signal, &action, nullptr);
+}
+
+struct ReleaseShare {
+    void operator()(SDK::Share* share) const { SDK::Share::Release(share); }
+};
+using Share = std::unique_ptr<SDK::Share, ReleaseShare>;
+
+[[noreturn]] void refuse(const std::string& share, const char* reason) {
+    throw std::runtime_error(terminalText(share) + ": " + reason);
+}
+
+const char* platformReason() {
+    switch (VLIBCErrGet()) {
+        case VEXO_ERR_SHARE_MISSING:
+            return "no such share";
+        case VEXO_ERR_MISSING:
+            return "has no index to update";
+        case VEXO_ERR_EXISTS:
+            return "another process is working on its index";
+        case VEXO_ERR_NO_SPACE:
+            return "no space is left for its index";
+        default:
+            return "its index cannot be used";
+    }
+}
+
+std::string timeText(int64_t seconds) {
+    const auto time = static_cast<time_t>(seconds);
+    tm parts = {};
+    char text[32];
+    if (localtime_r(&time, &parts) == nullptr || strftime(text, sizeof text, "%Y-%m-%d %H:%M:%S", &parts) == 0)
+        return "?";
+    return text;
+}
+
+int printStatus(const SDK::Share& share) {
+    FIINDEXSTATUS found = {};
+    if (FILEIDXIndexStatus(share.GetName(), &found) < 0) {
+        if (VLIBCErrGet() != VEXO_ERR_MISSING) refuse(share.GetName(), platformReason());
+        printf("%s: no index\n", terminalText(share.GetName()).c_str());
+        return 1;
+    }
+    printf("%s: %llu entries, %llu of them folders, in %lld KiB; built %s, updated %s\n",
+           terminalText(share.GetName()).c_str(), found.records, found.folders,
+           static_cast<long long>(found.bytes / 1024), timeText(found.built).c_str(), timeText(found.updated).c_str());
+    if (FILEIDXIsIndexEnable(share.GetName()) != 1) printf("not used: the share's option vexo:index is off\n");
+    return 0;
+}
+
+int drop(const SDK::Share& share) {
+    if (FILEIDXIndexDrop(share.GetName()) < 0) refuse(share.GetName(), platformReason());
+    printf("%s: index removed\n", terminalText(share.GetName()).c_str());
+    return 0;
+}
+
+// The platform's work on the index of a share: given up unless it is done.
+class Work {
+ public:
+    Work(const SDK::Share& share, int mode) : share_(share.GetName()) {
+        char path[4096];
+        if (FILEIDXIndexBegin(share_.c_str(), mode, path, sizeof path) < 0) refuse(share_, platformReason());
+        open_ = true;
+        database_ = path;
+    }
+    ~Work() {
+        if (open_) FILEIDXIndexEnd(share_.c_str(), 0);
+    }
+    Work(const Work&) = delete;
+    Work& operator=(const Work&) = delete;
+
+    [[nodiscard]] const std::string& database() const { return database_; }
+    void done() {
+        open_ = false;
+        if (FILEIDXIndexEnd(share_.c_str(), 1) < 0) refuse(share_, platformReason());
+    }
+
+ private:
+    std::string share_, database_;
+    bool open_ = false;
+};
+
+void print(const SDK::Share& share, const IndexCounts& counts) {
+    printf("%s: looked at %llu folders, compared %llu; %llu entries added, %llu changed, %llu removed\n",
+           terminalText(share.GetName()).c_str(), counts.folders, counts.compared, counts.added, counts.changed,
+           counts.removed);
+}
+
+int work(const SDK::Share& share, bool build, bool everything) {
+    const std::string root = share.GetFullPath();
+    if (VEXOFSIsRemoteFS(VEXOGetFSType(root.c_str(), 0)) == 1) refuse(share.GetName(), "lies on a network mount");
+    const ShareFiles files(root, &stopRequested);
+    _tag_VEXOSTAT_ status;
+    // A volume that is not mounted must not empty the index.
+    if (files.status("", status) != Presence::kThere || !S_ISDIR(status.st_mode)) {
+        refuse(share.GetName(), "its folder is not there");
+    }
+    stopOnSignals();
+    Work work(share, build ? FI_INDEX_BUILD : FI_INDEX_UPDATE);
+    IndexRows rows(root, share.GetName(), work.database());
+    IndexCounts counts;
+    {
+        Indexer indexer(files, rows, &stopRequested);
+        if (!(build ? indexer.build() : indexer.update(everything))) {
+            refuse(share.GetName(),
+                   build ? "broken off; the index is what it was before" : "broken off; the next update goes on");
+        }
+        counts = indexer.counts();
+    }
+    work.done();
+    if (build) return printStatus(share);
+    print(share, counts);
+    return 0;
+}
+
+}  // namespace
+
+int index(const std::vector<std::string>& words) {
+    const Arguments arguments(words, {}, {"--full"}, 2);
+    const std::string& action = arguments.position(0);
+    const bool build = action == "build", update = action == "update";
+    if (!build && !update && action != "drop" && action != "status") throw UsageError("unknown action " + action);
+    if (arguments.has("--full") && !update) throw UsageError("--full goes with update");
+    if (geteuid() != 0 && action != "status") throw std::runtime_error("only root sees all that an index must hold");
+    const Share share(SDK::Share::LoadShare(arguments.position(1).c_str()));
+    if (share == nullptr) refuse(arguments.position(1), "no such share");
+    if (action == "status") return printStatus(*share);
+    if (action == "drop") return drop(*share);
+    return work(*share, build, arguments.has("--full"));
+}
+
+}  // namespace orvel::ctl

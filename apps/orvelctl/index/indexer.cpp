@@ -1,0 +1,201 @@
+#include "index/indexer.h"
+
+#include <unistd.h>
+
+#include <ctime>
+#include <utility>
+
+#include "index/folder_state.h"
+
+namespace orvel::ctl {
+namespace {
+
+constexpr int kSettlingRounds = 2;
+constexpr useconds_t kNap = 50000;
+
+// The clock that times of files are taken from.
+int64_t kernelClock() {
+    timespec now = {};
+    clock_gettime(CLOCK_REALTIME_COARSE, &now);
+    return now.tv_sec;
+}
+
+FolderTimes timesOf(const _tag_VEXOSTAT_& status) {
+    return {status.st_modify, status.st_change, status.st_create};
+}
+
+std::string parentOf(const std::string& path) {
+    const size_t slash = path.rfind('/');
+    return slash == std::string::npos ? "" : path.substr(0, slash);
+}
+
+std::string within(const std::string& folder, const std::string& name) {
+    return folder.empty() ? name : folder + "/" + name;
+}
+
+}  // namespace
+
+std::vector<Entry> Indexer::list(const std::string& folder) {
+    std::vector<Entry> entries = files_.list(folder);
+    progress_.at("/" + folder, entries.size());
+    return entries;
+}
+
+void Indexer::add(const Entry& entry) {
+    rows_.insert(entry);
+    ++counts_.added;
+}
+
+// The new folder with its files added, its folders not yet.
+Indexer::NewFolder Indexer::read(Entry folder) {
+    NewFolder made = {std::move(folder), kernelClock(), {}};
+    for (Entry& entry : list(made.own.path)) {
+        if (entry.isFolder()) {
+            made.inside.push_back(std::move(entry));
+        } else {
+            add(entry);
+        }
+    }
+    return made;
+}
+
+// Each folder behind what lies in it.
+void Indexer::addTree(Entry top) {
+    std::vector<NewFolder> way;
+    way.push_back(read(std::move(top)));
+    while (!way.empty() && !stopped()) {
+        NewFolder& last = way.back();
+        if (!last.inside.empty()) {
+            Entry next = std::move(last.inside.back());
+            last.inside.pop_back();
+            way.push_back(read(std::move(next)));
+            continue;
+        }
+        if (!last.own.path.empty()) {
+            writeOwnRow(std::move(last.own), last.seen);
+            ++counts_.added;
+        }
+        way.pop_back();
+    }
+}
+
+void Indexer::writeOwnRow(Entry folder, int64_t seen) {
+    if (mayChangeUnseen(timesOf(folder.status), seen)) {
+        unsettled_.insert(folder.path);
+        --folder.status.st_change;
+    }
+    rows_.remove(folder.path);
+    rows_.insert(folder);
+}
+
+void Indexer::removeTree(const std::string& path, bool isFolder) {
+    if (isFolder) {
+        counts_.removed += rows_.removeBelow(path);
+        const std::string prefix = path + "/";
+        auto below = known_.lower_bound(prefix);
+        while (below != known_.end() && below->first.starts_with(prefix)) below = known_.erase(below);
+        known_.erase(path);
+    }
+    rows_.remove(path);
+    ++counts_.removed;
+}
+
+// Folders that the index has come up on their own.
+void Indexer::compareEntry(const Entry& entry, const Row* row) {
+    if (row != nullptr && row->isFolder != entry.isFolder()) {
+        removeTree(entry.path, row->isFolder);
+        row = nullptr;
+    }
+    if (row == nullptr) {
+        if (!entry.isFolder()) return add(entry);
+        rows_.removeBelow(entry.path);  // what a work broken off has left
+        return addTree(entry);
+    }
+    if (entry.isFolder() || rows_.rowOf(entry) == *row) return;
+    rows_.remove(entry.path);
+    rows_.insert(entry);
+    ++counts_.changed;
+}
+
+void Indexer::compare(const std::string& folder) {
+    std::map<std::string, Row> rows = rows_.in(folder);
+    const std::vector<Entry> entries = list(folder);
+    for (const Entry& entry : entries) {
+        if (stopped()) return;
+        const auto row = rows.find(entry.name);
+        compareEntry(entry, row != rows.end() ? &row->second : nullptr);
+        if (row != rows.end()) rows.erase(row);
+    }
+    if (stopped()) return;  // the listing may have been cut short
+    for (const auto& [name, row] : rows) {
+        const std::string path = within(folder, name);
+        _tag_VEXOSTAT_ status;
+        // A folder that could not be read has lost nothing.
+        const bool gone = files_.isRemoteMount(path) || files_.status(path, status) == Presence::kGone;
+        if (gone) removeTree(path, row.isFolder);
+    }
+}
+
+void Indexer::visit(const std::string& folder, const Row& stored, bool everything) {
+    ++counts_.folders;
+    if (files_.isRemoteMount(folder)) return removeTree(folder, true);
+    const std::string parent = parentOf(folder);
+    Entry own = {folder.substr(parent.empty() ? 0 : parent.size() + 1), folder, {}};
+    const int64_t seen = kernelClock();
+    // One that went this moment has changed the folder above, which the next update sees.
+    if (files_.status(folder, own.status) != Presence::kThere || !own.isFolder()) return;
+
+    const FolderState state = judgeFolder(stored.times, timesOf(own.status), changed_.contains(parent));
+    if (state != FolderState::kSame) changed_.insert(folder);
+    if (state == FolderState::kReplaced || replaced_.contains(parent)) replaced_.insert(folder);
+    if (state == FolderState::kSame && !replaced_.contains(folder) && !everything) return;
+    ++counts_.compared;
+    compare(folder);
+    if (stopped()) return;
+    const bool differs = !(rows_.rowOf(own) == stored);
+    if (differs) ++counts_.changed;
+    if (differs || mayChangeUnseen(timesOf(own.status), seen)) writeOwnRow(std::move(own), seen);
+}
+
+// Until a change could no longer fall into the second of an earlier one.
+void Indexer::rest() {
+    for (const int64_t start = kernelClock(); kernelClock() < start + kCoarsestTime && !stopped();) usleep(kNap);
+}
+
+// Compares once more the folders that changed so lately. One that goes on changing is left to the next update.
+void Indexer::settle() {
+    for (int round = 0; round < kSettlingRounds && !unsettled_.empty() && !stopped(); ++round) {
+        rest();
+        for (const std::string& folder : std::exchange(unsettled_, {})) {
+            Entry own = {folder.substr(folder.rfind('/') + 1), folder, {}};
+            const int64_t seen = kernelClock();
+            if (stopped() || files_.status(folder, own.status) != Presence::kThere || !own.isFolder()) continue;
+            compare(folder);
+            if (!stopped()) writeOwnRow(std::move(own), seen);
+        }
+    }
+}
+
+bool Indexer::build() {
+    addTree({});
+    settle();
+    return !stopped();
+}
+
+bool Indexer::update(bool everything) {
+    known_ = rows_.folders();
+    // The root has no row that could tell whether it changed.
+    changed_.insert("");
+    ++counts_.folders;
+    ++counts_.compared;
+    compare("");
+    for (auto next = known_.begin(); next != known_.end() && !stopped();) {
+        const auto [folder, stored] = *next;
+        visit(folder, stored, everything);
+        next = known_.upper_bound(folder);
+    }
+    settle();
+    return !stopped();
+}
+
+}  // namespace orvel::ctl

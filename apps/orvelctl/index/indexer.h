@@ -1,0 +1,71 @@
+// Brings the index of one share in step with its files.
+#ifndef ORVEL_ORVELCTL_INDEX_INDEXER_H
+#define ORVEL_ORVELCTL_INDEX_INDEXER_H
+
+#include <map>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "index/index_rows.h"
+#include "index/progress.h"
+#include "index/share_files.h"
+
+namespace orvel::ctl {
+
+struct IndexCounts {
+    unsigned long long folders = 0;   // looked at
+    unsigned long long compared = 0;  // of these, entry by entry
+    unsigned long long added = 0;
+    unsigned long long changed = 0;
+    unsigned long long removed = 0;
+};
+
+// A folder's own row is written behind everything below it, and tells a time that is not the folder's as long as the
+// folder may change without showing it: where the work is broken off, the next update goes on.
+class Indexer {
+ public:
+    // A nonzero `*stop` breaks the work off.
+    Indexer(const ShareFiles& files, IndexRows& rows, const int* stop) : files_(files), rows_(rows), stop_(stop) {}
+
+    // Fills an empty index. False when it was broken off; throws what IndexRows throws.
+    bool build();
+    // Looks at every folder of the index and compares those that changed, with `everything` all of them.
+    bool update(bool everything);
+    [[nodiscard]] const IndexCounts& counts() const { return counts_; }
+
+ private:
+    // A folder that the index does not have yet.
+    struct NewFolder {
+        Entry own;
+        int64_t seen;               // kernel's clock before it was listed
+        std::vector<Entry> inside;  // its folders that are still to be read
+    };
+
+    [[nodiscard]] bool stopped() const { return *stop_ != 0; }
+    std::vector<Entry> list(const std::string& folder);
+    NewFolder read(Entry folder);
+    void addTree(Entry top);
+    void add(const Entry& entry);
+    void writeOwnRow(Entry folder, int64_t seen);
+    void removeTree(const std::string& path, bool isFolder);
+    void compareEntry(const Entry& entry, const Row* row);
+    void compare(const std::string& folder);
+    void visit(const std::string& folder, const Row& stored, bool everything);
+    void settle();
+    void rest();
+
+    const ShareFiles& files_;
+    IndexRows& rows_;
+    const int* stop_;
+    Progress progress_;
+    IndexCounts counts_;
+    std::map<std::string, Row> known_;  // the folders of the index
+    std::set<std::string> changed_;     // folders that did change
+    std::set<std::string> replaced_;    // all folders below these are compared
+    std::set<std::string> unsettled_;   // folders that may change without showing it
+};
+
+}  // namespace orvel::ctl
+
+#endif

@@ -1,0 +1,48 @@
+// The files of a share as an index takes them.
+#ifndef ORVEL_ORVELCTL_INDEX_SHARE_FILES_H
+#define ORVEL_ORVELCTL_INDEX_SHARE_FILES_H
+
+#include <string>
+#include <vector>
+
+#include "vexo/stat.h"
+
+namespace orvel::ctl {
+
+struct Entry {
+    std::string name;
+    std::string path;  // within the share
+    _tag_VEXOSTAT_ status;
+
+    [[nodiscard]] bool isFolder() const;
+};
+
+// Whether a file or folder is there.
+enum class Presence { kGone, kThere, kUnknown /* an error keeps from telling */ };
+
+class ShareFiles {
+ public:
+    // `root`: real path of the share's root. A nonzero `*stop` ends a listing early.
+    ShareFiles(std::string root, int* stop) : root_(std::move(root)), stop_(stop) {}
+
+    [[nodiscard]] const std::string& root() const { return root_; }
+    [[nodiscard]] std::string realPath(const std::string& path) const {
+        return path.empty() ? root_ : root_ + "/" + path;
+    }
+
+    // What a walk reports of one folder ("" is the root), without network mounts and without paths too long to be
+    // asked for. Empty when it cannot be read.
+    [[nodiscard]] std::vector<Entry> list(const std::string& folder) const;
+    // The status of a file or folder.
+    [[nodiscard]] Presence status(const std::string& path, _tag_VEXOSTAT_& status) const;
+    // Known from the mount table alone: the server may be dead.
+    [[nodiscard]] bool isRemoteMount(const std::string& path) const;
+
+ private:
+    std::string root_;
+    int* stop_;
+};
+
+}  // namespace orvel::ctl
+
+#endif
