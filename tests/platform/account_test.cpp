@@ -4,11 +4,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <ctime>
 #include <filesystem>
-#include <memory>
 #include <string>
 #include <vector>
 
@@ -28,173 +26,179 @@ using support::kBobUid;
 using support::kCarolUid;
 using support::kUsersGid;
 
-struct Release {
-    void operator()(PVEXOUSER user) const { VEXOUserFree(user); }
-    void operator()(PVEXOGROUP group) const { VEXOGroupFree(group); }
-    void operator()(PVLIBCSZLIST list) const { VLIBCSzListFree(list); }
-};
-using User = std::unique_ptr<VEXOUSER, Release>;
-using List = std::unique_ptr<VLIBCSZLIST, Release>;
+// "name uid gid type home expiry", or "" with the platform error.
+std::string textOf(int result, PVEXOUSER user) {
+    EXPECT_EQ(result >= 0, user != nullptr);
+    if (user == nullptr) return "";
+    std::string text = user->szName;
+    for (const long number : {long{user->uid}, long{user->gid}, long{user->authType}}) {
+        text += ' ' + std::to_string(number);
+    }
+    text += ' ' + std::string(user->szHome) + ' ' + std::to_string(user->expiry);
+    VEXOUserFree(user);
+    return text;
+}
 
-User userOf(const std::string& name) {
+std::string userOf(const std::string& name) {
     PVEXOUSER user = nullptr;
     const int result = VEXOUserGet(name.c_str(), &user);
-    EXPECT_EQ(result >= 0, user != nullptr);
-    return User(user);
+    return textOf(result, user);
 }
 
-std::string nameOf(uid_t uid) {
+std::string userOf(uid_t uid) {
     PVEXOUSER user = nullptr;
     const int result = VEXOUserGetByUID(uid, &user);
-    EXPECT_EQ(result >= 0, user != nullptr);
-    const User record(user);
-    return user == nullptr ? std::string() : user->szName;
+    return textOf(result, user);
 }
 
-std::string groupNameOf(gid_t gid) {
+std::string groupOf(gid_t gid) {
     PVEXOGROUP group = nullptr;
     const int result = VEXOGroupGetByGID(gid, &group);
     EXPECT_EQ(result >= 0, group != nullptr);
-    const std::unique_ptr<VEXOGROUP, Release> record(group);
-    return group == nullptr ? std::string() : group->szName;
+    std::string name = group == nullptr ? "" : group->szName;
+    VEXOGroupFree(group);
+    return name;
 }
 
-std::vector<std::string> groupsOf(const char* user) {
+std::string groupsOf(const char* user) {
     PVLIBCSZLIST list = VLIBCSzListAlloc(512);
     const int count = VEXOGroupInfoGetgroupList(user, &list, 0);
-    const List owner(list);
-    if (count < 0) return {"failure"};
-    std::vector<std::string> out;
-    out.reserve(static_cast<size_t>(list->nItem));
-    for (int i = 0; i < list->nItem; ++i) out.emplace_back(VLIBCSzListGet(list, i));
-    EXPECT_EQ(count, list->nItem);
+    std::string out = count < 0 ? "failure" : std::to_string(count) + ":";
+    for (int i = 0; i < count; ++i) out += ' ' + std::string(VLIBCSzListGet(list, i));
+    VLIBCSzListFree(list);
     return out;
 }
 
-bool isIn(const char* user, const std::vector<std::string>& entries) {
+// "name id ..." of one kind, by the operations of users or of groups.
+template <class Record, class Open, class Next, class Free, class Close>
+std::string namesOf(AUTH_TYPE type, Open open, Next next, Free release, Close close) {
+    const auto db = open();
+    if (db == nullptr) return "failure";
+    std::string names;
+    Record* record = nullptr;
+    while (next(db, &record, type, 1) == 0)
+        names += std::string(record->szName) + ' ' + std::to_string(record->gid) + ' ';
+    release(record);
+    close(db);
+    return names;
+}
+
+std::string usersOf(AUTH_TYPE type) {
+    return namesOf<VEXOUSER>(type, VEXOUserDBOpen, VEXOUserDBGetByCursor, VEXOUserFree, VEXOUserDBClose);
+}
+
+std::string groupsOf(AUTH_TYPE type) {
+    return namesOf<VEXOGROUP>(type, VEXOGroupDBOpen, VEXOGroupDBGetByCursor, VEXOGroupFree, VEXOGroupDBClose);
+}
+
+bool isIn(const char* user, const std::vector<const char*>& entries) {
     PVLIBCSZLIST list = VLIBCSzListAlloc(0);
-    for (const std::string& entry : entries) VLIBCSzListPush(&list, entry.c_str());
-    const List owner(list);
-    return BlSDKUserIsInList(user, list) != 0;
+    for (const char* entry : entries) VLIBCSzListPush(&list, entry);
+    const bool in = BlSDKUserIsInList(user, list) != 0;
+    VLIBCSzListFree(list);
+    return in;
 }
 
 class AccountTest : public support::ApplianceTest {};
 
 TEST_F(AccountTest, RecordsOfEveryKind) {
+    const std::string longest(511, 'y');
     addUser("DOM\\dora", 20010, 20100);
     addUser("dan@example.com", 20011, 20101);
+    for (const char* name : {"a/b", "..", "\\dora", "DOM\\.."}) addUser(name, 20020, 1);
+    addUser(longest + "y", 20024, 1);
+    addUser(longest, 20025, 1);
+    addUser("alice", 20040, 1);  // the first record of a name or id counts
+    addUser("twin", kBobUid, 1);
+    addGroup("DOM\\staff", 20160, {});
     writeRootFile("/etc/shadow", "alice:x:1:0:9:7::20000:\nbob:x:1:0:9:7:::\nDOM\\dora:x:::::::\n");
     const std::string homes = shareRoot("homes");
-    struct Case {
+    const struct {
         const char* name;
         uid_t uid;
         gid_t gid;
-        int type;
-        std::string home;
-        long expiry;
+        std::string rest;
+    } cases[] = {
+        {"alice", kAliceUid, kUsersGid, "0 " + homes + "/alice 20000"},
+        {"bob", kBobUid, kUsersGid, "0 " + homes + "/bob -1"},
+        {"carol", kCarolUid, kUsersGid, "0 " + homes + "/carol -1"},
+        {"DOM\\dora", 20010, 20100, "1 " + homes + "/@DOM/dora -1"},
+        {"dan@example.com", 20011, 20101, "2 " + homes + "/dan@example.com -1"},
     };
-    const Case cases[] = {
-        {"alice", kAliceUid, kUsersGid, AUTH_LOCAL, homes + "/alice", 20000},
-        {"bob", kBobUid, kUsersGid, AUTH_LOCAL, homes + "/bob", -1},
-        {"carol", kCarolUid, kUsersGid, AUTH_LOCAL, homes + "/carol", -1},
-        {"DOM\\dora", 20010, 20100, AUTH_DOMAIN, homes + "/@DOM/dora", -1},
-        {"dan@example.com", 20011, 20101, AUTH_DIRECTORY, homes + "/dan@example.com", -1},
-    };
-    for (const Case& c : cases) {
-        const User user = userOf(c.name);
-        ASSERT_NE(user, nullptr) << c.name;
-        EXPECT_STREQ(user->szName, c.name);
-        EXPECT_EQ(user->uid, c.uid);
-        EXPECT_EQ(user->gid, c.gid);
-        EXPECT_EQ(user->authType, c.type) << c.name;
-        EXPECT_EQ(user->szHome, c.home);
-        EXPECT_EQ(user->expiry, c.expiry) << c.name;
-        EXPECT_EQ(nameOf(c.uid), c.name);
+    for (const auto& c : cases) {
+        const std::string expected =
+            std::string(c.name) + ' ' + std::to_string(c.uid) + ' ' + std::to_string(c.gid) + ' ' + c.rest;
+        EXPECT_EQ(userOf(c.name), expected);
+        EXPECT_EQ(userOf(c.uid), expected);
         uid_t uid = 0;
         gid_t gid = 0;
         EXPECT_EQ(VEXOUserGetUGID(c.name, &uid, &gid), 0);
         EXPECT_TRUE(uid == c.uid && gid == c.gid);
     }
-    writeRootFile("/etc/vexo/shares.conf", "");
-    EXPECT_STREQ(userOf("alice")->szHome, "") << "no share homes";
-}
-
-TEST_F(AccountTest, UnknownAndUnusableNames) {
-    const std::string tooLong(512, 'x');
-    addUser("a/b", 20020, 1);
-    addUser("..", 20021, 1);
-    addUser("\\dora", 20022, 1);
-    addUser("DOM\\..", 20023, 1);
-    addUser(tooLong, 20024, 1);
-    addUser(std::string(511, 'y'), 20025, 1);
     for (const char* name : {"nobody known", "", "a/b", "..", "\\dora", "DOM\\..", "ALICE"}) {
-        EXPECT_EQ(userOf(name), nullptr) << name;
-        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING) << name;
         uid_t uid = 5;
         gid_t gid = 6;
-        EXPECT_EQ(VEXOUserGetUGID(name, &uid, &gid), -1);
+        EXPECT_EQ(userOf(name), "") << name;
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING) << name;
+        EXPECT_EQ(VEXOUserGetUGID(name, &uid, &gid), -1);
         EXPECT_TRUE(uid == 5 && gid == 6);
     }
-    EXPECT_EQ(nameOf(20021), "");
+    for (const uid_t uid : {20020, 4242}) EXPECT_EQ(userOf(uid), "");
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
-    EXPECT_EQ(userOf(tooLong), nullptr) << "never cut";
+    EXPECT_EQ(userOf(longest + "y"), "") << "never cut";
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_GENERAL);
-    EXPECT_NE(userOf(std::string(511, 'y')), nullptr);
-    EXPECT_EQ(nameOf(4242), "");
-    EXPECT_EQ(groupNameOf(4242), "");
-    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
-    PVEXOUSER user = nullptr;
-    EXPECT_LT(VEXOUserGet(nullptr, &user), 0);
-    EXPECT_LT(VEXOUserGet("alice", nullptr), 0);
-    EXPECT_LT(VEXOUserGetByUID(0, nullptr), 0);
-    EXPECT_LT(VEXOGroupGetByGID(0, nullptr), 0);
-    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_PARAMETER);
-    VEXOUserFree(nullptr);
-    VEXOGroupFree(nullptr);
+    EXPECT_NE(userOf(longest), "");
+    EXPECT_EQ(usersOf(AUTH_LOCAL), "root 0 alice 20100 bob 20100 carol 20100 " + longest + " 1 alice 1 twin 1 ");
+    EXPECT_EQ(usersOf(AUTH_DOMAIN), "DOM\\dora 20100 ");
+    EXPECT_EQ(usersOf(AUTH_DIRECTORY), "dan@example.com 20101 ");
+    EXPECT_EQ(groupsOf(AUTH_LOCAL), "root 0 users 20100 administrators 20101 ");
+    EXPECT_EQ(groupsOf(AUTH_DOMAIN), "DOM\\staff 20160 ");
+    EXPECT_EQ(groupsOf(AUTH_DIRECTORY), "");
+    writeRootFile("/etc/vexo/shares.conf", "");
+    EXPECT_EQ(userOf("carol"), "carol 20003 20100 0  -1") << "no share homes";
 }
 
-TEST_F(AccountTest, TheFirstRecordOfANameOrIdCounts) {
-    addUser("alice", 20040, 1);
-    addUser("twin", kBobUid, 1);
+TEST_F(AccountTest, Groups) {
+    addGroup("again", kUsersGid, {"alice"});
+    addGroup("a", 20170, {"bob", "alice"});
+    addGroup("b", 20171, {"alice"});
+    addGroup("c", 20170, {"alice"});
+    EXPECT_EQ(groupsOf("alice"), "3: 20100 20170 20171");
+    EXPECT_EQ(groupsOf("nobody known"), "failure");
+    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
+    vexo::gate::fail("VLIBCSzListPush", VEXO_ERR_GENERAL, ENOMEM, 2);
+    EXPECT_EQ(groupsOf("alice"), "failure");
     writeRootFile("/etc/group", "g:x:30000:\ng:x:30001:\nh:x:30000:\n+:::\n");
-    EXPECT_EQ(userOf("alice")->uid, uid_t{kAliceUid});
-    EXPECT_EQ(nameOf(kBobUid), "bob");
     gid_t gid = 0;
     EXPECT_EQ(VEXOGroupGetGID("g", &gid), 0);
     EXPECT_EQ(gid, 30000U);
-    EXPECT_EQ(groupNameOf(30000), "g");
-    EXPECT_NE(VEXOGroupGetGID("+", &gid), 0);
-    EXPECT_NE(VEXOGroupGetGID("G", &gid), 0);
+    EXPECT_EQ(groupOf(30000), "g");
+    for (const char* name : {"+", "G"}) EXPECT_NE(VEXOGroupGetGID(name, &gid), 0);
 }
 
 TEST_F(AccountTest, ChangedFilesAreReadAgain) {
-    EXPECT_EQ(nameOf(20050), "");
-    EXPECT_EQ(userOf("dave"), nullptr);
+    EXPECT_EQ(userOf(20050), "");
     addUser("dave", 20050, kUsersGid);
-    EXPECT_NE(userOf("dave"), nullptr);
-    EXPECT_EQ(nameOf(20050), "dave");
-    EXPECT_EQ(groupsOf("dave"), std::vector<std::string>{"20100"});
+    EXPECT_NE(userOf("dave"), "");
+    EXPECT_NE(userOf(20050), "");
     addGroup("late", 20150, {"dave"});
-    EXPECT_EQ(groupsOf("dave"), (std::vector<std::string>{"20100", "20150"}));
+    EXPECT_EQ(groupsOf("dave"), "2: 20100 20150");
+    const std::string start = "dave 20050 20100 0 " + shareRoot("homes") + "/dave ";
     writeRootFile("/etc/shadow", "dave:x:::::::\n");
-    EXPECT_EQ(userOf("dave")->expiry, -1);
+    EXPECT_EQ(userOf("dave"), start + "-1");
     writeRootFile("/etc/shadow", "dave:x::::::5:\n");
-    EXPECT_EQ(userOf("dave")->expiry, 5);
-}
-
-// An id that nobody has is looked for once, however many files it owns.
-TEST_F(AccountTest, MissingIdsAreRemembered) {
-    EXPECT_EQ(nameOf(20060), "");
+    EXPECT_EQ(userOf("dave"), start + "5");
+    // An id that nobody has is looked for once, however many files it owns.
+    EXPECT_EQ(userOf(20060), "");
     fs::rename(systemRoot() + "/etc/passwd", systemRoot() + "/etc/moved");
     support::makeFolder(systemRoot() + "/etc/passwd");
-    EXPECT_EQ(nameOf(20060), "");
+    EXPECT_EQ(userOf(20060), "");
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING) << "the files are not looked at";
-    EXPECT_EQ(userOf("alice"), nullptr);
+    EXPECT_EQ(userOf("alice"), "");
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_GENERAL);
     fs::remove(systemRoot() + "/etc/passwd");
     fs::rename(systemRoot() + "/etc/moved", systemRoot() + "/etc/passwd");
-    EXPECT_NE(userOf("alice"), nullptr) << "a failure is not remembered";
+    EXPECT_NE(userOf("alice"), "") << "a failure is not remembered";
 }
 
 // The machine's own users must not stand in for files that cannot be read.
@@ -203,13 +207,12 @@ TEST_F(AccountTest, UnreadableFilesAreAFailure) {
     chmod((systemRoot() + "/etc/passwd").c_str(), 0600);
     support::asUser(kBobUid, kUsersGid, [] {
         for (const char* name : {"root", "nobody known"}) {
-            EXPECT_EQ(userOf(name), nullptr);
+            EXPECT_EQ(userOf(name), "");
             EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_GENERAL);
             EXPECT_EQ(errno, EACCES);
         }
         EXPECT_EQ(VEXOGroupIsAdminGroupMem("carol"), -1);
-        EXPECT_EQ(VEXOUserDBOpen(), nullptr);
-        EXPECT_EQ(VEXOGroupDBOpen(), nullptr);
+        EXPECT_EQ(usersOf(AUTH_LOCAL) + groupsOf(AUTH_LOCAL), "failurefailure");
         EXPECT_FALSE(isIn("bob", {"@users"}));
         return 0;
     });
@@ -217,29 +220,17 @@ TEST_F(AccountTest, UnreadableFilesAreAFailure) {
 
 TEST_F(AccountTest, WithoutFilesTheNameServicesAnswer) {
     fs::remove(systemRoot() + "/etc/group");
-    const User root = userOf("root");
-    ASSERT_NE(root, nullptr);
-    EXPECT_EQ(root->uid, 0U);
-    EXPECT_EQ(userOf("root")->uid, 0U) << "remembered";
-    EXPECT_EQ(nameOf(0), "root");
-    EXPECT_EQ(groupNameOf(0), "root");
-    EXPECT_EQ(userOf("nobody known"), nullptr);
-    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
-    EXPECT_EQ(nameOf(4242424242U), "");
-    EXPECT_EQ(groupsOf("root").front(), "0");
-    PVEXOUSERDB db = VEXOUserDBOpen();
-    ASSERT_NE(db, nullptr);
-    PVEXOUSER user = nullptr;
-    bool hasRoot = false;
-    while (VEXOUserDBGetByCursor(db, &user, AUTH_LOCAL, 1) == 0) hasRoot = hasRoot || user->uid == 0;
-    EXPECT_TRUE(hasRoot);
-    VEXOUserFree(user);
-    VEXOUserDBClose(db);
-    PVEXOGROUPDB groups = VEXOGroupDBOpen();
-    PVEXOGROUP group = nullptr;
-    EXPECT_EQ(VEXOGroupDBGetByCursor(groups, &group, AUTH_LOCAL, 1), 0);
-    VEXOGroupFree(group);
-    VEXOGroupDBClose(groups);
+    for (int round = 0; round < 2; ++round) {  // the second time from memory
+        EXPECT_TRUE(userOf("root").starts_with("root 0 0 0 "));
+        EXPECT_TRUE(userOf(0).starts_with("root 0 0 0 "));
+        EXPECT_EQ(groupOf(0), "root");
+        EXPECT_EQ(userOf("nobody known"), "");
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
+        EXPECT_TRUE(groupsOf("root").find(": 0") != std::string::npos);
+    }
+    for (const std::string& all : {usersOf(AUTH_LOCAL), groupsOf(AUTH_LOCAL)}) {
+        EXPECT_NE(all.find("root 0 "), std::string::npos);
+    }
 }
 
 TEST_F(AccountTest, ExpiryIsReadAsRootAfterTheSwitch) {
@@ -248,98 +239,36 @@ TEST_F(AccountTest, ExpiryIsReadAsRootAfterTheSwitch) {
     chmod((systemRoot() + "/etc/shadow").c_str(), 0600);
     support::inChild([] {
         if (setegid(kUsersGid) != 0 || seteuid(kBobUid) != 0) return 1;
-        EXPECT_EQ(userOf("alice")->expiry, 77);
+        EXPECT_TRUE(userOf("alice").ends_with(" 77"));
         EXPECT_EQ(geteuid(), uid_t{kBobUid});
         EXPECT_EQ(getegid(), gid_t{kUsersGid});
         return 0;
     });
     support::asUser(kBobUid, kUsersGid, [] {
-        EXPECT_EQ(userOf("alice")->expiry, -1) << "unknown without the right to look";
+        EXPECT_TRUE(userOf("alice").ends_with(" -1")) << "unknown without the right to look";
         return 0;
     });
-}
-
-TEST_F(AccountTest, Expiry) {
     const long today = time(nullptr) / 86400;
-    EXPECT_EQ(VEXOUserIsExpired(-1), 0);
-    EXPECT_EQ(VEXOUserIsExpired(0), 1);
-    EXPECT_EQ(VEXOUserIsExpired(today - 1), 1);
-    EXPECT_EQ(VEXOUserIsExpired(today + 2), 0);
-}
-
-TEST_F(AccountTest, Enumeration) {
-    addUser("DOM\\dora", 20010, 20100);
-    addUser(std::string(600, 'x'), 20012, 1);
-    addUser("dan@example.com", 20011, 20101);
-    addUser("..", 20013, 1);
-    addGroup("DOM\\staff", 20160, {});
-    const auto users = [](AUTH_TYPE type) {
-        std::string names;
-        PVEXOUSERDB db = VEXOUserDBOpen();
-        PVEXOUSER user = nullptr;
-        while (VEXOUserDBGetByCursor(db, &user, type, 1) == 0) names += std::string(user->szName) + ' ';
-        VEXOUserFree(user);
-        VEXOUserDBClose(db);
-        return names;
-    };
-    const auto groups = [](AUTH_TYPE type) {
-        std::string names;
-        PVEXOGROUPDB db = VEXOGroupDBOpen();
-        PVEXOGROUP group = nullptr;
-        while (VEXOGroupDBGetByCursor(db, &group, type, 1) == 0) {
-            names += group->szName + std::to_string(group->gid) + ' ';
-        }
-        VEXOGroupFree(group);
-        VEXOGroupDBClose(db);
-        return names;
-    };
-    EXPECT_EQ(users(AUTH_LOCAL), "root alice bob carol ");
-    EXPECT_EQ(users(AUTH_DOMAIN), "DOM\\dora ");
-    EXPECT_EQ(users(AUTH_DIRECTORY), "dan@example.com ");
-    EXPECT_EQ(groups(AUTH_LOCAL), "root0 users20100 administrators20101 ");
-    EXPECT_EQ(groups(AUTH_DOMAIN), "DOM\\staff20160 ");
-    EXPECT_EQ(groups(AUTH_DIRECTORY), "");
-    EXPECT_NE(VEXOUserDBGetByCursor(nullptr, nullptr, AUTH_LOCAL, 1), 0);
-    EXPECT_NE(VEXOGroupDBGetByCursor(nullptr, nullptr, AUTH_LOCAL, 1), 0);
-    VEXOUserDBClose(nullptr);
-    VEXOGroupDBClose(nullptr);
-}
-
-TEST_F(AccountTest, GroupsOfAUser) {
-    addGroup("again", kUsersGid, {"alice"});
-    addGroup("a", 20170, {"bob", "alice"});
-    addGroup("b", 20171, {"alice"});
-    addGroup("c", 20170, {"alice"});
-    EXPECT_EQ(groupsOf("alice"), (std::vector<std::string>{"20100", "20170", "20171"}));
-    EXPECT_EQ(groupsOf("nobody known"), std::vector<std::string>{"failure"});
-    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
-    EXPECT_EQ(VEXOGroupInfoGetgroupList("alice", nullptr, 0), -1);
-    EXPECT_EQ(groupsOf(nullptr), std::vector<std::string>{"failure"});
-    vexo::gate::fail("VLIBCSzListPush", VEXO_ERR_GENERAL, ENOMEM, 2);
-    EXPECT_EQ(groupsOf("alice"), std::vector<std::string>{"failure"});
+    for (const long expiry : {-1L, today + 2}) EXPECT_EQ(VEXOUserIsExpired(expiry), 0);
+    for (const long expiry : {0L, today}) EXPECT_EQ(VEXOUserIsExpired(expiry), 1);
 }
 
 TEST_F(AccountTest, Administrators) {
     addGroup("Managers", 20180, {"bob"});
     addUser("primary", 20014, kAdminGid);
-    struct Case {
-        const char* user;
+    const struct {
+        const char *user, *group;
         int answer;
-    };
-    const auto check = [](std::initializer_list<Case> cases) {
-        for (const Case& c : cases) {
-            EXPECT_EQ(VEXOGroupIsAdminGroupMem(c.user), c.answer) << c.user;
-            EXPECT_EQ(VEXOGroupIsAdminGroupMemEx(c.user, 1), c.answer) << c.user;
-        }
-    };
-    check({{"alice", 0}, {"bob", 0}, {"carol", 1}, {"primary", 1}, {"root", 0}, {"nobody known", -1}});
-    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
-    EXPECT_EQ(VEXOGroupIsAdminGroupMem(nullptr), -1);
-    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_PARAMETER);
-    setSetting("admin_group", "Managers");
-    check({{"bob", 1}, {"carol", 0}});
-    writeRootFile("/etc/vexoinfo.conf", "admin_group=\"no such group\"\n");
-    check({{"bob", 0}, {"carol", 0}});
+    } cases[] = {{"alice", nullptr, 0},         {"carol", nullptr, 1},  {"primary", nullptr, 1},
+                 {"nobody known", nullptr, -1}, {nullptr, nullptr, -1}, {"bob", "Managers", 1},
+                 {"carol", "Managers", 0},      {"carol", "no such", 0}};
+    for (const auto& c : cases) {
+        if (c.group != nullptr) setSetting("admin_group", c.group);
+        EXPECT_EQ(VEXOGroupIsAdminGroupMem(c.user), c.answer) << testing::PrintToString(c.user);
+        EXPECT_EQ(VEXOGroupIsAdminGroupMemEx(c.user, 1), c.answer);
+        const int code = c.user != nullptr ? VEXO_ERR_USER_MISSING : VEXO_ERR_PARAMETER;
+        EXPECT_TRUE(c.answer >= 0 || VLIBCErrGet() == code);
+    }
 }
 
 TEST_F(AccountTest, SupplementaryGroups) {
@@ -352,7 +281,6 @@ TEST_F(AccountTest, SupplementaryGroups) {
         EXPECT_EQ(std::vector<gid_t>(gids, gids + count), (std::vector<gid_t>{777, 20170}));
         EXPECT_EQ(VEXOUserInitGroups("nobody known", 778), 0);
         EXPECT_EQ(getgroups(16, gids), 1);
-        EXPECT_EQ(VEXOUserInitGroups(nullptr, 1), -1);
         return 0;
     });
     support::asUser(kBobUid, kUsersGid, [] {
@@ -364,68 +292,50 @@ TEST_F(AccountTest, SupplementaryGroups) {
 
 TEST_F(AccountTest, Lists) {
     addUser("DOM\\dora", 20010, 20190);
-    addUser("\xC3\xA9ric", 20015, kUsersGid);
     addGroup("DOM\\Domain Users", 20190, {});
     addGroup("Users", 20191, {});
-    struct Case {
+    const struct {
         const char* user;
-        std::vector<std::string> entries;
+        std::vector<const char*> entries;
         bool isIn;
-    };
-    const Case cases[] = {
-        {"alice", {}, false},
+    } cases[] = {
         {"alice", {"bob", "ALICE"}, true},
-        {"alice", {"alic", "alicex", "", "@", "+&", "*alice", "@alice"}, false},
+        {"alice", {"alic", "alicex", "", "@", "+&", "*alice", "@alice", "users"}, false},
         {"alice", {"*"}, true},
         {"", {"*", ""}, false},
         {"\xC3\x89RIC", {"\xC3\xA9ric"}, true},
-        {"alice", {"@users"}, true},
         {"alice", {"+&users"}, true},
-        {"alice", {"&users"}, true},
         {"alice", {"@USERS"}, true},   // no group has this very spelling
         {"alice", {"@Users"}, false},  // one has, and alice is not in it
-        {"alice", {"users"}, false},
-        {"carol", {"@administrators"}, true},
         {"nobody known", {"@users"}, false},
         {"nobody known", {"nobody known"}, true},
         {"DOM\\dora", {"dom\\DORA"}, true},
         {"DOM\\dora", {"dora"}, false},
         {"DOM\\dora", {"@dom\\domain users"}, true},
     };
-    for (const Case& c : cases) {
-        EXPECT_EQ(isIn(c.user, c.entries), c.isIn) << c.user << ": " << (c.entries.empty() ? "" : c.entries.front());
-    }
-    EXPECT_EQ(BlSDKUserIsInList(nullptr, nullptr), 0);
-    EXPECT_EQ(BlSDKUserIsInList("alice", nullptr), 0);
-}
-
-TEST(ApplicationFile, Lines) {
-    const auto list = vexo::parseApplications(
-        "# c\n; c\n\n a.b : alice, @users \"x y\"\r\nnobodys:\n : x\nforgotten alice\na.b: *\nlast:bob");
-    ASSERT_EQ(list.users.size(), 4U);
-    EXPECT_EQ(list.users.at("a.b"), (std::vector<std::string>{"alice", "@users", "x y", "*"}));
-    EXPECT_TRUE(list.users.at("nobodys").empty());
-    EXPECT_TRUE(list.users.at("forgotten").empty());
-    EXPECT_EQ(list.users.at("last"), std::vector<std::string>{"bob"});
-    EXPECT_EQ(list.malformed, (std::vector<int>{6, 7}));
+    for (const auto& c : cases) EXPECT_EQ(isIn(c.user, c.entries), c.isIn) << c.user << ": " << c.entries.front();
 }
 
 TEST_F(AccountTest, Applications) {
+    const auto list = vexo::parseApplications(
+        "# c\n; c\n\n a.b : alice, @users \"x y\"\r\nnobodys:\n : x\nforgotten alice\na.b: *\nlast:bob");
+    EXPECT_EQ(list.users.size(), 4U);
+    EXPECT_EQ(list.users.at("a.b"), (std::vector<std::string>{"alice", "@users", "x y", "*"}));
+    EXPECT_EQ(list.malformed, (std::vector<int>{6, 7}));
     EXPECT_EQ(VLIBUserPrivilegeHas("alice", "any"), 1) << "no file";
     writeRootFile("/etc/vexo/applications", "files: alice @administrators\nnobodys:\nforgotten bob\n");
     support::announceLog("line 3 of /etc/vexo/applications has no \"identifier:\"");
-    struct Case {
+    const struct {
         const char *user, *application;
         int answer;
-    };
-    const Case cases[] = {
+    } cases[] = {
         {"alice", "files", 1}, {"carol", "files", 1},   {"bob", "files", 0},     {"bob", "other", 1},
         {"bob", "FILES", 1},   {"alice", "nobodys", 0}, {"bob", "forgotten", 0}, {"", "other", 0},
         {nullptr, "other", 0}, {"alice", nullptr, 0},
     };
-    for (const Case& c : cases) {
+    for (const auto& c : cases) {
         EXPECT_EQ(VLIBUserPrivilegeHas(c.user, c.application), c.answer)
-            << (c.user == nullptr ? "null" : c.user) << ' ' << (c.application == nullptr ? "null" : c.application);
+            << testing::PrintToString(c.user) << testing::PrintToString(c.application);
     }
     writeRootFile("/etc/vexo/applications", "files: bob\n");
     EXPECT_EQ(VLIBUserPrivilegeHas("bob", "files"), 1);
