@@ -20,26 +20,25 @@ int escapedByte(std::string_view text) {
     return high < 0 || low < 0 ? 0 : high * 16 + low;
 }
 
-// Takes the piece up to the next `separator` off `text`.
-std::string_view takePiece(std::string_view& text, char separator) {
-    const size_t end = std::min(text.find(separator), text.size());
-    const std::string_view piece = text.substr(0, end);
-    text.remove_prefix(std::min(end + 1, text.size()));
-    return piece;
-}
-
-std::string_view trim(std::string_view text) {
-    const size_t first = text.find_first_not_of(" \t");
-    if (first == std::string_view::npos) return {};
-    return text.substr(first, text.find_last_not_of(" \t") - first + 1);
-}
-
 bool isTokenByte(char c) {
     return (c >= '0' && c <= '9') || (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') ||
            std::string_view("!#$%&'*+-.^_`|~").find(c) != std::string_view::npos;
 }
 
 }  // namespace
+
+std::string_view trimBlanks(std::string_view text) {
+    const size_t first = text.find_first_not_of(" \t");
+    if (first == std::string_view::npos) return {};
+    return text.substr(first, text.find_last_not_of(" \t") - first + 1);
+}
+
+std::string_view takePiece(std::string_view& text, char separator) {
+    const size_t end = std::min(text.find(separator), text.size());
+    const std::string_view piece = text.substr(0, end);
+    text.remove_prefix(std::min(end + 1, text.size()));
+    return piece;
+}
 
 std::string decodeFormText(std::string_view text) {
     std::string out;
@@ -65,11 +64,20 @@ void parseForm(std::string_view text, FormFields& fields) {
     }
 }
 
-std::optional<std::string> findCookie(std::string_view header, std::string_view name) {
+std::vector<std::pair<std::string, std::string>> parseCookies(std::string_view header) {
+    std::vector<std::pair<std::string, std::string>> cookies;
     while (!header.empty()) {
         std::string_view value = takePiece(header, ';');
         if (value.find('=') == std::string_view::npos) continue;
-        if (trim(takePiece(value, '=')) == name) return std::string(trim(value));
+        const std::string_view name = trimBlanks(takePiece(value, '='));
+        cookies.emplace_back(name, trimBlanks(value));
+    }
+    return cookies;
+}
+
+std::optional<std::string> findCookie(std::string_view header, std::string_view name) {
+    for (auto& [cookie, value] : parseCookies(header)) {
+        if (cookie == name) return std::move(value);
     }
     return {};
 }

@@ -10,6 +10,11 @@
 
 namespace vexo {
 
+// Without blanks and tabs at both ends.
+std::string_view trimBlanks(std::string_view text);
+// Takes the piece up to the next `separator`, which goes too, off `text`.
+std::string_view takePiece(std::string_view& text, char separator);
+
 using FormFields = std::vector<std::pair<std::string, std::string>>;
 
 // Percent escapes to bytes, "+" to a blank. An escape that is none stays as it is, and so does "%00": no name or text
@@ -18,6 +23,9 @@ std::string decodeFormText(std::string_view text);
 
 // Appends the fields of "a=1&b=2", decoded, in their order. A piece without "=" is a field with an empty value.
 void parseForm(std::string_view text, FormFields& fields);
+
+// The cookies of a Cookie header, names and values as they stand, in their order.
+std::vector<std::pair<std::string, std::string>> parseCookies(std::string_view header);
 
 // The value of the first cookie of that name in a Cookie header.
 std::optional<std::string> findCookie(std::string_view header, std::string_view name);
