@@ -49,10 +49,11 @@ bool isThere(const std::string& path) {
     return faccessat(AT_FDCWD, path.c_str(), F_OK, AT_SYMLINK_NOFOLLOW | AT_EACCESS) == 0;
 }
 
-// Whoever can write to the temporary folder could have put a link there, to have root make folders elsewhere.
-bool isLink(const std::string& path) {
+// Whoever can write to the temporary folder could have put a link there, to have root make folders elsewhere. Root's
+// own links are the operator's business.
+bool isForeignLink(const std::string& path) {
     struct stat status {};
-    return lstat(path.c_str(), &status) == 0 && S_ISLNK(status.st_mode);
+    return lstat(path.c_str(), &status) == 0 && S_ISLNK(status.st_mode) && status.st_uid != 0;
 }
 
 // Only a folder that this process made, never what a link put in its place leads to.
@@ -80,8 +81,9 @@ void makeTaskFolders(const std::string& volume, const std::string& taskFolder) {
     makeTemporaryFolder(volume);
     const std::string top = searchRoot(volume);
     for (const std::string& above : {volume + "/@tmp", volume + "/@tmp/orvel", top}) {
-        if (!isLink(above)) continue;
-        syslog(LOG_ERR, "%s:%d %s is a link, nothing is made below it", kSource, __LINE__, printable(above).c_str());
+        if (!isForeignLink(above)) continue;
+        syslog(LOG_ERR, "%s:%d %s is a user's link, nothing is made below it", kSource, __LINE__,
+               printable(above).c_str());
         return;
     }
     makeFolder(top);
