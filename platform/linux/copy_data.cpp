@@ -14,12 +14,15 @@ namespace {
 constexpr off_t kPiece = off_t{4} << 20;  // between two questions whether to go on
 constexpr size_t kBuffer = size_t{256} << 10;
 
+off_t copied = 0;
+
 class DataCopy {
  public:
     DataCopy(int source, int target, off_t size, int (*isCancelled)())
         : source_(source), target_(target), size_(size), isCancelled_(isCancelled) {}
 
     bool run() {
+        copied = 0;
         if (cancelled()) return false;
         if (ioctl(target_, FICLONE, source_) == 0) return finish(target_);
         off_t from = 0;
@@ -43,6 +46,7 @@ class DataCopy {
     // a clone that is shorter, or a source that shrank, would leave zeros where there was data.
     bool finish(int judged) {
         const off_t held = lseek(judged, 0, SEEK_END);
+        copied = std::min(held, size_);
         if (held >= size_) return ftruncate(target_, size_) == 0;
         if (held >= 0) errno = EIO;
         return false;
@@ -62,6 +66,7 @@ class DataCopy {
 
     bool copyRange(off_t from, off_t end) {
         while (from < end) {
+            copied = from;
             if (cancelled()) return false;
             const size_t piece = static_cast<size_t>(std::min(end - from, kPiece));
             const ssize_t done = inKernel_ ? copyInKernel(from, piece) : copyBuffered(from, piece);
@@ -116,6 +121,10 @@ class DataCopy {
 };
 
 }  // namespace
+
+off_t copiedBytes() {
+    return copied;
+}
 
 bool copyData(int source, int target, off_t size, int (*isCancelled)()) {
     return DataCopy(source, target, size, isCancelled).run();

@@ -11,6 +11,9 @@ namespace vexo {
 // asked before each piece. False with errno: ECANCELED when cancelled, EIO when the source ends before `size`.
 [[nodiscard]] bool copyData(int source, int target, off_t size, int (*isCancelled)());
 
+// How far the copy under way is, or the last one came.
+off_t copiedBytes();
+
 }  // namespace vexo
 
 #endif

@@ -86,10 +86,15 @@ bool takeOverPermissions(const Copy& copy, int file) {
     return vexo::takeOverPermissions(copy.folder.get(), copy.name.c_str(), copy.oldStatus.st_mode, file);
 }
 
+bool keepsMode(const Copy& copy) {
+    return (copy.options.switches & VEXO_COPY_KEEP_MODE) != 0 && !copy.exists;
+}
+
 bool create(const Copy& copy, vexo::PartFile& part) {
-    // A part that replaces a file is closed to others until it has that file's permissions.
+    // A part is closed to others until it has the permissions of another file.
     const vexo::Umask mask(kUmask);
-    return part.create(copy.exists ? 0600 : kNewFile) && vexo::setOwner(part.get(), copy.options.uid, copy.options.gid);
+    return part.create(copy.exists || keepsMode(copy) ? 0600 : kNewFile) &&
+           vexo::setOwner(part.get(), copy.options.uid, copy.options.gid);
 }
 
 // What a network file system could not write yet is reported when a descriptor closes.
@@ -103,6 +108,7 @@ bool fill(const Copy& copy, int part) {
     const struct stat& from = copy.sourceStatus;
     if (!vexo::copyData(copy.source.get(), part, from.st_size, options.isCancelled)) return false;
     if (copy.exists && !takeOverPermissions(copy, part)) return false;
+    if (keepsMode(copy) && !vexo::setMode(part, from.st_mode & 0777)) return false;
     if ((options.switches & VEXO_COPY_KEEP_TIMES) != 0) {
         const std::array<timespec, 2> times = {from.st_atim, from.st_mtim};
         if (futimens(part, times.data()) != 0) return false;
@@ -196,4 +202,8 @@ int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* opti
     return 0;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+long long VEXOFileCopyDone() {
+    return vexo::copiedBytes();
 }

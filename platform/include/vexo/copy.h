@@ -10,6 +10,7 @@ enum {
     VEXO_COPY_OVERWRITE = 0x1,   // an existing file at the target is replaced
     VEXO_COPY_KEEP_TIMES = 0x2,  // the copy takes over the times of access and modification
     VEXO_COPY_TAKE = 0x4,        // the source is the caller's to give: on one file system it becomes the target itself
+    VEXO_COPY_KEEP_MODE = 0x8,   // a new file has the source's permission bits, without set-id and sticky bits
 };
 
 struct VEXOCOPYOPT {
@@ -24,11 +25,11 @@ VEXO_BEGIN_C
 // identity. `options` may be null: the caller's own file, never cancelled, no switches.
 //
 // The target appears whole or not at all: the data goes to a file beside it, which takes its place in one step. A new
-// file has the mode 0644, or what the folder's default ACL says; one that replaces another takes over that one's
-// permissions (its ACL too), not its owner. Holes of the source stay holes; data is shared with the source where the
-// file system can. With TAKE, a source that the caller owns, that has one name and lies on the target's file system is
-// not copied but becomes the target, and its old name is gone; any other source is copied and stays. A failure may
-// leave a source that was to be taken with the target's owner and permissions.
+// file has the mode 0644, or what the folder's default ACL says (see KEEP_MODE, which does not bear on TAKE); one that
+// replaces another takes over that one's permissions (its ACL too), not its owner. Holes of the source stay holes; data
+// is shared with the source where the file system can. With TAKE, a source that the caller owns, that has one name and
+// lies on the target's file system is not copied but becomes the target, and its old name is gone; any other source is
+// copied and stays. A failure may leave a source that was to be taken with the target's owner and permissions.
 //
 // 0, or -1 with errno and the slot, the target as it was and nothing beside it: 0x0600 the source or the target's
 // folder is missing, 0x0700 a path is no path of a file (the source is a folder, link, pipe...; the target has no
@@ -37,6 +38,10 @@ VEXO_BEGIN_C
 // is FAT and cannot hold the name, 0xA300 nor a file of this size, 0x2900 no space, 0x2400 quota, 0x8400 read-only file
 // system, 0xA400 cancelled, 0x0D00 a null or empty path, 0x8100 else (the source shrank or could not be read).
 VEXO_API int VEXOFileCopy(const char* source, const char* target, const struct VEXOCOPYOPT* options);
+
+// The bytes of the source that the copy under way has behind it, holes included: for isCancelled to tell how far it is.
+// After the copy, what it came to.
+VEXO_API long long VEXOFileCopyDone(void);
 VEXO_END_C
 
 #endif
