@@ -15,6 +15,7 @@
 
 #include <cerrno>
 #include <cstring>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -34,10 +35,9 @@ using support::kUsersGid;
 // An entry of an ACL as the kernel stores it behind a 4-byte version.
 struct AclEntry {
     uint16_t tag, permission;
-    uint32_t id;
+    uint32_t id = 0xFFFFFFFF;
 };
 enum : uint16_t { kOwnerTag = 1, kUserTag = 2, kGroupObjectTag = 4, kGroupTag = 8, kMaskTag = 16, kOtherTag = 32 };
-constexpr uint32_t kNoId = 0xFFFFFFFF;
 
 bool setAcl(const std::string& path, const std::vector<AclEntry>& entries) {
     std::string blob("\2\0\0\0", 4);
@@ -114,31 +114,30 @@ class AclTest : public support::ApplianceTest {
 std::vector<std::string> AclTest::fill(const std::string& folder) {
     std::vector<std::string> names;
     for (const mode_t mode : {0000, 0644, 0600, 0755, 0070, 0007, 0604, 0640, 0664, 0775, 0711, 0111, 0010, 04755}) {
+        const auto bits = [&](unsigned shift) { return static_cast<uint16_t>((mode >> shift) & 7); };
+        const std::vector<AclEntry> acls[] = {
+            {},
+            // More than the mode shows for carol, less for the owning group; the mask is the mode's.
+            {{kOwnerTag, bits(6)},
+             {kUserTag, 7, kCarolUid},
+             {kGroupObjectTag, 0},
+             {kMaskTag, bits(3)},
+             {kOtherTag, bits(0)}},
+            // Less for carol.
+            {{kOwnerTag, bits(6)},
+             {kUserTag, 0, kCarolUid},
+             {kGroupObjectTag, 7},
+             {kGroupTag, 5, support::kAdminGid},
+             {kMaskTag, 7},
+             {kOtherTag, bits(0)}}};
         for (const uid_t owner : {uid_t{0}, uid_t{kAliceUid}, uid_t{kBobUid}}) {
-            for (const int acl : {0, 1, 2}) {
+            for (const auto& acl : acls) {
                 const bool isFolder = (names.size() & 1) != 0;
-                names.push_back(std::to_string(mode) + "-" + std::to_string(owner) + "-" + std::to_string(acl));
+                names.push_back(std::to_string(names.size()));
                 const std::string path = folder + "/" + names.back();
                 isFolder ? support::makeFolder(path) : support::writeFile(path, "#!/bin/sh\n");
                 EXPECT_EQ(chown(path.c_str(), owner, kUsersGid), 0);
-                const auto bits = [&](unsigned shift) { return static_cast<uint16_t>((mode >> shift) & 7); };
-                if (acl ==
-                    1) {  // more than the mode shows for carol, less for the owning group; the mask is the mode's
-                    EXPECT_TRUE(setAcl(path, {{kOwnerTag, bits(6), kNoId},
-                                              {kUserTag, 7, kCarolUid},
-                                              {kGroupObjectTag, 0, kNoId},
-                                              {kMaskTag, bits(3), kNoId},
-                                              {kOtherTag, bits(0), kNoId}}));
-                } else if (acl == 2) {  // less for carol
-                    EXPECT_TRUE(setAcl(path, {{kOwnerTag, bits(6), kNoId},
-                                              {kUserTag, 0, kCarolUid},
-                                              {kGroupObjectTag, 7, kNoId},
-                                              {kGroupTag, 5, support::kAdminGid},
-                                              {kMaskTag, 7, kNoId},
-                                              {kOtherTag, bits(0), kNoId}}));
-                } else {
-                    EXPECT_EQ(chmod(path.c_str(), mode), 0);
-                }
+                EXPECT_TRUE(acl.empty() ? chmod(path.c_str(), mode) == 0 : setAcl(path, acl));
             }
         }
     }
@@ -244,36 +243,27 @@ TEST_F(AclTest, ImmutableAndAppendOnly) {
     for (const char* name : {"/fixed", "/growing", "/log"}) EXPECT_TRUE(mark(root_ + name, 0));
 }
 
-TEST_F(AclTest, OwnEntriesAndRootsAreSettledWithoutTheKernel) {
-    const vexo::Identity root{0, true, true, true};
-    const vexo::Identity alice{kAliceUid, false, false, false};
-    vexo::FolderFacts folder{};
-    folder.device = 5;
-    folder.plain = true;
-    _tag_VEXOSTAT_ file{};
-    file.st_device = 5;
-    file.st_attributes = VEXO_ATTRIBUTE_KNOWN;
-    file.st_mode = S_IFREG | 0640;
-    file.st_uid = kAliceUid;
-    EXPECT_EQ(vexo::settle(alice, folder, file).open, 0U);
-    EXPECT_EQ(vexo::settle(alice, folder, file).granted, 6U);
-    EXPECT_EQ(vexo::settle(root, folder, file).granted, 6U);
-    file.st_uid = kBobUid;
-    EXPECT_EQ(vexo::settle(alice, folder, file).open, 4U);  // by the group or an ACL, nothing else can grant more
-    file.st_mode = S_IFREG | 0600;
-    EXPECT_EQ(vexo::settle(alice, folder, file).open, 0U);
-    // Whatever makes the status no proof leaves every bit to the kernel.
-    const auto unsettled = [&](auto&& change) {
-        vexo::FolderFacts otherFolder = folder;
-        _tag_VEXOSTAT_ other = file;
-        change(otherFolder, other);
-        return vexo::settle(root, otherFolder, other).open == 7U;
-    };
-    EXPECT_TRUE(unsettled([](auto& f, auto&) { f.plain = false; }));
-    EXPECT_TRUE(unsettled([](auto&, auto& e) { e.st_device = 6; }));
-    EXPECT_TRUE(unsettled([](auto&, auto& e) { e.st_attributes = 0; }));
-    EXPECT_TRUE(unsettled([](auto&, auto& e) { e.st_mode = S_IFLNK | 0777; }));
-    EXPECT_TRUE(unsettled([](auto&, auto& e) { e.st_gid = 65534; }));
+// Whatever makes the status no proof leaves every bit to the kernel, even for root.
+TEST_F(AclTest, OnlyAProofSettles) {
+    struct Facts {
+        vexo::FolderFacts folder{};
+        _tag_VEXOSTAT_ entry{};
+    } facts;
+    facts.folder.device = facts.entry.st_device = 5;
+    facts.folder.plain = true;
+    facts.entry.st_attributes = VEXO_ATTRIBUTE_KNOWN;
+    facts.entry.st_mode = S_IFREG | 0640;
+    const auto openBits = [](const Facts& f) { return vexo::settle({0, true, true, true}, f.folder, f.entry).open; };
+    EXPECT_EQ(openBits(facts), 0U);
+    const std::function<void(Facts&)> changes[] = {
+        [](Facts& f) { f.folder.plain = false; }, [](Facts& f) { f.entry.st_device = 6; },
+        [](Facts& f) { f.entry.st_attributes = 0; }, [](Facts& f) { f.entry.st_mode = S_IFLNK | 0777; },
+        [](Facts& f) { f.entry.st_gid = 65534; }};
+    for (const auto& change : changes) {
+        Facts changed = facts;
+        change(changed);
+        EXPECT_EQ(openBits(changed), 7U) << &change - changes;
+    }
 }
 
 TEST_F(AclTest, FailuresAndOddPaths) {
@@ -295,9 +285,11 @@ TEST_F(AclTest, FailuresAndOddPaths) {
         EXPECT_EQ(errno, c.systemCode);
         EXPECT_EQ(VLIBCErrGet(), c.code);
     }
-    unsigned permission = 0;
-    EXPECT_LT(VEXOACLPermGet(nullptr, &permission), 0);
-    EXPECT_LT(VEXOACLPermGet("/", nullptr), 0);
+    support::makeFolder(root_ + "/closed", 0700);  // denied is no failure
+    support::writeFile(root_ + "/closed/b", "", 0666);
+    if (geteuid() == 0) {
+        EXPECT_EQ(support::asUser(kAliceUid, kUsersGid, [&] { return int(byPath(root_ + "/closed/b")); }), 0);
+    }
     errno = 0;
     for (const char* never : {"/", "/..", "."}) EXPECT_EQ(byPath(never) & VEXO_ACL_DELETE, 0U) << never;
     EXPECT_EQ(byPath(root_ + "//") & VEXO_ACL_DELETE, byPath(root_) & VEXO_ACL_DELETE);
@@ -306,18 +298,6 @@ TEST_F(AclTest, FailuresAndOddPaths) {
     EXPECT_NE(byPath("link") & VEXO_ACL_DELETE, 0U);  // the link goes, not its target
     EXPECT_EQ(errno, 0);
     EXPECT_EQ(VEXOACLFolderOpen(-1), nullptr);
-    VEXOACLFolderClose(nullptr);
-}
-
-TEST_F(AclTest, ADeniedFolderIsNoFailure) {
-    SKIP_WITHOUT_ROOT();
-    support::makeFolder(root_ + "/closed", 0700);
-    support::writeFile(root_ + "/closed/a", "", 0666);
-    const auto body = [&] {
-        EXPECT_EQ(byPath(root_ + "/closed/a"), 0U);
-        return 0;
-    };
-    EXPECT_EQ(support::asUser(kAliceUid, kUsersGid, body), 0);
 }
 
 TEST_F(AclTest, SupportIsAskedOncePerDevice) {
@@ -332,7 +312,6 @@ TEST_F(AclTest, SupportIsAskedOncePerDevice) {
     EXPECT_EQ(errno, 0);
     EXPECT_LT(VEXOACLIsSupport((root_ + "/missing").c_str(), -1, 2), 0);
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_MISSING);
-    EXPECT_LT(VEXOACLIsSupport(nullptr, -1, 2), 0);
 }
 
 }  // namespace
