@@ -42,14 +42,15 @@ bool isServerDown(int error) {
 
 }  // namespace
 
+std::string definedShareName(const std::string& shareName) {
+    if (IsDirUserHome(shareName, nullptr)) return shareName;
+    const std::unique_ptr<SDK::Share, ReleaseShare> share(SDK::Share::LoadShare(shareName.c_str()));
+    return share != nullptr ? share->GetName() : "";
+}
+
 LinkPolicy linkPolicyOf(const std::string& shareName) {
-    std::string name = shareName;
-    if (!IsDirUserHome(shareName, nullptr)) {
-        // Shares answer to any spelling of their name; settings do not.
-        const std::unique_ptr<SDK::Share, ReleaseShare> share(SDK::Share::LoadShare(shareName.c_str()));
-        if (share == nullptr) return LinkPolicy::kNone;
-        name = share->GetName();
-    }
+    const std::string name = definedShareName(shareName);
+    if (name.empty()) return LinkPolicy::kNone;
     return VexoConf::Info().Get("link_policy_" + name, "inside") == "inside" ? LinkPolicy::kInside : LinkPolicy::kNone;
 }
 

@@ -17,6 +17,9 @@ enum class LinkPolicy {
 };
 LinkPolicy linkPolicyOf(const std::string& shareName);
 
+// A share's name as it is defined, since shares answer to any spelling; "home" for home folders, "" for no share.
+std::string definedShareName(const std::string& shareName);
+
 // Opens the folder that `info` resolved to, as the calling identity, beneath its share root, and puts its path without
 // links, "." or ".." into `realPath`. 0; 407 when the path leaves the share (".." or a link) or the policy forbids a
 // link in it, 408 missing or no folder, 410 a network mount that does not answer, 402 else.

@@ -1,14 +1,13 @@
 #include "listing.h"
 
 #include <algorithm>
-#include <vector>
 
 #include "confined.h"
+#include "criteria.h"
 #include "orvel/error_state.h"
 #include "orvel/file_info.h"
 #include "orvel/listing.h"
 #include "orvel/privilege.h"
-#include "orvel/search_criteria.h"
 #include "reply.h"
 
 namespace orvel::cgi {
@@ -40,25 +39,6 @@ const char* sidOf(const ListRequest& request) {
     return request.sid.empty() ? nullptr : request.sid.c_str();
 }
 
-// The criteria of one request; the library only borrows them.
-class NameCriteria {
- public:
-    NameCriteria() = default;
-    ~NameCriteria() {
-        for (const FileSearch::FindComp* criterion : list_) delete criterion;
-    }
-    NameCriteria(const NameCriteria&) = delete;
-    NameCriteria& operator=(const NameCriteria&) = delete;
-
-    bool add(const std::string& patterns) {
-        return FileSearch::FindFactory::createFindOp(FileSearch::FIND_NAME, nullptr, patterns.c_str(), list_);
-    }
-    [[nodiscard]] const std::vector<FileSearch::FindComp*>& list() const { return list_; }
-
- private:
-    std::vector<FileSearch::FindComp*> list_;
-};
-
 }  // namespace
 
 int additionalBits(std::string_view words) {
@@ -87,8 +67,11 @@ int listFolder(const ListRequest& request, Listing& listing) {
     if (refusal != ORV_ERR_NONE) return refusal;
     if (!CheckDirListPrivilege(realPath.c_str())) return lastCode();
 
-    NameCriteria criteria;
-    if (!request.pattern.empty() && !criteria.add(request.pattern)) return lastCode();
+    Criteria criteria;
+    if (!request.pattern.empty()) {
+        const int code = criteria.add(FileSearch::FIND_NAME, nullptr, request.pattern);
+        if (code != ORV_ERR_NONE) return code;
+    }
     OrvEnum enumeration;
     const bool listed = enumeration.OrvLibDirEntryListEnum(
         info.path.c_str(), realPath.c_str(), request.sortBy.empty() ? "name" : request.sortBy.c_str(),
@@ -108,8 +91,15 @@ int listShares(const ListRequest& request, Listing& listing) {
 
 void writeListing(const ListRequest& request, const Listing& listing,
                   void (*append)(const DIRENTRY_INFO&, int, std::string&), Output& out) {
-    out.text() += "{\"total\":" + std::to_string(listing.total) + ",\"offset\":" + std::to_string(request.offset) +
-                  ",\"items\":[";
+    out.text() += '{';
+    writePage(request, listing, append, out);
+    out.text() += '}';
+}
+
+void writePage(const ListRequest& request, const Listing& listing,
+               void (*append)(const DIRENTRY_INFO&, int, std::string&), Output& out) {
+    out.text() +=
+        "\"total\":" + std::to_string(listing.total) + ",\"offset\":" + std::to_string(request.offset) + ",\"items\":[";
     bool first = true;
     for (const DIRENTRY_INFO& entry : listing.entries) {
         if (!first) out.text() += ',';
@@ -117,7 +107,7 @@ void writeListing(const ListRequest& request, const Listing& listing,
         append(entry, request.additional, out.text());
         out.spill();
     }
-    out.text() += "]}";
+    out.text() += ']';
 }
 
 }  // namespace orvel::cgi

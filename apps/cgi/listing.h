@@ -43,9 +43,11 @@ int listShares(const ListRequest& request, Listing& listing);
 void appendEntry(const DIRENTRY_INFO& entry, int additional, std::string& out);
 void appendShare(const DIRENTRY_INFO& entry, int additional, std::string& out);
 
-// Appends {"total","offset","items"} with the entries written by `append`.
+// Appends {"total","offset","items"} with the entries written by `append`; the second without the braces.
 void writeListing(const ListRequest& request, const Listing& listing,
                   void (*append)(const DIRENTRY_INFO&, int, std::string&), Output& out);
+void writePage(const ListRequest& request, const Listing& listing,
+               void (*append)(const DIRENTRY_INFO&, int, std::string&), Output& out);
 
 }  // namespace orvel::cgi
 

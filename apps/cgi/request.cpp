@@ -92,6 +92,40 @@ std::optional<unsigned long> numberParam(const VEXO::WebCGI& cgi, const char* na
     return parseNumber(cgi.GetParam(name, ""));
 }
 
+bool isPosted() {
+    const char* method = getenv("REQUEST_METHOD");
+    return method != nullptr && std::string_view(method) == "POST";
+}
+
+std::optional<_tag_dir_entry_type_> typeParam(const VEXO::WebCGI& cgi) {
+    const std::string word = cgi.GetParam("filetype", "all");
+    if (word == "dir") return DIR_ENTRY_TYPE_DIR;
+    if (word == "file") return DIR_ENTRY_TYPE_FILE;
+    if (word == "all") return DIR_ENTRY_TYPE_ALL;
+    return std::nullopt;
+}
+
+std::optional<bool> ascendingParam(const VEXO::WebCGI& cgi) {
+    const std::string word = cgi.GetParam("sort_direction", "asc");
+    if (word == "asc") return true;
+    if (word == "desc") return false;
+    return std::nullopt;
+}
+
+std::optional<std::vector<std::string>> pathParams(const VEXO::WebCGI& cgi) {
+    std::vector<std::string> paths;
+    for (const std::string& raw : cgi.GetParams("path_raw")) {
+        const auto path = percentDecode(raw);
+        if (!path) return std::nullopt;
+        paths.push_back(*path);
+    }
+    for (const std::string& path : cgi.GetParams("path")) {
+        if (path.find('\0') != std::string::npos) return std::nullopt;
+        paths.push_back(path);
+    }
+    return paths;
+}
+
 std::optional<std::string> pathParam(const VEXO::WebCGI& cgi) {
     if (cgi.HasParam("path_raw")) return percentDecode(cgi.GetParam("path_raw", ""));
     std::string path = cgi.GetParam("path", "");

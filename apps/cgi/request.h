@@ -5,7 +5,9 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
+#include "orvel/dir_entry.h"
 #include "reply.h"
 #include "vexo/web.h"
 
@@ -38,9 +40,19 @@ int actAs(const char* sid, const std::string& user, bool needsHome);
 std::optional<unsigned long> numberParam(const VEXO::WebCGI& cgi, const char* name, unsigned long fallback);
 std::optional<unsigned long> parseNumber(std::string_view text);
 
+// Whether the request is a POST: a link that somebody follows must change nothing.
+bool isPosted();
+
+// "filetype": "dir", "file" or "all" (default); "sort_direction": true for "asc" (default), false for "desc". Nothing
+// for any other word.
+std::optional<_tag_dir_entry_type_> typeParam(const VEXO::WebCGI& cgi);
+std::optional<bool> ascendingParam(const VEXO::WebCGI& cgi);
+
 // The share-relative path of a request: "path_raw", percent-encoded once more so that its bytes can be anything, or
 // "path". Nothing for a path that cannot be one: a NUL byte or a broken "%".
 std::optional<std::string> pathParam(const VEXO::WebCGI& cgi);
+// Those of a request that takes several: every "path_raw", then every "path". Nothing when one cannot be a path.
+std::optional<std::vector<std::string>> pathParams(const VEXO::WebCGI& cgi);
 
 }  // namespace orvel::cgi
 

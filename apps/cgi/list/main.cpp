@@ -21,21 +21,6 @@
 namespace orvel::cgi {
 namespace {
 
-std::optional<_tag_dir_entry_type_> typeParam(const VEXO::WebCGI& web) {
-    const std::string word = web.GetParam("filetype", "all");
-    if (word == "dir") return DIR_ENTRY_TYPE_DIR;
-    if (word == "file") return DIR_ENTRY_TYPE_FILE;
-    if (word == "all") return DIR_ENTRY_TYPE_ALL;
-    return std::nullopt;
-}
-
-std::optional<bool> ascendingParam(const VEXO::WebCGI& web) {
-    const std::string word = web.GetParam("sort_direction", "asc");
-    if (word == "asc") return true;
-    if (word == "desc") return false;
-    return std::nullopt;
-}
-
 // Nothing when a parameter is not what it should be.
 std::optional<ListRequest> parse(const VEXO::WebCGI& web, const User& user) {
     const auto path = pathParam(web);

@@ -3,10 +3,10 @@
 // Parameters, from the query or a form:
 //   action           "mkdir", "rename" or "subfolders"; more of each at its function
 //   path, path_raw   what it is done to
+//   taskid           a search whose results shall show what was done
 // Actions that change something must be posted.
 #include <sys/stat.h>
 
-#include <cstdlib>
 #include <string_view>
 
 #include "operation/operation.h"
@@ -14,6 +14,7 @@
 #include "orvel/privilege.h"
 #include "orvel/share_path.h"
 #include "reply.h"
+#include "search_task.h"
 
 namespace orvel::cgi {
 namespace {
@@ -35,11 +36,6 @@ const Action* actionOf(const std::string& name) {
         if (action.name == name) return &action;
     }
     return nullptr;
-}
-
-bool isPosted() {
-    const char* method = getenv("REQUEST_METHOD");
-    return method != nullptr && std::string_view(method) == "POST";
 }
 
 // The share's rule for the path; below a home folder the file system alone decides.
@@ -75,7 +71,9 @@ void serve(Output& out) {
     if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
     const auto path = pathParam(web);
     const Action* action = actionOf(web.GetParam("action", ""));
-    if (!path || action == nullptr || (action->need != Need::kList && !isPosted())) {
+    const std::string search = web.GetParam("taskid", "");
+    if (!path || action == nullptr || (!search.empty() && !isTaskId(search)) ||
+        (action->need != Need::kList && !isPosted())) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
     Operation operation = {.user = user, .web = web, .path = *path, .info = {}, .data = {}};

@@ -2,6 +2,7 @@
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 #include "reply.h"
+#include "shown_search.h"
 #include "target.h"
 
 namespace orvel::cgi {
@@ -20,6 +21,7 @@ int makeFolderOperation(Operation& operation) {
         return code;
     }
     OrvLibDoLog(operation.user.name, info.path, 0, ORVEL_ACTION_MKDIR, true);
+    ShownSearch(operation.user.name, operation.web.GetParam("taskid", "")).added({info, target.folder, target.name});
     putPath(operation.data, "path", info.path);
     return ORV_ERR_NONE;
 }

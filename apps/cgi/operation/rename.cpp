@@ -10,6 +10,7 @@
 #include "orvel/error_state.h"
 #include "orvel/name_check.h"
 #include "reply.h"
+#include "shown_search.h"
 #include "target.h"
 #include "text.h"
 
@@ -56,6 +57,8 @@ int renameOperation(Operation& operation) {
         return OrvParseErrnoToError(errno, info.shareName.c_str(), info.realPath.c_str());
     }
     OrvLibDoLog(operation.user.name, info.path, 0, ORVEL_ACTION_RENAME, false);
+    ShownSearch(operation.user.name, operation.web.GetParam("taskid", ""))
+        .moved({info, target.folder, target.name}, {info, target.folder, *name});
     putPath(operation.data, "path", info.path.substr(0, info.path.rfind('/') + 1) + *name);
     return ORV_ERR_NONE;
 }

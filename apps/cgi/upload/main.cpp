@@ -6,6 +6,7 @@
 //   path, path_raw   the folder; each file goes into it under its own name
 // And for both:
 //   overwrite        "error" (default), "skip" or "overwrite": what an existing file means
+//   taskid           a search whose results shall show the files
 //
 // "data" of the reply is {"files":[{"path","size","skipped"}]}. The first file that cannot be stored ends the request;
 // those before it stay, and are told in "data" beside the error. Folders that do not exist are made.
@@ -26,6 +27,7 @@
 #include "orvel/upload_check.h"
 #include "reply.h"
 #include "request.h"
+#include "search_task.h"
 #include "text.h"
 #include "upload/store.h"
 #include "vexo/web.h"
@@ -41,6 +43,10 @@ std::optional<_tag__type_> modeOf(const std::string& word) {
     if (word == "skip") return OVERWRITE_MODE_SKIP;
     if (word == "overwrite") return OVERWRITE_MODE_OVERWRITE;
     return std::nullopt;
+}
+
+bool isNoneOrTask(const std::string& search) {
+    return search.empty() || isTaskId(search);
 }
 
 struct Outcome {
@@ -88,11 +94,12 @@ bool readBody(long long length, bool& whole, Take take) {
 void storeRaw(const User& user, const VEXO::WebCGI& web, long long length, Outcome& outcome) {
     const auto path = pathParam(web);
     const auto mode = modeOf(web.GetParam("overwrite", "error"));
-    if (!path || !mode) {
+    const std::string search = web.GetParam("taskid", "");
+    if (!path || !mode || !isNoneOrTask(search)) {
         outcome.fail(ORV_ERR_PARAMETER, web.GetParam("path", ""), Status::kBadRequest);
         return;
     }
-    Upload upload(user, *path, *mode);
+    Upload upload(user, *path, *mode, search);
     int code = upload.begin();
     bool whole = false;
     if (code == ORV_ERR_NONE) {
@@ -110,16 +117,21 @@ void storeRaw(const User& user, const VEXO::WebCGI& web, long long length, Outco
 class FormStore final : public PartSink {
  public:
     FormStore(const User& user, const VEXO::WebCGI& web, Outcome& outcome)
-        : user_(user), folder_(pathParam(web)), mode_(web.GetParam("overwrite", "error")), outcome_(outcome) {}
+        : user_(user),
+          folder_(pathParam(web)),
+          mode_(web.GetParam("overwrite", "error")),
+          search_(web.GetParam("taskid", "")),
+          outcome_(outcome) {}
 
     bool partBegin(const PartHeader& header) override {
         field_ = header.isFile ? "" : header.name;
         value_.clear();
         if (!header.isFile || header.fileName.empty()) return true;  // a form's file field that was left empty
         const auto mode = modeOf(mode_);
-        if (!folder_ || folder_->empty() || !mode) return outcome_.refuse(CGI_UPLOAD_FIELD, folder_.value_or(""));
+        const bool usable = folder_ && !folder_->empty() && mode && isNoneOrTask(search_);
+        if (!usable) return outcome_.refuse(CGI_UPLOAD_FIELD, folder_.value_or(""));
         const char* separator = folder_->ends_with('/') ? "" : "/";
-        upload_ = std::make_unique<Upload>(user_, *folder_ + separator + header.fileName, *mode);
+        upload_ = std::make_unique<Upload>(user_, *folder_ + separator + header.fileName, *mode, search_);
         return proceed(upload_->begin());
     }
 
@@ -141,6 +153,7 @@ class FormStore final : public PartSink {
         if (field_ == "path") folder_ = value_;
         if (field_ == "path_raw") folder_ = percentDecode(value_);
         if (field_ == "overwrite") mode_ = value_;
+        if (field_ == "taskid") search_ = value_;
         return true;
     }
 
@@ -149,7 +162,7 @@ class FormStore final : public PartSink {
 
     const User& user_;
     std::optional<std::string> folder_;
-    std::string mode_;
+    std::string mode_, search_;
     Outcome& outcome_;
     std::string field_, value_;
     std::unique_ptr<Upload> upload_;

@@ -13,6 +13,7 @@
 #include "orvel/share_path.h"
 #include "orvel/upload_check.h"
 #include "reply.h"
+#include "shown_search.h"
 
 namespace orvel::cgi {
 namespace {
@@ -103,6 +104,7 @@ int Upload::finish() {
         return code;
     }
     OrvLibDoLog(user_.name, path_, size(), ORVEL_ACTION_UPLOAD, false);
+    ShownSearch(user_.name, search_).added({info_, target.folder, target.name});
     return ORV_ERR_NONE;
 }
 

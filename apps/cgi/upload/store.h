@@ -20,7 +20,9 @@ int isCancelled();
 // which the object is only destroyed; nothing is left behind then.
 class Upload {
  public:
-    Upload(const User& user, std::string path, _tag__type_ mode) : user_(user), path_(std::move(path)), mode_(mode) {}
+    // `search`: task id of a search whose results shall show the file, "" for none.
+    Upload(const User& user, std::string path, _tag__type_ mode, std::string search)
+        : user_(user), path_(std::move(path)), mode_(mode), search_(std::move(search)) {}
 
     // Asks every rule and takes on the user's identity.
     int begin();
@@ -40,6 +42,7 @@ class Upload {
     const User& user_;
     std::string path_;
     _tag__type_ mode_;
+    std::string search_;
     bool skipped_ = false;
     PathInfo info_;
     Spool spool_;

@@ -1,0 +1,44 @@
+#include "chosen_folders.h"
+
+#include "confined.h"
+#include "orvel/error_state.h"
+#include "orvel/file_info.h"
+#include "orvel/privilege.h"
+#include "orvel/share_path.h"
+
+namespace orvel::cgi {
+namespace {
+
+int chooseFolder(const User& user, const std::string& path, std::string& folder) {
+    PathInfo info;
+    const char* sid = user.sid.empty() ? nullptr : user.sid.c_str();
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(user.name.c_str(), path, info)) return lastCode();
+    if (!CheckShareListPrivilege(user.name.c_str(), sid, info.path.c_str())) return ORV_ERR_DENIED;
+    std::string realPath;
+    const int code = confinedFolder(info, linkPolicyOf(info.shareName), realPath);
+    if (code != ORV_ERR_NONE) return code;
+    folder = "/" + definedShareName(info.shareName) + realPath.substr(info.shareRoot.size());
+    return ORV_ERR_NONE;
+}
+
+}  // namespace
+
+int chooseFolders(const User& user, const std::vector<std::string>& paths, std::vector<std::string>& folders,
+                  std::string& culprit) {
+    for (const std::string& path : paths) {
+        std::string folder;
+        const int code = chooseFolder(user, path, folder);
+        if (code == ORV_ERR_NONE) {
+            folders.push_back(folder);
+        } else if (code != ORV_ERR_DENIED) {
+            culprit = path;
+            return code;
+        }
+    }
+    if (!folders.empty()) return ORV_ERR_NONE;
+    culprit = paths.empty() ? "" : paths.front();
+    return ORV_ERR_DENIED;
+}
+
+}  // namespace orvel::cgi

@@ -1,0 +1,107 @@
+#include <json/value.h>
+
+#include <climits>
+#include <exception>
+#include <optional>
+#include <string>
+
+#include "found_entry.h"
+#include "listing.h"
+#include "orvel/error_state.h"
+#include "search/actions.h"
+#include "text.h"
+#include "vexo/error.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr unsigned long kUsualPage = 100;
+constexpr unsigned long kLongestPage = 10000;
+constexpr size_t kLongestFilter = 1000;
+
+// Nothing when a parameter is not what it should be.
+std::optional<ListRequest> parse(const User& user, const VEXO::WebCGI& web) {
+    const auto offset = numberParam(web, "offset", 0);
+    const auto limit = numberParam(web, "limit", kUsualPage);
+    const auto type = typeParam(web);
+    const auto ascending = ascendingParam(web);
+    const std::string filter = web.GetParam("filter", "");
+    if (!offset || !limit || !type || !ascending || filter.size() > kLongestFilter) return std::nullopt;
+    if (*offset > static_cast<unsigned long>(LONG_MAX) || *limit < 1 || *limit > kLongestPage) return std::nullopt;
+    return ListRequest{.user = user.name,
+                       .sid = user.sid,
+                       .path = "",
+                       .sortBy = web.GetParam("sort_by", ""),
+                       .ascending = *ascending,
+                       .offset = *offset,
+                       .limit = *limit,
+                       .additional = additionalBits(web.GetParam("additional", "")),
+                       .pattern = filter,
+                       .type = *type};
+}
+
+struct Page {
+    const FoundEntries& entries;
+    Listing& listing;
+    bool failed = false;
+};
+
+BOOL take(__tag_FI_FILE_INFO_DATA* record, void* arg) {
+    auto& page = *static_cast<Page*>(arg);
+    try {
+        page.listing.entries.push_back(page.entries.entryOf(*record));
+    } catch (const std::exception&) {
+        page.failed = true;  // memory is out; nothing may be thrown through the platform
+    }
+    return page.failed ? 0 : 1;
+}
+
+int query(const ListRequest& request, FileSearch::OrvSearchDBTask& results, Listing& listing) {
+    const FoundEntries entries(request.user, request.additional);
+    Page page = {entries, listing};
+    unsigned long long total = 0;
+    const bool read =
+        results.queryResult(request.offset, request.limit, request.sortBy.empty() ? nullptr : request.sortBy.c_str(),
+                            &request.ascending, &request.type, request.pattern.c_str(), take, &page, &total);
+    listing.total = total;
+    if (!read) return OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
+    return page.failed ? ORV_ERR_GENERAL : ORV_ERR_NONE;
+}
+
+Json::Value stateOf(const KTR::Task& record) {
+    Json::Value state;
+    state["finished"] = record.isFinished();
+    const Json::Value stopped = record.getProperty(kStoppedProperty);
+    state["stopped"] = stopped.isBool() && stopped.asBool();
+    const Json::Value noted = record.getProperty(kCodeProperty);
+    const int code = noted.isInt() ? noted.asInt() : record.hasFailed() ? ORV_ERR_GENERAL : ORV_ERR_NONE;
+    state["failed"] = code != ORV_ERR_NONE;
+    if (code != ORV_ERR_NONE) {
+        state["failure"]["code"] = code;
+        state["failure"]["key"] = OrvParseErrorToKTRString(code, nullptr);
+    }
+    const Json::Value shares = record.getProperty(kSharesProperty);
+    state["shares"] = shares.isObject() ? shares : Json::Value(Json::objectValue);
+    return state;
+}
+
+}  // namespace
+
+void listResults(Output& out, const User& user, const VEXO::WebCGI& web, const SearchTask& task) {
+    const auto request = parse(user, web);
+    if (!request) return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, "");
+    // Asked first: what is finished has all its results.
+    const Json::Value state = stateOf(*task.record);
+    Listing listing;
+    const int code = task.results == nullptr ? ORV_ERR_MISSING : query(*request, *task.results, listing);
+    if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, "");
+
+    beginReply(out, Status::kOk, user.cookie);
+    out.text() += "{\"success\":true,\"data\":";
+    appendJson(state, out.text());
+    out.text().back() = ',';
+    writePage(*request, listing, appendEntry, out);
+    out.text() += "}}";
+}
+
+}  // namespace orvel::cgi

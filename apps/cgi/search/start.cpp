@@ -1,0 +1,160 @@
+#include <fcntl.h>
+#include <json/value.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "background.h"
+#include "chosen_folders.h"
+#include "criteria.h"
+#include "descriptor.h"
+#include "orvel/error_state.h"
+#include "orvel/search_walker.h"
+#include "orvel/share_path.h"
+#include "search/actions.h"
+#include "text.h"
+#include "vexo/error.h"
+#include "vexo/index.h"
+
+namespace orvel::cgi {
+namespace {
+
+using FileSearch::OrvSearchWalker;
+
+constexpr size_t kMostFolders = 100;
+
+struct Search {
+    std::unique_ptr<OrvSearchWalker> walker;
+    std::unique_ptr<KTR::Task> record;
+    std::string database;
+    const Criteria& criteria;
+    Descriptor ready;  // closed once the background process has noted itself
+};
+
+int platformCode() {
+    const int code = OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
+    return code != ORV_ERR_NONE ? code : ORV_ERR_GENERAL;
+}
+
+// Writes the records that are still on their way: who reads "finished" reads all of them. 0 or a library code.
+int flush(const std::string& database) {
+    FIQUERY query = {};
+    unsigned long long count = 0;
+    return FILEIDXCountGet(database.c_str(), &query, &count) < 0 ? platformCode() : ORV_ERR_NONE;
+}
+
+// The search itself, in a process of its own.
+int run(void* arg) {
+    Search& search = *static_cast<Search*>(arg);
+    if (!search.record->attach()) return 1;
+    search.ready = Descriptor();
+    VLIBCErrSetEx(0, __FILE__, __LINE__);
+    int code = search.walker->Walk(search.criteria.accessTimes()) ? ORV_ERR_NONE : platformCode();
+    const int written = flush(search.database);
+    if (code == ORV_ERR_NONE) code = written;
+    // A record that could not be stored is no reason for the walk to end, but for saying so.
+    const int last = VLIBCErrGet();
+    if (code == ORV_ERR_NONE && (last == VEXO_ERR_NO_SPACE || last == VEXO_ERR_QUOTA)) code = platformCode();
+
+    KTR::Task& record = *search.record;
+    if (!record.beginUpdate()) return 1;
+    record.setProperty(kStoppedProperty, *stopFlag() != 0);
+    if (code != ORV_ERR_NONE) record.setProperty(kCodeProperty, code);
+    record.finish();
+    return record.endUpdate() ? 0 : 1;
+}
+
+// Which shares are searched, and how.
+Json::Value waysOf(const std::vector<std::string>& folders) {
+    Json::Value ways(Json::objectValue);
+    for (const std::string& folder : folders) {
+        std::string share = folder.substr(1, folder.find('/', 1) - 1);
+        if (IsDirUserHome(share, nullptr)) share = "homes";
+        ways[readable(share)] = FILEIDXIsIndexEnable(share.c_str()) == 1 ? "index" : "walk";
+    }
+    return ways;
+}
+
+bool note(Search& search, const std::vector<std::string>& folders, const User& user) {
+    search.record = makeRecord(user.name, search.walker->getDBTaskId());
+    if (search.record == nullptr) return false;
+    KTR::Task& record = *search.record;
+    if (!record.beginUpdate()) return false;
+    record.setProperty(kVolumeProperty, search.walker->getDBVol());
+    record.setProperty(kSharesProperty, waysOf(folders));
+    return record.endUpdate();
+}
+
+// Goes on with the search in the background. 0 once its process can be found there.
+int launch(Search& search) {
+    int ends[2];
+    if (pipe2(ends, O_CLOEXEC) != 0) return OrvParseErrnoToError(errno, nullptr, nullptr);
+    const Descriptor noted(ends[0]);
+    search.ready = Descriptor(ends[1]);
+    if (startBackground(run, &search) < 0) return OrvParseErrnoToError(errno, nullptr, nullptr);
+    search.ready = Descriptor();
+    char nothing = 0;
+    while (read(noted.get(), &nothing, 1) < 0 && errno == EINTR) {
+    }
+    return ORV_ERR_NONE;
+}
+
+int beginSearch(const User& user, const std::vector<std::string>& folders, bool recursive, const Criteria& criteria,
+                std::string& id) {
+    Search search = {std::make_unique<OrvSearchWalker>(user.name.c_str(), user.sid.c_str(), stopFlag()), nullptr, "",
+                     criteria, Descriptor()};
+    search.walker->setSearchCurrentDir(!recursive);
+    if (!search.walker->init(folders, criteria.list())) return platformCode();
+    id = search.walker->getDBTaskId();
+    const std::string volume = search.walker->getDBVol();
+    search.database = FileSearch::OrvSearchDBTask::getDBTaskFilePath(volume.c_str(), user.name.c_str(), id.c_str());
+    int code = note(search, folders, user) ? ORV_ERR_NONE : platformCode();
+    if (code == ORV_ERR_NONE) code = launch(search);
+    if (code == ORV_ERR_NONE) return code;
+    unlink(search.database.c_str());
+    if (search.record != nullptr) search.record->remove();
+    return code;
+}
+
+bool needsHome(const std::vector<std::string>& paths) {
+    for (const std::string& path : paths) {
+        if (IsDirUserHome(path, nullptr)) return true;
+    }
+    return false;
+}
+
+}  // namespace
+
+void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
+    const auto paths = pathParams(web);
+    const std::string recursive = web.GetParam("recursive", "true");
+    if (!paths || paths->empty() || paths->size() > kMostFolders || (recursive != "true" && recursive != "false")) {
+        return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
+    }
+    Criteria criteria;
+    Json::Value data;
+    std::string culprit;
+    int code = parseCriteria([&web](const std::string& name) { return web.GetParam(name, ""); }, criteria, culprit);
+    if (code != ORV_ERR_NONE) {
+        data["parameter"] = culprit;
+        const Status status = code == ORV_ERR_PARAMETER ? Status::kBadRequest : Status::kOk;
+        return reply(out, status, user.cookie, code, "", data);
+    }
+    umask(022);  // whatever the web server's is
+    std::vector<std::string> folders;
+    code = actAs(user.sid.c_str(), user.name, needsHome(*paths));
+    if (code == ORV_ERR_NONE) code = chooseFolders(user, *paths, folders, culprit);
+    if (code == ORV_ERR_NONE) {
+        sweepTasks(user.name);
+        std::string id;
+        code = beginSearch(user, folders, recursive == "true", criteria, id);
+        if (code == ORV_ERR_NONE) data["taskid"] = id;
+    }
+    reply(out, Status::kOk, user.cookie, code, culprit, data);
+}
+
+}  // namespace orvel::cgi

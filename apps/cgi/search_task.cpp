@@ -1,0 +1,81 @@
+#include "search_task.h"
+
+#include <json/value.h>
+#include <poll.h>
+#include <sys/pidfd.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <ctime>
+
+#include "descriptor.h"
+#include "orvel/error_state.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr const char* kPrefix = "Quorvane_Search_";
+constexpr size_t kLongestId = 16;  // two numbers of 32 bits
+constexpr long long kKept = 2LL * 24 * 60 * 60;
+constexpr int kPatience = 2000;  // milliseconds
+
+bool hasEnded(const Descriptor& process, int milliseconds) {
+    pollfd watched = {process.get(), POLLIN, 0};
+    return poll(&watched, 1, milliseconds) == 1;
+}
+
+}  // namespace
+
+bool isTaskId(const std::string& text) {
+    return !text.empty() && text.size() <= kLongestId &&
+           text.find_first_not_of("0123456789ABCDEF") == std::string::npos;
+}
+
+int findTask(const std::string& user, const std::string& id, SearchTask& task) {
+    task.record.reset(KTR::TaskMgr(user.c_str()).getTask((kPrefix + id).c_str()));
+    if (task.record == nullptr) return ORV_ERR_MISSING;
+    const Json::Value volume = task.record->getProperty(kVolumeProperty);
+    if (volume.isString()) {
+        task.results.reset(FileSearch::OrvSearchDBTaskMgr(user.c_str()).getDBTask(volume.asCString(), id.c_str()));
+    }
+    return ORV_ERR_NONE;
+}
+
+std::unique_ptr<KTR::Task> makeRecord(const std::string& user, const std::string& id) {
+    return std::unique_ptr<KTR::Task>(KTR::TaskMgr(user.c_str()).createTask((kPrefix + id).c_str()));
+}
+
+bool endWork(KTR::Task& record, bool forGood) {
+    const pid_t worker = record.getWorker();
+    const Descriptor process(worker > 0 ? pidfd_open(worker, 0) : -1);
+    // The number may have gone to another process before the descriptor was opened, but not after.
+    if (!process || record.getWorker() != worker) return true;
+    pidfd_send_signal(process.get(), SIGTERM, nullptr, 0);
+    if (hasEnded(process, kPatience)) return true;
+    if (!forGood) return false;
+    pidfd_send_signal(process.get(), SIGKILL, nullptr, 0);
+    return hasEnded(process, kPatience);
+}
+
+bool removeTask(const SearchTask& task) {
+    if (task.results != nullptr) {
+        const std::string file = task.results->getDBTaskFilePath();
+        task.results->remove();
+        unlink((file + "-journal").c_str());  // what a killed process left
+    }
+    return task.record->remove();
+}
+
+void sweepTasks(const std::string& user) {
+    Json::Value names(Json::arrayValue);
+    if (!KTR::TaskMgr(user.c_str()).getAllTaskId(kPrefix, names)) return;
+    const long long now = time(nullptr);
+    for (const Json::Value& name : names) {
+        const std::string id = name.asString().substr(std::string(kPrefix).size());
+        SearchTask task;
+        if (!isTaskId(id) || findTask(user, id, task) != ORV_ERR_NONE) continue;
+        if (task.record->isFinished() && task.record->getCreateTime() < now - kKept) removeTask(task);
+    }
+}
+
+}  // namespace orvel::cgi

@@ -1,0 +1,57 @@
+#include "shown_search.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include "confined.h"
+#include "orvel/user_directory.h"
+#include "vexo/stat.h"
+
+namespace orvel::cgi {
+namespace {
+
+// The path that rows have: no links below the share's root. "" when it cannot be told.
+std::string rowPath(const ChangedFile& file) {
+    const std::string& shareRoot = file.info.shareRoot;
+    const Descriptor root(open(shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    if (!root) return "";
+    const std::string top = realPathOf(root), folder = realPathOf(file.folder);
+    if (top.empty() || !folder.starts_with(top)) return "";
+    return shareRoot + folder.substr(top.size()) + "/" + file.name;
+}
+
+bool statusOf(const std::string& path, _tag_VEXOSTAT_& status) {
+    return VLIBCFileLStat(path.c_str(), VEXO_STAT_BASIC | VEXO_STAT_CREATE_TIME, &status) >= 0;
+}
+
+}  // namespace
+
+ShownSearch::ShownSearch(const std::string& user, const std::string& taskId) {
+    if (isTaskId(taskId)) findTask(user, taskId, task_);
+}
+
+void ShownSearch::added(const ChangedFile& file) {
+    _tag_VEXOSTAT_ status;
+    if (task_.results == nullptr) return;
+    const std::string path = rowPath(file);
+    if (path.empty() || !statusOf(path, status)) return;
+    const std::string share = definedShareName(file.info.shareName);
+    OrvelUserEnum names;
+    // The first leaves a row that is there as it is, the second refreshes it.
+    task_.results->insertFile(share, path, names.GetUserNameByUID(status.st_uid),
+                              names.GetGroupNameByGID(status.st_gid), status);
+    task_.results->updateFile(share, path, share, path, status);
+}
+
+void ShownSearch::moved(const ChangedFile& from, const ChangedFile& to) {
+    _tag_VEXOSTAT_ status;
+    if (task_.results == nullptr) return;
+    const std::string source = rowPath(from), target = rowPath(to);
+    if (source.empty() || target.empty() || !statusOf(target, status)) return;
+    const std::string sourceShare = definedShareName(from.info.shareName);
+    const std::string targetShare = definedShareName(to.info.shareName);
+    task_.results->updateFile(sourceShare, source, targetShare, target, status);
+    if (S_ISDIR(status.st_mode)) task_.results->updateFileInFolder(sourceShare, source, targetShare, target);
+}
+
+}  // namespace orvel::cgi

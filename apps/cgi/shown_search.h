@@ -1,0 +1,38 @@
+// The search whose results the user has on screen while he changes files: its rows follow what is done.
+#ifndef ORVEL_CGI_SHOWN_SEARCH_H
+#define ORVEL_CGI_SHOWN_SEARCH_H
+
+#include <string>
+
+#include "descriptor.h"
+#include "orvel/file_info.h"
+#include "search_task.h"
+
+namespace orvel::cgi {
+
+// A file or folder by the open folder that holds it. `info`: what a path in the same share resolved to.
+struct ChangedFile {
+    const PathInfo& info;
+    const Descriptor& folder;
+    const std::string& name;
+};
+
+// Calls come after the operation, as the user. A row that cannot be brought up to date is logged; the operation was
+// done all the same.
+class ShownSearch {
+ public:
+    // `taskId`: parameter "taskid", "" for none. One that the user does not have, or no more, is none.
+    ShownSearch(const std::string& user, const std::string& taskId);
+
+    // A file or folder came into being, or a file got a new content.
+    void added(const ChangedFile& file);
+    // What was `from` is `to` now, with everything below it.
+    void moved(const ChangedFile& from, const ChangedFile& to);
+
+ private:
+    SearchTask task_;
+};
+
+}  // namespace orvel::cgi
+
+#endif
