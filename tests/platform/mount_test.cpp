@@ -1,11 +1,11 @@
 // The mount table and what is told from it.
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <filesystem>
 #include <string>
 
 #include "mount_table.h"
@@ -19,30 +19,16 @@ namespace {
 class MountTest : public support::ApplianceTest {};
 
 TEST_F(MountTest, ParsesWhatTheKernelWrites) {
-    const vexo::MountTable table = vexo::parseMountTable(
-        "/dev/root / ext4 rw 0 0\n"
-        "# /dev/none /none ext4 rw 0 0\n"
-        "\n"
-        "/dev/sdb1\t/volume1/my\\040disk\\011x\\134y vfat rw 0 0\n"
-        "server:/export /volume1/remote/ nfs4 rw,vers=4.2 0 0\n"
-        "torn /volume1/torn\n"
-        "x /volume1/odd\\9 fuse.thing rw 0 0\n"
-        "x /volume1/last\\04 vfat");
-    ASSERT_EQ(table.size(), 5U);
-    const struct {
-        const char* folder;
-        const char* typeName;
-        int type;
-    } wanted[] = {{"/", "ext4", 0},
-                  {"/volume1/my disk\tx\\y", "vfat", VEXO_FS_FAT},
-                  {"/volume1/remote", "nfs4", 8},
-                  {"/volume1/odd\\9", "fuse.thing", VEXO_FS_UNKNOWN},
-                  {"/volume1/last\\04", "vfat", VEXO_FS_FAT}};
-    for (size_t i = 0; i < table.size(); ++i) {
-        EXPECT_EQ(table[i].folder, wanted[i].folder);
-        EXPECT_EQ(table[i].typeName, wanted[i].typeName);
-        EXPECT_EQ(table[i].type, wanted[i].type);
+    std::string text;
+    for (const vexo::Mount& mount : vexo::parseMountTable(
+             "/dev/root / ext4 rw 0 0\n# /dev/none /none ext4 rw 0 0\n\n"
+             "/dev/sdb1\t/volume1/my\\040disk\\011x\\134y vfat rw 0 0\nserver:/export /volume1/remote/ nfs4 rw 0 0\n"
+             "torn /volume1/torn\nx /volume1/odd\\9 fuse.thing rw 0 0\nx /volume1/last\\04 vfat")) {
+        text += mount.folder + ' ' + mount.typeName + ' ' + std::to_string(mount.type) + '\n';
     }
+    EXPECT_EQ(text,
+              "/ ext4 0\n/volume1/my disk\tx\\y vfat 1\n/volume1/remote nfs4 8\n/volume1/odd\\9 fuse.thing 11\n"
+              "/volume1/last\\04 vfat 1\n");
 }
 
 TEST_F(MountTest, TypeIsThatOfTheLongestMountAboveThePath) {
@@ -50,26 +36,22 @@ TEST_F(MountTest, TypeIsThatOfTheLongestMountAboveThePath) {
     addMount("/volume1/usb", "xfs");
     addMount("/volume1/usb", "vfat");  // mounted over it later
     addMount("/volume1/iso", "udf");
-    addMount("/volume1/odd", "fuseblk");
     const struct {
         const char* path;
         int type;
     } cases[] = {{"/", 0},
-                 {"/etc", 0},
-                 {"/volume1", 2},
                  {"/volume10/a", 0},
-                 {"/volume1/photo/a.jpg", 2},
-                 {"/volume1/usb", VEXO_FS_FAT},
-                 {"/volume1/usb/a/b", VEXO_FS_FAT},
+                 {"/volume1", 2},
                  {"/volume1//usb//a", VEXO_FS_FAT},
                  {"/volume1/usbx", 2},
                  {"/volume1/iso/", 5},
-                 {"/volume1/odd/a", VEXO_FS_UNKNOWN},
                  {"relative", VEXO_FS_UNKNOWN},
                  {"", VEXO_FS_UNKNOWN}};
     for (const auto& c : cases) EXPECT_EQ(VEXOGetFSType(c.path, 0), c.type) << c.path;
-    EXPECT_EQ(VEXOGetFSType(nullptr, 0), -1);
-    EXPECT_EQ(errno, EINVAL);
+    for (int type = -1; type <= 12; ++type) {
+        EXPECT_EQ(VEXOFSIsRemoteFS(type), static_cast<int>(type >= 6 && type <= 8)) << type;
+        EXPECT_EQ(VEXOFSIsImageFS(type), static_cast<int>(type == 4 || type == 5)) << type;
+    }
 }
 
 TEST_F(MountTest, MountPointsAreFoundWithoutTouchingTheFileSystem) {
@@ -80,14 +62,11 @@ TEST_F(MountTest, MountPointsAreFoundWithoutTouchingTheFileSystem) {
         const char* path;
         int index, remote;
         const char* typeName;
-    } cases[] = {{"/", 0, 0, "ext4"},
-                 {"//", 0, 0, "ext4"},
-                 {"/nowhere/remote", 1, 1, "cifs"},
+    } cases[] = {{"//", 0, 0, "ext4"},
                  {"/nowhere/remote///", 1, 1, "cifs"},
                  {"/nowhere/remote/a", -1, 0, ""},
                  {"/nowhere/my disk", 2, 0, "iso9660"},
                  {"/nowhere/other", 3, 0, "fuse.sshfs"},
-                 {"/nowhere", -1, 0, ""},
                  {"", -1, 0, ""}};
     for (const auto& c : cases) {
         SCOPED_TRACE(c.path);
@@ -98,34 +77,20 @@ TEST_F(MountTest, MountPointsAreFoundWithoutTouchingTheFileSystem) {
         EXPECT_EQ(WebUtils::IsMountPoint(c.path), c.index >= 0);
         EXPECT_EQ(WebUtils::getMountType(c.path), c.typeName);
     }
-    EXPECT_EQ(VEXOFSIsInMountTable(nullptr), -1);
-    // The questions of WebUtils do not count as the last one.
     EXPECT_EQ(VEXOFSIsInMountTable("/nowhere/remote"), 1);
     EXPECT_FALSE(WebUtils::IsMountPoint("/nowhere"));
-    EXPECT_EQ(VEXOFSIsRemoteFS(), 1);
+    EXPECT_EQ(VEXOFSIsRemoteFS(), 1) << "the questions of WebUtils do not count as the last one";
+    EXPECT_EQ(VEXOFSIsInMountTable(nullptr), -1);
+    EXPECT_EQ(VEXOFSIsRemoteFS(), 0);
 }
 
-TEST_F(MountTest, KindsOfTypes) {
-    for (int type = -1; type <= 12; ++type) {
-        EXPECT_EQ(VEXOFSIsRemoteFS(type), type == 6 || type == 7 || type == 8 ? 1 : 0) << type;
-        EXPECT_EQ(VEXOFSIsImageFS(type), type == 4 || type == 5 ? 1 : 0) << type;
-    }
-    EXPECT_STREQ(rgszFsType[VEXO_FS_FAT], "vfat");
-    EXPECT_STREQ(rgszFsType[8], "nfs4");
-}
-
-TEST_F(MountTest, AChangedTableIsReadAgain) {
-    EXPECT_EQ(VEXOFSIsInMountTable("/volume9"), -1);
+TEST_F(MountTest, AChangedTableIsReadAgainAndAnUnreadableOneFails) {
     for (int round = 0; round < 20; ++round) {  // faster than the clock of file times
         addMount("/volume9/" + std::to_string(round), "nfs");
         EXPECT_EQ(VEXOFSIsInMountTable(("/volume9/" + std::to_string(round)).c_str()), round + 1);
     }
-}
-
-TEST_F(MountTest, AnUnreadableTableFails) {
-    ASSERT_EQ(unlink((systemRoot() + "/proc/mounts").c_str()), 0);
-    ASSERT_EQ(mkdir((systemRoot() + "/proc/mounts").c_str(), 0700), 0);
-    VLIBCErrSetEx(0, "", 0);
+    std::filesystem::remove(systemRoot() + "/proc/mounts");
+    support::makeFolder(systemRoot() + "/proc/mounts");
     errno = 0;
     EXPECT_EQ(VEXOGetFSType("/volume1", 0), -1);
     EXPECT_NE(errno, 0);
@@ -155,66 +120,56 @@ TEST_F(MountTest, TheMachinesOwnTableFollowsMountsAndForks) {
 }
 
 TEST_F(MountTest, VolumesAndTheirKinds) {
+    const std::string longOne = "/" + std::string(4096, 'v');
+    const auto text = [](const char* path) {
+        VOLUMEPATHINFO info;
+        VLIBCErrSetEx(0, "", 0);
+        if (VolumePathParse(path, &info) <= 0) return std::to_string(VLIBCErrGet());
+        return std::string(info.szVolume) + " " + std::to_string(info.kind);
+    };
+    const std::string refused = std::to_string(VEXO_ERR_PARAMETER);
+    const std::string internal = " " + std::to_string(VEXO_VOLUME_INTERNAL);
     writeRootFile("/etc/vexo/volumes",
                   "# removable\n/volumeUSB1 4\n/volumeSATA esata\n/mnt/deep/ usb\n/torn\n/volumeX what\n");
     const struct {
         const char* path;
-        const char* volume;
-        int kind;
-    } cases[] = {{"/volume1/photo/a", "/volume1", VEXO_VOLUME_INTERNAL},
-                 {"/volumeUSB1", "/volumeUSB1", VEXO_VOLUME_USB},
-                 {"/volumeUSB1/share/a", "/volumeUSB1", VEXO_VOLUME_USB},
-                 {"/volumeUSB12/share", "/volumeUSB12", VEXO_VOLUME_INTERNAL},
-                 {"/volumeSATA/x", "/volumeSATA", VEXO_VOLUME_ESATA},
-                 {"/mnt/deep/share", "/mnt", VEXO_VOLUME_USB},
-                 {"/mnt/other", "/mnt", VEXO_VOLUME_INTERNAL},
-                 {"/volumeX/a", "/volumeX", VEXO_VOLUME_INTERNAL},
-                 {"/", "/", VEXO_VOLUME_INTERNAL}};
-    for (const auto& c : cases) {
-        SCOPED_TRACE(c.path);
-        VOLUMEPATHINFO info;
-        EXPECT_GT(VolumePathParse(c.path, &info), 0);
-        EXPECT_STREQ(info.szVolume, c.volume);
-        EXPECT_EQ(info.kind, c.kind);
-    }
-    VOLUMEPATHINFO info;
+        std::string volume;
+    } cases[] = {{"/volume1/photo/a", "/volume1" + internal},
+                 {"/volumeUSB1", "/volumeUSB1 4"},
+                 {"/volumeUSB12/share", "/volumeUSB12" + internal},
+                 {"/volumeSATA/x", "/volumeSATA 8"},
+                 {"/mnt/deep/share", "/mnt 4"},
+                 {"/mnt/other", "/mnt" + internal},
+                 {"/volumeX/a", "/volumeX" + internal},
+                 {"/", "/" + internal},
+                 {nullptr, refused},
+                 {"", refused},
+                 {"volume1/a", refused},
+                 {longOne.c_str(), refused}};
+    for (const auto& c : cases) EXPECT_EQ(text(c.path), c.volume) << &c - cases;
     // Anything but a regular file is no volumes file, and a pipe's writer is not waited for.
     const std::string file = systemRoot() + "/etc/vexo/volumes";
-    ASSERT_EQ(unlink(file.c_str()), 0);
-    ASSERT_EQ(mkfifo(file.c_str(), 0600), 0);
-    EXPECT_GT(VolumePathParse("/volumeUSB1/a", &info), 0);
-    EXPECT_EQ(info.kind, VEXO_VOLUME_INTERNAL);
-    ASSERT_EQ(unlink(file.c_str()), 0);
-    const std::string longOne = "/" + std::string(4096, 'v');
-    for (const char* bad : {static_cast<const char*>(nullptr), "", "volume1/a", longOne.c_str()}) {
-        VLIBCErrSetEx(0, "", 0);
-        EXPECT_LE(VolumePathParse(bad, &info), 0);
-        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_PARAMETER);
-    }
+    ASSERT_TRUE(std::filesystem::remove(file) && mkfifo(file.c_str(), 0600) == 0);
+    EXPECT_EQ(text("/volumeUSB1/a"), "/volumeUSB1" + internal);
 }
 
 TEST_F(MountTest, HiddenNamesAndSmallTexts) {
-    const struct {
-        const char* name;
-        int dir, file;
-    } names[] = {{".", 0, 1},   {"..", 0, 1}, {"@tmp", 0, 1}, {"@vexoea", 1, 1}, {"@vexoea2", 0, 0}, {"@Tmp", 0, 0},
-                 {"...", 0, 0}, {".x", 0, 0}, {"@", 0, 0},    {"", 0, 0},        {"#recycle", 0, 0}, {nullptr, 0, 0}};
-    for (const auto& c : names) {
-        EXPECT_EQ(VEXOEAIsHiddenDir(c.name), c.dir) << (c.name ? c.name : "null");
-        EXPECT_EQ(VEXOEAIsHiddenFile(c.name), c.file) << (c.name ? c.name : "null");
+    EXPECT_EQ(VEXOEAIsHiddenDir("@vexoea"), 1);
+    for (const char* name : {".", "..", "@tmp", "@vexoea"}) EXPECT_EQ(VEXOEAIsHiddenFile(name), 1) << name;
+    for (const char* name : {".", "..", "@tmp", "@vexoea2", ""}) EXPECT_EQ(VEXOEAIsHiddenDir(name), 0) << name;
+    for (const char* name : {"@vexoea2", "@Tmp", "...", ".x", "@", "", "#recycle"}) {
+        EXPECT_EQ(VEXOEAIsHiddenFile(name), 0) << name;
     }
     using Pieces = std::vector<std::string>;
     EXPECT_EQ(WebUtils::StringExplode("//photo//2012/", "/"), (Pieces{"photo", "2012"}));
     EXPECT_EQ(WebUtils::StringExplode("a::b:c", "::"), (Pieces{"a", "b:c"}));
-    EXPECT_EQ(WebUtils::StringExplode("", "/"), Pieces{});
     EXPECT_EQ(WebUtils::StringExplode("ab", ""), Pieces{"ab"});
     const std::string file = shareRoot("photo") + "/a";
     support::writeFile(file, "");
     const timespec times[] = {{5, 0}, {1234567890, 5}};
-    ASSERT_EQ(utimensat(AT_FDCWD, file.c_str(), times, 0), 0);
+    ASSERT_EQ(utimensat(-1, file.c_str(), times, 0), 0);
     EXPECT_EQ(WebUtils::GetModifyTime(file.c_str()), "1234567890");
     EXPECT_EQ(WebUtils::GetModifyTime((file + "x").c_str()), "0");
-    EXPECT_EQ(WebUtils::GetModifyTime(nullptr), "0");
 }
 
 }  // namespace
