@@ -89,7 +89,8 @@ bool matches(const LoginRecord& record, const Check& check) {
 
 bool hasLiveAccount(const char* user) {
     UserRecord record;
-    return VEXOUserGet(user, acquire(record)) >= 0 && VEXOUserIsExpired(record->expiry) != 1;
+    const int found = VEXOUserGet(user, acquire(record));
+    return found >= 0 && VEXOUserIsExpired(record->expiry) != 1;
 }
 
 bool isAdministrator(const char* user) {

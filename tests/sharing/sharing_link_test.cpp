@@ -1,0 +1,256 @@
+// A visitor's way: the link's row, the log-in, the cookie, the page.
+#include "orvel/sharing_link.h"
+
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <ctime>
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "fault_gate.h"
+#include "sharing/clock.h"
+#include "sharing/record_file.h"
+#include "support/appliance.h"
+#include "support/log_texts.h"
+#include "vexo/auto_block.h"
+#include "vexo/error.h"
+
+namespace fs = std::filesystem;
+using OrvelLogin::FolderSharingLoginManager;
+using support::announceLog;
+
+namespace {
+
+using Texts = std::vector<std::string>;
+
+class SharingLinkTest : public support::ApplianceTest {
+ protected:
+    void SetUp() override {
+        ApplianceTest::SetUp();
+        setenv("REMOTE_ADDR", "10.0.0.5", 1);
+        support::makeFolder(systemRoot() + "/tmp", 01777);
+        support::makeFolder(systemRoot() + "/var/lib/vexo");
+        support::uptime = 100000;
+        support::secondsSlept = 0;
+    }
+    void TearDown() override {
+        for (const char* name : {"REMOTE_ADDR", "HTTP_COOKIE", "QUERY_STRING", "HTTP_FOLDER_SHARING",
+                                 "HTTP_X_FORWARDED_FOR", "USERNAME"}) {
+            unsetenv(name);
+        }
+        ApplianceTest::TearDown();
+    }
+    static std::string database() { return systemRoot() + "/usr/vexo/etc/pexlander/pxsharing.db"; }
+    static void sql(const std::string& text) {
+        support::makeFolder(fs::path(database()).parent_path());
+        sqlite3* db = nullptr;
+        ASSERT_EQ(sqlite3_open(database().c_str(), &db), SQLITE_OK);
+        EXPECT_EQ(sqlite3_exec(db, text.c_str(), nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
+        sqlite3_close(db);
+    }
+    static std::string pathOf(const std::string& link) {
+        setenv("HTTP_FOLDER_SHARING", link.c_str(), 1);
+        VEXO::WebCGI cgi;
+        return FolderSharingLoginManager().GetSharingFolderPath(cgi);
+    }
+    static std::string headerOf(VEXO::WebCGI& cgi) {
+        testing::internal::CaptureStdout();
+        cgi.WriteHeader("x");
+        fflush(stdout);
+        return testing::internal::GetCapturedStdout();
+    }
+    FolderSharingLoginManager manager;
+};
+
+TEST_F(SharingLinkTest, TheRowOfALink) {
+    const long now = time(nullptr);
+    const auto row = [](const std::string& id, const std::string& uid, const std::string& path,
+                        const std::string& available, const std::string& expires) {
+        return "INSERT INTO sharingLinks VALUES('" + id + "'," + uid + "," + path + ",'f','p'," + available + "," +
+               expires + ");";
+    };
+    sql("CREATE TABLE sharingLinks(linkID TEXT, uid TEXT, filepath TEXT, filename TEXT, password TEXT, AvailDate TEXT, "
+        "ExpDate TEXT);" +
+        row("open", "'alice'", "'/photo'", "'0'", "'0'") + row("it''s \"", "'alice'", "'/quoted'", "'0'", "'0'") +
+        row("future", "'alice'", "'/photo'", "'" + std::to_string(now + 1000) + "'", "'99999999999'") +
+        row("past", "'alice'", "'/photo'", "'0'", "'" + std::to_string((now - 200000) / 10 * 10) + "'") +
+        row("noUser", "NULL", "'/photo'", "'0'", "'0'") + row("noPath", "'alice'", "NULL", "'0'", "'0'") +
+        row("noBegin", "'alice'", "'/photo'", "NULL", "'0'") + row("noEnd", "'alice'", "'/photo'", "'0'", "NULL") +
+        row("nothing", "'alice'", "'/photo'", "NULL", "'10'"));
+    const std::string end = "orvellogin:# Sharing download DBquery failed";
+    const std::string outside = "orvellogin:# sharing link out of valid duration";
+    struct Case {
+        std::string link, path;
+        Texts log;
+    };
+    for (const auto& [link, path, log] : std::vector<Case>{
+             {"open", "/photo", {}},
+             {"it's \"", "/quoted", {}},
+             {"future", "/photo", {outside, end}},  // returned all the same
+             {"past", "/photo", {outside, end}},
+             {"noUser", "", {"orvellogin:# faild to fetch uid", end}},
+             {"noPath", "", {}},
+             {"noBegin", "/photo", {"orvellogin:# faild to fetch AvailDate", end}},  // an end of 0 does not mend it
+             {"noEnd", "/photo", {"orvellogin:# ExpDate", end}},
+             {"nothing", "/photo", {"orvellogin:# faild to fetch AvailDate", outside, end}},
+             {"' OR 1 --", "", {"orvellogin:# faild to fetch query result", end}},
+         }) {
+        EXPECT_EQ(pathOf(link), path) << link;
+        EXPECT_EQ(support::takeLogTexts(), log) << link;
+    }
+
+    // The header comes before the parameter; without both nothing is asked.
+    setenv("QUERY_STRING", "FOLDER_SHARING=open", 1);
+    EXPECT_EQ(pathOf("noPath"), "");
+    unsetenv("HTTP_FOLDER_SHARING");
+    VEXO::WebCGI cgi;
+    EXPECT_EQ(manager.GetSharingFolderPath(cgi), "/photo");
+    unsetenv("QUERY_STRING");
+    VEXO::WebCGI none;
+    vexo::gate::reset();
+    EXPECT_EQ(manager.GetSharingFolderPath(none), "");
+    EXPECT_FALSE(manager.isAuthorized(none));
+    EXPECT_EQ(vexo::gate::calls("VEXODBConnect"), 0);
+}
+
+TEST_F(SharingLinkTest, DatabasesThatCannotBeAsked) {
+    const Texts unconnected = {"orvellogin:# Failed to connect to database", "orvellogin:# DB Query failed",
+                               "orvellogin:# Sharing download DBquery failed"};
+    EXPECT_EQ(pathOf("x"), "");
+    EXPECT_EQ(support::takeLogTexts(), unconnected);
+    EXPECT_FALSE(fs::exists(database())) << "never made";
+    support::writeFile(database(), "no database at all, but long enough to be taken for the header of one.......");
+    EXPECT_EQ(pathOf("it's"), "");
+    const Texts broken = support::takeLogTexts();
+    ASSERT_EQ(broken.size(), 3U);
+    EXPECT_EQ(broken[0],
+              "orvellogin:# Failed to exec [SELECT * FROM sharingLinks WHERE linkID = 'it''s' LIMIT 1;] (file is not a "
+              "database)");
+    EXPECT_EQ(broken[1], unconnected[1]);
+    EXPECT_EQ(broken[2], unconnected[2]);
+    EXPECT_EQ(pathOf(std::string(120000, '\'')), "");
+    EXPECT_EQ(support::takeLogTexts().size(), 3U);
+}
+
+TEST_F(SharingLinkTest, LoggedInByACookieOfTheLink) {
+    VEXO::WebCGI first;
+    char user[64] = "untouched";
+    _tag_confirm_policy policy = {.flags = 15, .keepAccessTime = 0};
+    EXPECT_EQ(manager.isAuthorized(&first, user, sizeof user, &policy, CGI_POSITION_FILE_MANAGER, "L"), -5);
+    EXPECT_STREQ(user, "untouched");
+    EXPECT_EQ(manager.GetLoginUserName(), "");
+    ASSERT_TRUE(manager.folderSharingLogin(first, "L", "alice"));
+    ASSERT_TRUE(manager.folderSharingLogin(first, "K", "carol"));
+    EXPECT_EQ(manager.GetLoginUserName(), "carol");
+    EXPECT_EQ(support::secondsSlept, 2U);
+
+    const std::string header = headerOf(first), records = support::readFile(systemRoot() + orvel::kRecordFile);
+    const auto sessionOf = [&](const std::string& line) {
+        return records.substr(records.find(line) + line.size(), 13);
+    };
+    const std::string alice = sessionOf("10.0.0.5,alice,"), carol = sessionOf("10.0.0.5,carol,");
+    EXPECT_EQ(header,
+              "Set-Cookie: L=" + alice + "; Path=/\r\nSet-Cookie: K=" + carol + "; Path=/\r\nContent-Type: x\r\n\r\n");
+
+    setenv("HTTP_COOKIE", ("L=" + alice + "; K=" + carol).c_str(), 1);
+    setenv("HTTP_FOLDER_SHARING", "K", 1);
+    VEXO::WebCGI second;
+    FolderSharingLoginManager later;
+    EXPECT_EQ(later.isAuthorized(&second, user, sizeof user, &policy, CGI_POSITION_FILE_MANAGER, "K"), 2);
+    EXPECT_TRUE(later.isAuthorized(second, "L"));
+    EXPECT_EQ(later.GetLoginUserName(), "alice");
+    EXPECT_TRUE(later.isAuthorized(second));
+    EXPECT_EQ(later.GetLoginUserName(), "carol");
+    EXPECT_TRUE(later.folderSharingLogin(second, "L", "bob")) << "logged in already: nothing new";
+    EXPECT_EQ(later.GetLoginUserName(), "alice");
+    EXPECT_EQ(support::secondsSlept, 2U);
+
+    // A check that fails leaves what stands in the buffer: the name of a user who may no longer pass.
+    writeRootFile("/etc/vexo/applications", "VEXO.QDS.App.Quorvane3.Instance: carol\n");
+    user[0] = '\0';
+    EXPECT_EQ(later.isAuthorized(&second, user, sizeof user, &policy, CGI_POSITION_FILE_MANAGER, "L"), -2);
+    EXPECT_EQ(later.GetLoginUserName(), "alice");
+    EXPECT_EQ(later.isAuthorized(&second, nullptr, 0, &policy, CGI_POSITION_FILE_MANAGER, "K"), -4);
+}
+
+TEST_F(SharingLinkTest, RefusedLogins) {
+    VEXO::WebCGI cgi;
+    _tag_login_params params = {
+        .user = "alice", .password = "p", .service = "s", .allowedKinds = 15, .neverExpires = 0};
+    char session[8] = {};
+    const auto login = [&](const char* user, int kinds, const char* log) {
+        if (log != nullptr) announceLog(log);
+        params.user = user;
+        params.allowedKinds = kinds;
+        return manager.login(&cgi, session, sizeof session, &params, "L");
+    };
+    for (const auto& [user, kinds] : {std::pair{"alice", 13}, {"carol", 14}, {"DOM\\dora", 11}, {"dan@ldap", 7}}) {
+        EXPECT_EQ(login(user, kinds, "LOGIN_ERR_INVALID"), -3) << user;
+    }
+    for (const auto& [user, kinds] : {std::pair{"alice", 2}, {"carol", 1}, {"DOM\\dora", 4}, {"dan@ldap", 8}}) {
+        EXPECT_EQ(login(user, kinds, nullptr), 1) << user;  // a user who is not known is not logged
+    }
+    vexo::gate::fail("VEXOGroupIsAdminGroupMemEx", VEXO_ERR_GENERAL, EIO, 1);
+    EXPECT_EQ(login("bob", 2, "VEXOGroupIsAdminGroupMem(bob) failed. [0x8100 "), 1) << "counts as no administrator";
+    vexo::gate::fail("VEXO::WebCGI::AddCookieToHeader", 0, 0, 1);
+    EXPECT_EQ(login("alice", 15, ") AddCookieToHeader failed."), 1);
+    EXPECT_EQ(std::string(session).size(), 7U) << "cut to its buffer";
+    EXPECT_EQ(login(nullptr, 15, ") Bad parameter."), -4);
+    params.password = nullptr;
+    EXPECT_EQ(login("alice", 15, ") Bad parameter."), -4);
+    params.password = "p";
+    announceLog(") Bad parameter.");
+    EXPECT_EQ(login("a,b", 15, "VexoCgiLoginAddUser failed."), -4);
+
+    setenv("REMOTE_ADDR", "10.0.0.66", 1);
+    setSetting("autoblock_attempts", "2");
+    manager.folderSharingFailLoginSet();
+    EXPECT_EQ(login("alice", 15, nullptr), 1) << "one failure, which success forgets";
+    for (int i = 0; i < 2; ++i) manager.folderSharingFailLoginSet();
+    EXPECT_EQ(login("alice", 15, "VEXOAutoBlockIsDeniedIP"), -3);
+    unsetenv("REMOTE_ADDR");
+    EXPECT_EQ(login("alice", 15, "Failed to get client ip."), -4);
+    announceLog("Failed to get client ip.");
+    manager.folderSharingFailLoginSet();
+}
+
+TEST_F(SharingLinkTest, ThePageOnStandardOutput) {
+    const std::string desktop = systemRoot() + "/usr/vexo/vexoman/webman";
+    support::makeFolder(desktop);
+    fs::last_write_time(desktop, fs::file_time_type::clock::now());
+    setenv("QUERY_STRING", "tunnel=/t&noCache=", 1);
+    VEXO::WebCGI cgi;
+    ASSERT_TRUE(cgi.AddCookieToHeader("/", "L", "s"));
+    testing::internal::CaptureStdout();
+    manager.WriteWebPage(cgi, "digest", "/photo/a'b");
+    const std::string plain = testing::internal::GetCapturedStdout();
+    EXPECT_TRUE(
+        plain.starts_with("Set-Cookie: L=s; Path=/\r\nContent-Type: text/html; charset=\"UTF-8\"\r\n\r\n"
+                          "    <!DOCTYPE html>    <html>\n"));
+    EXPECT_TRUE(plain.ends_with("<body>\n</body></html>\n"));
+    EXPECT_NE(plain.find("var g_FolderPath = '/photo/a\\'b';"), std::string::npos);
+    EXPECT_NE(plain.find("var g_MD5 = 'digest';"), std::string::npos);
+    struct stat status = {};
+    ASSERT_EQ(stat(desktop.c_str(), &status), 0);
+    const std::string version = std::to_string(status.st_mtime);
+    EXPECT_NE(plain.find("src='/t/webman/vexodefs.cgi?v=" + version + "'"), std::string::npos);
+    EXPECT_NE(plain.find("FolderSharingLoader.js?" + version + "'"), std::string::npos);
+
+    setenv("QUERY_STRING", "noCache=1", 1);
+    VEXO::WebCGI fresh;
+    testing::internal::CaptureStdout();
+    manager.WriteWebPage(fresh, "", "");
+    const std::string busted = testing::internal::GetCapturedStdout();
+    const std::string before = "FolderSharingLoader.js?" + version;
+    const int number = atoi(busted.c_str() + busted.find(before) + before.size());
+    EXPECT_TRUE(number >= 1 && number <= 1000) << number;
+    EXPECT_NE(busted.find("style.css?v=" + version + std::to_string(number) + "'"), std::string::npos);
+    EXPECT_NE(busted.find("var g_Version = '" + version + "'"), std::string::npos) << "no suffix here";
+}
+
+}  // namespace
