@@ -98,8 +98,8 @@ std::optional<PendingChange> parsePendingChange(std::string_view text) {
 
 bool isOnTheWay(std::string_view text, const PendingChange& change) {
     const auto& [before, after] = change;
-    const auto [shortest, longest] = std::minmax(before.size(), after.size());
-    if (text.size() < shortest || text.size() > longest) return false;
+    if (text.size() < std::min(before.size(), after.size())) return false;
+    if (text.size() > std::max(before.size(), after.size())) return false;
     for (size_t i = 0; i < text.size(); ++i) {
         const bool isOld = i < before.size() && text[i] == before[i];
         if (!isOld && text[i] != (i < after.size() ? after[i] : '\n')) return false;
