@@ -1,0 +1,284 @@
+// How a search begins, fails, is stopped and dies.
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <filesystem>
+#include <string>
+
+#include "fault_gate.h"
+#include "orvel/identity.h"
+#include "orvel/search_walker.h"
+#include "search/search_fixture.h"
+#include "support/fault_sweep.h"
+#include "support/log_texts.h"
+#include "vexo/error.h"
+
+using namespace FileSearch;
+using namespace support;
+namespace fs = std::filesystem;
+
+namespace {
+
+class SearchRunTest : public SearchFixture {
+ protected:
+    static std::string only(const std::string& text) { return "orvelsearch:# " + text; }
+};
+
+// Matches everything; what happens at each file is the test's business.
+class Probe : public FindComp {
+ public:
+    explicit Probe(std::function<void(int)> at) : at_(std::move(at)) {
+        setSqlCond(*primary_, FI_COL_SIZE, FI_OP_GREATER_EQUAL, 0ULL, nullptr, nullptr);
+    }
+    bool operator()(const char*, const _tag_VEXOSTAT_&) override {
+        at_(++seen);
+        return true;
+    }
+    using FindComp::operator();
+    int seen = 0;
+
+ private:
+    std::function<void(int)> at_;
+};
+
+TEST_F(SearchRunTest, WhatInitRefuses) {
+    makeFolder(shareRoot("photo") + "/#recycle");
+    makeFolder(shareRoot("homes") + "/alice/sub");
+    inOwnProcess([&] {
+        FindTypeComp all(false);
+        struct Case {
+            const char* user;
+            std::vector<std::string> folders;
+            bool criteria;
+            int error;
+            std::vector<std::string> log;
+        };
+        const std::string nowhere = only("Fail to find any directory");
+        const Case cases[] = {
+            {"alice", {"/photo"}, false, VEXO_ERR_PARAMETER, {}},
+            {"alice", {}, true, VEXO_ERR_DENIED, {nowhere}},
+            {"alice", {"/photo/#recycle"}, true, VEXO_ERR_DENIED, {nowhere}},
+            {"nobody-here", {"/home"}, true, VEXO_ERR_PATH, {}},
+            {"eve", {"/photo"}, true, VEXO_ERR_DENIED, {nowhere}},
+            {"alice", {"/photo/none"}, true, VEXO_ERR_DENIED, {nowhere}},
+        };
+        addUser("eve", 20009, kUsersGid);
+        for (const Case& test : cases) {
+            SCOPED_TRACE(std::string(test.user) + (test.folders.empty() ? "" : test.folders.front()));
+            int flag = 0;
+            OrvSearchWalker walker(test.user, nullptr, &flag);
+            EXPECT_FALSE(
+                walker.init(test.folders, test.criteria ? std::vector<FindComp*>{&all} : std::vector<FindComp*>()));
+            EXPECT_EQ(VLIBCErrGet(), test.error);
+            auto log = takeLogTexts();
+            std::erase_if(log, [](const std::string& line) { return !line.starts_with("orvelsearch"); });
+            EXPECT_EQ(log, test.log);
+            EXPECT_STREQ(walker.getDBTaskId(), "");
+            EXPECT_STREQ(walker.getDBVol(), "");
+            VLIBCErrSetEx(0, "", 0);
+            EXPECT_FALSE(walker.Walk({}));
+            EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_PARAMETER);
+        }
+
+        int flag = 0;
+        OrvSearchWalker walker("alice", nullptr, &flag);
+        vexo::gate::fail("FILEIDXDBCreate", VEXO_ERR_NO_SPACE, ENOSPC);
+        EXPECT_FALSE(walker.init({"/photo"}, {&all}));
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_NO_SPACE);
+        const auto log = takeLogTexts();
+        EXPECT_TRUE(log.size() == 1 && log[0].starts_with(only("Fail to ceate DB /tmp/@tmp/orvel/PXSearch/alice/")));
+        EXPECT_FALSE(walker.Walk({})) << "not initialised";
+
+        // What is refused silently does not hinder the others; a home is what it is on disk.
+        SearchShareDirMap map;
+        for (const char* folder : {"/photo/#recycle", "/photo/x/../", "/home/sub/", "/photo", "/photo/none"}) {
+            EXPECT_TRUE(map.insertDir("alice", nullptr, folder));
+        }
+        takeLog();
+        ASSERT_EQ(map.shares().size(), 2U);
+        EXPECT_EQ(map.findShare("home"), nullptr);
+        ASSERT_EQ(map.findShare("photo")->size(), 1U);
+        const PathInfo& home = map.findShare("homes")->at(0);
+        EXPECT_EQ(home.path, "/homes/alice/sub");
+        EXPECT_EQ(home.realPath, shareRoot("homes") + "/alice/sub");
+        EXPECT_EQ(home.shareName + home.shareRoot + home.volumePath, "homes" + shareRoot("homes") + "/tmp");
+    });
+}
+
+TEST_F(SearchRunTest, WhatAWalkMeets) {
+    SKIP_WITHOUT_ROOT();
+    const std::string folder = shareRoot("photo") + "/chosen";
+    struct Case {
+        const char* name;
+        std::function<void()> change;
+        bool result;
+        int error;
+        std::vector<std::string> log;
+    };
+    const Case cases[] = {
+        {"gone", [&] { fs::remove(folder); }, false, VEXO_ERR_MISSING, {}},
+        {"denied", [&] { chmod(shareRoot("photo").c_str(), 0700); }, false, VEXO_ERR_DENIED, {}},
+        {"no folder above",
+         [&] {
+             fs::rename(shareRoot("photo"), shareRoot("photo") + "-aside");
+             writeFile(shareRoot("photo"), "");
+         },
+         false,
+         VEXO_ERR_GENERAL,
+         {only("Fail to Stat " + folder + ", Not a directory")}},
+        {"a file",
+         [&] {
+             fs::remove(folder);
+             writeFile(folder, "");
+         },
+         true,
+         0,
+         {}},
+        {"a link",
+         [&] {
+             fs::rename(folder, folder + "-moved");
+             EXPECT_EQ(symlink("chosen-moved", folder.c_str()), 0);
+         },
+         true,
+         0,
+         {}},
+    };
+    for (const Case& test : cases) {
+        SCOPED_TRACE(test.name);
+        makeFolder(folder, 0755);
+        inOwnProcess([&] {
+            FindTypeComp all(false);
+            int flag = 0;
+            OrvSearchWalker walker("bob", nullptr, &flag);
+            EXPECT_TRUE(walker.init({"/photo/chosen"}, {&all}));
+            test.change();
+            EXPECT_EQ(OrvLibUGIDSet(nullptr, "bob"), 0);
+            VLIBCErrSetEx(0, "", 0);
+            EXPECT_EQ(walker.Walk({}), test.result);
+            EXPECT_EQ(VLIBCErrGet(), test.error);
+            EXPECT_EQ(takeLogTexts(), test.log);
+        });
+        for (const char* aside : {"", "-aside"}) fs::remove_all(shareRoot("photo") + aside);
+        addShare("photo", "read only = no\nvalid users = alice\nread list = bob\n");
+    }
+
+    // Without a flag the walk ends, as failed, with its first entry; a failing index fails the search.
+    for (const char* name : {"/a", "/b"}) writeFile(shareRoot("photo") + name, "");
+    inOwnProcess([&] {
+        FindTypeComp all(false);
+        OrvSearchWalker walker("alice", nullptr, nullptr);
+        EXPECT_TRUE(walker.init({"/photo"}, {&all}));
+        EXPECT_FALSE(walker.Walk({}));
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_PATH);
+        EXPECT_EQ(takeLogTexts(), std::vector<std::string>{only("Fail to walk " + shareRoot("photo"))});
+        OrvSearchDBTask task(walker.getDBVol(), "alice", walker.getDBTaskId());
+        EXPECT_EQ(rowsOf(task).size(), 1U);
+
+        addShare("photo", "read only = no\nvalid users = alice\nvexo:index = yes\n");
+        buildIndex({"photo"});
+        int flag = 0;
+        OrvSearchWalker indexed("alice", nullptr, &flag);
+        EXPECT_TRUE(indexed.init({"/photo"}, {&all}));
+        vexo::gate::fail("FILEIDXResultGetAndTableGen", VEXO_ERR_GENERAL, EIO);
+        EXPECT_FALSE(indexed.Walk({}));
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_PARAMETER);
+    });
+}
+
+TEST_F(SearchRunTest, CancelLeavesTheResultsSoFar) {
+    for (const char* name : {"docs/a", "docs/b", "photo/a", "photo/b/c", "photo/d"}) {
+        const std::string path = name;
+        writeFile(shareRoot(path.substr(0, path.find('/'))) + path.substr(path.find('/')), "");
+    }
+    inOwnProcess([&] {
+        struct Case {
+            int raisedAt, value;
+            int seen;  // entries that were looked at
+        };
+        // 1 ends the walk at once; any other value ends the search behind the folder that is being walked.
+        const Case cases[] = {{0, 1, 0}, {0, 7, 0}, {1, 1, 1}, {1, 2, 2}, {2, 1, 2}, {4, 1, 4}, {4, 2, 6}, {99, 1, 6}};
+        for (const Case& test : cases) {
+            SCOPED_TRACE(std::to_string(test.raisedAt) + ":" + std::to_string(test.value));
+            int flag = 0;
+            Probe probe([&](int seen) { flag = seen == test.raisedAt ? test.value : flag; });
+            OrvSearchWalker walker("alice", nullptr, &flag);
+            EXPECT_TRUE(walker.init({"/photo", "/docs"}, {&probe}));
+            if (test.raisedAt == 0) flag = test.value;
+            EXPECT_TRUE(walker.Walk({}));
+            EXPECT_EQ(probe.seen, test.seen);
+            OrvSearchDBTask task(walker.getDBVol(), "alice", walker.getDBTaskId());
+            EXPECT_EQ(rowsOf(task).size(), static_cast<size_t>(test.seen));
+            EXPECT_TRUE(task.remove());
+        }
+    });
+}
+
+TEST_F(SearchRunTest, ResultsOutliveTheSearchThatWasKilled) {
+    for (int i = 0; i < 300; ++i) writeFile(shareRoot("photo") + "/" + std::to_string(i), "");
+    for (const int killedAt : {1, 2, 150, 300}) {
+        SCOPED_TRACE(killedAt);
+        int id[2];
+        ASSERT_EQ(pipe(id), 0);
+        const pid_t child = fork();
+        if (child == 0) {
+            int flag = 0;
+            Probe probe([&](int seen) {
+                if (seen == killedAt) raise(SIGKILL);
+                usleep(5000);
+            });
+            OrvSearchWalker walker("alice", nullptr, &flag);
+            if (!walker.init({"/photo"}, {&probe})) _exit(1);
+            if (write(id[1], walker.getDBTaskId(), strlen(walker.getDBTaskId())) < 0) _exit(1);
+            walker.Walk({});
+            _exit(1);
+        }
+        close(id[1]);
+        char taskId[64] = {};
+        EXPECT_GT(read(id[0], taskId, sizeof taskId - 1), 0);
+        close(id[0]);
+        int status = 0;
+        waitpid(child, &status, 0);
+        EXPECT_TRUE(WIFSIGNALED(status));
+        inOwnProcess([&] {
+            OrvSearchDBTask task("/tmp", "alice", taskId);
+            const size_t rows = rowsOf(task).size();
+            EXPECT_LT(rows, static_cast<size_t>(killedAt));
+            EXPECT_TRUE(killedAt < 300 || rows > 50U) << "what is older than a second is there";
+            EXPECT_TRUE(task.remove());
+        });
+    }
+}
+
+TEST_F(SearchRunTest, EveryFaultOfThePlatform) {
+    SKIP_WITHOUT_ROOT();
+    for (const char* name : {"/a", "/b/c", "/d"}) writeFile(shareRoot("photo") + name, "");
+    writeFile(shareRoot("docs") + "/e", "");
+    inOwnProcess([&] {
+        buildIndex({"docs"});
+        const Query query{{"/photo", "/docs", "/home"}, {{0, nullptr, "*"}, {8, "less", "100"}, {7, "since", "1"}}};
+        const Rows all = search("alice", query);
+        EXPECT_EQ(all.size(), 5U);
+        EXPECT_EQ(seteuid(kAliceUid), 0);
+        Criteria criteria(query.asks);
+        const int faults = sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
+            int flag = 0;
+            OrvSearchWalker walker("alice", nullptr, &flag);
+            const bool ready = walker.init(query.folders, criteria.all);
+            const bool done = ready && walker.Walk(criteria.accessTimes);
+            EXPECT_EQ(geteuid(), static_cast<uid_t>(kAliceUid));
+            EXPECT_TRUE(nth != 0 || done);
+            if (!ready) return;
+            vexo::gate::reset();
+            OrvSearchDBTask task(walker.getDBVol(), "alice", walker.getDBTaskId());
+            for (const auto& [key, row] : rowsOf(task))
+                EXPECT_TRUE(all.contains(key) && (all.at(key) == row || nth != 0));
+            EXPECT_TRUE(task.remove());
+        });
+        EXPECT_GT(faults, 20);
+    });
+}
+
+}  // namespace
