@@ -1,6 +1,7 @@
 #include "util/wildcard.h"
 
 #include <unicode/uchar.h>
+#include <unicode/utf8.h>
 
 namespace orvel {
 namespace {
@@ -39,6 +40,16 @@ const char* decodeFolded(const char* at, const char* end, UChar32& code) {
     at = decodeMultibyte(at, end, code);
     code = u_foldCase(code, U_FOLD_CASE_DEFAULT);
     return at;
+}
+
+// The code is of a folded character.
+void appendWellFormed(UChar32 code, std::string& out) {
+    constexpr UChar32 replacement = 0xFFFD;
+    if (code == 0 || code > UCHAR_MAX_VALUE || U_IS_SURROGATE(code)) code = replacement;
+    char encoded[U8_MAX_LENGTH];
+    std::size_t length = 0;
+    U8_APPEND_UNSAFE(encoded, length, code);
+    out.append(encoded, length);
 }
 
 // The next position from which the elements behind a run, the first of them `first`, can match; `end` when none.
@@ -102,6 +113,19 @@ std::size_t Wildcard::compileRun(std::string_view pattern, std::size_t at) {
     return at;
 }
 
+std::vector<std::string> Wildcard::literals() const {
+    std::vector<std::string> found;
+    bool behindLiteral = false;
+    for (const UChar32 element : elements_) {
+        if (element >= 0) {
+            if (!behindLiteral) found.emplace_back();
+            appendWellFormed(element, found.back());
+        }
+        behindLiteral = element >= 0;
+    }
+    return found;
+}
+
 bool Wildcard::match(std::string_view text) const {
     if (matchesNothing_) return false;
     const char* at = text.data();
@@ -136,6 +160,15 @@ bool Wildcard::match(std::string_view text) const {
         element = behindRun;
     }
     return true;
+}
+
+void appendComparable(std::string_view text, std::string& out) {
+    const char* at = text.data();
+    for (const char* const end = at + text.size(); at < end;) {
+        UChar32 code = 0;
+        at = decodeFolded(at, end, code);
+        appendWellFormed(code, out);
+    }
 }
 
 }  // namespace orvel

@@ -6,6 +6,7 @@
 #include <unicode/utypes.h>
 
 #include <cstddef>
+#include <string>
 #include <string_view>
 #include <vector>
 
@@ -29,6 +30,10 @@ class Wildcard {
     // Whether the whole of `text` fits. Costs at most pattern length x text length, without recursion or allocation.
     [[nodiscard]] bool match(std::string_view text) const;
 
+    // The stretches of literal characters between the wildcards, in the form of appendComparable. A name that fits the
+    // pattern holds each of them in that form.
+    [[nodiscard]] std::vector<std::string> literals() const;
+
  private:
     // An element of the compiled pattern: a folded code point, or one of these, which are negative.
     enum : UChar32 { kAny = -1, kRun = -2 };
@@ -38,6 +43,10 @@ class Wildcard {
     std::vector<UChar32> elements_;
     bool matchesNothing_ = false;
 };
+
+// Appends `text` as the comparison sees it: each character folded, as well-formed UTF-8 without NUL. Equal characters
+// give equal text; those that have no such form all give U+FFFD.
+void appendComparable(std::string_view text, std::string& out);
 
 }  // namespace orvel
 

@@ -20,6 +20,7 @@
 #include <sstream>
 
 #include "fault_gate.h"
+#include "index_connections.h"
 #include "orvel/error_state.h"
 
 namespace fs = std::filesystem;
@@ -182,6 +183,7 @@ void ApplianceTest::TearDown() {
     for (const auto& part : announced) ADD_FAILURE() << "announced, but never logged: " << part;
     capturedLog.clear();
     announced.clear();
+    vexo::fileindex::closeDatabases();
     EXPECT_EQ(openDescriptors(), descriptors_) << "descriptors were left open";
     if (chdir("/") != 0) ADD_FAILURE() << "chdir: " << strerror(errno);
     std::error_code ignored;

@@ -4,8 +4,9 @@
 // databases, one for each search, which lie where their caller says and may be anybody's garbage: a file that is no
 // regular file, has a second name, belongs neither to root nor to the effective user, or holds no such database is
 // refused. Operations that take a database path keep it open for the process; records inserted are committed in
-// batches, within a second and before anything is read, and at exit. In every database the pair of share and path is
-// unique.
+// batches, within a second and before anything is read, and at exit; a process that ends by _exit calls FILEIDXDBFlush
+// before. A forked child begins anew and leaves what its parent has open alone. In every database the pair of share and
+// path is unique. Operations may be called from callbacks.
 //
 // Where nothing else is said an operation gives 0 or more on success, and on failure <0 with the slot set: 0x0900
 // missing or not to be opened, 0x0300 denied, 0x2900 no space, 0x0D00 a bad argument, 0x8100 anything else, a database
@@ -55,9 +56,11 @@ enum __tag_FI_SQL_COND_OP : int {
 //
 // Paths (column 5): op 8 with a value V holds for records directly in the folder V ("" is the share's root); and-linked
 // with op 9 on the same V it is widened to any depth below V. Op 8 with a value that ends in "/*" holds at any depth
-// below what stands before it; no other character is a wildcard. Op 6 is the wildcard comparison of names, without
-// case, backslash escapes. In the condition of a path that a search gives, the first component is the share's name and
-// is dropped.
+// below what stands before it; no other character is a wildcard. In the condition of a path that a search gives (the
+// `paths` of FILEIDXResultGetAndTableGen) the first component is the share's name and is dropped, and a final "/*" is a
+// folder of that name. Op 6, on any text, is the wildcard comparison of names, without case, backslash escapes; of a
+// pattern for names the first 493 bytes count, as in the criterion. Numbers beyond 64 bits count as the largest; the
+// id 4294967295 (columns 15 and 16) equals nothing.
 //
 // Evaluation: an or-chain holds when one of its members does; a member holds when its own test does and, where it has
 // an and-link of its own, that; a member without one takes the chain's first non-null and-link.
@@ -127,14 +130,17 @@ VEXO_API int FILEIDXDBCreate(const char* path);
 VEXO_API int FILEIDXOutputDBInsert(const char* db, const __tag_FI_FILE_INFO_DATA* record);
 VEXO_API int FILEIDXDBInsert(const char* db, const __tag_FI_FILE_INFO_DATA* records, int count);
 
-// Sets the columns of the and-linked nodes `set` (op 0) in every record for which `where` holds; a new name brings its
-// fold key along.
+// Sets the columns of the and-linked nodes `set` (op 0) in every record for which `where` holds; a record that already
+// stands at the new share and path is replaced. A null tree is a bad argument here: not every record is meant.
 VEXO_API int FILEIDXDBUpdate(const char* db, const __tag_FI_SQL_COND* set, const __tag_FI_SQL_COND* where);
 VEXO_API int FILEIDXDBDel(const char* db, const __tag_FI_SQL_COND* where);
 
+// Commits what this process wrote to the database so far.
+VEXO_API int FILEIDXDBFlush(const char* db);
+
 // How many records satisfy query->cond (sort, offset and limit do not count).
 VEXO_API int FILEIDXCountGet(const char* db, const FIQUERY* query, unsigned long long* count);
-// Calls `callback` for each record of the page in order; it ends the page by answering 0.
+// Calls `callback` for each record of the page in order; it ends the page by answering 0. A limit of 0 gives none.
 VEXO_API int FILEIDXDBSelect(const char* db, const FIQUERY* query, BOOL (*callback)(__tag_FI_FILE_INFO_DATA*, void*),
                              void* arg);
 

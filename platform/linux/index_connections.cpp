@@ -1,0 +1,205 @@
+#include "index_connections.h"
+
+#include <pthread.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <condition_variable>
+#include <csignal>
+#include <cstdlib>
+#include <map>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "failure.h"
+
+namespace vexo::fileindex {
+namespace {
+
+using Clock = Database::Clock;
+
+// After so long a batch is committed also when nothing more is inserted: somebody looks at the results meanwhile.
+constexpr std::chrono::milliseconds kBatchAge(500);
+constexpr size_t kMostOpen = 8;
+
+struct Entry {
+    std::string path;
+    dev_t device;
+    ino_t inode;
+    std::unique_ptr<Database> database;
+    bool isStore;
+    Failure failure;  // of a commit that nobody waited for; code 0: none
+    unsigned long long used;
+};
+
+// What one process has open. It is never destroyed, so that it serves also at exit; a forked child begins with an empty
+// one and leaves its parent's connections alone, which SQLite demands.
+class Connections {
+ public:
+    static Connections& ofThisProcess();
+
+    std::mutex mutex;
+    std::map<std::string, OpenMode> admitted;
+
+    Database* find(const std::string& path);
+    bool close(const std::string& path);
+    void stop();
+
+ private:
+    Connections() : owner_(getpid()) {}
+    Entry* openEntry(const std::string& path, const struct stat& status);
+    Database* use(Entry& entry);
+    void makeRoom();
+    void startCommitter();
+    void commitOld();
+
+    pid_t owner_;
+    std::vector<std::unique_ptr<Entry>> entries_;
+    unsigned long long uses_ = 0;
+    std::thread committer_;
+    std::condition_variable changed_;
+    bool stopping_ = false;
+};
+
+Connections& Connections::ofThisProcess() {
+    static Connections* now = nullptr;
+    if (now == nullptr || now->owner_ != getpid()) {
+        static Connections* inherited = nullptr;
+        inherited = now;  // stays reachable for leak checkers
+        static_cast<void>(inherited);
+        now = new Connections;
+        static const int registered = std::atexit(closeDatabases);
+        static_cast<void>(registered);
+    }
+    return *now;
+}
+
+Database* Connections::find(const std::string& path) {
+    const auto same = std::find_if(entries_.begin(), entries_.end(), [&](const auto& e) { return e->path == path; });
+    // While a batch is open its file is not asked for again: SQLite sees for itself when it begins the next.
+    if (same != entries_.end() && (*same)->database->batchBegan() && (*same)->failure.code == 0) return use(**same);
+    struct stat status {};
+    if (lstat(path.c_str(), &status) != 0) {
+        fail(errno == EACCES ? VEXO_ERR_DENIED : VEXO_ERR_FILE);
+        return nullptr;
+    }
+    // One connection for each file, whatever it is called: a second one would lose the first one's locks.
+    const auto found = std::find_if(entries_.begin(), entries_.end(), [&](const auto& e) {
+        return e->device == status.st_dev && e->inode == status.st_ino;
+    });
+    if (found != entries_.end()) return use(**found);
+    if (same != entries_.end()) entries_.erase(same);
+    Entry* entry = openEntry(path, status);
+    return entry == nullptr ? nullptr : use(*entry);
+}
+
+Entry* Connections::openEntry(const std::string& path, const struct stat& status) {
+    const auto mode = admitted.find(path);
+    const bool isStore = mode != admitted.end();
+    std::unique_ptr<Database> database = Database::open(path, isStore ? mode->second : OpenMode());
+    if (database == nullptr) return nullptr;
+    makeRoom();
+    entries_.push_back(
+        std::make_unique<Entry>(Entry{path, status.st_dev, status.st_ino, std::move(database), isStore, {}, 0}));
+    if (!isStore) startCommitter();
+    return entries_.back().get();
+}
+
+Database* Connections::use(Entry& entry) {
+    entry.used = ++uses_;
+    if (entry.failure.code != 0) {
+        const Failure failure = std::exchange(entry.failure, {});
+        fail(failure.code, failure.systemCode);
+        return nullptr;
+    }
+    return entry.database.get();
+}
+
+void Connections::makeRoom() {
+    if (entries_.size() < kMostOpen) return;
+    const auto oldest = std::min_element(entries_.begin(), entries_.end(),
+                                         [](const auto& a, const auto& b) { return a->used < b->used; });
+    static_cast<void>((*oldest)->database->commit());
+    entries_.erase(oldest);
+}
+
+bool Connections::close(const std::string& path) {
+    const auto found = std::find_if(entries_.begin(), entries_.end(), [&](const auto& e) { return e->path == path; });
+    if (found == entries_.end()) return true;
+    const bool done = use(**found) != nullptr && (*found)->database->commit();
+    entries_.erase(found);
+    return done;
+}
+
+// The thread takes no signals: they are for the program.
+void Connections::startCommitter() {
+    if (committer_.joinable()) {
+        changed_.notify_one();
+        return;
+    }
+    sigset_t all;
+    sigset_t before;
+    sigfillset(&all);
+    pthread_sigmask(SIG_SETMASK, &all, &before);
+    committer_ = std::thread([this] { commitOld(); });
+    pthread_sigmask(SIG_SETMASK, &before, nullptr);
+}
+
+void Connections::commitOld() {
+    const QuietFailures quiet;
+    std::unique_lock<std::mutex> lock(mutex);
+    while (!stopping_) {
+        changed_.wait_for(lock, kBatchAge / 2);
+        for (const auto& entry : entries_) {
+            const auto began = entry->database->batchBegan();
+            // The store is reached as root, and the whole process would become that.
+            if (entry->isStore || !began || Clock::now() - *began < kBatchAge) continue;
+            if (!entry->database->commit()) entry->failure = QuietFailures::last();
+        }
+    }
+}
+
+void Connections::stop() {
+    {
+        const std::lock_guard<std::mutex> lock(mutex);
+        stopping_ = true;
+    }
+    changed_.notify_all();
+    if (committer_.joinable()) committer_.join();
+    const std::lock_guard<std::mutex> lock(mutex);
+    stopping_ = false;
+    const RaisedIdentity raised;
+    for (const auto& entry : entries_) static_cast<void>(entry->database->commit());
+    entries_.clear();
+}
+
+}  // namespace
+
+Lease::Lease(const char* path) {
+    Connections& connections = Connections::ofThisProcess();
+    lock_ = std::unique_lock<std::mutex>(connections.mutex);
+    if (connections.admitted.contains(path)) raised_.emplace();
+    database_ = connections.find(path);
+}
+
+void admitDatabase(const std::string& path, OpenMode mode) {
+    Connections& connections = Connections::ofThisProcess();
+    const std::lock_guard<std::mutex> lock(connections.mutex);
+    connections.admitted[path] = mode;
+}
+
+bool dismissDatabase(const std::string& path) {
+    Connections& connections = Connections::ofThisProcess();
+    const std::lock_guard<std::mutex> lock(connections.mutex);
+    const RaisedIdentity raised;
+    connections.admitted.erase(path);
+    return connections.close(path);
+}
+
+void closeDatabases() {
+    Connections::ofThisProcess().stop();
+}
+
+}  // namespace vexo::fileindex

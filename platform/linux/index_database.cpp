@@ -1,0 +1,344 @@
+#include "index_database.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <utility>
+
+#include "failure.h"
+#include "file_io.h"
+#include "index_columns.h"
+#include "index_vfs.h"
+#include "vexo/error.h"
+
+namespace vexo::fileindex {
+namespace {
+
+using Node = __tag_FI_SQL_COND;
+
+// In a search that finds much, a batch is this large; in one that finds little, it is this old.
+constexpr int kBatchRows = 10000;
+constexpr std::chrono::milliseconds kBatchAge(300);
+constexpr int kBusyMilliseconds = 10000;
+constexpr int kSoonMilliseconds = 100;
+constexpr int kSetLimit = FI_COL_GROUP + 1;
+
+// Compared word for word before a database is used, so a change here makes another format.
+constexpr std::array<const char*, 4> kSchema = {
+    "CREATE TABLE record(id INTEGER PRIMARY KEY,name BLOB,share BLOB,path BLOB,parent BLOB,share_root BLOB,"
+    "extension BLOB,permission BLOB,owner BLOB,group_name BLOB,is_dir INTEGER,size INTEGER,created INTEGER,"
+    "changed INTEGER,accessed INTEGER,modified INTEGER,mode INTEGER,uid INTEGER,gid INTEGER)",
+    "CREATE UNIQUE INDEX record_address ON record(share,path)",
+    "CREATE TABLE state(records INTEGER,built INTEGER,updated INTEGER)",
+    "CREATE TABLE ranking(id INTEGER PRIMARY KEY,records BLOB)",
+};
+
+void matchFunction(sqlite3_context* context, int, sqlite3_value** values) {
+    const auto* pattern = static_cast<const orvel::Wildcard*>(sqlite3_value_pointer(values[0], "wildcard"));
+    const auto* text = static_cast<const char*>(sqlite3_value_blob(values[1]));
+    const auto length = static_cast<size_t>(sqlite3_value_bytes(values[1]));
+    const std::string_view name = text == nullptr ? std::string_view() : std::string_view(text, length);
+    sqlite3_result_int(context, static_cast<int>(pattern != nullptr && pattern->match(name)));
+}
+
+void comparableFunction(sqlite3_context* context, int, sqlite3_value** values) {
+    try {
+        const auto* text = static_cast<const char*>(sqlite3_value_blob(values[0]));
+        const auto length = static_cast<size_t>(sqlite3_value_bytes(values[0]));
+        std::string out;
+        if (text != nullptr) orvel::appendComparable({text, length}, out);
+        sqlite3_result_text64(context, out.data(), out.size(), SQLITE_TRANSIENT, SQLITE_UTF8);
+    } catch (...) {
+        sqlite3_result_error_nomem(context);
+    }
+}
+
+bool addFunctions(sqlite3* db) {
+    constexpr int flags = SQLITE_UTF8 | SQLITE_DETERMINISTIC | SQLITE_INNOCUOUS;
+    return sqlite3_create_function(db, "vexo_match", 2, flags, nullptr, matchFunction, nullptr, nullptr) == SQLITE_OK &&
+           sqlite3_create_function(db, "vexo_comparable", 1, flags, nullptr, comparableFunction, nullptr, nullptr) ==
+               SQLITE_OK;
+}
+
+// A file may be made to harm who opens it.
+void limit(sqlite3* db) {
+    sqlite3_db_config(db, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
+    sqlite3_db_config(db, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
+    sqlite3_db_config(db, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
+    sqlite3_db_config(db, SQLITE_DBCONFIG_ENABLE_LOAD_EXTENSION, 0, nullptr);
+    sqlite3_limit(db, SQLITE_LIMIT_LENGTH, 4 << 20);
+    sqlite3_limit(db, SQLITE_LIMIT_COLUMN, 100);
+    sqlite3_limit(db, SQLITE_LIMIT_ATTACHED, 0);
+    sqlite3_limit(db, SQLITE_LIMIT_WORKER_THREADS, 0);
+}
+
+std::vector<const Node*> nodesToSet(const Node* set) {
+    std::vector<const Node*> nodes;
+    for (const Node* node = set; node != nullptr; node = node->pAndNext) {
+        const Column* column = columnOf(node->type);
+        if (column == nullptr || node->op != FI_OP_EQUAL || nodes.size() == kSetLimit) return {};
+        nodes.push_back(node);
+    }
+    return nodes;
+}
+
+void append(std::vector<Value>& to, const std::vector<Value>& values) {
+    to.insert(to.end(), values.begin(), values.end());
+}
+
+}  // namespace
+
+const char* const kShareSchema =
+    "CREATE INDEX record_parent ON record(parent);"
+    "CREATE VIRTUAL TABLE trigram USING fts5(name,content='',columnsize=0,detail=none,"
+    "tokenize='trigram case_sensitive 1');"
+    "INSERT INTO trigram(rowid,name) SELECT id,vexo_comparable(name) FROM record;"
+    "CREATE TRIGGER record_insert AFTER INSERT ON record BEGIN "
+    "INSERT INTO trigram(rowid,name) VALUES(new.id,vexo_comparable(new.name));END;"
+    "CREATE TRIGGER record_delete AFTER DELETE ON record BEGIN "
+    "INSERT INTO trigram(trigram,rowid,name) VALUES('delete',old.id,vexo_comparable(old.name));END;"
+    "CREATE TRIGGER record_update AFTER UPDATE OF name ON record BEGIN "
+    "INSERT INTO trigram(trigram,rowid,name) VALUES('delete',old.id,vexo_comparable(old.name));"
+    "INSERT INTO trigram(rowid,name) VALUES(new.id,vexo_comparable(new.name));END;";
+
+Database::~Database() {
+    const KeepErrno keep;
+    insert_ = Statement();
+    sqlite3_close_v2(db_);
+}
+
+std::unique_ptr<Database> Database::open(const std::string& path, OpenMode mode) {
+    const std::string resolved = resolveFolder(path);
+    struct stat status {};
+    if (resolved.empty() || lstat(resolved.c_str(), &status) != 0) {
+        fail(errno == EACCES ? VEXO_ERR_DENIED : VEXO_ERR_FILE);
+        return nullptr;
+    }
+    if (!isTrusted(status, S_IFREG)) {
+        fail(VEXO_ERR_FILE, EACCES);
+        return nullptr;
+    }
+    const int flags = SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_NOFOLLOW | SQLITE_OPEN_EXRESCODE |
+                      (mode.readOnly ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE);
+    sqlite3* db = nullptr;
+    const int result = sqlite3_open_v2(resolved.c_str(), &db, flags, trustedFileSystem());
+    std::unique_ptr<Database> database(new Database(path, db));
+    if (result != SQLITE_OK) {
+        failSql(db, result);
+        return nullptr;
+    }
+    if (database->configure(mode) && database->hasOurSchema(mode.ofShare)) return database;
+    // What a killed writer began must be taken back before anybody reads, and only a writer can.
+    const bool unfinished = sqlite3_extended_errcode(db) == SQLITE_READONLY_ROLLBACK;
+    database.reset();
+    if (!unfinished || !mode.readOnly || open(path, {false, mode.ofShare}) == nullptr) return nullptr;
+    return open(path, mode);
+}
+
+bool Database::create(const std::string& path) {
+    const std::string resolved = resolveFolder(path);
+    if (resolved.empty() || !openFile(resolved, O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW, 0600)) {
+        const int code = errorOfErrno(errno);
+        fail(code == VEXO_ERR_MISSING ? static_cast<int>(VEXO_ERR_FILE) : code);
+        return false;
+    }
+    // A journal that an earlier file of this name left behind is not ours to play back.
+    unlink((resolved + "-journal").c_str());
+    sqlite3* db = nullptr;
+    constexpr int flags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_NOFOLLOW | SQLITE_OPEN_EXRESCODE;
+    const int result = sqlite3_open_v2(resolved.c_str(), &db, flags, trustedFileSystem());
+    Database database(resolved, db);
+    const bool opened = result == SQLITE_OK || failSql(db, result);
+    if (opened && database.configure({}) && database.makeSchema()) return true;
+    const KeepErrno keep;
+    database.rollBack();
+    unlink(resolved.c_str());
+    return false;
+}
+
+bool Database::configure(OpenMode mode) {
+    limit(db_);
+    waitForOthers(true);
+    if (!addFunctions(db_)) return failSql(db_);
+    // Results are worth nothing after a loss of power, but must survive the death of their writer. Pages that a large
+    // batch changed wait in memory: written early, they would lock readers out for the rest of the batch.
+    constexpr const char* common =
+        "PRAGMA cell_size_check=ON;PRAGMA temp_store=MEMORY;PRAGMA secure_delete=OFF;PRAGMA cache_spill=OFF;"
+        "PRAGMA cache_size=-16384;";
+    return execute(db_, common) && execute(db_, mode.ofShare ? "PRAGMA synchronous=FULL;PRAGMA mmap_size=2147418112;"
+                                                             : "PRAGMA synchronous=OFF;PRAGMA mmap_size=0;");
+}
+
+bool Database::makeSchema() {
+    const std::string identity =
+        "PRAGMA page_size=4096;PRAGMA auto_vacuum=NONE;BEGIN;PRAGMA application_id=" + std::to_string(kApplicationId) +
+        ";";
+    if (!execute(db_, identity.c_str())) return false;
+    for (const char* sql : kSchema) {
+        if (!execute(db_, sql)) return false;
+    }
+    return execute(db_, "INSERT INTO state VALUES(0,0,0);COMMIT");
+}
+
+bool Database::hasOurSchema(bool ofShare) {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT coalesce(sql,'') FROM sqlite_schema ORDER BY rowid")) return false;
+    size_t rows = 0;
+    Statement::Step step = statement.step();
+    for (; step == Statement::kRow; step = statement.step()) {
+        const bool known = rows < kSchema.size() ? statement.text(0) == kSchema[rows] : ofShare;
+        ++rows;
+        if (!known) break;
+    }
+    if (step == Statement::kFailed) return false;
+    if (step == Statement::kDone && rows >= kSchema.size()) return true;
+    fail(VEXO_ERR_GENERAL, EINVAL);
+    return false;
+}
+
+bool Database::begin() {
+    if (began_) return true;
+    // Orders that were made for the records as they were are gone with the first change.
+    if (!execute(db_, "BEGIN IMMEDIATE;DELETE FROM ranking")) {
+        const KeepErrno keep;
+        rollBack();
+        return false;
+    }
+    began_ = Clock::now();
+    rows_ = 0;
+    added_ = 0;
+    return true;
+}
+
+bool Database::written(bool done) {
+    if (!done) {
+        const KeepErrno keep;
+        rollBack();
+        return false;
+    }
+    ++rows_;
+    const bool large = rows_ >= kBatchRows;
+    // The clock is asked seldom: it costs as much as a part of an insert.
+    const bool old = rows_ % 16 == 0 && Clock::now() - *began_ >= kBatchAge;
+    return large || old ? commit() : true;
+}
+
+bool Database::commit() {
+    if (!began_) return true;
+    const std::string counted = "UPDATE state SET records=records+(" + std::to_string(added_) + ");COMMIT";
+    const bool done = execute(db_, counted.c_str());
+    if (!done) {
+        const KeepErrno keep;
+        rollBack();
+    }
+    began_.reset();
+    return done;
+}
+
+void Database::rollBack() {
+    insert_.reset();
+    if (sqlite3_get_autocommit(db_) == 0) sqlite3_exec(db_, "ROLLBACK", nullptr, nullptr, nullptr);
+    began_.reset();
+}
+
+void Database::waitForOthers(bool wait) {
+    sqlite3_busy_timeout(db_, wait ? kBusyMilliseconds : kSoonMilliseconds);
+}
+
+bool Database::insert(const __tag_FI_FILE_INFO_DATA& record) {
+    if (!begin()) return false;
+    static const std::string sql =
+        std::string("INSERT OR IGNORE INTO record(") + kRecordColumns + ") VALUES(" + kRecordMarks + ")";
+    if (!insert_ && !insert_.prepare(db_, sql)) return written(false);
+    if (!bindRecord(insert_, record)) return written(false);
+    const bool done = insert_.run();
+    if (done) added_ += sqlite3_changes(db_);
+    return written(done);
+}
+
+bool Database::change(const std::string& sql, const std::vector<Value>& values) {
+    Statement statement;
+    return statement.prepare(db_, sql) && statement.bind(values) && statement.run();
+}
+
+// Records at the address that moved ones come to are replaced by them.
+bool Database::clearTarget(const std::vector<const Node*>& set, const Condition& where) {
+    std::string share = "share";
+    std::string path = "path";
+    std::vector<Value> values;
+    for (const Node* node : set) {
+        if (node->type != FI_COL_SHARE && node->type != FI_COL_PATH) continue;
+        (node->type == FI_COL_SHARE ? share : path) = "?" + std::to_string(values.size() + 1);
+        values.push_back(valueOf(*node));
+    }
+    if (values.empty()) return true;
+    append(values, where.values);
+    append(values, where.values);
+    if (!change("DELETE FROM record WHERE (share,path) IN (SELECT " + share + "," + path + " FROM record WHERE " +
+                    where.sql + ") AND NOT (" + where.sql + ")",
+                values)) {
+        return false;
+    }
+    added_ -= sqlite3_changes64(db_);
+    return true;
+}
+
+bool Database::update(const Node* set, const Node* where) {
+    const std::vector<const Node*> nodes = nodesToSet(set);
+    if (nodes.empty()) {
+        fail(VEXO_ERR_PARAMETER, EINVAL);
+        return false;
+    }
+    const std::optional<Condition> condition = readCondition(where, {});
+    if (!condition || !begin()) return false;
+    std::string sql = "UPDATE record SET ";
+    std::vector<Value> values;
+    for (const Node* node : nodes) {
+        sql += (values.empty() ? "" : ",") + std::string(columnOf(node->type)->name) + "=?";
+        values.push_back(valueOf(*node));
+    }
+    append(values, condition->values);
+    return written(clearTarget(nodes, *condition) && change(sql + " WHERE " + condition->sql, values));
+}
+
+bool Database::remove(const Node* where) {
+    const std::optional<Condition> condition = readCondition(where, {});
+    if (!condition || !begin()) return false;
+    const bool done = change("DELETE FROM record WHERE " + condition->sql, condition->values);
+    if (done) added_ -= sqlite3_changes64(db_);
+    return written(done);
+}
+
+bool Database::select(const Condition& condition, std::vector<int64_t>& ids) {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT id FROM record WHERE " + condition.sql + " ORDER BY id") ||
+        !statement.bind(condition.values)) {
+        return false;
+    }
+    Statement::Step step = statement.step();
+    for (; step == Statement::kRow; step = statement.step()) ids.push_back(statement.number(0));
+    return step == Statement::kDone;
+}
+
+bool Database::count(const Condition& condition, int64_t& count) {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT count(*) FROM record WHERE " + condition.sql) ||
+        !statement.bind(condition.values) || statement.step() != Statement::kRow) {
+        return false;
+    }
+    count = statement.number(0);
+    return true;
+}
+
+bool Database::countAll(int64_t& count) {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT records FROM state") || statement.step() != Statement::kRow) return false;
+    count = std::max<int64_t>(statement.number(0), 0);
+    return true;
+}
+
+}  // namespace vexo::fileindex
