@@ -14,16 +14,27 @@
 namespace {
 
 namespace fs = std::filesystem;
+using support::kAliceUid;
+using support::kUsersGid;
 
 constexpr uid_t kKeepUser = static_cast<uid_t>(-1);
 constexpr gid_t kKeepGroup = static_cast<gid_t>(-1);
 
 class MakeFolderTest : public support::ApplianceTest {
  protected:
-    struct stat statusOf(const std::string& path) {
+    // "uid mode" of a folder.
+    std::string textOf(const std::string& path) {
         struct stat status {};
-        EXPECT_EQ(lstat(path.c_str(), &status), 0) << path;
-        return status;
+        EXPECT_EQ(lstat((root_ + path).c_str(), &status), 0) << path;
+        return std::to_string(status.st_uid) + (status.st_gid == kUsersGid ? " users " : " ") +
+               std::to_string(status.st_mode);
+    }
+    static std::string expected(uid_t uid, mode_t mode) {
+        return std::to_string(uid) + (uid == 0 ? " " : " users ") + std::to_string(S_IFDIR | mode);
+    }
+    int make(const std::string& path, uid_t uid, mode_t mode, int recursive = 1, const char** stopAt = nullptr) {
+        const gid_t gid = uid == kKeepUser ? kKeepGroup : gid_t{kUsersGid};
+        return VEXOFSMkdirP((root_ + path).c_str(), stopAt, recursive, uid, gid, mode);
     }
     std::string root_ = shareRoot("photo");
 };
@@ -32,29 +43,18 @@ TEST_F(MakeFolderTest, OwnerAndModeGoToWhatItMadeAlone) {
     SKIP_WITHOUT_ROOT();
     support::makeFolder(root_ + "/old", 0711);
     const mode_t before = umask(077);
-    EXPECT_EQ(
-        VEXOFSMkdirP((root_ + "/old//new/deep/").c_str(), nullptr, 1, support::kAliceUid, support::kUsersGid, 0755), 0);
+    EXPECT_EQ(make("/old//new/deep/", kAliceUid, 0755), 0);
     umask(before);
-    for (const char* made : {"/old/new", "/old/new/deep"}) {
-        const struct stat status = statusOf(root_ + made);
-        EXPECT_EQ(status.st_uid, support::kAliceUid);
-        EXPECT_EQ(status.st_gid, support::kUsersGid);
-        EXPECT_EQ(status.st_mode, mode_t{S_IFDIR | 0755});
-    }
-    EXPECT_EQ(statusOf(root_ + "/old").st_uid, 0U);
-    EXPECT_EQ(statusOf(root_ + "/old").st_mode, mode_t{S_IFDIR | 0711});
+    for (const char* made : {"/old/new", "/old/new/deep"}) EXPECT_EQ(textOf(made), expected(kAliceUid, 0755));
+    EXPECT_EQ(textOf("/old"), expected(0, 0711));
     // Made already: success, and nothing changes.
     errno = 0;
-    EXPECT_EQ(VEXOFSMkdirP((root_ + "/old/new").c_str(), nullptr, 1, support::kBobUid, support::kUsersGid, 0700), 0);
+    EXPECT_EQ(make("/old/new", support::kBobUid, 0700), 0);
     EXPECT_EQ(errno, 0);
-    EXPECT_EQ(statusOf(root_ + "/old/new").st_uid, support::kAliceUid);
-    EXPECT_EQ(statusOf(root_ + "/old/new").st_mode, mode_t{S_IFDIR | 0755});
-}
-
-TEST_F(MakeFolderTest, KeepsTheSetGroupBitOfItsParent) {
+    EXPECT_EQ(textOf("/old/new"), expected(kAliceUid, 0755));
     support::makeFolder(root_ + "/team", 02775);
-    ASSERT_EQ(VEXOFSMkdirP((root_ + "/team/new").c_str(), nullptr, 0, kKeepUser, kKeepGroup, 0750), 0);
-    EXPECT_EQ(statusOf(root_ + "/team/new").st_mode, mode_t{S_IFDIR | 02750});
+    ASSERT_EQ(make("/team/new", kKeepUser, 0750, 0), 0);
+    EXPECT_EQ(textOf("/team/new"), expected(0, 02750)) << "the set-group bit of its parent stays";
 }
 
 TEST_F(MakeFolderTest, RefusalsTellWhereTheyStopped) {
@@ -64,28 +64,25 @@ TEST_F(MakeFolderTest, RefusalsTellWhereTheyStopped) {
     fs::create_symlink(root_ + "/elsewhere", root_ + "/link");
     const std::string longName(256, 'n');
     const struct {
-        std::string path, stopAt;
+        std::string path;
         int recursive, systemCode, code;
     } cases[] = {
-        {root_ + "/a/b/c", "a/b/c", 0, ENOENT, VEXO_ERR_MISSING},
-        {root_ + "/file/x", "file/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
-        {root_ + "/file", "file", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
-        {root_ + "/dangling/x", "dangling/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
-        {root_ + "/" + longName, longName, 1, ENAMETOOLONG, VEXO_ERR_NAME_TOO_LONG},
+        {"a/b/c", 0, ENOENT, VEXO_ERR_MISSING},
+        {"file/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
+        {"file", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
+        {"dangling/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
+        {longName, 1, ENAMETOOLONG, VEXO_ERR_NAME_TOO_LONG},
     };
     for (const auto& c : cases) {
-        SCOPED_TRACE(c.path);
-        const char* stopAt = nullptr;
-        VLIBCErrSetEx(0, "", 0);
-        EXPECT_LT(VEXOFSMkdirP(c.path.c_str(), &stopAt, c.recursive, kKeepUser, kKeepGroup, 0755), 0);
+        const char* stopAt = "";
+        const std::string path = root_ + "/" + c.path;
+        EXPECT_LT(VEXOFSMkdirP(path.c_str(), &stopAt, c.recursive, kKeepUser, kKeepGroup, 0755), 0) << path;
         EXPECT_EQ(errno, c.systemCode);
         EXPECT_EQ(VLIBCErrGet(), c.code);
-        ASSERT_NE(stopAt, nullptr);
-        EXPECT_EQ(std::string(stopAt), c.stopAt);
+        EXPECT_EQ(stopAt, c.path);
     }
     EXPECT_TRUE(fs::is_empty(root_ + "/elsewhere"));
-    // An existing link to a folder counts as that folder.
-    EXPECT_EQ(VEXOFSMkdirP((root_ + "/link/new").c_str(), nullptr, 0, kKeepUser, kKeepGroup, 0755), 0);
+    EXPECT_EQ(make("/link/new", kKeepUser, 0755, 0), 0) << "an existing link to a folder counts as that folder";
     EXPECT_TRUE(fs::is_directory(root_ + "/elsewhere/new"));
     for (const char* bad : {static_cast<const char*>(nullptr), ""}) {
         EXPECT_LT(VEXOFSMkdirP(bad, nullptr, 1, kKeepUser, kKeepGroup, 0755), 0);
@@ -96,18 +93,16 @@ TEST_F(MakeFolderTest, RefusalsTellWhereTheyStopped) {
 TEST_F(MakeFolderTest, AFolderThatCannotBeHandedOverIsNotLeft) {
     SKIP_WITHOUT_ROOT();
     const auto body = [&] {
-        const char* stopAt = nullptr;
-        const std::string path = root_ + "/mine";
-        EXPECT_LT(VEXOFSMkdirP(path.c_str(), &stopAt, 1, support::kBobUid, support::kUsersGid, 0755), 0);
+        const char* stopAt = "";
+        EXPECT_LT(make("/mine", support::kBobUid, 0755, 1, &stopAt), 0);
         EXPECT_EQ(errno, EPERM);
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_DENIED);
         EXPECT_STREQ(stopAt, "mine");
-        EXPECT_FALSE(fs::exists(path));
-        EXPECT_EQ(VEXOFSMkdirP(path.c_str(), nullptr, 1, support::kAliceUid, support::kUsersGid, 0700), 0);
-        return 0;
+        EXPECT_FALSE(fs::exists(root_ + "/mine"));
+        return make("/mine", kAliceUid, 0700);
     };
-    EXPECT_EQ(support::asUser(support::kAliceUid, support::kUsersGid, body), 0);
-    EXPECT_EQ(statusOf(root_ + "/mine").st_uid, support::kAliceUid);
+    EXPECT_EQ(support::asUser(kAliceUid, kUsersGid, body), 0);
+    EXPECT_EQ(textOf("/mine"), expected(kAliceUid, 0700));
 }
 
 }  // namespace
