@@ -1,10 +1,13 @@
 #include "chosen_folders.h"
 
+#include <algorithm>
+
 #include "confined.h"
 #include "orvel/error_state.h"
 #include "orvel/file_info.h"
 #include "orvel/privilege.h"
 #include "orvel/share_path.h"
+#include "vexo/index.h"
 
 namespace orvel::cgi {
 namespace {
@@ -39,6 +42,21 @@ int chooseFolders(const User& user, const std::vector<std::string>& paths, std::
     if (!folders.empty()) return ORV_ERR_NONE;
     culprit = paths.empty() ? "" : paths.front();
     return ORV_ERR_DENIED;
+}
+
+std::map<std::string, bool> searchedShares(const std::vector<std::string>& folders) {
+    std::map<std::string, bool> shares;
+    for (const std::string& folder : folders) {
+        const bool home = IsDirUserHome(folder, nullptr);
+        const std::string share = home ? "homes" : folder.substr(1, folder.find('/', 1) - 1);
+        shares[share] = FILEIDXIsIndexEnable(share.c_str()) == 1;
+    }
+    return shares;
+}
+
+bool anyHome(const std::vector<std::string>& paths) {
+    return std::any_of(paths.begin(), paths.end(),
+                       [](const std::string& path) { return IsDirUserHome(path, nullptr); });
 }
 
 }  // namespace orvel::cgi

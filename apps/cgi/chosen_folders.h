@@ -2,6 +2,7 @@
 #ifndef ORVEL_CGI_CHOSEN_FOLDERS_H
 #define ORVEL_CGI_CHOSEN_FOLDERS_H
 
+#include <map>
 #include <string>
 #include <vector>
 
@@ -15,6 +16,12 @@ namespace orvel::cgi {
 // else the code of the path that cannot be resolved, then in `culprit`.
 int chooseFolders(const User& user, const std::vector<std::string>& paths, std::vector<std::string>& folders,
                   std::string& culprit);
+
+// The shares that the folders lie in ("homes" for home folders), and whether the file index answers for them.
+std::map<std::string, bool> searchedShares(const std::vector<std::string>& folders);
+
+// Whether one of the paths lies in the user's home.
+bool anyHome(const std::vector<std::string>& paths);
 
 }  // namespace orvel::cgi
 

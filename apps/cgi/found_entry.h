@@ -2,27 +2,15 @@
 #ifndef ORVEL_CGI_FOUND_ENTRY_H
 #define ORVEL_CGI_FOUND_ENTRY_H
 
-#include <list>
-#include <string>
-
-#include "orvel/dir_entry.h"
-#include "vexo/index.h"
+#include "listing.h"
+#include "orvel/search_task.h"
 
 namespace orvel::cgi {
 
-class FoundEntries {
- public:
-    // `additional`: ADDITIONAL_... bits. What the user may do (ADDITIONAL_PERM) is asked of the file system for each
-    // entry, as the calling identity; all else is what the search found.
-    FoundEntries(const std::string& user, int additional);
-
-    // The entry of a record. Its path begins with "/home" below the user's own home.
-    [[nodiscard]] DIRENTRY_INFO entryOf(const __tag_FI_FILE_INFO_DATA& record) const;
-
- private:
-    std::string home_;  // real path, "" for none
-    int additional_;
-};
+// Reads the page that `request` asks for; its pattern is what the names must contain. Paths begin with "/home" below
+// the user's own home. What the user may do (ADDITIONAL_PERM) is asked of the file system, as the calling identity, all
+// else is what the search found. 0 or a library code; what a failure leaves in `listing` is to be thrown away.
+int readResults(const ListRequest& request, FileSearch::OrvSearchDBTask& results, Listing& listing);
 
 }  // namespace orvel::cgi
 

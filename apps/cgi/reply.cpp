@@ -3,6 +3,7 @@
 #include <json/value.h>
 
 #include "text.h"
+#include "vexo/error.h"
 
 namespace orvel::cgi {
 namespace {
@@ -42,6 +43,11 @@ void beginReply(Output& out, Status status, const std::string& cookie) {
 int lastCode(int fallback) {
     const int code = OrvLibGetErr();
     return code != ORV_ERR_NONE ? code : fallback;
+}
+
+int platformCode() {
+    const int code = OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
+    return code != ORV_ERR_NONE ? code : ORV_ERR_GENERAL;
 }
 
 void putPath(Json::Value& object, const char* key, std::string_view path) {

@@ -39,6 +39,9 @@ void replyFailure(Output& out, Status status, const std::string& cookie, int cod
 // The library code of the failure just met, `fallback` where it set none (store 0 before the call).
 int lastCode(int fallback = ORV_ERR_GENERAL);
 
+// The library code for the platform's last failure.
+int platformCode();
+
 // Sets `key` to `path`, readable, and where it is no UTF-8 `key` + "_raw" to its bytes, percent-encoded.
 void putPath(Json::Value& object, const char* key, std::string_view path);
 

@@ -2,7 +2,7 @@
 
 #include <json/value.h>
 #include <poll.h>
-#include <sys/pidfd.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <csignal>
@@ -18,6 +18,15 @@ constexpr const char* kPrefix = "Quorvane_Search_";
 constexpr size_t kLongestId = 16;  // two numbers of 32 bits
 constexpr long long kKept = 2LL * 24 * 60 * 60;
 constexpr int kPatience = 2000;  // milliseconds
+
+// The C library's own declarations lack C linkage in some of its versions.
+Descriptor openProcess(pid_t process) {
+    return Descriptor(process > 0 ? static_cast<int>(syscall(SYS_pidfd_open, process, 0)) : -1);
+}
+
+void send(const Descriptor& process, int signal) {
+    syscall(SYS_pidfd_send_signal, process.get(), signal, nullptr, 0);
+}
 
 bool hasEnded(const Descriptor& process, int milliseconds) {
     pollfd watched = {process.get(), POLLIN, 0};
@@ -47,13 +56,13 @@ std::unique_ptr<KTR::Task> makeRecord(const std::string& user, const std::string
 
 bool endWork(KTR::Task& record, bool forGood) {
     const pid_t worker = record.getWorker();
-    const Descriptor process(worker > 0 ? pidfd_open(worker, 0) : -1);
+    const Descriptor process = openProcess(worker);
     // The number may have gone to another process before the descriptor was opened, but not after.
     if (!process || record.getWorker() != worker) return true;
-    pidfd_send_signal(process.get(), SIGTERM, nullptr, 0);
+    send(process, SIGTERM);
     if (hasEnded(process, kPatience)) return true;
     if (!forGood) return false;
-    pidfd_send_signal(process.get(), SIGKILL, nullptr, 0);
+    send(process, SIGKILL);
     return hasEnded(process, kPatience);
 }
 

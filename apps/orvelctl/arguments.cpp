@@ -14,7 +14,7 @@ bool contains(const std::vector<std::string>& list, const std::string& word) {
 }  // namespace
 
 Arguments::Arguments(const std::vector<std::string>& words, const std::vector<std::string>& valued,
-                     const std::vector<std::string>& flags, size_t positions) {
+                     const std::vector<std::string>& flags, size_t positions, bool orMore) {
     for (size_t i = 0; i < words.size(); ++i) {
         if (!words[i].starts_with("--")) {
             positions_.push_back(words[i]);
@@ -28,7 +28,8 @@ Arguments::Arguments(const std::vector<std::string>& words, const std::vector<st
             throw UsageError("unknown option " + words[i]);
         }
     }
-    if (positions_.size() != positions) throw UsageError("wrong number of arguments");
+    const bool fits = positions_.size() == positions || (orMore && positions_.size() > positions);
+    if (!fits) throw UsageError("wrong number of arguments");
 }
 
 std::string Arguments::value(const std::string& option, const std::string& fallback) const {

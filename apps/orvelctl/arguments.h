@@ -18,11 +18,12 @@ class UsageError : public std::runtime_error {
 class Arguments {
  public:
     // `valued` options take the next word ("--user alice"), `flags` none. Throws UsageError for an unknown option, a
-    // missing value, or another number of positions than `positions`.
+    // missing value, or another number of positions than `positions`; with `orMore` there may be more of them.
     Arguments(const std::vector<std::string>& words, const std::vector<std::string>& valued,
-              const std::vector<std::string>& flags, size_t positions);
+              const std::vector<std::string>& flags, size_t positions, bool orMore = false);
 
     [[nodiscard]] const std::string& position(size_t index) const { return positions_[index]; }
+    [[nodiscard]] const std::vector<std::string>& positions() const { return positions_; }
     [[nodiscard]] bool has(const std::string& option) const { return options_.count(option) != 0; }
     [[nodiscard]] std::string value(const std::string& option, const std::string& fallback) const;
     // Throws UsageError when the option is missing.

@@ -35,7 +35,9 @@ std::string rightText(uint32_t right) {
     return right == ORV_PRIVILEGE_READ_WRITE ? "rw" : right == ORV_PRIVILEGE_READ ? "ro" : "--";
 }
 
-std::string row(const DIRENTRY_INFO& entry, int additional, bool shares) {
+}  // namespace
+
+std::string entryRow(const DIRENTRY_INFO& entry, int additional, bool shares) {
     std::string text;
     if ((additional & ADDITIONAL_PERM) != 0) {
         text += (entry.isDirectory ? "d" : "-") + GetPrivilegeStr(entry.mode) + "  ";
@@ -61,9 +63,11 @@ std::string row(const DIRENTRY_INFO& entry, int additional, bool shares) {
     return text + "\n";
 }
 
+namespace {
+
 void printRows(const cgi::ListRequest& request, const cgi::Listing& listing, bool shares, cgi::Output& out) {
     for (const DIRENTRY_INFO& entry : listing.entries) {
-        out.text() += row(entry, request.additional, shares);
+        out.text() += entryRow(entry, request.additional, shares);
         out.spill();
     }
     out.text() += std::to_string(listing.entries.size()) + " of " + std::to_string(listing.total) + "\n";

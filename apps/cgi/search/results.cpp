@@ -1,7 +1,6 @@
 #include <json/value.h>
 
 #include <climits>
-#include <exception>
 #include <optional>
 #include <string>
 
@@ -10,7 +9,6 @@
 #include "orvel/error_state.h"
 #include "search/actions.h"
 #include "text.h"
-#include "vexo/error.h"
 
 namespace orvel::cgi {
 namespace {
@@ -40,34 +38,6 @@ std::optional<ListRequest> parse(const User& user, const VEXO::WebCGI& web) {
                        .type = *type};
 }
 
-struct Page {
-    const FoundEntries& entries;
-    Listing& listing;
-    bool failed = false;
-};
-
-BOOL take(__tag_FI_FILE_INFO_DATA* record, void* arg) {
-    auto& page = *static_cast<Page*>(arg);
-    try {
-        page.listing.entries.push_back(page.entries.entryOf(*record));
-    } catch (const std::exception&) {
-        page.failed = true;  // memory is out; nothing may be thrown through the platform
-    }
-    return page.failed ? 0 : 1;
-}
-
-int query(const ListRequest& request, FileSearch::OrvSearchDBTask& results, Listing& listing) {
-    const FoundEntries entries(request.user, request.additional);
-    Page page = {entries, listing};
-    unsigned long long total = 0;
-    const bool read =
-        results.queryResult(request.offset, request.limit, request.sortBy.empty() ? nullptr : request.sortBy.c_str(),
-                            &request.ascending, &request.type, request.pattern.c_str(), take, &page, &total);
-    listing.total = total;
-    if (!read) return OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
-    return page.failed ? ORV_ERR_GENERAL : ORV_ERR_NONE;
-}
-
 Json::Value stateOf(const KTR::Task& record) {
     Json::Value state;
     state["finished"] = record.isFinished();
@@ -93,7 +63,7 @@ void listResults(Output& out, const User& user, const VEXO::WebCGI& web, const S
     // Asked first: what is finished has all its results.
     const Json::Value state = stateOf(*task.record);
     Listing listing;
-    const int code = task.results == nullptr ? ORV_ERR_MISSING : query(*request, *task.results, listing);
+    const int code = task.results == nullptr ? ORV_ERR_MISSING : readResults(*request, *task.results, listing);
     if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, "");
 
     beginReply(out, Status::kOk, user.cookie);

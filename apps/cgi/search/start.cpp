@@ -14,7 +14,6 @@
 #include "descriptor.h"
 #include "orvel/error_state.h"
 #include "orvel/search_walker.h"
-#include "orvel/share_path.h"
 #include "search/actions.h"
 #include "text.h"
 #include "vexo/error.h"
@@ -35,18 +34,6 @@ struct Search {
     Descriptor ready;  // closed once the background process has noted itself
 };
 
-int platformCode() {
-    const int code = OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
-    return code != ORV_ERR_NONE ? code : ORV_ERR_GENERAL;
-}
-
-// Writes the records that are still on their way: who reads "finished" reads all of them. 0 or a library code.
-int flush(const std::string& database) {
-    FIQUERY query = {};
-    unsigned long long count = 0;
-    return FILEIDXCountGet(database.c_str(), &query, &count) < 0 ? platformCode() : ORV_ERR_NONE;
-}
-
 // The search itself, in a process of its own.
 int run(void* arg) {
     Search& search = *static_cast<Search*>(arg);
@@ -54,8 +41,8 @@ int run(void* arg) {
     search.ready = Descriptor();
     VLIBCErrSetEx(0, __FILE__, __LINE__);
     int code = search.walker->Walk(search.criteria.accessTimes()) ? ORV_ERR_NONE : platformCode();
-    const int written = flush(search.database);
-    if (code == ORV_ERR_NONE) code = written;
+    // Who reads that it is finished reads all of it.
+    if (FILEIDXDBFlush(search.database.c_str()) < 0 && code == ORV_ERR_NONE) code = platformCode();
     // A record that could not be stored is no reason for the walk to end, but for saying so.
     const int last = VLIBCErrGet();
     if (code == ORV_ERR_NONE && (last == VEXO_ERR_NO_SPACE || last == VEXO_ERR_QUOTA)) code = platformCode();
@@ -68,14 +55,9 @@ int run(void* arg) {
     return record.endUpdate() ? 0 : 1;
 }
 
-// Which shares are searched, and how.
 Json::Value waysOf(const std::vector<std::string>& folders) {
     Json::Value ways(Json::objectValue);
-    for (const std::string& folder : folders) {
-        std::string share = folder.substr(1, folder.find('/', 1) - 1);
-        if (IsDirUserHome(share, nullptr)) share = "homes";
-        ways[readable(share)] = FILEIDXIsIndexEnable(share.c_str()) == 1 ? "index" : "walk";
-    }
+    for (const auto& [share, indexed] : searchedShares(folders)) ways[readable(share)] = indexed ? "index" : "walk";
     return ways;
 }
 
@@ -105,8 +87,9 @@ int launch(Search& search) {
 
 int beginSearch(const User& user, const std::vector<std::string>& folders, bool recursive, const Criteria& criteria,
                 std::string& id) {
-    Search search = {std::make_unique<OrvSearchWalker>(user.name.c_str(), user.sid.c_str(), stopFlag()), nullptr, "",
-                     criteria, Descriptor()};
+    Search search = {
+        std::make_unique<OrvSearchWalker>(user.name.c_str(), user.sid.empty() ? nullptr : user.sid.c_str(), stopFlag()),
+        nullptr, "", criteria, Descriptor()};
     search.walker->setSearchCurrentDir(!recursive);
     if (!search.walker->init(folders, criteria.list())) return platformCode();
     id = search.walker->getDBTaskId();
@@ -118,13 +101,6 @@ int beginSearch(const User& user, const std::vector<std::string>& folders, bool 
     unlink(search.database.c_str());
     if (search.record != nullptr) search.record->remove();
     return code;
-}
-
-bool needsHome(const std::vector<std::string>& paths) {
-    for (const std::string& path : paths) {
-        if (IsDirUserHome(path, nullptr)) return true;
-    }
-    return false;
 }
 
 }  // namespace
@@ -146,7 +122,7 @@ void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
     }
     umask(022);  // whatever the web server's is
     std::vector<std::string> folders;
-    code = actAs(user.sid.c_str(), user.name, needsHome(*paths));
+    code = actAs(user.sid.c_str(), user.name, anyHome(*paths));
     if (code == ORV_ERR_NONE) code = chooseFolders(user, *paths, folders, culprit);
     if (code == ORV_ERR_NONE) {
         sweepTasks(user.name);
