@@ -109,6 +109,10 @@ bool OrvSearchWalker::search(const std::vector<FindATimeComp*>& accessTimeCriter
             return fail(VEXO_ERR_PARAMETER, __LINE__);
         }
     }
+    // Whoever waits for the end reads them in another process.
+    if (FILEIDXDBFlush(database_.c_str()) < 0) {
+        syslog(LOG_ERR, "%s:%d Fail to insert data into DB %s", kSource, __LINE__, orvel::printable(database_).c_str());
+    }
     return true;
 }
 

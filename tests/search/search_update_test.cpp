@@ -307,9 +307,9 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
             size_t count;
         };
         const Filter filters[] = {
-            {DIR_ENTRY_TYPE_ALL, nullptr, 66}, {DIR_ENTRY_TYPE_ALL, "", 66},    {DIR_ENTRY_TYPE_DIR, nullptr, 6},
-            {DIR_ENTRY_TYPE_FILE, "", 60},     {DIR_ENTRY_TYPE_DIR, "F1", 2},   {DIR_ENTRY_TYPE_FILE, "f1", 0},
-            {DIR_ENTRY_TYPE_ALL, ".4", 12},    {DIR_ENTRY_TYPE_ALL, "?5?.", 0},
+            {DIR_ENTRY_TYPE_ALL, nullptr, 66}, {DIR_ENTRY_TYPE_ALL, "", 66},     {DIR_ENTRY_TYPE_DIR, nullptr, 6},
+            {DIR_ENTRY_TYPE_FILE, "", 60},     {DIR_ENTRY_TYPE_DIR, "F1", 2},    {DIR_ENTRY_TYPE_FILE, "f1", 0},
+            {DIR_ENTRY_TYPE_ALL, ".4", 12},    {DIR_ENTRY_TYPE_ALL, "?5?.", 10},
         };
         for (const Filter& filter : filters) {
             SCOPED_TRACE(std::to_string(filter.type) + (filter.name == nullptr ? "-" : filter.name));

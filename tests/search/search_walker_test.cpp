@@ -12,7 +12,6 @@
 #include "fault_gate.h"
 #include "orvel/identity.h"
 #include "search/search_fixture.h"
-#include "support/fault_sweep.h"
 #include "support/log_texts.h"
 #include "vexo/error.h"
 #include "vexo/filesystem.h"
@@ -145,8 +144,8 @@ TEST_F(SearchWalkerTest, WalkIndexAndModelAgree) {
             empty += walked[i].empty() ? 1 : 0;
         }
         EXPECT_GT(all.size(), 50U);
-        EXPECT_GT(found, 5000U);
-        EXPECT_LE(empty, 2U) << "queries that find nothing prove little";
+        EXPECT_GT(found, 4000U);
+        EXPECT_LE(empty, 3U) << "queries that find nothing prove little";
         EXPECT_TRUE(takeLog().empty());
 
         // An index of one share alone.
