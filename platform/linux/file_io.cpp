@@ -18,22 +18,6 @@ bool fillAndRename(int fd, const std::string& temporary, const std::string& path
            rename(temporary.c_str(), path.c_str()) == 0;
 }
 
-std::string folderOf(const std::string& path) {
-    return path.substr(0, path.rfind('/') + 1);
-}
-
-bool moveIntoPlace(int fd, const std::string& temporary, const std::string& path, std::string_view text, mode_t mode) {
-    if (!fillAndRename(fd, temporary, path, text, mode)) {
-        const int savedErrno = errno;
-        unlink(temporary.c_str());
-        errno = savedErrno;
-        return false;
-    }
-    const std::string folder = folderOf(path);
-    synchroniseFolder(folder.empty() ? "." : folder);
-    return true;
-}
-
 bool isBefore(const timespec& a, const timespec& b) {
     return a.tv_sec != b.tv_sec ? a.tv_sec < b.tv_sec : a.tv_nsec < b.tv_nsec;
 }
@@ -93,16 +77,18 @@ bool readRegularFile(const std::string& path, size_t limit, std::string& text, F
 }
 
 bool replaceFile(const std::string& path, std::string_view text, mode_t mode) {
-    std::string temporary = folderOf(path) + ".new-XXXXXX";
+    const std::string folder = path.substr(0, path.rfind('/') + 1);
+    std::string temporary = folder + ".new-XXXXXX";
     const Descriptor fd(mkostemp(temporary.data(), O_CLOEXEC));
-    return fd && moveIntoPlace(fd.get(), temporary, path, text, mode);
-}
-
-bool replaceFileAlone(const std::string& path, std::string_view text, mode_t mode) {
-    const std::string temporary = path + ".new";
-    unlink(temporary.c_str());
-    const Descriptor fd = openFile(temporary, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
-    return fd && moveIntoPlace(fd.get(), temporary, path, text, mode);
+    if (!fd) return false;
+    if (!fillAndRename(fd.get(), temporary, path, text, mode)) {
+        const int savedErrno = errno;
+        unlink(temporary.c_str());
+        errno = savedErrno;
+        return false;
+    }
+    synchroniseFolder(folder.empty() ? "." : folder);
+    return true;
 }
 
 bool isTrusted(const struct stat& status, mode_t type) {

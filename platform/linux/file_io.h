@@ -78,8 +78,6 @@ class FileVersion {
 // Replaces `path` as a whole: a temporary beside it, written, synchronised and renamed. On failure the temporary is
 // gone and the old file as it was. A symbolic link at `path` is itself replaced.
 [[nodiscard]] bool replaceFile(const std::string& path, std::string_view text, mode_t mode);
-// The same where nobody else writes this file: the temporary has one name, so that what a killed process left goes.
-[[nodiscard]] bool replaceFileAlone(const std::string& path, std::string_view text, mode_t mode);
 
 // True for what a central store may trust: of this type (S_IFREG, S_IFDIR), owned by root or the effective user,
 // writable by nobody else, and, for a file, under one name only.

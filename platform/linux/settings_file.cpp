@@ -2,6 +2,8 @@
 
 #include <algorithm>
 #include <charconv>
+#include <cstdio>
+#include <utility>
 
 #include "failure.h"
 #include "trusted_file.h"
@@ -10,7 +12,7 @@ namespace vexo {
 namespace {
 
 constexpr size_t kMaxFile = size_t{16} << 20;
-constexpr int kMaxReadings = 10;
+constexpr int kMaxReadings = 100;
 
 std::string pendingPath(const std::string& path) {
     return path + ".pending";
@@ -46,7 +48,7 @@ bool writeFromStart(int fd, std::string_view text) {
 bool overwrite(int fd, std::string_view text, size_t oldSize) {
     std::string padded(text);
     padded.resize(std::max(text.size(), oldSize), '\n');
-    return writeFromStart(fd, padded) && ftruncate(fd, static_cast<off_t>(text.size())) == 0 && fdatasync(fd) == 0;
+    return writeFromStart(fd, padded) && ftruncate(fd, static_cast<off_t>(text.size())) == 0;
 }
 
 // Makes the announced change; one that the disk does not hold is taken back.
@@ -57,12 +59,21 @@ bool carryOut(int fd, const std::string& path, const PendingChange& change) {
     return done;
 }
 
-// Lays the change beside the file.
+// Lays the change beside the file, as readable as the file. The temporary has one name, since the caller's lock keeps
+// others out: what a killed process left is made use of.
 bool announce(int fd, const std::string& path, const PendingChange& change) {
     struct stat status {};
     if (fstat(fd, &status) != 0) return false;
-    const std::string text = buildPendingChange(change.before, change.after);
-    if (replaceFileAlone(pendingPath(path), text, status.st_mode & 0777)) return true;
+    const std::string pending = pendingPath(path);
+    const std::string temporary = pending + ".new";
+    unlink(temporary.c_str());
+    const Descriptor beside = openFile(temporary, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
+    if (beside && writeAll(beside.get(), buildPendingChange(change.before, change.after)) &&
+        fchmod(beside.get(), status.st_mode & 0777) == 0 && rename(temporary.c_str(), pending.c_str()) == 0) {
+        return true;
+    }
+    const KeepErrno keep;
+    if (beside) unlink(temporary.c_str());
     // A full disk must not keep anybody from taking a right away: what does not grow goes without.
     return (errno == ENOSPC || errno == EDQUOT) && change.after.size() <= change.before.size();
 }
@@ -108,15 +119,20 @@ bool isOnTheWay(std::string_view text, const PendingChange& change) {
 }
 
 bool readSettingsFile(const std::string& path, std::string& text, FileVersion& version) {
+    // Asked before and after: a change that begins or ends while the file is read is seen in one of the two answers,
+    // and one that does both shows in the time of modification.
+    auto pending = readPending(path);
     for (int readings = 0; readings < kMaxReadings; ++readings) {
         if (!readRegularFile(path, kMaxFile, text, version)) return false;
-        const auto change = readPending(path);
-        if (change && isOnTheWay(text, *change)) {
-            text = change->after;
-            return true;
+        const auto before = std::exchange(pending, readPending(path));
+        for (const auto& change : {before, pending}) {
+            if (change && isOnTheWay(text, *change)) {
+                text = change->after;
+                return true;
+            }
         }
         struct stat status {};
-        if (stat(path.c_str(), &status) != 0 || version.isSame(status)) return true;
+        if (before == pending && stat(path.c_str(), &status) == 0 && version.isSame(status)) return true;
     }
     return true;
 }

@@ -1,9 +1,9 @@
 // A settings file as a whole: read without a lock, changed in place.
 //
-// The file keeps its inode, since callers lock the file itself, and so it is overwritten; a writer that is killed, or
-// the power that fails, then leaves part of the old and part of the new text. Therefore the change lies whole beside
-// the file, in FILE.pending, while it is made: a reader that finds the file on the way from one text to the other takes
-// the new one, and the next writer ends the change.
+// The file keeps its inode, since callers lock the file itself, and so it is overwritten; a writer that is killed
+// within its write leaves part of the old and part of the new text (the kernel looks for signals at each page).
+// Therefore the change lies whole beside the file, in FILE.pending, while it is made: a reader that finds the file on
+// the way from one text to the other takes the new one, and the next writer ends the change.
 #ifndef VEXO_LINUX_SETTINGS_FILE_H
 #define VEXO_LINUX_SETTINGS_FILE_H
 
@@ -19,6 +19,8 @@ namespace vexo {
 struct PendingChange {
     std::string before;
     std::string after;
+
+    bool operator==(const PendingChange&) const = default;
 };
 
 // The text of a pending file, docs/formats/settings.md, and back; empty for one that is torn.
