@@ -7,7 +7,9 @@
 //   "asc" (default) or "desc" offset, limit    the page; limit 0, the default, means everything additional       words
 //   as for additionalBits pattern          comma-separated name patterns; filetype "dir", "file" or "all" (default)
 //   (folder only)
-// "data" of the reply is {"total","offset","items"}.
+// "data" of the reply is {"total","offset","items"}; beside that of the shares stands "user", who is logged in.
+#include <json/value.h>
+
 #include <optional>
 #include <string>
 
@@ -16,6 +18,7 @@
 #include "orvel/share_path.h"
 #include "reply.h"
 #include "request.h"
+#include "text.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
@@ -60,7 +63,13 @@ void serve(Output& out) {
     if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, request->path);
 
     beginReply(out, Status::kOk, user.cookie);
-    out.text() += "{\"success\":true,\"data\":";
+    out.text() += "{\"success\":true,";
+    if (shares) {
+        out.text() += "\"user\":";
+        appendJson(Json::Value(readable(user.name)), out.text());
+        out.text() += ',';
+    }
+    out.text() += "\"data\":";
     writeListing(*request, listing, shares ? appendShare : appendEntry, out);
     out.text() += '}';
 }

@@ -1,0 +1,196 @@
+// Where one is: the folder on screen, its listing, what is chosen in it.
+
+import { get } from "./api.js";
+import { announce } from "./dom.js";
+import { entryOf } from "./entries.js";
+import { emit } from "./events.js";
+import { Listing } from "./listing.js";
+import { normaliseId, parentOf } from "./path.js";
+import { pref, setPref } from "./prefs.js";
+import { COLUMNS } from "./rows.js";
+import { Selection } from "./selection.js";
+import { t } from "./strings.js";
+
+const ADDITIONAL = "size,time,owner,perm,mount_point_type";
+const FIRST_LOOK = 60;
+// Most folders are there within this; only slower ones show that something is going on.
+const PATIENCE = 150;
+
+export const browser = {
+  id: "/",
+  shares: [],
+  user: "",
+  listing: null,
+  selection: new Selection(() => emit("selection")),
+  mode: pref("mode", "list"),
+  sort: pref("sort", { by: "name", ascending: true }),
+  filter: "",
+  view: null,
+};
+
+const remembered = new Map();
+let turn = 0;
+
+export async function loadShares() {
+  const reply = await get("list", { action: "shares", additional: "perm,volume_status,mount_point_type,sync_share" });
+  browser.user = reply.user ?? "";
+  browser.shares = reply.items.map(entryOf);
+  emit("shares");
+}
+
+export function shareEntry(id) {
+  const share = id.split("/")[1];
+  return browser.shares.find((entry) => entry.encodedName === share);
+}
+
+// Opening goes through the address, so that back and forward work.
+export function go(id) {
+  if (normaliseId(location.hash.slice(1)) === id) open(id);
+  else location.hash = id;
+}
+
+export function goUp() {
+  if (browser.id !== "/") go(parentOf(browser.id));
+}
+
+function columns() {
+  return [COLUMNS.name, COLUMNS.size, COLUMNS.mtime, COLUMNS.type, COLUMNS.owner].map((column) => ({
+    ...column,
+    sorted: column.sort !== browser.sort.by ? null : browser.sort.ascending ? "ascending" : "descending",
+  }));
+}
+
+// Folders come first whichever way the rest is sorted: descending, they are a list of their own.
+function makeListing(id) {
+  const parts = browser.sort.ascending ? ["all"] : ["dir", "file"];
+  const pattern = browser.filter === "" ? undefined : `*${browser.filter.replace(/[,\\]/g, "?")}*`;
+  return new Listing(parts, async (filetype, offset, limit, signal) => {
+    const reply = await get("list", {
+      action: "folder", path_raw: id, filetype, offset, limit, pattern, additional: ADDITIONAL,
+      sort_by: browser.sort.by, sort_direction: browser.sort.ascending ? "asc" : "desc",
+    }, signal);
+    return { total: reply.total, items: reply.items.map(entryOf) };
+  }, changed);
+}
+
+function changed(listing) {
+  if (listing !== browser.listing) return;
+  emit("listing");
+}
+
+function remember() {
+  if (!browser.listing?.ready || browser.filter !== "") return;
+  remembered.set(browser.id, { top: browser.view.root.scrollTop, cursor: browser.selection.cursor });
+}
+
+export async function open(id) {
+  const mine = ++turn;
+  const from = browser.id;
+  remember();
+  browser.listing?.cancel();
+  browser.filter = "";
+  browser.id = id;
+  emit("place", id);
+  if (id === "/") {
+    browser.listing = null;
+    browser.selection.reset();
+    emit("shown");
+    return;
+  }
+  await show(id, mine, parentOf(from) === id ? from : null);
+  if (mine === turn && browser.listing?.ready) announce(t("announce.opened", { count: browser.listing.total }));
+}
+
+async function show(id, mine, cameFrom) {
+  const listing = makeListing(id);
+  const saved = remembered.get(id);
+  await Promise.race([listing.need(0, FIRST_LOOK), new Promise((resolve) => setTimeout(resolve, PATIENCE))]);
+  if (mine !== turn) return listing.cancel();
+  browser.listing = listing;
+  browser.selection.reset();
+  emit("shown");
+  if (!listing.ready && !listing.error) await listing.need(0, FIRST_LOOK);
+  if (mine !== turn || !listing.ready) return;
+  if (saved) restore(saved);
+  if (cameFrom) {
+    const index = listing.find((entry) => entry.id === cameFrom);
+    if (index >= 0) choose(index);
+  }
+}
+
+function restore({ top, cursor }) {
+  browser.view.root.scrollTop = top;
+  browser.selection.cursor = browser.selection.anchor = Math.min(cursor, Math.max(0, browser.listing.total - 1));
+  browser.view.render();
+}
+
+function choose(index) {
+  browser.selection.pick(index);
+  browser.view.reveal(index);
+}
+
+export function setMode(mode) {
+  browser.mode = mode;
+  setPref("mode", mode);
+  const [first] = browser.view.inSight ?? [0];
+  emit("shown");
+  if (browser.listing?.ready && first > 0) browser.view.reveal(first);
+}
+
+export function setSort(by) {
+  const ascending = browser.sort.by === by ? !browser.sort.ascending : true;
+  browser.sort = { by, ascending };
+  setPref("sort", browser.sort);
+  reopen();
+}
+
+export function setFilter(text) {
+  if (browser.filter === text) return;
+  browser.filter = text;
+  reopen();
+}
+
+async function reopen() {
+  if (browser.id === "/") return;
+  const mine = ++turn;
+  browser.listing?.cancel();
+  remembered.delete(browser.id);
+  await show(browser.id, mine, null);
+}
+
+// After something was changed: what is there stays until the new state has come; what was chosen stays chosen.
+export async function refresh(chooseIds = null) {
+  if (browser.id === "/") return loadShares();
+  const { listing, selection, view } = browser;
+  if (!listing) return undefined;
+  const chosen = chooseIds ?? idsOf(selection.ranges.list.length > 0 && selection.count <= 1000 ? selection : null);
+  const cursorId = chooseIds ? chooseIds[0] : listing.item(selection.cursor)?.id;
+  await listing.refresh(...(view.inSight ?? [0, FIRST_LOOK]));
+  if (listing !== browser.listing) return undefined;
+  const wanted = new Set(chosen);
+  const indexes = [];
+  let cursor = null;
+  for (let i = 0; i < listing.total && i < 20000 && (wanted.size > indexes.length || cursor === null); ++i) {
+    const id = listing.item(i)?.id;
+    if (id === cursorId) cursor = i;
+    if (id && wanted.has(id)) indexes.push(i);
+  }
+  selection.restore(indexes, cursor ?? Math.min(selection.cursor, Math.max(0, listing.total - 1)));
+  if (chooseIds && cursor !== null) view.reveal(cursor);
+  return undefined;
+}
+
+function idsOf(selection) {
+  if (!selection) return [];
+  const ids = [];
+  for (const [first, last] of selection.ranges.list) {
+    for (let i = first; i <= last; ++i) ids.push(browser.listing.item(i)?.id);
+  }
+  return ids.filter(Boolean);
+}
+
+export function selectedEntries() {
+  return browser.listing ? browser.listing.entries(browser.selection.ranges.list) : Promise.resolve([]);
+}
+
+export { columns };

@@ -1,0 +1,78 @@
+// Everything that can be done, once: for the toolbar, the menus, the keyboard and the list of shortcuts.
+
+import { browser, go, goUp, refresh, selectedEntries, setMode, shareEntry } from "./browser.js";
+import { isReadOnlyShare } from "./entries.js";
+import { copyPath, download, newFolder, rename, showProperties } from "./operations.js";
+import { editPath } from "./pathbar.js";
+import { preview } from "./preview.js";
+import { chooseFiles } from "./uploads.js";
+
+const commands = new Map();
+
+// {id, icon, keys: ["Delete"], group, when(context), run(context)}; the label is the text "command.ID".
+export function addCommand(command) {
+  commands.set(command.id, { when: () => true, keys: [], ...command });
+}
+
+export function command(id) {
+  return commands.get(id);
+}
+
+export function allCommands() {
+  return [...commands.values()];
+}
+
+// What commands decide by.
+export function context() {
+  const { selection, listing } = browser;
+  const count = listing?.ready ? selection.count : 0;
+  const share = shareEntry(browser.id);
+  const folder = browser.id !== "/" && Boolean(listing?.ready);
+  return {
+    folder,
+    count,
+    single: count === 1 ? listing.item(selection.ranges.list[0][0]) : undefined,
+    canWrite: folder && share !== undefined && !isReadOnlyShare(share),
+    inBin: /^\/[^/]+\/%23recycle(\/|$)/.test(browser.id),
+  };
+}
+
+export function runCommand(id) {
+  const found = commands.get(id);
+  const now = context();
+  if (found?.when(now)) found.run(now);
+}
+
+export function shortcutText(keys) {
+  const mac = navigator.platform.startsWith("Mac");
+  const names = { Mod: mac ? "⌘" : "Ctrl", ArrowUp: "↑", ArrowLeft: "←", ArrowRight: "→", Delete: "Del", " ": "Space", Backspace: "⌫" };
+  return keys.split("+").map((key) => names[key] ?? (key.length === 1 ? key.toUpperCase() : key)).join(mac ? "" : "+");
+}
+
+const some = ({ count }) => count > 0;
+const one = ({ single }) => single !== undefined;
+
+addCommand({ id: "open", icon: "folder-open", keys: ["Enter"], group: "open", when: one, run: ({ single }) =>
+  (single.isFolder ? go(single.id) : preview(single)) });
+addCommand({ id: "preview", icon: "eye", keys: [" "], group: "open", when: ({ single }) => single && !single.isFolder,
+  run: ({ single }) => preview(single) });
+addCommand({ id: "download", icon: "download", keys: ["Mod+s"], group: "open", when: some,
+  run: async () => download(await selectedEntries()) });
+addCommand({ id: "rename", icon: "rename", keys: ["F2"], group: "change", when: ({ single, canWrite, inBin }) => single && canWrite && !inBin,
+  run: ({ single }) => rename(single) });
+addCommand({ id: "copyPath", icon: "copy", group: "info", when: one, run: ({ single }) => copyPath(single.id) });
+addCommand({ id: "properties", icon: "info", keys: ["Alt+Enter"], group: "info", when: ({ single, folder }) => single || folder,
+  run: ({ single }) => showProperties(single ?? browser.id) });
+addCommand({ id: "upload", icon: "upload", keys: ["Mod+u"], group: "new", when: ({ canWrite, inBin }) => canWrite && !inBin, run: () => chooseFiles(false) });
+addCommand({ id: "uploadFolder", icon: "upload", group: "new", when: ({ canWrite, inBin }) => canWrite && !inBin, run: () => chooseFiles(true) });
+addCommand({ id: "newFolder", icon: "new-folder", keys: ["Alt+n"], group: "new", when: ({ canWrite, inBin }) => canWrite && !inBin, run: () => newFolder() });
+addCommand({ id: "selectAll", icon: "check", keys: ["Mod+a"], group: "select", when: ({ folder }) => folder,
+  run: () => browser.selection.all(browser.listing.total) });
+addCommand({ id: "selectNone", icon: "close", keys: ["Escape"], group: "select", when: some, run: () => browser.selection.clear() });
+addCommand({ id: "refresh", icon: "refresh", keys: ["Alt+r"], group: "view", run: () => refresh() });
+addCommand({ id: "viewList", icon: "list", keys: ["Alt+1"], group: "view", when: ({ folder }) => folder, run: () => setMode("list") });
+addCommand({ id: "viewGrid", icon: "grid", keys: ["Alt+2"], group: "view", when: ({ folder }) => folder, run: () => setMode("grid") });
+addCommand({ id: "up", icon: "up", keys: ["Backspace", "Alt+ArrowUp"], group: "go", when: () => browser.id !== "/", run: goUp });
+addCommand({ id: "back", icon: "back", keys: ["Alt+ArrowLeft"], group: "go", run: () => history.back() });
+addCommand({ id: "forward", icon: "forward", keys: ["Alt+ArrowRight"], group: "go", run: () => history.forward() });
+addCommand({ id: "editPath", icon: "rename", keys: ["Mod+l"], group: "go", run: editPath });

@@ -1,0 +1,86 @@
+// Making elements. Text only ever enters the document as text.
+
+// h("div.card#id", {title: "x", onclick: f, role: "row"}, child, "text", [more])
+export function h(selector, attributes = {}, ...children) {
+  const [tag, ...marks] = selector.split(/(?=[.#])/);
+  const node = document.createElement(tag || "div");
+  for (const mark of marks) {
+    if (mark[0] === "#") node.id = mark.slice(1);
+    else node.classList.add(mark.slice(1));
+  }
+  set(node, attributes);
+  node.append(...children.flat(Infinity).filter((child) => child !== null && child !== undefined && child !== false));
+  return node;
+}
+
+export function set(node, attributes) {
+  for (const [name, value] of Object.entries(attributes)) {
+    if (name.startsWith("on")) node.addEventListener(name.slice(2), value);
+    else if (value === false || value === null || value === undefined) node.removeAttribute(name);
+    else node.setAttribute(name, value === true ? "" : value);
+  }
+  return node;
+}
+
+export function icon(name, className = "icon") {
+  const svg = document.createElementNS("http://www.w3.org/2000/svg", "svg");
+  svg.setAttribute("class", className);
+  svg.setAttribute("aria-hidden", "true");
+  const use = document.createElementNS("http://www.w3.org/2000/svg", "use");
+  use.setAttribute("href", `icons.svg#${name}`);
+  svg.append(use);
+  return svg;
+}
+
+export function iconButton(name, label, onclick, extra = {}) {
+  return h("button.icon-button", { type: "button", "aria-label": label, title: label, onclick, ...extra }, icon(name));
+}
+
+export const $ = (id) => document.getElementById(id);
+
+const BIDI = { "\u202A": "LRE", "\u202B": "RLE", "\u202C": "PDF", "\u202D": "LRO", "\u202E": "RLO", "\u2066": "LRI",
+  "\u2067": "RLI", "\u2068": "FSI", "\u2069": "PDI", "\u200E": "LRM", "\u200F": "RLM", "\u061C": "ALM" };
+const ODD = /[\u0000-\u001F\u007F-\u009F\u202A-\u202E\u2066-\u2069\u200E\u200F\u061C\uFFFD]/u;
+const ODD_RUN = /([\u0000-\u001F\u007F-\u009F\u202A-\u202E\u2066-\u2069\u200E\u200F\u061C\uFFFD])/u;
+const PLAIN = /^[\u0020-\u024F]*$/u;
+const TAIL = 9;
+
+// A name for people: characters that would hide, move or break text show as marks.
+export function nameNode(name) {
+  const node = h("bdi.name");
+  if (!ODD.test(name)) {
+    const cut = name.length - TAIL;
+    // The end, with the extension, stays in sight when the name is cut.
+    if (cut > TAIL && PLAIN.test(name)) {
+      node.append(h("span.stem", {}, name.slice(0, cut)), h("span.tail", {}, name.slice(cut)));
+    } else {
+      node.append(h("span.stem", {}, name));
+    }
+    return node;
+  }
+  const stem = h("span.stem");
+  for (const piece of name.split(ODD_RUN)) {
+    if (piece === "") continue;
+    stem.append(piece.length === 1 && ODD.test(piece) ? h("span.mark", {}, markOf(piece)) : piece);
+  }
+  node.append(stem);
+  return node;
+}
+
+export function plainName(name) {
+  return name.replace(new RegExp(ODD, "gu"), (piece) => (piece === "\uFFFD" ? piece : `[${markOf(piece)}]`));
+}
+
+function markOf(character) {
+  const code = character.codePointAt(0);
+  if (character === "\uFFFD") return "?";
+  if (code < 0x20) return String.fromCodePoint(0x2400 + code);
+  if (code === 0x7F) return "\u2421";
+  return BIDI[character] ?? code.toString(16).toUpperCase();
+}
+
+export function announce(text) {
+  const live = $("live");
+  live.textContent = "";
+  requestAnimationFrame(() => { live.textContent = text; });
+}

@@ -1,0 +1,55 @@
+// An entry of a listing as the page uses it: flat, with its id.
+
+import { encodeName, idIn, lastOf, parentOf, splitExtension } from "./path.js";
+import { kindOf } from "./icons.js";
+import { t } from "./strings.js";
+
+export function entryOf(item) {
+  const more = item.additional ?? {};
+  const id = idIn(item);
+  return {
+    id,
+    name: item.name,
+    encodedName: item.name_raw ?? encodeName(item.name),
+    parent: parentOf(id),
+    isFolder: item.isdir,
+    kind: kindOf(item.name, item.isdir, id, more.mount_point_type ?? ""),
+    size: item.isdir ? null : more.size ?? null,
+    mtime: more.time?.mtime ?? 0,
+    time: more.time,
+    owner: more.owner?.user || (more.owner ? String(more.owner.uid) : ""),
+    group: more.owner?.group || (more.owner ? String(more.owner.gid) : ""),
+    mount: more.mount_point_type ?? "",
+    perm: more.perm,
+    right: more.perm?.share_right,
+    volume: more.volume_status,
+    synced: more.sync_share ?? false,
+  };
+}
+
+// What somebody without the right to read an entry sees is its name alone.
+export function isLocked(entry) {
+  return entry.perm?.acl !== undefined && !entry.perm.acl.read && entry.right === undefined;
+}
+
+export function isOffline(entry) {
+  return entry.mount === "remotefail";
+}
+
+export function isReadOnlyShare(entry) {
+  return entry.right === 1 || entry.volume?.readonly === true;
+}
+
+export function extensionOf(entry) {
+  return entry.isFolder ? "" : splitExtension(entry.name)[1].slice(1).toUpperCase();
+}
+
+// The recycle bin of a share has a name that says so.
+export function shownName(entry) {
+  return entry.kind === "recycle" ? t("place.recycle") : entry.name;
+}
+
+export function isRecycleBin(id) {
+  const parts = id.split("/");
+  return parts.length === 3 && lastOf(id) === "%23recycle";
+}

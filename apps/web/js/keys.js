@@ -1,0 +1,110 @@
+// The keyboard: moving in the list, shortcuts, finding by typing.
+
+import { browser } from "./browser.js";
+import { allCommands, context, runCommand } from "./commands.js";
+import { $ } from "./dom.js";
+
+const TYPING_PAUSE = 900; // after which a letter begins a new word
+const TYPING_GAP = 200; // in which the next letter mostly comes
+let typed = "";
+let typedAt = 0;
+
+export function setupKeys() {
+  $("view").addEventListener("keydown", (event) => {
+    if (event.target !== $("view")) return;
+    if (moved(event) || typeAhead(event)) event.preventDefault();
+  });
+  addEventListener("keydown", shortcut);
+}
+
+function shortcut(event) {
+  if (event.defaultPrevented || document.querySelector("dialog[open], .menu")) return;
+  const writing = event.target.closest?.("input:not([type=checkbox]), textarea, select, [contenteditable]");
+  const found = allCommands().find((command) => command.keys.some((keys) => matches(event, keys)));
+  if (!found || (writing && !event.ctrlKey && !event.metaKey && !event.altKey)) return;
+  if (writing && ["selectAll", "copy", "cut", "paste"].includes(found.id)) return;
+  // A plain key on a button or a link is that button's.
+  const onControl = event.target.closest?.("button, a, [role=treeitem]");
+  if (onControl && ["Enter", " "].includes(event.key)) return;
+  if (!found.when(context())) return;
+  event.preventDefault();
+  runCommand(found.id);
+}
+
+function matches(event, keys) {
+  const wanted = new Set(keys.split("+"));
+  const mod = event.ctrlKey || event.metaKey;
+  const key = [...wanted].at(-1);
+  return mod === wanted.has("Mod") && event.altKey === wanted.has("Alt") && event.shiftKey === (wanted.has("Shift") || (event.shiftKey && key === "?")) &&
+    (event.key === key || event.key.toLowerCase() === key);
+}
+
+function moved(event) {
+  const { listing, selection, view } = browser;
+  if (!listing?.ready || listing.total === 0 || event.altKey) return false;
+  const across = view.shape.across;
+  const page = view.linesPerPage() * across;
+  const { cursor } = selection;
+  const steps = { ArrowDown: cursor + across, ArrowUp: cursor - across, Home: 0, End: listing.total - 1, PageDown: cursor + page, PageUp: cursor - page };
+  if (across > 1) Object.assign(steps, { ArrowRight: cursor + 1, ArrowLeft: cursor - 1 });
+  if (event.key === " " && (event.ctrlKey || event.metaKey)) {
+    selection.pick(cursor, { ctrl: true });
+    return true;
+  }
+  if (!(event.key in steps)) return false;
+  // The first key after arriving chooses the first row instead of jumping over it.
+  const fresh = selection.count === 0 && cursor === 0 && ["ArrowDown", "ArrowRight"].includes(event.key) && !event.shiftKey;
+  const index = fresh ? 0 : Math.min(listing.total - 1, Math.max(0, steps[event.key]));
+  if (event.ctrlKey && !event.shiftKey) selection.move(index);
+  else selection.pick(index, { shift: event.shiftKey, ctrl: event.ctrlKey });
+  view.reveal(index);
+  return true;
+}
+
+// Letters jump to the next name that begins with them.
+function typeAhead(event) {
+  const { listing, selection } = browser;
+  if (!listing?.ready || event.key.length !== 1 || event.ctrlKey || event.metaKey || event.altKey) return false;
+  const now = performance.now();
+  const continued = now - typedAt < TYPING_PAUSE;
+  if (event.key === " " && !(continued && typed !== "")) return false;
+  if (event.key === "/" || event.key === "?") return false;
+  typed = continued ? typed + event.key : event.key;
+  typedAt = now;
+  const repeated = [...typed].every((letter) => letter === typed[0]);
+  jump(repeated ? typed[0] : typed, selection.cursor + (repeated || typed.length === 1 ? 1 : 0));
+  return true;
+}
+
+let jumps = 0;
+
+async function jump(text, start) {
+  const mine = ++jumps;
+  const { listing, selection, view } = browser;
+  const wanted = text.toLowerCase();
+  const begins = (entry) => entry.name.toLowerCase().startsWith(wanted);
+  let index = listing.find(begins, start % Math.max(1, listing.total));
+  if (index < 0 && browser.sort.by === "name" && browser.sort.ascending) {
+    await new Promise((resolve) => setTimeout(resolve, TYPING_GAP));
+    if (mine === jumps) index = await searchSorted(listing, wanted, () => mine === jumps);
+  }
+  if (index < 0 || mine !== jumps || listing !== browser.listing) return;
+  selection.pick(index);
+  view.reveal(index, "center");
+}
+
+// Rows that were never loaded are found by halving, as they lie in the order of their names; the folders first.
+async function searchSorted(listing, wanted, goesOn) {
+  let low = 0;
+  let high = listing.total;
+  const at = async (index) => (await listing.entries([[index, index]]))[0];
+  while (low < high && goesOn()) {
+    const middle = (low + high) >> 1;
+    const entry = await at(middle);
+    if (!entry) return -1;
+    if (entry.isFolder || entry.name.toLowerCase() < wanted) low = middle + 1;
+    else high = middle;
+  }
+  const entry = low < listing.total ? await at(low) : undefined;
+  return entry?.name.toLowerCase().startsWith(wanted) ? low : -1;
+}

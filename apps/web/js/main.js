@@ -1,0 +1,162 @@
+// Starts the page.
+
+import { setupActivity } from "./activity.js";
+import { browser, columns, goUp, loadShares, open, refresh, setFilter, setSort, shareEntry } from "./browser.js";
+import { context, runCommand } from "./commands.js";
+import { setWhy } from "./dialogs.js";
+import { $, h } from "./dom.js";
+import { setupDragAndDrop } from "./dragdrop.js";
+import { on } from "./events.js";
+import { homeNode, paintVolume } from "./home.js";
+import { setupKeys } from "./keys.js";
+import { newFolder } from "./operations.js";
+import { normaliseId, parentOf } from "./path.js";
+import { setupPathbar } from "./pathbar.js";
+import { setupPointer } from "./pointer.js";
+import { setupSettings } from "./settings.js";
+import { emptyBin, emptyFolder, failedState, noShares, nothingFound } from "./states.js";
+import { loadStrings, t } from "./strings.js";
+import { setupToolbar } from "./toolbar.js";
+import { setupTree } from "./tree.js";
+import { chooseFiles, uploadsRunning } from "./uploads.js";
+import { View } from "./view.js";
+import { showWhy } from "./why.js";
+
+const SCROLL_PAUSE = 60;
+let stateNode = null;
+let homeShown = null;
+let scrollTimer = null;
+
+function setState(node) {
+  stateNode?.remove();
+  stateNode = node;
+  if (node) $("content").append(node);
+}
+
+// The place changed: another list, or the shares.
+function showPlace() {
+  homeShown?.remove();
+  homeShown = null;
+  setState(null);
+  const home = browser.id === "/";
+  $("view").hidden = home;
+  if (home) {
+    homeShown = homeNode();
+    $("content").append(homeShown);
+    if (browser.shares.length === 0) setState(noShares());
+  } else {
+    browser.view.show(browser.listing, browser.selection, browser.mode, columns());
+    paintListing();
+  }
+  paintVolume($("volume"), shareEntry(browser.id));
+}
+
+function paintListing() {
+  const { listing, view } = browser;
+  if (!listing) return;
+  view.render();
+  setState(stateOf(listing));
+  if (listing.ready) listing.need(...view.inSight);
+}
+
+function stateOf(listing) {
+  if (listing.error) {
+    const { id } = browser;
+    const back = parentOf(id) === "/" ? null : goUp;
+    return failedState(listing.error, undefined, { retry: () => open(id), back, why: () => showWhy(id) });
+  }
+  if (!listing.ready || listing.total > 0) return null;
+  if (browser.filter !== "") return nothingFound(browser.filter, clearFilter);
+  const { canWrite, inBin } = context();
+  return inBin ? emptyBin() : emptyFolder({ canWrite, upload: () => chooseFiles(false), newFolder });
+}
+
+function clearFilter() {
+  $("find").value = "";
+  setFilter("");
+}
+
+// Pages are asked for once the scrolling slows down: what flies by is never fetched.
+function scrolled() {
+  clearTimeout(scrollTimer);
+  scrollTimer = setTimeout(() => browser.listing?.need(...browser.view.inSight), SCROLL_PAUSE);
+}
+
+function setupFind() {
+  const input = $("find");
+  let timer = null;
+  input.addEventListener("input", () => {
+    clearTimeout(timer);
+    timer = setTimeout(() => setFilter(input.value.trim()), 180);
+  });
+  input.addEventListener("keydown", (event) => {
+    if (event.key === "Escape") {
+      clearFilter();
+      $("view").focus();
+    }
+    if (event.key === "ArrowDown" || event.key === "Enter") $("view").focus();
+  });
+  on("place", () => {
+    clearTimeout(timer);
+    input.value = "";
+    input.disabled = browser.id === "/";
+  });
+}
+
+function setupSidebar() {
+  const close = () => {
+    $("side").classList.remove("open");
+    document.querySelector(".side-scrim")?.remove();
+  };
+  $("menu-button").addEventListener("click", () => {
+    $("side").classList.add("open");
+    document.body.append(h("div.side-scrim", { onclick: close }));
+  });
+  on("place", close);
+  addEventListener("keydown", (event) => { if (event.key === "Escape") close(); });
+}
+
+function fillTexts() {
+  for (const node of document.querySelectorAll("[data-text]")) node.textContent = t(node.dataset.text);
+  for (const node of document.querySelectorAll("[data-label]")) {
+    node.setAttribute("aria-label", t(node.dataset.label));
+    if (node.tagName === "BUTTON") node.title = t(node.dataset.label);
+  }
+  for (const node of document.querySelectorAll("[data-placeholder]")) node.placeholder = t(node.dataset.placeholder);
+  for (const node of document.querySelectorAll("[data-run]")) node.addEventListener("click", () => runCommand(node.dataset.run));
+}
+
+async function start() {
+  await loadStrings();
+  fillTexts();
+  browser.view = new View($("view"), { onScrolled: scrolled });
+  setWhy(showWhy);
+  on("shown", showPlace);
+  on("listing", paintListing);
+  on("selection", () => browser.listing && browser.view.listing === browser.listing && browser.view.paintSelection());
+  on("shares", () => { if (browser.id === "/" && homeShown) showPlace(); });
+  setupToolbar(setSort);
+  setupPathbar();
+  setupTree();
+  setupPointer();
+  setupKeys();
+  setupFind();
+  setupSidebar();
+  setupSettings();
+  setupActivity();
+  setupDragAndDrop();
+  addEventListener("hashchange", () => open(normaliseId(location.hash.slice(1))));
+  addEventListener("beforeunload", (event) => { if (uploadsRunning()) event.preventDefault(); });
+  addEventListener("focus", () => { if (context().folder && browser.selection.count === 0) refresh(); });
+  try {
+    await loadShares();
+  } catch (failure) {
+    setState(failedState(failure, undefined, { retry: () => location.reload() }));
+    return;
+  }
+  document.body.classList.add("started");
+  open(normaliseId(location.hash.slice(1)));
+  $("view").focus({ preventScroll: true });
+}
+
+start();

@@ -1,0 +1,126 @@
+// What is done to files at once: new folder, rename, download, properties.
+
+import { get, post, PROGRAMS, readReply } from "./api.js";
+import { browser, refresh } from "./browser.js";
+import { askText, dialog, toast, toastFailure } from "./dialogs.js";
+import { $, h, icon, nameNode, plainName } from "./dom.js";
+import { entryOf, extensionOf } from "./entries.js";
+import { emit } from "./events.js";
+import { formatFullTime, formatMode, formatSize } from "./format.js";
+import { iconOf } from "./icons.js";
+import { childOf, decode, encodeName, lastOf, nameOf, parentOf, splitExtension } from "./path.js";
+import { t } from "./strings.js";
+import { whyNode } from "./why.js";
+
+export function checkName(text) {
+  if (text === "") return t("name.empty");
+  if (text.includes("/")) return t("name.slash");
+  if (text === "." || text === "..") return t("name.dots");
+  return new TextEncoder().encode(text).length > 255 ? t("name.long") : "";
+}
+
+export async function newFolder() {
+  const folder = browser.id;
+  const made = await askText({
+    title: t("newFolder.title"), label: t("name.label"), value: t("newFolder.name"), action: t("newFolder.action"), check: checkName,
+    submit: async (name) => {
+      const id = childOf(folder, encodeName(name));
+      await post("operation", { action: "mkdir", path_raw: id });
+      return id;
+    },
+  });
+  if (!made) return;
+  emit("folders-changed", { ids: [folder] });
+  if (browser.id === folder) await refresh([made]);
+}
+
+export async function rename(entry) {
+  const [stem] = entry.isFolder ? [entry.name] : splitExtension(entry.name);
+  const renamed = await askText({
+    title: t("rename.title"), label: t("name.label"), value: entry.name, selectTo: stem.length, action: t("rename.action"),
+    check: (text) => (text === entry.name ? "" : checkName(text)),
+    submit: async (name) => {
+      if (name === entry.name) return entry.id;
+      await post("operation", { action: "rename", path_raw: entry.id, name_raw: encodeName(name) });
+      return childOf(entry.parent, encodeName(name));
+    },
+  });
+  if (!renamed || renamed === entry.id) return;
+  if (entry.isFolder) emit("folders-changed", { ids: [entry.parent] });
+  await refresh([renamed]);
+}
+
+// A file as it is; several, or a folder, as one zip. What goes wrong comes back as a reply in the frame.
+export function download(entries) {
+  if (entries.length === 0) return;
+  const frame = h("iframe", { name: `download-${Date.now()}`, hidden: true, title: "" });
+  const form = h("form", { method: "post", action: `${PROGRAMS}download`, target: frame.name, hidden: true });
+  for (const entry of entries) form.append(h("input", { type: "hidden", name: "path_raw", value: entry.id }));
+  if (entries.length > 1) form.append(h("input", { type: "hidden", name: "name", value: plainName(nameOf(parentOf(entries[0].id))) || "download" }));
+  document.body.append(frame, form);
+  frame.addEventListener("load", () => {
+    const text = frame.contentDocument?.body?.textContent ?? "";
+    if (text === "") return;
+    try {
+      readReply(200, text);
+    } catch (failure) {
+      toastFailure(failure, entries[0].id);
+    }
+  });
+  form.submit();
+  form.remove();
+  setTimeout(() => frame.remove(), 600000);
+  if (entries.length > 1 || entries[0].isFolder) toast({ text: t("download.zip", { count: entries.length }) });
+}
+
+export async function copyPath(id) {
+  const text = decode(id);
+  try {
+    await navigator.clipboard.writeText(text);
+  } catch {
+    // Without a secure connection there is no clipboard: the old way.
+    const area = h("textarea.visually-hidden");
+    area.value = text;
+    (document.querySelector("dialog[open]") ?? document.body).append(area);
+    area.select();
+    document.execCommand("copy");
+    area.remove();
+  }
+  toast({ text: t("path.copied") });
+}
+
+async function entryAt(id) {
+  if (parentOf(id) === "/") return browser.shares.find((share) => share.id === id);
+  const name = lastOf(id);
+  const reply = await get("list", { action: "folder", path_raw: parentOf(id), pattern: decode(name).replace(/[,\\*?[\]]/g, "?"),
+    additional: "size,time,owner,perm,mount_point_type" });
+  return reply.items.map(entryOf).find((entry) => entry.encodedName === name);
+}
+
+// Of an entry, or of the folder with an id.
+export async function showProperties(what) {
+  let entry = what;
+  try {
+    if (typeof what === "string") entry = await entryAt(what);
+  } catch (failure) {
+    return toastFailure(failure, what);
+  }
+  if (!entry) return undefined;
+  const line = (key, value) => value && [h("dt", {}, t(`properties.${key}`)), h("dd", {}, value)];
+  return dialog({ title: t("command.properties"), className: "properties", fill: () => [
+    h("div.hero", {}, icon(iconOf(entry), "file-icon"), h("div.grow", {}, h("b", {}, nameNode(entry.name)),
+      h("span.soft", {}, entry.isFolder ? t("type.folder") : extensionOf(entry) || t("type.file")))),
+    h("dl", {}, line("path", h("code", {}, plainName(decode(entry.id)))),
+      line("size", entry.size !== null && `${formatSize(entry.size)} (${t("size.bytes", { count: entry.size })})`),
+      line("modified", formatFullTime(entry.mtime)), line("created", formatFullTime(entry.time?.crtime)),
+      line("owner", entry.owner && `${entry.owner} · ${entry.group}`),
+      line("mode", entry.perm?.posix !== undefined && h("code", {}, `${formatMode(entry.perm.posix)}`)),
+      line("volume", entry.volume && t("volume.free", { free: formatSize(entry.volume.freespace), total: formatSize(entry.volume.totalspace) }))),
+    whyNode(entry.id),
+    h("footer", {}, h("button.button.outlined", { type: "button", onclick: () => copyPath(entry.id) }, icon("copy"), t("command.copyPath"))),
+  ] });
+}
+
+export function focusView() {
+  $("view").focus({ preventScroll: true });
+}

@@ -1,0 +1,85 @@
+// Paths of shares. Everywhere in the page a path is an "id": the bytes of the share-relative path, percent-encoded as
+// the programs do it. So a name in any encoding can be kept, compared, put into the address bar and sent back.
+
+const decoder = new TextDecoder("utf-8");
+const encoder = new TextEncoder();
+
+export function encodeName(name) {
+  return encodeURIComponent(name.toWellFormed()).replace(/[!'()*]/g, hexOf);
+}
+
+function hexOf(character) {
+  return "%" + character.charCodeAt(0).toString(16).toUpperCase();
+}
+
+// From a path as people type it.
+export function encodePath(path) {
+  return path.split("/").map(encodeName).join("/");
+}
+
+// An address that somebody may have edited: whatever it holds, the answer is an id.
+export function normaliseId(text) {
+  const parts = text.split("/").filter((part) => part !== "");
+  return parts.length === 0 ? "/" : "/" + parts.map(normalisePart).join("/");
+}
+
+function normalisePart(part) {
+  const whole = part.replace(/%(?![0-9A-Fa-f]{2})/g, "%25");
+  return whole.replace(/%[0-9A-Fa-f]{2}|[^A-Za-z0-9\-._~]/gu, (piece) =>
+    piece.length === 3 && piece[0] === "%" ? piece.toUpperCase() : encodeName(piece));
+}
+
+// Readable; bytes that are no UTF-8 show as U+FFFD.
+export function decode(id) {
+  const bytes = encoder.encode(id);
+  const out = new Uint8Array(bytes.length);
+  let length = 0;
+  for (let i = 0; i < bytes.length; ++i) {
+    const escaped = bytes[i] === 0x25;
+    out[length++] = escaped ? parseInt(id.slice(i + 1, i + 3), 16) : bytes[i];
+    if (escaped) i += 2;
+  }
+  return decoder.decode(out.subarray(0, length));
+}
+
+export function parentOf(id) {
+  const end = id.lastIndexOf("/");
+  return end <= 0 ? "/" : id.slice(0, end);
+}
+
+export function lastOf(id) {
+  return id.slice(id.lastIndexOf("/") + 1);
+}
+
+export function nameOf(id) {
+  return decode(lastOf(id));
+}
+
+export function childOf(id, encodedName) {
+  return (id === "/" ? "" : id) + "/" + encodedName;
+}
+
+export function isWithin(id, ancestor) {
+  return ancestor === "/" || id === ancestor || id.startsWith(ancestor + "/");
+}
+
+// "/a/b/c" gives "/a", "/a/b", "/a/b/c".
+export function ancestry(id) {
+  const parts = id.split("/").filter((part) => part !== "");
+  return parts.map((_, i) => "/" + parts.slice(0, i + 1).join("/"));
+}
+
+export function shareOf(id) {
+  return ancestry(id)[0] ?? "/";
+}
+
+// Of a reply's object, whose readable text is in `key`.
+export function idIn(object, key = "path") {
+  return object[key + "_raw"] ?? encodePath(object[key]);
+}
+
+// "name.tar.gz" gives ["name", ".tar.gz"]; names that begin with a dot have no extension.
+export function splitExtension(name) {
+  const match = /^(.+?)((?:\.tar)?\.[^.\s]{1,10})$/iu.exec(name);
+  return match ? [match[1], match[2]] : [name, ""];
+}

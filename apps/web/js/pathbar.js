@@ -1,0 +1,66 @@
+// The path as a row of folders, and as text to type over.
+
+import { h, icon, nameNode, set } from "./dom.js";
+import { browser, go } from "./browser.js";
+import { ancestry, decode, encodePath, nameOf, normaliseId } from "./path.js";
+import { isRecycleBin } from "./entries.js";
+import { on } from "./events.js";
+import { t } from "./strings.js";
+
+const bar = document.getElementById("pathbar");
+
+export function labelOf(id) {
+  if (id === "/") return t("place.shares");
+  if (id === "/home") return t("place.home");
+  return isRecycleBin(id) ? t("place.recycle") : nameOf(id);
+}
+
+export function setupPathbar() {
+  on("place", paint);
+  bar.addEventListener("click", (event) => {
+    if (!event.target.closest("a")) editPath();
+  });
+}
+
+function paint(id) {
+  const ids = ["/", ...ancestry(id)];
+  bar.replaceChildren(h("ol", {}, ids.map((one, i) => {
+    const last = i === ids.length - 1;
+    const crumb = h("a.crumb", { href: `#${one}`, "data-id": one, "aria-current": last ? "page" : null, title: last ? null : decode(one) });
+    if (i === 0 && !last) set(crumb, { "aria-label": labelOf(one) }).append(icon("kind-share"));
+    else crumb.append(nameNode(labelOf(one)));
+    return h("li", {}, crumb);
+  })));
+  bar.querySelector("ol").scrollLeft = 1e6;
+  document.title = `${labelOf(id)} – Orvel`;
+}
+
+export function editPath() {
+  if (bar.querySelector("input")) return;
+  const before = browser.id;
+  const text = decode(before);
+  const input = h("input.input", { type: "text", value: text, "aria-label": t("path.edit"), spellcheck: "false", autocomplete: "off" });
+  let done = false;
+  const finish = (accept) => {
+    if (done) return;
+    done = true;
+    const typed = input.value.trim();
+    paint(browser.id);
+    // Bytes that cannot be typed stay when nothing was typed over them.
+    if (accept) go(typed === text ? before : normaliseId(encodePath(typed)));
+    document.getElementById("view").focus({ preventScroll: true });
+  };
+  input.addEventListener("keydown", (event) => {
+    event.stopPropagation();
+    if (event.key === "Enter") finish(true);
+    if (event.key === "Escape") finish(false);
+  });
+  input.addEventListener("blur", () => finish(false));
+  bar.append(input);
+  input.focus();
+  input.select();
+}
+
+export function crumbId(node) {
+  return node.closest?.(".crumb")?.dataset.id ?? null;
+}

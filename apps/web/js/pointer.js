@@ -1,0 +1,55 @@
+// The pointer in the list: choosing, opening, the context menu.
+
+import { browser, go, setSort } from "./browser.js";
+import { runCommand } from "./commands.js";
+import { preview } from "./preview.js";
+import { openMenu } from "./menu.js";
+import { contextItems } from "./toolbar.js";
+
+export function setupPointer() {
+  const { root } = browser.view;
+  root.addEventListener("click", clicked);
+  root.addEventListener("dblclick", (event) => {
+    if (indexOf(event) >= 0 && !event.target.closest("button") && !event.ctrlKey && !event.shiftKey) runCommand("open");
+  });
+  root.addEventListener("contextmenu", (event) => {
+    event.preventDefault();
+    const index = indexOf(event);
+    if (index < 0) browser.selection.clear();
+    else if (!browser.selection.has(index)) browser.selection.pick(index);
+    openMenu(contextItems(), { x: event.clientX, y: event.clientY });
+  });
+}
+
+function indexOf(event) {
+  const index = browser.view.indexOf(event.target);
+  return index >= 0 && browser.listing?.item(index) ? index : -1;
+}
+
+function clicked(event) {
+  const { selection, listing } = browser;
+  const sort = event.target.closest("[data-sort]");
+  if (sort) return setSort(sort.dataset.sort);
+  if (event.target.closest("[data-all]")) return selection.count === listing.total ? selection.clear() : selection.all(listing.total);
+  const index = indexOf(event);
+  if (index < 0) return selection.clear();
+  const shift = event.shiftKey;
+  const ctrl = event.ctrlKey || event.metaKey;
+  if (event.target.closest(".more")) {
+    if (!selection.has(index)) selection.pick(index);
+    const box = event.target.closest(".more").getBoundingClientRect();
+    return openMenu(contextItems(), { x: box.left, y: box.bottom + 2 });
+  }
+  if (event.target.closest(".check")) return selection.pick(index, shift ? { shift, ctrl: true } : { ctrl: true });
+  if (event.pointerType === "touch") return tapped(index);
+  return selection.pick(index, { shift, ctrl });
+}
+
+// A finger opens; once something is chosen it chooses more.
+function tapped(index) {
+  const { selection, listing } = browser;
+  if (selection.count > 0) return selection.pick(index, { ctrl: true });
+  const entry = listing.item(index);
+  selection.cursor = index;
+  return entry.isFolder ? go(entry.id) : preview(entry);
+}

@@ -1,0 +1,122 @@
+// A look at a file: pictures, text, sound and film; of everything else what it is.
+
+import { urlOf } from "./api.js";
+import { browser } from "./browser.js";
+import { h, icon, iconButton, nameNode } from "./dom.js";
+import { describe } from "./errors.js";
+import { formatFullTime, formatSize } from "./format.js";
+import { canShowImage, iconOf } from "./icons.js";
+import { download } from "./operations.js";
+import { t } from "./strings.js";
+
+const TEXT_START = 256 * 1024;
+const LARGEST_IMAGE = 64 * 1024 * 1024;
+const TEXT_KINDS = new Set(["text", "code", "misc", "sheet"]);
+
+let shown = null;
+
+export function preview(entry) {
+  const node = h("dialog.preview", { "aria-label": t("preview.title") });
+  const title = h("div.preview-title");
+  const stage = h("div.stage");
+  node.append(h("header", {}, title,
+    iconButton("download", t("command.download"), () => download([shown.entry])),
+    iconButton("close", t("dialog.close"), () => node.close())), stage,
+    iconButton("back", t("preview.previous"), () => step(-1), { "data-step": "previous" }),
+    iconButton("forward", t("preview.next"), () => step(1), { "data-step": "next" }));
+  node.addEventListener("close", () => {
+    shown.abort.abort();
+    node.remove();
+    shown = null;
+  });
+  node.addEventListener("click", (event) => {
+    if (event.target === node || event.target === stage) node.close();
+  });
+  node.addEventListener("keydown", (event) => {
+    const by = { ArrowLeft: -1, ArrowRight: 1, ArrowUp: -1, ArrowDown: 1 }[event.key];
+    if (by && !event.target.closest("pre, video, audio")) step(by);
+    if (event.key === " " && !event.target.closest("button, video, audio")) node.close();
+  });
+  shown = { node, title, stage, abort: new AbortController(), entry };
+  fill(entry);
+  document.body.append(node);
+  node.showModal();
+  node.focus();
+}
+
+// The next file of the list; the selection goes along.
+function step(by) {
+  const { listing, selection, view } = browser;
+  for (let i = selection.cursor + by; i >= 0 && i < listing.total; i += by) {
+    const entry = listing.item(i);
+    if (!entry) break;
+    if (entry.isFolder) continue;
+    selection.pick(i);
+    view.reveal(i);
+    fill(entry);
+    return;
+  }
+}
+
+async function fill(entry) {
+  shown.abort.abort();
+  const abort = new AbortController();
+  Object.assign(shown, { entry, abort });
+  const about = [entry.size !== null && formatSize(entry.size), formatFullTime(entry.mtime)].filter(Boolean).join(" · ");
+  shown.title.replaceChildren(icon(iconOf(entry), "file-icon"), h("div.grow", {}, h("b", {}, nameNode(entry.name)), h("span", {}, about)));
+  shown.stage.replaceChildren(h("div.progress.unknown.slow", {}, h("i")));
+  const { stage } = shown;
+  try {
+    const content = await contentOf(entry, abort.signal);
+    if (!abort.signal.aborted) stage.replaceChildren(content);
+  } catch (failure) {
+    if (!abort.signal.aborted) stage.replaceChildren(message(entry, describe(failure).title));
+  }
+}
+
+function contentOf(entry, signal) {
+  if (entry.size === 0) return message(entry, t("preview.empty"));
+  if (canShowImage(entry.name) && entry.size <= LARGEST_IMAGE) return imageOf(entry);
+  if (entry.kind === "audio" || entry.kind === "video") return mediaOf(entry);
+  if (TEXT_KINDS.has(entry.kind)) return textOf(entry, signal);
+  return message(entry, t("preview.none"));
+}
+
+function source(entry) {
+  return urlOf("download", { path_raw: entry.id });
+}
+
+function imageOf(entry) {
+  return new Promise((resolve) => {
+    const image = h("img", { alt: entry.name, draggable: "false" });
+    image.addEventListener("load", () => resolve(image));
+    image.addEventListener("error", () => resolve(message(entry, t("preview.broken"))));
+    image.src = source(entry);
+  });
+}
+
+function mediaOf(entry) {
+  return new Promise((resolve) => {
+    const player = h(entry.kind, { controls: true, preload: "metadata" });
+    player.addEventListener("loadedmetadata", () => resolve(player));
+    player.addEventListener("error", () => resolve(message(entry, t("preview.broken"))));
+    player.src = source(entry);
+  });
+}
+
+async function textOf(entry, signal) {
+  const response = await fetch(source(entry), { headers: { Range: `bytes=0-${TEXT_START - 1}` }, signal });
+  if (!response.ok) {
+    const reply = await response.json();
+    throw Object.assign(new Error(), reply.error);
+  }
+  const bytes = new Uint8Array(await response.arrayBuffer());
+  if (bytes.subarray(0, 4096).includes(0)) return message(entry, t("preview.none"));
+  const text = h("pre", { tabindex: 0 }, new TextDecoder().decode(bytes));
+  return entry.size > TEXT_START ? h("div.text-part", {}, text, h("p.soft", {}, t("preview.start", { size: formatSize(TEXT_START) }))) : text;
+}
+
+function message(entry, text) {
+  return h("div.no-preview", {}, icon(iconOf(entry), "file-icon huge"), h("p", {}, text),
+    h("button.button.outlined", { type: "button", onclick: () => download([entry]) }, icon("download"), t("command.download")));
+}

@@ -1,0 +1,94 @@
+// One row of the list, or one tile of the grid.
+
+import { h, icon, nameNode, plainName, set } from "./dom.js";
+import { extensionOf, isLocked, isOffline, shownName } from "./entries.js";
+import { formatFullTime, formatSize, formatTime } from "./format.js";
+import { iconOf } from "./icons.js";
+import { decode } from "./path.js";
+import { t } from "./strings.js";
+import { thumbnailOf } from "./thumbnails.js";
+
+// id, and how a cell shows it. `sort` is the server's name of the order.
+export const COLUMNS = {
+  name: { id: "name", sort: "name" },
+  folder: { id: "folder", sort: "path", text: (entry) => plainName(decode(entry.parent)) },
+  size: { id: "size", sort: "size", text: (entry) => (entry.size === null ? "" : formatSize(entry.size)) },
+  mtime: { id: "mtime", sort: "mtime", text: (entry) => formatTime(entry.mtime), title: (entry) => formatFullTime(entry.mtime) },
+  type: { id: "type", sort: "type", text: (entry) => (entry.isFolder ? t("type.folder") : extensionOf(entry)) },
+  owner: { id: "owner", sort: "user", text: (entry) => entry.owner },
+};
+
+export function makeHeader(columns) {
+  return h("div.row.header", { role: "row", "aria-rowindex": 1 },
+    h("span.check-cell", { role: "columnheader" }, h("button.check", { type: "button", "data-all": "", "aria-label": t("select.all") })),
+    columns.map((column) => h(`span.cell.${column.id}`, { role: "columnheader", "aria-sort": column.sorted ?? "none" },
+      column.sort === null ? h("span.sort", {}, t(`column.${column.id}`))
+        : h("button.sort", { type: "button", "data-sort": column.sort }, t(`column.${column.id}`), icon("chevron-down", "icon arrow")))),
+    h("span.more-cell", { role: "columnheader" }));
+}
+
+export function makeRow(index, mode) {
+  const row = h("div.row", { id: `row-${index}`, role: mode === "list" ? "row" : "option" });
+  row.index = index;
+  if (mode === "list") row.setAttribute("aria-rowindex", index + 2);
+  else row.setAttribute("aria-posinset", index + 1);
+  return row;
+}
+
+export function fillRow(row, index, entry, mode, columns) {
+  row.entry = entry;
+  row.filled = true;
+  row.classList.toggle("waiting", !entry);
+  row.classList.toggle("locked", Boolean(entry && isLocked(entry)));
+  row.draggable = Boolean(entry);
+  if (!entry) {
+    row.removeAttribute("aria-label");
+    row.replaceChildren(h("span.bone.bone-icon"), h("span.bone.bone-name"), h("span.bone.bone-more"));
+    row.querySelector(".bone-name").style.width = `${18 + ((index * 37) % 24)}%`;
+    return;
+  }
+  row.replaceChildren(...(mode === "list" ? listCells(entry, columns) : tileParts(entry)));
+  set(row, { "aria-label": mode === "grid" ? plainName(entry.name) : null });
+}
+
+function check() {
+  return h("button.check", { type: "button", tabindex: -1, "aria-label": t("select.one") });
+}
+
+function more() {
+  return h("button.more", { type: "button", tabindex: -1, "aria-label": t("menu.open"), title: t("menu.open") }, icon("dots"));
+}
+
+function badges(entry) {
+  return [
+    isLocked(entry) && h("span.badge", { title: t("mark.locked") }, icon("lock")),
+    isOffline(entry) && h("span.badge.warn", { title: t("mark.offline") }, icon("offline")),
+  ];
+}
+
+function listCells(entry, columns) {
+  const cells = columns.map((column) => column.id === "name" ? null : h(`span.cell.${column.id}`,
+    { role: "gridcell", title: column.title?.(entry) ?? null }, column.id === "folder" ? nameNode(column.text(entry)) : column.text(entry)));
+  const sub = [formatTime(entry.mtime), entry.size === null ? null : formatSize(entry.size)].filter(Boolean).join(" · ");
+  return [
+    h("span.check-cell", { role: "gridcell" }, check()),
+    h("span.cell.name", { role: "gridcell", title: plainName(entry.name) }, picture(entry, "file-icon"),
+      h("span.label", {}, nameNode(shownName(entry)), h("span.sub", {}, sub)), badges(entry)),
+    ...cells.filter(Boolean),
+    h("span.more-cell", { role: "gridcell" }, more()),
+  ];
+}
+
+function tileParts(entry) {
+  return [
+    check(), more(),
+    h("span.tile-picture", {}, picture(entry, "file-icon large"), badges(entry)),
+    h("span.label", { title: plainName(entry.name) }, nameNode(shownName(entry)),
+      h("span.sub", {}, entry.size === null ? t("type.folder") : formatSize(entry.size))),
+  ];
+}
+
+function picture(entry, className) {
+  const drawn = icon(iconOf(entry), className);
+  return className.includes("large") ? thumbnailOf(entry, drawn) : drawn;
+}

@@ -1,0 +1,40 @@
+// Texts of the page, by language. A key that a table lacks falls back to English, then to the key itself.
+
+import { pref, setPref } from "./prefs.js";
+
+export const LANGUAGES = { en: "English", de: "Deutsch" };
+
+let table = {};
+let fallback = {};
+export let language = "en";
+export let locale = "en";
+
+export async function loadStrings() {
+  const wanted = pref("language", null) ?? navigator.languages.map((tag) => tag.slice(0, 2)).find((tag) => tag in LANGUAGES);
+  language = wanted in LANGUAGES ? wanted : "en";
+  const load = async (name) => (await fetch(`strings/${name}.json`)).json();
+  [fallback, table] = await Promise.all([load("en"), language === "en" ? {} : load(language)]);
+  // Dates and numbers as the browser's own region writes them, where it speaks the language.
+  locale = navigator.languages.find((tag) => tag.startsWith(language)) ?? language;
+  document.documentElement.lang = language;
+}
+
+export function changeLanguage(name) {
+  setPref("language", name);
+  location.reload();
+}
+
+export function has(key) {
+  return key in table || key in fallback;
+}
+
+// Fills {name} in the text. A table entry {"one": ..., "other": ...} is chosen by the parameter `count`.
+export function t(key, parameters = {}) {
+  let text = table[key] ?? fallback[key] ?? key;
+  if (typeof text === "object") text = text[new Intl.PluralRules(language).select(parameters.count)] ?? text.other;
+  return text.replace(/\{(\w+)\}/g, (whole, name) => {
+    const value = parameters[name];
+    if (value === undefined) return whole;
+    return typeof value === "number" ? value.toLocaleString(locale) : value;
+  });
+}

@@ -1,0 +1,241 @@
+// Uploads: a few at once, the rest in a queue. What stands in the way of a file is asked about once.
+
+import { ApiError, post, readReply, urlOf } from "./api.js";
+import { Card } from "./activity.js";
+import { browser, refresh } from "./browser.js";
+import { dialog, toastFailure } from "./dialogs.js";
+import { h, nameNode } from "./dom.js";
+import { describe } from "./errors.js";
+import { emit } from "./events.js";
+import { formatDuration, formatSize } from "./format.js";
+import { childOf, decode, encodeName, nameOf, parentOf, splitExtension } from "./path.js";
+import { labelOf } from "./pathbar.js";
+import { t } from "./strings.js";
+import { fromInput } from "./upload_files.js";
+
+const AT_ONCE = 3;
+const NAMES_PER_QUESTION = 100;
+const EXISTS = 414;
+
+const queue = [];
+let running = 0;
+let asking = Promise.resolve();
+
+export function chooseFiles(folders) {
+  const input = h("input", { type: "file", multiple: true, webkitdirectory: folders });
+  const target = browser.id;
+  input.addEventListener("change", () => startUpload(fromInput(input), target));
+  input.click();
+}
+
+export async function startUpload(found, target) {
+  if (found.length === 0) return;
+  const batch = new Batch(found, target);
+  try {
+    await batch.makeEmptyFolders(found.filter((one) => !one.file));
+    await batch.lookForConflicts();
+  } catch (failure) {
+    if (failure.code !== undefined) toastFailure(failure, target);
+  }
+  queue.push(...batch.jobs);
+  batch.paint();
+  pump();
+}
+
+function pump() {
+  while (running < AT_ONCE && queue.length > 0) {
+    const job = queue.shift();
+    if (job.state !== "waiting") continue;
+    ++running;
+    job.run().finally(() => {
+      --running;
+      job.batch.paint();
+      pump();
+    });
+  }
+}
+
+class Batch {
+  constructor(found, target) {
+    this.target = target;
+    this.policy = null; // "skip", "overwrite" or "both", once somebody said so for all
+    this.jobs = found.filter((one) => one.file).map((one) => new Job(this, one));
+    this.bytes = this.jobs.reduce((sum, job) => sum + job.file.size, 0);
+    this.begun = performance.now();
+    this.card = new Card({
+      iconName: "upload", onCancel: () => this.cancel(),
+      title: t("upload.title", { count: this.jobs.length, folder: labelOf(target) }),
+    });
+  }
+
+  async makeEmptyFolders(folders) {
+    for (const { parts } of folders) {
+      await post("operation", { action: "mkdir", parents: "true", path_raw: idFor(this.target, parts) })
+        .catch((failure) => { if (failure.code !== EXISTS) throw failure; });
+    }
+  }
+
+  // Files that would meet others are found before their bytes go anywhere.
+  async lookForConflicts() {
+    const folders = Map.groupBy(this.jobs, (job) => parentOf(job.id));
+    for (const [folder, jobs] of folders) {
+      for (let i = 0; i < jobs.length; i += NAMES_PER_QUESTION) {
+        const some = jobs.slice(i, i + NAMES_PER_QUESTION);
+        const pattern = some.map((job) => decode(job.name).replace(/[,\\*?[\]]/g, "?")).join(",");
+        const reply = await post("list", { action: "folder", path_raw: folder, pattern }).catch((failure) => {
+          if (failure.code === 408) return { items: [] }; // the folder is yet to be made
+          throw failure;
+        });
+        const there = new Set(reply.items.map((item) => item.name_raw ?? encodeName(item.name)));
+        for (const job of some) job.meets = there.has(job.name);
+      }
+    }
+  }
+
+  cancel() {
+    for (const job of this.jobs) job.cancel();
+    this.paint();
+  }
+
+  paint() {
+    if (this.card.finished) return;
+    const count = (...states) => this.jobs.filter((job) => states.includes(job.state)).length;
+    const failed = this.jobs.filter((job) => job.state === "failed");
+    const left = count("waiting", "running");
+    const loaded = this.jobs.reduce((sum, job) => sum + (job.state === "running" || job.state === "waiting" ? job.loaded : job.file.size), 0);
+    this.card.showErrors(failed.map((job) => ({ path: decode(job.id), text: describe(job.failure, decode(job.id)).title })));
+    if (left > 0) {
+      const seconds = ((performance.now() - this.begun) / 1000) * ((this.bytes - loaded) / Math.max(1, loaded));
+      const detail = [t("upload.progress", { done: this.jobs.length - left, count: this.jobs.length }),
+        t("size.of", { done: formatSize(loaded), total: formatSize(this.bytes) }), loaded > 0 && formatDuration(seconds)];
+      this.card.progress(this.bytes > 0 ? loaded / this.bytes : null, detail.filter(Boolean).join(" · "));
+      this.changed(2000);
+      return;
+    }
+    this.changed(0);
+    const done = count("done");
+    const detail = [t("upload.done", { count: done }), count("skipped") > 0 && t("upload.skipped", { count: count("skipped") }),
+      failed.length > 0 && t("upload.failed", { count: failed.length })];
+    const kind = failed.length > 0 ? "failed" : count("cancelled") > 0 ? "stopped" : "good";
+    this.card.finish(kind, count("cancelled") > 0 ? t("upload.cancelled", { count: done }) : detail.filter(Boolean).join(" · "));
+  }
+
+  // The list follows, though not at every file.
+  changed(wait) {
+    if (wait > 0 && this.timer) return;
+    clearTimeout(this.timer);
+    this.timer = setTimeout(() => {
+      this.timer = null;
+      emit("folders-changed", { ids: [this.target] });
+      if (browser.id === this.target) refresh();
+    }, wait);
+  }
+}
+
+function idFor(target, parts) {
+  return parts.reduce((id, part) => childOf(id, encodeName(part)), target);
+}
+
+class Job {
+  constructor(batch, { file, parts }) {
+    Object.assign(this, { batch, file, id: idFor(batch.target, parts), state: "waiting", loaded: 0, meets: false });
+    this.name = this.id.slice(this.id.lastIndexOf("/") + 1);
+  }
+
+  async run() {
+    this.state = "running";
+    try {
+      await this.place();
+    } catch (failure) {
+      if (this.state === "running") this.state = "failed";
+      this.failure = failure;
+    }
+  }
+
+  async place() {
+    if (!this.meets) {
+      try {
+        return await this.send("error");
+      } catch (failure) {
+        if (failure.code !== EXISTS) throw failure;
+      }
+    }
+    // One question at a time; the answer to one may be meant for all.
+    const answer = await (asking = asking.catch(() => {}).then(() => this.batch.policy ?? ask(this)));
+    if (this.state === "cancelled") return undefined;
+    if (answer === "both") return this.sendBeside();
+    if (answer === "overwrite") return this.send("overwrite");
+    this.state = answer === null ? "cancelled" : "skipped";
+    return undefined;
+  }
+
+  async sendBeside() {
+    const [stem, extension] = splitExtension(nameOf(this.id));
+    const folder = parentOf(this.id);
+    for (let n = 2; ; ++n) {
+      this.id = childOf(folder, encodeName(`${stem} (${n})${extension}`));
+      try {
+        return await this.send("error");
+      } catch (failure) {
+        if (failure.code !== EXISTS || n > 999) throw failure;
+      }
+    }
+  }
+
+  // What fetch() cannot: tell how far the body is.
+  send(overwrite) {
+    return new Promise((resolve, reject) => {
+      const request = new XMLHttpRequest();
+      this.request = request;
+      request.open("PUT", urlOf("upload", { path_raw: this.id, overwrite }));
+      request.setRequestHeader("Content-Type", "application/octet-stream");
+      request.upload.addEventListener("progress", (event) => {
+        this.loaded = event.loaded;
+        this.batch.paint();
+      });
+      request.addEventListener("load", () => {
+        try {
+          readReply(request.status, request.responseText);
+          this.state = "done";
+          resolve();
+        } catch (failure) {
+          reject(failure);
+        }
+      });
+      request.addEventListener("error", () => reject(new ApiError({ key: "page:upload_broken" })));
+      request.addEventListener("abort", () => resolve());
+      request.send(this.file);
+    });
+  }
+
+  cancel() {
+    if (this.state !== "waiting" && this.state !== "running") return;
+    this.state = "cancelled";
+    this.request?.abort();
+  }
+}
+
+function ask(job) {
+  const more = job.batch.jobs.filter((one) => one.state === "waiting").length > 0;
+  return dialog({ title: t("conflict.title"), fill: (close) => {
+    const all = h("input", { type: "checkbox", checked: more });
+    const answer = (value) => () => {
+      if (all.checked && more) job.batch.policy = value;
+      close(value);
+    };
+    return [
+      h("div.body", {}, h("p", {}, h("b", {}, nameNode(nameOf(job.id)))), h("p.soft", {}, t("conflict.text", { folder: labelOf(parentOf(job.id)) })),
+        more && h("label.check-line", {}, all, t("conflict.all"))),
+      h("footer", {}, h("button.button", { type: "button", onclick: answer("skip") }, t("conflict.skip")),
+        h("button.button.outlined", { type: "button", onclick: answer("overwrite") }, t("conflict.overwrite")),
+        h("button.button.primary", { type: "button", onclick: answer("both") }, t("conflict.both"))),
+    ];
+  } }).then((answer) => {
+    if (answer === null) job.batch.cancel();
+    return answer;
+  });
+}
+
+export function uploadsRunning() {
+  return running + queue.length > 0;
+}

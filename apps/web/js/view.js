@@ -1,0 +1,158 @@
+// The rows (or tiles) of a long list: only those in sight are in the document.
+
+import { h } from "./dom.js";
+import { makeRow, fillRow, makeHeader } from "./rows.js";
+
+// Browsers lose precision beyond some ten million pixels; longer lists scroll at a scale.
+const TALLEST = 12_000_000;
+const OVERSCAN = 6;
+const WAITING_ROWS = 12;
+const TILE = { width: 132, height: 144, gap: 6 };
+
+export class View {
+  constructor(root, { onScrolled }) {
+    this.root = root;
+    this.canvas = h("div.canvas", { role: "presentation" });
+    this.rows = new Map();
+    this.listing = null;
+    this.selection = null;
+    this.mode = "list";
+    this.onScrolled = onScrolled;
+    root.addEventListener("scroll", () => this.scrolled(), { passive: true });
+    new ResizeObserver(() => this.render()).observe(root);
+  }
+
+  show(listing, selection, mode, columns) {
+    this.listing = listing;
+    this.selection = selection;
+    this.mode = mode;
+    this.columns = columns;
+    this.rows.clear();
+    this.canvas.replaceChildren();
+    this.header = mode === "list" ? makeHeader(columns) : null;
+    this.root.className = `view ${mode} ${columns.map((column) => `has-${column.id}`).join(" ")}`;
+    this.root.setAttribute("role", mode === "list" ? "grid" : "listbox");
+    this.root.replaceChildren(...(this.header ? [this.header] : []), this.canvas);
+    this.root.scrollTop = 0;
+    this.render();
+  }
+
+  // How many there are per line, how high a line is, how many lines there are.
+  get shape() {
+    const style = getComputedStyle(this.root);
+    if (this.mode === "list") {
+      return { across: 1, height: parseFloat(style.getPropertyValue("--row-height")) || 36, width: 0 };
+    }
+    const room = this.root.clientWidth - parseFloat(style.paddingLeft) - parseFloat(style.paddingRight);
+    const across = Math.max(2, Math.floor((room + TILE.gap) / (TILE.width + TILE.gap)));
+    return { across, height: TILE.height + TILE.gap, width: room / across };
+  }
+
+  get count() {
+    if (this.listing.ready) return this.listing.total;
+    return this.listing.error ? 0 : WAITING_ROWS;
+  }
+
+  measure() {
+    const { across, height, width } = this.shape;
+    const lines = Math.ceil(this.count / across);
+    const headerHeight = this.header?.offsetHeight ?? 0;
+    const room = this.root.clientHeight - headerHeight;
+    const whole = lines * height;
+    const shown = Math.min(whole, TALLEST);
+    const scale = shown > room ? (whole - room) / (shown - room) : 1;
+    return { across, height, width, room, shown, scale, top: this.root.scrollTop * scale };
+  }
+
+  render() {
+    if (!this.listing) return;
+    const box = this.measure();
+    this.canvas.style.height = `${box.shown}px`;
+    const firstLine = Math.max(0, Math.floor(box.top / box.height) - OVERSCAN);
+    const lastLine = Math.ceil((box.top + box.room) / box.height) + OVERSCAN;
+    const first = firstLine * box.across;
+    const last = Math.min(this.count, (lastLine + 1) * box.across) - 1;
+    for (const [index, row] of this.rows) {
+      if (index >= first && index <= last) continue;
+      row.remove();
+      this.rows.delete(index);
+    }
+    for (let index = first; index <= last; ++index) this.place(index, box);
+    this.root.setAttribute("aria-rowcount", this.listing.ready ? this.listing.total + 1 : -1);
+    this.root.setAttribute("aria-busy", String(!this.listing.ready));
+    this.inSight = [Math.floor(box.top / box.height) * box.across, Math.ceil((box.top + box.room) / box.height) * box.across];
+    this.paintSelection();
+  }
+
+  place(index, box) {
+    let row = this.rows.get(index);
+    if (!row) {
+      row = makeRow(index, this.mode);
+      this.rows.set(index, row);
+      this.canvas.append(row);
+    }
+    const entry = this.listing.ready ? this.listing.item(index) : undefined;
+    if (row.entry !== entry || !row.filled) fillRow(row, index, entry, this.mode, this.columns);
+    if (row.total !== this.listing.total) {
+      row.total = this.listing.total;
+      if (this.mode === "grid") row.setAttribute("aria-setsize", row.total);
+    }
+    const y = Math.floor(index / box.across) * box.height - box.top + box.top / box.scale;
+    const x = (index % box.across) * box.width;
+    row.style.transform = `translate(${x}px, ${y}px)`;
+    if (box.width) row.style.width = `${box.width - TILE.gap}px`;
+  }
+
+  paintSelection() {
+    for (const [index, row] of this.rows) {
+      const chosen = this.selection.has(index);
+      const cursor = index === this.selection.cursor;
+      if (row.classList.contains("selected") !== chosen || !row.hasAttribute("aria-selected")) {
+        row.classList.toggle("selected", chosen);
+        row.setAttribute("aria-selected", String(chosen));
+      }
+      row.classList.toggle("cursor", cursor);
+      row.classList.toggle("above-selected", chosen && this.selection.has(index + 1));
+      row.classList.toggle("below-selected", chosen && this.selection.has(index - 1));
+    }
+    const active = this.rows.get(this.selection.cursor);
+    if (active) this.root.setAttribute("aria-activedescendant", active.id);
+    else this.root.removeAttribute("aria-activedescendant");
+  }
+
+  scrolled() {
+    if (this.frame) return;
+    this.frame = requestAnimationFrame(() => {
+      this.frame = null;
+      this.render();
+      this.onScrolled();
+    });
+  }
+
+  // Brings a row into sight.
+  reveal(index, where = "nearest") {
+    const box = this.measure();
+    const line = Math.floor(index / box.across);
+    const y = line * box.height;
+    let top = box.top;
+    if (where === "center") top = y - (box.room - box.height) / 2;
+    else if (y < top) top = y;
+    else if (y + box.height > top + box.room) top = y + box.height - box.room;
+    if (top !== box.top) this.root.scrollTop = top / box.scale;
+    this.render();
+  }
+
+  rowAt(index) {
+    return this.rows.get(index);
+  }
+
+  indexOf(node) {
+    const row = node.closest?.(".row");
+    return row && this.canvas.contains(row) ? row.index : -1;
+  }
+
+  linesPerPage() {
+    const { room, height } = this.measure();
+    return Math.max(1, Math.floor(room / height) - 1);
+  }
+}

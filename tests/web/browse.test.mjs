@@ -1,0 +1,173 @@
+// Looking around: shares, folders, long lists, the keyboard, hostile names, refusals.
+import assert from "node:assert/strict";
+import { mkdirSync, readdirSync, writeFileSync } from "node:fs";
+import { after, before, test } from "node:test";
+import { launch, openPage, row, rowsReady, screenshot } from "./browser.mjs";
+
+const LARGE = 100_000;
+let chrome;
+
+before(async () => {
+  chrome = await launch();
+  const folder = `${process.env.ORVEL_TEST_PROJECTS}/large`;
+  mkdirSync(folder);
+  for (let i = 0; i < LARGE; ++i) writeFileSync(`${folder}/entry ${String(i).padStart(6, "0")}.txt`, "");
+});
+after(() => chrome.close());
+
+async function withPage(user, options, run) {
+  const page = await openPage(chrome.browser, user, options);
+  try {
+    await rowsReady(page);
+    await run(page);
+    assert.deepEqual(page.complaints, []);
+  } finally {
+    await page.context().close();
+  }
+}
+
+const names = (page) => page.locator("#view .row:not(.header) .name bdi, #view .row:not(.header) bdi.name").allTextContents();
+const place = (page) => page.evaluate(() => location.hash.slice(1));
+
+test("shares, by user", () => withPage("alice", {}, async (page) => {
+  assert.equal(await page.locator(".card").count(), 10);
+  await screenshot(page, "home");
+  await withPage("bob", {}, async (other) => {
+    assert.equal(await other.locator(".card", { hasText: "projects" }).count(), 0);
+    assert.match(await other.locator(".card", { hasText: "photo" }).textContent(), /Read only/);
+  });
+  await page.click(".card >> text=music");
+  await page.waitForFunction(() => document.querySelectorAll("#view .row:not(.header)").length === 3);
+  await page.dblclick("#view >> text=Night Trains");
+  await page.waitForFunction(() => document.querySelectorAll("#view .row:not(.header)").length === 9);
+  assert.equal(await page.locator("[role=treeitem].current").getAttribute("aria-label"), "Night Trains");
+  await page.click("#pathbar >> text=music");
+  await page.waitForSelector("#view .row.selected >> text=Night Trains"); // where one came from
+  await page.goBack();
+  await page.waitForSelector("#view >> text=01 Track.flac");
+}));
+
+test("sorting keeps folders first, both ways", () => withPage("alice", { path: "/photo" }, async (page) => {
+  await screenshot(page, "list");
+  await page.click("[data-sort=size]");
+  await page.click("[data-sort=size]");
+  await page.waitForSelector("[aria-sort=descending]");
+  await rowsReady(page);
+  assert.match((await names(page))[0], /2024/);
+  await page.press("#view", "End");
+  await page.waitForSelector("#view .row.cursor .size >> text=/^0 B$/");
+  await page.click("[data-sort=name]");
+  await page.click(".view-switch button >> nth=1");
+  await rowsReady(page);
+  assert.equal(await page.getAttribute("#view", "role"), "listbox");
+  await screenshot(page, "grid");
+}));
+
+test("a folder of 100,000: first view, its end, everything chosen", () => withPage("alice", { path: "/home" }, async (page) => {
+  const requests = [];
+  page.on("request", (request) => { if (request.url().includes("/cgi-bin/list")) requests.push(new URL(request.url()).searchParams); });
+  await page.evaluate(() => { location.hash = "/projects/large"; });
+  await page.waitForSelector("#view >> text=entry 000000.txt");
+  assert.equal(await page.getAttribute("#view", "aria-rowcount"), String(LARGE + 1));
+  assert.ok(requests.length <= 2, `${requests.length} requests for the first view`);
+  await page.evaluate(async () => {
+    const view = document.getElementById("view");
+    for (let i = 1; i <= 60; ++i) {
+      view.scrollTop = (view.scrollHeight * 0.99 * i) / 60;
+      await new Promise(requestAnimationFrame);
+    }
+  });
+  await page.waitForSelector("#view >> text=/entry 0990\\d\\d.txt/");
+  assert.ok(requests.length <= 8, `${requests.length} requests after flying by ${LARGE} entries`);
+  assert.ok(await page.locator("#view .row").count() < 80);
+  await page.focus("#view");
+  await page.keyboard.type("entry 0734");
+  await page.waitForSelector("#view .row.selected >> text=entry 073400.txt");
+  await page.keyboard.press("Shift+End");
+  await page.waitForSelector(`#status >> text=${(LARGE - 73400).toLocaleString("en-GB")} selected`);
+  await page.keyboard.press("Control+a");
+  await page.waitForSelector("#status >> text=100,000 selected");
+}));
+
+test("names that programs stumble over", () => withPage("alice", { path: "/worldwide", viewport: { width: 1280, height: 2000 } }, async (page) => {
+  const shown = await page.locator("#view .row:not(.header) .cell.name").evaluateAll((cells) => cells.map((cell) => cell.title));
+  for (const name of ["<img src=x onerror=alert(1)>.txt", "&amp; &lt;tag&gt;.txt", "single ' double \" back `.txt", "line[␊]break.txt",
+    "looks like [RLO]txt.exe", "percent%20sign%2F.txt", "שלום עולם.txt", "#hash.txt", "question?.txt", "caf\uFFFD in Latin-1.txt"]) {
+    assert.ok(shown.includes(name), `${name} in ${shown.join("\n")}`);
+  }
+  assert.equal(await page.locator("#view img, #view b b").count(), 0);
+  await screenshot(page, "hostile-names");
+  for (const [folder, inside] of [[/dossier/, "dedans.txt"], [/папка/, "внутри.txt"]]) {
+    await page.dblclick(`#view .row:has-text("${folder.source}")`);
+    await page.waitForSelector(`#view >> text=${inside}`);
+    await page.reload(); // the address alone leads back
+    await page.waitForSelector(`#view >> text=${inside}`);
+    await page.keyboard.press("Backspace");
+    await page.waitForSelector("#view >> text=#hash.txt");
+  }
+  for (const name of ["Latin-1.txt", "question?.txt", "percent%20sign"]) {
+    const download = page.waitForEvent("download");
+    await row(page, name).click({ button: "right" });
+    await page.click(".menu >> text=Download");
+    assert.ok((await (await download).createReadStream()).readable);
+  }
+}));
+
+test("what one may not open says so, and why", () => withPage("bob", { path: "/projects" }, async (page) => {
+  await page.waitForSelector(".state >> text=no permission for “projects”");
+  await page.click(".state >> text=Why?");
+  await page.waitForSelector(".dialog >> text=You are on the no-access list of “projects”");
+  await screenshot(page, "why");
+  await page.keyboard.press("Escape");
+  await page.evaluate(() => { location.hash = "/photo/no such folder"; });
+  await page.waitForSelector(".state >> text=“no such folder” is not there");
+  await page.click(".state >> text=Go up");
+  await page.waitForSelector("#view >> text=2012");
+  assert.equal(await page.locator("#toolbar [data-command=newFolder]").count(), 0); // his right is to read
+}));
+
+test("dark, German, on a phone", async () => {
+  await withPage("alice", { path: "/photo/2014", colorScheme: "dark", locale: "de-DE" }, async (page) => {
+    assert.equal(await page.getAttribute("html", "lang"), "de");
+    assert.match(await page.locator("#status").textContent(), /4 Elemente/);
+    await screenshot(page, "dark");
+    await page.keyboard.press("?");
+    await page.waitForSelector(".dialog >> text=Tastenkürzel");
+    await screenshot(page, "help");
+  });
+  await withPage("alice", { path: "/photo", viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true }, async (page) => {
+    await screenshot(page, "phone");
+    await row(page, "2016").tap();
+    await page.waitForFunction(() => location.hash === "#/photo/2016");
+    assert.ok(await page.evaluate(() => document.documentElement.scrollWidth <= innerWidth));
+    await page.tap("#menu-button");
+    await page.tap("#tree >> text=music");
+    await page.waitForSelector("#view >> text=Night Trains");
+  });
+});
+
+test("a typed path, a filter, a place that is not there any more", () => withPage("alice", { path: "/" }, async (page) => {
+  await page.keyboard.press("Control+l");
+  await page.keyboard.type("/projects/house");
+  await page.keyboard.press("Enter");
+  await page.waitForSelector("#view >> text=plan.pdf");
+  assert.equal(await place(page), "/projects/house");
+  await page.keyboard.press("/");
+  await page.keyboard.type("nothing like it");
+  await page.waitForSelector(".state >> text=Nothing here matches");
+  await page.keyboard.press("Escape");
+  await page.waitForSelector("#view >> text=plan.pdf");
+}));
+
+test("every message key has its words, in both languages", async () => {
+  const source = (await import("node:fs")).readFileSync(new URL("../../src/core/error_state.cpp", import.meta.url), "utf8");
+  const keys = [...source.matchAll(/"(error:\w+)"/g)].map((match) => match[1]);
+  assert.ok(keys.length > 20);
+  const tables = readdirSync(new URL("../../apps/web/strings", import.meta.url));
+  for (const file of tables) {
+    const table = (await import(`../../apps/web/strings/${file}`, { with: { type: "json" } })).default;
+    for (const key of keys) assert.ok(table[key] && table[`${key}.hint`], `${key} in ${file}`);
+  }
+  const [de, en] = await Promise.all(tables.sort().map(async (file) => (await import(`../../apps/web/strings/${file}`, { with: { type: "json" } })).default));
+  assert.deepEqual(Object.keys(de).sort(), Object.keys(en).sort());
+});

@@ -1,0 +1,24 @@
+#!/usr/bin/env bash
+# The page in a real browser, against the web server and a demo appliance made for the test.
+#   run.sh SERVER BUILD [TEST...]
+# ORVEL_TEST_SCREENSHOTS: where pictures of the main states go, without it a temporary folder.
+set -uo pipefail
+here=$(cd "$(dirname "$0")" && pwd)
+. "$here/../apps/served.sh"
+shift 2
+for program in node npm; do # Node.js 20 or later
+    command -v "$program" >/dev/null || { echo "FAILED: $program is not installed"; exit 1; }
+done
+[ -x "${ORVEL_TEST_CHROMIUM:-/usr/bin/chromium}" ] || { echo "FAILED: chromium is not installed"; exit 1; }
+cmp -s "$here/package-lock.json" "$here/node_modules/.installed" ||
+    { (cd "$here" && npm ci --no-audit --no-fund --loglevel=error) && cp "$here/package-lock.json" "$here/node_modules/.installed"; } ||
+    { echo "FAILED: npm ci"; exit 1; }
+
+export ORVEL_TEST_URL=http://127.0.0.1:$port/ ORVEL_TEST_LARGE=${ORVEL_TEST_LARGE:-20000}
+for user in alice bob admin; do export "ORVEL_TEST_${user^^}=$(password "$user")"; done
+ORVEL_TEST_PHOTO=$(root_of photo) ORVEL_TEST_PROJECTS=$(root_of projects)
+export ORVEL_TEST_PHOTO ORVEL_TEST_PROJECTS
+tests=("$@")
+[ "${#tests[@]}" -gt 0 ] || tests=("$here"/*.test.mjs)
+node --test --test-concurrency=1 --test-reporter=spec "${tests[@]}" || failures=$((failures + 1))
+finish
