@@ -23,7 +23,7 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-constexpr auto kPatience = std::chrono::seconds(5);  // for one statement, locks included
+constexpr auto kPatience = std::chrono::seconds(3);  // for one statement, locks included
 constexpr auto kBusyPause = std::chrono::milliseconds(5);
 constexpr int kStepsBetweenLooks = 20000;
 constexpr size_t kMaxResult = size_t{64} << 20;
