@@ -126,11 +126,16 @@ std::optional<std::vector<std::string>> pathParams(const VEXO::WebCGI& cgi) {
     return paths;
 }
 
+std::optional<std::string> bytesParam(const VEXO::WebCGI& cgi, const std::string& name) {
+    const std::string raw = name + "_raw";
+    if (cgi.HasParam(raw)) return percentDecode(cgi.GetParam(raw, ""));
+    std::string text = cgi.GetParam(name, "");
+    if (text.find('\0') != std::string::npos) return std::nullopt;
+    return text;
+}
+
 std::optional<std::string> pathParam(const VEXO::WebCGI& cgi) {
-    if (cgi.HasParam("path_raw")) return percentDecode(cgi.GetParam("path_raw", ""));
-    std::string path = cgi.GetParam("path", "");
-    if (path.find('\0') != std::string::npos) return std::nullopt;
-    return path;
+    return bytesParam(cgi, "path");
 }
 
 }  // namespace orvel::cgi

@@ -48,8 +48,10 @@ bool isPosted();
 std::optional<_tag_dir_entry_type_> typeParam(const VEXO::WebCGI& cgi);
 std::optional<bool> ascendingParam(const VEXO::WebCGI& cgi);
 
-// The share-relative path of a request: "path_raw", percent-encoded once more so that its bytes can be anything, or
-// "path". Nothing for a path that cannot be one: a NUL byte or a broken "%".
+// A name or path in a request: parameter `name` + "_raw", percent-encoded once more so that its bytes can be anything,
+// or `name` itself. Nothing for what cannot be one: a NUL byte or a broken "%".
+std::optional<std::string> bytesParam(const VEXO::WebCGI& cgi, const std::string& name);
+// The share-relative path of a request, "path_raw" or "path".
 std::optional<std::string> pathParam(const VEXO::WebCGI& cgi);
 // Those of a request that takes several: every "path_raw", then every "path". Nothing when one cannot be a path.
 std::optional<std::vector<std::string>> pathParams(const VEXO::WebCGI& cgi);

@@ -43,6 +43,12 @@ void ShownSearch::added(const ChangedFile& file) {
     task_.results->updateFile(share, path, share, path, status);
 }
 
+void ShownSearch::removed(const ChangedFile& file) {
+    if (task_.results == nullptr) return;
+    const std::string path = rowPath(file);
+    if (!path.empty()) task_.results->delRecs(definedShareName(file.info.shareName), path);
+}
+
 void ShownSearch::moved(const ChangedFile& from, const ChangedFile& to) {
     _tag_VEXOSTAT_ status;
     if (task_.results == nullptr) return;

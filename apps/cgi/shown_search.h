@@ -26,6 +26,8 @@ class ShownSearch {
 
     // A file or folder came into being, or a file got a new content.
     void added(const ChangedFile& file);
+    // It is gone, with everything below it.
+    void removed(const ChangedFile& file);
     // What was `from` is `to` now, with everything below it.
     void moved(const ChangedFile& from, const ChangedFile& to);
 

@@ -2,7 +2,6 @@
 
 #include <archive.h>
 #include <archive_entry.h>
-#include <dirent.h>
 #include <fcntl.h>
 
 #include <algorithm>
@@ -12,8 +11,8 @@
 #include <ctime>
 #include <memory>
 
+#include "folder_names.h"
 #include "text.h"
-#include "vexo/filesystem.h"
 
 namespace orvel::cgi {
 namespace {
@@ -21,27 +20,9 @@ namespace {
 constexpr size_t kPiece = size_t{256} * 1024;
 constexpr int kDeepest = 256;  // descriptors stay open on the way down
 
-struct CloseDirectory {
-    void operator()(DIR* directory) const { closedir(directory); }
-};
 struct FreeEntry {
     void operator()(archive_entry* entry) const { archive_entry_free(entry); }
 };
-
-// The names of a folder in byte order; false with errno.
-bool namesIn(const Descriptor& folder, std::vector<std::string>& names) {
-    const int fd = openat(folder.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    const std::unique_ptr<DIR, CloseDirectory> directory(fd < 0 ? nullptr : fdopendir(fd));
-    if (directory == nullptr) return false;
-    for (;;) {
-        errno = 0;
-        const dirent* entry = readdir(directory.get());
-        if (entry == nullptr) break;
-        if (VEXOEAIsHiddenFile(entry->d_name) == 0) names.emplace_back(entry->d_name);
-    }
-    std::sort(names.begin(), names.end());
-    return errno == 0;
-}
 
 }  // namespace
 
@@ -50,7 +31,7 @@ std::string memberName(const std::string& component) {
     return isUtf8(component) ? component : percentEncode(component);
 }
 
-ZipStream::ZipStream(int fd) : archive_(archive_write_new()) {
+ZipStream::ZipStream(int fd, ZipObserver* observer) : archive_(archive_write_new()), observer_(observer) {
     setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted from
     if (archive_ == nullptr || archive_write_set_format_zip(archive_) != ARCHIVE_OK ||
         archive_write_set_options(archive_, "zip:hdrcharset=UTF-8") < ARCHIVE_WARN ||
@@ -66,8 +47,18 @@ ZipStream::~ZipStream() {
 }
 
 bool ZipStream::broken() {
+    error_ = archive_errno(archive_);
+    return stopped();
+}
+
+bool ZipStream::stopped() {
     broken_ = true;
     return false;
+}
+
+void ZipStream::miss(const std::string& name, int error, const char* reason) {
+    if (observer_ != nullptr) return observer_->leftOut(name, error);
+    leaveOut(name, reason != nullptr ? reason : strerror(error));
 }
 
 void ZipStream::leaveOut(const std::string& name, const std::string& reason) {
@@ -86,7 +77,7 @@ bool ZipStream::begin(const std::string& name, const struct stat& status, long l
 
 bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
     struct stat status {};
-    if (fstat(file.get(), &status) != 0) return leaveOut(name, strerror(errno)), true;
+    if (fstat(file.get(), &status) != 0) return miss(name, errno), true;
     if (!begin(name, status, status.st_size)) return false;
     std::string piece(kPiece, '\0');
     long long left = status.st_size;  // a file that grows meanwhile is cut there
@@ -94,12 +85,13 @@ bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
         const ssize_t got = read(file.get(), piece.data(), std::min<size_t>(kPiece, static_cast<size_t>(left)));
         if (got < 0 && errno == EINTR) continue;
         if (got <= 0) {
-            leaveOut(name, got < 0 ? strerror(errno) : "became shorter while it was read");
+            miss(name, got < 0 ? errno : EIO, got < 0 ? nullptr : "became shorter while it was read");
             break;
         }
         if (archive_write_data(archive_, piece.data(), static_cast<size_t>(got)) < 0) return broken();
         left -= got;
         bytes_ += got;
+        if (observer_ != nullptr && !observer_->wrote(got)) return stopped();
     }
     return archive_write_finish_entry(archive_) >= ARCHIVE_WARN || broken();
 }
@@ -107,14 +99,14 @@ bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
 bool ZipStream::addChild(const Descriptor& folder, const std::string& child, const std::string& name) {
     struct stat status {};
     if (fstatat(folder.get(), child.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
-        leaveOut(name, strerror(errno));
+        miss(name, errno);
         return true;
     }
     if (!S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode)) return true;
     const Descriptor opened(
         openat(folder.get(), child.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
     if (opened) return add(opened, name);
-    leaveOut(name, strerror(errno));
+    miss(name, errno);
     return true;
 }
 
@@ -122,8 +114,8 @@ bool ZipStream::addFolder(const Descriptor& folder, const std::string& name) {
     struct stat status {};
     std::vector<std::string> names;
     if (fstat(folder.get(), &status) != 0 || !begin(name + "/", status, -1)) return !broken_;
-    if (depth_ == kDeepest) return leaveOut(name, "too deep"), true;
-    if (!namesIn(folder, names)) leaveOut(name, strerror(errno));
+    if (depth_ == kDeepest) return miss(name, ENAMETOOLONG, "too deep"), true;
+    if (!namesIn(folder.get(), Hidden::kLeaveOut, names)) miss(name, errno);
     ++depth_;
     const bool going = std::all_of(names.begin(), names.end(), [&](const std::string& child) {
         return addChild(folder, child, name + "/" + memberName(child));
@@ -134,11 +126,12 @@ bool ZipStream::addFolder(const Descriptor& folder, const std::string& name) {
 
 bool ZipStream::add(const Descriptor& opened, const std::string& name) {
     if (broken_) return false;
+    if (observer_ != nullptr && !observer_->begins(name)) return stopped();
     struct stat status {};
-    if (fstat(opened.get(), &status) != 0) return leaveOut(name, strerror(errno)), true;
+    if (fstat(opened.get(), &status) != 0) return miss(name, errno), true;
     if (S_ISDIR(status.st_mode)) return addFolder(opened, name);
     if (S_ISREG(status.st_mode)) return addFile(opened, name);
-    return leaveOut(name, "neither a file nor a folder"), true;
+    return miss(name, EINVAL, "neither a file nor a folder"), true;
 }
 
 bool ZipStream::finish() {
@@ -152,7 +145,7 @@ bool ZipStream::finish() {
             broken_ = archive_write_data(archive_, text.data(), text.size()) < 0;
         }
     }
-    return !broken_ && archive_write_close(archive_) == ARCHIVE_OK;
+    return !broken_ && (archive_write_close(archive_) == ARCHIVE_OK || broken());
 }
 
 }  // namespace orvel::cgi

@@ -16,11 +16,23 @@ namespace orvel::cgi {
 // The name of a file or folder within an archive, which knows UTF-8 alone: itself, or percent-encoded.
 std::string memberName(const std::string& component);
 
-// A stream to a descriptor. What cannot be read is left out and told in a last member, "_not_included.txt". Members are
-// deflated, times and permissions kept; symbolic links and anything else but files and folders stay out.
+// Looks on while a zip is made.
+class ZipObserver {
+ public:
+    virtual ~ZipObserver() = default;
+    // A member begins, or `count` more of its bytes were written. False ends the making.
+    virtual bool begins(const std::string& name) = 0;
+    virtual bool wrote(long long count) = 0;
+    // A member could not be read, or not to its end, for an errno value.
+    virtual void leftOut(const std::string& name, int error) = 0;
+};
+
+// A stream to a descriptor. What cannot be read is left out and told to the observer, or without one in a last member,
+// "_not_included.txt". Members are deflated, times and permissions kept; symbolic links and anything else but files and
+// folders stay out.
 class ZipStream {
  public:
-    explicit ZipStream(int fd);
+    explicit ZipStream(int fd, ZipObserver* observer = nullptr);
     ~ZipStream();
     ZipStream(const ZipStream&) = delete;
     ZipStream& operator=(const ZipStream&) = delete;
@@ -33,6 +45,7 @@ class ZipStream {
     // Writes the end. False when not everything arrived.
     bool finish();
     [[nodiscard]] long long bytes() const { return bytes_; }  // of the members, as they were
+    [[nodiscard]] int error() const { return error_; }        // errno of what broke it, 0 when it was stopped
 
  private:
     bool addFile(const Descriptor& file, const std::string& name);
@@ -40,8 +53,12 @@ class ZipStream {
     bool addChild(const Descriptor& folder, const std::string& child, const std::string& name);
     bool begin(const std::string& name, const struct stat& status, long long size);
     bool broken();
+    bool stopped();
+    void miss(const std::string& name, int error, const char* reason = nullptr);
 
     struct archive* archive_;
+    ZipObserver* observer_;
+    int error_ = 0;
     std::vector<std::string> leftOut_;
     long long bytes_ = 0;
     bool broken_ = false;

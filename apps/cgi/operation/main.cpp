@@ -1,17 +1,18 @@
 // CGI program "operation": what a user does to files.
 //
 // Parameters, from the query or a form:
-//   action           "mkdir", "rename" or "subfolders"; more of each at its function
-//   path, path_raw   what it is done to
-//   taskid           a search whose results shall show what was done
+//   action           a name of kActions; more of each at its function
+//   path, path_raw   what it is done to; may be given more than once where the action goes on in the background
+//   taskid           of an action on files: a search whose results shall show what was done; else the task meant
 // Actions that change something must be posted.
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <string_view>
 
+#include "operation/judge.h"
 #include "operation/operation.h"
 #include "orvel/error_state.h"
-#include "orvel/privilege.h"
 #include "orvel/share_path.h"
 #include "reply.h"
 #include "search_task.h"
@@ -19,17 +20,29 @@
 namespace orvel::cgi {
 namespace {
 
-enum class Need { kList, kCreate, kModify };
+enum class Takes { kPath, kPaths, kTask };
 
 struct Action {
     std::string_view name;
-    Need need;
+    Takes takes;
+    bool changes;  // must be posted
+    Need need;     // asked here for the action of one path; the others ask for each
     int (*run)(Operation& operation);
 };
 
-constexpr Action kActions[] = {{"mkdir", Need::kCreate, makeFolderOperation},
-                               {"rename", Need::kModify, renameOperation},
-                               {"subfolders", Need::kList, subfoldersOperation}};
+constexpr Action kActions[] = {{"mkdir", Takes::kPath, true, Need::kCreate, makeFolderOperation},
+                               {"rename", Takes::kPath, true, Need::kModify, renameOperation},
+                               {"subfolders", Takes::kPath, false, Need::kList, subfoldersOperation},
+                               {"copy", Takes::kPaths, true, Need::kRead, copyOperation},
+                               {"move", Takes::kPaths, true, Need::kModify, moveOperation},
+                               {"delete", Takes::kPaths, true, Need::kModify, deleteOperation},
+                               {"restore", Takes::kPaths, true, Need::kModify, restoreOperation},
+                               {"empty", Takes::kPaths, true, Need::kModify, emptyOperation},
+                               {"compress", Takes::kPaths, true, Need::kRead, compressOperation},
+                               {"extract", Takes::kPaths, true, Need::kRead, extractOperation},
+                               {"status", Takes::kTask, false, Need::kList, statusOperation},
+                               {"cancel", Takes::kTask, true, Need::kList, cancelOperation},
+                               {"clear", Takes::kTask, true, Need::kList, clearOperation}};
 
 const Action* actionOf(const std::string& name) {
     for (const Action& action : kActions) {
@@ -38,27 +51,30 @@ const Action* actionOf(const std::string& name) {
     return nullptr;
 }
 
-// The share's rule for the path; below a home folder the file system alone decides.
-int judge(const Operation& operation, Need need) {
-    const char* user = operation.user.name.c_str();
-    const char* sid = operation.user.sid.c_str();
-    const char* path = operation.info.path.c_str();
-    OrvLibSetErr(ORV_ERR_NONE);
-    if (need == Need::kList) return CheckShareListPrivilege(user, sid, path) ? ORV_ERR_NONE : lastCode(ORV_ERR_DENIED);
-    if (IsDirUserHome(path, nullptr)) return ORV_ERR_NONE;
-    int privilege = ORV_PRIVILEGE_UNKNOWN, mask = 0;
-    if (OrvLibGetPrivilege(path, user, sid, &privilege, &mask) != 0) return lastCode();
-    const bool fixed = need == Need::kModify && (mask & ORV_MASK_NO_MODIFYING) != 0;
-    return privilege == ORV_PRIVILEGE_READ_WRITE && !fixed ? ORV_ERR_NONE : ORV_ERR_DENIED;
+bool readPaths(const VEXO::WebCGI& web, Takes takes, std::vector<std::string>& paths) {
+    if (takes == Takes::kTask) return true;
+    const auto found = takes == Takes::kPaths ? pathParams(web) : std::nullopt;
+    const auto one = takes == Takes::kPath ? pathParam(web) : std::nullopt;
+    if (found) paths = *found;
+    if (one) paths = {*one};
+    const std::string search = web.GetParam("taskid", "");
+    return !paths.empty() && (search.empty() || isTaskId(search));
+}
+
+bool isInHome(const Operation& operation) {
+    const auto isHome = [](const std::string& path) { return IsDirUserHome(path, nullptr); };
+    return std::any_of(operation.paths.begin(), operation.paths.end(), isHome) ||
+           isHome(bytesParam(operation.web, "target").value_or(""));
 }
 
 int perform(Operation& operation, const Action& action) {
     const User& user = operation.user;
-    int code = actAs(user.sid.c_str(), user.name, IsDirUserHome(operation.path, nullptr));
-    if (code != ORV_ERR_NONE) return code;
+    int code = actAs(user.sid.c_str(), user.name, isInHome(operation));
+    if (code != ORV_ERR_NONE || action.takes != Takes::kPath)
+        return code == ORV_ERR_NONE ? action.run(operation) : code;
     OrvLibSetErr(ORV_ERR_NONE);
-    if (!PathInfoFactory::create(user.name.c_str(), operation.path, operation.info)) return lastCode();
-    code = judge(operation, action.need);
+    if (!PathInfoFactory::create(user.name.c_str(), operation.paths.front(), operation.info)) return lastCode();
+    code = judge(user, operation.info.path, action.need);
     return code == ORV_ERR_NONE ? action.run(operation) : code;
 }
 
@@ -69,16 +85,14 @@ void serve(Output& out) {
 
     const VEXO::WebCGI web;
     if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
-    const auto path = pathParam(web);
     const Action* action = actionOf(web.GetParam("action", ""));
-    const std::string search = web.GetParam("taskid", "");
-    if (!path || action == nullptr || (!search.empty() && !isTaskId(search)) ||
-        (action->need != Need::kList && !isPosted())) {
+    Operation operation = {.user = user, .web = web, .paths = {}, .info = {}, .culprit = "", .data = {}};
+    if (action == nullptr || (action->changes && !isPosted()) || !readPaths(web, action->takes, operation.paths)) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
-    Operation operation = {.user = user, .web = web, .path = *path, .info = {}, .data = {}};
+    if (!operation.paths.empty()) operation.culprit = operation.paths.front();
     const int code = perform(operation, *action);
-    reply(out, Status::kOk, user.cookie, code, *path, operation.data);
+    reply(out, Status::kOk, user.cookie, code, operation.culprit, operation.data);
 }
 
 }  // namespace

@@ -5,6 +5,7 @@
 #include <json/value.h>
 
 #include <string>
+#include <vector>
 
 #include "orvel/file_info.h"
 #include "request.h"
@@ -15,8 +16,9 @@ namespace orvel::cgi {
 struct Operation {
     const User& user;
     const VEXO::WebCGI& web;
-    std::string path;  // share-relative
-    PathInfo info;     // what it resolved to
+    std::vector<std::string> paths;  // share-relative
+    PathInfo info;                   // what the first one resolved to, for an action that takes one
+    std::string culprit;             // path to name when the action is refused
     Json::Value data;
 };
 
@@ -26,6 +28,30 @@ int makeFolderOperation(Operation& operation);
 int renameOperation(Operation& operation);
 // data: {"items":[{"name","path","mtime","mount_type"}]}, the sub-folders by name, "mount_type" only for mount points.
 int subfoldersOperation(Operation& operation);
+
+// These go on in the background; data: {"taskid"}. They take several paths, and what goes wrong with one of them shows
+// in the task (see Progress) while the others are worked on.
+
+// "target" or "target_raw": the folder to copy or move to; "conflict": see conflict.h.
+int copyOperation(Operation& operation);
+int moveOperation(Operation& operation);
+// To the share's recycle bin, where it has one; "permanent" = "true", and what lies in the bin: for good.
+int deleteOperation(Operation& operation);
+// Puts what lies in a recycle bin back where it was; "conflict" as above.
+int restoreOperation(Operation& operation);
+// Empties the recycle bin of the share that the path lies in.
+int emptyOperation(Operation& operation);
+// "target" or "target_raw": the zip to make; "conflict" as above.
+int compressOperation(Operation& operation);
+// Unpacks the archives at the paths into the folder "target" or "target_raw"; "conflict" as above.
+int extractOperation(Operation& operation);
+
+// "taskid" (or without it, all of the user's): data: the task, or {"tasks":[...]}; see taskReply.
+int statusOperation(Operation& operation);
+// Asks the task "taskid" to end; data: the task. One that has ended is no failure.
+int cancelOperation(Operation& operation);
+// Removes the record of "taskid" (420 while it runs), or without it those of all that ended. data: {"cleared"}.
+int clearOperation(Operation& operation);
 
 }  // namespace orvel::cgi
 

@@ -1,0 +1,165 @@
+#include <fcntl.h>
+
+#include <cerrno>
+#include <set>
+
+#include "download/archive.h"
+#include "operation/item.h"
+#include "operation/new_file.h"
+#include "operation/operation.h"
+#include "operation/task_start.h"
+#include "operation/transfer_job.h"
+#include "orvel/activity_log.h"
+#include "orvel/error_state.h"
+#include "orvel/name_check.h"
+
+namespace orvel::cgi {
+namespace {
+
+struct Job {
+    const Operation& operation;
+    Conflict conflict;
+    PathInfo info;  // of the archive
+    Target place;
+};
+
+// Tells the members of the zip as the items of the operation.
+class Watch : public ZipObserver {
+ public:
+    explicit Watch(Progress& progress) : progress_(progress) {}
+    // What follows lies in this share-relative folder.
+    void enter(const std::string& folder) { folder_ = folder; }
+    bool begins(const std::string& name) override {
+        ended();
+        open_ = true;
+        progress_.begin(folder_ + "/" + name);
+        return !progress_.stopped();
+    }
+    bool wrote(long long count) override {
+        progress_.bytes(count);
+        return !progress_.stopped();
+    }
+    void leftOut(const std::string& name, int error) override {
+        open_ = false;
+        progress_.failed(folder_ + "/" + name, OrvParseErrnoToError(error, nullptr, nullptr));
+    }
+    void ended() {
+        if (open_) progress_.done();
+        open_ = false;
+    }
+
+ private:
+    Progress& progress_;
+    std::string folder_;
+    bool open_ = false;
+};
+
+// A name that no other source has in the archive.
+std::string freeName(const Item& item, std::set<std::string>& taken) {
+    const std::string name = memberName(item.place.name);
+    std::string free = name;
+    for (int number = 2; !taken.insert(free).second; ++number) {
+        free = numberedName(name, number, S_ISDIR(item.status.st_mode));
+    }
+    return free;
+}
+
+void addAll(const Job& job, ZipStream& zip, Watch& watch, Progress& progress) {
+    std::set<std::string> taken;
+    for (const std::string& path : job.operation.paths) {
+        Item item;
+        int code = openItem(job.operation.user, path, {Need::kRead}, item);
+        if (code == ORV_ERR_NONE && !S_ISREG(item.status.st_mode) && !S_ISDIR(item.status.st_mode)) {
+            code = ORV_ERR_DENIED;
+        }
+        constexpr int flags = O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC;
+        const Descriptor opened(code != ORV_ERR_NONE ? -1
+                                                     : openat(item.place.folder.get(), item.place.name.c_str(), flags));
+        if (code == ORV_ERR_NONE && !opened) code = OrvParseErrnoToError(errno, nullptr, nullptr);
+        if (code != ORV_ERR_NONE) {
+            progress.failed(path, code);
+            continue;
+        }
+        watch.enter(item.info.path.substr(0, item.info.path.rfind('/')));
+        if (!zip.add(opened, freeName(item, taken))) return;
+    }
+}
+
+// Gives the archive its name. 0 with the name, or a library code.
+int publish(const Job& job, NewFile& file, std::string& name) {
+    const Owner owner = ownerFor(job.operation.user.name);
+    [[maybe_unused]] int ignored = fchown(file.get(), owner.uid, owner.gid);  // FAT keeps neither
+    ignored = fchmod(file.get(), 0644);
+    const std::string wanted = job.place.name;
+    name = wanted;
+    bool published = file.publish(name, job.conflict == Conflict::kOverwrite);
+    for (int number = 2; !published && errno == EEXIST && job.conflict == Conflict::kKeepBoth; ++number) {
+        name = numberedName(wanted, number, false);
+        published = file.publish(name, false);
+    }
+    return published ? ORV_ERR_NONE : OrvParseErrnoToError(errno, nullptr, nullptr);
+}
+
+int codeOf(const ZipStream& zip) {
+    const int code = zip.error() == 0 ? ORV_ERR_COMPRESS : OrvParseErrnoToError(zip.error(), nullptr, nullptr);
+    return code == ORV_ERR_GENERAL ? ORV_ERR_COMPRESS : code;
+}
+
+void run(const Job& job, Progress& progress) {
+    const Operation& operation = job.operation;
+    for (const std::string& path : operation.paths) {
+        Item item;
+        if (openItem(operation.user, path, {Need::kRead}, item) == ORV_ERR_NONE) {
+            measure(item, progress);
+        } else {
+            progress.expect(1, 0);
+        }
+    }
+    NewFile file(job.place.folder.get());
+    if (!file.create()) return progress.broken(job.info.path, OrvParseErrnoToError(errno, nullptr, nullptr));
+    Watch watch(progress);
+    ZipStream zip(file.get(), &watch);
+    addAll(job, zip, watch, progress);
+    if (progress.stopped()) return;
+    watch.ended();
+    if (!zip.finish()) return progress.broken(job.info.path, codeOf(zip));
+    std::string name;
+    const int code = publish(job, file, name);
+    if (code != ORV_ERR_NONE) return progress.broken(job.info.path, code);
+    // The log knows no kind of its own for it.
+    OrvLibDoLog(operation.user.name, job.info.path, zip.bytes(), ORVEL_ACTION_COPY, false);
+    ShownSearch(operation.user.name, operation.web.GetParam("taskid", "")).added({job.info, job.place.folder, name});
+}
+
+int openArchive(Operation& operation, const std::string& path, Job& job) {
+    const User& user = operation.user;
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(user.name.c_str(), path, job.info)) return lastCode();
+    const Conflict wanted = job.conflict;
+    int code = judgeTarget(user, job.info, job.conflict);
+    if (code != ORV_ERR_NONE) return code;
+    code = openTarget(job.info, linkPolicyOf(job.info.shareName), user.name, Missing::kRefuse, job.place);
+    if (code != ORV_ERR_NONE) return code;
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (OrvCheckFileName(realPathOf(job.place.folder).c_str(), job.place.name.c_str()) != 0) return lastCode();
+    struct stat there {};
+    const bool taken = fstatat(job.place.folder.get(), job.place.name.c_str(), &there, AT_SYMLINK_NOFOLLOW) == 0 &&
+                       (job.conflict == Conflict::kError || job.conflict == Conflict::kSkip || !S_ISREG(there.st_mode));
+    if (!taken || wanted == Conflict::kKeepBoth) return ORV_ERR_NONE;
+    return ORV_ERR_EXISTS;
+}
+
+}  // namespace
+
+int compressOperation(Operation& operation) {
+    const auto target = bytesParam(operation.web, "target");
+    const auto conflict = conflictOf(operation.web.GetParam("conflict", "error"));
+    if (!target || !conflict) return ORV_ERR_PARAMETER;
+    operation.culprit = *target;
+    Job job = {.operation = operation, .conflict = *conflict, .info = {}, .place = Target()};
+    const int code = openArchive(operation, *target, job);
+    if (code != ORV_ERR_NONE) return code;
+    return startTask(operation, "compress", [&job](Progress& progress) { run(job, progress); });
+}
+
+}  // namespace orvel::cgi

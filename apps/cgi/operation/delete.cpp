@@ -1,0 +1,73 @@
+#include "operation/operation.h"
+#include "operation/recycle.h"
+#include "operation/task_start.h"
+#include "operation/transfer.h"
+#include "operation/tree_remove.h"
+#include "orvel/activity_log.h"
+#include "orvel/error_state.h"
+
+namespace orvel::cgi {
+namespace {
+
+// The bin that takes the item; nothing when it is to be removed for good.
+std::optional<RecycleBin> binFor(const Item& item, bool permanent) {
+    auto bin = permanent ? std::nullopt : RecycleBin::of(item.info);
+    if (bin && (bin->is(item) || bin->holds(item))) bin.reset();
+    return bin;
+}
+
+void expectAll(const Operation& operation, bool permanent, Progress& progress) {
+    for (const std::string& path : operation.paths) {
+        Item item;
+        const bool found = !progress.stopped() && openItem(operation.user, path, {Need::kModify}, item) == 0;
+        if (found && !binFor(item, permanent)) {
+            measure(item, progress);
+        } else {
+            progress.expect(1, 0);
+        }
+    }
+}
+
+bool recycle(const RecycleBin& bin, const Item& item, const Owner& owner, Progress& progress) {
+    Descriptor folder;
+    Entry place{};
+    const int code = bin.placeFor(item, owner, folder, place);
+    if (code != ORV_ERR_NONE) {
+        progress.failed(item.info.path, code);
+        return false;
+    }
+    Transfer transfer(
+        progress,
+        {.conflict = Conflict::kKeepBoth, .move = true, .owner = owner, .onFat = false, .nextName = nextBinName});
+    return transfer.run(item, place);
+}
+
+void run(const Operation& operation, bool permanent, Progress& progress) {
+    const std::string& user = operation.user.name;
+    const Owner owner = ownerFor(user);
+    ShownSearch search(user, operation.web.GetParam("taskid", ""));
+    expectAll(operation, permanent, progress);
+    for (const std::string& path : operation.paths) {
+        if (progress.stopped()) return;
+        Item item;
+        const int code = openItem(operation.user, path, {Need::kModify}, item);
+        if (code != ORV_ERR_NONE) {
+            progress.failed(path, code);
+            continue;
+        }
+        const auto bin = binFor(item, permanent);
+        const bool gone = bin ? recycle(*bin, item, owner, progress) : removeTree(item.entry(), progress);
+        if (!gone) continue;
+        OrvLibDoLog(user, item.info.path, 0, ORVEL_ACTION_DELETE, false);
+        search.removed(item.changed());
+    }
+}
+
+}  // namespace
+
+int deleteOperation(Operation& operation) {
+    const bool permanent = operation.web.GetParam("permanent", "") == "true";
+    return startTask(operation, "delete", [&](Progress& progress) { run(operation, permanent, progress); });
+}
+
+}  // namespace orvel::cgi

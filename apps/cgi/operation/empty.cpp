@@ -1,0 +1,66 @@
+#include <fcntl.h>
+
+#include <cerrno>
+
+#include "folder_names.h"
+#include "operation/operation.h"
+#include "operation/recycle.h"
+#include "operation/task_start.h"
+#include "operation/tree_remove.h"
+#include "orvel/activity_log.h"
+#include "orvel/error_state.h"
+
+namespace orvel::cgi {
+namespace {
+
+// What stands in the bin, as the user sees it.
+std::vector<Item> itemsIn(const RecycleBin& bin, const PathInfo& info, Progress& progress) {
+    std::vector<std::string> names;
+    if (!namesIn(bin.folder().get(), Hidden::kLeaveOut, names)) {
+        progress.broken(bin.sharePath(), OrvParseErrnoToError(errno, nullptr, nullptr));
+    }
+    std::vector<Item> items(names.size());
+    for (size_t i = 0; i < names.size(); ++i) {
+        items[i].info = info;
+        items[i].info.path = bin.sharePath() + "/" + names[i];
+        items[i].info.realPath = info.shareRoot + "/#recycle/" + names[i];
+        items[i].place.name = names[i];
+    }
+    return items;
+}
+
+// The names stay, one folder is open at a time.
+bool look(const RecycleBin& bin, Item& item) {
+    item.place.folder = Descriptor(openat(bin.folder().get(), ".", O_PATH | O_DIRECTORY | O_CLOEXEC));
+    return fstatat(bin.folder().get(), item.place.name.c_str(), &item.status, AT_SYMLINK_NOFOLLOW) == 0;
+}
+
+void run(const Operation& operation, const RecycleBin& bin, const PathInfo& info, Progress& progress) {
+    ShownSearch search(operation.user.name, operation.web.GetParam("taskid", ""));
+    std::vector<Item> items = itemsIn(bin, info, progress);
+    for (Item& item : items) {
+        if (!progress.stopped() && look(bin, item)) measure(item, progress);
+        item.place.folder = Descriptor();
+    }
+    for (const Item& item : items) {
+        if (progress.stopped()) return;
+        if (!removeTree({bin.folder().get(), item.place.name, item.info.path}, progress)) continue;
+        OrvLibDoLog(operation.user.name, item.info.path, 0, ORVEL_ACTION_DELETE, false);
+        search.removed({info, bin.folder(), item.place.name});
+    }
+}
+
+}  // namespace
+
+int emptyOperation(Operation& operation) {
+    PathInfo info;
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(operation.user.name.c_str(), operation.paths.front(), info)) return lastCode();
+    const int code = judge(operation.user, info.path, Need::kModify);
+    if (code != ORV_ERR_NONE) return code;
+    const auto bin = RecycleBin::of(info);
+    if (!bin) return ORV_ERR_MISSING;
+    return startTask(operation, "empty", [&](Progress& progress) { run(operation, *bin, info, progress); });
+}
+
+}  // namespace orvel::cgi

@@ -1,0 +1,73 @@
+#include <fcntl.h>
+
+#include <cerrno>
+
+#include "operation/operation.h"
+#include "operation/task_start.h"
+#include "operation/transfer_job.h"
+#include "operation/unpack.h"
+#include "orvel/activity_log.h"
+#include "orvel/error_state.h"
+
+namespace orvel::cgi {
+namespace {
+
+struct Job {
+    const Operation& operation;
+    Conflict conflict;
+    PathInfo info;  // the target folder
+    Descriptor folder;
+};
+
+int openArchive(const Job& job, const std::string& path, Item& item, Descriptor& file) {
+    const int code = openItem(job.operation.user, path, {Need::kRead}, item);
+    if (code != ORV_ERR_NONE) return code;
+    if (!S_ISREG(item.status.st_mode)) return ORV_ERR_ARCHIVE;
+    file = Descriptor(openat(item.place.folder.get(), item.place.name.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
+    return file ? ORV_ERR_NONE : OrvParseErrnoToError(errno, nullptr, nullptr);
+}
+
+void extractOne(const Job& job, const std::string& path, Progress& progress) {
+    const User& user = job.operation.user;
+    Item item;
+    Descriptor file;
+    int code = openArchive(job, path, item, file);
+    if (code != ORV_ERR_NONE) return progress.failed(path, code);
+    Unpacker unpacker(
+        progress,
+        {.folder = job.folder, .path = job.info.path, .conflict = job.conflict, .owner = ownerFor(user.name)});
+    code = unpacker.run(file.get(), UnpackLimits::of(item.status.st_size));
+    if (code != ORV_ERR_NONE) progress.failed(path, code);
+    if (unpacker.names().empty()) return;
+    // The log knows no kind of its own for it.
+    OrvLibDoLog(user.name, item.info.path, unpacker.bytes(), ORVEL_ACTION_COPY, false);
+    ShownSearch search(user.name, job.operation.web.GetParam("taskid", ""));
+    for (const std::string& name : unpacker.names()) search.added({job.info, job.folder, name});
+}
+
+void run(const Job& job, Progress& progress) {
+    for (const std::string& path : job.operation.paths) {
+        Item item;
+        Descriptor file;
+        if (openArchive(job, path, item, file) == ORV_ERR_NONE) progress.expect(0, item.status.st_size);
+    }
+    for (const std::string& path : job.operation.paths) {
+        if (!progress.stopped()) extractOne(job, path, progress);
+    }
+}
+
+}  // namespace
+
+int extractOperation(Operation& operation) {
+    const auto target = bytesParam(operation.web, "target");
+    const auto conflict = conflictOf(operation.web.GetParam("conflict", "error"));
+    if (!target || !conflict) return ORV_ERR_PARAMETER;
+    operation.culprit = *target;
+    Job job = {.operation = operation, .conflict = *conflict, .info = {}, .folder = Descriptor()};
+    int code = openFolder(operation.user, *target, job.info, job.folder);
+    if (code == ORV_ERR_NONE) code = judgeTarget(operation.user, job.info, job.conflict);
+    if (code != ORV_ERR_NONE) return code;
+    return startTask(operation, "extract", [&job](Progress& progress) { run(job, progress); });
+}
+
+}  // namespace orvel::cgi

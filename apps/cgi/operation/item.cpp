@@ -1,0 +1,69 @@
+#include "operation/item.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
+
+#include "background.h"
+#include "orvel/directory_walker.h"
+#include "orvel/error_state.h"
+#include "vexo/filesystem.h"
+#include "vexo/user.h"
+
+namespace orvel::cgi {
+namespace {
+
+struct Sum : OrvDirectoryWalkerCallBack {
+    long long items = 0, bytes = 0;
+    bool operator()(const std::string&, const std::string&, const std::string&, const std::string&,
+                    _tag_VEXOSTAT_& status, const std::string*) override {
+        ++items;
+        if (S_ISREG(status.st_mode)) bytes += status.st_size;
+        return true;
+    }
+};
+
+}  // namespace
+
+int openItem(const User& user, const std::string& path, std::initializer_list<Need> needs, Item& item) {
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(user.name.c_str(), path, item.info)) return lastCode();
+    int code = ORV_ERR_NONE;
+    for (const Need need : needs) {
+        code = judge(user, item.info.path, need);
+        if (code != ORV_ERR_NONE) return code;
+    }
+    code = openTarget(item.info, linkPolicyOf(item.info.shareName), user.name, Missing::kRefuse, item.place);
+    if (code != ORV_ERR_NONE) return code;
+    if (VEXOEAIsHiddenFile(item.place.name.c_str()) != 0) return ORV_ERR_MISSING;
+    const bool there =
+        fstatat(item.place.folder.get(), item.place.name.c_str(), &item.status, AT_SYMLINK_NOFOLLOW) == 0;
+    return there ? ORV_ERR_NONE : refusalCode(errno, item.info.realPath);
+}
+
+int openFolder(const User& user, const std::string& path, PathInfo& info, Descriptor& folder) {
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(user.name.c_str(), path, info)) return lastCode();
+    return confinedOpen(info, linkPolicyOf(info.shareName), O_PATH | O_DIRECTORY, folder);
+}
+
+Owner ownerFor(const std::string& user) {
+    Owner owner;
+    uid_t uid = 0;
+    gid_t gid = 0;
+    if (geteuid() == 0 && VEXOUserGetUGID(user.c_str(), &uid, &gid) == 0) owner = {uid, gid};
+    return owner;
+}
+
+void measure(const Item& item, Progress& progress) {
+    Sum sum;
+    if (S_ISDIR(item.status.st_mode)) {
+        OrvDirectoryWalker walker(ENUM_IGNORE_ALL_ERR, stopFlag());
+        walker.Walk_TopDown(item.info.path, "", item.realPath(), sum, nullptr, false);
+        if (chdir("/") != 0) return;  // a walk stays in its last folder, which would keep a volume busy
+    }
+    progress.expect(sum.items + 1, sum.bytes + (S_ISREG(item.status.st_mode) ? item.status.st_size : 0));
+}
+
+}  // namespace orvel::cgi

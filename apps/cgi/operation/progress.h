@@ -1,0 +1,64 @@
+// What a background operation tells about itself in its task record.
+#ifndef ORVEL_CGI_OPERATION_PROGRESS_H
+#define ORVEL_CGI_OPERATION_PROGRESS_H
+
+#include <json/value.h>
+
+#include <string>
+
+#include "vexo/task.h"
+
+namespace orvel::cgi {
+
+// The record's "data": {"action", "state": "running", "done", "cancelled" or "failed", "items_done", "items_skipped",
+// "items_failed", "items_total", "bytes_done", "bytes_total", "current", "errors": [{"path","code","key"}],
+// "errors_left_out": how many more there were than the list holds}; paths are share-relative. Totals may grow. At most
+// one of these objects in a process.
+class Progress {
+ public:
+    Progress(KTR::Task& task, const std::string& action);
+    ~Progress();
+    Progress(const Progress&) = delete;
+    Progress& operator=(const Progress&) = delete;
+
+    // More is to be done.
+    void expect(long long items, long long bytes);
+    // The item at work. Everything is published at once or a little later.
+    void begin(const std::string& path);
+    void bytes(long long count);
+    // How the item ended.
+    void done() { count(itemsDone_); }
+    void skipped() { count(itemsSkipped_); }
+    void failed(const std::string& path, int code);
+    // The whole operation failed.
+    void broken(const std::string& path, int code);
+    // Whether the user wants the operation to end. To be asked often.
+    bool stopped();
+
+    // Writes the record now. False when it could not be written.
+    bool publish();
+    // Writes the last word and marks the task as finished.
+    void end();
+
+    // For VEXOFileCopy: publishes how far its copy is, and tells whether to stop.
+    static int askDuringCopy();
+
+ private:
+    void count(long long& items);
+    void publishNowAndThen(long long underWay);
+    [[nodiscard]] Json::Value data(long long underWay) const;
+    [[nodiscard]] float fraction(long long underWay) const;
+
+    KTR::Task& task_;
+    std::string action_, current_, state_ = "running";
+    long long itemsDone_ = 0, itemsSkipped_ = 0, itemsFailed_ = 0, itemsTotal_ = 0;
+    long long bytesDone_ = 0, bytesTotal_ = 0;
+    Json::Value errors_{Json::arrayValue};
+    size_t errorBytes_ = 0;
+    long long errorsLeftOut_ = 0;
+    long long publishedAt_ = 0;  // milliseconds
+};
+
+}  // namespace orvel::cgi
+
+#endif

@@ -1,0 +1,140 @@
+#include "operation/recycle.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cctype>
+#include <cerrno>
+#include <string_view>
+
+#include "orvel/error_state.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr const char* kBin = "#recycle";
+constexpr int kOpenFolder = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
+constexpr int kMostNumbers = 9999;
+
+// Where the mark at the end of `stem` begins; npos when there is none.
+size_t markIn(std::string_view stem) {
+    const size_t begin = stem.rfind(" (#");
+    if (begin == std::string_view::npos || !stem.ends_with(')') || stem.size() < begin + 5) return stem.npos;
+    const std::string_view digits = stem.substr(begin + 3, stem.size() - begin - 4);
+    const bool number = std::all_of(digits.begin(), digits.end(), [](unsigned char c) { return isdigit(c) != 0; });
+    return number ? begin : stem.npos;
+}
+
+// Where the ending of a name begins; its length when it has none, or when a mark stands at its very end.
+size_t endingOf(const std::string& name) {
+    constexpr size_t kLongestEnding = 32;
+    const size_t dot = name.rfind('.');
+    const bool hasEnding = dot != std::string::npos && dot != 0 && name.size() - dot <= kLongestEnding;
+    return hasEnding && markIn(name) == std::string::npos ? dot : name.size();
+}
+
+bool isWritable(const Descriptor& folder) {
+    return faccessat(AT_FDCWD, folder.path().c_str(), W_OK | X_OK, AT_EACCESS) == 0;
+}
+
+// Makes `name` in `folder` with the permissions of `original` and opens it. Invalid with errno.
+Descriptor makeLike(const Descriptor& folder, const std::string& name, const Descriptor& original, const Owner& owner) {
+    struct stat status {};
+    if (fstat(original.get(), &status) != 0 || mkdirat(folder.get(), name.c_str(), 0700) != 0) return Descriptor();
+    Descriptor made(openat(folder.get(), name.c_str(), kOpenFolder));
+    if (!made) return made;
+    [[maybe_unused]] int ignored = fchownat(made.get(), "", owner.uid, owner.gid, AT_EMPTY_PATH);  // not kept by FAT
+    ignored = fchmodat(AT_FDCWD, made.path().c_str(), status.st_mode & 0777, 0);
+    return made;
+}
+
+// Enters the folder of the bin that stands for `name`, made when there is none.
+Descriptor enter(const Descriptor& folder, const std::string& name, const Descriptor& original, const Owner& owner) {
+    for (int number = 1; number <= kMostNumbers; ++number) {
+        const std::string inBin = binName(name, number);
+        Descriptor found(openat(folder.get(), inBin.c_str(), kOpenFolder));
+        if (!found && errno == ENOENT) found = makeLike(folder, inBin, original, owner);
+        if (found && isWritable(found)) return found;
+        const bool taken = found || errno == EEXIST || errno == ENOTDIR || errno == ELOOP;
+        if (!taken) return Descriptor();
+    }
+    errno = EEXIST;
+    return Descriptor();
+}
+
+// The components between the real path `top` and the item's own name.
+std::vector<std::string> foldersOf(const Item& item, const std::string& top) {
+    std::vector<std::string> folders;
+    const std::string path = item.realPath();
+    std::string_view rest = path;
+    rest.remove_prefix(std::min(top.size() + 1, rest.size()));
+    for (size_t slash = rest.find('/'); slash != std::string_view::npos; slash = rest.find('/')) {
+        folders.emplace_back(rest.substr(0, slash));
+        rest.remove_prefix(slash + 1);
+    }
+    return folders;
+}
+
+}  // namespace
+
+std::string binName(const std::string& name, int number) {
+    if (number == 1 && originalName(name) == name) return name;
+    const size_t ending = endingOf(name);
+    return name.substr(0, ending) + " (#" + std::to_string(number) + ")" + name.substr(ending);
+}
+
+std::string originalName(const std::string& nameInBin) {
+    const size_t ending = endingOf(nameInBin);
+    const size_t mark = markIn(std::string_view(nameInBin).substr(0, ending));
+    return mark == std::string::npos ? nameInBin : nameInBin.substr(0, mark) + nameInBin.substr(ending);
+}
+
+std::string nextBinName(const std::string& name, int number, bool /*isFolder*/) {
+    return binName(originalName(name), number);
+}
+
+std::optional<RecycleBin> RecycleBin::of(const PathInfo& info) {
+    RecycleBin bin;
+    bin.root_ = Descriptor(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    bin.folder_ = Descriptor(openat(bin.root_.get(), kBin, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    if (!bin.folder_) return std::nullopt;
+    bin.shareName_ = info.shareName;
+    bin.rootPath_ = realPathOf(bin.root_);
+    bin.path_ = realPathOf(bin.folder_);
+    return bin;
+}
+
+int RecycleBin::placeFor(const Item& item, const Owner& owner, Descriptor& folder, Entry& place) const {
+    Descriptor original(openat(root_.get(), ".", kOpenFolder));
+    folder = Descriptor(openat(folder_.get(), ".", kOpenFolder));
+    std::string path = sharePath();
+    for (const std::string& name : foldersOf(item, rootPath_)) {
+        original = Descriptor(openat(original.get(), name.c_str(), kOpenFolder));
+        if (original) folder = enter(folder, name, original, owner);
+        if (!original || !folder) return OrvParseErrnoToError(errno, nullptr, nullptr);
+        path += "/" + name;
+    }
+    const std::string name = binName(item.place.name, 1);
+    place = {folder.get(), name, path + "/" + name};
+    return ORV_ERR_NONE;
+}
+
+std::string RecycleBin::originOf(const Item& item) const {
+    std::string path = "/" + shareName_;
+    for (const std::string& name : foldersOf(item, path_)) path += "/" + originalName(name);
+    return path + "/" + originalName(item.place.name);
+}
+
+void RecycleBin::prune(const Item& item) const {
+    std::vector<std::string> folders = foldersOf(item, path_);
+    while (!folders.empty()) {
+        std::string path = ".";
+        for (const std::string& name : folders) path += "/" + name;
+        // A link in the way was put there since; rmdir removes none.
+        if (unlinkat(folder_.get(), path.c_str(), AT_REMOVEDIR) != 0) return;
+        folders.pop_back();
+    }
+}
+
+}  // namespace orvel::cgi

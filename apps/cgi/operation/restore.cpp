@@ -1,0 +1,55 @@
+#include "operation/operation.h"
+#include "operation/recycle.h"
+#include "operation/task_start.h"
+#include "operation/transfer.h"
+#include "operation/transfer_job.h"
+#include "orvel/activity_log.h"
+#include "orvel/error_state.h"
+
+namespace orvel::cgi {
+namespace {
+
+// Opens the place where the item once was; folders that are gone are made again. 0 or a library code.
+int openOrigin(const User& user, const std::string& path, Conflict& conflict, PathInfo& info, Target& place) {
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(user.name.c_str(), path, info)) return lastCode();
+    const int code = judgeTarget(user, info, conflict);
+    if (code != ORV_ERR_NONE) return code;
+    return openTarget(info, linkPolicyOf(info.shareName), user.name, Missing::kMake, place);
+}
+
+void restoreOne(const Operation& operation, const std::string& path, Conflict conflict, ShownSearch& search,
+                Progress& progress) {
+    const User& user = operation.user;
+    Item item;
+    int code = openItem(user, path, {Need::kModify}, item);
+    const auto bin = code == ORV_ERR_NONE ? RecycleBin::of(item.info) : std::nullopt;
+    if (code == ORV_ERR_NONE && (!bin || !bin->holds(item))) code = ORV_ERR_PARAMETER;
+    PathInfo info;
+    Target place;
+    if (code == ORV_ERR_NONE) code = openOrigin(user, bin->originOf(item), conflict, info, place);
+    if (code != ORV_ERR_NONE) return progress.failed(path, code);
+
+    Transfer transfer(progress, {.conflict = conflict, .move = true, .owner = ownerFor(user.name), .onFat = false});
+    Entry to = {place.folder.get(), place.name, info.path};
+    if (!transfer.run(item, to)) return removeMadeFolders(place);
+    OrvLibDoLog(user.name, item.info.path, transfer.bytes(), ORVEL_ACTION_MOVE, false);
+    search.moved(item.changed(), {info, place.folder, to.name});
+    bin->prune(item);
+}
+
+}  // namespace
+
+int restoreOperation(Operation& operation) {
+    const auto conflict = conflictOf(operation.web.GetParam("conflict", "error"));
+    if (!conflict) return ORV_ERR_PARAMETER;
+    return startTask(operation, "restore", [&](Progress& progress) {
+        ShownSearch search(operation.user.name, operation.web.GetParam("taskid", ""));
+        progress.expect(static_cast<long long>(operation.paths.size()), 0);
+        for (const std::string& path : operation.paths) {
+            if (!progress.stopped()) restoreOne(operation, path, *conflict, search, progress);
+        }
+    });
+}
+
+}  // namespace orvel::cgi

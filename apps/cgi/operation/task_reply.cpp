@@ -1,0 +1,50 @@
+#include "operation/task_reply.h"
+
+#include <cctype>
+#include <utility>
+
+#include "operation/task_start.h"
+
+namespace orvel::cgi {
+namespace {
+
+// Operations have names in lower case, searches have not.
+bool isOperation(const std::string& id) {
+    const std::string prefix = kTaskPrefix;
+    return id.starts_with(prefix) && id.size() > prefix.size() &&
+           std::islower(static_cast<unsigned char>(id[prefix.size()])) != 0;
+}
+
+}  // namespace
+
+Json::Value taskReply(const KTR::Task& task) {
+    const Json::Value data = task.getProperty("data");
+    Json::Value shown = data.isObject() ? data : Json::Value(Json::objectValue);
+    shown["taskid"] = task.getName();
+    shown["created"] = Json::Int64{task.getCreateTime()};
+    const Json::Value progress = task.getProperty("progress");
+    shown["progress"] = progress.isDouble() ? progress : Json::Value(0.0);
+    shown["finished"] = task.isFinished();
+    if (task.hasFailed() && (!shown["state"].isString() || shown["state"] == "running")) shown["state"] = "failed";
+    return shown;
+}
+
+std::unique_ptr<KTR::Task> taskOf(const Operation& operation) {
+    const std::string id = operation.web.GetParam("taskid", "");
+    if (!isOperation(id)) return nullptr;
+    return std::unique_ptr<KTR::Task>(KTR::TaskMgr(operation.user.name.c_str()).getTask(id.c_str()));
+}
+
+bool tasksOf(const Operation& operation, std::vector<std::unique_ptr<KTR::Task>>& tasks) {
+    const KTR::TaskMgr manager(operation.user.name.c_str());
+    Json::Value names(Json::arrayValue);
+    if (!manager.getAllTaskId(kTaskPrefix, names)) return false;
+    for (const Json::Value& name : names) {
+        if (!isOperation(name.asString())) continue;
+        std::unique_ptr<KTR::Task> task(manager.getTask(name.asCString()));
+        if (task != nullptr) tasks.push_back(std::move(task));
+    }
+    return true;
+}
+
+}  // namespace orvel::cgi

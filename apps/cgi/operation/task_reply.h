@@ -1,0 +1,26 @@
+// A task as replies show it.
+#ifndef ORVEL_CGI_OPERATION_TASK_REPLY_H
+#define ORVEL_CGI_OPERATION_TASK_REPLY_H
+
+#include <json/value.h>
+
+#include <memory>
+#include <vector>
+
+#include "operation/operation.h"
+#include "vexo/task.h"
+
+namespace orvel::cgi {
+
+// {"taskid","created","progress","finished"} with the members of its "data" beside them. A task whose process ended
+// without a last word is shown as "failed".
+Json::Value taskReply(const KTR::Task& task);
+
+// The background operation "taskid" of the user, null when he has no such one; and all of them, false when they cannot
+// be listed. Searches have records of the same kind, but are no operations.
+std::unique_ptr<KTR::Task> taskOf(const Operation& operation);
+bool tasksOf(const Operation& operation, std::vector<std::unique_ptr<KTR::Task>>& tasks);
+
+}  // namespace orvel::cgi
+
+#endif

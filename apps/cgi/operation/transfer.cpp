@@ -1,0 +1,257 @@
+#include "operation/transfer.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <climits>
+#include <cstdio>
+
+#include "folder_names.h"
+#include "operation/new_file.h"
+#include "operation/rename_new.h"
+#include "operation/tree_remove.h"
+#include "orvel/error_state.h"
+#include "vexo/copy.h"
+#include "vexo/error.h"
+#include "vexo/text.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr int kMostNumbers = 9999;
+constexpr mode_t kUntilFilled = 0700;
+
+int codeOfCopy() {
+    switch (VLIBCErrGet()) {
+        case VEXO_ERR_EXISTS:
+        case VEXO_ERR_TARGET_EXISTS:
+        case VEXO_ERR_TARGET_EXISTS_OTHER:
+            return ORV_ERR_EXISTS;
+        case VEXO_ERR_FILE_TOO_LARGE:
+            return ORV_ERR_FILE_TOO_BIG;
+        default:
+            return OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
+    }
+}
+
+bool isSame(const struct stat& a, const struct stat& b) {
+    return a.st_dev == b.st_dev && a.st_ino == b.st_ino;
+}
+
+// Whether a file is as it was when it was looked at.
+bool isUnchanged(const struct stat& before, const struct stat& now) {
+    return isSame(before, now) && before.st_size == now.st_size && before.st_mtim.tv_sec == now.st_mtim.tv_sec &&
+           before.st_mtim.tv_nsec == now.st_mtim.tv_nsec;
+}
+
+}  // namespace
+
+bool Transfer::FoldedOrder::operator()(const std::string& a, const std::string& b) const {
+    return VLIBCUnicodeUTF8StrCaseCmp(a.c_str(), b.c_str()) < 0;
+}
+
+Transfer::Result Transfer::failed(const Entry& entry, int code) {
+    progress_.failed(entry.path, code);
+    return Result::kFailed;
+}
+
+Transfer::Result Transfer::failedWith(const Entry& entry, int error) {
+    // The only thing that is not valid is then a name that the file system cannot hold.
+    if (error == EINVAL && rules_.onFat) return failed(entry, ORV_ERR_FAT_NAME);
+    return failed(entry, OrvParseErrnoToError(error, nullptr, nullptr));
+}
+
+bool Transfer::run(const Item& from, Entry& to) {
+    top_ = &from;
+    topTarget_.reset();
+    renaming_ = rules_.move;
+    bytes_ = 0;
+    return place(from.entry(), from.status, to, taken_) == Result::kDone;
+}
+
+// `taken`: the names that were already given in the target's folder.
+Transfer::Result Transfer::place(const Entry& from, const struct stat& status, Entry& to, Names& taken) {
+    if (progress_.stopped()) return Result::kFailed;
+    progress_.begin(from.path);
+    if (to.path.size() >= PATH_MAX) return failed(from, ORV_ERR_LONG_PATH);
+    // One of two names that are one there would replace the other, or mix with it.
+    if (rules_.onFat && !taken.insert(to.name).second && rules_.conflict != Conflict::kKeepBoth) {
+        return failed(from, ORV_ERR_EXISTS);
+    }
+    const Result result = make(from, status, to, false);
+    return result == Result::kExists ? resolve(from, status, to) : result;
+}
+
+Transfer::Result Transfer::resolve(const Entry& from, const struct stat& status, Entry& to) {
+    struct stat there {};
+    if (fstatat(to.folder, to.name.c_str(), &there, AT_SYMLINK_NOFOLLOW) != 0) {
+        return failedWith(from, errno);
+    }
+    const bool merging = S_ISDIR(status.st_mode) && S_ISDIR(there.st_mode);
+    const bool sameKind = (status.st_mode & S_IFMT) == (there.st_mode & S_IFMT);
+    if (rules_.conflict == Conflict::kKeepBoth) return keepBoth(from, status, to);
+    if (rules_.conflict == Conflict::kSkip && !merging) {
+        progress_.skipped();
+        return Result::kFailed;
+    }
+    if (rules_.conflict == Conflict::kError || !sameKind) return failed(from, ORV_ERR_EXISTS);
+    if (isSame(status, there)) return failed(from, ORV_ERR_SELECT_CONFLICT);
+    return make(from, status, to, true);
+}
+
+Transfer::Result Transfer::keepBoth(const Entry& from, const struct stat& status, Entry& to) {
+    const std::string name = to.name, folder = to.path.substr(0, to.path.rfind('/') + 1);
+    for (int number = 2; number <= kMostNumbers; ++number) {
+        to.name = rules_.nextName(name, number, S_ISDIR(status.st_mode));
+        to.path = folder + to.name;
+        const Result result = make(from, status, to, false);
+        if (result != Result::kExists) return result;
+    }
+    return failed(from, ORV_ERR_EXISTS);
+}
+
+// `replace`: in the place of what is there, which is of the same kind; folders are merged.
+Transfer::Result Transfer::make(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
+    return renaming_ ? rename(from, status, to, replace) : copy(from, status, to, replace);
+}
+
+Transfer::Result Transfer::rename(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
+    if (replace && S_ISDIR(status.st_mode)) return fill(from, status, to, false);
+    const bool renamed = replace ? renameat(from.folder, from.name.c_str(), to.folder, to.name.c_str()) == 0
+                                 : renameNew(from.folder, from.name, to.folder, to.name);
+    if (renamed) {
+        progress_.done();
+        return Result::kDone;
+    }
+    if (errno == EXDEV) {
+        renaming_ = false;
+        // It is now that there are bytes to be moved; the item itself was expected.
+        measure(*top_, progress_);
+        progress_.expect(-1, 0);
+        return copy(from, status, to, replace);
+    }
+    return errno == EEXIST || errno == ENOTEMPTY ? Result::kExists : failedWith(from, errno);
+}
+
+Transfer::Result Transfer::copy(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
+    if (S_ISDIR(status.st_mode)) return replace ? fill(from, status, to, false) : makeFolder(from, status, to);
+    Result result = Result::kFailed;
+    if (S_ISREG(status.st_mode)) {
+        result = copyFile(from, status, to, replace);
+    } else if (S_ISLNK(status.st_mode)) {
+        result = copyLink(from, status, to, replace);
+    } else {
+        return failed(from, ORV_ERR_GENERAL);
+    }
+    if (result == Result::kDone && rules_.move) result = removeSource(from, status);
+    if (result == Result::kDone) progress_.done();
+    return result;
+}
+
+Transfer::Result Transfer::copyFile(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
+    unsigned switches = VEXO_COPY_KEEP_TIMES | VEXO_COPY_KEEP_MODE;
+    if (replace) switches |= VEXO_COPY_OVERWRITE;
+    const VEXOCOPYOPT options = {
+        .uid = rules_.owner.uid, .gid = rules_.owner.gid, .isCancelled = Progress::askDuringCopy, .switches = switches};
+    if (VEXOFileCopy(from.handle().c_str(), to.handle().c_str(), &options) == 0) {
+        bytes_ += status.st_size;
+        progress_.bytes(status.st_size);
+        return Result::kDone;
+    }
+    if (VLIBCErrGet() == VEXO_ERR_CANCELLED) return Result::kFailed;
+    const int code = codeOfCopy();
+    return code == ORV_ERR_EXISTS && !replace ? Result::kExists : failed(from, code);
+}
+
+Transfer::Result Transfer::copyLink(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
+    std::array<char, PATH_MAX> text{};
+    if (readlinkat(from.folder, from.name.c_str(), text.data(), text.size() - 1) < 0) return failedWith(from, errno);
+    if (!putLink(to.folder, to.name, text.data(), replace)) {
+        return errno == EEXIST ? Result::kExists : failedWith(from, errno);
+    }
+    const std::array<timespec, 2> times = {status.st_atim, status.st_mtim};
+    utimensat(to.folder, to.name.c_str(), times.data(), AT_SYMLINK_NOFOLLOW);
+    [[maybe_unused]] const int ignored =
+        fchownat(to.folder, to.name.c_str(), rules_.owner.uid, rules_.owner.gid, AT_SYMLINK_NOFOLLOW);
+    return Result::kDone;
+}
+
+Transfer::Result Transfer::makeFolder(const Entry& from, const struct stat& status, const Entry& to) {
+    if (mkdirat(to.folder, to.name.c_str(), kUntilFilled) == 0) return fill(from, status, to, true);
+    return errno == EEXIST ? Result::kExists : failedWith(from, errno);
+}
+
+// What a new folder takes over from its source.
+void Transfer::makeAlike(const Descriptor& folder, const struct stat& status) const {
+    struct stat now {};
+    const mode_t group = fstat(folder.get(), &now) == 0 ? now.st_mode & S_ISGID : 0;
+    const std::array<timespec, 2> times = {status.st_atim, status.st_mtim};
+    [[maybe_unused]] int ignored = fchown(folder.get(), rules_.owner.uid, rules_.owner.gid);  // FAT keeps neither
+    ignored = fchmod(folder.get(), (status.st_mode & 0777) | group);
+    futimens(folder.get(), times.data());
+}
+
+// `made`: the folder is new.
+Transfer::Result Transfer::fill(const Entry& from, const struct stat& status, const Entry& to, bool made) {
+    constexpr int flags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
+    const Descriptor source(openat(from.folder, from.name.c_str(), flags));
+    if (!source) {
+        const int error = errno;
+        if (made) unlinkat(to.folder, to.name.c_str(), AT_REMOVEDIR);
+        return failedWith(from, error);
+    }
+    const Descriptor target(openat(to.folder, to.name.c_str(), flags));
+    struct stat inside {};
+    if (!target || fstat(target.get(), &inside) != 0) return failedWith(from, errno);
+    if (!topTarget_) topTarget_ = inside;
+    // The tree may lie in itself by way of a mount.
+    if (isSame(status, *topTarget_)) return failed(from, ORV_ERR_SELECT_CONFLICT);
+    const bool all = fillFrom(from, source, to, target);
+    if (made) makeAlike(target, status);
+    if (progress_.stopped()) return Result::kFailed;
+    if (!all && rules_.move) {
+        progress_.skipped();  // it stays, with what stayed in it
+        return Result::kFailed;
+    }
+    if (rules_.move && removeSource(from, status) != Result::kDone) return Result::kFailed;
+    progress_.done();
+    return all ? Result::kDone : Result::kFailed;
+}
+
+bool Transfer::fillFrom(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target) {
+    std::vector<std::string> names;
+    bool all = namesIn(source.get(), Hidden::kLeaveOut, names);
+    if (!all) failedWith(from, errno);
+    if (renaming_) progress_.expect(static_cast<long long>(names.size()), 0);
+    Names taken;
+    for (const std::string& name : names) {
+        if (progress_.stopped()) return false;
+        const Entry child = from.child(source.get(), name);
+        Entry childTo = to.child(target.get(), name);
+        struct stat status {};
+        if (fstatat(child.folder, child.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+            failedWith(child, errno);
+            all = false;
+        } else {
+            all = place(child, status, childTo, taken) == Result::kDone && all;
+        }
+    }
+    return all;
+}
+
+// After a copy: the source is removed unless it is not what was copied any more.
+Transfer::Result Transfer::removeSource(const Entry& from, const struct stat& status) {
+    const char* name = from.name.c_str();
+    if (S_ISDIR(status.st_mode)) {
+        removeHidden(from);  // what was passed over is nobody's any more
+        return unlinkat(from.folder, name, AT_REMOVEDIR) == 0 ? Result::kDone : failedWith(from, errno);
+    }
+    struct stat now {};
+    if (fstatat(from.folder, name, &now, AT_SYMLINK_NOFOLLOW) != 0) return failedWith(from, errno);
+    if (!isUnchanged(status, now)) return failed(from, ORV_ERR_BUSY);
+    return unlinkat(from.folder, name, 0) == 0 ? Result::kDone : failedWith(from, errno);
+}
+
+}  // namespace orvel::cgi

@@ -1,0 +1,72 @@
+// Copying and moving of files and whole folders.
+#ifndef ORVEL_CGI_OPERATION_TRANSFER_H
+#define ORVEL_CGI_OPERATION_TRANSFER_H
+
+#include <optional>
+#include <set>
+#include <string>
+
+#include "operation/conflict.h"
+#include "operation/item.h"
+#include "operation/progress.h"
+
+namespace orvel::cgi {
+
+// Files appear under their names whole or not at all, with the permissions and times of the source; a new folder gets
+// them once it is filled. Links are copied as they are. What fails is reported, each item for itself, and the rest goes
+// on; so does what is neither a file, a folder nor a link. Hidden names are passed over.
+//
+// A move is a rename; where that is not possible, on another file system, it is a copy after which the source is
+// removed.
+class Transfer {
+ public:
+    struct Rules {
+        Conflict conflict;
+        bool move;
+        Owner owner;
+        bool onFat;  // the target: names that differ only in case are one there
+        std::string (*nextName)(const std::string& name, int number, bool isFolder) = numberedName;  // see kKeepBoth
+    };
+    Transfer(Progress& progress, const Rules& rules) : progress_(progress), rules_(rules) {}
+
+    // Puts `from` where `to` says; its name, and its path with it, change when both are kept. `to.folder` is the same
+    // for all calls. Sizes must have been measured before, except for a move. True when all of it arrived.
+    bool run(const Item& from, Entry& to);
+    // What the last run copied.
+    [[nodiscard]] long long bytes() const { return bytes_; }
+
+ private:
+    enum class Result { kDone, kFailed, kExists };
+    struct FoldedOrder {
+        bool operator()(const std::string& a, const std::string& b) const;
+    };
+    using Names = std::set<std::string, FoldedOrder>;
+
+    Result place(const Entry& from, const struct stat& status, Entry& to, Names& taken);
+    Result resolve(const Entry& from, const struct stat& status, Entry& to);
+    Result keepBoth(const Entry& from, const struct stat& status, Entry& to);
+    Result make(const Entry& from, const struct stat& status, const Entry& to, bool replace);
+    Result rename(const Entry& from, const struct stat& status, const Entry& to, bool replace);
+    Result copy(const Entry& from, const struct stat& status, const Entry& to, bool replace);
+    Result copyFile(const Entry& from, const struct stat& status, const Entry& to, bool replace);
+    Result copyLink(const Entry& from, const struct stat& status, const Entry& to, bool replace);
+    Result makeFolder(const Entry& from, const struct stat& status, const Entry& to);
+    Result fill(const Entry& from, const struct stat& status, const Entry& to, bool made);
+    bool fillFrom(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target);
+    void makeAlike(const Descriptor& folder, const struct stat& status) const;
+    Result removeSource(const Entry& from, const struct stat& status);
+    Result failed(const Entry& entry, int code);
+    Result failedWith(const Entry& entry, int error);
+
+    Progress& progress_;
+    Rules rules_;
+    Names taken_;                           // at the top of the target
+    const Item* top_ = nullptr;             // of the run
+    std::optional<struct stat> topTarget_;  // the folder that it becomes
+    bool renaming_ = false;                 // no rename of this run met another file system yet
+    long long bytes_ = 0;
+};
+
+}  // namespace orvel::cgi
+
+#endif

@@ -1,0 +1,110 @@
+#include "operation/transfer_job.h"
+
+#include "operation/item.h"
+#include "operation/task_start.h"
+#include "operation/transfer.h"
+#include "orvel/activity_log.h"
+#include "orvel/error_state.h"
+#include "orvel/name_check.h"
+#include "orvel/privilege.h"
+#include "vexo/filesystem.h"
+
+namespace orvel::cgi {
+namespace {
+
+struct Job {
+    const Operation& operation;
+    bool move;
+    Conflict conflict;
+    PathInfo info;  // the target folder
+    Descriptor folder;
+};
+
+int openSource(const Job& job, const std::string& path, Item& item) {
+    const User& user = job.operation.user;
+    return job.move ? openItem(user, path, {Need::kRead, Need::kModify}, item)
+                    : openItem(user, path, {Need::kRead}, item);
+}
+
+// Whether the item may get a place in the target folder.
+int checkPlace(const Job& job, const Item& item) {
+    const std::string folder = realPathOf(job.folder);
+    if (S_ISDIR(item.status.st_mode) && (folder + "/").starts_with(item.realPath() + "/")) {
+        return ORV_ERR_SELECT_CONFLICT;  // a folder into itself
+    }
+    OrvLibSetErr(ORV_ERR_NONE);
+    const bool fits = OrvCheckFileName(folder.c_str(), item.place.name.c_str()) == 0;
+    return fits ? ORV_ERR_NONE : lastCode();
+}
+
+void expectAll(const Job& job, Progress& progress) {
+    for (const std::string& path : job.operation.paths) {
+        Item item;
+        if (job.move || progress.stopped() || openSource(job, path, item) != ORV_ERR_NONE) {
+            progress.expect(1, 0);
+        } else {
+            measure(item, progress);
+        }
+    }
+}
+
+void tell(const Job& job, const Item& item, const Entry& made, long long bytes, ShownSearch& search) {
+    OrvLibDoLog(job.operation.user.name, item.info.path, bytes, job.move ? ORVEL_ACTION_MOVE : ORVEL_ACTION_COPY,
+                false);
+    const ChangedFile there = {job.info, job.folder, made.name};
+    if (job.move) {
+        search.moved(item.changed(), there);
+    } else {
+        search.added(there);
+    }
+}
+
+void run(const Job& job, Progress& progress) {
+    ShownSearch search(job.operation.user.name, job.operation.web.GetParam("taskid", ""));
+    expectAll(job, progress);
+    Transfer transfer(progress, {.conflict = job.conflict,
+                                 .move = job.move,
+                                 .owner = ownerFor(job.operation.user.name),
+                                 .onFat = isOnFat(job.folder)});
+    for (const std::string& path : job.operation.paths) {
+        if (progress.stopped()) return;
+        Item item;
+        int code = openSource(job, path, item);
+        if (code == ORV_ERR_NONE) code = checkPlace(job, item);
+        if (code != ORV_ERR_NONE) {
+            progress.failed(path, code);
+            continue;
+        }
+        Entry to = {job.folder.get(), item.place.name, job.info.path + "/" + item.place.name};
+        if (transfer.run(item, to)) tell(job, item, to, transfer.bytes(), search);
+    }
+}
+
+}  // namespace
+
+bool isOnFat(const Descriptor& folder) {
+    return VEXOGetFSType(realPathOf(folder).c_str(), 0) == VEXO_FS_FAT;
+}
+
+int judgeTarget(const User& user, const PathInfo& info, Conflict& conflict) {
+    // A mode that was chosen: whether there is something at the target shows for each item.
+    _tag__type_ mode = conflict == Conflict::kOverwrite ? OVERWRITE_MODE_OVERWRITE : OVERWRITE_MODE_SKIP;
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!CheckShareUploadPrivilege(user.name.c_str(), user.sid.c_str(), info.path.c_str(), mode)) return lastCode();
+    if (conflict == Conflict::kOverwrite && mode != OVERWRITE_MODE_OVERWRITE) conflict = Conflict::kSkip;
+    return ORV_ERR_NONE;
+}
+
+int startTransfer(Operation& operation, bool move) {
+    const auto target = bytesParam(operation.web, "target");
+    const auto conflict = conflictOf(operation.web.GetParam("conflict", "error"));
+    if (!target || !conflict) return ORV_ERR_PARAMETER;
+    operation.culprit = *target;
+    Job job = {.operation = operation, .move = move, .conflict = *conflict, .info = {}, .folder = Descriptor()};
+    int code = openFolder(operation.user, *target, job.info, job.folder);
+    if (code == ORV_ERR_NONE) code = judgeTarget(operation.user, job.info, job.conflict);
+    if (code != ORV_ERR_NONE) return code;
+    return startTask(operation, move ? "move" : "copy", [&job](Progress& progress) { run(job, progress); });
+}
+
+}  // namespace orvel::cgi

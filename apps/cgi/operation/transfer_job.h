@@ -1,0 +1,22 @@
+// What "copy" and "move" have in common.
+#ifndef ORVEL_CGI_OPERATION_TRANSFER_JOB_H
+#define ORVEL_CGI_OPERATION_TRANSFER_JOB_H
+
+#include "operation/conflict.h"
+#include "operation/item.h"
+#include "operation/operation.h"
+
+namespace orvel::cgi {
+
+int startTransfer(Operation& operation, bool move);
+
+// Asks whether the user may make something in the folder at `info`. The share may forbid to replace files; what is to
+// be overwritten is then skipped. 0 or a library code.
+int judgeTarget(const User& user, const PathInfo& info, Conflict& conflict);
+
+// Whether the file system of the open folder is one where case does not count.
+bool isOnFat(const Descriptor& folder);
+
+}  // namespace orvel::cgi
+
+#endif

@@ -1,0 +1,89 @@
+#include "operation/tree_remove.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
+
+#include "folder_names.h"
+#include "orvel/error_state.h"
+#include "vexo/filesystem.h"
+
+namespace orvel::cgi {
+namespace {
+
+bool failed(const Entry& entry, Progress& progress, int error) {
+    progress.failed(entry.path, OrvParseErrnoToError(error, nullptr, nullptr));
+    return false;
+}
+
+void removeQuietly(int folder, const std::string& name) {
+    if (unlinkat(folder, name.c_str(), 0) == 0) return;
+    const Descriptor inside(openat(folder, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    std::vector<std::string> names;
+    if (!inside || !namesIn(inside.get(), Hidden::kInclude, names)) return;
+    for (const std::string& child : names) removeQuietly(inside.get(), child);
+    unlinkat(folder, name.c_str(), AT_REMOVEDIR);
+}
+
+bool removeIn(const Entry& entry, dev_t device, Progress& progress);
+
+// Everything in the folder. Errors are reported for each item in it.
+bool emptyFolder(const Entry& entry, dev_t device, Progress& progress) {
+    const Descriptor folder(openat(entry.folder, entry.name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    struct stat status {};
+    std::vector<std::string> names;
+    if (!folder || fstat(folder.get(), &status) != 0) return failed(entry, progress, errno);
+    if (status.st_dev != device) {
+        progress.failed(entry.path, ORV_ERR_MOUNT_BUSY);
+        return false;
+    }
+    if (!namesIn(folder.get(), Hidden::kInclude, names)) return failed(entry, progress, errno);
+    bool all = true;
+    for (const std::string& name : names) {
+        if (progress.stopped()) return false;
+        if (VEXOEAIsHiddenFile(name.c_str()) != 0) {
+            removeQuietly(folder.get(), name);
+        } else {
+            all = removeIn(entry.child(folder.get(), name), device, progress) && all;
+        }
+    }
+    return all;
+}
+
+bool removeIn(const Entry& entry, dev_t device, Progress& progress) {
+    progress.begin(entry.path);
+    struct stat status {};
+    if (fstatat(entry.folder, entry.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+        return failed(entry, progress, errno);
+    }
+    const bool isFolder = S_ISDIR(status.st_mode);
+    if (isFolder && !emptyFolder(entry, device, progress)) return false;
+    if (unlinkat(entry.folder, entry.name.c_str(), isFolder ? AT_REMOVEDIR : 0) != 0) {
+        return failed(entry, progress, errno);
+    }
+    if (S_ISREG(status.st_mode)) progress.bytes(status.st_size);
+    progress.done();
+    return true;
+}
+
+}  // namespace
+
+bool removeTree(const Entry& entry, Progress& progress) {
+    struct stat status {};
+    if (fstatat(entry.folder, entry.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+        return failed(entry, progress, errno);
+    }
+    return removeIn(entry, status.st_dev, progress);
+}
+
+void removeHidden(const Entry& entry) {
+    const Descriptor folder(openat(entry.folder, entry.name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    std::vector<std::string> names;
+    if (!folder || !namesIn(folder.get(), Hidden::kInclude, names)) return;
+    for (const std::string& name : names) {
+        if (VEXOEAIsHiddenFile(name.c_str()) != 0) removeQuietly(folder.get(), name);
+    }
+}
+
+}  // namespace orvel::cgi

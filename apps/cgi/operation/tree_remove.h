@@ -1,0 +1,20 @@
+// Removing files and whole folders, for good.
+#ifndef ORVEL_CGI_OPERATION_TREE_REMOVE_H
+#define ORVEL_CGI_OPERATION_TREE_REMOVE_H
+
+#include "operation/item.h"
+#include "operation/progress.h"
+
+namespace orvel::cgi {
+
+// Removes the entry with everything below it, hidden names too; links are removed, not followed. What cannot be removed
+// is reported, each item for itself, and the rest goes on; another file system that is mounted in the tree stays. True
+// when all of it is gone.
+bool removeTree(const Entry& entry, Progress& progress);
+
+// Removes what the file manager never shows from the folder `entry`, without a report, as far as it goes.
+void removeHidden(const Entry& entry);
+
+}  // namespace orvel::cgi
+
+#endif

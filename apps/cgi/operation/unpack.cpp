@@ -1,0 +1,357 @@
+#include "operation/unpack.h"
+
+#include <archive.h>
+#include <archive_entry.h>
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <charconv>
+#include <climits>
+#include <clocale>
+#include <memory>
+
+#include "operation/member_path.h"
+#include "operation/new_file.h"
+#include "orvel/error_state.h"
+#include "orvel/name_check.h"
+#include "vexo/filesystem.h"
+#include "vexo/settings.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr size_t kBlock = size_t{256} * 1024;
+constexpr long long kMiB = 1024LL * 1024;
+constexpr long long kNeverMeasured = 64 * kMiB;
+constexpr int kMostNumbers = 9999;
+constexpr int kSkipped = -1;  // beside library codes
+constexpr int kStopped = -2;
+
+struct CloseArchive {
+    void operator()(archive* source) const { archive_read_free(source); }
+};
+
+int codeOf(int error) {
+    return OrvParseErrnoToError(error, nullptr, nullptr);
+}
+
+long long setting(const char* key, long long fallback) {
+    const std::string text = VexoConf::Info().Get(key, "");
+    long long value = 0;
+    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
+    return error == std::errc() && end == text.data() + text.size() && value > 0 ? value : fallback;
+}
+
+// The product, or the largest number.
+long long times(long long a, long long b) {
+    long long product = 0;
+    return __builtin_mul_overflow(a, b, &product) ? LLONG_MAX : product;
+}
+
+std::string joined(const std::vector<std::string>& components) {
+    std::string path = ".";
+    for (const std::string& component : components) path += "/" + component;
+    return path;
+}
+
+// Whether a file or folder of this name may be made in the folder.
+int checkName(const Descriptor& folder, const std::string& name) {
+    if (VEXOEAIsHiddenFile(name.c_str()) != 0) return ORV_ERR_RESERVED_NAME;
+    OrvLibSetErr(ORV_ERR_NONE);
+    return OrvCheckFileName(realPathOf(folder).c_str(), name.c_str()) == 0 ? ORV_ERR_NONE : lastCode();
+}
+
+std::unique_ptr<archive, CloseArchive> openArchive(int file) {
+    setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted to
+    std::unique_ptr<archive, CloseArchive> source(archive_read_new());
+    if (source == nullptr) return nullptr;
+    archive_read_support_format_zip(source.get());
+    archive_read_support_format_tar(source.get());
+    // Not all there are: some would run outside programs.
+    for (const auto support :
+         {archive_read_support_filter_gzip, archive_read_support_filter_bzip2, archive_read_support_filter_compress,
+          archive_read_support_filter_lzip, archive_read_support_filter_lzma, archive_read_support_filter_xz,
+          archive_read_support_filter_zstd, archive_read_support_filter_lz4}) {
+        support(source.get());
+    }
+    return archive_read_open_fd(source.get(), file, kBlock) == ARCHIVE_OK ? std::move(source) : nullptr;
+}
+
+}  // namespace
+
+struct Unpacker::Member {
+    archive_entry* entry;
+    std::vector<std::string> folders;
+    std::string name;
+    std::string path;   // share-relative
+    Descriptor folder;  // that holds it
+    [[nodiscard]] mode_t mode() const { return archive_entry_perm(entry); }
+    [[nodiscard]] timespec modified() const {
+        if (archive_entry_mtime_is_set(entry) == 0) return {0, UTIME_NOW};
+        return {archive_entry_mtime(entry), archive_entry_mtime_nsec(entry)};
+    }
+    [[nodiscard]] bool isThere(struct stat& status) const {
+        return fstatat(folder.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
+    }
+};
+
+UnpackLimits UnpackLimits::of(long long archiveSize) {
+    const long long byRatio = times(archiveSize, setting("extract_max_ratio", 200));
+    const long long most = times(setting("extract_max_size", kMiB), kMiB);
+    return {std::min(std::max(byRatio, kNeverMeasured), most), setting("extract_max_members", 1000000)};
+}
+
+int Unpacker::run(int file, const UnpackLimits& limits) {
+    limits_ = limits;
+    bytes_ = members_ = consumed_ = 0;
+    exceeded_ = torn_ = false;
+    const auto source = openArchive(file);
+    const int code = source == nullptr ? static_cast<int>(ORV_ERR_ARCHIVE) : readAll(source.get());
+    finishFolders();
+    return code;
+}
+
+int Unpacker::readAll(archive* source) {
+    for (;;) {
+        if (progress_.stopped()) return ORV_ERR_NONE;
+        archive_entry* entry = nullptr;
+        const int result = archive_read_next_header(source, &entry);
+        if (result == ARCHIVE_EOF) return ORV_ERR_NONE;
+        if (result == ARCHIVE_RETRY) continue;
+        if (result < ARCHIVE_WARN) return members_ == 0 ? ORV_ERR_ARCHIVE : ORV_ERR_ARCHIVE_DATA;
+        if (++members_ > limits_.members) return ORV_ERR_FILE_TOO_BIG;
+        take(source, entry);
+        if (exceeded_) return ORV_ERR_FILE_TOO_BIG;
+        if (torn_) return ORV_ERR_ARCHIVE_DATA;
+        const long long consumed = archive_filter_bytes(source, -1);
+        progress_.bytes(std::max(consumed - consumed_, 0LL));
+        consumed_ = std::max(consumed, consumed_);
+    }
+}
+
+void Unpacker::take(archive* source, archive_entry* entry) {
+    progress_.expect(1, 0);
+    const char* name = archive_entry_pathname(entry);
+    const std::string shown = target_.path + "/" + (name == nullptr ? "" : name);
+    progress_.begin(shown);
+    auto components = memberComponents(name == nullptr ? "" : name);
+    // The top itself, as archives of "." have it.
+    if (!components && name != nullptr && archive_entry_filetype(entry) == AE_IFDIR &&
+        std::string_view(name).find_first_not_of("./") == std::string_view::npos && *name != '/' &&
+        std::string_view(name).find("..") == std::string_view::npos) {
+        return progress_.done();
+    }
+    if (!components) return progress_.failed(shown, ORV_ERR_ILLEGAL_NAME);
+    Member member = {
+        .entry = entry, .folders = std::move(*components), .name = {}, .path = shown, .folder = Descriptor()};
+    member.name = std::move(member.folders.back());
+    member.folders.pop_back();
+    const int code = place(source, member);
+    if (code == ORV_ERR_NONE) {
+        names_.insert(member.folders.empty() ? member.name : member.folders.front());
+        progress_.done();
+    } else if (code == kSkipped) {
+        progress_.skipped();
+    } else if (code != kStopped) {
+        progress_.failed(shown, code);
+    }
+}
+
+int Unpacker::place(archive* source, Member& member) {
+    if (member.path.size() >= PATH_MAX) return ORV_ERR_LONG_PATH;
+    int code = enter(member.folders, member.folder);
+    if (code == ORV_ERR_NONE) code = checkName(member.folder, member.name);
+    if (code != ORV_ERR_NONE) return code;
+    if (archive_entry_hardlink(member.entry) != nullptr) return makeHardLink(member);
+    if (archive_entry_is_encrypted(member.entry) != 0) return ORV_ERR_ARCHIVE_PASSWORD;
+    switch (archive_entry_filetype(member.entry)) {
+        case AE_IFREG:
+            return makeFile(source, member);
+        case AE_IFDIR:
+            return makeFolder(member);
+        case AE_IFLNK:
+            return makeLink(member);
+        default:
+            return ORV_ERR_DENIED;  // devices, pipes
+    }
+}
+
+// Opens the folder, of which missing parts are made. Links in it are not followed.
+int Unpacker::enter(const std::vector<std::string>& folders, Descriptor& folder) {
+    constexpr int flags = O_PATH | O_DIRECTORY;
+    folder = openBeneath(target_.folder, joined(folders), LinkPolicy::kNone, flags);
+    if (folder) return ORV_ERR_NONE;
+    if (errno != ENOENT) return refusalCode(errno, "");
+    folder = openBeneath(target_.folder, ".", LinkPolicy::kNone, flags);
+    for (const std::string& name : folders) {
+        Descriptor next = openBeneath(folder, name, LinkPolicy::kNone, flags);
+        if (!next && errno == ENOENT) {
+            const int code = checkName(folder, name);
+            if (code != ORV_ERR_NONE) return code;
+            if (mkdirat(folder.get(), name.c_str(), 0755) != 0) return codeOf(errno);
+            next = openBeneath(folder, name, LinkPolicy::kNone, flags);
+            [[maybe_unused]] const int ignored =
+                fchownat(next.get(), "", target_.owner.uid, target_.owner.gid, AT_EMPTY_PATH);  // FAT keeps none
+        }
+        if (!next) return refusalCode(errno, "");
+        folder = std::move(next);
+    }
+    return ORV_ERR_NONE;
+}
+
+int Unpacker::makeFolder(const Member& member) {
+    struct stat there {};
+    if (member.isThere(there)) return S_ISDIR(there.st_mode) ? ORV_ERR_NONE : ORV_ERR_EXISTS;
+    std::vector<std::string> all = member.folders;
+    all.push_back(member.name);
+    Descriptor made;
+    const int code = enter(all, made);
+    if (code == ORV_ERR_NONE) madeFolders_.push_back({joined(all), member.mode(), member.modified()});
+    return code;
+}
+
+// Gives what was made its name, by the policy. 0, kSkipped or a library code.
+int Unpacker::nameIt(Member& member, bool (*give)(void* what, const std::string& name, bool replace), void* what) {
+    const std::string wanted = member.name;
+    bool given = give(what, wanted, false);
+    if (given || errno != EEXIST) return given ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
+    switch (target_.conflict) {
+        case Conflict::kError:
+            return ORV_ERR_EXISTS;
+        case Conflict::kSkip:
+            return kSkipped;
+        case Conflict::kOverwrite:
+            if (struct stat there{};
+                member.isThere(there) && (there.st_mode & S_IFMT) != archive_entry_filetype(member.entry)) {
+                return ORV_ERR_EXISTS;
+            }
+            return give(what, wanted, true) ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
+        case Conflict::kKeepBoth:
+            break;
+    }
+    for (int number = 2; !given && number <= kMostNumbers; ++number) {
+        member.name = numberedName(wanted, number, false);
+        given = give(what, member.name, false);
+        if (!given && errno != EEXIST) break;
+    }
+    return given ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
+}
+
+int Unpacker::makeFile(archive* source, Member& member) {
+    struct stat there {};
+    if (target_.conflict == Conflict::kSkip && member.isThere(there)) return kSkipped;
+    if (archive_entry_size(member.entry) > limits_.bytes - bytes_) {
+        exceeded_ = true;
+        return ORV_ERR_FILE_TOO_BIG;
+    }
+    NewFile file(member.folder.get());
+    if (!file.create()) return codeOf(errno);
+    const int code = fill(source, member, file.get());
+    if (code != ORV_ERR_NONE) return code;
+    // A file that its owner could not read or write would be of no use to him.
+    [[maybe_unused]] int ignored = fchown(file.get(), target_.owner.uid, target_.owner.gid);  // FAT keeps neither
+    ignored = fchmod(file.get(), (member.mode() & 0755) | 0600);
+    const std::array<timespec, 2> when = {timespec{0, UTIME_NOW}, member.modified()};
+    futimens(file.get(), when.data());
+    return nameIt(
+        member,
+        [](void* what, const std::string& name, bool replace) {
+            return static_cast<NewFile*>(what)->publish(name, replace);
+        },
+        &file);
+}
+
+// Writes the member's data; what the archive leaves out stays a hole.
+int Unpacker::fill(archive* source, const Member& member, int file) {
+    long long end = archive_entry_size_is_set(member.entry) != 0 ? archive_entry_size(member.entry) : 0;
+    const long long before = bytes_;
+    for (;;) {
+        const void* block = nullptr;
+        size_t size = 0;
+        la_int64_t offset = 0;
+        const int result = archive_read_data_block(source, &block, &size, &offset);
+        if (result == ARCHIVE_EOF) break;
+        if (result == ARCHIVE_RETRY) continue;
+        if (result < ARCHIVE_WARN) {
+            torn_ = result == ARCHIVE_FATAL;
+            return ORV_ERR_ARCHIVE_DATA;
+        }
+        if (progress_.stopped()) return kStopped;
+        if (offset < 0 || offset > limits_.bytes - before - static_cast<long long>(size)) {
+            exceeded_ = true;
+            return ORV_ERR_FILE_TOO_BIG;
+        }
+        for (size_t done = 0; done < size;) {
+            const ssize_t put =
+                pwrite(file, static_cast<const char*>(block) + done, size - done, offset + static_cast<off_t>(done));
+            if (put < 0 && errno == EINTR) continue;
+            if (put <= 0) return codeOf(put < 0 ? errno : ENOSPC);
+            done += static_cast<size_t>(put);
+        }
+        end = std::max(end, static_cast<long long>(offset) + static_cast<long long>(size));
+        bytes_ = before + end;
+    }
+    bytes_ = before + end;
+    return ftruncate(file, end) == 0 ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
+}
+
+int Unpacker::makeLink(Member& member) {
+    const char* text = archive_entry_symlink(member.entry);
+    if (text == nullptr || !staysInside(text, member.folders.size())) return ORV_ERR_DENIED;
+    struct Link {
+        const Descriptor& folder;
+        const char* text;
+    } link = {member.folder, text};
+    return nameIt(
+        member,
+        [](void* what, const std::string& name, bool replace) {
+            const auto& made = *static_cast<Link*>(what);
+            return putLink(made.folder.get(), name, made.text, replace);
+        },
+        &link);
+}
+
+// One more name of a member that was unpacked before.
+int Unpacker::makeHardLink(Member& member) {
+    auto other = memberComponents(archive_entry_hardlink(member.entry));
+    if (!other) return ORV_ERR_ILLEGAL_NAME;
+    const std::string name = other->back();
+    other->pop_back();
+    struct Names {
+        Descriptor from;
+        std::string name;
+        const Descriptor& to;
+    } names = {openBeneath(target_.folder, joined(*other), LinkPolicy::kNone, O_PATH | O_DIRECTORY), name,
+               member.folder};
+    struct stat status {};
+    if (!names.from || fstatat(names.from.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+        return refusalCode(errno, "");
+    }
+    if (!S_ISREG(status.st_mode)) return ORV_ERR_DENIED;
+    return nameIt(
+        member,
+        [](void* what, const std::string& asName, bool replace) {
+            const auto& pair = *static_cast<Names*>(what);
+            if (replace && unlinkat(pair.to.get(), asName.c_str(), 0) != 0) return false;
+            return linkat(pair.from.get(), pair.name.c_str(), pair.to.get(), asName.c_str(), 0) == 0;
+        },
+        &names);
+}
+
+// Folders get their permissions and times last: they were to be written in.
+void Unpacker::finishFolders() {
+    for (auto folder = madeFolders_.rbegin(); folder != madeFolders_.rend(); ++folder) {
+        const Descriptor opened =
+            openBeneath(target_.folder, folder->path, LinkPolicy::kNone, O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
+        if (!opened) continue;
+        [[maybe_unused]] const int ignored = fchmod(opened.get(), (folder->mode & 0755) | 0700);
+        const std::array<timespec, 2> when = {timespec{0, UTIME_NOW}, folder->modified};
+        futimens(opened.get(), when.data());
+    }
+    madeFolders_.clear();
+}
+
+}  // namespace orvel::cgi

@@ -1,0 +1,78 @@
+// Unpacking of archives that anybody can have made.
+#ifndef ORVEL_CGI_OPERATION_UNPACK_H
+#define ORVEL_CGI_OPERATION_UNPACK_H
+
+#include <set>
+#include <string>
+#include <vector>
+
+#include "operation/conflict.h"
+#include "operation/item.h"
+#include "operation/progress.h"
+
+struct archive;
+struct archive_entry;
+
+namespace orvel::cgi {
+
+// What an archive may come to. Settings "extract_max_ratio" (bytes for each byte of the archive, 200; archives that
+// come to less than 64 MiB are never measured by it), "extract_max_size" (MiB, 1048576) and "extract_max_members"
+// (1000000).
+struct UnpackLimits {
+    long long bytes, members;
+    static UnpackLimits of(long long archiveSize);
+};
+
+// Unpacks zip and tar, these also compressed as a whole, into one folder. Nothing of a member's name or of links in the
+// folder leads out of it; a member appears under its name whole or not at all. What cannot be unpacked is reported,
+// each member for itself, and the rest goes on: names that lead out or may not be used, links that lead out, devices,
+// encrypted members. Names are the bytes that the archive has.
+class Unpacker {
+ public:
+    struct Target {
+        const Descriptor& folder;
+        std::string path;  // share-relative
+        Conflict conflict;
+        Owner owner;
+    };
+    Unpacker(Progress& progress, const Target& target) : progress_(progress), target_(target) {}
+
+    // Unpacks the open file. 0, or the library code of why not all could be read: 1401 no archive, 1402 broken, 1007
+    // beyond the limits.
+    int run(int file, const UnpackLimits& limits);
+    // The names that were given in the folder.
+    [[nodiscard]] const std::set<std::string>& names() const { return names_; }
+    [[nodiscard]] long long bytes() const { return bytes_; }
+
+ private:
+    struct Member;
+    struct MadeFolder {
+        std::string path;  // below the target
+        mode_t mode;
+        timespec modified;
+    };
+
+    int readAll(archive* source);
+    void take(archive* source, archive_entry* entry);
+    int place(archive* source, Member& member);
+    int enter(const std::vector<std::string>& folders, Descriptor& folder);
+    int makeFolder(const Member& member);
+    int makeFile(archive* source, Member& member);
+    int makeLink(Member& member);
+    int makeHardLink(Member& member);
+    int fill(archive* source, const Member& member, int file);
+    int nameIt(Member& member, bool (*give)(void* what, const std::string& name, bool replace), void* what);
+    void finishFolders();
+
+    Progress& progress_;
+    Target target_;
+    UnpackLimits limits_{};
+    std::set<std::string> names_;
+    std::vector<MadeFolder> madeFolders_;
+    long long bytes_ = 0, members_ = 0, consumed_ = 0;
+    bool exceeded_ = false, torn_ = false;
+};
+
+}  // namespace orvel::cgi
+
+#endif
