@@ -1,30 +1,11 @@
 // Users and groups: from the system root's files and from NSS, remembered and read again, lists and applications.
 #include <grp.h>
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
-#include <ctime>
-#include <filesystem>
-#include <string>
-#include <vector>
 
 #include "application_list.h"
-#include "fault_gate.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
-#include "vexo/list.h"
+#include "support/testing.h"
 #include "vexo/user.h"
 
 namespace {
-
-namespace fs = std::filesystem;
-using support::kAdminGid;
-using support::kAliceUid;
-using support::kBobUid;
-using support::kCarolUid;
-using support::kUsersGid;
 
 // "name uid gid type home expiry", or "" with the platform error.
 std::string textOf(int result, PVEXOUSER user) {
@@ -99,7 +80,7 @@ bool isIn(const char* user, const std::vector<const char*>& entries) {
     return in;
 }
 
-class AccountTest : public support::ApplianceTest {};
+class AccountTest : public ApplianceTest {};
 
 TEST_F(AccountTest, RecordsOfEveryKind) {
     const std::string longest(511, 'y');
@@ -113,27 +94,21 @@ TEST_F(AccountTest, RecordsOfEveryKind) {
     addGroup("DOM\\staff", 20160, {});
     writeRootFile("/etc/shadow", "alice:x:1:0:9:7::20000:\nbob:x:1:0:9:7:::\nDOM\\dora:x:::::::\n");
     const std::string homes = shareRoot("homes");
-    const struct {
-        const char* name;
-        uid_t uid;
-        gid_t gid;
-        std::string rest;
-    } cases[] = {
-        {"alice", kAliceUid, kUsersGid, "0 " + homes + "/alice 20000"},
-        {"bob", kBobUid, kUsersGid, "0 " + homes + "/bob -1"},
-        {"carol", kCarolUid, kUsersGid, "0 " + homes + "/carol -1"},
-        {"DOM\\dora", 20010, 20100, "1 " + homes + "/@DOM/dora -1"},
-        {"dan@example.com", 20011, 20101, "2 " + homes + "/dan@example.com -1"},
-    };
-    for (const auto& c : cases) {
+    for (const auto& [name, uid, gid, rest] : Rows<const char*, uid_t, gid_t, std::string>{
+             {"alice", kAliceUid, kUsersGid, "0 " + homes + "/alice 20000"},
+             {"bob", kBobUid, kUsersGid, "0 " + homes + "/bob -1"},
+             {"carol", kCarolUid, kUsersGid, "0 " + homes + "/carol -1"},
+             {"DOM\\dora", 20010, 20100, "1 " + homes + "/@DOM/dora -1"},
+             {"dan@example.com", 20011, 20101, "2 " + homes + "/dan@example.com -1"},
+         }) {
         const std::string expected =
-            std::string(c.name) + ' ' + std::to_string(c.uid) + ' ' + std::to_string(c.gid) + ' ' + c.rest;
-        EXPECT_EQ(userOf(c.name), expected);
-        EXPECT_EQ(userOf(c.uid), expected);
-        uid_t uid = 0;
-        gid_t gid = 0;
-        EXPECT_EQ(VEXOUserGetUGID(c.name, &uid, &gid), 0);
-        EXPECT_TRUE(uid == c.uid && gid == c.gid);
+            std::string(name) + ' ' + std::to_string(uid) + ' ' + std::to_string(gid) + ' ' + rest;
+        EXPECT_EQ(userOf(name), expected);
+        EXPECT_EQ(userOf(uid), expected);
+        uid_t sameUid = 0;
+        gid_t sameGid = 0;
+        EXPECT_EQ(VEXOUserGetUGID(name, &sameUid, &sameGid), 0);
+        EXPECT_TRUE(sameUid == uid && sameGid == gid);
     }
     for (const char* name : {"nobody known", "", "a/b", "..", "\\dora", "DOM\\..", "ALICE"}) {
         uid_t uid = 5;
@@ -191,7 +166,7 @@ TEST_F(AccountTest, ChangedFilesAreReadAgain) {
     // An id that nobody has is looked for once, however many files it owns.
     EXPECT_EQ(userOf(20060), "");
     fs::rename(systemRoot() + "/etc/passwd", systemRoot() + "/etc/moved");
-    support::makeFolder(systemRoot() + "/etc/passwd");
+    makeFolder(systemRoot() + "/etc/passwd");
     EXPECT_EQ(userOf(20060), "");
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING) << "the files are not looked at";
     EXPECT_EQ(userOf("alice"), "");
@@ -205,7 +180,7 @@ TEST_F(AccountTest, ChangedFilesAreReadAgain) {
 TEST_F(AccountTest, UnreadableFilesAreAFailure) {
     SKIP_WITHOUT_ROOT();
     chmod((systemRoot() + "/etc/passwd").c_str(), 0600);
-    support::asUser(kBobUid, kUsersGid, [] {
+    asUser(kBobUid, kUsersGid, [] {
         for (const char* name : {"root", "nobody known"}) {
             EXPECT_EQ(userOf(name), "");
             EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_GENERAL);
@@ -237,14 +212,14 @@ TEST_F(AccountTest, ExpiryIsReadAsRootAfterTheSwitch) {
     SKIP_WITHOUT_ROOT();
     writeRootFile("/etc/shadow", "alice:x:1:0:9:7::77:\n");
     chmod((systemRoot() + "/etc/shadow").c_str(), 0600);
-    support::inChild([] {
+    inChild([] {
         if (setegid(kUsersGid) != 0 || seteuid(kBobUid) != 0) return 1;
         EXPECT_TRUE(userOf("alice").ends_with(" 77"));
         EXPECT_EQ(geteuid(), uid_t{kBobUid});
         EXPECT_EQ(getegid(), gid_t{kUsersGid});
         return 0;
     });
-    support::asUser(kBobUid, kUsersGid, [] {
+    asUser(kBobUid, kUsersGid, [] {
         EXPECT_TRUE(userOf("alice").ends_with(" -1")) << "unknown without the right to look";
         return 0;
     });
@@ -256,25 +231,26 @@ TEST_F(AccountTest, ExpiryIsReadAsRootAfterTheSwitch) {
 TEST_F(AccountTest, Administrators) {
     addGroup("Managers", 20180, {"bob"});
     addUser("primary", 20014, kAdminGid);
-    const struct {
-        const char *user, *group;
-        int answer;
-    } cases[] = {{"alice", nullptr, 0},         {"carol", nullptr, 1},  {"primary", nullptr, 1},
-                 {"nobody known", nullptr, -1}, {nullptr, nullptr, -1}, {"bob", "Managers", 1},
-                 {"carol", "Managers", 0},      {"carol", "no such", 0}};
-    for (const auto& c : cases) {
-        if (c.group != nullptr) setSetting("admin_group", c.group);
-        EXPECT_EQ(VEXOGroupIsAdminGroupMem(c.user), c.answer) << testing::PrintToString(c.user);
-        EXPECT_EQ(VEXOGroupIsAdminGroupMemEx(c.user, 1), c.answer);
-        const int code = c.user != nullptr ? VEXO_ERR_USER_MISSING : VEXO_ERR_PARAMETER;
-        EXPECT_TRUE(c.answer >= 0 || VLIBCErrGet() == code);
+    for (const auto& [user, group, answer] : Rows<const char*, const char*, int>{{"alice", nullptr, 0},
+                                                                                 {"carol", nullptr, 1},
+                                                                                 {"primary", nullptr, 1},
+                                                                                 {"nobody known", nullptr, -1},
+                                                                                 {nullptr, nullptr, -1},
+                                                                                 {"bob", "Managers", 1},
+                                                                                 {"carol", "Managers", 0},
+                                                                                 {"carol", "no such", 0}}) {
+        if (group != nullptr) setSetting("admin_group", group);
+        EXPECT_EQ(VEXOGroupIsAdminGroupMem(user), answer) << testing::PrintToString(user);
+        EXPECT_EQ(VEXOGroupIsAdminGroupMemEx(user, 1), answer);
+        const int code = user != nullptr ? VEXO_ERR_USER_MISSING : VEXO_ERR_PARAMETER;
+        EXPECT_TRUE(answer >= 0 || VLIBCErrGet() == code);
     }
 }
 
 TEST_F(AccountTest, SupplementaryGroups) {
     SKIP_WITHOUT_ROOT();
     addGroup("a", 20170, {"alice"});
-    support::inChild([] {
+    inChild([] {
         EXPECT_EQ(VEXOUserInitGroups("alice", 777), 0);
         gid_t gids[16];
         const int count = getgroups(16, gids);
@@ -283,7 +259,7 @@ TEST_F(AccountTest, SupplementaryGroups) {
         EXPECT_EQ(getgroups(16, gids), 1);
         return 0;
     });
-    support::asUser(kBobUid, kUsersGid, [] {
+    asUser(kBobUid, kUsersGid, [] {
         EXPECT_EQ(VEXOUserInitGroups("alice", 0), -1);
         EXPECT_EQ(errno, EPERM);
         return 0;
@@ -294,26 +270,22 @@ TEST_F(AccountTest, Lists) {
     addUser("DOM\\dora", 20010, 20190);
     addGroup("DOM\\Domain Users", 20190, {});
     addGroup("Users", 20191, {});
-    const struct {
-        const char* user;
-        std::vector<const char*> entries;
-        bool isIn;
-    } cases[] = {
-        {"alice", {"bob", "ALICE"}, true},
-        {"alice", {"alic", "alicex", "", "@", "+&", "*alice", "@alice", "users"}, false},
-        {"alice", {"*"}, true},
-        {"", {"*", ""}, false},
-        {"\xC3\x89RIC", {"\xC3\xA9ric"}, true},
-        {"alice", {"+&users"}, true},
-        {"alice", {"@USERS"}, true},   // no group has this very spelling
-        {"alice", {"@Users"}, false},  // one has, and alice is not in it
-        {"nobody known", {"@users"}, false},
-        {"nobody known", {"nobody known"}, true},
-        {"DOM\\dora", {"dom\\DORA"}, true},
-        {"DOM\\dora", {"dora"}, false},
-        {"DOM\\dora", {"@dom\\domain users"}, true},
-    };
-    for (const auto& c : cases) EXPECT_EQ(isIn(c.user, c.entries), c.isIn) << c.user << ": " << c.entries.front();
+    for (const auto& [user, entries, expected] : Rows<const char*, std::vector<const char*>, bool>{
+             {"alice", {"bob", "ALICE"}, true},
+             {"alice", {"alic", "alicex", "", "@", "+&", "*alice", "@alice", "users"}, false},
+             {"alice", {"*"}, true},
+             {"", {"*", ""}, false},
+             {"\xC3\x89RIC", {"\xC3\xA9ric"}, true},
+             {"alice", {"+&users"}, true},
+             {"alice", {"@USERS"}, true},   // no group has this very spelling
+             {"alice", {"@Users"}, false},  // one has, and alice is not in it
+             {"nobody known", {"@users"}, false},
+             {"nobody known", {"nobody known"}, true},
+             {"DOM\\dora", {"dom\\DORA"}, true},
+             {"DOM\\dora", {"dora"}, false},
+             {"DOM\\dora", {"@dom\\domain users"}, true},
+         })
+        EXPECT_EQ(isIn(user, entries), expected) << user << ": " << entries.front();
 }
 
 TEST_F(AccountTest, Applications) {
@@ -324,23 +296,26 @@ TEST_F(AccountTest, Applications) {
     EXPECT_EQ(list.malformed, (std::vector<int>{6, 7}));
     EXPECT_EQ(VLIBUserPrivilegeHas("alice", "any"), 1) << "no file";
     writeRootFile("/etc/vexo/applications", "files: alice @administrators\nnobodys:\nforgotten bob\n");
-    support::announceLog("line 3 of /etc/vexo/applications has no \"identifier:\"");
-    const struct {
-        const char *user, *application;
-        int answer;
-    } cases[] = {
-        {"alice", "files", 1}, {"carol", "files", 1},   {"bob", "files", 0},     {"bob", "other", 1},
-        {"bob", "FILES", 1},   {"alice", "nobodys", 0}, {"bob", "forgotten", 0}, {"", "other", 0},
-        {nullptr, "other", 0}, {"alice", nullptr, 0},
-    };
-    for (const auto& c : cases) {
-        EXPECT_EQ(VLIBUserPrivilegeHas(c.user, c.application), c.answer)
-            << testing::PrintToString(c.user) << testing::PrintToString(c.application);
+    announceLog("line 3 of /etc/vexo/applications has no \"identifier:\"");
+    for (const auto& [user, application, answer] : Rows<const char*, const char*, int>{
+             {"alice", "files", 1},
+             {"carol", "files", 1},
+             {"bob", "files", 0},
+             {"bob", "other", 1},
+             {"bob", "FILES", 1},
+             {"alice", "nobodys", 0},
+             {"bob", "forgotten", 0},
+             {"", "other", 0},
+             {nullptr, "other", 0},
+             {"alice", nullptr, 0},
+         }) {
+        EXPECT_EQ(VLIBUserPrivilegeHas(user, application), answer)
+            << testing::PrintToString(user) << testing::PrintToString(application);
     }
     writeRootFile("/etc/vexo/applications", "files: bob\n");
     EXPECT_EQ(VLIBUserPrivilegeHas("bob", "files"), 1);
     fs::remove(systemRoot() + "/etc/vexo/applications");
-    support::makeFolder(systemRoot() + "/etc/vexo/applications");
+    makeFolder(systemRoot() + "/etc/vexo/applications");
     EXPECT_EQ(VLIBUserPrivilegeHas("bob", "files"), 0) << "what cannot be read allows nothing";
 }
 

@@ -2,35 +2,19 @@
 // identities, folders, modes, owners and ACLs.
 #include "vexo/acl.h"
 
-#include <fcntl.h>
 #include <grp.h>
-#include <gtest/gtest.h>
 #include <linux/capability.h>
 #include <linux/fs.h>
 #include <sys/ioctl.h>
-#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/xattr.h>
-#include <unistd.h>
-
-#include <cerrno>
-#include <cstring>
-#include <functional>
-#include <string>
-#include <vector>
 
 #include "acl_rules.h"
 #include "file_io.h"
 #include "platform/private_mounts.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
-
-using support::kAliceUid;
-using support::kBobUid;
-using support::kCarolUid;
-using support::kUsersGid;
 
 // An entry of an ACL as the kernel stores it behind a 4-byte version.
 struct AclEntry {
@@ -67,7 +51,7 @@ bool become(const Acting& who) {
     return syscall(SYS_capset, &header, data) == 0;
 }
 
-class AclTest : public support::ApplianceTest {
+class AclTest : public ApplianceTest {
  protected:
     unsigned byPath(const std::string& path) {
         unsigned permission = 0xFFFF;
@@ -127,7 +111,7 @@ std::vector<std::string> AclTest::fill(const std::string& folder) {
             {{kOwnerTag, bits(6)},
              {kUserTag, 0, kCarolUid},
              {kGroupObjectTag, 7},
-             {kGroupTag, 5, support::kAdminGid},
+             {kGroupTag, 5, kAdminGid},
              {kMaskTag, 7},
              {kOtherTag, bits(0)}}};
         for (const uid_t owner : {uid_t{0}, uid_t{kAliceUid}, uid_t{kBobUid}}) {
@@ -135,7 +119,7 @@ std::vector<std::string> AclTest::fill(const std::string& folder) {
                 const bool isFolder = (names.size() & 1) != 0;
                 names.push_back(std::to_string(names.size()));
                 const std::string path = folder + "/" + names.back();
-                isFolder ? support::makeFolder(path) : support::writeFile(path, "#!/bin/sh\n");
+                isFolder ? makeFolder(path) : writeFile(path, "#!/bin/sh\n");
                 EXPECT_EQ(chown(path.c_str(), owner, kUsersGid), 0);
                 EXPECT_TRUE(acl.empty() ? chmod(path.c_str(), mode) == 0 : setAcl(path, acl));
             }
@@ -152,7 +136,7 @@ TEST_F(AclTest, FolderFormAgreesWithTheKernelAndWithTheDeed) {
         {"alice", kAliceUid, 1, {}, kAsIds},
         {"bob of the group", kBobUid, kUsersGid, {kUsersGid}, kAsIds},
         {"carol, named in ACLs", kCarolUid, 1, {1}, kAsIds},
-        {"carol of both groups", kCarolUid, 1, {kUsersGid, support::kAdminGid}, kAsIds},
+        {"carol of both groups", kCarolUid, 1, {kUsersGid, kAdminGid}, kAsIds},
         {"a stranger", 29999, 29999, {}, kAsIds},
         {"a stranger who reads all", 29999, 29999, {}, 1U << CAP_DAC_READ_SEARCH},
         {"a stranger who overrides", 29999, 29999, {}, 1U << CAP_DAC_OVERRIDE},
@@ -172,13 +156,13 @@ TEST_F(AclTest, FolderFormAgreesWithTheKernelAndWithTheDeed) {
     std::vector<std::string> names;
     for (const auto& folder : folders) {
         const std::string path = root_ + "/" + folder.name;
-        support::makeFolder(path);
+        makeFolder(path);
         names = fill(path);
         ASSERT_EQ(chown(path.c_str(), folder.owner, kUsersGid), 0);
         ASSERT_EQ(chmod(path.c_str(), folder.mode), 0);
     }
     for (const Acting& who : identities) {
-        const int result = support::inChild([&] {
+        const int result = inChild([&] {
             if (!become(who)) return 97;
             for (const auto& folder : folders) {
                 SCOPED_TRACE(std::string(who.name) + " in " + folder.name);
@@ -192,11 +176,11 @@ TEST_F(AclTest, FolderFormAgreesWithTheKernelAndWithTheDeed) {
 
 TEST_F(AclTest, AttributesAndMountsJudgeToo) {
     SKIP_WITHOUT_ROOT();
-    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
         std::vector<std::string> names;
         for (const char* name : {"read-only", "no-execute", "bound"}) {
             const std::string folder = root_ + "/" + name;
-            support::makeFolder(folder, 0777);
+            makeFolder(folder, 0777);
             EXPECT_EQ(mount("none", folder.c_str(), "tmpfs", 0, "size=4m,mode=0777"), 0);
             names = fill(folder);
         }
@@ -204,7 +188,7 @@ TEST_F(AclTest, AttributesAndMountsJudgeToo) {
         EXPECT_EQ(mount("none", (root_ + "/no-execute").c_str(), nullptr, MS_REMOUNT | MS_NOEXEC, nullptr), 0);
         // A folder of the same device whose mount is read-only while the one around it is not.
         const std::string inner = root_ + "/bound/inner";
-        support::makeFolder(inner, 0777);
+        makeFolder(inner, 0777);
         EXPECT_EQ(mount(inner.c_str(), inner.c_str(), nullptr, MS_BIND, nullptr), 0);
         EXPECT_EQ(mount("none", inner.c_str(), nullptr, MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
         EXPECT_EQ(byPath(inner) & VEXO_ACL_WRITE, 0U);
@@ -230,9 +214,9 @@ TEST_F(AclTest, ImmutableAndAppendOnly) {
         return ioctl(fd.get(), FS_IOC_SETFLAGS, &flags) == 0;
     };
     const std::vector<std::string> names = {"plain", "fixed", "growing"};
-    for (const std::string& name : names) support::writeFile(root_ + "/" + name, "", 0666);
-    support::makeFolder(root_ + "/log", 0777);
-    support::writeFile(root_ + "/log/plain", "", 0666);
+    for (const std::string& name : names) writeFile(root_ + "/" + name, "", 0666);
+    makeFolder(root_ + "/log", 0777);
+    writeFile(root_ + "/log/plain", "", 0666);
     if (!mark(root_ + "/fixed", FS_IMMUTABLE_FL)) GTEST_SKIP() << "no immutable files here: " << strerror(errno);
     EXPECT_TRUE(mark(root_ + "/growing", FS_APPEND_FL));
     EXPECT_TRUE(mark(root_ + "/log", FS_APPEND_FL));
@@ -270,25 +254,19 @@ TEST_F(AclTest, FailuresAndOddPaths) {
     ASSERT_EQ(symlink("gone", (root_ + "/dangling").c_str()), 0);
     ASSERT_EQ(symlink("a", (root_ + "/link").c_str()), 0);
     ASSERT_EQ(symlink("loop", (root_ + "/loop").c_str()), 0);
-    support::writeFile(root_ + "/a", "", 0444);
-    const struct {
-        std::string path;
-        int systemCode, code;
-    } cases[] = {{root_ + "/missing", ENOENT, VEXO_ERR_MISSING},
-                 {root_ + "/a/below", ENOTDIR, VEXO_ERR_MISSING},
-                 {root_ + "/dangling", ENOENT, VEXO_ERR_ACL_TARGET_MISSING},
-                 {root_ + "/loop", ELOOP, VEXO_ERR_GENERAL}};
-    for (const auto& c : cases) {
+    writeFile(root_ + "/a", "", 0444);
+    for (const auto& [path, systemCode, code] :
+         Rows<std::string, int, int>{{root_ + "/missing", ENOENT, VEXO_ERR_MISSING},
+                                     {root_ + "/a/below", ENOTDIR, VEXO_ERR_MISSING},
+                                     {root_ + "/dangling", ENOENT, VEXO_ERR_ACL_TARGET_MISSING},
+                                     {root_ + "/loop", ELOOP, VEXO_ERR_GENERAL}}) {
         unsigned permission = 0;
-        VLIBCErrSetEx(0, "", 0);
-        EXPECT_LT(VEXOACLPermGet(c.path.c_str(), &permission), 0) << c.path;
-        EXPECT_EQ(errno, c.systemCode);
-        EXPECT_EQ(VLIBCErrGet(), c.code);
+        EXPECT_FAILS(VEXOACLPermGet(path.c_str(), &permission), systemCode, code);
     }
-    support::makeFolder(root_ + "/closed", 0700);  // denied is no failure
-    support::writeFile(root_ + "/closed/b", "", 0666);
+    makeFolder(root_ + "/closed", 0700);  // denied is no failure
+    writeFile(root_ + "/closed/b", "", 0666);
     if (geteuid() == 0) {
-        EXPECT_EQ(support::asUser(kAliceUid, kUsersGid, [&] { return int(byPath(root_ + "/closed/b")); }), 0);
+        EXPECT_EQ(asUser(kAliceUid, kUsersGid, [&] { return int(byPath(root_ + "/closed/b")); }), 0);
     }
     errno = 0;
     for (const char* never : {"/", "/..", "."}) EXPECT_EQ(byPath(never) & VEXO_ACL_DELETE, 0U) << never;
@@ -301,7 +279,7 @@ TEST_F(AclTest, FailuresAndOddPaths) {
 }
 
 TEST_F(AclTest, SupportIsAskedOncePerDevice) {
-    support::writeFile(root_ + "/a", "");
+    writeFile(root_ + "/a", "");
     _tag_VEXOSTAT_ status;
     ASSERT_EQ(VLIBCFileLStat((root_ + "/a").c_str(), 1, &status), 0);
     const bool kept = getxattr((root_ + "/a").c_str(), "system.posix_acl_access", nullptr, 0) >= 0 || errno == ENODATA;

@@ -1,38 +1,20 @@
 // Copies: whole or not at all, by every way, refused with the right number.
 #include "vexo/copy.h"
 
-#include <fcntl.h>
-#include <gtest/gtest.h>
 #include <sys/mount.h>
 #include <sys/resource.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
 #include <sys/xattr.h>
-#include <unistd.h>
 
-#include <cerrno>
 #include <csignal>
-#include <cstring>
-#include <filesystem>
-#include <functional>
 #include <random>
 #include <set>
-#include <string>
-#include <vector>
 
 #include "platform/private_mounts.h"
 #include "platform/refuse_calls.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
-
-namespace fs = std::filesystem;
-using support::inChild;
-using support::kAliceUid;
-using support::kUsersGid;
-using support::readFile;
-using support::writeFile;
 
 constexpr size_t kBig = (size_t{4} << 20) + 1;  // two pieces
 constexpr const char* kSource = "from/source";
@@ -54,14 +36,8 @@ VEXOCOPYOPT options(unsigned switches, int question = 0, int (*event)() = nullpt
     return {static_cast<uid_t>(-1), static_cast<gid_t>(-1), event != nullptr ? ask : nullptr, switches};
 }
 
-struct stat statusOf(const std::string& path) {
-    struct stat status {};
-    EXPECT_EQ(lstat(path.c_str(), &status), 0) << path;
-    return status;
-}
-
 // The tests' working directory is a share's root.
-class CopyTest : public support::ApplianceTest {
+class CopyTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -70,7 +46,7 @@ class CopyTest : public support::ApplianceTest {
         std::string noise(kBig, ' ');
         for (char& c : noise) c = static_cast<char>(generator());
         writeFile(kSource, noise);
-        support::makeFolder("in", 0777);
+        makeFolder("in", 0777);
     }
     static std::set<std::string> names() {
         std::set<std::string> found;
@@ -85,10 +61,7 @@ class CopyTest : public support::ApplianceTest {
                               const std::string& target = kTarget) {
         SCOPED_TRACE(source + " -> " + target);
         const auto before = names();
-        VLIBCErrSetEx(0, "", 0);
-        EXPECT_EQ(copy(with, source.c_str(), target.c_str()), -1);
-        EXPECT_EQ(errno, systemCode) << strerror(errno);
-        EXPECT_EQ(VLIBCErrGet(), code);
+        EXPECT_FAILS(copy(with, source.c_str(), target.c_str()), systemCode, code);
         EXPECT_EQ(names(), before);
     }
 };
@@ -117,14 +90,14 @@ int dies() {
     return raise(SIGKILL);
 }
 
-const support::Refusal kNoNameless{SYS_openat, EOPNOTSUPP, 2, O_TMPFILE & ~O_DIRECTORY};
-const support::Refusal kNoClone{SYS_ioctl, EOPNOTSUPP};
-const support::Refusal kNoKernelCopy{SYS_copy_file_range, EXDEV};
-const support::Refusal kNoExclusiveRename{SYS_renameat2, EINVAL, 4, 1};
+const Refusal kNoNameless{SYS_openat, EOPNOTSUPP, 2, O_TMPFILE & ~O_DIRECTORY};
+const Refusal kNoClone{SYS_ioctl, EOPNOTSUPP};
+const Refusal kNoKernelCopy{SYS_copy_file_range, EXDEV};
+const Refusal kNoExclusiveRename{SYS_renameat2, EINVAL, 4, 1};
 
 // Runs `body` in a child whose kernel refuses these calls.
-void withRefusals(const std::vector<support::Refusal>& refusals, const std::function<void()>& body) {
-    EXPECT_EQ(inChild([&] { return support::refuseCalls(refusals) ? (body(), 0) : 97; }), 0);
+void withRefusals(const std::vector<Refusal>& refusals, const std::function<void()>& body) {
+    EXPECT_EQ(inChild([&] { return refuseCalls(refusals) ? (body(), 0) : 97; }), 0);
 }
 
 TEST_F(CopyTest, TheTargetIsANewFileOfTheGivenOwner) {
@@ -221,48 +194,44 @@ TEST_F(CopyTest, SourcesAndTargetsThatAreRefused) {
     const std::string source = kSource;
     writeFile("in/old", "old");
     for (const std::string folder : {"from", "in"}) {
-        support::makeFolder(folder + "/folder");
+        makeFolder(folder + "/folder");
         fs::create_symlink("old", folder + "/link");
         ASSERT_EQ(mkfifo((folder + "/pipe").c_str(), 0666), 0);
     }
     fs::create_hard_link(source, "in/same");
     addMount(in, "vfat");
-    const struct {
-        std::string source, target;
-        unsigned switches;
-        int code, systemCode;
-    } cases[] = {
-        {"from/missing", "in/a", 1, VEXO_ERR_MISSING, ENOENT},
-        {"from/folder", "in/a", 1, VEXO_ERR_BAD_PATH, EISDIR},
-        {"from/link", "in/a", 1, VEXO_ERR_BAD_PATH, ELOOP},
-        {"from/pipe", "in/a", 1, VEXO_ERR_BAD_PATH, EINVAL},
-        {"/dev/null", "in/a", 1, VEXO_ERR_BAD_PATH, EINVAL},
-        {source + "/a", "in/a", 1, VEXO_ERR_BAD_PATH, ENOTDIR},
-        {source, "nowhere/a", 1, VEXO_ERR_MISSING, ENOENT},
-        {source, source + "/a", 1, VEXO_ERR_BAD_PATH, ENOTDIR},
-        {source, "in/", 1, VEXO_ERR_BAD_PATH, EINVAL},
-        {source, "in/..", 1, VEXO_ERR_BAD_PATH, EINVAL},
-        {source, "in/same", 1, VEXO_ERR_EXISTS, EEXIST},
-        {source, "in/old", 0, VEXO_ERR_TARGET_EXISTS, EEXIST},
-        {source, "in/folder", 1, VEXO_ERR_TARGET_EXISTS_OTHER, EEXIST},
-        {source, "in/link", 1, VEXO_ERR_TARGET_EXISTS_OTHER, EEXIST},
-        {source, "in/pipe", 0, VEXO_ERR_TARGET_EXISTS_OTHER, EEXIST},
-        {source, "in/" + std::string(256, 'n'), 1, VEXO_ERR_NAME_TOO_LONG, ENAMETOOLONG},
-        {source, in + "/what?", 1, VEXO_ERR_FAT_NAME, EINVAL},
-        {"", "in/a", 1, VEXO_ERR_PARAMETER, EINVAL},
-        {source, "", 1, VEXO_ERR_PARAMETER, EINVAL},
-    };
-    for (const auto& c : cases) expectFailure(options(c.switches), c.code, c.systemCode, c.source, c.target);
+    for (const auto& [from, to, switches, code, systemCode] : Rows<std::string, std::string, unsigned, int, int>{
+             {"from/missing", "in/a", 1, VEXO_ERR_MISSING, ENOENT},
+             {"from/folder", "in/a", 1, VEXO_ERR_BAD_PATH, EISDIR},
+             {"from/link", "in/a", 1, VEXO_ERR_BAD_PATH, ELOOP},
+             {"from/pipe", "in/a", 1, VEXO_ERR_BAD_PATH, EINVAL},
+             {"/dev/null", "in/a", 1, VEXO_ERR_BAD_PATH, EINVAL},
+             {source + "/a", "in/a", 1, VEXO_ERR_BAD_PATH, ENOTDIR},
+             {source, "nowhere/a", 1, VEXO_ERR_MISSING, ENOENT},
+             {source, source + "/a", 1, VEXO_ERR_BAD_PATH, ENOTDIR},
+             {source, "in/", 1, VEXO_ERR_BAD_PATH, EINVAL},
+             {source, "in/..", 1, VEXO_ERR_BAD_PATH, EINVAL},
+             {source, "in/same", 1, VEXO_ERR_EXISTS, EEXIST},
+             {source, "in/old", 0, VEXO_ERR_TARGET_EXISTS, EEXIST},
+             {source, "in/folder", 1, VEXO_ERR_TARGET_EXISTS_OTHER, EEXIST},
+             {source, "in/link", 1, VEXO_ERR_TARGET_EXISTS_OTHER, EEXIST},
+             {source, "in/pipe", 0, VEXO_ERR_TARGET_EXISTS_OTHER, EEXIST},
+             {source, "in/" + std::string(256, 'n'), 1, VEXO_ERR_NAME_TOO_LONG, ENAMETOOLONG},
+             {source, in + "/what?", 1, VEXO_ERR_FAT_NAME, EINVAL},
+             {"", "in/a", 1, VEXO_ERR_PARAMETER, EINVAL},
+             {source, "", 1, VEXO_ERR_PARAMETER, EINVAL},
+         })
+        expectFailure(options(switches), code, systemCode, from, to);
     EXPECT_EQ(readFile("in/old"), "old");
     EXPECT_EQ(copy(options(0), kSource, (fs::current_path() / "what?").c_str()), 0) << "not on FAT";
 }
 
 TEST_F(CopyTest, EachWayGivesTheSameAndLeavesNothing) {
-    const std::vector<support::Refusal> ways[] = {{},
-                                                  {kNoClone},
-                                                  {kNoClone, kNoKernelCopy},
-                                                  {kNoNameless},
-                                                  {kNoNameless, kNoExclusiveRename, kNoClone, kNoKernelCopy}};
+    const std::vector<Refusal> ways[] = {{},
+                                         {kNoClone},
+                                         {kNoClone, kNoKernelCopy},
+                                         {kNoNameless},
+                                         {kNoNameless, kNoExclusiveRename, kNoClone, kNoKernelCopy}};
     for (const auto& refusals : ways) {
         SCOPED_TRACE(&refusals - ways);
         withRefusals(refusals, [&] {
@@ -316,7 +285,7 @@ TEST_F(CopyTest, AKilledCopyLeavesTheTargetAsItWas) {
         SCOPED_TRACE(nameless);
         const pid_t child = fork();
         if (child == 0) {
-            support::refuseCalls(nameless ? std::vector{kNoClone} : std::vector{kNoClone, kNoNameless});
+            refuseCalls(nameless ? std::vector{kNoClone} : std::vector{kNoClone, kNoNameless});
             _exit(copy(options(VEXO_COPY_OVERWRITE, 2, dies)));
         }
         int status = 0;
@@ -337,7 +306,7 @@ TEST_F(CopyTest, AKilledCopyLeavesTheTargetAsItWas) {
 
 TEST_F(CopyTest, FailuresOfTheFileSystem) {
     const struct {
-        support::Refusal refusal;
+        Refusal refusal;
         int code;
     } cases[] = {{{SYS_copy_file_range, EDQUOT}, VEXO_ERR_QUOTA},
                  {{SYS_copy_file_range, ENOSPC}, VEXO_ERR_NO_SPACE},
@@ -358,7 +327,7 @@ TEST_F(CopyTest, FailuresOfTheFileSystem) {
 
 TEST_F(CopyTest, FullAndReadOnlyFileSystems) {
     SKIP_WITHOUT_ROOT();
-    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
         EXPECT_EQ(mount("none", "in", "tmpfs", 0, "size=2m,mode=0777"), 0);
         expectFailure(options(0), VEXO_ERR_NO_SPACE, ENOSPC);
         writeFile(kTarget, "old");
@@ -376,7 +345,7 @@ TEST_F(CopyTest, FullAndReadOnlyFileSystems) {
 TEST_F(CopyTest, DeniedToTheUser) {
     SKIP_WITHOUT_ROOT();
     writeFile("from/private", "secret", 0600);
-    support::makeFolder("closed", 0755);
+    makeFolder("closed", 0755);
     VEXOCOPYOPT own = options(VEXO_COPY_OVERWRITE);
     own.uid = kAliceUid;
     own.gid = kUsersGid;
@@ -384,12 +353,12 @@ TEST_F(CopyTest, DeniedToTheUser) {
         expectFailure(options(0), VEXO_ERR_DENIED, EACCES, "from/private");
         expectFailure(options(0), VEXO_ERR_DENIED, EACCES, kSource, "closed/a");
         VEXOCOPYOPT toBob = own;
-        toBob.uid = support::kBobUid;
+        toBob.uid = kBobUid;
         expectFailure(toBob, VEXO_ERR_DENIED, EPERM);
         for (int time = 0; time < 2; ++time) EXPECT_EQ(copy(own), 0);
         return 0;
     };
-    EXPECT_EQ(support::asUser(kAliceUid, kUsersGid, body), 0);
+    EXPECT_EQ(asUser(kAliceUid, kUsersGid, body), 0);
     EXPECT_EQ(statusOf(kTarget).st_uid, kAliceUid);
 }
 

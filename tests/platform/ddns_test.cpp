@@ -1,14 +1,11 @@
 // Dynamic-DNS entries by provider.
 #include "vexo/ddns.h"
 
-#include <gtest/gtest.h>
-
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
-class DdnsTest : public support::ApplianceTest {};
+class DdnsTest : public ApplianceTest {};
 
 TEST_F(DdnsTest, EntriesByProvider) {
     VEXODDNS entry;
@@ -19,22 +16,18 @@ TEST_F(DdnsTest, EntriesByProvider) {
                   "[here.example]\r\nuser=\"u\"\r\nhostname=\"box.here.example\"\r\n"
                   "# [commented]\nhostname=\"second.is.ignored\"\n"
                   "[there]\nuser=\"nobody\"\n[link]\nhostname=\"a/b@c\"\n[last]\nhostname=last.example");
-    const struct {
-        const char* provider;
-        const char* host;
-    } cases[] = {{"here.example", "box.here.example"},
-                 {"last", "last.example"},
-                 {"Here.Example", nullptr},
-                 {"there", nullptr},
-                 {"link", nullptr},
-                 {"missing", nullptr},
-                 {"", nullptr}};
-    for (const auto& c : cases) {
-        SCOPED_TRACE(c.provider);
-        EXPECT_EQ(VEXODDNSConfigGet(c.provider, &entry) >= 0, c.host != nullptr);
-        EXPECT_STREQ(entry.szHostname, c.host != nullptr ? c.host : "");
-        EXPECT_STREQ(entry.szProvider, c.host != nullptr ? c.provider : "");
-        if (c.host == nullptr) {
+    for (const auto& [provider, host] : Rows<const char*, const char*>{{"here.example", "box.here.example"},
+                                                                       {"last", "last.example"},
+                                                                       {"Here.Example", nullptr},
+                                                                       {"there", nullptr},
+                                                                       {"link", nullptr},
+                                                                       {"missing", nullptr},
+                                                                       {"", nullptr}}) {
+        SCOPED_TRACE(provider);
+        EXPECT_EQ(VEXODDNSConfigGet(provider, &entry) >= 0, host != nullptr);
+        EXPECT_STREQ(entry.szHostname, host != nullptr ? host : "");
+        EXPECT_STREQ(entry.szProvider, host != nullptr ? provider : "");
+        if (host == nullptr) {
             EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_MISSING);
         }
     }

@@ -1,19 +1,8 @@
 // Shares of domain and directory users.
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-
-#include <cerrno>
-#include <string>
-
-#include "fault_gate.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 #include "vexo/share.h"
 
 namespace {
-
-using support::kBobUid;
-using support::kUsersGid;
 
 const struct Service {
     const char* user;
@@ -34,7 +23,7 @@ std::string joined(PVLIBCSZLIST list) {
     return out;
 }
 
-class DirectoryServiceTest : public support::ApplianceTest {
+class DirectoryServiceTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -101,7 +90,7 @@ TEST_F(DirectoryServiceTest, UsableShares) {
 TEST_F(DirectoryServiceTest, FailingLookups) {
     SKIP_WITHOUT_ROOT();
     chmod((systemRoot() + "/etc/group").c_str(), 0600);
-    support::asUser(kBobUid, kUsersGid, [] {
+    asUser(kBobUid, kUsersGid, [] {
         for (const Service& service : kServices) {
             int privilege = 7;
             EXPECT_EQ(service.privilege("all", service.user, "sid", &privilege), -2);

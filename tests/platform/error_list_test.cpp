@@ -1,22 +1,7 @@
 // The error slot, lists and hashes, and the fault gate that the other tests rely on.
-#include <gtest/gtest.h>
-
-#include <cerrno>
-#include <initializer_list>
-#include <string>
-
-#include "fault_gate.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
-#include "vexo/list.h"
+#include "support/testing.h"
 
 namespace {
-
-std::string joined(PVLIBCSZLIST list) {
-    std::string out;
-    for (int i = 0; i < list->nItem; ++i) out += std::string(VLIBCSzListGet(list, i)) + '|';
-    return out;
-}
 
 PVLIBCSZLIST listOf(std::initializer_list<const char*> texts) {
     PVLIBCSZLIST list = VLIBCSzListAlloc(-5);
@@ -24,7 +9,7 @@ PVLIBCSZLIST listOf(std::initializer_list<const char*> texts) {
     return list;
 }
 
-class PlatformBasics : public support::ApplianceTest {};
+class PlatformBasics : public ApplianceTest {};
 
 TEST_F(PlatformBasics, ErrorSlotKeepsTheLastFailure) {
     VLIBCErrSetEx(VEXO_ERR_DENIED, "somewhere", 7);

@@ -1,29 +1,17 @@
 // What the platform's files rely on: whole replacement, limits, trust, and knowing a version again.
 #include "file_io.h"
 
-#include <sys/stat.h>
-
-#include <ctime>
-#include <filesystem>
-#include <iterator>
-#include <string>
-
 #include "raise.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 
 namespace {
 
-using support::kAliceUid;
-using support::kUsersGid;
-using support::readFile;
-using support::writeFile;
-
-class FileIo : public support::ApplianceTest {
+class FileIo : public ApplianceTest {
  protected:
     static std::string path(const std::string& name) { return systemRoot() + "/files/" + name; }
     void SetUp() override {
         ApplianceTest::SetUp();
-        support::makeFolder(path(""), 0755);
+        makeFolder(path(""), 0755);
         writeFile(path("a"), "0123456789", 0600);
     }
     static struct stat statusOf(const std::string& name) {
@@ -52,18 +40,14 @@ TEST_F(FileIo, ReplaceIsWholeOrNothing) {
 
 TEST_F(FileIo, ReadStopsAtTheLimitAndAtAnythingButAFile) {
     ASSERT_EQ(mkfifo(path("pipe").c_str(), 0600), 0);
-    const struct {
-        const char* name;
-        size_t limit;
-        int systemCode;
-    } cases[] = {{"a", 10, 0}, {"a", 9, EFBIG}, {"pipe", 10, EINVAL}, {"none", 10, ENOENT}};
-    for (const auto& c : cases) {
+    for (const auto& [name, limit, systemCode] :
+         Rows<const char*, size_t, int>{{"a", 10, 0}, {"a", 9, EFBIG}, {"pipe", 10, EINVAL}, {"none", 10, ENOENT}}) {
         std::string text = "before";
         vexo::FileVersion version;
         errno = 0;
-        EXPECT_EQ(vexo::readRegularFile(path(c.name), c.limit, text, version), c.systemCode == 0);
-        EXPECT_EQ(errno, c.systemCode);
-        EXPECT_TRUE(c.systemCode != 0 || text == "0123456789");
+        EXPECT_EQ(vexo::readRegularFile(path(name), limit, text, version), systemCode == 0);
+        EXPECT_EQ(errno, systemCode);
+        EXPECT_TRUE(systemCode != 0 || text == "0123456789");
     }
 }
 
@@ -109,7 +93,7 @@ TEST_F(FileIo, AVersionIsKnownAgainUntilTheFileChanges) {
 
 TEST_F(FileIo, RaisedIdentityGoesBack) {
     SKIP_WITHOUT_ROOT();
-    support::inChild([] {
+    inChild([] {
         EXPECT_EQ(setresgid(kUsersGid, kUsersGid, 0), 0);
         EXPECT_EQ(setresuid(kAliceUid, kAliceUid, 0), 0);
         {

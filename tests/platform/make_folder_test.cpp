@@ -1,26 +1,13 @@
 // Folders made with their parents.
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
-#include <filesystem>
-#include <string>
-
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 #include "vexo/filesystem.h"
 
 namespace {
 
-namespace fs = std::filesystem;
-using support::kAliceUid;
-using support::kUsersGid;
-
 constexpr uid_t kKeepUser = static_cast<uid_t>(-1);
 constexpr gid_t kKeepGroup = static_cast<gid_t>(-1);
 
-class MakeFolderTest : public support::ApplianceTest {
+class MakeFolderTest : public ApplianceTest {
  protected:
     // "uid mode" of a folder.
     std::string textOf(const std::string& path) {
@@ -41,7 +28,7 @@ class MakeFolderTest : public support::ApplianceTest {
 
 TEST_F(MakeFolderTest, OwnerAndModeGoToWhatItMadeAlone) {
     SKIP_WITHOUT_ROOT();
-    support::makeFolder(root_ + "/old", 0711);
+    makeFolder(root_ + "/old", 0711);
     const mode_t before = umask(077);
     EXPECT_EQ(make("/old//new/deep/", kAliceUid, 0755), 0);
     umask(before);
@@ -49,37 +36,31 @@ TEST_F(MakeFolderTest, OwnerAndModeGoToWhatItMadeAlone) {
     EXPECT_EQ(textOf("/old"), expected(0, 0711));
     // Made already: success, and nothing changes.
     errno = 0;
-    EXPECT_EQ(make("/old/new", support::kBobUid, 0700), 0);
+    EXPECT_EQ(make("/old/new", kBobUid, 0700), 0);
     EXPECT_EQ(errno, 0);
     EXPECT_EQ(textOf("/old/new"), expected(kAliceUid, 0755));
-    support::makeFolder(root_ + "/team", 02775);
+    makeFolder(root_ + "/team", 02775);
     ASSERT_EQ(make("/team/new", kKeepUser, 0750, 0), 0);
     EXPECT_EQ(textOf("/team/new"), expected(0, 02750)) << "the set-group bit of its parent stays";
 }
 
 TEST_F(MakeFolderTest, RefusalsTellWhereTheyStopped) {
-    support::writeFile(root_ + "/file", "");
-    support::makeFolder(root_ + "/elsewhere");
+    writeFile(root_ + "/file", "");
+    makeFolder(root_ + "/elsewhere");
     fs::create_symlink(root_ + "/elsewhere/gone", root_ + "/dangling");
     fs::create_symlink(root_ + "/elsewhere", root_ + "/link");
     const std::string longName(256, 'n');
-    const struct {
-        std::string path;
-        int recursive, systemCode, code;
-    } cases[] = {
-        {"a/b/c", 0, ENOENT, VEXO_ERR_MISSING},
-        {"file/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
-        {"file", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
-        {"dangling/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
-        {longName, 1, ENAMETOOLONG, VEXO_ERR_NAME_TOO_LONG},
-    };
-    for (const auto& c : cases) {
+    for (const auto& [name, recursive, systemCode, code] : Rows<std::string, int, int, int>{
+             {"a/b/c", 0, ENOENT, VEXO_ERR_MISSING},
+             {"file/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
+             {"file", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
+             {"dangling/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
+             {longName, 1, ENAMETOOLONG, VEXO_ERR_NAME_TOO_LONG},
+         }) {
         const char* stopAt = "";
-        const std::string path = root_ + "/" + c.path;
-        EXPECT_LT(VEXOFSMkdirP(path.c_str(), &stopAt, c.recursive, kKeepUser, kKeepGroup, 0755), 0) << path;
-        EXPECT_EQ(errno, c.systemCode);
-        EXPECT_EQ(VLIBCErrGet(), c.code);
-        EXPECT_EQ(stopAt, c.path);
+        const std::string path = root_ + "/" + name;
+        EXPECT_FAILS(VEXOFSMkdirP(path.c_str(), &stopAt, recursive, kKeepUser, kKeepGroup, 0755), systemCode, code);
+        EXPECT_EQ(stopAt, name);
     }
     EXPECT_TRUE(fs::is_empty(root_ + "/elsewhere"));
     EXPECT_EQ(make("/link/new", kKeepUser, 0755, 0), 0) << "an existing link to a folder counts as that folder";
@@ -94,14 +75,12 @@ TEST_F(MakeFolderTest, AFolderThatCannotBeHandedOverIsNotLeft) {
     SKIP_WITHOUT_ROOT();
     const auto body = [&] {
         const char* stopAt = "";
-        EXPECT_LT(make("/mine", support::kBobUid, 0755, 1, &stopAt), 0);
-        EXPECT_EQ(errno, EPERM);
-        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_DENIED);
+        EXPECT_FAILS(make("/mine", kBobUid, 0755, 1, &stopAt), EPERM, VEXO_ERR_DENIED);
         EXPECT_STREQ(stopAt, "mine");
         EXPECT_FALSE(fs::exists(root_ + "/mine"));
         return make("/mine", kAliceUid, 0700);
     };
-    EXPECT_EQ(support::asUser(kAliceUid, kUsersGid, body), 0);
+    EXPECT_EQ(asUser(kAliceUid, kUsersGid, body), 0);
     EXPECT_EQ(textOf("/mine"), expected(kAliceUid, 0700));
 }
 

@@ -1,17 +1,11 @@
 // Memory that runs out inside an operation: it fails like any other failure, and no exception leaves the platform.
-#include <fcntl.h>
-#include <sys/stat.h>
-
-#include <cstdlib>
-#include <functional>
 #include <new>
 
 #include "file_io.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "vexo/acl.h"
 #include "vexo/copy.h"
 #include "vexo/ddns.h"
-#include "vexo/error.h"
 #include "vexo/filesystem.h"
 #include "vexo/process.h"
 #include "vexo/settings.h"
@@ -48,7 +42,7 @@ int untilRefusal = 0;  // 1: the next allocation is refused; 0 and below: none i
 
 namespace {
 
-using MemoryTest = support::ApplianceTest;
+using MemoryTest = ApplianceTest;
 
 // Runs `operation` with its allocation 1, 2, 3... refused, until one run needs no more of them; how many were refused.
 // `check` follows each run and is told whether it met a refusal.
@@ -80,8 +74,8 @@ TEST_F(MemoryTest, OperationsFailWithoutAnException) {
     const std::string source = root + "/a source with a long name";
     const std::string target = root + "/a target with a long name";
     const std::string made = root + "/a folder with a long name/and one below it";
-    support::writeFile(source, "new");
-    support::writeFile(target, "old");
+    writeFile(source, "new");
+    writeFile(target, "old");
     writeRootFile("/etc/vexo/volumes", "/a-volume-with-a-long-name usb\n");
     writeRootFile("/etc/vexo/ddns.conf", "[provider]\nhostname=\"a.host.with.a.long.name\"\n");
     const vexo::Descriptor folder = vexo::openFile(root, O_RDONLY | O_DIRECTORY);
@@ -90,39 +84,38 @@ TEST_F(MemoryTest, OperationsFailWithoutAnException) {
     VEXODDNS entry;
     const VEXOCOPYOPT overwrite{static_cast<uid_t>(-1), static_cast<gid_t>(-1), nullptr, VEXO_COPY_OVERWRITE};
 
-    const struct {
-        const char* name;
-        std::function<int()> run;  // <0 on failure
-    } operations[] = {
-        {"VEXOACLPermGet", [&] { return VEXOACLPermGet(source.c_str(), &permission); }},
-        {"VEXOACLFolderOpen",
-         [&] {
-             VEXOACLFOLDER* opened = VEXOACLFolderOpen(folder.get());
-             VEXOACLFolderClose(opened);
-             return opened == nullptr ? -1 : 0;
-         }},
-        {"VEXOGetFSType", [&] { return VEXOGetFSType(root.c_str(), 0); }},
-        {"VEXOFSIsInMountTable", [] { return VEXOFSIsInMountTable("/"); }},
-        {"VEXOFSMkdirP",
-         [&] { return VEXOFSMkdirP(made.c_str(), nullptr, 1, static_cast<uid_t>(-1), static_cast<gid_t>(-1), 0755); }},
-        {"VolumePathParse", [&] { return VolumePathParse("/a-volume-with-a-long-name/a", &volume); }},
-        {"VEXOFileCopy", [&] { return VEXOFileCopy(source.c_str(), target.c_str(), &overwrite); }},
-        {"VLIBCExec", [] { return VLIBCExec("/bin/true", nullptr); }},
-        {"VEXOLogKTRFMXferLog", [] { return VEXOLogKTRFMXferLog("::1", "alice", "download", 1, "/photo/a", false); }},
-        {"VEXODDNSConfigGet", [&] { return VEXODDNSConfigGet("provider", &entry); }},
-    };
-    for (const auto& operation : operations) {
-        SCOPED_TRACE(operation.name);
-        ASSERT_GE(operation.run(), 0);
-        const int before = support::openDescriptors();
-        const int refusals = refuseEach(operation.run, [](int result, bool refused) {
+    for (const auto& [name, run] : Rows<const char*, std::function<int()>>{
+             {"VEXOACLPermGet", [&] { return VEXOACLPermGet(source.c_str(), &permission); }},
+             {"VEXOACLFolderOpen",
+              [&] {
+                  VEXOACLFOLDER* opened = VEXOACLFolderOpen(folder.get());
+                  VEXOACLFolderClose(opened);
+                  return opened == nullptr ? -1 : 0;
+              }},
+             {"VEXOGetFSType", [&] { return VEXOGetFSType(root.c_str(), 0); }},
+             {"VEXOFSIsInMountTable", [] { return VEXOFSIsInMountTable("/"); }},
+             {"VEXOFSMkdirP",
+              [&] {
+                  return VEXOFSMkdirP(made.c_str(), nullptr, 1, static_cast<uid_t>(-1), static_cast<gid_t>(-1), 0755);
+              }},
+             {"VolumePathParse", [&] { return VolumePathParse("/a-volume-with-a-long-name/a", &volume); }},
+             {"VEXOFileCopy", [&] { return VEXOFileCopy(source.c_str(), target.c_str(), &overwrite); }},
+             {"VLIBCExec", [] { return VLIBCExec("/bin/true", nullptr); }},
+             {"VEXOLogKTRFMXferLog",
+              [] { return VEXOLogKTRFMXferLog("::1", "alice", "download", 1, "/photo/a", false); }},
+             {"VEXODDNSConfigGet", [&] { return VEXODDNSConfigGet("provider", &entry); }},
+         }) {
+        SCOPED_TRACE(name);
+        ASSERT_GE(run(), 0);
+        const int before = openDescriptors();
+        const int refusals = refuseEach(run, [](int result, bool refused) {
             EXPECT_EQ(result < 0, refused);
             if (refused) {
                 EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_GENERAL);
             }
         });
         EXPECT_GT(refusals, 0);
-        EXPECT_EQ(support::openDescriptors(), before);
+        EXPECT_EQ(openDescriptors(), before);
     }
 }
 

@@ -1,22 +1,14 @@
 // The mount table and what is told from it.
-#include <gtest/gtest.h>
 #include <sys/mount.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
-#include <filesystem>
-#include <string>
 
 #include "mount_table.h"
 #include "platform/private_mounts.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 #include "vexo/filesystem.h"
 
 namespace {
 
-class MountTest : public support::ApplianceTest {};
+class MountTest : public ApplianceTest {};
 
 TEST_F(MountTest, ParsesWhatTheKernelWrites) {
     std::string text;
@@ -36,18 +28,15 @@ TEST_F(MountTest, TypeIsThatOfTheLongestMountAboveThePath) {
     addMount("/volume1/usb", "xfs");
     addMount("/volume1/usb", "vfat");  // mounted over it later
     addMount("/volume1/iso", "udf");
-    const struct {
-        const char* path;
-        int type;
-    } cases[] = {{"/", 0},
-                 {"/volume10/a", 0},
-                 {"/volume1", 2},
-                 {"/volume1//usb//a", VEXO_FS_FAT},
-                 {"/volume1/usbx", 2},
-                 {"/volume1/iso/", 5},
-                 {"relative", VEXO_FS_UNKNOWN},
-                 {"", VEXO_FS_UNKNOWN}};
-    for (const auto& c : cases) EXPECT_EQ(VEXOGetFSType(c.path, 0), c.type) << c.path;
+    for (const auto& [path, type] : Rows<const char*, int>{{"/", 0},
+                                                           {"/volume10/a", 0},
+                                                           {"/volume1", 2},
+                                                           {"/volume1//usb//a", VEXO_FS_FAT},
+                                                           {"/volume1/usbx", 2},
+                                                           {"/volume1/iso/", 5},
+                                                           {"relative", VEXO_FS_UNKNOWN},
+                                                           {"", VEXO_FS_UNKNOWN}})
+        EXPECT_EQ(VEXOGetFSType(path, 0), type) << path;
     for (int type = -1; type <= 12; ++type) {
         EXPECT_EQ(VEXOFSIsRemoteFS(type), static_cast<int>(type >= 6 && type <= 8)) << type;
         EXPECT_EQ(VEXOFSIsImageFS(type), static_cast<int>(type == 4 || type == 5)) << type;
@@ -58,24 +47,20 @@ TEST_F(MountTest, MountPointsAreFoundWithoutTouchingTheFileSystem) {
     addMount("/nowhere/remote", "cifs");
     addMount("/nowhere/my\\040disk", "iso9660");
     addMount("/nowhere/other", "fuse.sshfs");
-    const struct {
-        const char* path;
-        int index, remote;
-        const char* typeName;
-    } cases[] = {{"//", 0, 0, "ext4"},
-                 {"/nowhere/remote///", 1, 1, "cifs"},
-                 {"/nowhere/remote/a", -1, 0, ""},
-                 {"/nowhere/my disk", 2, 0, "iso9660"},
-                 {"/nowhere/other", 3, 0, "fuse.sshfs"},
-                 {"", -1, 0, ""}};
-    for (const auto& c : cases) {
-        SCOPED_TRACE(c.path);
+    for (const auto& [path, index, remote, typeName] :
+         Rows<const char*, int, int, const char*>{{"//", 0, 0, "ext4"},
+                                                  {"/nowhere/remote///", 1, 1, "cifs"},
+                                                  {"/nowhere/remote/a", -1, 0, ""},
+                                                  {"/nowhere/my disk", 2, 0, "iso9660"},
+                                                  {"/nowhere/other", 3, 0, "fuse.sshfs"},
+                                                  {"", -1, 0, ""}}) {
+        SCOPED_TRACE(path);
         errno = EHOSTDOWN;
-        EXPECT_EQ(VEXOFSIsInMountTable(c.path), c.index);
+        EXPECT_EQ(VEXOFSIsInMountTable(path), index);
         EXPECT_EQ(errno, EHOSTDOWN);
-        EXPECT_EQ(VEXOFSIsRemoteFS(), c.remote);
-        EXPECT_EQ(WebUtils::IsMountPoint(c.path), c.index >= 0);
-        EXPECT_EQ(WebUtils::getMountType(c.path), c.typeName);
+        EXPECT_EQ(VEXOFSIsRemoteFS(), remote);
+        EXPECT_EQ(WebUtils::IsMountPoint(path), index >= 0);
+        EXPECT_EQ(WebUtils::getMountType(path), typeName);
     }
     EXPECT_EQ(VEXOFSIsInMountTable("/nowhere/remote"), 1);
     EXPECT_FALSE(WebUtils::IsMountPoint("/nowhere"));
@@ -90,7 +75,7 @@ TEST_F(MountTest, AChangedTableIsReadAgainAndAnUnreadableOneFails) {
         EXPECT_EQ(VEXOFSIsInMountTable(("/volume9/" + std::to_string(round)).c_str()), round + 1);
     }
     std::filesystem::remove(systemRoot() + "/proc/mounts");
-    support::makeFolder(systemRoot() + "/proc/mounts");
+    makeFolder(systemRoot() + "/proc/mounts");
     errno = 0;
     EXPECT_EQ(VEXOGetFSType("/volume1", 0), -1);
     EXPECT_NE(errno, 0);
@@ -102,10 +87,10 @@ TEST_F(MountTest, AChangedTableIsReadAgainAndAnUnreadableOneFails) {
 TEST_F(MountTest, TheMachinesOwnTableFollowsMountsAndForks) {
     SKIP_WITHOUT_ROOT();
     const std::string place = shareRoot("photo") + "/with blank";
-    support::makeFolder(place);
+    makeFolder(place);
     const std::string table = systemRoot() + "/proc/mounts";
     // In a child also because the table's descriptor stays open in the process that reads it.
-    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
         unlink(table.c_str());
         EXPECT_EQ(VEXOFSIsInMountTable(place.c_str()), -1);
         EXPECT_EQ(mount("none", place.c_str(), "tmpfs", 0, "size=64k"), 0);
@@ -113,7 +98,7 @@ TEST_F(MountTest, TheMachinesOwnTableFollowsMountsAndForks) {
         EXPECT_EQ(WebUtils::getMountType(place), "tmpfs");
         EXPECT_EQ(umount(place.c_str()), 0);
         // The child's answers take no news away from its parent.
-        EXPECT_EQ(support::inChild([&] { return VEXOFSIsInMountTable(place.c_str()) == -1 ? 0 : 1; }), 0);
+        EXPECT_EQ(inChild([&] { return VEXOFSIsInMountTable(place.c_str()) == -1 ? 0 : 1; }), 0);
         EXPECT_EQ(VEXOFSIsInMountTable(place.c_str()), -1);
         return 0;
     }));
@@ -165,7 +150,7 @@ TEST_F(MountTest, HiddenNamesAndSmallTexts) {
     EXPECT_EQ(WebUtils::StringExplode("a::b:c", "::"), (Pieces{"a", "b:c"}));
     EXPECT_EQ(WebUtils::StringExplode("ab", ""), Pieces{"ab"});
     const std::string file = shareRoot("photo") + "/a";
-    support::writeFile(file, "");
+    writeFile(file, "");
     const timespec times[] = {{5, 0}, {1234567890, 5}};
     ASSERT_EQ(utimensat(-1, file.c_str(), times, 0), 0);
     EXPECT_EQ(WebUtils::GetModifyTime(file.c_str()), "1234567890");

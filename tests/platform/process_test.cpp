@@ -1,20 +1,13 @@
 // Programs that the platform runs.
 #include "vexo/process.h"
 
-#include <fcntl.h>
-#include <gtest/gtest.h>
-#include <unistd.h>
-
-#include <cerrno>
 #include <csignal>
-#include <string>
 
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
-class ProcessTest : public support::ApplianceTest {
+class ProcessTest : public ApplianceTest {
  protected:
     std::string root_ = shareRoot("photo");
 };
@@ -24,7 +17,7 @@ TEST_F(ProcessTest, TheProgramSeesItsArgumentsAndNothingOfThisProcess) {
     const std::string script =
         "{ echo \"$0\"; env; ls -l /proc/$$/fd; grep SigBlk /proc/self/status; sh -c 'kill -PIPE $$; echo deaf'; } > " +
         report + "; exit 7";
-    support::inChild([&] {
+    inChild([&] {
         setenv("SECRET", "yes", 1);
         open("/", O_RDONLY);  // NOLINT(android-cloexec-open): as a foreign library would leave it
         sigset_t blocked;
@@ -37,7 +30,7 @@ TEST_F(ProcessTest, TheProgramSeesItsArgumentsAndNothingOfThisProcess) {
         EXPECT_EQ(errno, 0);
         return 0;
     });
-    const std::string seen = support::readFile(report);
+    const std::string seen = readFile(report);
     for (const char* part : {"a b;$(touch x)\n", "LC_ALL=C\n", "0 -> /dev/null", "SigBlk:\t0000000000000000"}) {
         EXPECT_NE(seen.find(part), std::string::npos) << part << " in " << seen;
     }
@@ -45,7 +38,7 @@ TEST_F(ProcessTest, TheProgramSeesItsArgumentsAndNothingOfThisProcess) {
 }
 
 TEST_F(ProcessTest, Failures) {
-    support::writeFile(root_ + "/plain", "no program");
+    writeFile(root_ + "/plain", "no program");
     const std::string plain = root_ + "/plain";
     const struct {
         const char* program;

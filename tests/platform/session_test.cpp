@@ -1,28 +1,11 @@
 // Sessions: who is let in, whose session counts, and what of the store is trusted.
 #include "vexo/session.h"
 
-#include <fcntl.h>
-#include <sys/stat.h>
-
-#include <cerrno>
-#include <cstdlib>
-#include <ctime>
-#include <filesystem>
-#include <functional>
-#include <iterator>
-#include <string>
-
 #include "session_record.h"
 #include "session_store.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
-
-namespace fs = std::filesystem;
+#include "support/testing.h"
 
 namespace {
-
-using support::kAliceUid;
-using support::kUsersGid;
 
 TEST(SessionFormat, WhatIsWrittenIsReadAndNothingElse) {
     for (const std::string user : {"alice", "DOM\\al \"quoted\" ice", "a=b", "\xC3\xA9@ldap"}) {
@@ -44,7 +27,7 @@ TEST(SessionFormat, WhatIsWrittenIsReadAndNothingElse) {
     EXPECT_FALSE(vexo::isSessionAlive(1000, 1000 + 900 + 61, 900));
 }
 
-class Session : public support::ApplianceTest {
+class Session : public ApplianceTest {
  protected:
     // What one request of `user` that shows `sid` comes to.
     struct Reply {
@@ -68,11 +51,6 @@ class Session : public support::ApplianceTest {
     }
     static std::string store() { return systemRoot() + "/run/vexo/sessions"; }
     static std::string fileOf(const std::string& sid) { return store() + "/" + sid; }
-    static struct stat statusOf(const std::string& path) {
-        struct stat status {};
-        EXPECT_EQ(lstat(path.c_str(), &status), 0) << path;
-        return status;
-    }
     static bool isNoted(const std::string& sid) { return std::abs(statusOf(fileOf(sid)).st_mtime - time(nullptr)) < 5; }
     static void setLastUse(const std::string& sid, long secondsAgo) {
         const timespec times[] = {{0, UTIME_OMIT}, {time(nullptr) - secondsAgo, 0}};
@@ -90,7 +68,7 @@ TEST_F(Session, ALogInMakesOneSessionAndTheCookieKeepsIt) {
     EXPECT_EQ(first.cookie, "id=" + first.sid + "; Path=/; HttpOnly; SameSite=Strict");
     EXPECT_EQ(statusOf(store()).st_mode & 07777, 0700U);
     EXPECT_EQ(statusOf(fileOf(first.sid)).st_mode & 07777, 0600U);
-    const auto record = vexo::parseSessionRecord(support::readFile(fileOf(first.sid)));
+    const auto record = vexo::parseSessionRecord(readFile(fileOf(first.sid)));
     ASSERT_TRUE(record);
     EXPECT_EQ(record->user + record->address, "alice192.0.2.7");
     EXPECT_LT(std::abs(record->time - time(nullptr)), 5);
@@ -107,14 +85,11 @@ TEST_F(Session, ALogInMakesOneSessionAndTheCookieKeepsIt) {
 }
 
 TEST_F(Session, OnlyAKnownUserThatTheServerLetInHasOne) {
-    const struct {
-        const char* user;
-        int code;
-    } cases[] = {{"", VEXO_ERR_DENIED}, {"nobody-here", VEXO_ERR_USER_MISSING}};
-    for (const auto& c : cases) {
-        const Reply reply = request(c.user);
+    for (const auto& [user, code] :
+         Rows<const char*, int>{{"", VEXO_ERR_DENIED}, {"nobody-here", VEXO_ERR_USER_MISSING}}) {
+        const Reply reply = request(user);
         EXPECT_FALSE(reply.authorized);
-        EXPECT_EQ(VLIBCErrGet(), c.code) << c.user;
+        EXPECT_EQ(VLIBCErrGet(), code) << user;
         EXPECT_EQ(reply.user + reply.sid + reply.cookie, "");
     }
     EXPECT_FALSE(fs::exists(store()));
@@ -141,7 +116,7 @@ TEST_F(Session, EndsAfterIdlenessAndNotesUsesOnceAMinute) {
     EXPECT_TRUE(keptAfter(20 * 60L));
     // A sweep takes what has ended and nothing else.
     const std::string ended = request("bob").sid;
-    support::writeFile(fileOf("notes"), "");
+    writeFile(fileOf("notes"), "");
     for (const std::string& name : {ended, std::string("notes")}) setLastUse(name, 3600);
     vexo::sweepSessions();
     EXPECT_TRUE(fs::exists(fileOf(sid)) && !fs::exists(fileOf(ended)) && fs::exists(fileOf("notes")));
@@ -149,9 +124,9 @@ TEST_F(Session, EndsAfterIdlenessAndNotesUsesOnceAMinute) {
 
 TEST_F(Session, WhatOthersCouldHaveMadeIsNoSession) {
     const std::string good = request("alice").sid;
-    const std::string record = support::readFile(fileOf(good));
+    const std::string record = readFile(fileOf(good));
     const auto write = [](const std::string& text, mode_t mode) {
-        return [=](const std::string& file) { support::writeFile(file, text, mode); };
+        return [=](const std::string& file) { writeFile(file, text, mode); };
     };
     const struct {
         const char* what;
@@ -159,13 +134,13 @@ TEST_F(Session, WhatOthersCouldHaveMadeIsNoSession) {
     } cases[] = {{"sound", write(record, 0600)},
                  {"link", [&](const std::string& file) { fs::create_symlink(fileOf(good), file); }},
                  {"second name", [&](const std::string& file) { fs::create_hard_link(fileOf(good), file); }},
-                 {"folder", [](const std::string& file) { support::makeFolder(file); }},
+                 {"folder", [](const std::string& file) { makeFolder(file); }},
                  {"pipe", [](const std::string& file) { mkfifo(file.c_str(), 0600); }},
                  {"writable", write(record, 0622)},
                  {"huge", write(record + std::string(5000, '#'), 0600)},
                  {"torn", write("user=\"alice", 0600)},
                  {"another's", [&](const std::string& file) {
-                      support::writeFile(file, record, 0600);
+                      writeFile(file, record, 0600);
                       if (chown(file.c_str(), kAliceUid, 0) != 0) fs::remove(file);
                   }}};
     for (const auto& c : cases) {
@@ -174,7 +149,7 @@ TEST_F(Session, WhatOthersCouldHaveMadeIsNoSession) {
         EXPECT_EQ(isKept("alice", sid), &c == cases) << c.what;
         fs::remove(fileOf(sid));
     }
-    support::writeFile(store() + "/../outside", record, 0600);
+    writeFile(store() + "/../outside", record, 0600);
     EXPECT_FALSE(isKept("alice", "../outside"));
     // A store that others could fill is not used at all.
     ASSERT_EQ(chmod(store().c_str(), 0777), 0);
@@ -213,7 +188,7 @@ TEST_F(Session, IdsAreGivenForTheSessionsOwnUser) {
 TEST_F(Session, TheStoreIsReachedAfterTheSwitchAndOnlyWithTheSavedIdentity) {
     SKIP_WITHOUT_ROOT();
     const std::string sid = request("alice").sid;
-    support::inChild([&] {
+    inChild([&] {
         EXPECT_EQ(setegid(kUsersGid), 0);
         EXPECT_EQ(seteuid(kAliceUid), 0);
         EXPECT_EQ(VexoCgiUIDGet(sid.c_str(), "alice"), uid_t{kAliceUid});
@@ -226,7 +201,7 @@ TEST_F(Session, TheStoreIsReachedAfterTheSwitchAndOnlyWithTheSavedIdentity) {
     for (const auto& entry : fs::directory_iterator(store())) {
         EXPECT_TRUE(statusOf(entry.path()).st_uid == 0 && statusOf(entry.path()).st_gid == 0);
     }
-    support::asUser(kAliceUid, kUsersGid, [&] {
+    asUser(kAliceUid, kUsersGid, [&] {
         EXPECT_EQ(VexoCgiUIDGet(sid.c_str(), "alice"), 0xFFFFFFFF) << "root's store is closed to a mere user";
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_DENIED);
         return 0;
@@ -234,7 +209,7 @@ TEST_F(Session, TheStoreIsReachedAfterTheSwitchAndOnlyWithTheSavedIdentity) {
     // Without root the store is the user's own.
     fs::remove_all(systemRoot() + "/run");
     ASSERT_EQ(chmod(systemRoot().c_str(), 0777), 0);
-    EXPECT_EQ(support::asUser(kAliceUid, kUsersGid, [] { return isKept("bob", request("bob").sid) ? 0 : 1; }), 0);
+    EXPECT_EQ(asUser(kAliceUid, kUsersGid, [] { return isKept("bob", request("bob").sid) ? 0 : 1; }), 0);
     EXPECT_EQ(statusOf(store()).st_uid, uid_t{kAliceUid});
     ASSERT_EQ(chmod(systemRoot().c_str(), 0755), 0);
 }

@@ -1,35 +1,31 @@
 // Settings files: the format, and the operations that read it.
 #include "vexo/settings.h"
 
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
-#include <ctime>
-#include <string>
-
-#include "fault_gate.h"
 #include "settings_text.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
 TEST(SettingsFormat, Lines) {
     using namespace std::string_view_literals;
-    const struct {
-        std::string_view line, key, value;
-    } cases[] = {
-        {"a=b", "a", "b"},           {" a\t= \"b c\" \r", "a", "b c"},
-        {"a= b c ", "a", "b c"},     {"a=", "a", ""},
-        {"a=\"\"", "a", ""},         {"a=\" b \"", "a", " b "},
-        {"a=\"b\" # why", "a", "b"}, {"a=\"say \"hi\"\"", "a", "say \"hi\""},
-        {"a=\"torn", "a", "\"torn"}, {"a=\"", "a", "\""},
-        {"a b=c=d", "a b", "c=d"},   {"", "", ""},
-        {"just text", "", ""},       {"=b", "", ""},
-        {"# a=b", "", ""},           {"a=b\0c"sv, "", ""},
-    };
-    for (const auto& [line, key, value] : cases) {
+    for (const auto& [line, key, value] : Rows<std::string_view, std::string_view, std::string_view>{
+             {"a=b", "a", "b"},
+             {" a\t= \"b c\" \r", "a", "b c"},
+             {"a= b c ", "a", "b c"},
+             {"a=", "a", ""},
+             {"a=\"\"", "a", ""},
+             {"a=\" b \"", "a", " b "},
+             {"a=\"b\" # why", "a", "b"},
+             {"a=\"say \"hi\"\"", "a", "say \"hi\""},
+             {"a=\"torn", "a", "\"torn"},
+             {"a=\"", "a", "\""},
+             {"a b=c=d", "a b", "c=d"},
+             {"", "", ""},
+             {"just text", "", ""},
+             {"=b", "", ""},
+             {"# a=b", "", ""},
+             {"a=b\0c"sv, "", ""},
+         }) {
         const auto setting = vexo::parseSettingLine(line, "=");
         EXPECT_EQ(setting.has_value(), !key.empty()) << line;
         EXPECT_TRUE(!setting || (setting->key == key && setting->value == value)) << line;
@@ -42,7 +38,7 @@ TEST(SettingsFormat, Lines) {
     EXPECT_FALSE(vexo::findSetting(settings, "c"));
 }
 
-class Settings : public support::ApplianceTest {
+class Settings : public ApplianceTest {
  protected:
     // "1 value", "0 " or "-1 " with the platform's code.
     static std::string ask(const char* file, const char* key = "a", int size = 8) {
@@ -76,7 +72,7 @@ TEST_F(Settings, GetKeyValue) {
     for (const auto& c : cases) EXPECT_EQ(ask(c.file, c.key, c.size), c.expected) << &c - cases;
     if (geteuid() != 0) return;
     chmod((systemRoot() + "/etc/huge.conf").c_str(), 0600);
-    support::asUser(support::kAliceUid, support::kUsersGid, [] {
+    asUser(kAliceUid, kUsersGid, [] {
         EXPECT_EQ(ask("/etc/huge.conf"), failure(VEXO_ERR_DENIED));
         return 0;
     });
@@ -86,12 +82,12 @@ TEST_F(Settings, AFileIsReadAgainOnlyWhenItChanged) {
     const std::string file = systemRoot() + "/etc/x.conf";
     const timespec hourAgo[] = {{time(nullptr) - 3600, 0}, {time(nullptr) - 3600, 0}};
     for (const char* text : {"a=1\n", "a=2\n"}) {  // the same inode, size and time: the first is still believed
-        support::writeFile(file, text);
+        writeFile(file, text);
         ASSERT_EQ(utimensat(-1, file.c_str(), hourAgo, 0), 0);
         EXPECT_EQ(ask("/etc/x.conf"), "1 1");
     }
     for (const char* text : {"a=3\n", "a=4\n"}) {  // within one tick of the clock
-        support::writeFile(file, text);
+        writeFile(file, text);
         EXPECT_EQ(ask("/etc/x.conf"), std::string("1 ") + text[2]);
     }
     ASSERT_EQ(unlink(file.c_str()), 0);
@@ -100,16 +96,14 @@ TEST_F(Settings, AFileIsReadAgainOnlyWhenItChanged) {
 
 TEST_F(Settings, CheckKeyValue) {
     writeRootFile("/etc/x.conf", "a=\"Yes\"\nname=\"\xC3\x89T\xC3\x89\"\n");
-    const struct {
-        const char *file, *key, *value;
-        int nocase, answer;
-    } cases[] = {{"/etc/x.conf", "a", "Yes", 0, 1},
-                 {"/etc/x.conf", "a", "yes", 0, 0},
-                 {"/etc/x.conf", "name", "\xC3\xA9t\xC3\xA9", 1, 1},
-                 {"/etc/x.conf", "b", "", 0, 0},  // absent is not empty
-                 {"/etc/none.conf", "a", "Yes", 0, 0},
-                 {"/etc/x.conf", "a", nullptr, 0, 0}};
-    for (const auto& c : cases) EXPECT_EQ(VLIBCFileCheckKeyValue(c.file, c.key, c.value, c.nocase), c.answer);
+    for (const auto& [file, key, value, nocase, answer] :
+         Rows<const char*, const char*, const char*, int, int>{{"/etc/x.conf", "a", "Yes", 0, 1},
+                                                               {"/etc/x.conf", "a", "yes", 0, 0},
+                                                               {"/etc/x.conf", "name", "\xC3\xA9t\xC3\xA9", 1, 1},
+                                                               {"/etc/x.conf", "b", "", 0, 0},  // absent is not empty
+                                                               {"/etc/none.conf", "a", "Yes", 0, 0},
+                                                               {"/etc/x.conf", "a", nullptr, 0, 0}})
+        EXPECT_EQ(VLIBCFileCheckKeyValue(file, key, value, nocase), answer);
 }
 
 TEST_F(Settings, GetKeysFillsTheCallersHashOrANewOne) {
@@ -144,13 +138,10 @@ TEST_F(Settings, TheAppliancesOwnFiles) {
     EXPECT_EQ(VLIBCSupportGet("support_s2s"), 1);
     EXPECT_EQ(VLIBCSupportGet("support_other"), 0);
     EXPECT_EQ(VexoConf::Info().Get("pexlanderxferlog", "no"), "Yes");
-    const struct {
-        const char* value;
-        int minutes;
-    } cases[] = {{"30", 30}, {"0", 0}, {"-3", -3}, {"30 minutes", -1}, {"", -1}, {"99999999999", -1}};
-    for (const auto& c : cases) {
-        setSetting("session_timeout", c.value);
-        EXPECT_EQ(VLIBCConfGetKTRTimeout(), c.minutes) << c.value;
+    for (const auto& [value, minutes] :
+         Rows<const char*, int>{{"30", 30}, {"0", 0}, {"-3", -3}, {"30 minutes", -1}, {"", -1}, {"99999999999", -1}}) {
+        setSetting("session_timeout", value);
+        EXPECT_EQ(VLIBCConfGetKTRTimeout(), minutes) << value;
     }
     ASSERT_EQ(unlink((systemRoot() + "/etc/vexoinfo.conf").c_str()), 0);
     EXPECT_EQ(VexoConf::Info().Get("pexlanderxferlog", "no"), "no");

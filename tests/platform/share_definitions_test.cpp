@@ -1,25 +1,16 @@
 // The grammar of share definitions, also held against Samba's own reader, and what sections mean.
 #include "share_definitions.h"
 
-#include <gtest/gtest.h>
-#include <unistd.h>
-
 #include <cstdio>
-#include <cstdlib>
-#include <filesystem>
 #include <map>
-#include <optional>
 #include <set>
-#include <string>
-#include <vector>
 
 #include "share_options.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "vexo/share.h"
 
 namespace {
 
-namespace fs = std::filesystem;
 using vexo::ShareOption;
 
 const vexo::IncludeReader kNoIncludes = [](const std::string&) { return std::optional<std::string>(); };
@@ -152,14 +143,14 @@ const Difference kRefusedBySamba[] = {
 TEST(SambaGrammar, ReadsAlike) {
     const bool hasOracle = system("command -v testparm >/dev/null") == 0;
     const std::string folder = "/tmp/definitions-" + std::to_string(getpid());
-    support::writeFile(folder + "/users.conf", "valid users = included\n# no section of its own\n");
-    support::writeFile(folder + "/sections.conf", "read list = first\n[inner]\npath = /v/inner\n");
-    support::writeFile(folder + "/loop.conf", "include = " + folder + "/loop.conf\n");
+    writeFile(folder + "/users.conf", "valid users = included\n# no section of its own\n");
+    writeFile(folder + "/sections.conf", "read list = first\n[inner]\npath = /v/inner\n");
+    writeFile(folder + "/loop.conf", "include = " + folder + "/loop.conf\n");
     const auto read = [&](std::string& text) {
         for (size_t at = 0; (at = text.find("@/", at)) != std::string::npos;) text.replace(at, 1, folder);
-        support::writeFile(folder + "/smb.conf", text);
+        writeFile(folder + "/smb.conf", text);
         return vexo::parseDefinitions(text, [](const std::string& file) {
-            return fs::exists(file) ? std::optional(support::readFile(file)) : std::nullopt;
+            return fs::exists(file) ? std::optional(readFile(file)) : std::nullopt;
         });
     };
     for (std::string text : kAlike) {
@@ -198,36 +189,32 @@ vexo::ShareReading read(const std::string& text, std::string before = {}) {
 }
 
 TEST(ShareSection, MalformedOnesSayWhy) {
-    const struct {
-        std::string text;
-        const char* fault;
-    } cases[] = {
-        {"path =\n", "no path"},
-        {"path = volume1/photo\n", "is not of the form"},
-        {"path = /volume1/a/b\n", "is not of the form"},
-        {"path = /volume1/..\n", "is not of the form"},
-        {"path = /./photo\n", "is not of the form"},
-        {"path = /volume1/" + std::string(256, 'x') + "\n", "is not of the form"},
-        {std::string("path = /volume1/a\0b\n", 20), "a zero byte"},
-        {"path = /v/p\nvexo:index =\n", "neither yes nor no"},
-        {"path = /v/p\nwriteable = perhaps\n", "neither yes nor no"},
-        {"path = /v/p\nvexo:restriction = -1\n", "is no number"},
-        {"path = /v/p\nvexo:restriction = 4 5\n", "is no number"},
-        {"path = /v/p\nvexo:restriction = 4294967296\n", "is no number or too large"},
-        {"path = /v/p\nvexo:ftp = 2147483648\n", "is no number or too large"},
-        {"path = /v/p\nvalid users alice\n", "line 3: neither"},
-        {"path = /v/p\ninclude = gone\n", "line 3: the included file"},
-        {"path = /v/p\ncopy = gone\n", "line 3: copies a section"},
-        // What is not offered is no fault.
-        {"available = no\n", ""},
-        {"printable = yes\npath = /var/tmp\n", ""},
-        {"print ok = 1\nread only = ?\n", ""},
-    };
-    for (const auto& c : cases) {
-        const vexo::ShareReading reading = read(c.text);
-        EXPECT_FALSE(reading.share.has_value()) << c.text;
-        EXPECT_NE(reading.fault.find(c.fault), std::string::npos) << c.text << reading.fault;
-        EXPECT_EQ(reading.fault.empty(), *c.fault == '\0') << c.text;
+    for (const auto& [text, fault] : Rows<std::string, const char*>{
+             {"path =\n", "no path"},
+             {"path = volume1/photo\n", "is not of the form"},
+             {"path = /volume1/a/b\n", "is not of the form"},
+             {"path = /volume1/..\n", "is not of the form"},
+             {"path = /./photo\n", "is not of the form"},
+             {"path = /volume1/" + std::string(256, 'x') + "\n", "is not of the form"},
+             {std::string("path = /volume1/a\0b\n", 20), "a zero byte"},
+             {"path = /v/p\nvexo:index =\n", "neither yes nor no"},
+             {"path = /v/p\nwriteable = perhaps\n", "neither yes nor no"},
+             {"path = /v/p\nvexo:restriction = -1\n", "is no number"},
+             {"path = /v/p\nvexo:restriction = 4 5\n", "is no number"},
+             {"path = /v/p\nvexo:restriction = 4294967296\n", "is no number or too large"},
+             {"path = /v/p\nvexo:ftp = 2147483648\n", "is no number or too large"},
+             {"path = /v/p\nvalid users alice\n", "line 3: neither"},
+             {"path = /v/p\ninclude = gone\n", "line 3: the included file"},
+             {"path = /v/p\ncopy = gone\n", "line 3: copies a section"},
+             // What is not offered is no fault.
+             {"available = no\n", ""},
+             {"printable = yes\npath = /var/tmp\n", ""},
+             {"print ok = 1\nread only = ?\n", ""},
+         }) {
+        const vexo::ShareReading reading = read(text);
+        EXPECT_FALSE(reading.share.has_value()) << text;
+        EXPECT_NE(reading.fault.find(fault), std::string::npos) << text << reading.fault;
+        EXPECT_EQ(reading.fault.empty(), *fault == '\0') << text;
     }
     // A default that cannot be read spoils whoever relies on it; so does the section that is copied.
     EXPECT_NE(read("path = /v/p\n", "vexo:restriction = high\n").fault, "");

@@ -1,34 +1,11 @@
 // Shares on a running appliance: records, rights from the lists, files that change, homes.
 #include "vexo/share.h"
 
-#include <gtest/gtest.h>
-#include <unistd.h>
-
-#include <cerrno>
-#include <cstdlib>
-#include <cstring>
-#include <filesystem>
-#include <memory>
-#include <string>
-
-#include "fault_gate.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
-namespace fs = std::filesystem;
-using support::announceLog;
-using support::kAliceUid;
-using support::kUsersGid;
-
 constexpr const char* kDefinitions = "/etc/vexo/shares.conf";
-
-std::string joined(PVLIBCSZLIST list) {
-    std::string out;
-    for (int i = 0; i < list->nItem; ++i) out += std::string(VLIBCSzListGet(list, i)) + '|';
-    return out;
-}
 
 // The root of a share, or "" with the platform error when there is none.
 std::string rootOf(const char* name) {
@@ -51,7 +28,7 @@ std::string allNames() {
     return names;
 }
 
-class ShareTest : public support::ApplianceTest {
+class ShareTest : public ApplianceTest {
  protected:
     void define(const std::string& text) { writeRootFile(kDefinitions, text); }
 };
@@ -138,26 +115,23 @@ TEST_F(ShareTest, MalformedSectionsDoNotHideTheOthers) {
 TEST_F(ShareTest, RightsFromLists) {
     addUser("erin", 20030, kUsersGid);
     addGroup("Editors", 20130, {"erin"});
-    const struct {
-        const char* options;
-        int alice, bob, erin;
-    } cases[] = {
-        {"", 1, 1, 1},
-        {"read only = no\n", 2, 2, 2},
-        {"valid users = ALICE, @editors\nwrite list = bob\n", 1, 2, 1},
-        {"valid users = +Editors\nread list = alice\nread only = no\n", 1, 0, 2},
-        {"valid users = &Editors\ninvalid users = +users\n", 0, 0, 0},
-        {"invalid users = bob @none\nwrite list = bob @Editors\nread only = yes\n", 1, 0, 2},
-        {"valid users = \"\"\nread only = no\n", 0, 0, 0},
-        {"write list = erin\nread list = erin alice\nvalid users = @users\ninvalid users = @\"no such\"\n", 1, 1, 2},
-    };
-    for (const auto& c : cases) {
-        addShare("music", c.options);
+    for (const auto& [options, alice, bob, erin] : Rows<const char*, int, int, int>{
+             {"", 1, 1, 1},
+             {"read only = no\n", 2, 2, 2},
+             {"valid users = ALICE, @editors\nwrite list = bob\n", 1, 2, 1},
+             {"valid users = +Editors\nread list = alice\nread only = no\n", 1, 0, 2},
+             {"valid users = &Editors\ninvalid users = +users\n", 0, 0, 0},
+             {"invalid users = bob @none\nwrite list = bob @Editors\nread only = yes\n", 1, 0, 2},
+             {"valid users = \"\"\nread only = no\n", 0, 0, 0},
+             {"write list = erin\nread list = erin alice\nvalid users = @users\ninvalid users = @\"no such\"\n", 1, 1,
+              2},
+         }) {
+        addShare("music", options);
         SDK::Share* share = SDK::Share::LoadShare("music");
         ASSERT_NE(share, nullptr);
-        EXPECT_EQ(share->GetAccessRight("alice"), c.alice) << c.options;
-        EXPECT_EQ(share->GetAccessRight("bob"), c.bob) << c.options;
-        EXPECT_EQ(share->GetAccessRight("erin"), c.erin) << c.options;
+        EXPECT_EQ(share->GetAccessRight("alice"), alice) << options;
+        EXPECT_EQ(share->GetAccessRight("bob"), bob) << options;
+        EXPECT_EQ(share->GetAccessRight("erin"), erin) << options;
         EXPECT_EQ(share->GetAccessRight(""), 0);
         EXPECT_EQ(share->GetAccessRight(nullptr), 0);
         SDK::Share::Release(share);
@@ -169,7 +143,7 @@ TEST_F(ShareTest, ChangesAreSeen) {
     writeRootFile("/etc/vexo/more.conf", "[b]\npath = /v/b\n");
     define("[a]\npath = /v/a\n[global]\ninclude = /etc/vexo/more.conf\n");
     EXPECT_EQ(allNames(), "a|b|");
-    support::writeFile(systemRoot() + "/etc/vexo/more.conf", "[d]\npath = /v/d\n");
+    writeFile(systemRoot() + "/etc/vexo/more.conf", "[d]\npath = /v/d\n");
     EXPECT_EQ(allNames(), "a|d|") << "same inode and size, within one tick of the clock";
     define("[e]\npath = /v/e\n[global]\ninclude = later.conf\n");
     usleep(20000);  // longer than the clock that stamps files stands still
@@ -202,21 +176,19 @@ TEST_F(ShareTest, RootsWithVariablesFollowTheUser) {
     addUser("DOM\\dora", 20031, kUsersGid);
     addUser("..", 20032, kUsersGid);
     define("[own]\npath = /v/%U\n[all]\npath = /v/%S.%g.%u\n[dom]\npath = /%D/%U\n");
-    const struct {
-        const char *user, *own, *all, *dom, *names;
-    } cases[] = {
-        {"alice", "/v/alice", "/v/all.users.alice", "", "own|all|"},
-        {"DOM\\dora", "/v/dora", "/v/all.users.DOM\\dora", "/DOM/dora", "own|all|dom|"},
-        {"..", "", "/v/all.users...", "", "all|"},
-        {"nobody known", "", "/v/all..", "", "all|"},
-    };
-    for (const auto& c : cases) {
-        setenv("REMOTE_USER", c.user, 1);
-        EXPECT_EQ(rootOf("own"), c.own) << c.user;
-        EXPECT_EQ(rootOf("all"), c.all) << c.user;
-        EXPECT_EQ(rootOf("dom"), c.dom) << c.user;
-        EXPECT_EQ(allNames(), c.names) << c.user;
-        EXPECT_EQ(VEXOShareIsShareRecycle("/v/alice/#recycle"), std::string(c.user) == "alice");
+    for (const auto& [user, own, all, dom, names] :
+         Rows<const char*, const char*, const char*, const char*, const char*>{
+             {"alice", "/v/alice", "/v/all.users.alice", "", "own|all|"},
+             {"DOM\\dora", "/v/dora", "/v/all.users.DOM\\dora", "/DOM/dora", "own|all|dom|"},
+             {"..", "", "/v/all.users...", "", "all|"},
+             {"nobody known", "", "/v/all..", "", "all|"},
+         }) {
+        setenv("REMOTE_USER", user, 1);
+        EXPECT_EQ(rootOf("own"), own) << user;
+        EXPECT_EQ(rootOf("all"), all) << user;
+        EXPECT_EQ(rootOf("dom"), dom) << user;
+        EXPECT_EQ(allNames(), names) << user;
+        EXPECT_EQ(VEXOShareIsShareRecycle("/v/alice/#recycle"), std::string(user) == "alice");
     }
     unsetenv("REMOTE_USER");
     EXPECT_EQ(rootOf("own"), geteuid() == 0 ? "/v/root" : "") << "without a request, the effective user";
@@ -235,10 +207,10 @@ TEST_F(ShareTest, Homes) {
     const std::string home = shareRoot("homes") + "/alice";
     EXPECT_EQ(ask("alice"), VEXO_ERR_MISSING);
     EXPECT_FALSE(fs::exists(home)) << "asking makes nothing";
-    support::writeFile(home, "");
+    writeFile(home, "");
     EXPECT_EQ(ask("alice"), VEXO_ERR_MISSING);
     fs::remove(home);
-    support::makeFolder(home);
+    makeFolder(home);
     EXPECT_EQ(ask("alice"), 0);
     EXPECT_EQ(path, home);
     EXPECT_EQ(ask("alice", home.size()), VEXO_ERR_GENERAL) << "never cut";

@@ -1,30 +1,18 @@
 // Status records: what they hold, what failures leave.
-#include <fcntl.h>
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <algorithm>
-#include <cerrno>
-#include <cstring>
-#include <string>
-#include <tuple>
-
-#include "file_io.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
 #include "vexo/stat.h"
+#include "file_io.h"
+#include "support/testing.h"
 
 namespace {
 
-class StatTest : public support::ApplianceTest {
+class StatTest : public ApplianceTest {
  protected:
     std::string root_ = shareRoot("photo");
 };
 
 TEST_F(StatTest, RecordsWhatLstatTells) {
     const std::string file = root_ + "/a";
-    support::writeFile(file, "12345", 0640);
+    writeFile(file, "12345", 0640);
     const timespec times[] = {{1000000000, 0}, {1100000000, 999999999}};
     ASSERT_EQ(utimensat(AT_FDCWD, file.c_str(), times, 0), 0);
     ASSERT_EQ(symlink("a", (root_ + "/link").c_str()), 0);
@@ -58,15 +46,13 @@ TEST_F(StatTest, RecordsWhatLstatTells) {
 }
 
 TEST_F(StatTest, FailuresLeaveErrnoCodeAndAnEmptyRecord) {
-    support::writeFile(root_ + "/file", "");
-    support::makeFolder(root_ + "/closed", 0700);
+    writeFile(root_ + "/file", "");
+    makeFolder(root_ + "/closed", 0700);
     const auto expectFailure = [](const std::string& path, int systemCode, int code) {
         SCOPED_TRACE(path);
         _tag_VEXOSTAT_ status;
         memset(&status, 0xAB, sizeof status);
-        EXPECT_LT(VLIBCFileLStat(path.c_str(), 9, &status), 0);
-        EXPECT_EQ(errno, systemCode);
-        EXPECT_EQ(VLIBCErrGet(), code);
+        EXPECT_FAILS(VLIBCFileLStat(path.c_str(), 9, &status), systemCode, code);
         EXPECT_EQ(status.st_mode | status.st_uid | status.st_gid | status.st_links | status.st_attributes, 0U);
         EXPECT_EQ(status.st_size | status.st_access | status.st_modify | status.st_change | status.st_create, 0);
         EXPECT_EQ(status.st_device | status.st_inode, 0U);
@@ -77,7 +63,7 @@ TEST_F(StatTest, FailuresLeaveErrnoCodeAndAnEmptyRecord) {
     expectFailure(root_ + "/" + std::string(256, 'n'), ENAMETOOLONG, VEXO_ERR_GENERAL);
     EXPECT_LT(VLIBCFileLStat(nullptr, 1, nullptr), 0);
     SKIP_WITHOUT_ROOT();
-    support::asUser(support::kAliceUid, support::kUsersGid, [&] {
+    asUser(kAliceUid, kUsersGid, [&] {
         expectFailure(root_ + "/closed/a", EACCES, VEXO_ERR_DENIED);
         return 0;
     });

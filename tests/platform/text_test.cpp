@@ -1,11 +1,10 @@
 // The order of names: a strict total preorder for any bytes, and keys that order the same.
 #include "vexo/text.h"
 
-#include <gtest/gtest.h>
-
 #include <random>
 #include <string>
-#include <vector>
+
+#include "support/testing.h"
 
 namespace {
 
@@ -24,31 +23,27 @@ std::string key(const std::string& name) {
 }
 
 TEST(NameOrder, ComparesFoldedCodePoints) {
-    const struct {
-        const char *a, *b;
-        int expected;
-    } cases[] = {
-        {"", "a", -1},
-        {"photo", "PHOTO", 0},
-        {"photo", "Photos", -1},
-        {"[", "a", -1},  // between the cases of ASCII: letters fold down
-        {"_", "A", -1},
-        {"\xC3\xA9", "\xC3\x89", 0},  // é É
-        {"z", "\xC3\xA9", -1},
-        {"k", "\xE2\x84\xAA", 0},                     // the Kelvin sign folds to an ASCII letter
-        {"\xC3\x9F", "ss", 1},                        // folding is simple: no letter becomes two
-        {"\xC8\xBA", "\xE2\xB1\xA5", 0},              // Ⱥ folds to a longer sequence
-        {"\xF0\x90\x90\x80", "\xF0\x90\x90\xA8", 0},  // beyond the first plane
-        {"\xEF\xBF\xBF", "\xF0\x90\x80\x80", -1},     // by code point, not by UTF-16 unit
-        {"\xF4\x8F\xBF\xBF", "\x80", -1},             // a broken byte stands above every code point
-        {"\x80", "\xFF", -1},
-        {"\xC3", "\xC3\xA9", 1},              // cut sequence
-        {"\xC0\x80", "\xC3\xA9", 1},          // overlong
-        {"\xED\xA0\x80", "\xEE\x80\x80", 1},  // surrogate
-        {"\xE2\x82", "\xE2\x83", -1},
-        {"\xE2\x82", "\xE2\x82z", -1},  // each byte of a broken sequence counts by itself
-    };
-    for (const auto& [a, b, expected] : cases) {
+    for (const auto& [a, b, expected] : Rows<const char*, const char*, int>{
+             {"", "a", -1},
+             {"photo", "PHOTO", 0},
+             {"photo", "Photos", -1},
+             {"[", "a", -1},  // between the cases of ASCII: letters fold down
+             {"_", "A", -1},
+             {"\xC3\xA9", "\xC3\x89", 0},  // é É
+             {"z", "\xC3\xA9", -1},
+             {"k", "\xE2\x84\xAA", 0},                     // the Kelvin sign folds to an ASCII letter
+             {"\xC3\x9F", "ss", 1},                        // folding is simple: no letter becomes two
+             {"\xC8\xBA", "\xE2\xB1\xA5", 0},              // Ⱥ folds to a longer sequence
+             {"\xF0\x90\x90\x80", "\xF0\x90\x90\xA8", 0},  // beyond the first plane
+             {"\xEF\xBF\xBF", "\xF0\x90\x80\x80", -1},     // by code point, not by UTF-16 unit
+             {"\xF4\x8F\xBF\xBF", "\x80", -1},             // a broken byte stands above every code point
+             {"\x80", "\xFF", -1},
+             {"\xC3", "\xC3\xA9", 1},              // cut sequence
+             {"\xC0\x80", "\xC3\xA9", 1},          // overlong
+             {"\xED\xA0\x80", "\xEE\x80\x80", 1},  // surrogate
+             {"\xE2\x82", "\xE2\x83", -1},
+             {"\xE2\x82", "\xE2\x82z", -1},  // each byte of a broken sequence counts by itself
+         }) {
         SCOPED_TRACE(testing::Message() << key(a) << " / " << key(b));
         EXPECT_EQ(compare(a, b), expected);
         EXPECT_EQ(compare(b, a), -expected);

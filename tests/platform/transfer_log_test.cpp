@@ -1,30 +1,19 @@
 // The transfer log: its lines and its file.
-#include <gtest/gtest.h>
 #include <json/reader.h>
 #include <json/value.h>
 #include <sys/mount.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
-#include <unistd.h>
 
-#include <cerrno>
-#include <filesystem>
-#include <functional>
 #include <sstream>
-#include <string>
-#include <vector>
 
 #include "platform/private_mounts.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "transfer_entry.h"
-#include "vexo/error.h"
 #include "vexo/xferlog.h"
 
 namespace {
 
-namespace fs = std::filesystem;
-
-class TransferLogTest : public support::ApplianceTest {
+class TransferLogTest : public ApplianceTest {
  protected:
     static Json::Value parse(const std::string& line) {
         Json::Value value;
@@ -34,7 +23,7 @@ class TransferLogTest : public support::ApplianceTest {
     }
     std::vector<std::string> lines() {
         std::vector<std::string> all;
-        std::istringstream in(support::readFile(log_));
+        std::istringstream in(readFile(log_));
         for (std::string line; std::getline(in, line);) all.push_back(line);
         return all;
     }
@@ -80,32 +69,29 @@ TEST_F(TransferLogTest, EntriesOfManyProcessesAreAllThereAndWhole) {
 TEST_F(TransferLogTest, ASwitchedProgramStillLogsAndStaysSwitched) {
     SKIP_WITHOUT_ROOT();
     const auto body = [] {
-        if (setegid(support::kUsersGid) != 0 || seteuid(support::kAliceUid) != 0) return 97;
+        if (setegid(kUsersGid) != 0 || seteuid(kAliceUid) != 0) return 97;
         EXPECT_EQ(VEXOLogKTRFMXferLog("::1", "alice", "mkdir", 0, "/photo/a", true), 0);
-        return geteuid() == support::kAliceUid && getegid() == support::kUsersGid ? 0 : 1;
+        return geteuid() == kAliceUid && getegid() == kUsersGid ? 0 : 1;
     };
-    EXPECT_EQ(support::inChild(body), 0);
+    EXPECT_EQ(inChild(body), 0);
     EXPECT_EQ(lines().size(), 1U);
 }
 
 TEST_F(TransferLogTest, ALogThatOthersCouldHaveForgedIsNotWritten) {
     const auto attempt = [] { return VEXOLogKTRFMXferLog("::1", "u", "delete", 0, "/photo/a", false); };
     const std::string elsewhere = systemRoot() + "/elsewhere";
-    support::writeFile(elsewhere, "");
-    support::makeFolder(fs::path(log_).parent_path());
-    const struct {
-        const char* name;
-        std::function<void()> lay;
-    } traps[] = {{"link", [&] { fs::create_symlink(elsewhere, log_); }},
-                 {"second name", [&] { fs::create_hard_link(elsewhere, log_); }},
-                 {"writable by others", [&] { support::writeFile(log_, "", 0666); }},
-                 {"pipe", [&] { EXPECT_EQ(mkfifo(log_.c_str(), 0600), 0); }}};
-    for (const auto& trap : traps) {
-        SCOPED_TRACE(trap.name);
-        trap.lay();
+    writeFile(elsewhere, "");
+    makeFolder(fs::path(log_).parent_path());
+    for (const auto& [name, lay] :
+         Rows<const char*, std::function<void()>>{{"link", [&] { fs::create_symlink(elsewhere, log_); }},
+                                                  {"second name", [&] { fs::create_hard_link(elsewhere, log_); }},
+                                                  {"writable by others", [&] { writeFile(log_, "", 0666); }},
+                                                  {"pipe", [&] { EXPECT_EQ(mkfifo(log_.c_str(), 0600), 0); }}}) {
+        SCOPED_TRACE(name);
+        lay();
         EXPECT_EQ(attempt(), -1);
         EXPECT_NE(errno, 0);
-        EXPECT_EQ(support::readFile(elsewhere), "");
+        EXPECT_EQ(readFile(elsewhere), "");
         ASSERT_EQ(unlink(log_.c_str()), 0);
     }
     EXPECT_EQ(attempt(), 0);
@@ -117,8 +103,8 @@ TEST_F(TransferLogTest, ALogThatOthersCouldHaveForgedIsNotWritten) {
 TEST_F(TransferLogTest, AFullDiskLeavesNoTornLine) {
     SKIP_WITHOUT_ROOT();
     const std::string folder = fs::path(log_).parent_path();
-    support::makeFolder(folder);
-    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+    makeFolder(folder);
+    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
         EXPECT_EQ(mount("none", folder.c_str(), "tmpfs", 0, "size=16k,mode=0755"), 0);
         const std::string path = "/photo/" + std::string(3000, 'p');
         size_t written = 0;

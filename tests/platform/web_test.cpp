@@ -1,28 +1,23 @@
 // One web request: its fields, cookies and header, and what of a body is refused.
 #include "vexo/web.h"
 
-#include <fcntl.h>
-#include <unistd.h>
-
 #include <cstdio>
-#include <cstdlib>
-#include <functional>
-#include <string>
-#include <vector>
 
 #include "cgi_text.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 
 namespace {
 
 TEST(CgiText, FormText) {
-    struct Case {
-        const char *encoded, *decoded;
-    };
-    for (const auto& [encoded, decoded] :
-         {Case{"", ""}, Case{"a+b%20c%2Bd", "a b c+d"}, Case{"%2fphoto%2F%C3%A9", "/photo/\xC3\xA9"},
-          Case{"%FF", "\xFF"}, Case{"%00", "%00"}, Case{"a%2", "a%2"}, Case{"%", "%"}, Case{"%zz%41", "%zzA"},
-          Case{"%2541", "%41"}}) {
+    for (const auto& [encoded, decoded] : Rows<const char*, const char*>{{"", ""},
+                                                                         {"a+b%20c%2Bd", "a b c+d"},
+                                                                         {"%2fphoto%2F%C3%A9", "/photo/\xC3\xA9"},
+                                                                         {"%FF", "\xFF"},
+                                                                         {"%00", "%00"},
+                                                                         {"a%2", "a%2"},
+                                                                         {"%", "%"},
+                                                                         {"%zz%41", "%zzA"},
+                                                                         {"%2541", "%41"}}) {
         EXPECT_EQ(vexo::decodeFormText(encoded), decoded) << encoded;
     }
     vexo::FormFields fields;
@@ -32,24 +27,21 @@ TEST(CgiText, FormText) {
 }
 
 TEST(CgiText, Cookies) {
-    struct Case {
-        const char *header, *value;
-    };
-    for (const auto& [header, value] : {Case{"id=1", "1"}, Case{"x=0;  id = 1 ;id=2", "1"}, Case{"id=a=b", "a=b"},
-                                        Case{"id=", ""}, Case{"id; id=1", "1"}}) {
+    for (const auto& [header, value] : Rows<const char*, const char*>{
+             {"id=1", "1"}, {"x=0;  id = 1 ;id=2", "1"}, {"id=a=b", "a=b"}, {"id=", ""}, {"id; id=1", "1"}}) {
         EXPECT_EQ(vexo::findCookie(header, "id"), value) << header;
     }
     for (const char* header : {"", "id", "xid=1; ID=2", ";;=;"}) EXPECT_FALSE(vexo::findCookie(header, "id")) << header;
 }
 
 TEST(CgiText, ParseToArray) {
-    struct Case {
-        const char *text, *separator;
-        std::vector<std::string> pieces;
-    };
-    const Case cases[] = {{"a,b,,c", ",", {"a", "b", "", "c"}}, {",", ",", {"", ""}}, {"", ",", {""}},
-                          {"a::b:c", "::", {"a", "b:c"}},       {"a,b", "", {"a,b"}}, {"a,b", nullptr, {"a,b"}}};
-    for (const auto& [text, separator, pieces] : cases) {
+    for (const auto& [text, separator, pieces] :
+         Rows<const char*, const char*, std::vector<std::string>>{{"a,b,,c", ",", {"a", "b", "", "c"}},
+                                                                  {",", ",", {"", ""}},
+                                                                  {"", ",", {""}},
+                                                                  {"a::b:c", "::", {"a", "b:c"}},
+                                                                  {"a,b", "", {"a,b"}},
+                                                                  {"a,b", nullptr, {"a,b"}}}) {
         const Json::Value array = VEXO::WebAPIUtil::ParseToArray(text, separator);
         Json::Value expected(Json::arrayValue);
         for (const std::string& piece : pieces) expected.append(piece);
@@ -58,15 +50,15 @@ TEST(CgiText, ParseToArray) {
     EXPECT_EQ(VEXO::WebAPIUtil::ParseToArray(nullptr, ","), Json::Value(Json::arrayValue));
 }
 
-class WebRequest : public support::ApplianceTest {
+class WebRequest : public ApplianceTest {
  protected:
     // Runs `body` in a process that was started as a CGI program with this body of the request.
     static void post(const std::string& type, const std::string& length, const std::string& text,
                      const std::function<void()>& body) {
         const std::string file = systemRoot() + "/body";
-        support::writeFile(file, text);
+        writeFile(file, text);
         SCOPED_TRACE(type + " " + length);
-        support::inChild([&] {
+        inChild([&] {
             setenv("REQUEST_METHOD", "POST", 1);
             setenv("CONTENT_TYPE", type.c_str(), 1);
             setenv("CONTENT_LENGTH", length.c_str(), 1);
@@ -108,17 +100,18 @@ TEST_F(WebRequest, FieldsOfQueryAndBody) {
 }
 
 TEST_F(WebRequest, ABodyThatIsNotWholeOrTooLongIsRefused) {
-    struct Case {
-        std::string length, text;
-        bool refused;
-    };
     const size_t limit = size_t{1} << 20;
     const std::string longest = "b=" + std::string(limit - 2, 'x');
     for (const auto& [length, text, refused] :
-         {Case{"", "b=1", false}, Case{"0", "", false}, Case{std::to_string(limit), longest, false},
-          Case{std::to_string(limit + 1), longest + "x", true}, Case{"99999999999999999999", "b=1", true},
-          Case{"-1", "b=1", true}, Case{"3x", "b=1", true}, Case{"4", "b=1", true},
-          Case{"4", std::string("b=\0x", 4), true}}) {
+         Rows<std::string, std::string, bool>{{"", "b=1", false},
+                                              {"0", "", false},
+                                              {std::to_string(limit), longest, false},
+                                              {std::to_string(limit + 1), longest + "x", true},
+                                              {"99999999999999999999", "b=1", true},
+                                              {"-1", "b=1", true},
+                                              {"3x", "b=1", true},
+                                              {"4", "b=1", true},
+                                              {"4", std::string("b=\0x", 4), true}}) {
         post("application/x-www-form-urlencoded", length, text,
              [refuse = refused, taken = !refused && text.starts_with("b=") && !length.empty()] {
                  const VEXO::WebCGI web;
@@ -131,7 +124,7 @@ TEST_F(WebRequest, ABodyThatIsNotWholeOrTooLongIsRefused) {
 
 TEST_F(WebRequest, HeaderWithCookies) {
     const std::string file = systemRoot() + "/reply";
-    support::inChild([&] {
+    inChild([&] {
         VEXO::WebCGI web;
         EXPECT_TRUE(web.AddCookieToHeader("/", "link-1", "a b"));
         EXPECT_TRUE(web.AddCookieToHeader("", "x", ""));
@@ -148,7 +141,7 @@ TEST_F(WebRequest, HeaderWithCookies) {
         fflush(stdout);
         return 0;
     });
-    EXPECT_EQ(support::readFile(file),
+    EXPECT_EQ(readFile(file),
               "Set-Cookie: link-1=a b; Path=/\r\nSet-Cookie: x=\r\nContent-Type: text/html; charset=UTF-8\r\n\r\n");
 }
 

@@ -1,0 +1,63 @@
+// What nearly every test of the platform and of the library needs.
+#ifndef ORVEL_TESTS_SUPPORT_TESTING_H
+#define ORVEL_TESTS_SUPPORT_TESTING_H
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+#include <filesystem>
+#include <functional>
+#include <memory>
+#include <string>
+#include <tuple>
+#include <vector>
+
+#include "fault_gate.h"
+#include "orvel/error_state.h"
+#include "support/appliance.h"
+#include "vexo/error.h"
+#include "vexo/list.h"
+
+namespace support {
+
+// The rows of a table: for (const auto& [path, type] : Rows<const char*, int>{{"/", 0}, {"/volume1", 2}}) ...
+template <class... Fields>
+using Rows = std::vector<std::tuple<Fields...>>;
+
+// The status of what must be there, no link followed.
+inline struct stat statusOf(const std::string& path) {
+    struct stat status {};
+    EXPECT_EQ(lstat(path.c_str(), &status), 0) << path;
+    return status;
+}
+
+// The strings of a list, each with a bar behind it; the list stays the caller's. "null" for none.
+inline std::string joined(PVLIBCSZLIST list) {
+    std::string text = list == nullptr ? "null" : "";
+    for (int i = 0; list != nullptr && i < list->nItem; ++i) text += std::string(VLIBCSzListGet(list, i)) + '|';
+    return text;
+}
+
+}  // namespace support
+
+namespace fs = std::filesystem;
+using namespace support;  // tests alone include this
+
+// The platform's operation fails, with this errno and this error number.
+#define EXPECT_FAILS(operation, systemCode, platformCode) \
+    do {                                                  \
+        errno = 0;                                        \
+        VLIBCErrSetEx(0, "", 0);                          \
+        EXPECT_LT(operation, 0);                          \
+        EXPECT_EQ(errno, systemCode);                     \
+        EXPECT_EQ(VLIBCErrGet(), platformCode);           \
+    } while (false)
+
+#endif
