@@ -115,7 +115,8 @@ bool addLoginRecord(const char* user, std::string& session, int neverExpires, co
                        .accessTime = uptime,
                        .position = "1",
                        .neverExpires = never,
-                       .link = linkId},
+                       .link = linkId,
+                       .line = {}},
                       line);
     line.pop_back();  // the platform adds the end
     if (!addLine(line)) return false;

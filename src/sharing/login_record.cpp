@@ -42,20 +42,37 @@ bool parseLine(std::string_view line, LoginRecord& record) {
     return true;
 }
 
+// Are these bytes, a whole line with its end, what would be written for the record?
+bool isAsWritten(std::string_view bytes, const LoginRecord& record) {
+    const std::size_t fields = record.address.size() + record.user.size() + record.session.size() +
+                               record.loginTime.size() + record.accessTime.size() + record.position.size() +
+                               record.neverExpires.size() + record.link.size();
+    constexpr std::size_t kSeparators = 8;  // the end of the line among them
+    return bytes.size() == fields + kSeparators && record.position.end()[0] == ',' &&
+           record.link.end() == bytes.end() - 1;
+}
+
 }  // namespace
 
 bool nextLoginRecord(std::string_view& text, std::size_t longest, LoginRecord& record) {
     while (!text.empty()) {
         const std::size_t end = std::min(text.find('\n'), text.size());
-        // A NUL ends what is read of a line.
         const std::string_view line = text.substr(0, end);
-        text.remove_prefix(std::min(end + 1, text.size()));
-        if (line.size() <= longest && parseLine(line.substr(0, line.find('\0')), record)) return true;
+        const std::string_view bytes = text.substr(0, end + 1);
+        text.remove_prefix(bytes.size());
+        // A NUL ends what is read of a line.
+        if (line.size() > longest || !parseLine(line.substr(0, line.find('\0')), record)) continue;
+        record.line = isAsWritten(bytes, record) ? bytes : std::string_view();
+        return true;
     }
     return false;
 }
 
 void appendLoginRecord(const LoginRecord& record, std::string& out) {
+    if (!record.line.empty()) {
+        out += record.line;
+        return;
+    }
     for (const std::string_view field : {record.address, record.user, record.session, record.loginTime,
                                          record.accessTime, record.position, record.neverExpires}) {
         out += field;
@@ -66,7 +83,8 @@ void appendLoginRecord(const LoginRecord& record, std::string& out) {
 }
 
 long numberOf(std::string_view field) {
-    field.remove_prefix(std::min(field.find_first_not_of(" \t\n\v\f\r"), field.size()));
+    const bool plain = !field.empty() && field[0] >= '0' && field[0] <= '9';
+    if (!plain) field.remove_prefix(std::min(field.find_first_not_of(" \t\n\v\f\r"), field.size()));
     const bool negative = field.starts_with('-');
     if (field.starts_with('+')) {
         field.remove_prefix(1);

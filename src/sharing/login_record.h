@@ -18,6 +18,8 @@ struct LoginRecord {
     std::string_view position;
     std::string_view neverExpires;  // "0": the record expires
     std::string_view link;
+    std::string_view line;  // all of it with its end, where that is how the record would be written; whoever changes a
+                            // field empties it
 };
 
 // Longest line, without its end, that a check and a look-up read; a longer one is no record.

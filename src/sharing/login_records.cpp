@@ -126,6 +126,7 @@ void appendJudged(LoginRecord record, const Check& check, std::string& out) {
     record.accessTime = access;
     record.position = position;
     record.link = check.link;
+    record.line = {};
     appendLoginRecord(record, out);
 }
 
