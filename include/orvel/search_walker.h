@@ -1,5 +1,6 @@
 // A running search: chosen folders and criteria in, a task with its results out. Shares that the file index covers are
-// answered from it, the others are walked; both give the same records.
+// answered from it, the others are walked, and so are folders that no index holds (hidden ones, recycle bins, those
+// behind links); both give the same records.
 //
 // Failures are reported by result and by the platform's error number, and logged at LOG_ERR where a function does not
 // say otherwise; the library code is not set here (look-ups of privileges and paths set theirs). Constructing an object
@@ -132,6 +133,8 @@ class ORVEL_API OrvSearchWalker {
     [[nodiscard]] bool prepare(const std::vector<std::string>& folders, const std::vector<FindComp*>& criteria);
     [[nodiscard]] bool makeTask(const std::vector<FindComp*>& criteria);
     [[nodiscard]] bool search(const std::vector<FindATimeComp*>& accessTimeCriteria);
+    [[nodiscard]] bool searchIndexed(const std::string& shareName, std::vector<PathInfo> folders,
+                                     const std::vector<FindATimeComp*>& accessTimeCriteria);
     [[nodiscard]] bool walkShare(const std::vector<PathInfo>& folders);
     [[nodiscard]] bool walkFolder(const PathInfo& folder);
     [[nodiscard]] bool askIndex(const std::string& shareName, const std::vector<PathInfo>& folders,

@@ -1,6 +1,8 @@
 // A search in a share that the file index covers.
 #include <unistd.h>
 
+#include <algorithm>
+
 #include "core/boundary.h"
 #include "orvel/search_walker.h"
 #include "vexo/user.h"
@@ -33,17 +35,23 @@ class PathConditions {
     std::vector<__tag_FI_SQL_COND> folders_, below_;
 };
 
+struct AccessTest {
+    const std::string& shareRoot;
+    const std::vector<FindATimeComp*>& criteria;
+};
+
 // Access times change without the index knowing, so the file itself is asked.
-BOOL testAccessTime(__tag_FI_FILE_INFO_DATA* record, void* criteria) {
+BOOL testAccessTime(__tag_FI_FILE_INFO_DATA* record, void* argument) {
     return orvel::guardedQuietly(0, [&] {
-        const std::string path = std::string(record->szShareRoot) + "/" + record->szPath;
+        const auto& test = *static_cast<const AccessTest*>(argument);
+        const std::string path = test.shareRoot + "/" + record->szPath;
         _tag_VEXOSTAT_ status{};
         if (VLIBCFileLStat(path.c_str(), kStatusFlags, &status) < 0) return 0;
         record->accessed = status.st_access;
-        for (FindATimeComp* one : *static_cast<const std::vector<FindATimeComp*>*>(criteria)) {
-            if (!(*one)(record->szName, status)) return 0;
-        }
-        return 1;
+        return std::all_of(test.criteria.begin(), test.criteria.end(),
+                           [&](FindATimeComp* one) { return (*one)(record->szName, status); })
+                   ? 1
+                   : 0;
     });
 }
 
@@ -70,7 +78,7 @@ bool OrvSearchWalker::askIndex(const std::string& shareName, const std::vector<P
     DirPrivilegeMap verdicts(folders.front().shareRoot, folders);
     const bool asksTimes = !accessTimeCriteria.empty();
     const bool asksFolders = !seesEverything(user_);
-    std::vector<FindATimeComp*> times = accessTimeCriteria;
+    AccessTest times{folders.front().shareRoot, accessTimeCriteria};
     return FILEIDXResultGetAndTableGen(shareName.c_str(), paths.head(), root_, database_.c_str(),
                                        asksTimes ? testAccessTime : nullptr, &times, cancelFlag_,
                                        asksFolders ? testFolder : nullptr, &verdicts) >= 0;

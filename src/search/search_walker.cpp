@@ -3,11 +3,13 @@
 #include <sys/stat.h>
 #include <syslog.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 
 #include "core/boundary.h"
 #include "orvel/search_task.h"
+#include "search/indexed_folder.h"
 #include "util/printable.h"
 #include "vexo/error.h"
 
@@ -103,17 +105,26 @@ bool OrvSearchWalker::Walk(const std::vector<FindATimeComp*>& accessTimeCriteria
 bool OrvSearchWalker::search(const std::vector<FindATimeComp*>& accessTimeCriteria) {
     for (const auto& [shareName, folders] : map_.shares()) {
         if (cancelled()) break;
-        if (FILEIDXIsIndexEnable(shareName.c_str()) != 1) {
-            if (!walkShare(folders)) return false;
-        } else if (!WalkDB(shareName, folders, accessTimeCriteria)) {
-            return fail(VEXO_ERR_PARAMETER, __LINE__);
-        }
+        const bool done = FILEIDXIsIndexEnable(shareName.c_str()) == 1
+                              ? searchIndexed(shareName, folders, accessTimeCriteria)
+                              : walkShare(folders);
+        if (!done) return false;
     }
     // Whoever waits for the end reads them in another process.
     if (FILEIDXDBFlush(database_.c_str()) < 0) {
         syslog(LOG_ERR, "%s:%d Fail to insert data into DB %s", kSource, __LINE__, orvel::printable(database_).c_str());
     }
     return true;
+}
+
+// Folders that the index cannot know are walked all the same.
+bool OrvSearchWalker::searchIndexed(const std::string& shareName, std::vector<PathInfo> folders,
+                                    const std::vector<FindATimeComp*>& accessTimeCriteria) {
+    const auto unknown = std::stable_partition(folders.begin(), folders.end(), orvel::indexHolds);
+    const std::vector<PathInfo> walked(unknown, folders.end());
+    folders.erase(unknown, folders.end());
+    if (!folders.empty() && !WalkDB(shareName, folders, accessTimeCriteria)) return fail(VEXO_ERR_PARAMETER, __LINE__);
+    return walkShare(walked);
 }
 
 bool OrvSearchWalker::walkShare(const std::vector<PathInfo>& folders) {

@@ -153,10 +153,12 @@ TEST_F(SearchRunTest, WhatAWalkMeets) {
             FindTypeComp files(false);
             const std::vector<FindComp*> all{&files}, none;
             int flag = 0;
+            EXPECT_EQ(OrvLibUGIDSet(nullptr, "bob"), 0);
             OrvSearchWalker walker("bob", nullptr, &flag);
             EXPECT_TRUE(walker.init({"/photo/chosen"}, all));
+            EXPECT_EQ(seteuid(0), 0);
             test.change();
-            EXPECT_EQ(OrvLibUGIDSet(nullptr, "bob"), 0);
+            EXPECT_EQ(seteuid(kBobUid), 0);
             VLIBCErrSetEx(0, "", 0);
             EXPECT_EQ(walker.Walk({}), test.result);
             EXPECT_EQ(VLIBCErrGet(), test.error);

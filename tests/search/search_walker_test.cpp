@@ -41,6 +41,7 @@ class Model {
         for (const std::string& folder : query.folders) {
             const size_t end = std::min(folder.find('/', 1), folder.size());
             std::string share = folder.substr(1, end - 1), within = folder.substr(end);
+            if (within.size() > 1 && within.back() == '/') within.pop_back();
             if (share == "home") share = "homes", within = "/alice" + within;
             visit(share, rootOf(share) + within, within.empty() ? "" : within.substr(1) + "/", true);
         }
@@ -84,7 +85,8 @@ class SearchWalkerTest : public SearchFixture {
             }
             EXPECT_EQ(symlink("2012", (top + "/link.txt").c_str()), 0);
             EXPECT_EQ(mkfifo((top + "/pipe.txt").c_str(), 0600), 0);
-            for (const char* out : {"/@tmp", "/@vexoea", "/#recycle"}) makeFile(top + out + "/a.txt");
+            EXPECT_EQ(symlink("2012", (top + "/link.d").c_str()), 0);
+            for (const char* out : {"/@tmp", "/@vexoea", "/#recycle/bin"}) makeFile(top + out + "/a.txt");
             makeFile(top + "/2012/#recycle/a.txt");
         }
         makeFile(shareRoot("homes") + "/bob/a.txt");
@@ -122,6 +124,11 @@ std::vector<Query> queries() {
     all.push_back({both, {names}, true});
     all.push_back({{"/home"}, {{1, "dir", nullptr}}, true});
     all.push_back({{"/homes"}, {names}});
+    // What no index holds, beside what it does.
+    for (const char* folder :
+         {"/photo/link.d/deep", "/photo/#recycle/bin", "/docs/@tmp", "/docs//2012/", "/docs/2012/../ab"}) {
+        all.push_back({{"/photo/ab", folder}, {names}});
+    }
     return all;
 }
 
