@@ -89,9 +89,9 @@ int FILEIDXCountGet(const char* db, const FIQUERY* query, unsigned long long* co
     if (!condition) return -1;
     const Lease lease(db);
     if (!lease || !lease->commit()) return -1;
-    int64_t found = 0;
-    if (!(query->cond == nullptr ? lease->countAll(found) : lease->count(*condition, found))) return -1;
-    *count = static_cast<unsigned long long>(found);
+    vexo::fileindex::State state{};
+    if (query->cond == nullptr ? !lease->readState(state) : !lease->count(*condition, state.records)) return -1;
+    *count = static_cast<unsigned long long>(state.records);
     return 0;
 } catch (const std::exception&) {
     return outOfMemory();
@@ -111,7 +111,7 @@ int FILEIDXDBSelect(const char* db, const FIQUERY* query, BOOL (*callback)(__tag
         std::vector<vexo::fileindex::OwnedRecord> part;
         {
             const Lease lease(db);
-            if (!lease || !parts.read(*lease, part)) return -1;
+            if (!lease || !lease->commit() || !parts.read(*lease, part)) return -1;
         }
         for (const auto& record : part) {
             __tag_FI_FILE_INFO_DATA view = record.view();

@@ -213,10 +213,13 @@ class Reader {
             below = true;
         }
         if (folder.empty() && below) return always();
-        Condition out{"(path>? AND path<?)", {Value(folder + "/"), Value(folder + "0")}, {{folder}}, {}};
-        if (folder.empty()) return {"parent=?", {Value(std::string())}, {}, {}};
-        if (below) return out;
-        return both(std::move(out), {"parent=?", {Value(folder)}, {}, {}});
+        Condition out{"parent=?", {Value(folder)}, {{{folder, below}}}, {}};
+        if (folder.empty()) return out;
+        const Condition inRange{"(path>? AND path<?)", {Value(folder + "/"), Value(folder + "0")}, {}, {}};
+        if (!below) return both(inRange, std::move(out));
+        out.sql = inRange.sql;
+        out.values = inRange.values;
+        return out;
     }
 
     const Reading reading_;

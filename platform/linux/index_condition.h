@@ -19,12 +19,18 @@ struct Reading {
     bool forTrigrams = false;  // also find what Condition::trigrams says
 };
 
+// Records directly in a folder, or at any depth below it.
+struct Folder {
+    std::string path;
+    bool below;
+};
+
 // What a tree says. `sql` is one parenthesised expression over the columns of a record; `values` are bound in order.
 struct Condition {
     std::string sql;
     std::vector<Value> values;
-    // Only records below one of these folders can satisfy the tree; empty: no such limit is known.
-    std::optional<std::vector<std::string>> folders;
+    // Only records of these folders can satisfy the tree; empty: no such limit is known.
+    std::optional<std::vector<Folder>> folders;
     // A full-text expression over trigrams of names that every record satisfying the tree fits; empty: none is known.
     std::optional<std::string> trigrams;
 };

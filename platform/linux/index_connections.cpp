@@ -2,15 +2,17 @@
 
 #include <pthread.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <condition_variable>
 #include <csignal>
 #include <cstdlib>
 #include <map>
+#include <new>
 #include <string>
+#include <string_view>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include "failure.h"
@@ -35,27 +37,26 @@ struct Entry {
 };
 
 // What one process has open. It is never destroyed, so that it serves also at exit; a forked child begins with an empty
-// one and leaves its parent's connections alone, which SQLite demands.
+// one and leaves its parent's connections alone, as SQLite demands.
 class Connections {
  public:
     static Connections& ofThisProcess();
 
     std::mutex mutex;
-    std::map<std::string, OpenMode> admitted;
+    std::map<std::string, OpenMode, std::less<>> admitted;
 
-    Database* find(const std::string& path);
+    Database* find(std::string_view path);
     bool close(const std::string& path);
     void stop();
 
  private:
-    Connections() : owner_(getpid()) {}
+    Connections() = default;
     Entry* openEntry(const std::string& path, const struct stat& status);
     Database* use(Entry& entry);
     void makeRoom();
     void startCommitter();
     void commitOld();
 
-    pid_t owner_;
     std::vector<std::unique_ptr<Entry>> entries_;
     unsigned long long uses_ = 0;
     std::thread committer_;
@@ -63,25 +64,28 @@ class Connections {
     bool stopping_ = false;
 };
 
-Connections& Connections::ofThisProcess() {
-    static Connections* now = nullptr;
-    if (now == nullptr || now->owner_ != getpid()) {
-        static Connections* inherited = nullptr;
-        inherited = now;  // stays reachable for leak checkers
-        static_cast<void>(inherited);
-        now = new Connections;
-        static const int registered = std::atexit(closeDatabases);
-        static_cast<void>(registered);
-    }
-    return *now;
+Connections* current = nullptr;
+Connections* inherited = nullptr;  // from the parent process; kept reachable for leak checkers
+
+void forgetAfterFork() {
+    inherited = std::exchange(current, nullptr);
 }
 
-Database* Connections::find(const std::string& path) {
+Connections& Connections::ofThisProcess() {
+    static const bool registered =
+        pthread_atfork(nullptr, nullptr, forgetAfterFork) == 0 && std::atexit(closeDatabases) == 0;
+    // Without either, rows could be lost or written twice.
+    if (!registered) throw std::bad_alloc();
+    if (current == nullptr) current = new Connections;
+    return *current;
+}
+
+Database* Connections::find(std::string_view path) {
     const auto same = std::find_if(entries_.begin(), entries_.end(), [&](const auto& e) { return e->path == path; });
     // While a batch is open its file is not asked for again: SQLite sees for itself when it begins the next.
     if (same != entries_.end() && (*same)->database->batchBegan() && (*same)->failure.code == 0) return use(**same);
     struct stat status {};
-    if (lstat(path.c_str(), &status) != 0) {
+    if (lstat(std::string(path).c_str(), &status) != 0) {
         fail(errno == EACCES ? VEXO_ERR_DENIED : VEXO_ERR_FILE);
         return nullptr;
     }
@@ -91,7 +95,7 @@ Database* Connections::find(const std::string& path) {
     });
     if (found != entries_.end()) return use(**found);
     if (same != entries_.end()) entries_.erase(same);
-    Entry* entry = openEntry(path, status);
+    Entry* entry = openEntry(std::string(path), status);
     return entry == nullptr ? nullptr : use(*entry);
 }
 
@@ -180,7 +184,7 @@ void Connections::stop() {
 Lease::Lease(const char* path) {
     Connections& connections = Connections::ofThisProcess();
     lock_ = std::unique_lock<std::mutex>(connections.mutex);
-    if (connections.admitted.contains(path)) raised_.emplace();
+    if (connections.admitted.find(std::string_view(path)) != connections.admitted.end()) raised_.emplace();
     database_ = connections.find(path);
 }
 

@@ -2,8 +2,6 @@
 #include <algorithm>
 #include <exception>
 #include <memory>
-#include <optional>
-#include <string>
 #include <utility>
 #include <vector>
 
@@ -13,6 +11,7 @@
 #include "index_condition.h"
 #include "index_connections.h"
 #include "index_reading.h"
+#include "index_search.h"
 #include "index_store.h"
 #include "raise.h"
 #include "vexo/index.h"
@@ -31,25 +30,6 @@ struct Tests {
 bool holds(const Tests& tests, __tag_FI_FILE_INFO_DATA& record) {
     if (tests.folder != nullptr && tests.folder(record.szParent, tests.folderArgument) == 0) return false;
     return tests.access == nullptr || tests.access(&record, tests.accessArgument) != 0;
-}
-
-bool isCancelled(const int* cancel) {
-    return cancel != nullptr && __atomic_load_n(cancel, __ATOMIC_RELAXED) != 0;
-}
-
-int progress(void* cancel) {
-    return static_cast<int>(isCancelled(static_cast<const int*>(cancel)));
-}
-
-// The ids that satisfy everything but the caller's tests. A cancelled search finds none.
-bool findIds(Database& index, const Condition& condition, int* cancel, std::vector<int64_t>& ids) {
-    constexpr int steps = 100000;  // of SQLite's machine, a few milliseconds
-    sqlite3_progress_handler(index.handle(), steps, cancel == nullptr ? nullptr : progress, cancel);
-    const bool found = index.select(condition, ids);
-    sqlite3_progress_handler(index.handle(), 0, nullptr, nullptr);
-    if (found || !isCancelled(cancel)) return found;
-    ids.clear();
-    return true;
 }
 
 bool insertInto(const char* out, const std::vector<__tag_FI_FILE_INFO_DATA>& records) {
@@ -94,7 +74,7 @@ int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_COND* path
     {
         const vexo::RaisedIdentity raised;
         index = openIndex(share);
-        if (index == nullptr || !findIds(*index, both(std::move(*where), std::move(*what)), cancel, ids)) return -1;
+        if (index == nullptr || !searchIndex(*index, both(std::move(*where), std::move(*what)), cancel, ids)) return -1;
     }
     return copy(*index, ids, out, {accessTest, accessArg, folderTest, folderArg}, cancel) ? 0 : -1;
 } catch (const std::exception&) {

@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <ctime>
 #include <utility>
 
 #include "failure.h"
@@ -21,7 +22,7 @@ namespace {
 using Node = __tag_FI_SQL_COND;
 
 // In a search that finds much, a batch is this large; in one that finds little, it is this old.
-constexpr int kBatchRows = 10000;
+constexpr int kBatchRows = 50000;
 constexpr std::chrono::milliseconds kBatchAge(300);
 constexpr int kBusyMilliseconds = 10000;
 constexpr int kSoonMilliseconds = 100;
@@ -33,7 +34,7 @@ constexpr std::array<const char*, 4> kSchema = {
     "extension BLOB,permission BLOB,owner BLOB,group_name BLOB,is_dir INTEGER,size INTEGER,created INTEGER,"
     "changed INTEGER,accessed INTEGER,modified INTEGER,mode INTEGER,uid INTEGER,gid INTEGER)",
     "CREATE UNIQUE INDEX record_address ON record(share,path)",
-    "CREATE TABLE state(records INTEGER,built INTEGER,updated INTEGER)",
+    "CREATE TABLE state(records INTEGER,written INTEGER,built INTEGER,updated INTEGER)",
     "CREATE TABLE ranking(id INTEGER PRIMARY KEY,records BLOB)",
 };
 
@@ -167,21 +168,21 @@ bool Database::configure(OpenMode mode) {
     // Results are worth nothing after a loss of power, but must survive the death of their writer. Pages that a large
     // batch changed wait in memory: written early, they would lock readers out for the rest of the batch.
     constexpr const char* common =
-        "PRAGMA cell_size_check=ON;PRAGMA temp_store=MEMORY;PRAGMA secure_delete=OFF;PRAGMA cache_spill=OFF;"
+        "PRAGMA temp_store=MEMORY;PRAGMA secure_delete=OFF;PRAGMA cache_spill=OFF;"
         "PRAGMA cache_size=-16384;";
     return execute(db_, common) && execute(db_, mode.ofShare ? "PRAGMA synchronous=FULL;PRAGMA mmap_size=2147418112;"
-                                                             : "PRAGMA synchronous=OFF;PRAGMA mmap_size=0;");
+                                                             : "PRAGMA synchronous=OFF;PRAGMA mmap_size=0;PRAGMA cell_size_check=ON;");
 }
 
 bool Database::makeSchema() {
     const std::string identity =
-        "PRAGMA page_size=4096;PRAGMA auto_vacuum=NONE;BEGIN;PRAGMA application_id=" + std::to_string(kApplicationId) +
+        "PRAGMA page_size=8192;PRAGMA auto_vacuum=NONE;BEGIN;PRAGMA application_id=" + std::to_string(kApplicationId) +
         ";";
     if (!execute(db_, identity.c_str())) return false;
     for (const char* sql : kSchema) {
         if (!execute(db_, sql)) return false;
     }
-    return execute(db_, "INSERT INTO state VALUES(0,0,0);COMMIT");
+    return execute(db_, "INSERT INTO state VALUES(0,0,0,0);COMMIT");
 }
 
 bool Database::hasOurSchema(bool ofShare) {
@@ -229,7 +230,8 @@ bool Database::written(bool done) {
 
 bool Database::commit() {
     if (!began_) return true;
-    const std::string counted = "UPDATE state SET records=records+(" + std::to_string(added_) + ");COMMIT";
+    const std::string counted = "UPDATE state SET records=records+(" + std::to_string(added_) +
+                                "),written=" + std::to_string(time(nullptr)) + ";COMMIT";
     const bool done = execute(db_, counted.c_str());
     if (!done) {
         const KeepErrno keep;
@@ -334,10 +336,13 @@ bool Database::count(const Condition& condition, int64_t& count) {
     return true;
 }
 
-bool Database::countAll(int64_t& count) {
+bool Database::readState(State& state) {
     Statement statement;
-    if (!statement.prepare(db_, "SELECT records FROM state") || statement.step() != Statement::kRow) return false;
-    count = std::max<int64_t>(statement.number(0), 0);
+    if (!statement.prepare(db_, "SELECT records,written,built,updated FROM state") ||
+        statement.step() != Statement::kRow) {
+        return false;
+    }
+    state = {std::max<int64_t>(statement.number(0), 0), statement.number(1), statement.number(2), statement.number(3)};
     return true;
 }
 

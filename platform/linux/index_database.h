@@ -19,6 +19,14 @@ struct OpenMode {
     bool ofShare = false;  // in the central store: it may hold the trigrams of names, and outlives a loss of power
 };
 
+// What a database says about itself; times are seconds since the epoch, 0 for never.
+struct State {
+    int64_t records;
+    int64_t written;  // when a record was last added, changed or removed
+    int64_t built;    // of a share's index: when it was built
+    int64_t updated;  // and when that or an update ended
+};
+
 // What only the index of a share holds beside the records: trigrams of names, kept by triggers, and an index on
 // folders.
 extern const char* const kShareSchema;
@@ -56,7 +64,7 @@ class Database {
     // The ids of the records that satisfy the condition, ascending.
     [[nodiscard]] bool select(const Condition& condition, std::vector<int64_t>& ids);
     [[nodiscard]] bool count(const Condition& condition, int64_t& count);
-    [[nodiscard]] bool countAll(int64_t& count);
+    [[nodiscard]] bool readState(State& state);
 
  private:
     Database(std::string path, sqlite3* db) : path_(std::move(path)), db_(db) {}

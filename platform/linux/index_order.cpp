@@ -1,7 +1,5 @@
 #include "index_order.h"
 
-#include <sys/stat.h>
-
 #include <algorithm>
 #include <cstring>
 #include <ctime>
@@ -15,9 +13,9 @@
 namespace vexo::fileindex {
 namespace {
 
-constexpr size_t kPartRecords = 4096;    // of an order, in one row
-constexpr size_t kWorthKeeping = 10000;  // records; fewer are sorted at each request
-constexpr time_t kQuietSeconds = 1;      // without a change, and the search has most likely ended
+constexpr size_t kPartRecords = 4096;     // of an order, in one row
+constexpr int64_t kWorthKeeping = 10000;  // records; fewer are sorted at each request
+constexpr int64_t kQuietSeconds = 1;      // without a change, and the search has most likely ended
 constexpr size_t kAll = std::numeric_limits<size_t>::max();
 
 // The first row of the order in the table of rankings: one number for each combination of columns and directions.
@@ -30,11 +28,12 @@ int64_t firstRow(const FIQUERY& query) {
     return number << 32;
 }
 
-bool isQuiet(const Database& database) {
-    struct stat status {};
-    if (stat(database.path().c_str(), &status) != 0) return false;
-    const time_t age = time(nullptr) - status.st_mtim.tv_sec;
-    return age < 0 || age > kQuietSeconds;
+// Whether an order is worth keeping: there are many records, and their search has most likely ended. A clock that was
+// set back counts as time gone by.
+bool isWorthKeeping(const State& state) {
+    const int64_t now = time(nullptr);
+    const bool isQuiet = state.written > now || now - state.written > kQuietSeconds;
+    return state.records >= kWorthKeeping && isQuiet;
 }
 
 bool addKeys(Database& database, const FIQUERY& query, const Condition& condition, Sorter& sorter) {
@@ -224,10 +223,9 @@ bool selectPage(Database& database, const FIQUERY& query, std::vector<int64_t>& 
     bool kept = false;
     if (!findOrder(database, query, kept)) return false;
     if (kept) return pageOfKept(database, query, *condition, ids);
-    int64_t records = 0;
-    if (!database.countAll(records)) return false;
-    const bool isWorthKeeping = static_cast<size_t>(records) >= kWorthKeeping && isQuiet(database);
-    if (isWorthKeeping) return pageOfNew(database, query, *condition, ids);
+    State state{};
+    if (!database.readState(state)) return false;
+    if (isWorthKeeping(state)) return pageOfNew(database, query, *condition, ids);
     return sortNow(database, query, *condition, query.offset, query.limit, ids);
 }
 

@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <string>
 
+#include "failure.h"
+
 namespace vexo::fileindex {
 namespace {
 
@@ -11,6 +13,15 @@ constexpr size_t kPart = 256;
 }  // namespace
 
 bool PartReader::read(Database& database, std::vector<OwnedRecord>& part) {
+    // One transaction: locks taken for every record would cost more than the records.
+    if (!execute(database.handle(), "BEGIN")) return false;
+    const bool done = readRecords(database, part);
+    const KeepErrno keep;
+    database.rollBack();
+    return done;
+}
+
+bool PartReader::readRecords(Database& database, std::vector<OwnedRecord>& part) {
     static const std::string sql = std::string("SELECT ") + kRecordColumns + " FROM record WHERE id=?";
     Statement statement;
     if (!statement.prepare(database.handle(), sql)) return false;

@@ -18,6 +18,8 @@ class PartReader {
     [[nodiscard]] bool read(Database& database, std::vector<OwnedRecord>& part);
 
  private:
+    [[nodiscard]] bool readRecords(Database& database, std::vector<OwnedRecord>& part);
+
     const std::vector<int64_t>& ids_;
     size_t next_ = 0;
 };

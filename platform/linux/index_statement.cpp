@@ -75,6 +75,11 @@ bool Statement::bindBytes(int at, std::string_view bytes) {
            failSql(sqlite3_db_handle(statement_));
 }
 
+bool Statement::bindText(int at, std::string_view text) {
+    return sqlite3_bind_text64(statement_, at, text.data(), text.size(), SQLITE_STATIC, SQLITE_UTF8) == SQLITE_OK ||
+           failSql(sqlite3_db_handle(statement_));
+}
+
 bool Statement::bind(const std::vector<Value>& values) {
     int at = 0;
     for (const Value& value : values) {

@@ -58,6 +58,7 @@ class Statement {
     [[nodiscard]] bool bind(const std::vector<Value>& values);
     [[nodiscard]] bool bind(int at, int64_t value);
     [[nodiscard]] bool bindBytes(int at, std::string_view bytes);
+    [[nodiscard]] bool bindText(int at, std::string_view text);  // for full-text expressions alone
 
     enum Step { kFailed = -1, kDone = 0, kRow = 1 };
     [[nodiscard]] Step step();

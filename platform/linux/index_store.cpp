@@ -156,18 +156,16 @@ std::string definedName(const char* share) {
 bool readStatus(const std::string& share, FIINDEXSTATUS& status) {
     const std::unique_ptr<Database> database = openIndex(share);
     if (database == nullptr) return false;
-    Statement statement;
     struct stat file {};
-    if (!statement.prepare(database->handle(),
-                           "SELECT records,built,updated,(SELECT count(*) FROM record WHERE is_dir=1) FROM state") ||
-        statement.step() != Statement::kRow || lstat(indexPath(share).c_str(), &file) != 0) {
+    State state{};
+    int64_t folders = 0;
+    if (!database->readState(state) || !database->count({"is_dir=1", {}, {}, {}}, folders)) return false;
+    if (lstat(indexPath(share).c_str(), &file) != 0) {
+        fail(errorOfErrno(errno));
         return false;
     }
-    status.records = static_cast<unsigned long long>(statement.number(0));
-    status.built = statement.number(1);
-    status.updated = statement.number(2);
-    status.folders = static_cast<unsigned long long>(statement.number(3));
-    status.bytes = file.st_size;
+    status = {static_cast<unsigned long long>(state.records), static_cast<unsigned long long>(folders), file.st_size,
+              state.built, state.updated};
     return true;
 }
 
