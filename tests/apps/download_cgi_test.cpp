@@ -1,23 +1,15 @@
 // The program download, run as a web server runs it. Archives are read back by libarchive's own reader.
 #include <archive.h>
 #include <archive_entry.h>
-#include <fcntl.h>
-#include <gtest/gtest.h>
-#include <sys/stat.h>
 #include <sys/sysmacros.h>
-#include <unistd.h>
 
 #include <clocale>
-#include <filesystem>
 
 #include "apps/program.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "text.h"
 
-namespace fs = std::filesystem;
 using orvel::cgi::percentEncode;
-using support::CgiReply;
-using support::RawReply;
 
 namespace {
 
@@ -48,14 +40,13 @@ Members membersOf(const std::string& zip) {
     return members;
 }
 
-class DownloadCgi : public support::ApplianceTest {
+class DownloadCgi : public ApplianceTest {
  protected:
-    static std::string ask(const std::string& user, const std::string& query, const support::Variables& more = {},
+    static std::string ask(const std::string& user, const std::string& query, const Variables& more = {},
                            const std::string& method = "GET") {
-        return support::runCgi(PROGRAM_DOWNLOAD, user, method, query, "", more);
+        return runCgi(PROGRAM_DOWNLOAD, user, method, query, "", more);
     }
-    static RawReply fetch(const std::string& path, const support::Variables& more = {},
-                          const std::string& method = "GET") {
+    static RawReply fetch(const std::string& path, const Variables& more = {}, const std::string& method = "GET") {
         return RawReply(ask("alice", "path=" + percentEncode(path), more, method));
     }
     static Members zip(const std::string& query) {
@@ -68,8 +59,8 @@ class DownloadCgi : public support::ApplianceTest {
 
 TEST_F(DownloadCgi, AFileComesWholeOrInPart) {
     const std::string data("0123456789\0\r\n\xFF", 14);
-    support::writeFile(shareRoot("photo") + "/f.html", data, 0644);
-    support::writeFile(shareRoot("photo") + "/empty", "", 0644);
+    writeFile(shareRoot("photo") + "/f.html", data, 0644);
+    writeFile(shareRoot("photo") + "/empty", "", 0644);
     const RawReply whole = fetch("/photo/f.html");
     EXPECT_EQ(whole.status, 200);
     EXPECT_EQ(whole.body, data);
@@ -81,7 +72,7 @@ TEST_F(DownloadCgi, AFileComesWholeOrInPart) {
     const std::string tag = whole.headers.at("ETag"), date = whole.headers.at("Last-Modified");
     struct {
         const char* method;
-        support::Variables headers;
+        Variables headers;
         int status;
         std::string body, range;
     } const cases[] = {
@@ -113,13 +104,13 @@ TEST_F(DownloadCgi, AFileComesWholeOrInPart) {
     }
     EXPECT_EQ(fetch("/photo/empty").headers.at("Content-Length"), "0");
     EXPECT_EQ(fetch("/photo/empty", {{"HTTP_RANGE", "bytes=0-"}}).status, 416);
-    support::writeFile(shareRoot("photo") + "/f.html", "another time", 0644);
+    writeFile(shareRoot("photo") + "/f.html", "another time", 0644);
     EXPECT_EQ(fetch("/photo/f.html", {{"HTTP_IF_NONE_MATCH", tag}}).status, 200);
 }
 
 TEST_F(DownloadCgi, NamesOfAnyBytes) {
     const std::string name = "\xE9 \"\n;.txt";
-    support::writeFile(shareRoot("photo") + "/" + name, "x", 0644);
+    writeFile(shareRoot("photo") + "/" + name, "x", 0644);
     const RawReply reply(ask("alice", "path_raw=" + percentEncode("/photo/" + percentEncode(name))));
     EXPECT_EQ(reply.body, "x");
     EXPECT_EQ(reply.headers.at("Content-Disposition"),
@@ -129,8 +120,8 @@ TEST_F(DownloadCgi, NamesOfAnyBytes) {
 TEST_F(DownloadCgi, RefusalsShowInTheStatus) {
     const std::string root = shareRoot("photo");
     addShare("preview", "read only = no\nvalid users = alice\nvexo:restriction = 4\n");
-    support::writeFile(shareRoot("preview") + "/f", "secret", 0644);
-    support::writeFile(root + "/folder/f", "x", 0644);
+    writeFile(shareRoot("preview") + "/f", "secret", 0644);
+    writeFile(root + "/folder/f", "x", 0644);
     ASSERT_EQ(mkfifo((root + "/pipe").c_str(), 0666), 0);
     fs::create_symlink("folder/f", root + "/inside");
     fs::create_symlink("/etc/passwd", root + "/outside");
@@ -171,12 +162,12 @@ TEST_F(DownloadCgi, RefusalsShowInTheStatus) {
 
 TEST_F(DownloadCgi, FoldersAndSeveralPathsComeAsZip) {
     const std::string root = shareRoot("photo");
-    support::makeFolder(root + "/sub/empty");
+    makeFolder(root + "/sub/empty");
     for (const char* name : {"/sub/ü.txt", "/sub/日本", "/sub/\xE9", "/sub/\xE8"}) {
-        support::writeFile(root + name, name, 0644);
+        writeFile(root + name, name, 0644);
     }
-    support::writeFile(root + "/sub/@tmp/x", "hidden", 0644);
-    support::writeFile(root + "/other/sub/big", std::string(300000, 'z'), 0644);
+    writeFile(root + "/sub/@tmp/x", "hidden", 0644);
+    writeFile(root + "/other/sub/big", std::string(300000, 'z'), 0644);
     fs::create_symlink("/etc/passwd", root + "/sub/link");
     ASSERT_EQ(mkfifo((root + "/sub/pipe").c_str(), 0666), 0);
 
@@ -203,9 +194,9 @@ TEST_F(DownloadCgi, FoldersAndSeveralPathsComeAsZip) {
 TEST_F(DownloadCgi, AZipTellsWhatItLacks) {
     SKIP_WITHOUT_ROOT();
     const std::string root = shareRoot("photo");
-    support::writeFile(root + "/sub/readable", "x", 0644);
-    support::writeFile(root + "/sub/closed.txt", "secret", 0600);
-    support::writeFile(root + "/sub/closed/inner", "secret", 0644);
+    writeFile(root + "/sub/readable", "x", 0644);
+    writeFile(root + "/sub/closed.txt", "secret", 0600);
+    writeFile(root + "/sub/closed/inner", "secret", 0644);
     chmod((root + "/sub/closed").c_str(), 0700);
     const Members members = zip("path=/photo/sub");
     EXPECT_EQ(members.at("sub/readable"), "x");
@@ -218,7 +209,7 @@ TEST_F(DownloadCgi, AZipTellsWhatItLacks) {
 
 TEST_F(DownloadCgi, TheTransferLogTellsWhatWasSent) {
     const std::string log = systemRoot() + "/var/log/vexo/xfer.log";
-    support::writeFile(shareRoot("photo") + "/f", "0123456789", 0644);
+    writeFile(shareRoot("photo") + "/f", "0123456789", 0644);
     fetch("/photo/f");
     EXPECT_FALSE(fs::exists(log));
     setSetting("pexlanderxferlog", "yes");
@@ -226,7 +217,7 @@ TEST_F(DownloadCgi, TheTransferLogTellsWhatWasSent) {
     fetch("/photo/f", {}, "HEAD");
     fetch("/photo/missing");
     zip("path=/photo/f&path=/photo");
-    const std::string text = support::readFile(log);
+    const std::string text = readFile(log);
     EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 3) << text;
     EXPECT_NE(text.find("\"download\""), std::string::npos) << text;
     EXPECT_NE(text.find("\"size\":3"), std::string::npos) << text;

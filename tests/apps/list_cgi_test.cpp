@@ -1,21 +1,13 @@
 // The program list, run as a web server runs it.
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <filesystem>
 #include <set>
 
 #include "apps/program.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "text.h"
-
-namespace fs = std::filesystem;
-using support::CgiReply;
 
 namespace {
 
-class ListCgi : public support::ApplianceTest {
+class ListCgi : public ApplianceTest {
  protected:
     static CgiReply ask(const std::string& user, const std::string& query,
                         const std::map<std::string, std::string>& more = {}) {
@@ -25,7 +17,7 @@ class ListCgi : public support::ApplianceTest {
                                                         {"REMOTE_USER", user},
                                                         {"QUERY_STRING", query}};
         for (const auto& [name, value] : more) variables[name] = value;
-        const support::Finished finished = support::runProgram({PROGRAM_LIST}, variables);
+        const Finished finished = runProgram({PROGRAM_LIST}, variables);
         EXPECT_EQ(finished.status, 0) << query;
         return CgiReply(finished.output);
     }
@@ -68,7 +60,7 @@ TEST_F(ListCgi, RepliesCarryTheirHeadersAndTheNewSessionOnce) {
 
 TEST_F(ListCgi, EachUserSeesTheOwnShares) {
     addShare("music", "read only = no\nvalid users = alice\nvexo:synced = yes\n");
-    for (const char* user : {"alice", "bob"}) support::makeFolder(shareRoot("homes") + "/" + user);
+    for (const char* user : {"alice", "bob"}) makeFolder(shareRoot("homes") + "/" + user);
     EXPECT_EQ(names(ask("alice", "action=shares")), (Names{"home", "photo", "homes", "music"})) << "home first";
     addShare("hidden", "browseable = no\nread only = no\nvalid users = alice\n");
     EXPECT_EQ(names(ask("alice", "action=shares&sort_by=name")), (Names{"home", "homes", "music", "photo"}));
@@ -87,7 +79,7 @@ TEST_F(ListCgi, RefusalsSayWhy) {
     addShare("music", "read only = no\nvalid users = alice\ninvalid users = bob\n");
     addShare("sealed", "read only = no\nvalid users = bob\nvexo:restriction = 1\n");
     const std::string root = shareRoot("photo");
-    support::writeFile(root + "/file.txt", "x", 0644);
+    writeFile(root + "/file.txt", "x", 0644);
     addMount(root + "/dead", "nfs");
     struct {
         std::string path;
@@ -149,12 +141,12 @@ TEST_F(ListCgi, ParametersAreTakenStrictly) {
 
 TEST_F(ListCgi, APageIsSortedCountedAndFiltered) {
     const std::string root = shareRoot("photo");
-    support::makeFolder(root + "/b-folder");
-    support::makeFolder(root + "/a-folder");
+    makeFolder(root + "/b-folder");
+    makeFolder(root + "/a-folder");
     for (const char* name : {"one.jpg", "three.jpg", "seven.png"}) {
-        support::writeFile(root + "/" + name, std::string(std::string(name).size(), 'x'));
+        writeFile(root + "/" + name, std::string(std::string(name).size(), 'x'));
     }
-    support::writeFile(root + "/ten.jpg", std::string(10, 'x'));
+    writeFile(root + "/ten.jpg", std::string(10, 'x'));
     struct {
         const char* parameters;
         Names names;
@@ -188,10 +180,10 @@ TEST_F(ListCgi, APageIsSortedCountedAndFiltered) {
 
 TEST_F(ListCgi, NamesOfAnyBytesTravelAndComeBack) {
     const std::string root = shareRoot("photo");
-    support::makeFolder(root + "/\xE9t\xE9", 0777);
+    makeFolder(root + "/\xE9t\xE9", 0777);
     const std::string markup = "<b>\"\\\n\x7F\u202E.txt";
-    support::writeFile(root + "/\xE9t\xE9/dedans\xFF.txt", "x");
-    support::writeFile(root + "/\xE9t\xE9/" + markup, "x");
+    writeFile(root + "/\xE9t\xE9/dedans\xFF.txt", "x");
+    writeFile(root + "/\xE9t\xE9/" + markup, "x");
 
     const CgiReply outer = folder("alice", "/photo", "&additional=real_path,size,type");
     const Json::Value item = outer.json["data"]["items"][0];
@@ -215,10 +207,10 @@ TEST_F(ListCgi, NamesOfAnyBytesTravelAndComeBack) {
 
 TEST_F(ListCgi, NothingLeadsOutOfAShare) {
     const std::string root = shareRoot("photo");
-    support::makeFolder(root + "/folder/deep");
-    support::writeFile(root + "/folder/inside.txt", "x");
+    makeFolder(root + "/folder/deep");
+    writeFile(root + "/folder/inside.txt", "x");
     const std::string outside = addShare("other", "");
-    support::writeFile(outside + "/secret.txt", "x");
+    writeFile(outside + "/secret.txt", "x");
     fs::create_symlink("folder", root + "/inside");
     fs::create_symlink("../folder/../inside", root + "/folder/around");
     fs::create_symlink(outside, root + "/absolute");
@@ -250,8 +242,8 @@ TEST_F(ListCgi, TheHomeIsMadeOnFirstUse) {
     struct stat status = {};
     ASSERT_EQ(stat((homes + "/alice").c_str(), &status), 0);
     EXPECT_EQ(status.st_mode & 07777, 0755U);
-    EXPECT_EQ(status.st_uid, support::kAliceUid);
-    EXPECT_EQ(status.st_gid, support::kUsersGid);
+    EXPECT_EQ(status.st_uid, kAliceUid);
+    EXPECT_EQ(status.st_gid, kUsersGid);
     EXPECT_EQ(folder("carol", "/home").json["success"], true);
     EXPECT_EQ(folder("alice", "/home/../bob").json["error"]["code"], 407);
 }
@@ -259,14 +251,14 @@ TEST_F(ListCgi, TheHomeIsMadeOnFirstUse) {
 TEST_F(ListCgi, TheKernelJudgesAsTheUser) {
     SKIP_WITHOUT_ROOT();
     const std::string root = shareRoot("photo");
-    support::makeFolder(root + "/private", 0700);
-    ASSERT_EQ(chown((root + "/private").c_str(), support::kAliceUid, support::kUsersGid), 0);
+    makeFolder(root + "/private", 0700);
+    ASSERT_EQ(chown((root + "/private").c_str(), kAliceUid, kUsersGid), 0);
     addShare("photo", "read only = no\nvalid users = alice, bob, carol\n");
     EXPECT_TRUE(folder("alice", "/photo/private").json["success"].asBool());
     EXPECT_EQ(folder("bob", "/photo/private").json["error"]["code"], 407);
     EXPECT_TRUE(folder("carol", "/photo/private").json["success"].asBool()) << "an administrator";
     // Root's own groups must not help, nor his permissions below a folder that can be entered.
-    support::makeFolder(root + "/root's", 0750);
+    makeFolder(root + "/root's", 0750);
     EXPECT_EQ(folder("alice", "/photo/root's").json["error"]["code"], 407);
 }
 

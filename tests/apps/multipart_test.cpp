@@ -1,9 +1,6 @@
 #include "multipart.h"
 
-#include <gtest/gtest.h>
-
-#include <string>
-#include <vector>
+#include "support/testing.h"
 
 namespace {
 
@@ -66,35 +63,29 @@ TEST(Multipart, PartsInPiecesOfAnySize) {
 }
 
 TEST(Multipart, Malformed) {
-    struct Case {
-        const char* what;
-        std::string body;
-        Status status;
-    };
-    const Case cases[] = {
-        {"nothing", "", Status::kMore},
-        {"no delimiter", "just text", Status::kMore},
-        {"cut in the data", field("name=a", "data"), Status::kMore},
-        {"cut in the headers", "--XX\r\nContent-Disp", Status::kMore},
-        {"no name", field("filename=x", "data"), Status::kMalformed},
-        {"another disposition", "--XX\r\nContent-Disposition: attachment; name=a\r\n\r\nx\r\n--XX--",
-         Status::kMalformed},
-        {"no headers", "--XX\r\n\r\ndata\r\n--XX--", Status::kMalformed},
-        {"junk behind the delimiter", "--XXjunk\r\n\r\n", Status::kMalformed},
-        {"endless headers", "--XX\r\n" + std::string(20000, 'h'), Status::kMalformed},
-        {"too many parts",
-         [] {
-             std::string body;
-             for (int i = 0; i < 1001; ++i) body += field("name=a", "");
-             return body;
-         }(),
-         Status::kMalformed},
-        {"the sink stops", field("name=stop", "data"), Status::kStopped},
-    };
-    for (const auto& test : cases) {
-        SCOPED_TRACE(test.what);
+    for (const auto& [what, body, status] : Rows<const char*, std::string, Status>{
+             {"nothing", "", Status::kMore},
+             {"no delimiter", "just text", Status::kMore},
+             {"cut in the data", field("name=a", "data"), Status::kMore},
+             {"cut in the headers", "--XX\r\nContent-Disp", Status::kMore},
+             {"no name", field("filename=x", "data"), Status::kMalformed},
+             {"another disposition", "--XX\r\nContent-Disposition: attachment; name=a\r\n\r\nx\r\n--XX--",
+              Status::kMalformed},
+             {"no headers", "--XX\r\n\r\ndata\r\n--XX--", Status::kMalformed},
+             {"junk behind the delimiter", "--XXjunk\r\n\r\n", Status::kMalformed},
+             {"endless headers", "--XX\r\n" + std::string(20000, 'h'), Status::kMalformed},
+             {"too many parts",
+              [] {
+                  std::string body;
+                  for (int i = 0; i < 1001; ++i) body += field("name=a", "");
+                  return body;
+              }(),
+              Status::kMalformed},
+             {"the sink stops", field("name=stop", "data"), Status::kStopped},
+         }) {
+        SCOPED_TRACE(what);
         Collector all;
-        EXPECT_EQ(readWhole(test.body, all, 5), test.status);
+        EXPECT_EQ(readWhole(body, all, 5), status);
     }
 }
 
@@ -111,19 +102,16 @@ TEST(Multipart, MemoryStaysFlat) {
 }
 
 TEST(Multipart, Boundary) {
-    struct Case {
-        std::string type, boundary;
-    };
-    const Case cases[] = {
-        {"multipart/form-data; boundary=abc", "abc"},
-        {"Multipart/Form-Data ;charset=x; BOUNDARY=\"a b;c\" ; x=y", "a b;c"},
-        {"multipart/form-data", ""},
-        {"multipart/form-data; boundary=", ""},
-        {"multipart/mixed; boundary=abc", ""},
-        {"multipart/form-data; boundary=" + std::string(71, 'b'), ""},
-        {"", ""},
-    };
-    for (const auto& test : cases) EXPECT_EQ(orvel::cgi::boundaryOf(test.type), test.boundary) << test.type;
+    for (const auto& [type, boundary] : Rows<std::string, std::string>{
+             {"multipart/form-data; boundary=abc", "abc"},
+             {"Multipart/Form-Data ;charset=x; BOUNDARY=\"a b;c\" ; x=y", "a b;c"},
+             {"multipart/form-data", ""},
+             {"multipart/form-data; boundary=", ""},
+             {"multipart/mixed; boundary=abc", ""},
+             {"multipart/form-data; boundary=" + std::string(71, 'b'), ""},
+             {"", ""},
+         })
+        EXPECT_EQ(orvel::cgi::boundaryOf(type), boundary) << type;
 }
 
 }  // namespace

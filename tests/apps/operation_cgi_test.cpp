@@ -1,26 +1,18 @@
 // The program operation, run as a web server runs it.
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <filesystem>
-
 #include "apps/program.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "text.h"
 
-namespace fs = std::filesystem;
 using orvel::cgi::percentEncode;
-using support::CgiReply;
 
 namespace {
 
-class OperationCgi : public support::ApplianceTest {
+class OperationCgi : public ApplianceTest {
  protected:
     static CgiReply ask(const std::string& user, const std::string& form, const std::string& method = "POST") {
-        if (method == "GET") return CgiReply(support::runCgi(PROGRAM_OPERATION, user, method, form));
-        return CgiReply(support::runCgi(PROGRAM_OPERATION, user, method, "", form,
-                                        {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
+        if (method == "GET") return CgiReply(runCgi(PROGRAM_OPERATION, user, method, form));
+        return CgiReply(
+            runCgi(PROGRAM_OPERATION, user, method, "", form, {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
     }
     static int code(const CgiReply& reply) { return reply.json["error"]["code"].asInt(); }
     static int mkdir(const std::string& user, const std::string& path, const std::string& more = "") {
@@ -47,7 +39,7 @@ TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
     const std::string root = addShare("photo", "read only = no\nvalid users = alice, carol\nread list = bob\n");
     const std::string fat = addShare("usb", "read only = no\n");
     addMount(fat, "vfat");
-    support::makeFolder(root + "/root's", 0755);
+    makeFolder(root + "/root's", 0755);
     fs::create_symlink("/tmp", root + "/outside");
     struct {
         std::string user, path, more;
@@ -75,16 +67,16 @@ TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
     for (const auto& folder : cases) {
         EXPECT_EQ(mkdir(folder.user, folder.path, folder.more), folder.code) << folder.path << folder.more;
     }
-    const std::pair<std::string, unsigned> made[] = {{root + "/a", support::kAliceUid},
-                                                     {root + "/p", support::kAliceUid},
-                                                     {root + "/p/q/r", support::kAliceUid},
-                                                     {root + "/c", support::kCarolUid},
-                                                     {shareRoot("homes") + "/bob/b", support::kBobUid}};
+    const std::pair<std::string, unsigned> made[] = {{root + "/a", kAliceUid},
+                                                     {root + "/p", kAliceUid},
+                                                     {root + "/p/q/r", kAliceUid},
+                                                     {root + "/c", kCarolUid},
+                                                     {shareRoot("homes") + "/bob/b", kBobUid}};
     for (const auto& [path, owner] : made) {
         struct stat status = {};
         ASSERT_EQ(stat(path.c_str(), &status), 0) << path;
         EXPECT_EQ(status.st_uid, owner) << path;
-        EXPECT_EQ(status.st_gid, support::kUsersGid) << path;
+        EXPECT_EQ(status.st_gid, kUsersGid) << path;
         EXPECT_EQ(status.st_mode & 07777, 0755U) << path;
     }
 }
@@ -95,12 +87,12 @@ TEST_F(OperationCgi, RenamingReplacesNothing) {
     const std::string fat = addShare("usb", "read only = no\n");
     addShare("archive", "read only = no\nvexo:restriction = 2\n");
     addMount(fat, "vfat");
-    support::makeFolder(root + "/folder", 0777);
-    support::makeFolder(root + "/folder/empty", 0777);
-    support::makeFolder(root + "/root's", 0755);
-    for (const std::string file : {"/one", "/two", "/root's/f", "/folder/f"}) support::writeFile(root + file, file);
-    support::writeFile(fat + "/f", "x");
-    support::writeFile(shareRoot("archive") + "/f", "x");
+    makeFolder(root + "/folder", 0777);
+    makeFolder(root + "/folder/empty", 0777);
+    makeFolder(root + "/root's", 0755);
+    for (const std::string file : {"/one", "/two", "/root's/f", "/folder/f"}) writeFile(root + file, file);
+    writeFile(fat + "/f", "x");
+    writeFile(shareRoot("archive") + "/f", "x");
     fs::create_symlink("folder", root + "/inside");
     fs::create_symlink("/etc", root + "/outside");
     struct {
@@ -135,9 +127,9 @@ TEST_F(OperationCgi, RenamingReplacesNothing) {
         EXPECT_EQ(rename(renaming.user, renaming.path, renaming.name), renaming.code)
             << renaming.path << " to " << renaming.name;
     }
-    EXPECT_EQ(support::readFile(root + "/ONE"), "/one");
-    EXPECT_EQ(support::readFile(root + "/two"), "/two");
-    EXPECT_EQ(support::readFile(root + "/folder/g\nh"), "/folder/f");
+    EXPECT_EQ(readFile(root + "/ONE"), "/one");
+    EXPECT_EQ(readFile(root + "/two"), "/two");
+    EXPECT_EQ(readFile(root + "/folder/g\nh"), "/folder/f");
     EXPECT_EQ(fs::read_symlink(root + "/link"), "/etc");
     const CgiReply raw = ask("alice", "action=rename&path=/photo/two&name_raw=%25FF");
     EXPECT_EQ(raw.json["data"]["path_raw"], "/photo/%FF");
@@ -146,8 +138,8 @@ TEST_F(OperationCgi, RenamingReplacesNothing) {
 
 TEST_F(OperationCgi, SubFoldersOfAFolder) {
     const std::string root = shareRoot("photo");
-    for (const char* name : {"/b", "/a", "/a/deep", "/@tmp", "/\xFF"}) support::makeFolder(root + name);
-    support::writeFile(root + "/file", "x");
+    for (const char* name : {"/b", "/a", "/a/deep", "/@tmp", "/\xFF"}) makeFolder(root + name);
+    writeFile(root + "/file", "x");
     fs::create_symlink("/etc", root + "/outside");
     const CgiReply reply = ask("bob", "action=subfolders&path=/photo", "GET");
     std::vector<std::string> names;
@@ -179,7 +171,7 @@ TEST_F(OperationCgi, TheTransferLogTellsWhatChanged) {
     rename("alice", "/photo/a", "b");
     rename("alice", "/photo/a", "b");
     ask("alice", "action=subfolders&path=/photo", "GET");
-    const std::string text = support::readFile(log);
+    const std::string text = readFile(log);
     EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 2) << text;
     EXPECT_LT(text.find("\"mkdir\""), text.find("\"rename\"")) << text;
 }

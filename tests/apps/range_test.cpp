@@ -1,6 +1,6 @@
 #include "download/range.h"
 
-#include <gtest/gtest.h>
+#include "support/testing.h"
 
 namespace {
 

@@ -1,11 +1,6 @@
 #include "request.h"
 
-#include <gtest/gtest.h>
-
-#include <cstdlib>
-#include <string>
-
-#include "support/appliance.h"
+#include "support/testing.h"
 
 using namespace orvel::cgi;
 
@@ -19,7 +14,7 @@ TEST(Request, NumbersAreDigitsThatFit) {
     }
 }
 
-class ForwardedFor : public support::ApplianceTest {};
+class ForwardedFor : public ApplianceTest {};
 
 TEST_F(ForwardedFor, CountsOnlyFromConfiguredProxies) {
     struct {

@@ -1,8 +1,6 @@
 #include "text.h"
 
-#include <gtest/gtest.h>
-
-#include <string>
+#include "support/testing.h"
 
 using namespace orvel::cgi;
 

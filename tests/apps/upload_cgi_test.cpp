@@ -1,39 +1,31 @@
 // The program upload, run as a web server runs it.
-#include <gtest/gtest.h>
 #include <sched.h>
 #include <sys/mount.h>
-#include <sys/stat.h>
 #include <sys/sysmacros.h>
-#include <unistd.h>
-
-#include <filesystem>
 
 #include "apps/program.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "text.h"
-
-namespace fs = std::filesystem;
-using support::CgiReply;
 
 namespace {
 
-class UploadCgi : public support::ApplianceTest {
+class UploadCgi : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
         SKIP_WITHOUT_ROOT();
     }
     static CgiReply put(const std::string& user, const std::string& path, const std::string& body,
-                        const std::string& mode = "error", const support::Variables& more = {}) {
+                        const std::string& mode = "error", const Variables& more = {}) {
         const std::string query = "path=" + orvel::cgi::percentEncode(path) + "&overwrite=" + mode;
-        return CgiReply(support::runCgi(PROGRAM_UPLOAD, user, "PUT", query, body, more));
+        return CgiReply(runCgi(PROGRAM_UPLOAD, user, "PUT", query, body, more));
     }
     static std::string part(const std::string& disposition, const std::string& data) {
         return "--XX\r\nContent-Disposition: form-data; " + disposition + "\r\n\r\n" + data + "\r\n";
     }
     static CgiReply post(const std::string& user, const std::string& query, const std::string& body) {
-        return CgiReply(support::runCgi(PROGRAM_UPLOAD, user, "POST", query, body,
-                                        {{"CONTENT_TYPE", "multipart/form-data; boundary=XX"}}));
+        return CgiReply(
+            runCgi(PROGRAM_UPLOAD, user, "POST", query, body, {{"CONTENT_TYPE", "multipart/form-data; boundary=XX"}}));
     }
     static int code(const CgiReply& reply) { return reply.json["error"]["code"].asInt(); }
     // What uploads of this user left in the temporary place of the volume.
@@ -50,7 +42,7 @@ class UploadCgi : public support::ApplianceTest {
         struct stat status = {};
         ASSERT_EQ(lstat(path.c_str(), &status), 0) << path;
         EXPECT_EQ(status.st_uid, uid) << path;
-        EXPECT_EQ(status.st_gid, support::kUsersGid) << path;
+        EXPECT_EQ(status.st_gid, kUsersGid) << path;
         EXPECT_EQ(status.st_mode & 07777, mode) << path;
     }
 };
@@ -66,17 +58,17 @@ TEST_F(UploadCgi, AFileBelongsToItsUserWithTheFoldersAboveIt) {
     EXPECT_EQ(reply.status, 200);
     EXPECT_EQ(reply.json["data"]["files"][0]["path"], "/photo/new/deeper/a.bin");
     EXPECT_EQ(reply.json["data"]["files"][0]["size"], 5);
-    EXPECT_EQ(support::readFile(root + "/new/deeper/a.bin"), data);
-    expectOwned(root + "/new", support::kAliceUid, 0755);
-    expectOwned(root + "/new/deeper", support::kAliceUid, 0755);
-    expectOwned(root + "/new/deeper/a.bin", support::kAliceUid, 0644);
+    EXPECT_EQ(readFile(root + "/new/deeper/a.bin"), data);
+    expectOwned(root + "/new", kAliceUid, 0755);
+    expectOwned(root + "/new/deeper", kAliceUid, 0755);
+    expectOwned(root + "/new/deeper/a.bin", kAliceUid, 0644);
 
     EXPECT_TRUE(put("carol", "/photo/admin/b", "").json["success"].asBool());
-    expectOwned(root + "/admin", support::kCarolUid, 0755);
-    expectOwned(root + "/admin/b", support::kCarolUid, 0644);
+    expectOwned(root + "/admin", kCarolUid, 0755);
+    expectOwned(root + "/admin/b", kCarolUid, 0644);
     EXPECT_TRUE(put("bob", "/home/c", "x").json["success"].asBool());
-    expectOwned(shareRoot("homes") + "/bob/c", support::kBobUid, 0644);
-    for (const unsigned uid : {unsigned{support::kAliceUid}, 0U}) EXPECT_EQ(temporaries(uid), Names{});
+    expectOwned(shareRoot("homes") + "/bob/c", kBobUid, 0644);
+    for (const unsigned uid : {unsigned{kAliceUid}, 0U}) EXPECT_EQ(temporaries(uid), Names{});
 }
 
 TEST_F(UploadCgi, WhatExistsIsReplacedOnlyWhenAskedForAndAllowed) {
@@ -96,28 +88,28 @@ TEST_F(UploadCgi, WhatExistsIsReplacedOnlyWhenAskedForAndAllowed) {
     for (const auto& existing : cases) {
         SCOPED_TRACE(std::string(existing.share) + " " + existing.mode);
         const std::string file = shareRoot(existing.share) + "/f";
-        support::writeFile(file, "old", 0640);
-        ASSERT_EQ(chown(file.c_str(), support::kAliceUid, support::kUsersGid), 0);
+        writeFile(file, "old", 0640);
+        ASSERT_EQ(chown(file.c_str(), kAliceUid, kUsersGid), 0);
         const CgiReply reply = put("alice", std::string("/") + existing.share + "/f", "new", existing.mode);
         EXPECT_EQ(code(reply), existing.code);
         EXPECT_EQ(reply.json["data"]["files"][0]["skipped"].asBool(), existing.skipped);
-        EXPECT_EQ(support::readFile(file), existing.content);
-        expectOwned(file, support::kAliceUid, 0640);
+        EXPECT_EQ(readFile(file), existing.content);
+        expectOwned(file, kAliceUid, 0640);
     }
     EXPECT_EQ(code(put("alice", "/archive/other", "new")), 0);
-    EXPECT_EQ(temporaries(support::kAliceUid), Names{});
+    EXPECT_EQ(temporaries(kAliceUid), Names{});
 }
 
 TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
     const std::string root = shareRoot("photo");
     const std::string fat = addShare("usb", "read only = no\n");
     addMount(fat, "vfat");
-    support::makeFolder(root + "/folder", 0777);
-    support::makeFolder(root + "/root's", 0755);
-    support::writeFile(root + "/file", "x", 0666);
+    makeFolder(root + "/folder", 0777);
+    makeFolder(root + "/root's", 0755);
+    writeFile(root + "/file", "x", 0666);
     ASSERT_EQ(mkfifo((root + "/pipe").c_str(), 0666), 0);
     ASSERT_EQ(mknod((root + "/device").c_str(), S_IFCHR | 0666, makedev(1, 3)), 0);
-    support::makeFolder(root + "/inner", 0777);
+    makeFolder(root + "/inner", 0777);
     fs::create_symlink("folder", root + "/inside");
     fs::create_symlink("/tmp", root + "/outside");
     fs::create_symlink("nowhere", root + "/dangling");
@@ -164,10 +156,10 @@ TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
     EXPECT_EQ(code(put("alice", "/photo/dangling", "data", "overwrite")), 414);
     EXPECT_EQ(namesIn(root), before);
     EXPECT_EQ(namesIn(fat), Names{});
-    EXPECT_EQ(temporaries(support::kAliceUid), Names{});
+    EXPECT_EQ(temporaries(kAliceUid), Names{});
 
     EXPECT_EQ(code(put("alice", "/photo/inside/x", "data")), 0);
-    EXPECT_EQ(support::readFile(root + "/folder/x"), "data");
+    EXPECT_EQ(readFile(root + "/folder/x"), "data");
     setSetting("link_policy_photo", "none");
     EXPECT_EQ(code(put("alice", "/photo/inside/y", "data")), 407);
 }
@@ -183,14 +175,14 @@ TEST_F(UploadCgi, ABodyThatIsNotWhatWasAnnouncedLeavesNothing) {
     for (const char* length : {"5", "9223372036854775807"}) {
         EXPECT_EQ(code(put("alice", "/photo/new/x", "data", "error", {{"CONTENT_LENGTH", length}})), 1802) << length;
     }
-    EXPECT_EQ(CgiReply(support::runCgi(PROGRAM_UPLOAD, "alice", "GET", "path=/photo/x")).status, 400);
+    EXPECT_EQ(CgiReply(runCgi(PROGRAM_UPLOAD, "alice", "GET", "path=/photo/x")).status, 400);
     EXPECT_EQ(put("alice", "/photo/x", "data", "sometimes").status, 400);
     EXPECT_EQ(put("", "/photo/x", "data").status, 401);
     EXPECT_EQ(namesIn(root), Names{});
-    EXPECT_EQ(temporaries(support::kAliceUid), Names{});
+    EXPECT_EQ(temporaries(kAliceUid), Names{});
 
     EXPECT_EQ(code(put("alice", "/photo/x", "data", "error", {{"CONTENT_LENGTH", "3"}})), 0);
-    EXPECT_EQ(support::readFile(root + "/x"), "dat");
+    EXPECT_EQ(readFile(root + "/x"), "dat");
 }
 
 TEST_F(UploadCgi, AFormBringsSeveralFiles) {
@@ -208,9 +200,9 @@ TEST_F(UploadCgi, AFormBringsSeveralFiles) {
                                      part("name=a; filename=\"\\\\three\"", "333") + "--XX--\r\n");
     EXPECT_EQ(code(second), 0);
     EXPECT_EQ(second.json["data"]["files"].size(), 2U);
-    EXPECT_EQ(support::readFile(root + "/sub/two\xFF\n.txt"), "2222");
+    EXPECT_EQ(readFile(root + "/sub/two\xFF\n.txt"), "2222");
     EXPECT_EQ(namesIn(root + "/sub"), (Names{"\\three", "two\xFF\n.txt"}));
-    for (const std::string& name : namesIn(root + "/sub")) expectOwned(root + "/sub/" + name, support::kAliceUid, 0644);
+    for (const std::string& name : namesIn(root + "/sub")) expectOwned(root + "/sub/" + name, kAliceUid, 0644);
 }
 
 TEST_F(UploadCgi, ABrokenFormKeepsOnlyItsWholeFiles) {
@@ -244,10 +236,9 @@ TEST_F(UploadCgi, ABrokenFormKeepsOnlyItsWholeFiles) {
         EXPECT_EQ(reply.json["data"]["files"].size(), form.left.size());
         fs::remove(root + "/one");
     }
-    EXPECT_EQ(temporaries(support::kAliceUid), Names{});
+    EXPECT_EQ(temporaries(kAliceUid), Names{});
     for (const char* type : {"multipart/form-data", "multipart/mixed; boundary=XX", "multipart/form-data; boundary="}) {
-        const CgiReply reply(
-            support::runCgi(PROGRAM_UPLOAD, "alice", "POST", "path=/photo", file, {{"CONTENT_TYPE", type}}));
+        const CgiReply reply(runCgi(PROGRAM_UPLOAD, "alice", "POST", "path=/photo", file, {{"CONTENT_TYPE", type}}));
         EXPECT_EQ(code(reply), 1800) << type;
     }
 }
@@ -271,7 +262,7 @@ TEST_F(UploadCgi, FullAndReadOnlyFileSystems) {
     };
     for (const auto& full : cases) {
         SCOPED_TRACE(full.folder + " " + full.options);
-        const int result = support::inChild([&] {
+        const int result = inChild([&] {
             if (unshare(CLONE_NEWNS) != 0 || mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) return 2;
             if (mount("full", full.folder.c_str(), "tmpfs", full.flags, full.options) != 0) return 3;
             EXPECT_EQ(code(put("alice", "/photo/new/big", big)), full.code);
@@ -297,7 +288,7 @@ TEST_F(UploadCgi, TheTransferLogTellsWhatWasStored) {
     put("alice", "/photo/told", "data");
     put("alice", "/photo/told", "data");
     put("alice", "/photo/told", "data", "skip");
-    const std::string text = support::readFile(log);
+    const std::string text = readFile(log);
     EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 1) << text;
     for (const char* piece : {"\"upload\"", "\"alice\"", "127.0.0.1", "\"/photo/told\""}) {
         EXPECT_NE(text.find(piece), std::string::npos) << piece << text;
@@ -306,22 +297,22 @@ TEST_F(UploadCgi, TheTransferLogTellsWhatWasStored) {
 
 TEST_F(UploadCgi, WhatAKilledUploadLeftIsRemovedByALaterOne) {
     put("alice", "/photo/first", "makes the temporary folder");
-    const std::string folder = "/tmp/@tmp/orvel/upload-" + std::to_string(support::kAliceUid);
+    const std::string folder = "/tmp/@tmp/orvel/upload-" + std::to_string(kAliceUid);
     for (const char* name : {"part-old", "part-new", "other"}) {
-        support::writeFile(folder + "/" + name, "x");
-        ASSERT_EQ(chown((folder + "/" + name).c_str(), support::kAliceUid, support::kUsersGid), 0);
+        writeFile(folder + "/" + name, "x");
+        ASSERT_EQ(chown((folder + "/" + name).c_str(), kAliceUid, kUsersGid), 0);
     }
     const auto longAgo = fs::file_time_type::clock::now() - std::chrono::hours(2);
     for (const char* name : {"part-old", "other"}) fs::last_write_time(folder + "/" + name, longAgo);
     EXPECT_EQ(code(put("alice", "/photo/second", "data")), 0);
-    EXPECT_EQ(temporaries(support::kAliceUid), (Names{"other", "part-new"}));
+    EXPECT_EQ(temporaries(kAliceUid), (Names{"other", "part-new"}));
     fs::remove_all(folder);
 
     // Nothing that others could have prepared is used.
     fs::create_directory_symlink(shareRoot("photo"), folder);
     EXPECT_EQ(code(put("alice", "/photo/third", "data")), 407);
     fs::remove(folder);
-    support::makeFolder(folder, 0777);
+    makeFolder(folder, 0777);
     EXPECT_EQ(code(put("alice", "/photo/third", "data")), 407);
     fs::remove_all(folder);
     EXPECT_EQ(namesIn(shareRoot("photo")), (Names{"first", "second"}));

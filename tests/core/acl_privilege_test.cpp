@@ -1,24 +1,14 @@
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
 #include <climits>
-#include <cstring>
 
-#include "fault_gate.h"
-#include "orvel/error_state.h"
 #include "orvel/privilege.h"
-#include "support/appliance.h"
 #include "support/log_texts.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
 using Texts = std::vector<std::string>;
-using support::takeLogTexts;
 
-class AclPrivilegeTest : public support::ApplianceTest {};
+class AclPrivilegeTest : public ApplianceTest {};
 
 std::string workingFolder() {
     char path[PATH_MAX];
@@ -26,29 +16,29 @@ std::string workingFolder() {
 }
 
 TEST_F(AclPrivilegeTest, FailuresOfThePlatform) {
-    struct Case {
-        int platform, result, code;
-        bool accessLogs, getLogs;
-    };
-    const Case cases[] = {
-        {0x8400, -1, 411, false, true},  {0x0600, -1, 408, false, false}, {0xA000, -1, 408, false, true},
-        {0xD700, -1, 408, false, false}, {0x0300, 0, 7, false, false},    {0xD800, 0, 7, false, false},
-        {0x8100, -1, 7, true, true},     {0x1400, -1, 7, true, true},
-    };
-    for (const Case& c : cases) {
+    for (const auto& [platform, result, code, accessLogs, getLogs] : Rows<int, int, int, bool, bool>{
+             {0x8400, -1, 411, false, true},
+             {0x0600, -1, 408, false, false},
+             {0xA000, -1, 408, false, true},
+             {0xD700, -1, 408, false, false},
+             {0x0300, 0, 7, false, false},
+             {0xD800, 0, 7, false, false},
+             {0x8100, -1, 7, true, true},
+             {0x1400, -1, 7, true, true},
+         }) {
         char reason[8];
-        snprintf(reason, sizeof reason, "%X", static_cast<unsigned>(c.platform));
+        snprintf(reason, sizeof reason, "%X", static_cast<unsigned>(platform));
         vexo::gate::reset();
-        vexo::gate::fail("VEXOACLPermGet", c.platform);
+        vexo::gate::fail("VEXOACLPermGet", platform);
         OrvLibSetErr(7);
-        EXPECT_EQ(ACLAccess("/tmp", 31), c.result) << reason;
-        EXPECT_EQ(OrvLibGetErr(), c.code) << reason;
+        EXPECT_EQ(ACLAccess("/tmp", 31), result) << reason;
+        EXPECT_EQ(OrvLibGetErr(), code) << reason;
         const std::string start = "orveldir:# Failed to get the ACL Privilege: file = /tmp, ";
-        EXPECT_EQ(takeLogTexts(), c.accessLogs ? Texts{start + "reason=[" + reason + "]"} : Texts{});
+        EXPECT_EQ(takeLogTexts(), accessLogs ? Texts{start + "reason=[" + reason + "]"} : Texts{});
 
         EXPECT_EQ(GetACLPrivilege("/tmp"), 0x1FFFU);
         const std::string line = start + "euid = " + std::to_string(geteuid()) + ", reason=[" + reason + "]";
-        EXPECT_EQ(takeLogTexts(), c.getLogs ? Texts{line} : Texts{}) << reason;
+        EXPECT_EQ(takeLogTexts(), getLogs ? Texts{line} : Texts{}) << reason;
     }
 }
 
@@ -67,10 +57,10 @@ TEST_F(AclPrivilegeTest, ArgumentsAndMissingFiles) {
 TEST_F(AclPrivilegeTest, PermissionsOfTheCaller) {
     SKIP_WITHOUT_ROOT();
     const std::string folder = shareRoot("photo") + "/d", file = folder + "/f";
-    support::makeFolder(folder, 0755);
-    support::writeFile(file, "x", 0644);
-    ASSERT_EQ(chown(file.c_str(), support::kAliceUid, support::kUsersGid), 0);
-    support::asUser(support::kAliceUid, support::kUsersGid, [&] {
+    makeFolder(folder, 0755);
+    writeFile(file, "x", 0644);
+    ASSERT_EQ(chown(file.c_str(), kAliceUid, kUsersGid), 0);
+    asUser(kAliceUid, kUsersGid, [&] {
         EXPECT_EQ(GetACLPrivilege(file.c_str()), 0xEU) << "no delete: the folder is not hers";
         EXPECT_EQ(ACLAccess(file.c_str(), ORV_ACCESS_READ | ORV_ACCESS_WRITE | ORV_ACCESS_APPEND), 0);
         VLIBCErrSetEx(0, "", 0);
@@ -79,7 +69,7 @@ TEST_F(AclPrivilegeTest, PermissionsOfTheCaller) {
         EXPECT_EQ(VLIBCErrGet(), 0x0300);
         return 0;
     });
-    support::asUser(support::kBobUid, support::kUsersGid, [&] {
+    asUser(kBobUid, kUsersGid, [&] {
         EXPECT_EQ(ACLAccess(file.c_str(), ORV_ACCESS_READ), 0);
         EXPECT_EQ(ACLAccess(file.c_str(), ORV_ACCESS_WRITE), -1);
         return 0;
@@ -88,20 +78,16 @@ TEST_F(AclPrivilegeTest, PermissionsOfTheCaller) {
 
 TEST_F(AclPrivilegeTest, EnteringAFolder) {
     const std::string root = shareRoot("photo");
-    support::writeFile(root + "/file", "x");
+    writeFile(root + "/file", "x");
     EXPECT_FALSE(CheckDirListPrivilege(nullptr));
-    struct Case {
-        std::string path;
-        int code, failure;
-    };
-    const Case cases[] = {{root + "/none", 408, ENOENT},
-                          {root + "/file", 408, ENOTDIR},
-                          {root + "/" + std::string(300, 'x'), 402, ENAMETOOLONG}};
-    for (const Case& c : cases) {
+    for (const auto& [path, code, failure] :
+         Rows<std::string, int, int>{{root + "/none", 408, ENOENT},
+                                     {root + "/file", 408, ENOTDIR},
+                                     {root + "/" + std::string(300, 'x'), 402, ENAMETOOLONG}}) {
         OrvLibSetErr(7);
-        EXPECT_FALSE(CheckDirListPrivilege(c.path.c_str()));
-        EXPECT_EQ(OrvLibGetErr(), c.code);
-        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# Failed to chdir " + c.path + ". [" + strerror(c.failure) + "]"});
+        EXPECT_FALSE(CheckDirListPrivilege(path.c_str()));
+        EXPECT_EQ(OrvLibGetErr(), code);
+        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# Failed to chdir " + path + ". [" + strerror(failure) + "]"});
     }
     OrvLibSetErr(7);
     EXPECT_TRUE(CheckDirListPrivilege(root.c_str()));
@@ -112,9 +98,9 @@ TEST_F(AclPrivilegeTest, EnteringAFolder) {
 TEST_F(AclPrivilegeTest, FoldersThatAreClosed) {
     SKIP_WITHOUT_ROOT();
     const std::string closed = shareRoot("photo") + "/closed", unread = shareRoot("photo") + "/unread";
-    support::makeFolder(closed, 0700);
-    support::makeFolder(unread, 0711);
-    support::asUser(support::kBobUid, support::kUsersGid, [&] {
+    makeFolder(closed, 0700);
+    makeFolder(unread, 0711);
+    asUser(kBobUid, kUsersGid, [&] {
         EXPECT_FALSE(CheckDirListPrivilege(closed.c_str()));
         EXPECT_EQ(OrvLibGetErr(), 407);
         EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# Failed to chdir " + closed + ". [Permission denied]"});

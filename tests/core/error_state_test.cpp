@@ -1,56 +1,46 @@
-#include "orvel/error_state.h"
-
-#include <cerrno>
-#include <string>
-
-#include "support/appliance.h"
 #include "support/log_texts.h"
+#include "support/testing.h"
 
 namespace {
 
-class ErrorStateTest : public support::ApplianceTest {};
+class ErrorStateTest : public ApplianceTest {};
 
 TEST_F(ErrorStateTest, EveryCodeHasItsKey) {
-    struct Case {
-        int code;
-        const char* key;
-    };
-    const Case cases[] = {
-        {400, "error_error_system"},
-        {401, "error_error_system"},
-        {402, "error_error_system"},
-        {403, "error_invalid_user_group"},
-        {404, "error_invalid_user_group"},
-        {405, "error_invalid_user_group"},
-        {406, "error_testjoin"},
-        {407, "error_privilege_not_enough"},
-        {408, "error_no_path"},
-        {409, "error_privilege_not_enough"},
-        {410, "conn_rv_fail"},
-        {411, "error_fs_ro"},
-        {412, "error_long_path"},
-        {413, "error_encryption_long_path"},
-        {414, "error_file_exist"},
-        {415, "error_quota_not_enough"},
-        {416, "error_space_not_enough"},
-        {417, "error_io"},
-        {418, "error_reserved_name"},
-        {419, "error_fat_reserved_name"},
-        {420, "error_error_system"},
-        {421, "error_folder_busy"},
-        {1004, "error_overwrite_fail"},
-        {1005, "error_select_conflict"},
-        {1006, "mvcp_filename_illegal"},
-        {1007, "mvcp_file_too_big"},
-        {1400, "error_error_system"},
-        {1401, "error_invalid_archive"},
-        {1402, "error_invalid_archive_data"},
-        {1403, "extract_passwd_missing"},
-        {1404, "error_error_system"},
-        {1405, "error_error_system"},
-    };
-    for (const Case& c : cases) {
-        EXPECT_EQ(OrvParseErrorToKTRString(c.code, "other:key"), std::string("error:") + c.key) << c.code;
+    for (const auto& [code, key] : Rows<int, const char*>{
+             {400, "error_error_system"},
+             {401, "error_error_system"},
+             {402, "error_error_system"},
+             {403, "error_invalid_user_group"},
+             {404, "error_invalid_user_group"},
+             {405, "error_invalid_user_group"},
+             {406, "error_testjoin"},
+             {407, "error_privilege_not_enough"},
+             {408, "error_no_path"},
+             {409, "error_privilege_not_enough"},
+             {410, "conn_rv_fail"},
+             {411, "error_fs_ro"},
+             {412, "error_long_path"},
+             {413, "error_encryption_long_path"},
+             {414, "error_file_exist"},
+             {415, "error_quota_not_enough"},
+             {416, "error_space_not_enough"},
+             {417, "error_io"},
+             {418, "error_reserved_name"},
+             {419, "error_fat_reserved_name"},
+             {420, "error_error_system"},
+             {421, "error_folder_busy"},
+             {1004, "error_overwrite_fail"},
+             {1005, "error_select_conflict"},
+             {1006, "mvcp_filename_illegal"},
+             {1007, "mvcp_file_too_big"},
+             {1400, "error_error_system"},
+             {1401, "error_invalid_archive"},
+             {1402, "error_invalid_archive_data"},
+             {1403, "extract_passwd_missing"},
+             {1404, "error_error_system"},
+             {1405, "error_error_system"},
+         }) {
+        EXPECT_EQ(OrvParseErrorToKTRString(code, "other:key"), std::string("error:") + key) << code;
     }
     for (const int code : {0, -1, 399, 422, 1003, 1008, 1399, 1406, 1800, 1803, 1804, 1805}) {
         EXPECT_STREQ(OrvParseErrorToKTRString(code, "other:key"), "other:key") << code;
@@ -89,26 +79,19 @@ TEST_F(ErrorStateTest, BusyAsksTheMountTable) {
 
 TEST_F(ErrorStateTest, LongPathAsksWhetherTheShareIsEncrypted) {
     addShare("secret", "valid users = alice\nvexo:encrypted = yes\n");
-    struct Case {
-        const char* share;
-        int code;
-        int left;  // in the error variable
-        std::vector<std::string> log;
-    };
-    const Case cases[] = {
-        {"secret", 413, 0, {}},
-        {"photo", 412, 0, {}},
-        {"home", 412, 0, {}},
-        {"nowhere", 412, 408, {"orveldir:# VEXOShareGet fail nowhere"}},
-        {"no\nwhere", 412, 408, {"orveldir:# VEXOShareGet fail no\\x0Awhere"}},
-    };
-    for (const Case& c : cases) {
+    for (const auto& [share, code, left, log] : Rows<const char*, int, int, std::vector<std::string>>{
+             {"secret", 413, 0, {}},
+             {"photo", 412, 0, {}},
+             {"home", 412, 0, {}},
+             {"nowhere", 412, 408, {"orveldir:# VEXOShareGet fail nowhere"}},
+             {"no\nwhere", 412, 408, {"orveldir:# VEXOShareGet fail no\\x0Awhere"}},
+         }) {
         OrvLibSetErr(0);
-        EXPECT_EQ(OrvParseErrnoToError(ENAMETOOLONG, c.share, nullptr), c.code) << c.share;
-        EXPECT_EQ(OrvLibGetErr(), c.left) << c.share;
-        EXPECT_EQ(support::takeLogTexts(), c.log);
-        EXPECT_EQ(OrvParseVexoErrToError(0xC300, c.share), c.code) << c.share;
-        EXPECT_EQ(support::takeLogTexts(), c.log);
+        EXPECT_EQ(OrvParseErrnoToError(ENAMETOOLONG, share, nullptr), code) << share;
+        EXPECT_EQ(OrvLibGetErr(), left) << share;
+        EXPECT_EQ(takeLogTexts(), log);
+        EXPECT_EQ(OrvParseVexoErrToError(0xC300, share), code) << share;
+        EXPECT_EQ(takeLogTexts(), log);
     }
 }
 

@@ -1,44 +1,34 @@
-#include <unistd.h>
-
-#include "fault_gate.h"
-#include "orvel/error_state.h"
 #include "orvel/share_path.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 
 namespace {
 
-class HomePathTest : public support::ApplianceTest {};
+class HomePathTest : public ApplianceTest {};
 
 TEST_F(HomePathTest, LocalUsers) {
-    struct Case {
-        const char* path;
-        const char* user;
-        bool home;
-    };
-    const Case cases[] = {
-        {"home", nullptr, true},
-        {"/home", nullptr, true},
-        {"/home", "bob", true},
-        {"/home/", nullptr, true},
-        {"/home/x", "alice", true},
-        {"/Home/x", nullptr, false},
-        {"home/x", nullptr, false},
-        {"/homex", nullptr, false},
-        {"", "alice", false},
-        {"/", nullptr, false},
-        {"/homes/alice", nullptr, false},
-        {"/homes", "alice", false},
-        {"/homes/alice", "alice", true},
-        {"/HOMES/Alice/x", "alice", true},
-        {"/homes/alicex", "alice", false},
-        {"/homes/alic", "alice", false},
-        {"/homes/alice/x", "bob", false},
-        {"/homes//alice", "alice", false},
-        {"/homesick/alice", "alice", false},
-        {"/photo/alice", "alice", false},
-    };
-    for (const Case& c : cases) {
-        EXPECT_EQ(IsDirUserHome(c.path, c.user), c.home) << c.path << " for " << (c.user != nullptr ? c.user : "null");
+    for (const auto& [path, user, home] : Rows<const char*, const char*, bool>{
+             {"home", nullptr, true},
+             {"/home", nullptr, true},
+             {"/home", "bob", true},
+             {"/home/", nullptr, true},
+             {"/home/x", "alice", true},
+             {"/Home/x", nullptr, false},
+             {"home/x", nullptr, false},
+             {"/homex", nullptr, false},
+             {"", "alice", false},
+             {"/", nullptr, false},
+             {"/homes/alice", nullptr, false},
+             {"/homes", "alice", false},
+             {"/homes/alice", "alice", true},
+             {"/HOMES/Alice/x", "alice", true},
+             {"/homes/alicex", "alice", false},
+             {"/homes/alic", "alice", false},
+             {"/homes/alice/x", "bob", false},
+             {"/homes//alice", "alice", false},
+             {"/homesick/alice", "alice", false},
+             {"/photo/alice", "alice", false},
+         }) {
+        EXPECT_EQ(IsDirUserHome(path, user), home) << path << " for " << (user != nullptr ? user : "null");
     }
     EXPECT_EQ(vexo::gate::calls("*"), 0) << "the platform is not asked about local users";
     EXPECT_EQ(OrvLibGetErr(), 0);
@@ -47,30 +37,28 @@ TEST_F(HomePathTest, LocalUsers) {
 // Where a domain user's home lies is known to the platform alone. The service is off, so nothing is made.
 TEST_F(HomePathTest, DomainAndDirectoryUsersByTheirHomeFolder) {
     setSetting("userhome_enable", "no");
-    addUser("CORP\\eve", 20010, support::kUsersGid);
-    addUser("eve@corp", 20011, support::kUsersGid);
+    addUser("CORP\\eve", 20010, kUsersGid);
+    addUser("eve@corp", 20011, kUsersGid);
     writeRootFile("/etc/vexo/shares.conf", "[homes]\npath = /orvel-no-such-volume/homes\nread only = no\n");
-    struct Case {
-        const char* path;
-        const char* user;
-        bool home;
-    };
-    const Case cases[] = {
-        {"/homes/@CORP/eve", "CORP\\eve", true},     {"/Homes/@corp/EVE/x", "CORP\\eve", true},
-        {"/homes/@CORP/evelyn", "CORP\\eve", false}, {"/homes/CORP\\eve", "CORP\\eve", false},
-        {"/homes/eve@corp/x", "eve@corp", true},     {"/homes/eve@corp.org", "eve@corp", false},
-        {"/homes/eve@corp", "unknown@corp", false},  {"/home/x", "CORP\\eve", true},
-        {"/homes/@CORP/eve", nullptr, false},
-    };
-    for (const Case& c : cases) {
-        EXPECT_EQ(IsDirUserHome(c.path, c.user), c.home) << c.path << " for " << (c.user != nullptr ? c.user : "null");
+    for (const auto& [path, user, home] : Rows<const char*, const char*, bool>{
+             {"/homes/@CORP/eve", "CORP\\eve", true},
+             {"/Homes/@corp/EVE/x", "CORP\\eve", true},
+             {"/homes/@CORP/evelyn", "CORP\\eve", false},
+             {"/homes/CORP\\eve", "CORP\\eve", false},
+             {"/homes/eve@corp/x", "eve@corp", true},
+             {"/homes/eve@corp.org", "eve@corp", false},
+             {"/homes/eve@corp", "unknown@corp", false},
+             {"/home/x", "CORP\\eve", true},
+             {"/homes/@CORP/eve", nullptr, false},
+         }) {
+        EXPECT_EQ(IsDirUserHome(path, user), home) << path << " for " << (user != nullptr ? user : "null");
     }
     EXPECT_EQ(vexo::gate::calls("VEXOFSMkdirP"), 0);
 }
 
 TEST_F(HomePathTest, AskingMakesTheHomeOfADomainUser) {
     SKIP_WITHOUT_ROOT();
-    addUser("CORP\\eve", 20010, support::kUsersGid);
+    addUser("CORP\\eve", 20010, kUsersGid);
     const std::string home = shareRoot("homes") + "/@CORP/eve";
     // The share's root is not called "homes" here, so the answer is no; the folder is made all the same.
     EXPECT_FALSE(IsDirUserHome("/homes/@CORP/eve", "CORP\\eve"));
@@ -81,7 +69,7 @@ TEST_F(HomePathTest, AskingMakesTheHomeOfADomainUser) {
 }
 
 TEST_F(HomePathTest, AHomeThatCannotBeMadeIsNone) {
-    addUser("CORP\\eve", 20010, support::kUsersGid);
+    addUser("CORP\\eve", 20010, kUsersGid);
     writeRootFile("/etc/vexo/shares.conf", "[homes]\npath = /orvel-no-such-volume/homes\nread only = no\n");
     vexo::gate::fail("VEXOFSMkdirP", 0x8100);
     EXPECT_FALSE(IsDirUserHome("/homes/@CORP/eve", "CORP\\eve"));

@@ -1,25 +1,11 @@
 #include "orvel/identity.h"
 
-#include <fcntl.h>
 #include <grp.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
-#include <algorithm>
-#include <cstdlib>
-#include <string>
-#include <vector>
-
-#include "fault_gate.h"
-#include "orvel/error_state.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 #include "vexo/session.h"
 
 namespace {
-
-using support::announceLog;
-using support::inChild;
 
 std::vector<gid_t> groupList() {
     std::vector<gid_t> groups(static_cast<std::size_t>(getgroups(0, nullptr)));
@@ -34,23 +20,23 @@ bool canRead(const std::string& path) {
     return fd >= 0;
 }
 
-class IdentityTest : public support::ApplianceTest {};
+class IdentityTest : public ApplianceTest {};
 
 TEST_F(IdentityTest, OrdinaryUserActsAsItself) {
     SKIP_WITHOUT_ROOT();
     addGroup("editors", 20110, {"alice"});
     const std::string mine = shareRoot("photo") + "/mine", foreign = shareRoot("photo") + "/foreign",
                       shared = shareRoot("photo") + "/shared";
-    for (const auto& path : {mine, foreign, shared}) support::writeFile(path, "x", 0600);
-    ASSERT_EQ(chown(mine.c_str(), support::kAliceUid, support::kUsersGid), 0);
+    for (const auto& path : {mine, foreign, shared}) writeFile(path, "x", 0600);
+    ASSERT_EQ(chown(mine.c_str(), kAliceUid, kUsersGid), 0);
     ASSERT_EQ(chown(shared.c_str(), 0, 20110), 0);
     ASSERT_EQ(chmod(shared.c_str(), 0640), 0);
 
     inChild([&] {
         EXPECT_EQ(OrvLibUGIDSet(nullptr, "alice"), 0);
-        EXPECT_EQ(geteuid(), support::kAliceUid);
-        EXPECT_EQ(getegid(), gid_t{support::kUsersGid});
-        EXPECT_EQ(groupList(), (std::vector<gid_t>{support::kUsersGid, 20110}));
+        EXPECT_EQ(geteuid(), kAliceUid);
+        EXPECT_EQ(getegid(), gid_t{kUsersGid});
+        EXPECT_EQ(groupList(), (std::vector<gid_t>{kUsersGid, 20110}));
         EXPECT_TRUE(canRead(mine));
         EXPECT_TRUE(canRead(shared));
         EXPECT_FALSE(canRead(foreign));
@@ -63,8 +49,8 @@ TEST_F(IdentityTest, AdministratorStaysRootWithTheGroupsOfItsOwn) {
     inChild([&] {
         EXPECT_EQ(OrvLibUGIDSet(nullptr, "carol"), 0);
         EXPECT_EQ(geteuid(), 0U);
-        EXPECT_EQ(getegid(), gid_t{support::kUsersGid});
-        EXPECT_EQ(groupList(), (std::vector<gid_t>{support::kUsersGid, support::kAdminGid}));
+        EXPECT_EQ(getegid(), gid_t{kUsersGid});
+        EXPECT_EQ(groupList(), (std::vector<gid_t>{kUsersGid, kAdminGid}));
         return 0;
     });
 }
@@ -128,15 +114,15 @@ TEST_F(IdentityTest, TheSessionTellsBothIds) {
         EXPECT_EQ(OrvLibUGIDSet(sid.c_str(), "alice"), 0);
         EXPECT_EQ(vexo::gate::calls("VexoCgiGIDGet"), 1);
         EXPECT_EQ(vexo::gate::calls("VexoCgiUIDGet"), 1) << "the uid is not read from the user source";
-        EXPECT_EQ(geteuid(), support::kAliceUid);
-        EXPECT_EQ(getegid(), gid_t{support::kUsersGid});
+        EXPECT_EQ(geteuid(), kAliceUid);
+        EXPECT_EQ(getegid(), gid_t{kUsersGid});
         return 0;
     });
     inChild([&] {
         vexo::gate::fail("VexoCgiUIDGet", VEXO_ERR_GENERAL);
         EXPECT_EQ(OrvLibUGIDSet(sid.c_str(), "alice"), -1);
         EXPECT_EQ(OrvLibGetErr(), 401);
-        const auto log = support::takeLog();
+        const auto log = takeLog();
         EXPECT_EQ(log.size(), 1U);
         EXPECT_TRUE(log.at(0).text.ends_with(" Failed to set UID for user=alice, sid=" + sid)) << log.at(0).text;
         return 0;
@@ -160,9 +146,9 @@ TEST_F(IdentityTest, SwitchUnderEveryFault) {
                                    if (OrvLibUGIDSet(sid, "alice") != 0) {
                                        EXPECT_EQ(OrvLibGetErr(), 401);
                                    } else {
-                                       EXPECT_EQ(geteuid(), support::kAliceUid);
-                                       EXPECT_EQ(getegid(), gid_t{support::kUsersGid});
-                                       for (const gid_t gid : groupList()) EXPECT_EQ(gid, gid_t{support::kUsersGid});
+                                       EXPECT_EQ(geteuid(), kAliceUid);
+                                       EXPECT_EQ(getegid(), gid_t{kUsersGid});
+                                       for (const gid_t gid : groupList()) EXPECT_EQ(gid, gid_t{kUsersGid});
                                    }
                                    return vexo::gate::calls("*") >= nth ? 1 : 0;
                                }) == 1) {
@@ -190,9 +176,9 @@ TEST_F(IdentityTest, FailedGroupListIsLoggedAndLeavesNoneOfRoots) {
         EXPECT_EQ(setgroups(3, roots), 0);
         vexo::gate::fail("VEXOUserInitGroups", VEXO_ERR_GENERAL, EPERM);
         EXPECT_EQ(OrvLibUGIDSet(nullptr, "alice"), 0);
-        EXPECT_EQ(geteuid(), support::kAliceUid);
+        EXPECT_EQ(geteuid(), kAliceUid);
         EXPECT_EQ(groupList(), std::vector<gid_t>{});
-        const auto log = support::takeLog();
+        const auto log = takeLog();
         EXPECT_EQ(log.size(), 1U);
         EXPECT_NE(log.at(0).text.find("Failed to initgroup for user=alice, sid=(null)"), std::string::npos);
         return 0;
@@ -203,8 +189,8 @@ TEST_F(IdentityTest, HandOver) {
     SKIP_WITHOUT_ROOT();
     const std::string file = shareRoot("photo") + "/f", link = shareRoot("photo") + "/link",
                       target = shareRoot("photo") + "/target";
-    support::writeFile(file, "x");
-    support::writeFile(target, "x");
+    writeFile(file, "x");
+    writeFile(target, "x");
     ASSERT_EQ(symlink(target.c_str(), link.c_str()), 0);
 
     const auto ownerOf = [](const std::string& path) {
@@ -213,9 +199,9 @@ TEST_F(IdentityTest, HandOver) {
         return status.st_uid;
     };
     EXPECT_EQ(OrvLibChown2Admin(file.c_str(), "alice"), 0);
-    EXPECT_EQ(ownerOf(file), support::kAliceUid);
+    EXPECT_EQ(ownerOf(file), kAliceUid);
     EXPECT_EQ(OrvLibChown2Admin(link.c_str(), "alice"), 0);
-    EXPECT_EQ(ownerOf(link), support::kAliceUid);
+    EXPECT_EQ(ownerOf(link), kAliceUid);
     EXPECT_EQ(ownerOf(target), 0U) << "a link is never followed";
     EXPECT_EQ(OrvLibChown2Admin(file.c_str(), "nobody-here"), -1);
 
@@ -231,7 +217,7 @@ TEST_F(IdentityTest, HandOver) {
     for (const char* type : {"vfat", "nfs", "iso9660"}) {
         SCOPED_TRACE(type);
         const std::string other = shareRoot("photo") + "/" + type + "-file";
-        support::writeFile(other, "x");
+        writeFile(other, "x");
         addMount(other, type);
         EXPECT_EQ(OrvLibChown2Admin(other.c_str(), "bob"), 0);
         EXPECT_EQ(ownerOf(other), 0U) << "owners are not kept there";

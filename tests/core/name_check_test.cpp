@@ -1,35 +1,32 @@
 #include "orvel/name_check.h"
 
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
-#include <string>
-
-#include "fault_gate.h"
-#include "orvel/error_state.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
-using support::announceLog;
-
-class NameCheckTest : public support::ApplianceTest {};
+class NameCheckTest : public ApplianceTest {};
 
 TEST_F(NameCheckTest, ReservedNames) {
-    struct Case {
-        const char* name;
-        int code;  // 0: may be used
-    };
-    const Case cases[] = {{nullptr, 400}, {"", 400},       {".", 418},       {"..", 418}, {"a:b", 418}, {"a/b", 418},
-                          {"._x", 418},   {"._", 418},     {"@vexoea", 418}, {"a b", 0},  {".x", 0},    {"_.x", 0},
-                          {"...", 0},     {"@vexoea2", 0}, {"a\xFF\nb", 0},  {"@tmp", 0}};
-    for (const auto& test : cases) {
-        SCOPED_TRACE(test.name == nullptr ? "(null)" : test.name);
+    for (const auto& [name, code] : Rows<const char*, int>{{nullptr, 400},
+                                                           {"", 400},
+                                                           {".", 418},
+                                                           {"..", 418},
+                                                           {"a:b", 418},
+                                                           {"a/b", 418},
+                                                           {"._x", 418},
+                                                           {"._", 418},
+                                                           {"@vexoea", 418},
+                                                           {"a b", 0},
+                                                           {".x", 0},
+                                                           {"_.x", 0},
+                                                           {"...", 0},
+                                                           {"@vexoea2", 0},
+                                                           {"a\xFF\nb", 0},
+                                                           {"@tmp", 0}}) {
+        SCOPED_TRACE(name == nullptr ? "(null)" : name);
         OrvLibSetErr(0);
-        EXPECT_EQ(OrvCheckReservedName(test.name), test.code == 0);
-        EXPECT_EQ(OrvLibGetErr(), test.code);
+        EXPECT_EQ(OrvCheckReservedName(name), code == 0);
+        EXPECT_EQ(OrvLibGetErr(), code);
     }
 }
 
@@ -37,22 +34,24 @@ TEST_F(NameCheckTest, FileNames) {
     const std::string fat = addShare("usb", "read only = no\n");
     addMount(fat, "vfat");
     const std::string disk = shareRoot("photo");
-    struct Case {
-        const char* folder;
-        const char* name;
-        int code;
-    };
-    const Case cases[] = {
-        {nullptr, "a", 400},         {disk.c_str(), nullptr, 400}, {disk.c_str(), "", 400},
-        {disk.c_str(), "..", 418},   {disk.c_str(), "a?b", 0},     {fat.c_str(), "a?b", 419},
-        {fat.c_str(), "a\\b", 419},  {fat.c_str(), "a\rb", 419},   {fat.c_str(), "a\nb", 419},
-        {fat.c_str(), "a|b\"", 419}, {fat.c_str(), "a:b", 418},    {fat.c_str(), "plain.txt", 0},
-    };
-    for (const auto& test : cases) {
-        SCOPED_TRACE(test.name == nullptr ? "(null)" : test.name);
+    for (const auto& [folder, name, code] : Rows<const char*, const char*, int>{
+             {nullptr, "a", 400},
+             {disk.c_str(), nullptr, 400},
+             {disk.c_str(), "", 400},
+             {disk.c_str(), "..", 418},
+             {disk.c_str(), "a?b", 0},
+             {fat.c_str(), "a?b", 419},
+             {fat.c_str(), "a\\b", 419},
+             {fat.c_str(), "a\rb", 419},
+             {fat.c_str(), "a\nb", 419},
+             {fat.c_str(), "a|b\"", 419},
+             {fat.c_str(), "a:b", 418},
+             {fat.c_str(), "plain.txt", 0},
+         }) {
+        SCOPED_TRACE(name == nullptr ? "(null)" : name);
         OrvLibSetErr(0);
-        EXPECT_EQ(OrvCheckFileName(test.folder, test.name), test.code == 0 ? 0 : -1);
-        EXPECT_EQ(OrvLibGetErr(), test.code);
+        EXPECT_EQ(OrvCheckFileName(folder, name), code == 0 ? 0 : -1);
+        EXPECT_EQ(OrvLibGetErr(), code);
     }
     vexo::gate::fail("VEXOGetFSType", VEXO_ERR_GENERAL, EIO);
     announceLog("Failed to statfs " + disk + ", reason=Input/output error");
@@ -65,7 +64,7 @@ TEST_F(NameCheckTest, Paths) {
     const std::string fat = addShare("usb", "read only = no\n"), dead = addShare("dead", "read only = no\n");
     addMount(fat, "vfat");
     addMount(dead + "/gone", "nfs");
-    support::writeFile(disk + "/file", "x");
+    writeFile(disk + "/file", "x");
     ASSERT_EQ(mkfifo((disk + "/fifo").c_str(), 0600), 0);
     ASSERT_EQ(symlink("file", (disk + "/link").c_str()), 0);
 
@@ -133,10 +132,10 @@ TEST_F(NameCheckTest, PathsBeyondTheLimitAreCut) {
 TEST_F(NameCheckTest, PathPermissions) {
     SKIP_WITHOUT_ROOT();
     const std::string folder = shareRoot("photo") + "/closed";
-    support::makeFolder(folder, 0755);
-    support::makeFolder(folder + "/hidden", 0700);
-    support::makeFolder(folder + "/hidden/below", 0755);
-    support::asUser(support::kBobUid, support::kUsersGid, [&] {
+    makeFolder(folder, 0755);
+    makeFolder(folder + "/hidden", 0700);
+    makeFolder(folder + "/hidden/below", 0755);
+    asUser(kBobUid, kUsersGid, [&] {
         constexpr int kWrite = 2;
         EXPECT_EQ(OrvCheckPath((folder + "/new").c_str(), true, kWrite, nullptr), -1);
         EXPECT_EQ(OrvLibGetErr(), 407);
@@ -148,7 +147,7 @@ TEST_F(NameCheckTest, PathPermissions) {
         OrvLibSetErr(77);
         EXPECT_EQ(OrvCheckPath(folder.c_str(), false, 0, nullptr), -1);
         EXPECT_EQ(OrvLibGetErr(), 77) << "no bits asked: fails with the code that was there";
-        const auto log = support::takeLog();
+        const auto log = takeLog();
         EXPECT_EQ(log.size(), 2U);
         EXPECT_TRUE(log.at(0).text.ends_with("Can't access " + folder + ", errno=197 ")) << log.at(0).text;
         return 0;
@@ -162,14 +161,13 @@ TEST_F(NameCheckTest, SupportedFileSystems) {
     addMount("/usbshare1/net", "nfs4");
     addMount("/usbshare1/strange", "fuseblk");
     addMount("/esata1", "cifs");
-    struct Case {
-        std::string path;
-        bool supported;
-    };
-    const Case cases[] = {{internal, true},          {usb, true},  {usb + "/a/b", true}, {usb + "/net/a", false},
-                          {usb + "/strange", false}, {esata, true}};
-    for (const auto& test : cases) {
-        EXPECT_EQ(OrvLibFileSystemSupported(test.path.c_str()), test.supported) << test.path;
+    for (const auto& [path, supported] : Rows<std::string, bool>{{internal, true},
+                                                                 {usb, true},
+                                                                 {usb + "/a/b", true},
+                                                                 {usb + "/net/a", false},
+                                                                 {usb + "/strange", false},
+                                                                 {esata, true}}) {
+        EXPECT_EQ(OrvLibFileSystemSupported(path.c_str()), supported) << path;
     }
     announceLog("Bad parameters: relative");
     EXPECT_TRUE(OrvLibFileSystemSupported("relative"));
@@ -182,28 +180,24 @@ TEST_F(NameCheckTest, SupportedFileSystems) {
 }
 
 TEST(Utf8Pattern, Table) {
-    struct Case {
-        const char* text;
-        bool valid;
-    };
-    const Case cases[] = {{nullptr, true},
-                          {"", true},
-                          {"plain", true},
-                          {"\xC3\xA9", true},
-                          {"\xC3\x28", false},
-                          {"\x80", false},
-                          {"a\xBF", false},
-                          {"\xE4\xBD\xA0", true},
-                          {"\xE4\xBD", false},
-                          {"\xF0\x9F\x98\x80", true},
-                          {"\xF8\x88\x80\x80\x80", true},
-                          {"\xFC\x84\x80\x80\x80\x80", true},
-                          {"\xFC\x84\x80\x80\x80", false},
-                          {"\xC0\x80", true},      // overlong
-                          {"\xED\xA0\x80", true},  // surrogate
-                          {"\xFE", false},
-                          {"\xFF", false}};
-    for (const auto& test : cases) EXPECT_EQ(IsUnicodeString(test.text), test.valid) << (test.text ? test.text : "");
+    for (const auto& [text, valid] : Rows<const char*, bool>{{nullptr, true},
+                                                             {"", true},
+                                                             {"plain", true},
+                                                             {"\xC3\xA9", true},
+                                                             {"\xC3\x28", false},
+                                                             {"\x80", false},
+                                                             {"a\xBF", false},
+                                                             {"\xE4\xBD\xA0", true},
+                                                             {"\xE4\xBD", false},
+                                                             {"\xF0\x9F\x98\x80", true},
+                                                             {"\xF8\x88\x80\x80\x80", true},
+                                                             {"\xFC\x84\x80\x80\x80\x80", true},
+                                                             {"\xFC\x84\x80\x80\x80", false},
+                                                             {"\xC0\x80", true},      // overlong
+                                                             {"\xED\xA0\x80", true},  // surrogate
+                                                             {"\xFE", false},
+                                                             {"\xFF", false}})
+        EXPECT_EQ(IsUnicodeString(text), valid) << (text ? text : "");
 }
 
 class TmpDirTest : public NameCheckTest {
@@ -216,7 +210,7 @@ class TmpDirTest : public NameCheckTest {
 
 TEST_F(TmpDirTest, MakesBothOpenToAllAndKeepsTheUmask) {
     std::string volume = shareRoot("photo");
-    support::inChild([&] {
+    inChild([&] {
         umask(077);
         EXPECT_EQ(OrvCreateTmpDir(volume.data()), 0);
         EXPECT_EQ(modeOf(volume + "/@tmp"), mode_t{S_IFDIR | 0777});
@@ -230,18 +224,18 @@ TEST_F(TmpDirTest, MakesBothOpenToAllAndKeepsTheUmask) {
 
 TEST_F(TmpDirTest, WhatStandsInTheWay) {
     const std::string root = shareRoot("photo");
-    support::inChild([&] {
+    inChild([&] {
         std::string plain = root + "/plain", dangling = root + "/dangling", missing = root + "/missing";
-        support::writeFile(plain + "/@tmp", "a file");
-        support::makeFolder(dangling);
+        writeFile(plain + "/@tmp", "a file");
+        makeFolder(dangling);
         EXPECT_EQ(symlink("nowhere", (dangling + "/@tmp").c_str()), 0);
         EXPECT_EQ(OrvCreateTmpDir(plain.data()), 0);
-        EXPECT_EQ(support::readFile(plain + "/@tmp"), "a file");
+        EXPECT_EQ(readFile(plain + "/@tmp"), "a file");
         EXPECT_EQ(OrvCreateTmpDir(dangling.data()), 0) << "a dangling link is replaced";
         EXPECT_EQ(modeOf(dangling + "/@tmp/orvel"), mode_t{S_IFDIR | 0777});
         EXPECT_EQ(OrvCreateTmpDir(nullptr), -1);
         EXPECT_EQ(OrvCreateTmpDir(missing.data()), -1);
-        const auto log = support::takeLog();
+        const auto log = takeLog();
         EXPECT_EQ(log.size(), 2U);
         EXPECT_NE(log.at(1).text.find(")Failed to mkdir : " + missing + "/@tmp , reason=No such file or directory[2]"),
                   std::string::npos);

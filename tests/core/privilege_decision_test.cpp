@@ -1,9 +1,8 @@
 #include "core/privilege_decision.h"
 
-#include <gtest/gtest.h>
-
 #include "core/user_kind.h"
 #include "orvel/privilege.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -20,11 +19,8 @@ TEST(PrivilegeDecision, NoAccessBeatsReadWriteBeatsReadOnly) {
 }
 
 TEST(PrivilegeDecision, ServiceAnswersAndMasks) {
-    struct Case {
-        int answer, privilege;
-    };
-    for (const Case& c : {Case{0, 0}, Case{1, 1}, Case{2, 2}, Case{3, 0}, Case{-1, 0}, Case{4, 0}}) {
-        EXPECT_EQ(orvel::privilegeFromService(c.answer), c.privilege) << c.answer;
+    for (const auto& [answer, privilege] : Rows<int, int>{{0, 0}, {1, 1}, {2, 2}, {3, 0}, {-1, 0}, {4, 0}}) {
+        EXPECT_EQ(orvel::privilegeFromService(answer), privilege) << answer;
     }
     EXPECT_EQ(orvel::effectiveMask(true, 7), 0U);
     EXPECT_EQ(orvel::effectiveMask(false, 7), 7U);
@@ -45,19 +41,14 @@ TEST(PrivilegeDecision, WhatAMaskForbids) {
 }
 
 TEST(PrivilegeDecision, RequestedPermissions) {
-    struct Case {
-        int requested;
-        unsigned bit;
-    };
-    const Case cases[] = {{ORV_ACCESS_READ, 0x4},
-                          {ORV_ACCESS_WRITE, 0x2},
-                          {ORV_ACCESS_EXECUTE, 0x1},
-                          {ORV_ACCESS_DELETE, 0x200},
-                          {ORV_ACCESS_APPEND, 0x8}};
-    for (const Case& c : cases) {
-        EXPECT_TRUE(orvel::aclGrants(c.bit, c.requested)) << c.requested;
-        EXPECT_FALSE(orvel::aclGrants(0x1FFF & ~c.bit, c.requested)) << c.requested;
-        EXPECT_FALSE(orvel::aclGrants(c.bit, 31)) << c.requested;
+    for (const auto& [requested, bit] : Rows<int, unsigned>{{ORV_ACCESS_READ, 0x4},
+                                                            {ORV_ACCESS_WRITE, 0x2},
+                                                            {ORV_ACCESS_EXECUTE, 0x1},
+                                                            {ORV_ACCESS_DELETE, 0x200},
+                                                            {ORV_ACCESS_APPEND, 0x8}}) {
+        EXPECT_TRUE(orvel::aclGrants(bit, requested)) << requested;
+        EXPECT_FALSE(orvel::aclGrants(0x1FFF & ~bit, requested)) << requested;
+        EXPECT_FALSE(orvel::aclGrants(bit, 31)) << requested;
     }
     EXPECT_TRUE(orvel::aclGrants(0x20F, 31));
     EXPECT_TRUE(orvel::aclGrants(0, 32)) << "a bit that asks for nothing";
@@ -70,18 +61,18 @@ TEST(PrivilegeDecision, UserKinds) {
 }
 
 TEST(PermissionText, LettersAndDigits) {
-    struct Case {
-        unsigned mode;
-        const char* text;
-        int digits;
-    };
-    const Case cases[] = {{0755, "rwxr-xr-x", 755}, {0640, "rw-r-----", 640}, {0750, "rwxr-x---", 750},
-                          {0, "---------", 0},      {0777, "rwxrwxrwx", 777}, {0104755, "rwxr-xr-x", 755},
-                          {0007, "------rwx", 7},   {0421, "r---w---x", 421}, {~0U, "rwxrwxrwx", 777}};
-    for (const Case& c : cases) {
-        EXPECT_EQ(GetPrivilegeStr(c.mode), c.text);
-        EXPECT_EQ(GetPrivilege(c.mode), c.digits) << c.text;
-        EXPECT_EQ(GetPrivilege(c.text), c.digits) << c.text;
+    for (const auto& [mode, text, digits] : Rows<unsigned, const char*, int>{{0755, "rwxr-xr-x", 755},
+                                                                             {0640, "rw-r-----", 640},
+                                                                             {0750, "rwxr-x---", 750},
+                                                                             {0, "---------", 0},
+                                                                             {0777, "rwxrwxrwx", 777},
+                                                                             {0104755, "rwxr-xr-x", 755},
+                                                                             {0007, "------rwx", 7},
+                                                                             {0421, "r---w---x", 421},
+                                                                             {~0U, "rwxrwxrwx", 777}}) {
+        EXPECT_EQ(GetPrivilegeStr(mode), text);
+        EXPECT_EQ(GetPrivilege(mode), digits) << text;
+        EXPECT_EQ(GetPrivilege(text), digits) << text;
     }
     EXPECT_EQ(GetPrivilege("rwx"), 700);
     EXPECT_EQ(GetPrivilege("wxrsssRWX-and more"), 0);

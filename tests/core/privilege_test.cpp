@@ -1,19 +1,13 @@
 #include "orvel/privilege.h"
 
-#include <unistd.h>
-
-#include "fault_gate.h"
-#include "orvel/error_state.h"
 #include "orvel/privilege_reason.h"
-#include "support/appliance.h"
 #include "support/fault_sweep.h"
 #include "support/log_texts.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
 using Texts = std::vector<std::string>;
-using support::takeLogTexts;
 
 struct Answer {
     int result = 99, privilege = 99, mask = 99;
@@ -25,12 +19,12 @@ Answer ask(const char* path, const char* user, const char* sid = nullptr) {
     return out;
 }
 
-class PrivilegeTest : public support::ApplianceTest {
+class PrivilegeTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
-        addUser("CORP\\eve", 20010, support::kUsersGid);
-        addUser("fay@corp", 20011, support::kUsersGid);
+        addUser("CORP\\eve", 20010, kUsersGid);
+        addUser("fay@corp", 20011, kUsersGid);
         addGroup("editors", 20110, {"bob", "CORP\\eve"});
         addShare("mixed",
                  "invalid users = bob\nwrite list = bob, alice, CORP\\eve\nread list = alice\nvalid users = fay@corp\n"
@@ -42,29 +36,23 @@ class PrivilegeTest : public support::ApplianceTest {
 };
 
 TEST_F(PrivilegeTest, ListsAndMasks) {
-    struct Case {
-        const char* path;
-        const char* user;
-        int privilege, mask;
-    };
-    const Case cases[] = {
-        {"/photo", "alice", 2, 0},
-        {"/photo/x/../y", "bob", 1, 0},
-        {"/photo", "carol", 0, 0},
-        {"/mixed", "bob", 0, 5},
-        {"/mixed", "alice", 2, 5},
-        {"/mixed", "carol", 0, 0},  // an administrator: no privilege by membership, but no mask either
-        {"/drop", "carol", 2, 0},
-        {"/mixed", "CORP\\eve", 2, 5},  // without a session the lists judge
-        {"/mixed", "fay@corp", 1, 5},
-        {"/view", "bob", 1, 4},
-        {"photo/x", "alice", 2, 0},
-    };
-    for (const Case& c : cases) {
-        const Answer out = ask(c.path, c.user);
-        EXPECT_EQ(out.result, 0) << c.path << " " << c.user;
-        EXPECT_EQ(out.privilege, c.privilege) << c.path << " " << c.user;
-        EXPECT_EQ(out.mask, c.mask) << c.path << " " << c.user;
+    for (const auto& [path, user, privilege, mask] : Rows<const char*, const char*, int, int>{
+             {"/photo", "alice", 2, 0},
+             {"/photo/x/../y", "bob", 1, 0},
+             {"/photo", "carol", 0, 0},
+             {"/mixed", "bob", 0, 5},
+             {"/mixed", "alice", 2, 5},
+             {"/mixed", "carol", 0, 0},  // an administrator: no privilege by membership, but no mask either
+             {"/drop", "carol", 2, 0},
+             {"/mixed", "CORP\\eve", 2, 5},  // without a session the lists judge
+             {"/mixed", "fay@corp", 1, 5},
+             {"/view", "bob", 1, 4},
+             {"photo/x", "alice", 2, 0},
+         }) {
+        const Answer out = ask(path, user);
+        EXPECT_EQ(out.result, 0) << path << " " << user;
+        EXPECT_EQ(out.privilege, privilege) << path << " " << user;
+        EXPECT_EQ(out.mask, mask) << path << " " << user;
     }
     int privilege = 99;
     EXPECT_EQ(OrvLibGetPrivilege("/photo", "bob", nullptr, &privilege, nullptr), 0);
@@ -72,27 +60,23 @@ TEST_F(PrivilegeTest, ListsAndMasks) {
 }
 
 TEST_F(PrivilegeTest, RefusedLookups) {
-    struct Case {
-        const char* path;
-        const char* user;
-        int code;
-        Texts log;
-    };
-    const Case cases[] = {
-        {nullptr, "alice", 401, {"orveldir(#): bad parameter!"}},
-        {"photo", "alice", 401, {"orveldir(#): bad path name=photo", "orveldir(#): OrvLibGetTokOfPath photo fail"}},
-        {"/", "alice", 401, {"orveldir(#) error path", "orveldir(#): OrvLibGetTokOfPath / fail"}},
-        {"/no\nne/x", "alice", 408, {"orveldir(#): VEXOShareGet no\\x0Ane fail"}},
-        {"/home", "alice", 408, {"orveldir(#): VEXOShareGet home fail"}},
-    };
-    for (const Case& c : cases) {
+    for (const auto& [path, user, code, log] : Rows<const char*, const char*, int, Texts>{
+             {nullptr, "alice", 401, {"orveldir(#): bad parameter!"}},
+             {"photo",
+              "alice",
+              401,
+              {"orveldir(#): bad path name=photo", "orveldir(#): OrvLibGetTokOfPath photo fail"}},
+             {"/", "alice", 401, {"orveldir(#) error path", "orveldir(#): OrvLibGetTokOfPath / fail"}},
+             {"/no\nne/x", "alice", 408, {"orveldir(#): VEXOShareGet no\\x0Ane fail"}},
+             {"/home", "alice", 408, {"orveldir(#): VEXOShareGet home fail"}},
+         }) {
         OrvLibSetErr(0);
-        const Answer out = ask(c.path, c.user);
+        const Answer out = ask(path, user);
         EXPECT_EQ(out.result, -1);
         EXPECT_EQ(out.privilege, -1);
         EXPECT_EQ(out.mask, 99);
-        EXPECT_EQ(OrvLibGetErr(), c.code);
-        EXPECT_EQ(takeLogTexts(), c.log);
+        EXPECT_EQ(OrvLibGetErr(), code);
+        EXPECT_EQ(takeLogTexts(), log);
     }
     int mask = 99;
     EXPECT_EQ(OrvLibGetPrivilege("/photo", "alice", nullptr, nullptr, &mask), -1);
@@ -100,20 +84,15 @@ TEST_F(PrivilegeTest, RefusedLookups) {
 }
 
 TEST_F(PrivilegeTest, TheAdministratorQuestionComesFirst) {
-    struct Case {
-        const char* path;
-        const char* user;
-        const char* log;
-    };
-    const Case cases[] = {{nullptr, nullptr, "VEXOGroupIsAdminGroupMem((null)) failed. [0x0D00 "},
-                          {"/photo", "nobody-here", "VEXOGroupIsAdminGroupMem(nobody-here) failed. [0x1D00 "},
-                          {nullptr, "nobody-here", "VEXOGroupIsAdminGroupMem(nobody-here) failed. [0x1D00 "}};
-    for (const Case& c : cases) {
-        EXPECT_EQ(ask(c.path, c.user).result, -1);
+    for (const auto& [path, user, start] : Rows<const char*, const char*, const char*>{
+             {nullptr, nullptr, "VEXOGroupIsAdminGroupMem((null)) failed. [0x0D00 "},
+             {"/photo", "nobody-here", "VEXOGroupIsAdminGroupMem(nobody-here) failed. [0x1D00 "},
+             {nullptr, "nobody-here", "VEXOGroupIsAdminGroupMem(nobody-here) failed. [0x1D00 "}}) {
+        EXPECT_EQ(ask(path, user).result, -1);
         EXPECT_EQ(OrvLibGetErr(), 401);
         const Texts log = takeLogTexts();
         ASSERT_EQ(log.size(), 1U);
-        EXPECT_TRUE(log[0].starts_with(std::string("orveldir:# ") + c.log)) << log[0];
+        EXPECT_TRUE(log[0].starts_with(std::string("orveldir:# ") + start)) << log[0];
         EXPECT_TRUE(log[0].ends_with("]")) << log[0];
     }
     EXPECT_EQ(vexo::gate::calls("VEXOShareGet"), 0);
@@ -161,25 +140,24 @@ TEST_F(PrivilegeTest, HasPrivilegeIsExact) {
 
 TEST_F(PrivilegeTest, ListingAndDownloading) {
     const Texts refused = {"orveldir:# No privilege in path "};
-    struct Case {
-        const char* path;
-        const char* user;
-        bool list, download;
-    };
-    const Case cases[] = {
-        {"/photo/x", "alice", true, true}, {"/photo", "bob", true, true},   {"/photo", "carol", false, false},
-        {"/quiet", "bob", false, false},   {"/quiet", "carol", true, true}, {"/view", "bob", true, false},
-        {"/drop", "bob", true, true},      {"/mixed", "bob", false, false},
-    };
-    for (const Case& c : cases) {
+    for (const auto& [path, user, list, download] : Rows<const char*, const char*, bool, bool>{
+             {"/photo/x", "alice", true, true},
+             {"/photo", "bob", true, true},
+             {"/photo", "carol", false, false},
+             {"/quiet", "bob", false, false},
+             {"/quiet", "carol", true, true},
+             {"/view", "bob", true, false},
+             {"/drop", "bob", true, true},
+             {"/mixed", "bob", false, false},
+         }) {
         OrvLibSetErr(7);
-        EXPECT_EQ(CheckShareListPrivilege(c.user, nullptr, c.path), c.list) << c.path << c.user;
+        EXPECT_EQ(CheckShareListPrivilege(user, nullptr, path), list) << path << user;
         EXPECT_EQ(OrvLibGetErr(), 7) << "a refused listing sets no code";
-        const std::string line = refused[0] + c.path;
-        EXPECT_EQ(takeLogTexts(), c.list ? Texts{} : Texts{line});
-        EXPECT_EQ(CheckShareDownloadPrivilege(c.user, nullptr, c.path), c.download) << c.path << c.user;
-        EXPECT_EQ(OrvLibGetErr(), c.download ? 7 : 407);
-        EXPECT_EQ(takeLogTexts(), c.download ? Texts{} : Texts{line});
+        const std::string line = refused[0] + path;
+        EXPECT_EQ(takeLogTexts(), list ? Texts{} : Texts{line});
+        EXPECT_EQ(CheckShareDownloadPrivilege(user, nullptr, path), download) << path << user;
+        EXPECT_EQ(OrvLibGetErr(), download ? 7 : 407);
+        EXPECT_EQ(takeLogTexts(), download ? Texts{} : Texts{line});
     }
 }
 
@@ -201,49 +179,42 @@ TEST_F(PrivilegeTest, ListingAndDownloadingAtTheEdges) {
 }
 
 TEST_F(PrivilegeTest, Uploads) {
-    for (const char* share : {"photo", "drop", "quiet"}) support::writeFile(shareRoot(share) + "/there", "x");
-    struct Case {
-        const char* path;
-        const char* user;
-        int mode;
-        bool granted;
-        int modeAfter, code;
-        Texts log;
-    };
-    const Case cases[] = {
-        {"/photo/new", "alice", 0, true, 0, 7, {}},
-        {"/photo/there", "alice", 1, true, 1, 7, {}},
-        {"/photo/there", "alice", 0, false, 0, 414, {"orveldir:# Share no modify privilege, path=/photo/there"}},
-        {"/photo/new", "bob", 0, false, 0, 407, {"orveldir:# Share no upload privilege, path=/photo/new"}},
-        {"/photo/new", "bob", 2, false, 2, 407, {"orveldir:# Share no upload privilege, path=/photo/new"}},
-        {"/drop/there", "alice", 0, true, 2, 7, {}},
-        {"/quiet/there", "alice", 1, true, 2, 7, {}},
-        {"/quiet/there", "carol", 1, true, 1, 7, {}},  // an administrator is free of the mask
-        {"/drop/there", "bob", 0, false, 0, 407, {"orveldir:# Share no upload privilege, path=/drop/there"}},
-        {"/none/x",
-         "alice",
-         0,
-         false,
-         0,
-         408,
-         {"orveldir(#): VEXOShareGet none fail", "orveldir:# Failed to get privilege, path= /none/x, reason=[408] "}},
-        {nullptr, "alice", 0, false, 0, 400, {}},
-        {"/home/x", nullptr, 0, false, 0, 400, {"orveldir:# Failed to get path info:/home/x, reason=[190]"}},
-        {"/home/x", nullptr, 2, true, 2, 7, {}},
-    };
-    for (const Case& c : cases) {
-        SCOPED_TRACE(std::string(c.path != nullptr ? c.path : "null") + " mode " + std::to_string(c.mode));
+    for (const char* share : {"photo", "drop", "quiet"}) writeFile(shareRoot(share) + "/there", "x");
+    for (const auto& [path, user, mode, granted, modeAfter, code, log] :
+         Rows<const char*, const char*, int, bool, int, int, Texts>{
+             {"/photo/new", "alice", 0, true, 0, 7, {}},
+             {"/photo/there", "alice", 1, true, 1, 7, {}},
+             {"/photo/there", "alice", 0, false, 0, 414, {"orveldir:# Share no modify privilege, path=/photo/there"}},
+             {"/photo/new", "bob", 0, false, 0, 407, {"orveldir:# Share no upload privilege, path=/photo/new"}},
+             {"/photo/new", "bob", 2, false, 2, 407, {"orveldir:# Share no upload privilege, path=/photo/new"}},
+             {"/drop/there", "alice", 0, true, 2, 7, {}},
+             {"/quiet/there", "alice", 1, true, 2, 7, {}},
+             {"/quiet/there", "carol", 1, true, 1, 7, {}},  // an administrator is free of the mask
+             {"/drop/there", "bob", 0, false, 0, 407, {"orveldir:# Share no upload privilege, path=/drop/there"}},
+             {"/none/x",
+              "alice",
+              0,
+              false,
+              0,
+              408,
+              {"orveldir(#): VEXOShareGet none fail",
+               "orveldir:# Failed to get privilege, path= /none/x, reason=[408] "}},
+             {nullptr, "alice", 0, false, 0, 400, {}},
+             {"/home/x", nullptr, 0, false, 0, 400, {"orveldir:# Failed to get path info:/home/x, reason=[190]"}},
+             {"/home/x", nullptr, 2, true, 2, 7, {}},
+         }) {
+        SCOPED_TRACE(std::string(path != nullptr ? path : "null") + " mode " + std::to_string(mode));
         OrvLibSetErr(7);
-        auto mode = static_cast<_tag__type_>(c.mode);
-        EXPECT_EQ(CheckShareUploadPrivilege(c.user, nullptr, c.path, mode), c.granted);
-        EXPECT_EQ(mode, c.modeAfter);
-        EXPECT_EQ(OrvLibGetErr(), c.code);
-        EXPECT_EQ(takeLogTexts(), c.log);
+        auto changed = static_cast<_tag__type_>(mode);
+        EXPECT_EQ(CheckShareUploadPrivilege(user, nullptr, path, changed), granted);
+        EXPECT_EQ(changed, modeAfter);
+        EXPECT_EQ(OrvLibGetErr(), code);
+        EXPECT_EQ(takeLogTexts(), log);
     }
 }
 
 TEST_F(PrivilegeTest, UploadsIntoTheHome) {
-    support::writeFile(shareRoot("homes") + "/bob/there", "x");
+    writeFile(shareRoot("homes") + "/bob/there", "x");
     auto mode = OVERWRITE_MODE_ERROR;
     EXPECT_TRUE(CheckShareUploadPrivilege("bob", nullptr, "/home/new", mode));
     EXPECT_FALSE(CheckShareUploadPrivilege("bob", nullptr, "/home/there", mode));
@@ -260,7 +231,7 @@ TEST_F(PrivilegeTest, LookupUnderEveryFault) {
         int privilege;
     };
     for (const Case& c : {Case{"alice", nullptr, 2}, Case{"CORP\\eve", "sid", 2}, Case{"bob", nullptr, 0}}) {
-        const int faults = support::sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
+        const int faults = sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
             OrvLibSetErr(0);
             const Answer out = ask("/mixed/x", c.user, c.sid);
             if (out.result == 0) {
@@ -279,7 +250,7 @@ TEST_F(PrivilegeTest, LookupUnderEveryFault) {
 
 TEST_F(PrivilegeTest, Explanations) {
     PrivilegeReason reason;
-    support::writeFile(shareRoot("mixed") + "/a", "x");
+    writeFile(shareRoot("mixed") + "/a", "x");
     addMount(shareRoot("view"), "nfs", "ro");
     ASSERT_TRUE(ExplainPrivilege("/mixed/a", "bob", nullptr, reason));
     EXPECT_EQ(reason.rule, PrivilegeRule::kNoAccess);
@@ -310,7 +281,7 @@ TEST_F(PrivilegeTest, Explanations) {
     EXPECT_EQ(reason.rule, PrivilegeRule::kService);
     EXPECT_EQ(reason.privilege, 1);
 
-    support::makeFolder(shareRoot("homes") + "/alice");
+    makeFolder(shareRoot("homes") + "/alice");
     ASSERT_TRUE(ExplainPrivilege("/home/x", "alice", nullptr, reason));
     EXPECT_EQ(reason.rule, PrivilegeRule::kHome);
     EXPECT_EQ(reason.shareRoot, shareRoot("homes") + "/alice");

@@ -1,19 +1,13 @@
-#include <algorithm>
-
-#include "fault_gate.h"
-#include "orvel/error_state.h"
 #include "orvel/privilege.h"
-#include "support/appliance.h"
 #include "support/fault_sweep.h"
 #include "support/log_texts.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
 using Texts = std::vector<std::string>;
-using support::takeLogTexts;
 
-class ShareListTest : public support::ApplianceTest {
+class ShareListTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -32,27 +26,21 @@ class ShareListTest : public support::ApplianceTest {
 };
 
 TEST_F(ShareListTest, OnlyTheListsDecide) {
-    struct Case {
-        const char* user;
-        int sort, writable;
-        Texts names;
-    };
-    const Case cases[] = {
-        {"alice", 0, 0, {"photo", "homes", "Zoo", "attic"}},
-        {"alice", 1, 0, {"attic", "homes", "photo", "Zoo"}},
-        {"alice", 7, 1, {"homes", "photo", "Zoo"}},
-        {"bob", 1, 0, {"attic", "cave", "homes", "photo", "Zoo"}},
-        {"bob", 0, 1, {"homes", "cave"}},
-        {"carol", 0, 0, {"homes"}},  // an administrator is nothing special here
-        {"fay@corp", 0, 0, {"dune"}},
-        {"unknown", 0, 0, {}},
-        {"", 0, 0, {}},
-    };
-    for (const Case& c : cases) {
+    for (const auto& [user, sort, writable, expected] : Rows<const char*, int, int, Texts>{
+             {"alice", 0, 0, {"photo", "homes", "Zoo", "attic"}},
+             {"alice", 1, 0, {"attic", "homes", "photo", "Zoo"}},
+             {"alice", 7, 1, {"homes", "photo", "Zoo"}},
+             {"bob", 1, 0, {"attic", "cave", "homes", "photo", "Zoo"}},
+             {"bob", 0, 1, {"homes", "cave"}},
+             {"carol", 0, 0, {"homes"}},  // an administrator is nothing special here
+             {"fay@corp", 0, 0, {"dune"}},
+             {"unknown", 0, 0, {}},
+             {"", 0, 0, {}},
+         }) {
         OrvLibSetErr(7);
-        const PVLIBCSZLIST list = OrvLibValidShareGen(c.user, c.sort, c.writable);
+        const PVLIBCSZLIST list = OrvLibValidShareGen(user, sort, writable);
         EXPECT_NE(list, nullptr);
-        EXPECT_EQ(names(list), c.names) << c.user << c.sort << c.writable;
+        EXPECT_EQ(names(list), expected) << user << sort << writable;
         EXPECT_EQ(OrvLibGetErr(), 0);
     }
 }
@@ -61,19 +49,15 @@ TEST_F(ShareListTest, Failures) {
     EXPECT_EQ(OrvLibValidShareGen(nullptr, 0, 0), nullptr);
     EXPECT_EQ(OrvLibGetErr(), 401);
     EXPECT_EQ(takeLogTexts(), Texts{"orveldir(#) bad parameter"});
-    struct Case {
-        const char* operation;
-        Texts log;
-    };
-    const Case cases[] = {{"VLIBCSzListAlloc", {"orveldir(#) malloc fail"}},
-                          {"VEXOShareDBOpen", {"orveldir:# VEXOShareDBOpenFile Error[8100]\n"}}};
-    for (const Case& c : cases) {
+    for (const auto& [operation, log] :
+         Rows<const char*, Texts>{{"VLIBCSzListAlloc", {"orveldir(#) malloc fail"}},
+                                  {"VEXOShareDBOpen", {"orveldir:# VEXOShareDBOpenFile Error[8100]\n"}}}) {
         OrvLibSetErr(0);
         vexo::gate::reset();
-        vexo::gate::fail(c.operation, VEXO_ERR_GENERAL, 0, 1);
-        EXPECT_EQ(OrvLibValidShareGen("alice", 1, 0), nullptr) << c.operation;
+        vexo::gate::fail(operation, VEXO_ERR_GENERAL, 0, 1);
+        EXPECT_EQ(OrvLibValidShareGen("alice", 1, 0), nullptr) << operation;
         EXPECT_EQ(OrvLibGetErr(), 401);
-        EXPECT_EQ(takeLogTexts(), c.log);
+        EXPECT_EQ(takeLogTexts(), log);
     }
 }
 
@@ -100,7 +84,7 @@ TEST_F(ShareListTest, AMalformedSectionHidesNoOther) {
 // The platform's own pushes come first; from some call on the one that fails is a push of a name.
 TEST_F(ShareListTest, NamesThatFindNoMemory) {
     int failed = 0;
-    const int faults = support::sweepFaults(
+    const int faults = sweepFaults(
         VEXO_ERR_GENERAL,
         [&](int) {
             OrvLibSetErr(7);
@@ -117,7 +101,7 @@ TEST_F(ShareListTest, NamesThatFindNoMemory) {
 // A share that is not the user's never shows, whatever fails.
 TEST_F(ShareListTest, EnumerationUnderEveryFault) {
     const Texts whole = {"photo", "homes", "Zoo", "attic"};
-    const int faults = support::sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
+    const int faults = sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
         OrvLibSetErr(7);
         const PVLIBCSZLIST list = OrvLibValidShareGen("alice", 0, 0);
         EXPECT_EQ(OrvLibGetErr(), list == nullptr ? 401 : 0);

@@ -1,24 +1,14 @@
 #include "orvel/share_path.h"
 
-#include <sys/stat.h>
-#include <unistd.h>
-
 #include <climits>
-#include <cstdlib>
-#include <cstring>
-#include <memory>
 
-#include "fault_gate.h"
-#include "orvel/error_state.h"
-#include "support/appliance.h"
 #include "support/fault_sweep.h"
 #include "support/log_texts.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
 using Texts = std::vector<std::string>;
-using support::takeLogTexts;
 
 struct Resolved {
     int result = -1;
@@ -31,34 +21,27 @@ Resolved resolve(const char* path, const std::string& user) {
     return out;
 }
 
-class SharePathTest : public support::ApplianceTest {};
+class SharePathTest : public ApplianceTest {};
 
 TEST_F(SharePathTest, Components) {
     const std::string deep = "/" + std::string(4093, 'a') + "bc";
-    struct Case {
-        std::string path;
-        const char* first;
-        const char* last;
-        Texts log;
-    };
-    const Case cases[] = {
-        {"/a/b/c", "a", "c", {}},
-        {"//a//b//", "a", "b", {}},
-        {"a/b", "a", "b", {}},
-        {"/\xff\xfe/..", "\xff\xfe", "..", {}},
-        {"/only", "only", "only", {}},
-        {"photo", nullptr, nullptr, {"orveldir(#): bad path name=photo"}},
-        {"", nullptr, nullptr, {"orveldir(#): bad path name="}},
-        {"/", nullptr, nullptr, {"orveldir(#) error path"}},
-        {"//", nullptr, nullptr, {"orveldir(#) error path"}},
-    };
-    for (const Case& c : cases) {
-        for (const int first : {1, 0}) {
-            std::string path = c.path;
-            const std::unique_ptr<char, decltype(&free)> found(OrvLibGetTokOfPath(path.data(), first), free);
-            EXPECT_STREQ(found.get(), first != 0 ? c.first : c.last) << c.path;
-            EXPECT_EQ(path, c.path) << "the argument stays";
-            EXPECT_EQ(takeLogTexts(), c.log);
+    for (const auto& [text, first, last, log] : Rows<std::string, const char*, const char*, Texts>{
+             {"/a/b/c", "a", "c", {}},
+             {"//a//b//", "a", "b", {}},
+             {"a/b", "a", "b", {}},
+             {"/\xff\xfe/..", "\xff\xfe", "..", {}},
+             {"/only", "only", "only", {}},
+             {"photo", nullptr, nullptr, {"orveldir(#): bad path name=photo"}},
+             {"", nullptr, nullptr, {"orveldir(#): bad path name="}},
+             {"/", nullptr, nullptr, {"orveldir(#) error path"}},
+             {"//", nullptr, nullptr, {"orveldir(#) error path"}},
+         }) {
+        for (const int wanted : {1, 0}) {
+            std::string path = text;
+            const std::unique_ptr<char, decltype(&free)> found(OrvLibGetTokOfPath(path.data(), wanted), free);
+            EXPECT_STREQ(found.get(), wanted != 0 ? first : last) << path;
+            EXPECT_EQ(path, text) << "the argument stays";
+            EXPECT_EQ(takeLogTexts(), log);
         }
     }
     std::string path = deep;
@@ -74,23 +57,19 @@ TEST_F(SharePathTest, Components) {
 
 TEST_F(SharePathTest, SharesResolve) {
     const std::string root = shareRoot("photo"), longRest = "/" + std::string(5000, 'x');
-    struct Case {
-        std::string path, rest;
-    };
-    const Case cases[] = {
-        {"/photo", ""},
-        {"/photo/2012/a.jpg", "/2012/a.jpg"},
-        {"/photo/", "/"},
-        {"//photo/a", "/a"},
-        {"photo/a", "/a"},
-        {"/photo//a/../b/./", "//a/../b/./"},
-        {"/photo/\xff\n", "/\xff\n"},
-        {"/photo" + longRest, longRest},
-    };
-    for (const Case& c : cases) {
-        const Resolved out = resolve(c.path.c_str(), "alice");
-        EXPECT_EQ(out.result, 1) << c.path;
-        EXPECT_EQ(out.real, root + c.rest);
+    for (const auto& [path, rest] : Rows<std::string, std::string>{
+             {"/photo", ""},
+             {"/photo/2012/a.jpg", "/2012/a.jpg"},
+             {"/photo/", "/"},
+             {"//photo/a", "/a"},
+             {"photo/a", "/a"},
+             {"/photo//a/../b/./", "//a/../b/./"},
+             {"/photo/\xff\n", "/\xff\n"},
+             {"/photo" + longRest, longRest},
+         }) {
+        const Resolved out = resolve(path.c_str(), "alice");
+        EXPECT_EQ(out.result, 1) << path;
+        EXPECT_EQ(out.real, root + rest);
         EXPECT_EQ(out.share, "photo");
         EXPECT_EQ(out.root, root);
         EXPECT_EQ(out.volume, "/tmp");
@@ -147,14 +126,14 @@ TEST_F(SharePathTest, HomeIsMadeOnFirstUse) {
     struct stat status {};
     ASSERT_EQ(stat(home.c_str(), &status), 0);
     EXPECT_EQ(status.st_mode & 07777, 0755U);
-    EXPECT_EQ(status.st_uid, support::kAliceUid);
-    EXPECT_EQ(status.st_gid, support::kUsersGid);
+    EXPECT_EQ(status.st_uid, kAliceUid);
+    EXPECT_EQ(status.st_gid, kUsersGid);
 }
 
 TEST_F(SharePathTest, HomeIsCanonicalAndAnExistingOneStays) {
     const std::string place = shareRoot("photo") + "/elsewhere", home = shareRoot("homes") + "/alice";
-    support::makeFolder(place, 0700);
-    support::makeFolder(home, 0711);
+    makeFolder(place, 0700);
+    makeFolder(home, 0711);
     std::string path = "before";
     EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 1);
     EXPECT_EQ(path, home);
@@ -171,14 +150,14 @@ TEST_F(SharePathTest, HomeIsCanonicalAndAnExistingOneStays) {
 TEST_F(SharePathTest, HomeThatCannotBeHad) {
     const std::string home = shareRoot("homes") + "/alice";
     std::string path = "before";
-    support::writeFile(home, "a file stands in the way");
+    writeFile(home, "a file stands in the way");
     EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 0);
     EXPECT_EQ(OrvLibGetErr(), 408);
     const std::string start = "orveldir:# Fail to mkdir for home [" + home + "]. (stop at ";
     EXPECT_EQ(takeLogTexts(), Texts{start + "alice): Not a directory"});
 
     ASSERT_EQ(unlink(home.c_str()), 0);
-    support::makeFolder(home);
+    makeFolder(home);
     vexo::gate::fail("VEXOFSMkdirP", 0x8100, EROFS);
     EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 0);
     EXPECT_EQ(takeLogTexts(), Texts{start + "(null)): Read-only file system"});
@@ -188,9 +167,9 @@ TEST_F(SharePathTest, HomeThatCannotBeHad) {
     const std::string part = "/" + std::string(199, 'd'), place = shareRoot("photo");
     std::string half;
     for (int i = 0; i < 12; ++i) half += part;
-    support::makeFolder(place + half);
+    makeFolder(place + half);
     ASSERT_EQ(symlink((place + half).c_str(), (place + "/half").c_str()), 0);
-    support::makeFolder(place + "/half" + half);
+    makeFolder(place + "/half" + half);
     ASSERT_EQ(rmdir(home.c_str()), 0);
     ASSERT_EQ(symlink((place + "/half" + half).c_str(), home.c_str()), 0);
     EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 0);
@@ -207,26 +186,22 @@ TEST_F(SharePathTest, HomeThatCannotBeHad) {
 
 TEST_F(SharePathTest, CanonicalPaths) {
     const std::string root = shareRoot("photo");
-    support::makeFolder(root + "/a");
-    support::writeFile(root + "/file", "x");
+    makeFolder(root + "/a");
+    writeFile(root + "/file", "x");
     ASSERT_EQ(symlink("a", (root + "/link").c_str()), 0);
     char resolved[PATH_MAX];
     EXPECT_EQ(OrvLibRealFullPathGet((root + "//link/./../a").c_str(), resolved, 1), 1);
     EXPECT_EQ(std::string(resolved), root + "/a");
 
-    struct Case {
-        std::string path;
-        int failure, code;
-    };
-    const Case cases[] = {{root + "/none", ENOENT, 408},
-                          {root + "/file/x", ENOTDIR, 401},
-                          {"/" + std::string(5000, 'x'), ENAMETOOLONG, 401},
-                          {"", ENOENT, 408}};
-    for (const Case& c : cases) {
-        EXPECT_EQ(OrvLibRealFullPathGet(c.path.c_str(), resolved, 4095), 0);
-        EXPECT_EQ(errno, c.failure);
-        EXPECT_EQ(OrvLibGetErr(), c.code) << c.path;
-        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# readpath(" + c.path + ") fail (" + strerror(c.failure) + ")"});
+    for (const auto& [path, failure, code] :
+         Rows<std::string, int, int>{{root + "/none", ENOENT, 408},
+                                     {root + "/file/x", ENOTDIR, 401},
+                                     {"/" + std::string(5000, 'x'), ENAMETOOLONG, 401},
+                                     {"", ENOENT, 408}}) {
+        EXPECT_EQ(OrvLibRealFullPathGet(path.c_str(), resolved, 4095), 0);
+        EXPECT_EQ(errno, failure);
+        EXPECT_EQ(OrvLibGetErr(), code) << path;
+        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# readpath(" + path + ") fail (" + strerror(failure) + ")"});
     }
     OrvLibSetErr(0);
     EXPECT_EQ(OrvLibRealFullPathGet(root.c_str(), resolved, 0), 0);
@@ -237,13 +212,13 @@ TEST_F(SharePathTest, CanonicalPaths) {
 
 TEST_F(SharePathTest, DeniedCanonicalPath) {
     SKIP_WITHOUT_ROOT();
-    support::makeFolder(shareRoot("photo") + "/closed/x", 0755);
+    makeFolder(shareRoot("photo") + "/closed/x", 0755);
     ASSERT_EQ(chmod((shareRoot("photo") + "/closed").c_str(), 0700), 0);
-    support::asUser(support::kBobUid, support::kUsersGid, [&] {
+    asUser(kBobUid, kUsersGid, [&] {
         char resolved[PATH_MAX];
         EXPECT_EQ(OrvLibRealFullPathGet((shareRoot("photo") + "/closed/x").c_str(), resolved, 4095), 0);
         EXPECT_EQ(OrvLibGetErr(), 407);
-        support::takeLog();
+        takeLog();
         return 0;
     });
 }
@@ -268,24 +243,17 @@ TEST_F(SharePathTest, TranslationFillsAtMostOneByteLess) {
 
 TEST_F(SharePathTest, TranslationsThatFail) {
     char out[100] = "out", missing[] = "/nowhere/x", slashes[] = "//", home[] = "/home/a";
-    struct Case {
-        char* path;
-        char* out;
-        int platform;
-        Texts log;
-    };
-    const Case cases[] = {
-        {nullptr, out, 0x0D00, {"orveldir(#) bad parameter, oldpath=(null), new path=out"}},
-        {missing, nullptr, 0x0D00, {"orveldir(#) bad parameter, oldpath=/nowhere/x, new path=(null)"}},
-        {slashes, out, 0x8100, {"orveldir(#) error path", "orveldir(#) OrvLibGetTokOfPath fail"}},
-        {missing, out, 0x1400, {}},
-        {home, out, 0x1400, {}},
-    };
-    for (const Case& c : cases) {
+    for (const auto& [path, place, platform, log] : Rows<char*, char*, int, Texts>{
+             {nullptr, out, 0x0D00, {"orveldir(#) bad parameter, oldpath=(null), new path=out"}},
+             {missing, nullptr, 0x0D00, {"orveldir(#) bad parameter, oldpath=/nowhere/x, new path=(null)"}},
+             {slashes, out, 0x8100, {"orveldir(#) error path", "orveldir(#) OrvLibGetTokOfPath fail"}},
+             {missing, out, 0x1400, {}},
+             {home, out, 0x1400, {}},
+         }) {
         VLIBCErrSetEx(0, "", 0);
-        EXPECT_EQ(OrvLibTransFullPath(c.path, c.out, sizeof out), -1);
-        EXPECT_EQ(VLIBCErrGet(), c.platform);
-        EXPECT_EQ(takeLogTexts(), c.log);
+        EXPECT_EQ(OrvLibTransFullPath(path, place, sizeof out), -1);
+        EXPECT_EQ(VLIBCErrGet(), platform);
+        EXPECT_EQ(takeLogTexts(), log);
         EXPECT_STREQ(out, "out");
     }
     vexo::gate::fail("VEXOShareGet", 0x8100);
@@ -297,25 +265,18 @@ TEST_F(SharePathTest, TranslationsThatFail) {
 
 TEST_F(SharePathTest, EncryptedShares) {
     addShare("secret", "valid users = alice\nvexo:encrypted = yes\n");
-    struct Case {
-        const char* share;
-        int result;
-        bool encrypted;
-        int code;
-        Texts log;
-    };
-    const Case cases[] = {{"secret", 1, true, 0, {}},
-                          {"photo", 1, false, 0, {}},
-                          {"home", 1, false, 0, {}},
-                          {"/home/x", 1, false, 0, {}},
-                          {"none", 0, false, 408, {"orveldir:# VEXOShareGet fail none"}}};
-    for (const Case& c : cases) {
+    for (const auto& [share, result, expected, code, log] :
+         Rows<const char*, int, bool, int, Texts>{{"secret", 1, true, 0, {}},
+                                                  {"photo", 1, false, 0, {}},
+                                                  {"home", 1, false, 0, {}},
+                                                  {"/home/x", 1, false, 0, {}},
+                                                  {"none", 0, false, 408, {"orveldir:# VEXOShareGet fail none"}}}) {
         OrvLibSetErr(0);
         bool encrypted = true;
-        EXPECT_EQ(OrvLibCheckEncryptShare(c.share, &encrypted), c.result) << c.share;
-        EXPECT_EQ(encrypted, c.encrypted) << c.share;
-        EXPECT_EQ(OrvLibGetErr(), c.code) << c.share;
-        EXPECT_EQ(takeLogTexts(), c.log);
+        EXPECT_EQ(OrvLibCheckEncryptShare(share, &encrypted), result) << share;
+        EXPECT_EQ(encrypted, expected) << share;
+        EXPECT_EQ(OrvLibGetErr(), code) << share;
+        EXPECT_EQ(takeLogTexts(), log);
     }
     EXPECT_EQ(OrvLibCheckEncryptShare("photo", nullptr), 0);
     EXPECT_EQ(OrvLibGetErr(), 400);
@@ -324,10 +285,10 @@ TEST_F(SharePathTest, EncryptedShares) {
 // Whatever fails, the result is either right or a failure with a code, and nothing is kept open.
 TEST_F(SharePathTest, ResolutionUnderEveryFault) {
     const std::string home = shareRoot("homes") + "/alice";
-    support::makeFolder(home);
+    makeFolder(home);
     for (const char* path : {"/photo/x", "/home/x"}) {
         const std::string expected = path[1] == 'p' ? shareRoot("photo") + "/x" : home + "/x";
-        const int faults = support::sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
+        const int faults = sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
             OrvLibSetErr(0);
             const Resolved out = resolve(path, "alice");
             if (out.result == 1) {

@@ -1,23 +1,12 @@
 #include "orvel/upload_check.h"
 
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <string>
-
-#include "fault_gate.h"
-#include "orvel/error_state.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
-using support::announceLog;
-
 constexpr auto kError = static_cast<_tag__type_>(0);
 
-class UploadCheckTest : public support::ApplianceTest {};
+class UploadCheckTest : public ApplianceTest {};
 
 TEST(UploadErrors, Table) {
     const int codes[] = {401, 1803, 401, 401, 415, 412, 401, 1802, 1801, 1800, 1800, 408, 411, 416, 407, 401};
@@ -27,17 +16,25 @@ TEST(UploadErrors, Table) {
 }
 
 TEST_F(UploadCheckTest, CopyFailuresHaveCodesOfTheirOwn) {
-    struct Case {
-        int platformError, code;
-    };
-    const Case cases[] = {{0x0300, 407},  {0x0600, 408}, {0x0700, 408}, {0x0800, 414}, {0x2400, 415},
-                          {0x2900, 416},  {0x8400, 411}, {0xA000, 414}, {0xA200, 414}, {0xA300, 1805},
-                          {0xA400, 1804}, {0xA500, 419}, {0xC300, 412}, {0x8100, 401}, {0x1234, 401}};
-    for (const auto& test : cases) {
-        vexo::gate::fail("VEXOFileCopy", test.platformError);
+    for (const auto& [platformError, code] : Rows<int, int>{{0x0300, 407},
+                                                            {0x0600, 408},
+                                                            {0x0700, 408},
+                                                            {0x0800, 414},
+                                                            {0x2400, 415},
+                                                            {0x2900, 416},
+                                                            {0x8400, 411},
+                                                            {0xA000, 414},
+                                                            {0xA200, 414},
+                                                            {0xA300, 1805},
+                                                            {0xA400, 1804},
+                                                            {0xA500, 419},
+                                                            {0xC300, 412},
+                                                            {0x8100, 401},
+                                                            {0x1234, 401}}) {
+        vexo::gate::fail("VEXOFileCopy", platformError);
         announceLog("Failed to copy /a to /b, reason=[");
         EXPECT_FALSE(MoveFile("alice", "/a", "/b", nullptr));
-        EXPECT_EQ(OrvLibGetErr(), test.code) << test.platformError;
+        EXPECT_EQ(OrvLibGetErr(), code) << platformError;
         vexo::gate::reset();
     }
     OrvLibSetErr(7);
@@ -51,15 +48,15 @@ TEST_F(UploadCheckTest, CopyFailuresHaveCodesOfTheirOwn) {
 TEST_F(UploadCheckTest, MoveGivesTheFileToItsUser) {
     SKIP_WITHOUT_ROOT();
     const std::string source = shareRoot("photo") + "/src", target = shareRoot("photo") + "/dst";
-    support::writeFile(source, "data", 0600);
+    writeFile(source, "data", 0600);
     ASSERT_TRUE(MoveFile("alice", source.c_str(), target.c_str(), nullptr));
     struct stat status = {};
     ASSERT_EQ(stat(target.c_str(), &status), 0);
-    EXPECT_EQ(status.st_uid, support::kAliceUid);
-    EXPECT_EQ(status.st_gid, gid_t{support::kUsersGid});
-    EXPECT_EQ(support::readFile(target), "data");
+    EXPECT_EQ(status.st_uid, kAliceUid);
+    EXPECT_EQ(status.st_gid, gid_t{kUsersGid});
+    EXPECT_EQ(readFile(target), "data");
 
-    support::writeFile(source, "data", 0600);
+    writeFile(source, "data", 0600);
     announceLog("reason=[A400]");
     EXPECT_FALSE(MoveFile("alice", source.c_str(), (target + "2").c_str(), [] { return 1; }));
     EXPECT_EQ(OrvLibGetErr(), 1804);
@@ -70,8 +67,8 @@ TEST_F(UploadCheckTest, MoveGivesTheFileToItsUser) {
 TEST_F(UploadCheckTest, CheckedInOrder) {
     SKIP_WITHOUT_ROOT();
     const std::string root = shareRoot("photo");
-    support::writeFile(root + "/there", "x", 0666);
-    support::makeFolder(root + "/closed", 0755);
+    writeFile(root + "/there", "x", 0666);
+    makeFolder(root + "/closed", 0755);
     addShare("fixed", "read only = no\nvexo:restriction = 2\n");
     struct Case {
         const char *what, *user, *path;
@@ -94,7 +91,7 @@ TEST_F(UploadCheckTest, CheckedInOrder) {
     };
     for (const auto& test : cases) {
         SCOPED_TRACE(test.what);
-        support::inChild([&] {
+        inChild([&] {
             OrvLibSetErr(0);
             auto mode = static_cast<_tag__type_>(test.mode);
             EXPECT_EQ(CheckFile(test.path, test.user, nullptr, mode), test.result);
@@ -104,7 +101,7 @@ TEST_F(UploadCheckTest, CheckedInOrder) {
             EXPECT_EQ(geteuid() != 0, test.switched);
             EXPECT_EQ(static_cast<int>(mode), test.modeAfter);
             std::string log;
-            for (const auto& line : support::takeLog()) log += line.text + "\n";
+            for (const auto& line : takeLog()) log += line.text + "\n";
             if (test.log != nullptr) {
                 EXPECT_NE(log.find(test.log), std::string::npos) << log;
             }
@@ -116,14 +113,14 @@ TEST_F(UploadCheckTest, CheckedInOrder) {
 // The look-up of permissions can fail without a code; what was stored before is answered then, but never "acceptable".
 TEST_F(UploadCheckTest, ARefusalIsNeverZero) {
     for (const int before : {0, 7}) {
-        support::inChild([&] {
+        inChild([&] {
             OrvLibSetErr(before);
             vexo::gate::fail("VEXOACLPermGet", VEXO_ERR_GENERAL);
             auto mode = kError;
             const int expected = before == 0 ? 401 : before;
             EXPECT_EQ(CheckFile("/photo/a", "alice", nullptr, mode), expected);
             EXPECT_EQ(OrvLibGetErr(), expected);
-            const auto log = support::takeLog();
+            const auto log = takeLog();
             EXPECT_FALSE(log.empty());
             const std::string reason = before == 0 ? "reason=[191]" : "reason=[7]";
             EXPECT_TRUE(!log.empty() && log.back().text.ends_with(reason)) << reason;
@@ -136,12 +133,12 @@ TEST_F(UploadCheckTest, ASwitchThatLeavesRootIsRefused) {
     SKIP_WITHOUT_ROOT();
     addUser("toor", 0, 0);
     addShare("open", "read only = no\n");
-    support::inChild([] {
+    inChild([] {
         OrvLibSetErr(5);
         auto mode = kError;
         EXPECT_EQ(CheckFile("/open/a", "toor", nullptr, mode), 401);
         std::string log;
-        for (const auto& line : support::takeLog()) log += line.text + "\n";
+        for (const auto& line : takeLog()) log += line.text + "\n";
         EXPECT_NE(log.find("left the process at uid 0"), std::string::npos) << log;
         EXPECT_NE(log.find("Failed to set UGID for user=toor, sid=(null)"), std::string::npos) << log;
         return 0;

@@ -1,32 +1,19 @@
 #include "orvel/directory_walker.h"
 
 #include <dirent.h>
-#include <fcntl.h>
-#include <gtest/gtest.h>
 #include <sched.h>
 #include <sys/mount.h>
 #include <sys/resource.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
-#include <algorithm>
-#include <cerrno>
-#include <functional>
-#include <optional>
 #include <stdexcept>
-#include <string>
-#include <vector>
 
 #include "enum/tree_walk.h"
-#include "fault_gate.h"
-#include "support/appliance.h"
 #include "support/log_texts.h"
 #include "support/system_faults.h"
+#include "support/testing.h"
 
 namespace {
 
-using support::makeFolder;
-using support::writeFile;
 using Lines = std::vector<std::string>;
 
 enum class Order { kWalk, kTopDown, kFirstFolder, kFirstFolderOnly };
@@ -103,7 +90,7 @@ void expectLevel(Order order, const std::string& real, const std::string& displa
     for (const auto& name : folders) expectLevel(Order::kTopDown, below(real, name), below(display, name), lines);
 }
 
-class DirectoryWalkerTest : public support::ApplianceTest {
+class DirectoryWalkerTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -252,7 +239,7 @@ class Failures : public DirectoryWalkerTest {
                 vexo::gate::reset();
                 failure.cause(root_);
                 EXPECT_EQ(walk(order, static_cast<_enum_ignore_err_>(mode), real, only_), ignored);
-                const Lines log = support::takeLogTexts();
+                const Lines log = takeLogTexts();
                 EXPECT_EQ(log, ignored ? Lines{} : Lines{"orveldir:# " + failure.log});
                 std::sort(lines_.begin(), lines_.end());
                 if (ignored) {
@@ -302,13 +289,13 @@ TEST_F(Failures, OfReading) {
     makeFolder(root_ + "/a/sub");
     makeFolder(root_ + "/z");
     for (const int nth : {1, 2}) {  // at once, and behind what the first reading brought
-        std::optional<support::ReadingFault> fault;
+        std::optional<ReadingFault> fault;
         const auto cause = [&](const std::string& root) { fault.emplace(root + "/a", EIO, nth); };
         Lines entries{"show/a", "show/a/sub", "show/z"};
         if (nth == 1) entries.erase(entries.begin() + 1);
         check({"EIO", cause, false, "", "Failed to open " + root_ + "/a, error Input/output error", entries});
     }
-    support::ReadingFault gone(root_ + "/a", ENOENT);
+    ReadingFault gone(root_ + "/a", ENOENT);
     EXPECT_TRUE(walk(Order::kTopDown, ENUM_IGNORE_NO_ERR, root_, only_)) << "a folder removed meanwhile has no entries";
 }
 
@@ -318,7 +305,7 @@ TEST_F(Failures, OfPermissionsAsAnUnprivilegedUser) {
     writeFile(root_ + "/open/f", "x");
     const auto modeOfClosed = [&](mode_t mode) {
         chmod((root_ + "/closed").c_str(), mode);
-        chown((root_ + "/closed").c_str(), support::kBobUid, support::kUsersGid);
+        chown((root_ + "/closed").c_str(), kBobUid, kUsersGid);
     };
     struct Case {
         mode_t mode;
@@ -338,11 +325,11 @@ TEST_F(Failures, OfPermissionsAsAnUnprivilegedUser) {
         modeOfClosed(c.mode);
         std::string log = c.log;
         log.replace(log.find('%'), 1, root_);
-        EXPECT_EQ(support::asUser(support::kBobUid, support::kUsersGid,
-                                  [&] {
-                                      check({c.log, [](const std::string&) {}, true, c.start, log, c.entries});
-                                      return 0;
-                                  }),
+        EXPECT_EQ(asUser(kBobUid, kUsersGid,
+                         [&] {
+                             check({c.log, [](const std::string&) {}, true, c.start, log, c.entries});
+                             return 0;
+                         }),
                   0);
     }
     modeOfClosed(0700);
@@ -370,7 +357,7 @@ TEST_F(DirectoryWalkerTest, FolderReplacedDuringTheWalk) {
                 EXPECT_EQ(lines_, Lines{"show/victim"});
                 const Lines log{"orveldir:# Failed to chdir " + root + "/victim. " +
                                 (byLink ? "[Not a directory]" : "[Stale file handle]")};
-                EXPECT_EQ(support::takeLogTexts(), mode == ENUM_IGNORE_ALL_ERR ? Lines{} : log);
+                EXPECT_EQ(takeLogTexts(), mode == ENUM_IGNORE_ALL_ERR ? Lines{} : log);
             }
         }
     }
@@ -379,7 +366,7 @@ TEST_F(DirectoryWalkerTest, FolderReplacedDuringTheWalk) {
 // A folder may turn into the root of a mount when it is first entered.
 TEST_F(DirectoryWalkerTest, EntersAFolderMountedDuringTheWalk) {
     makeFolder(root_ + "/mount");
-    const int result = support::inChild([&] {
+    const int result = inChild([&] {
         bool mounted = false;
         if (unshare(CLONE_NEWNS) != 0 || mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) return 1;
         only_.action = [&](const std::string& path, const std::string& name) {
@@ -442,12 +429,12 @@ TEST_F(DirectoryWalkerTest, FourThousandLevelsWithFewDescriptors) {
     const DeepTree tree(kDepth);
     for (const Order order : {Order::kWalk, Order::kFirstFolder}) {
         SCOPED_TRACE(static_cast<int>(order));
-        const int result = support::inChild([&] {
+        const int result = inChild([&] {
             const rlimit few{256, 256}, smallStack{256 * 1024, 256 * 1024};
             EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &few) + setrlimit(RLIMIT_STACK, &smallStack), 0);
             int most = 0, calls = 0;
             only_.action = [&](const auto&, const auto&) {
-                if (++calls % 100 == 0) most = std::max(most, support::openDescriptors());
+                if (++calls % 100 == 0) most = std::max(most, openDescriptors());
                 return true;
             };
             EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, tree.root(), only_, &after_));
@@ -488,7 +475,7 @@ TEST_F(DirectoryWalkerTest, FoldersMovedAboveADeepWalk) {
         EXPECT_GE(files, alsoAbove && done ? kDepth - 6 : 0);
         EXPECT_EQ(done, c.mode == ENUM_IGNORE_ALL_ERR || files == kDepth);
         const Lines lost{"orveldir:# Failed to open " + tree.root() + levels(10) + ", error No such file or directory"};
-        EXPECT_EQ(support::takeLogTexts(), done ? Lines{} : lost);
+        EXPECT_EQ(takeLogTexts(), done ? Lines{} : lost);
         EXPECT_EQ(std::count(lines_.begin(), lines_.end(), "-show/d"), done ? 1 : 0);
         if (alsoAbove) {
             EXPECT_EQ(rename((tree.elsewhere() + "/five").c_str(), five.c_str()), 0);

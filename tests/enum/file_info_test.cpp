@@ -1,13 +1,12 @@
 #include "orvel/file_info.h"
 
-#include <gtest/gtest.h>
 #include <json/value.h>
 #include <json/writer.h>
 
-#include <cstdint>
 #include <limits>
 
 #include "orvel/dir_entry.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -44,30 +43,25 @@ DIRENTRY_INFO sample() {
 }
 
 TEST(FileInfo, EachBitGivesItsMember) {
-    struct Case {
-        int bits;
-        const char* additional;  // null: no such member
-    };
-    const Case cases[] = {
-        {0, nullptr},
-        {0x100, nullptr},
-        {0x01, R"({"real_path":"/volume1/photo/a.jpg"})"},
-        {0x02, R"({"size":12.0})"},
-        {0x04, R"({"owner":{"gid":4294967295,"group":"users","uid":20001,"user":"alice"}})"},
-        {0x08, R"({"time":{"atime":4294967295,"crtime":3,"ctime":2,"mtime":1}})"},
-        {0x10, R"({"perm":{"acl":{"append":true,"del":true,"exec":true,"read":true,"write":true},)"
-               R"("is_acl_mode":true,"posix":644}})"},
-        {0x20, R"({"type":"JPG"})"},
-        {0x40, R"({"mount_point_type":"iso"})"},
-        {0x80, R"({"volume_status":{"freespace":4096.0,"readonly":true,"totalspace":1.8446744073709552e+19}})"},
-    };
-    for (const Case& c : cases) {
+    for (const auto& [bits, additional] : Rows<int, const char*>{
+             {0, nullptr},
+             {0x100, nullptr},
+             {0x01, R"({"real_path":"/volume1/photo/a.jpg"})"},
+             {0x02, R"({"size":12.0})"},
+             {0x04, R"({"owner":{"gid":4294967295,"group":"users","uid":20001,"user":"alice"}})"},
+             {0x08, R"({"time":{"atime":4294967295,"crtime":3,"ctime":2,"mtime":1}})"},
+             {0x10, R"({"perm":{"acl":{"append":true,"del":true,"exec":true,"read":true,"write":true},)"
+                    R"("is_acl_mode":true,"posix":644}})"},
+             {0x20, R"({"type":"JPG"})"},
+             {0x40, R"({"mount_point_type":"iso"})"},
+             {0x80, R"({"volume_status":{"freespace":4096.0,"readonly":true,"totalspace":1.8446744073709552e+19}})"},
+         }) {
         Json::Value out;
-        DumpFileInfo(c.bits, sample(), out);
+        DumpFileInfo(bits, sample(), out);
         const std::string rest = R"("isdir":false,"name":"a.jpg","path":"/photo/a.jpg"})";
         std::string expected = "{";
-        if (c.additional != nullptr) expected.append(R"("additional":)").append(c.additional).append(",");
-        EXPECT_EQ(compact(out), expected + rest) << c.bits;
+        if (additional != nullptr) expected.append(R"("additional":)").append(additional).append(",");
+        EXPECT_EQ(compact(out), expected + rest) << bits;
     }
 }
 

@@ -1,13 +1,10 @@
 #include "orvel/mount_status.h"
 
-#include <sys/stat.h>
-
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
-class MountStatusTest : public support::ApplianceTest {
+class MountStatusTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -22,29 +19,37 @@ class MountStatusTest : public support::ApplianceTest {
 };
 
 TEST_F(MountStatusTest, TypeOfTheMountAtExactlyThisFolder) {
-    struct Case {
-        const char* path;
-        int type;
-    };
     OrvelMountStatus mounts;
-    for (const auto& [path, type] :
-         {Case{"/volume1", 0}, Case{"/volume1/", 0}, Case{"/volume1///", 0}, Case{"/volume1/usb", 1},
-          Case{"/volume1/usb/deep", 3}, Case{"/with blank", 6}, Case{"/iso", 4}, Case{"/volume1-b", 11},
-          Case{"/volume1/a", 10}, Case{"/vol", 10}, Case{"/", 10}, Case{"", 10}, Case{nullptr, 10}}) {
+    for (const auto& [path, type] : Rows<const char*, int>{{"/volume1", 0},
+                                                           {"/volume1/", 0},
+                                                           {"/volume1///", 0},
+                                                           {"/volume1/usb", 1},
+                                                           {"/volume1/usb/deep", 3},
+                                                           {"/with blank", 6},
+                                                           {"/iso", 4},
+                                                           {"/volume1-b", 11},
+                                                           {"/volume1/a", 10},
+                                                           {"/vol", 10},
+                                                           {"/", 10},
+                                                           {"", 10},
+                                                           {nullptr, 10}}) {
         EXPECT_EQ(mounts.getFSTYPE(path), type) << (path == nullptr ? "null" : path);
     }
 }
 
 TEST_F(MountStatusTest, ReadOnlyByTheDeepestMountThatHoldsThePath) {
-    struct Case {
-        const char* path;
-        bool readOnly;
-    };
     OrvelMountStatus mounts;
-    for (const auto& [path, readOnly] :
-         {Case{"/volume1", false}, Case{"/volume1/a", false}, Case{"/volume1/usb", true}, Case{"/volume1/usb/a", true},
-          Case{"/volume1/usbx", false}, Case{"/volume1/usb/deep/a", false}, Case{"/volume1/usb/deeper", true},
-          Case{"/volume1-b/x", true}, Case{"/iso/", true}, Case{"/elsewhere", false}, Case{nullptr, false}}) {
+    for (const auto& [path, readOnly] : Rows<const char*, bool>{{"/volume1", false},
+                                                                {"/volume1/a", false},
+                                                                {"/volume1/usb", true},
+                                                                {"/volume1/usb/a", true},
+                                                                {"/volume1/usbx", false},
+                                                                {"/volume1/usb/deep/a", false},
+                                                                {"/volume1/usb/deeper", true},
+                                                                {"/volume1-b/x", true},
+                                                                {"/iso/", true},
+                                                                {"/elsewhere", false},
+                                                                {nullptr, false}}) {
         EXPECT_EQ(mounts.IsReadOnly(path), readOnly) << (path == nullptr ? "null" : path);
     }
 }
@@ -74,7 +79,7 @@ TEST_F(MountStatusTest, TableThatCannotBeRead) {
     const std::string table = systemRoot() + "/proc/mounts";
     ASSERT_EQ(chmod(table.c_str(), 0), 0);
     OrvelMountStatus mounts;
-    support::asUser(support::kAliceUid, support::kUsersGid, [&] {
+    asUser(kAliceUid, kUsersGid, [&] {
         EXPECT_FALSE(mounts.GetMountStatus());
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_FILE);
         EXPECT_STREQ(VLIBCErrorGetFile(), "orvelenum");

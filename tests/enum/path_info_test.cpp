@@ -1,17 +1,14 @@
 #include <json/value.h>
 
-#include "orvel/error_state.h"
 #include "orvel/file_info.h"
-#include "support/appliance.h"
 #include "support/log_texts.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
 using Texts = std::vector<std::string>;
-using support::takeLogTexts;
 
-class PathInfoTest : public support::ApplianceTest {};
+class PathInfoTest : public ApplianceTest {};
 
 TEST_F(PathInfoTest, TrailingSlashesGo) {
     for (const char* path : {"/photo/2012", "/photo/2012/", "/photo/2012///"}) {
@@ -29,46 +26,39 @@ TEST_F(PathInfoTest, TrailingSlashesGo) {
 }
 
 TEST_F(PathInfoTest, FailuresLeaveBothNumbers) {
-    struct Case {
-        const char* user;
-        const char* path;
-        int code, platform;
-        std::string kept;  // info.path afterwards
-        Texts log;
-    };
-    const Case cases[] = {
-        {nullptr, "/photo", 400, 0x0D00, "", {}},
-        {"alice", "", 400, 0x0D00, "", {}},
-        {"", "/photo", 400, 0x0D00, "/photo", {"orvelenum:# Fail to get the Full Path, /photo"}},
-        {"alice",
-         "/none//",
-         408,
-         0xBE00,
-         "/none",
-         {"orveldir:# VEXOShareGet fail", "orvelenum:# Fail to get the Full Path, /none//"}},
-        {"alice",
-         "///",
-         401,
-         0x8000,
-         "///",
-         {"orveldir(#) error path", "orveldir:# OrvLibGetTokOfPath fail",
-          "orvelenum:# Fail to get the Full Path, ///"}},
-        {"nobody",
-         "/home/x",
-         403,
-         0x8000,
-         "/home/x",
-         {"orveldir:# Failed to get user (nobody)", "orveldir:# OrvUserHomeFullPathGet fail",
-          "orvelenum:# Fail to get the Full Path, /home/x"}},
-    };
-    for (const Case& c : cases) {
+    for (const auto& [user, path, code, platform, kept, log] :
+         Rows<const char*, const char*, int, int, std::string, Texts>{
+             {nullptr, "/photo", 400, 0x0D00, "", {}},
+             {"alice", "", 400, 0x0D00, "", {}},
+             {"", "/photo", 400, 0x0D00, "/photo", {"orvelenum:# Fail to get the Full Path, /photo"}},
+             {"alice",
+              "/none//",
+              408,
+              0xBE00,
+              "/none",
+              {"orveldir:# VEXOShareGet fail", "orvelenum:# Fail to get the Full Path, /none//"}},
+             {"alice",
+              "///",
+              401,
+              0x8000,
+              "///",
+              {"orveldir(#) error path", "orveldir:# OrvLibGetTokOfPath fail",
+               "orvelenum:# Fail to get the Full Path, ///"}},
+             {"nobody",
+              "/home/x",
+              403,
+              0x8000,
+              "/home/x",
+              {"orveldir:# Failed to get user (nobody)", "orveldir:# OrvUserHomeFullPathGet fail",
+               "orvelenum:# Fail to get the Full Path, /home/x"}},
+         }) {
         PathInfo info;
-        EXPECT_FALSE(PathInfoFactory::create(c.user, c.path, info)) << c.path;
-        EXPECT_EQ(OrvLibGetErr(), c.code) << c.path;
-        EXPECT_EQ(VLIBCErrGet(), c.platform) << c.path;
-        EXPECT_EQ(info.path, c.kept);
+        EXPECT_FALSE(PathInfoFactory::create(user, path, info)) << path;
+        EXPECT_EQ(OrvLibGetErr(), code) << path;
+        EXPECT_EQ(VLIBCErrGet(), platform) << path;
+        EXPECT_EQ(info.path, kept);
         EXPECT_EQ(info.realPath, "");
-        EXPECT_EQ(takeLogTexts(), c.log);
+        EXPECT_EQ(takeLogTexts(), log);
     }
 }
 

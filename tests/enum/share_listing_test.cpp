@@ -1,24 +1,15 @@
-#include <sys/stat.h>
 #include <sys/statfs.h>
-#include <unistd.h>
 
-#include <algorithm>
-#include <cerrno>
-
-#include "fault_gate.h"
-#include "orvel/error_state.h"
 #include "orvel/listing.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
-using support::announceLog;
 using Names = std::vector<std::string>;
 
 constexpr int kShareProperties = 0x1FF;
 
-class ShareListingTest : public support::ApplianceTest {
+class ShareListingTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -44,7 +35,7 @@ class ShareListingTest : public support::ApplianceTest {
         EXPECT_NE(found, entries_.end()) << name;
         return found == entries_.end() ? DIRENTRY_INFO() : *found;
     }
-    void makeHome(const std::string& user) { support::makeFolder(shareRoot("homes") + "/" + user); }
+    void makeHome(const std::string& user) { makeFolder(shareRoot("homes") + "/" + user); }
 
     OrvEnum listing_;
     std::list<DIRENTRY_INFO> entries_;
@@ -118,22 +109,16 @@ TEST_F(ShareListingTest, SyncedOnlyWhereTheModelSupportsIt) {
 
 TEST_F(ShareListingTest, OrderAndPage) {
     makeHome("alice");
-    struct Case {
-        const char* sortBy;
-        bool ascending;
-        unsigned long offset, limit;
-        Names page;
-    };
-    const Case cases[] = {
-        {"name", true, 0, 0, {"docs", "home", "homes", "photo", "video"}},
-        {"name", false, 0, 0, {"video", "photo", "homes", "home", "docs"}},
-        {nullptr, false, 0, 0, {"docs", "video", "homes", "photo", "home"}},
-        {"name", true, 1, 2, {"home", "homes"}},
-        {"name", false, 4, 2, {"docs"}},
-        {"name", true, 9, 2, {}},
-        {"name", true, 9, 0, {"docs", "home", "homes", "photo", "video"}},
-    };
-    for (const auto& [sortBy, ascending, offset, limit, page] : cases) {
+    for (const auto& [sortBy, ascending, offset, limit, page] :
+         Rows<const char*, bool, unsigned long, unsigned long, Names>{
+             {"name", true, 0, 0, {"docs", "home", "homes", "photo", "video"}},
+             {"name", false, 0, 0, {"video", "photo", "homes", "home", "docs"}},
+             {nullptr, false, 0, 0, {"docs", "video", "homes", "photo", "home"}},
+             {"name", true, 1, 2, {"home", "homes"}},
+             {"name", false, 4, 2, {"docs"}},
+             {"name", true, 9, 2, {}},
+             {"name", true, 9, 0, {"docs", "home", "homes", "photo", "video"}},
+         }) {
         ASSERT_TRUE(list("alice", 0, sortBy, ascending, offset, limit));
         EXPECT_EQ(names(), page);
         EXPECT_EQ(total_, 5U);
@@ -143,8 +128,8 @@ TEST_F(ShareListingTest, OrderAndPage) {
 }
 
 TEST_F(ShareListingTest, SharesOfDomainAndDirectoryUsers) {
-    addUser("DOM\\dave", 30001, support::kUsersGid);
-    addUser("erin@directory", 30002, support::kUsersGid);
+    addUser("DOM\\dave", 30001, kUsersGid);
+    addUser("erin@directory", 30002, kUsersGid);
     addShare("domain", "valid users = DOM\\dave\n");
     addShare("directory", "valid users = erin@directory\n");
     ASSERT_TRUE(list("DOM\\dave"));
@@ -155,7 +140,7 @@ TEST_F(ShareListingTest, SharesOfDomainAndDirectoryUsers) {
     EXPECT_EQ(vexo::gate::calls("VexoCgiLDAPValidShareGen"), 1);
     list("DOM\\dave@directory");
     EXPECT_EQ(vexo::gate::calls("VexoCgiDomValidShareGen"), 2) << "with both signs a domain user";
-    support::takeLog();
+    takeLog();
 }
 
 TEST_F(ShareListingTest, NoUserOrNoTotal) {
@@ -168,12 +153,10 @@ TEST_F(ShareListingTest, NoUserOrNoTotal) {
 }
 
 TEST_F(ShareListingTest, SharesCannotBeEnumerated) {
-    struct Case {
-        const char *user, *operation, *log;
-    };
     for (const auto& [user, operation, log] :
-         {Case{"alice", "VEXOShareDBOpen", "VEXOShareDBOpenFile Error["},
-          Case{"DOM\\x", "VexoCgiDomValidShareGen", nullptr}, Case{"x@y", "VexoCgiLDAPValidShareGen", nullptr}}) {
+         Rows<const char*, const char*, const char*>{{"alice", "VEXOShareDBOpen", "VEXOShareDBOpenFile Error["},
+                                                     {"DOM\\x", "VexoCgiDomValidShareGen", nullptr},
+                                                     {"x@y", "VexoCgiLDAPValidShareGen", nullptr}}) {
         vexo::gate::fail(operation, VEXO_ERR_GENERAL);
         if (log != nullptr) announceLog(log);
         announceLog("Failed to enum valid shares");
@@ -189,7 +172,7 @@ TEST_F(ShareListingTest, ShareWithoutItsFolder) {
     EXPECT_EQ(names(), (Names{"photo", "homes", "video"}));
     ASSERT_TRUE(list("alice", ADDITIONAL_REAL_PATH));
     EXPECT_EQ(names().size(), 4U) << "nothing is looked at";
-    support::makeFolder(shareRoot("docs"));
+    makeFolder(shareRoot("docs"));
 }
 
 TEST_F(ShareListingTest, ServerThatDoesNotAnswer) {
@@ -218,11 +201,11 @@ TEST_F(ShareListingTest, HomeThatCannotBeResolved) {
     SKIP_WITHOUT_ROOT();
     makeHome("alice");
     ASSERT_EQ(chmod(shareRoot("homes").c_str(), 0700), 0);
-    support::asUser(support::kAliceUid, support::kUsersGid, [&] {
+    asUser(kAliceUid, kUsersGid, [&] {
         const bool resolved = list("alice");
         // Whether a home is there cannot be told without entering its parent; either answer must be consistent.
         EXPECT_TRUE(resolved ? names().front() != "home" : OrvLibGetErr() == ORV_ERR_DENIED);
-        support::takeLog();
+        takeLog();
         return 0;
     });
 }

@@ -1,23 +1,11 @@
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
-#include <string>
-#include <vector>
-
 #include "orvel/directory_walker.h"
-#include "orvel/error_state.h"
-#include "support/appliance.h"
 #include "support/log_texts.h"
 #include "support/system_faults.h"
+#include "support/testing.h"
 
 namespace {
 
-using support::makeFolder;
-using support::writeFile;
-
-class SubDirectoriesTest : public support::ApplianceTest {
+class SubDirectoriesTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -37,13 +25,13 @@ class SubDirectoriesTest : public support::ApplianceTest {
 
 TEST_F(SubDirectoriesTest, Failures) {
     expectFailure("", 400);
-    EXPECT_EQ(support::takeLogTexts(), std::vector<std::string>{"orveldir:# Bad parameter"});
+    EXPECT_EQ(takeLogTexts(), std::vector<std::string>{"orveldir:# Bad parameter"});
     writeFile(root_ + "/file", "x");
     expectFailure(root_ + "/missing", 408);
     expectFailure(root_ + "/file", 408);
     expectFailure(root_ + "/" + std::string(5000, 'p'), 402);
     makeFolder(root_ + "/sub");
-    const support::ReadingFault fault(root_, EIO, 2);
+    const ReadingFault fault(root_, EIO, 2);
     expectFailure(root_, 402);
 }
 
@@ -55,7 +43,7 @@ TEST_F(SubDirectoriesTest, DeniedToAnUnprivilegedUser) {
             expectFailure(root_ + "/closed", 407);
             return 0;
         };
-        EXPECT_EQ(support::asUser(support::kBobUid, support::kUsersGid, body), 0);
+        EXPECT_EQ(asUser(kBobUid, kUsersGid, body), 0);
     }
 }
 
@@ -99,17 +87,14 @@ TEST_F(SubDirectoriesTest, MountPoints) {
     addMount(root_ + "/server", "nfs4");
     writeFile(root_ + "/file", "x");
     addMount(root_ + "/file", "nfs4");
-    struct Case {
-        const char* dead;  // whose status cannot be read
-        std::string expected;
-    };
-    const Case cases[] = {
-        {"/none", "disk:ext4 local: server:nfs4 "}, {"/server", "disk:ext4 local: server:remotefail(0) "},
-        {"/disk", "local: server:nfs4 "},           {"/local", "disk:ext4 server:nfs4 "},
-        {"/file", "disk:ext4 local: server:nfs4 "},  // what the folder calls a file is not asked for its status
-    };
-    for (const Case& c : cases) {
-        const support::StatusFault fault(root_ + c.dead, EHOSTDOWN);
+    for (const auto& [dead, expected] : Rows<const char*, std::string>{
+             {"/none", "disk:ext4 local: server:nfs4 "},
+             {"/server", "disk:ext4 local: server:remotefail(0) "},
+             {"/disk", "local: server:nfs4 "},
+             {"/local", "disk:ext4 server:nfs4 "},
+             {"/file", "disk:ext4 local: server:nfs4 "},  // what the folder calls a file is not asked for its status
+         }) {
+        const StatusFault fault(root_ + dead, EHOSTDOWN);
         std::vector<_tag_SUBDIR_ENTRY_INFO_> found;
         ASSERT_TRUE(OrvLibEnumSubDir(root_, found));
         std::string text;
@@ -120,7 +105,7 @@ TEST_F(SubDirectoriesTest, MountPoints) {
             const bool allZero = one.size == 0 && one.mode == 0 && one.mtime == 0 && one.uid == 0 && one.gid == 0;
             text += allZero ? "(0) " : " ";
         }
-        EXPECT_EQ(text, c.expected);
+        EXPECT_EQ(text, expected);
     }
 }
 

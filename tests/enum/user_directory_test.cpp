@@ -2,18 +2,12 @@
 
 #include "core/owned.h"
 #include "enum/group_ids.h"
-#include "fault_gate.h"
-#include "orvel/error_state.h"
 #include "orvel/listing.h"
-#include "support/appliance.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
 namespace {
 
-using support::kAliceUid;
-using support::kUsersGid;
-
-class UserDirectoryTest : public support::ApplianceTest {};
+class UserDirectoryTest : public ApplianceTest {};
 
 TEST_F(UserDirectoryTest, KnownIdsAreAskedForOnceUnknownOnesEachTime) {
     OrvelUserEnum names;
@@ -54,7 +48,7 @@ TEST_F(UserDirectoryTest, EnumeratesOneSource) {
     EXPECT_EQ(users[kAliceUid].name, "alice");
     EXPECT_EQ(users[kAliceUid].reserved1, 5U);
     EXPECT_EQ(users[kAliceUid].reserved2, 6U);
-    EXPECT_EQ(users[support::kBobUid].name, "bob");
+    EXPECT_EQ(users[kBobUid].name, "bob");
     EXPECT_EQ(users[99].name, "kept");
     EXPECT_FALSE(users.contains(30001) || users.contains(30002));
 
@@ -81,8 +75,8 @@ TEST_F(UserDirectoryTest, SourceThatCannotBeOpened) {
     std::map<unsigned, _tag_GROUP_INFO_> groups;
     vexo::gate::fail("VEXOUserDBOpen", VEXO_ERR_GENERAL);
     vexo::gate::fail("VEXOGroupDBOpen", VEXO_ERR_GENERAL);
-    support::announceLog("Failed to open user db");
-    support::announceLog("Failed to open group db");
+    announceLog("Failed to open user db");
+    announceLog("Failed to open group db");
     EXPECT_FALSE(listing.EnumAllUsers(users, AUTH_LOCAL));
     EXPECT_FALSE(listing.EnumAllGroups(groups, AUTH_LOCAL));
     EXPECT_EQ(OrvLibGetErr(), 0);
@@ -99,15 +93,17 @@ TEST_F(UserDirectoryTest, GroupsOfAUser) {
 }
 
 TEST_F(UserDirectoryTest, GroupListThatHoldsNoNumber) {
-    struct Case {
-        const char* text;
-        bool good;
-        unsigned gid;
-    };
-    for (const auto& [text, good, gid] :
-         {Case{"100", true, 100}, Case{" 100", true, 100}, Case{"4294967295", true, 0xFFFFFFFF},
-          Case{"4294967301", true, 5}, Case{"100x", false, 0}, Case{"100 ", false, 0}, Case{"", false, 0},
-          Case{"-5", false, 0}, Case{" -5", false, 0}, Case{"99999999999999999999", false, 0}, Case{"\n", false, 0}}) {
+    for (const auto& [text, good, gid] : Rows<const char*, bool, unsigned>{{"100", true, 100},
+                                                                           {" 100", true, 100},
+                                                                           {"4294967295", true, 0xFFFFFFFF},
+                                                                           {"4294967301", true, 5},
+                                                                           {"100x", false, 0},
+                                                                           {"100 ", false, 0},
+                                                                           {"", false, 0},
+                                                                           {"-5", false, 0},
+                                                                           {" -5", false, 0},
+                                                                           {"99999999999999999999", false, 0},
+                                                                           {"\n", false, 0}}) {
         orvel::StringList list(VLIBCSzListAlloc(4));
         for (const char* item : {"7", text, "8"}) {
             auto* raw = list.release();
@@ -117,7 +113,7 @@ TEST_F(UserDirectoryTest, GroupListThatHoldsNoNumber) {
         std::list<unsigned> gids;
         EXPECT_EQ(orvel::appendGroupIds(list.get(), gids), good) << text;
         EXPECT_EQ(gids, good ? (std::list<unsigned>{7, gid, 8}) : std::list<unsigned>{7}) << text;
-        const auto log = support::takeLog();
+        const auto log = takeLog();
         ASSERT_EQ(log.size(), good ? 0U : 1U) << text;
         if (good) continue;
         EXPECT_NE(log[0].text.find("Get Error Formate from VEXOGroupInfoGetgroupList ("), std::string::npos);

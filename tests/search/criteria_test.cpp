@@ -1,17 +1,6 @@
 #include "orvel/search_criteria.h"
 
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-
-#include <algorithm>
-#include <cstdint>
-#include <cstring>
-#include <memory>
-#include <string>
-#include <vector>
-
-#include "orvel/error_state.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 
 using namespace FileSearch;
 
@@ -54,50 +43,42 @@ std::string textOf(const __tag_FI_SQL_COND* node) {
     return text;
 }
 
-class CriteriaTest : public support::ApplianceTest {};
+class CriteriaTest : public ApplianceTest {};
 
 TEST_F(CriteriaTest, ArgumentsAndResultsOfEachField) {
-    struct Case {
-        int field;
-        const char *op, *value;
-        bool result;
-        int code;
-        size_t added;
-    };
-    const Case cases[] = {
-        {0, nullptr, "a", true, 0, 1},
-        {0, "x", nullptr, false, 400, 0},
-        {1, "dir", nullptr, true, 0, 1},
-        {1, "DIR", nullptr, true, 0, 1},
-        {1, "File", nullptr, true, 0, 1},
-        {1, "link", nullptr, true, 0, 0},
-        {1, nullptr, "dir", false, 400, 0},
-        {2, nullptr, "jpg", true, 0, 2},
-        {2, nullptr, nullptr, false, 400, 0},
-        {3, nullptr, "alice", true, 0, 1},
-        {3, nullptr, "nobody-here", false, 403, 0},
-        {3, nullptr, nullptr, false, 400, 0},
-        {4, nullptr, "users", true, 0, 1},
-        {4, nullptr, "nobody-here", false, 404, 0},
-        {4, nullptr, nullptr, false, 400, 0},
-        {5, nullptr, "1", false, 400, 0},
-        {5, "before", nullptr, false, 400, 0},
-        {5, "before", "1", true, 0, 1},
-        {6, "", "", true, 0, 1},
-        {7, "after", "no number", true, 0, 1},
-        {8, "less", "1", true, 0, 1},
-        {8, nullptr, "1", false, 400, 0},
-        {9, nullptr, "x", true, 0, 0},
-        {9, "x", nullptr, false, 400, 0},
-        {-1, nullptr, "x", true, 0, 0},
-    };
-    for (const Case& c : cases) {
-        SCOPED_TRACE(std::to_string(c.field) + " " + (c.op ? c.op : "-") + " " + (c.value ? c.value : "-"));
+    for (const auto& [field, op, value, result, code, added] : Rows<int, const char*, const char*, bool, int, size_t>{
+             {0, nullptr, "a", true, 0, 1},
+             {0, "x", nullptr, false, 400, 0},
+             {1, "dir", nullptr, true, 0, 1},
+             {1, "DIR", nullptr, true, 0, 1},
+             {1, "File", nullptr, true, 0, 1},
+             {1, "link", nullptr, true, 0, 0},
+             {1, nullptr, "dir", false, 400, 0},
+             {2, nullptr, "jpg", true, 0, 2},
+             {2, nullptr, nullptr, false, 400, 0},
+             {3, nullptr, "alice", true, 0, 1},
+             {3, nullptr, "nobody-here", false, 403, 0},
+             {3, nullptr, nullptr, false, 400, 0},
+             {4, nullptr, "users", true, 0, 1},
+             {4, nullptr, "nobody-here", false, 404, 0},
+             {4, nullptr, nullptr, false, 400, 0},
+             {5, nullptr, "1", false, 400, 0},
+             {5, "before", nullptr, false, 400, 0},
+             {5, "before", "1", true, 0, 1},
+             {6, "", "", true, 0, 1},
+             {7, "after", "no number", true, 0, 1},
+             {8, "less", "1", true, 0, 1},
+             {8, nullptr, "1", false, 400, 0},
+             {9, nullptr, "x", true, 0, 0},
+             {9, "x", nullptr, false, 400, 0},
+             {-1, nullptr, "x", true, 0, 0},
+         }) {
+        SCOPED_TRACE(std::to_string(field) + " " + (op ? op : "-") + " " + (value ? value : "-"));
         Criteria criteria;
         OrvLibSetErr(0);
-        EXPECT_EQ(criteria.add(c.field, c.op, c.value), c.result);
-        EXPECT_EQ(OrvLibGetErr(), c.code);
-        EXPECT_EQ(criteria.list.size(), c.added);
+        EXPECT_EQ(criteria.add(field, op, value), result);
+        EXPECT_EQ(OrvLibGetErr(), code);
+        EXPECT_EQ(criteria.list.size(), added);
     }
     EXPECT_EQ(FindTypeCompFactory::createFindTypeOpt(nullptr), nullptr);
 }
@@ -155,24 +136,19 @@ TEST_F(CriteriaTest, ListsAreAlternatives) {
 }
 
 TEST_F(CriteriaTest, ComparesTheLastComponent) {
-    struct Case {
-        const char *path, *pattern;
-        bool result;
-    };
-    const Case cases[] = {
-        {"/share/dir/a.txt", "?.tx?", true},
-        {"/dir/x", "*dir*", false},
-        {"/a/b/", "?/", true},
-        {"/a/b/", "?", false},
-        {"/a/b//", "?", true},  // the trailing "/" alone
-        {"/", "?", true},
-        {"b/", "??", true},
-        {"", "?", false},
-        {nullptr, "?", false},
-    };
-    for (const Case& c : cases) {
-        FindNameComp criterion(c.pattern);
-        EXPECT_EQ(criterion(c.path, statusOf(0)), c.result) << (c.path ? c.path : "-") << " " << c.pattern;
+    for (const auto& [path, pattern, result] : Rows<const char*, const char*, bool>{
+             {"/share/dir/a.txt", "?.tx?", true},
+             {"/dir/x", "*dir*", false},
+             {"/a/b/", "?/", true},
+             {"/a/b/", "?", false},
+             {"/a/b//", "?", true},  // the trailing "/" alone
+             {"/", "?", true},
+             {"b/", "??", true},
+             {"", "?", false},
+             {nullptr, "?", false},
+         }) {
+        FindNameComp criterion(pattern);
+        EXPECT_EQ(criterion(path, statusOf(0)), result) << (path ? path : "-") << " " << pattern;
     }
 }
 
@@ -214,22 +190,19 @@ TEST_F(CriteriaTest, SizesAndTypes) {
 }
 
 TEST_F(CriteriaTest, Times) {
-    struct Case {
-        int field, column;
-        int64_t _tag_VEXOSTAT_::*time;
-    };
-    const Case cases[] = {
-        {5, 12, &_tag_VEXOSTAT_::st_modify}, {6, 9, &_tag_VEXOSTAT_::st_create}, {7, 11, &_tag_VEXOSTAT_::st_access}};
-    for (const Case& c : cases) {
-        SCOPED_TRACE(c.field);
+    for (const auto& [field, column, member] :
+         Rows<int, int, int64_t _tag_VEXOSTAT_::*>{{5, 12, &_tag_VEXOSTAT_::st_modify},
+                                                   {6, 9, &_tag_VEXOSTAT_::st_create},
+                                                   {7, 11, &_tag_VEXOSTAT_::st_access}}) {
+        SCOPED_TRACE(field);
         for (const bool before : {false, true}) {
             Criteria criteria;
-            ASSERT_TRUE(criteria.add(c.field, before ? "Before" : "after", "1000"));
+            ASSERT_TRUE(criteria.add(field, before ? "Before" : "after", "1000"));
             EXPECT_EQ(textOf(criteria.list[0]->getFirstCond()),
-                      std::to_string(c.column) + (before ? ".2.1000" : ".5.1000"));
+                      std::to_string(column) + (before ? ".2.1000" : ".5.1000"));
             for (const int64_t time : {999, 1000, 1001}) {
                 _tag_VEXOSTAT_ st{};
-                st.*c.time = time;
+                st.*member = time;
                 EXPECT_EQ(criteria.match("a", st), (time < 1000) == before) << time;
             }
         }
@@ -251,9 +224,9 @@ TEST_F(CriteriaTest, OwnersAndGroups) {
     ASSERT_TRUE(criteria.add(4, nullptr, "users"));
     EXPECT_EQ(textOf(criteria.list[0]->getFirstCond()), "15.0.20001|17.6.alice");
     EXPECT_EQ(textOf(criteria.list[1]->getFirstCond()), "16.0.20100|18.6.users");
-    EXPECT_TRUE(criteria.match("a", statusOf(S_IFREG, 0, support::kAliceUid, support::kUsersGid)));
-    EXPECT_FALSE(criteria.match("a", statusOf(S_IFREG, 0, support::kBobUid, support::kUsersGid)));
-    EXPECT_FALSE(criteria.match("a", statusOf(S_IFREG, 0, support::kAliceUid, support::kAdminGid)));
+    EXPECT_TRUE(criteria.match("a", statusOf(S_IFREG, 0, kAliceUid, kUsersGid)));
+    EXPECT_FALSE(criteria.match("a", statusOf(S_IFREG, 0, kBobUid, kUsersGid)));
+    EXPECT_FALSE(criteria.match("a", statusOf(S_IFREG, 0, kAliceUid, kAdminGid)));
 
     FindUserComp nobody("x", 0xFFFFFFFF);
     FindGroupComp noGroup(nullptr, 0xFFFFFFFF);
