@@ -30,7 +30,7 @@ class RecordCondition {
     [[nodiscard]] const __tag_FI_SQL_COND* get() const { return &path_; }
 
  private:
-    __tag_FI_SQL_COND path_, share_;
+    __tag_FI_SQL_COND path_{}, share_{};
 };
 
 }  // namespace orvel

@@ -64,7 +64,7 @@ class Filters {
     [[nodiscard]] const __tag_FI_SQL_COND* first() const { return first_; }
 
  private:
-    __tag_FI_SQL_COND type_, name_;
+    __tag_FI_SQL_COND type_{}, name_{};
     __tag_FI_SQL_COND* first_ = nullptr;
 };
 
