@@ -41,11 +41,10 @@ int run(void* arg) {
     search.ready = Descriptor();
     VLIBCErrSetEx(0, __FILE__, __LINE__);
     int code = search.walker->Walk(search.criteria.accessTimes()) ? ORV_ERR_NONE : platformCode();
-    // Who reads that it is finished reads all of it.
-    if (FILEIDXDBFlush(search.database.c_str()) < 0 && code == ORV_ERR_NONE) code = platformCode();
-    // A record that could not be stored is no reason for the walk to end, but for saying so.
+    // Records that could not be stored do not end a walk; only the platform's last error tells of them.
     const int last = VLIBCErrGet();
-    if (code == ORV_ERR_NONE && (last == VEXO_ERR_NO_SPACE || last == VEXO_ERR_QUOTA)) code = platformCode();
+    const bool lost = last == VEXO_ERR_NO_SPACE || last == VEXO_ERR_QUOTA || last == VEXO_ERR_READ_ONLY;
+    if (code == ORV_ERR_NONE && lost) code = platformCode();
 
     KTR::Task& record = *search.record;
     if (!record.beginUpdate()) return 1;
@@ -116,7 +115,7 @@ void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
     std::string culprit;
     int code = parseCriteria([&web](const std::string& name) { return web.GetParam(name, ""); }, criteria, culprit);
     if (code != ORV_ERR_NONE) {
-        data["parameter"] = culprit;
+        if (!culprit.empty()) data["parameter"] = culprit;
         const Status status = code == ORV_ERR_PARAMETER ? Status::kBadRequest : Status::kOk;
         return reply(out, status, user.cookie, code, "", data);
     }

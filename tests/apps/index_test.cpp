@@ -1,0 +1,179 @@
+// orvelctl index: what an update makes of an index, and what breaks one off.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <spawn.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "apps/program.h"
+#include "index/folder_state.h"
+#include "support/appliance.h"
+
+namespace fs = std::filesystem;
+using namespace orvel::ctl;
+
+namespace {
+
+TEST(FolderState, WhatTheTimesSay) {
+    struct {
+        FolderTimes stored, found;
+        bool parentChanged;
+        FolderState state;
+    } const cases[] = {
+        {{10, 10, 5}, {10, 10, 5}, true, FolderState::kSame},
+        {{10, 10, 5}, {11, 11, 5}, false, FolderState::kChanged},
+        {{10, 10, 5}, {11, 11, 5}, true, FolderState::kChanged},
+        {{10, 10, 5}, {9, 12, 5}, true, FolderState::kChanged},
+        {{10, 10, 5}, {10, 12, 5}, false, FolderState::kChanged},
+        {{10, 10, 5}, {10, 12, 5}, true, FolderState::kReplaced},  // moved here
+        {{10, 10, 5}, {10, 10, 6}, false, FolderState::kReplaced},
+        {{10, 10, 5}, {20, 21, 6}, false, FolderState::kReplaced},
+        {{10, 10, 10}, {20, 20, 20}, false, FolderState::kChanged},  // no times of creation
+    };
+    for (const auto& folder : cases) {
+        EXPECT_EQ(judgeFolder(folder.stored, folder.found, folder.parentChanged), folder.state)
+            << folder.found.modified << ' ' << folder.found.changed << ' ' << folder.found.created;
+    }
+    const std::pair<FolderTimes, bool> recent[] = {{{90, 98, 1}, false}, {{90, 99, 1}, true},   {{99, 90, 1}, true},
+                                                   {{90, 102, 1}, true}, {{900, 90, 1}, false}, {{1, 900, 1}, false}};
+    for (const auto& [times, unseen] : recent) EXPECT_EQ(mayChangeUnseen(times, 100), unseen) << times.changed;
+}
+
+class Index : public support::ApplianceTest {
+ protected:
+    void SetUp() override {
+        ApplianceTest::SetUp();
+        root_ = addShare("photo", "read only = no\nvexo:index = yes\n");
+    }
+    static support::Finished run(const std::vector<std::string>& words) {
+        std::vector<std::string> all = {ORVELCTL};
+        all.insert(all.end(), words.begin(), words.end());
+        return support::runProgram(all);
+    }
+    static std::string update(const std::string& more = "") {
+        std::vector<std::string> words = {"index", "update", "photo"};
+        if (!more.empty()) words.push_back(more);
+        const support::Finished finished = run(words);
+        EXPECT_EQ(finished.status, 0);
+        return finished.output.substr(finished.output.find("compared"));
+    }
+    static std::string search() {
+        return run({"search", "/photo", "--user", "carol", "--name", "*", "--json", "--sort", "ppath", "--additional",
+                    "size,owner,perm,type"})
+            .output;
+    }
+    // What the index says, and what a walk says.
+    void expectTruth(const std::string& when) {
+        const std::string indexed = search();
+        addShare("photo", "read only = no\n");
+        const std::string walked = search();
+        addShare("photo", "read only = no\nvexo:index = yes\n");
+        EXPECT_EQ(indexed, walked) << when;
+    }
+    void file(const std::string& path) { support::writeFile(root_ + path, path); }
+    void move(const std::string& from, const std::string& to) { fs::rename(root_ + from, root_ + to); }
+    // Starts the command and ends it with a signal.
+    static int broken(const std::vector<std::string>& words, int signal, useconds_t after) {
+        std::vector<std::string> texts = {ORVELCTL};
+        texts.insert(texts.end(), words.begin(), words.end());
+        std::vector<char*> list;
+        for (std::string& text : texts) list.push_back(text.data());
+        list.push_back(nullptr);
+        pid_t child = 0;
+        EXPECT_EQ(posix_spawn(&child, ORVELCTL, nullptr, nullptr, list.data(), environ), 0);
+        usleep(after);
+        kill(child, signal);
+        int status = 0;
+        waitpid(child, &status, 0);
+        return status;
+    }
+    std::string root_;
+};
+
+TEST_F(Index, AnUpdateMakesWhatABuildWouldMake) {
+    SKIP_WITHOUT_ROOT();
+    for (const std::string folder : {"/same", "/a", "/b", "/swap1", "/swap2", "/gone", "/kind", "/moved/from"}) {
+        for (const std::string path : {"/sub/deep/f", "/sub/g", "/h"}) file(folder + path + folder.substr(1, 1));
+    }
+    EXPECT_EQ(run({"index", "update", "photo"}).status, 1) << "no index yet";
+    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    expectTruth("built");
+    EXPECT_EQ(update(), "compared 1; 0 entries added, 0 changed, 0 removed\n");
+
+    file("/a/sub/new");
+    file("/new/tree/of/files");
+    fs::remove_all(root_ + "/gone");
+    fs::remove(root_ + "/b/hb");
+    move("/b/sub", "/b/renamed_%");
+    move("/swap1", "/swap");
+    move("/swap2", "/swap1");
+    move("/swap", "/swap2");
+    fs::remove_all(root_ + "/kind/sub");
+    file("/kind/sub");
+    fs::remove(root_ + "/kind/hk");
+    file("/kind/hk/now a folder");
+    move("/moved/from/sub", "/moved/sub");
+    chmod((root_ + "/same/sub").c_str(), 0700);
+    fs::create_symlink("a", root_ + "/link");
+    EXPECT_NE(update().find(" added"), std::string::npos);
+    expectTruth("updated");
+    EXPECT_EQ(update(), "compared 1; 0 entries added, 0 changed, 0 removed\n");
+
+    support::writeFile(root_ + "/same/hs", "longer than it was");
+    EXPECT_EQ(update(), "compared 1; 0 entries added, 0 changed, 0 removed\n") << "its folder does not tell";
+    EXPECT_NE(update("--full").find("0 entries added, 1 changed, 0 removed"), std::string::npos);
+    expectTruth("compared in full");
+}
+
+TEST_F(Index, NetworkMountsStayOut) {
+    SKIP_WITHOUT_ROOT();
+    file("/local/f");
+    file("/nfs/far/f");
+    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    EXPECT_NE(search().find("/photo/nfs/far/f"), std::string::npos);
+    addMount(root_ + "/nfs", "nfs");
+    EXPECT_NE(update().find(" 3 removed"), std::string::npos);
+    EXPECT_EQ(search().find("nfs"), std::string::npos);
+    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    EXPECT_EQ(search().find("nfs"), std::string::npos);
+    EXPECT_NE(search().find("/photo/local/f"), std::string::npos);
+    addMount(root_, "cifs");
+    EXPECT_EQ(run({"index", "update", "photo"}).status, 1);
+    EXPECT_EQ(run({"index", "build", "photo"}).status, 1);
+    EXPECT_EQ(support::asUser(support::kAliceUid, support::kUsersGid,
+                              [] {
+                                  return run({"index", "build", "photo"}).status;
+                              }),
+              1);
+}
+
+TEST_F(Index, WorkThatIsBrokenOffLosesNothing) {
+    SKIP_WITHOUT_ROOT();
+    file("/before");
+    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    const std::string before = search();
+    for (int i = 0; i < 3000; ++i)
+        file("/" + std::to_string(i % 60) + "/" + std::to_string(i % 7) + "/f" + std::to_string(i));
+    for (const int signal : {SIGTERM, SIGINT, SIGKILL}) {
+        broken({"index", "build", "photo"}, signal, 40000);
+        EXPECT_EQ(search(), before) << "the old index stays: " << signal;
+    }
+    for (const useconds_t after : {3000U, 10000U, 25000U, 60000U}) {
+        broken({"index", "update", "photo"}, after > 20000 ? SIGTERM : SIGKILL, after);
+        fs::remove_all(root_ + "/" + std::to_string(after / 1000));
+    }
+    update();
+    expectTruth("after updates that were killed");
+    fs::rename(root_, root_ + "-away");
+    EXPECT_EQ(run({"index", "update", "photo"}).status, 1) << "a volume that is not there has lost nothing";
+    fs::rename(root_ + "-away", root_);
+    expectTruth("there again");
+    EXPECT_EQ(run({"index", "drop", "photo"}).status, 0);
+    EXPECT_EQ(run({"index", "status", "photo"}).status, 1);
+}
+
+}  // namespace
