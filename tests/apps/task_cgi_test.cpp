@@ -176,7 +176,7 @@ TEST_F(TaskCgi, CopiesKeepWhatFilesAre) {
     const timespec old[] = {{1000000000, 0}, {1000000000, 5}};
     ASSERT_EQ(utimensat(AT_FDCWD, (photo_ + "/a/b").c_str(), old, 0), 0);
     writeFile(photo_ + "/a/holes", "x");
-    ASSERT_EQ(truncate((photo_ + "/a/holes").c_str(), 100 << 20), 0);
+    ASSERT_EQ(truncate((photo_ + "/a/holes").c_str(), 8 << 20), 0);
 
     const Json::Value task =
         perform("alice", "action=copy" + about({"/photo/a", "/photo/none", "/nowhere/x"}, "/video"));
@@ -192,7 +192,7 @@ TEST_F(TaskCgi, CopiesKeepWhatFilesAre) {
     EXPECT_TRUE(treeOf(photo_ + "/a") == treeOf(video_ + "/a"));
     struct stat copied {};
     ASSERT_EQ(stat((video_ + "/a/holes").c_str(), &copied), 0);
-    EXPECT_LT(copied.st_blocks, 1000) << "holes stay holes";
+    EXPECT_LT(copied.st_blocks, 100) << "holes stay holes";
     EXPECT_EQ(copied.st_uid, support::kAliceUid);
     ASSERT_EQ(stat((video_ + "/a/b").c_str(), &copied), 0);
     EXPECT_EQ(copied.st_mtime, 1000000000);
@@ -304,7 +304,7 @@ class LongTask : public TaskCgi {
     void SetUp() override {
         TaskCgi::SetUp();
         const char* wanted = getenv("ORVEL_TEST_FILES");
-        files_ = wanted != nullptr ? atoi(wanted) : 9000;
+        files_ = wanted != nullptr ? atoi(wanted) : 5000;
         support::makeFolder(photo_ + "/tree", 0777);
         for (int i = 0; i < files_; ++i) {
             const std::string folder = photo_ + "/tree/" + std::to_string(i / 200);
@@ -523,7 +523,9 @@ struct Packed {
 void pack(const std::string& path, const char* format, const char* filter, const std::vector<Packed>& members) {
     archive* out = archive_write_new();
     ASSERT_EQ(archive_write_set_format_by_name(out, format), ARCHIVE_OK);
-    ASSERT_EQ(archive_write_add_filter_by_name(out, filter), ARCHIVE_OK);
+    if (filter != nullptr) {
+        ASSERT_EQ(archive_write_add_filter_by_name(out, filter), ARCHIVE_OK);
+    }
     ASSERT_EQ(archive_write_open_filename(out, path.c_str()), ARCHIVE_OK);
     for (const Packed& member : members) {
         archive_entry* entry = archive_entry_new();
@@ -598,14 +600,14 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
     support::makeFolder(video_ + "/t", 0777);
     ASSERT_EQ(chmod((video_ + "/t").c_str(), 0777), 0);
     const std::string zeros(70 << 20, '\0');
-    pack(video_ + "/bomb.zip", "zip", "none",
+    pack(video_ + "/bomb.zip", "zip", nullptr,
          {{"small", AE_IFREG, "1"}, {"zeros", AE_IFREG, zeros}, {"more", AE_IFREG, "1"}});
     pack(video_ + "/bomb.tar.zst", "ustar", "zstd", {{"small2", AE_IFREG, "1"}, {"zeros", AE_IFREG, zeros}});
-    pack(video_ + "/good.zip", "zip", "none", {{"\xFFz", AE_IFREG, "5"}, {"\xC3\xA9", AE_IFREG, "6"}});
+    pack(video_ + "/good.zip", "zip", nullptr, {{"\xFFz", AE_IFREG, "5"}, {"\xC3\xA9", AE_IFREG, "6"}});
     pack(video_ + "/torn.tar.xz", "ustar", "xz",
          {{"whole", AE_IFREG, "1"}, {"half", AE_IFREG, std::string(1 << 20, 'h')}});
     const std::string random = readFile(PROGRAM_OPERATION).substr(0, 300000);
-    pack(video_ + "/cut.zip", "zip", "none", {{"first", AE_IFREG, "1"}, {"cut", AE_IFREG, random}});
+    pack(video_ + "/cut.zip", "zip", nullptr, {{"first", AE_IFREG, "1"}, {"cut", AE_IFREG, random}});
     for (const char* name : {"/torn.tar.xz", "/cut.zip"}) {
         ASSERT_EQ(truncate((video_ + name).c_str(), static_cast<off_t>(fs::file_size(video_ + name) * 3 / 4)), 0);
     }
