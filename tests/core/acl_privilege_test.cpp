@@ -16,16 +16,11 @@ std::string workingFolder() {
 }
 
 TEST_F(AclPrivilegeTest, FailuresOfThePlatform) {
-    for (const auto& [platform, result, code, accessLogs, getLogs] : Rows<int, int, int, bool, bool>{
-             {0x8400, -1, 411, false, true},
-             {0x0600, -1, 408, false, false},
-             {0xA000, -1, 408, false, true},
-             {0xD700, -1, 408, false, false},
-             {0x0300, 0, 7, false, false},
-             {0xD800, 0, 7, false, false},
-             {0x8100, -1, 7, true, true},
-             {0x1400, -1, 7, true, true},
-         }) {
+    const Rows<int, int, int, bool, bool> rows = {{0x8400, -1, 411, false, true}, {0x0600, -1, 408, false, false},
+                                                  {0xA000, -1, 408, false, true}, {0xD700, -1, 408, false, false},
+                                                  {0x0300, 0, 7, false, false},   {0xD800, 0, 7, false, false},
+                                                  {0x8100, -1, 7, true, true},    {0x1400, -1, 7, true, true}};
+    for (const auto& [platform, result, code, accessLogs, getLogs] : rows) {
         char reason[8];
         snprintf(reason, sizeof reason, "%X", static_cast<unsigned>(platform));
         vexo::gate::reset();

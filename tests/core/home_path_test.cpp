@@ -40,17 +40,13 @@ TEST_F(HomePathTest, DomainAndDirectoryUsersByTheirHomeFolder) {
     addUser("CORP\\eve", 20010, kUsersGid);
     addUser("eve@corp", 20011, kUsersGid);
     writeRootFile("/etc/vexo/shares.conf", "[homes]\npath = /orvel-no-such-volume/homes\nread only = no\n");
-    for (const auto& [path, user, home] : Rows<const char*, const char*, bool>{
-             {"/homes/@CORP/eve", "CORP\\eve", true},
-             {"/Homes/@corp/EVE/x", "CORP\\eve", true},
-             {"/homes/@CORP/evelyn", "CORP\\eve", false},
-             {"/homes/CORP\\eve", "CORP\\eve", false},
-             {"/homes/eve@corp/x", "eve@corp", true},
-             {"/homes/eve@corp.org", "eve@corp", false},
-             {"/homes/eve@corp", "unknown@corp", false},
-             {"/home/x", "CORP\\eve", true},
-             {"/homes/@CORP/eve", nullptr, false},
-         }) {
+    const Rows<const char*, const char*, bool> rows = {
+        {"/homes/@CORP/eve", "CORP\\eve", true},     {"/Homes/@corp/EVE/x", "CORP\\eve", true},
+        {"/homes/@CORP/evelyn", "CORP\\eve", false}, {"/homes/CORP\\eve", "CORP\\eve", false},
+        {"/homes/eve@corp/x", "eve@corp", true},     {"/homes/eve@corp.org", "eve@corp", false},
+        {"/homes/eve@corp", "unknown@corp", false},  {"/home/x", "CORP\\eve", true},
+        {"/homes/@CORP/eve", nullptr, false}};
+    for (const auto& [path, user, home] : rows) {
         EXPECT_EQ(IsDirUserHome(path, user), home) << path << " for " << (user != nullptr ? user : "null");
     }
     EXPECT_EQ(vexo::gate::calls("VEXOFSMkdirP"), 0);

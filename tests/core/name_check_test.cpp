@@ -7,22 +7,11 @@ namespace {
 class NameCheckTest : public ApplianceTest {};
 
 TEST_F(NameCheckTest, ReservedNames) {
-    for (const auto& [name, code] : Rows<const char*, int>{{nullptr, 400},
-                                                           {"", 400},
-                                                           {".", 418},
-                                                           {"..", 418},
-                                                           {"a:b", 418},
-                                                           {"a/b", 418},
-                                                           {"._x", 418},
-                                                           {"._", 418},
-                                                           {"@vexoea", 418},
-                                                           {"a b", 0},
-                                                           {".x", 0},
-                                                           {"_.x", 0},
-                                                           {"...", 0},
-                                                           {"@vexoea2", 0},
-                                                           {"a\xFF\nb", 0},
-                                                           {"@tmp", 0}}) {
+    const Rows<const char*, int> rows = {{nullptr, 400},   {"", 400},       {".", 418},      {"..", 418},
+                                         {"a:b", 418},     {"a/b", 418},    {"._x", 418},    {"._", 418},
+                                         {"@vexoea", 418}, {"a b", 0},      {".x", 0},       {"_.x", 0},
+                                         {"...", 0},       {"@vexoea2", 0}, {"a\xFF\nb", 0}, {"@tmp", 0}};
+    for (const auto& [name, code] : rows) {
         SCOPED_TRACE(name == nullptr ? "(null)" : name);
         OrvLibSetErr(0);
         EXPECT_EQ(OrvCheckReservedName(name), code == 0);
@@ -34,20 +23,12 @@ TEST_F(NameCheckTest, FileNames) {
     const std::string fat = addShare("usb", "read only = no\n");
     addMount(fat, "vfat");
     const std::string disk = shareRoot("photo");
-    for (const auto& [folder, name, code] : Rows<const char*, const char*, int>{
-             {nullptr, "a", 400},
-             {disk.c_str(), nullptr, 400},
-             {disk.c_str(), "", 400},
-             {disk.c_str(), "..", 418},
-             {disk.c_str(), "a?b", 0},
-             {fat.c_str(), "a?b", 419},
-             {fat.c_str(), "a\\b", 419},
-             {fat.c_str(), "a\rb", 419},
-             {fat.c_str(), "a\nb", 419},
-             {fat.c_str(), "a|b\"", 419},
-             {fat.c_str(), "a:b", 418},
-             {fat.c_str(), "plain.txt", 0},
-         }) {
+    const Rows<const char*, const char*, int> rows = {
+        {nullptr, "a", 400},         {disk.c_str(), nullptr, 400}, {disk.c_str(), "", 400},
+        {disk.c_str(), "..", 418},   {disk.c_str(), "a?b", 0},     {fat.c_str(), "a?b", 419},
+        {fat.c_str(), "a\\b", 419},  {fat.c_str(), "a\rb", 419},   {fat.c_str(), "a\nb", 419},
+        {fat.c_str(), "a|b\"", 419}, {fat.c_str(), "a:b", 418},    {fat.c_str(), "plain.txt", 0}};
+    for (const auto& [folder, name, code] : rows) {
         SCOPED_TRACE(name == nullptr ? "(null)" : name);
         OrvLibSetErr(0);
         EXPECT_EQ(OrvCheckFileName(folder, name), code == 0 ? 0 : -1);

@@ -61,15 +61,11 @@ TEST(PrivilegeDecision, UserKinds) {
 }
 
 TEST(PermissionText, LettersAndDigits) {
-    for (const auto& [mode, text, digits] : Rows<unsigned, const char*, int>{{0755, "rwxr-xr-x", 755},
-                                                                             {0640, "rw-r-----", 640},
-                                                                             {0750, "rwxr-x---", 750},
-                                                                             {0, "---------", 0},
-                                                                             {0777, "rwxrwxrwx", 777},
-                                                                             {0104755, "rwxr-xr-x", 755},
-                                                                             {0007, "------rwx", 7},
-                                                                             {0421, "r---w---x", 421},
-                                                                             {~0U, "rwxrwxrwx", 777}}) {
+    const Rows<unsigned, const char*, int> rows = {
+        {0755, "rwxr-xr-x", 755}, {0640, "rw-r-----", 640}, {0750, "rwxr-x---", 750},
+        {0, "---------", 0},      {0777, "rwxrwxrwx", 777}, {0104755, "rwxr-xr-x", 755},
+        {0007, "------rwx", 7},   {0421, "r---w---x", 421}, {~0U, "rwxrwxrwx", 777}};
+    for (const auto& [mode, text, digits] : rows) {
         EXPECT_EQ(GetPrivilegeStr(mode), text);
         EXPECT_EQ(GetPrivilege(mode), digits) << text;
         EXPECT_EQ(GetPrivilege(text), digits) << text;

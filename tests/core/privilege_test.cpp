@@ -60,16 +60,13 @@ TEST_F(PrivilegeTest, ListsAndMasks) {
 }
 
 TEST_F(PrivilegeTest, RefusedLookups) {
-    for (const auto& [path, user, code, log] : Rows<const char*, const char*, int, Texts>{
-             {nullptr, "alice", 401, {"orveldir(#): bad parameter!"}},
-             {"photo",
-              "alice",
-              401,
-              {"orveldir(#): bad path name=photo", "orveldir(#): OrvLibGetTokOfPath photo fail"}},
-             {"/", "alice", 401, {"orveldir(#) error path", "orveldir(#): OrvLibGetTokOfPath / fail"}},
-             {"/no\nne/x", "alice", 408, {"orveldir(#): VEXOShareGet no\\x0Ane fail"}},
-             {"/home", "alice", 408, {"orveldir(#): VEXOShareGet home fail"}},
-         }) {
+    const Rows<const char*, const char*, int, Texts> rows = {
+        {nullptr, "alice", 401, {"orveldir(#): bad parameter!"}},
+        {"photo", "alice", 401, {"orveldir(#): bad path name=photo", "orveldir(#): OrvLibGetTokOfPath photo fail"}},
+        {"/", "alice", 401, {"orveldir(#) error path", "orveldir(#): OrvLibGetTokOfPath / fail"}},
+        {"/no\nne/x", "alice", 408, {"orveldir(#): VEXOShareGet no\\x0Ane fail"}},
+        {"/home", "alice", 408, {"orveldir(#): VEXOShareGet home fail"}}};
+    for (const auto& [path, user, code, log] : rows) {
         OrvLibSetErr(0);
         const Answer out = ask(path, user);
         EXPECT_EQ(out.result, -1);
@@ -140,16 +137,11 @@ TEST_F(PrivilegeTest, HasPrivilegeIsExact) {
 
 TEST_F(PrivilegeTest, ListingAndDownloading) {
     const Texts refused = {"orveldir:# No privilege in path "};
-    for (const auto& [path, user, list, download] : Rows<const char*, const char*, bool, bool>{
-             {"/photo/x", "alice", true, true},
-             {"/photo", "bob", true, true},
-             {"/photo", "carol", false, false},
-             {"/quiet", "bob", false, false},
-             {"/quiet", "carol", true, true},
-             {"/view", "bob", true, false},
-             {"/drop", "bob", true, true},
-             {"/mixed", "bob", false, false},
-         }) {
+    const Rows<const char*, const char*, bool, bool> rows = {
+        {"/photo/x", "alice", true, true}, {"/photo", "bob", true, true},   {"/photo", "carol", false, false},
+        {"/quiet", "bob", false, false},   {"/quiet", "carol", true, true}, {"/view", "bob", true, false},
+        {"/drop", "bob", true, true},      {"/mixed", "bob", false, false}};
+    for (const auto& [path, user, list, download] : rows) {
         OrvLibSetErr(7);
         EXPECT_EQ(CheckShareListPrivilege(user, nullptr, path), list) << path << user;
         EXPECT_EQ(OrvLibGetErr(), 7) << "a refused listing sets no code";

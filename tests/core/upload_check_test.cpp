@@ -16,21 +16,10 @@ TEST(UploadErrors, Table) {
 }
 
 TEST_F(UploadCheckTest, CopyFailuresHaveCodesOfTheirOwn) {
-    for (const auto& [platformError, code] : Rows<int, int>{{0x0300, 407},
-                                                            {0x0600, 408},
-                                                            {0x0700, 408},
-                                                            {0x0800, 414},
-                                                            {0x2400, 415},
-                                                            {0x2900, 416},
-                                                            {0x8400, 411},
-                                                            {0xA000, 414},
-                                                            {0xA200, 414},
-                                                            {0xA300, 1805},
-                                                            {0xA400, 1804},
-                                                            {0xA500, 419},
-                                                            {0xC300, 412},
-                                                            {0x8100, 401},
-                                                            {0x1234, 401}}) {
+    const Rows<int, int> rows = {{0x0300, 407},  {0x0600, 408}, {0x0700, 408}, {0x0800, 414}, {0x2400, 415},
+                                 {0x2900, 416},  {0x8400, 411}, {0xA000, 414}, {0xA200, 414}, {0xA300, 1805},
+                                 {0xA400, 1804}, {0xA500, 419}, {0xC300, 412}, {0x8100, 401}, {0x1234, 401}};
+    for (const auto& [platformError, code] : rows) {
         vexo::gate::fail("VEXOFileCopy", platformError);
         announceLog("Failed to copy /a to /b, reason=[");
         EXPECT_FALSE(MoveFile("alice", "/a", "/b", nullptr));

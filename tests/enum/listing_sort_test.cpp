@@ -49,19 +49,10 @@ TEST(EnumCompareTest, Order) {
         EXPECT_FALSE(EnumCompare(key)(second, first)) << key << " " << first.name << " " << second.name;
     }
     EXPECT_FALSE(EnumCompare("name")(entry("a"), entry("A")) || EnumCompare("name")(entry("A"), entry("a")));
-    for (const auto& [key, added] : Rows<const char*, int>{{"size", 0x02},
-                                                           {"mtime", 0x08},
-                                                           {"crtime", 0x08},
-                                                           {"ctime", 0x08},
-                                                           {"atime", 0x08},
-                                                           {"user", 0x04},
-                                                           {"group", 0x04},
-                                                           {"posix", 0x10},
-                                                           {"type", 0x20},
-                                                           {"name", 0},
-                                                           {"x", 0},
-                                                           {nullptr, 0}})
-        EXPECT_EQ(orvel::widened(0x100, key), 0x100 | added);
+    const Rows<const char*, int> rows = {{"size", 0x02},  {"mtime", 0x08}, {"crtime", 0x08}, {"ctime", 0x08},
+                                         {"atime", 0x08}, {"user", 0x04},  {"group", 0x04},  {"posix", 0x10},
+                                         {"type", 0x20},  {"name", 0},     {"x", 0},         {nullptr, 0}};
+    for (const auto& [key, added] : rows) EXPECT_EQ(orvel::widened(0x100, key), 0x100 | added);
 }
 
 // Lists in which much is equal: few names, in both cases, of different lengths, with a common beginning and broken.

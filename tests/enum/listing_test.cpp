@@ -61,12 +61,9 @@ void ListingTest::makeMixedFolder() {
     file("B.jpg", "1");
     file("a", "12345");
     file("d.TXT", "12");
-    for (const auto& [name, mode, time] : Rows<const char*, mode_t, time_t>{{"beta", 0755, 5},
-                                                                            {"Alpha.zip", 0777, 4},
-                                                                            {"c.txt", 0600, 300},
-                                                                            {"B.jpg", 0644, 200},
-                                                                            {"a", 0640, 100},
-                                                                            {"d.TXT", 0400, 400}}) {
+    const Rows<const char*, mode_t, time_t> rows = {{"beta", 0755, 5},    {"Alpha.zip", 0777, 4}, {"c.txt", 0600, 300},
+                                                    {"B.jpg", 0644, 200}, {"a", 0640, 100},       {"d.TXT", 0400, 400}};
+    for (const auto& [name, mode, time] : rows) {
         const std::string path = real_ + "/" + name;
         ASSERT_EQ(chmod(path.c_str(), mode), 0);
         const timespec times[2] = {{1000 - time, 0}, {time, 0}};

@@ -39,17 +39,12 @@ TEST_F(MountStatusTest, TypeOfTheMountAtExactlyThisFolder) {
 
 TEST_F(MountStatusTest, ReadOnlyByTheDeepestMountThatHoldsThePath) {
     OrvelMountStatus mounts;
-    for (const auto& [path, readOnly] : Rows<const char*, bool>{{"/volume1", false},
-                                                                {"/volume1/a", false},
-                                                                {"/volume1/usb", true},
-                                                                {"/volume1/usb/a", true},
-                                                                {"/volume1/usbx", false},
-                                                                {"/volume1/usb/deep/a", false},
-                                                                {"/volume1/usb/deeper", true},
-                                                                {"/volume1-b/x", true},
-                                                                {"/iso/", true},
-                                                                {"/elsewhere", false},
-                                                                {nullptr, false}}) {
+    const Rows<const char*, bool> rows = {
+        {"/volume1", false},           {"/volume1/a", false},    {"/volume1/usb", true},
+        {"/volume1/usb/a", true},      {"/volume1/usbx", false}, {"/volume1/usb/deep/a", false},
+        {"/volume1/usb/deeper", true}, {"/volume1-b/x", true},   {"/iso/", true},
+        {"/elsewhere", false},         {nullptr, false}};
+    for (const auto& [path, readOnly] : rows) {
         EXPECT_EQ(mounts.IsReadOnly(path), readOnly) << (path == nullptr ? "null" : path);
     }
 }

@@ -231,14 +231,10 @@ TEST_F(AccountTest, ExpiryIsReadAsRootAfterTheSwitch) {
 TEST_F(AccountTest, Administrators) {
     addGroup("Managers", 20180, {"bob"});
     addUser("primary", 20014, kAdminGid);
-    for (const auto& [user, group, answer] : Rows<const char*, const char*, int>{{"alice", nullptr, 0},
-                                                                                 {"carol", nullptr, 1},
-                                                                                 {"primary", nullptr, 1},
-                                                                                 {"nobody known", nullptr, -1},
-                                                                                 {nullptr, nullptr, -1},
-                                                                                 {"bob", "Managers", 1},
-                                                                                 {"carol", "Managers", 0},
-                                                                                 {"carol", "no such", 0}}) {
+    const Rows<const char*, const char*, int> rows = {
+        {"alice", nullptr, 0},  {"carol", nullptr, 1},  {"primary", nullptr, 1},  {"nobody known", nullptr, -1},
+        {nullptr, nullptr, -1}, {"bob", "Managers", 1}, {"carol", "Managers", 0}, {"carol", "no such", 0}};
+    for (const auto& [user, group, answer] : rows) {
         if (group != nullptr) setSetting("admin_group", group);
         EXPECT_EQ(VEXOGroupIsAdminGroupMem(user), answer) << testing::PrintToString(user);
         EXPECT_EQ(VEXOGroupIsAdminGroupMemEx(user, 1), answer);
@@ -297,18 +293,11 @@ TEST_F(AccountTest, Applications) {
     EXPECT_EQ(VLIBUserPrivilegeHas("alice", "any"), 1) << "no file";
     writeRootFile("/etc/vexo/applications", "files: alice @administrators\nnobodys:\nforgotten bob\n");
     announceLog("line 3 of /etc/vexo/applications has no \"identifier:\"");
-    for (const auto& [user, application, answer] : Rows<const char*, const char*, int>{
-             {"alice", "files", 1},
-             {"carol", "files", 1},
-             {"bob", "files", 0},
-             {"bob", "other", 1},
-             {"bob", "FILES", 1},
-             {"alice", "nobodys", 0},
-             {"bob", "forgotten", 0},
-             {"", "other", 0},
-             {nullptr, "other", 0},
-             {"alice", nullptr, 0},
-         }) {
+    const Rows<const char*, const char*, int> rows = {
+        {"alice", "files", 1}, {"carol", "files", 1},   {"bob", "files", 0},     {"bob", "other", 1},
+        {"bob", "FILES", 1},   {"alice", "nobodys", 0}, {"bob", "forgotten", 0}, {"", "other", 0},
+        {nullptr, "other", 0}, {"alice", nullptr, 0}};
+    for (const auto& [user, application, answer] : rows) {
         EXPECT_EQ(VLIBUserPrivilegeHas(user, application), answer)
             << testing::PrintToString(user) << testing::PrintToString(application);
     }

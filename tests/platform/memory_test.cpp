@@ -84,27 +84,24 @@ TEST_F(MemoryTest, OperationsFailWithoutAnException) {
     VEXODDNS entry;
     const VEXOCOPYOPT overwrite{static_cast<uid_t>(-1), static_cast<gid_t>(-1), nullptr, VEXO_COPY_OVERWRITE};
 
-    for (const auto& [name, run] : Rows<const char*, std::function<int()>>{
-             {"VEXOACLPermGet", [&] { return VEXOACLPermGet(source.c_str(), &permission); }},
-             {"VEXOACLFolderOpen",
-              [&] {
-                  VEXOACLFOLDER* opened = VEXOACLFolderOpen(folder.get());
-                  VEXOACLFolderClose(opened);
-                  return opened == nullptr ? -1 : 0;
-              }},
-             {"VEXOGetFSType", [&] { return VEXOGetFSType(root.c_str(), 0); }},
-             {"VEXOFSIsInMountTable", [] { return VEXOFSIsInMountTable("/"); }},
-             {"VEXOFSMkdirP",
-              [&] {
-                  return VEXOFSMkdirP(made.c_str(), nullptr, 1, static_cast<uid_t>(-1), static_cast<gid_t>(-1), 0755);
-              }},
-             {"VolumePathParse", [&] { return VolumePathParse("/a-volume-with-a-long-name/a", &volume); }},
-             {"VEXOFileCopy", [&] { return VEXOFileCopy(source.c_str(), target.c_str(), &overwrite); }},
-             {"VLIBCExec", [] { return VLIBCExec("/bin/true", nullptr); }},
-             {"VEXOLogKTRFMXferLog",
-              [] { return VEXOLogKTRFMXferLog("::1", "alice", "download", 1, "/photo/a", false); }},
-             {"VEXODDNSConfigGet", [&] { return VEXODDNSConfigGet("provider", &entry); }},
-         }) {
+    const Rows<const char*, std::function<int()>> rows = {
+        {"VEXOACLPermGet", [&] { return VEXOACLPermGet(source.c_str(), &permission); }},
+        {"VEXOACLFolderOpen",
+         [&] {
+             VEXOACLFOLDER* opened = VEXOACLFolderOpen(folder.get());
+             VEXOACLFolderClose(opened);
+             return opened == nullptr ? -1 : 0;
+         }},
+        {"VEXOGetFSType", [&] { return VEXOGetFSType(root.c_str(), 0); }},
+        {"VEXOFSIsInMountTable", [] { return VEXOFSIsInMountTable("/"); }},
+        {"VEXOFSMkdirP",
+         [&] { return VEXOFSMkdirP(made.c_str(), nullptr, 1, static_cast<uid_t>(-1), static_cast<gid_t>(-1), 0755); }},
+        {"VolumePathParse", [&] { return VolumePathParse("/a-volume-with-a-long-name/a", &volume); }},
+        {"VEXOFileCopy", [&] { return VEXOFileCopy(source.c_str(), target.c_str(), &overwrite); }},
+        {"VLIBCExec", [] { return VLIBCExec("/bin/true", nullptr); }},
+        {"VEXOLogKTRFMXferLog", [] { return VEXOLogKTRFMXferLog("::1", "alice", "download", 1, "/photo/a", false); }},
+        {"VEXODDNSConfigGet", [&] { return VEXODDNSConfigGet("provider", &entry); }}};
+    for (const auto& [name, run] : rows) {
         SCOPED_TRACE(name);
         ASSERT_GE(run(), 0);
         const int before = openDescriptors();

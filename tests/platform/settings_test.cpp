@@ -8,24 +8,16 @@ namespace {
 
 TEST(SettingsFormat, Lines) {
     using namespace std::string_view_literals;
-    for (const auto& [line, key, value] : Rows<std::string_view, std::string_view, std::string_view>{
-             {"a=b", "a", "b"},
-             {" a\t= \"b c\" \r", "a", "b c"},
-             {"a= b c ", "a", "b c"},
-             {"a=", "a", ""},
-             {"a=\"\"", "a", ""},
-             {"a=\" b \"", "a", " b "},
-             {"a=\"b\" # why", "a", "b"},
-             {"a=\"say \"hi\"\"", "a", "say \"hi\""},
-             {"a=\"torn", "a", "\"torn"},
-             {"a=\"", "a", "\""},
-             {"a b=c=d", "a b", "c=d"},
-             {"", "", ""},
-             {"just text", "", ""},
-             {"=b", "", ""},
-             {"# a=b", "", ""},
-             {"a=b\0c"sv, "", ""},
-         }) {
+    const Rows<std::string_view, std::string_view, std::string_view> rows = {
+        {"a=b", "a", "b"},           {" a\t= \"b c\" \r", "a", "b c"},
+        {"a= b c ", "a", "b c"},     {"a=", "a", ""},
+        {"a=\"\"", "a", ""},         {"a=\" b \"", "a", " b "},
+        {"a=\"b\" # why", "a", "b"}, {"a=\"say \"hi\"\"", "a", "say \"hi\""},
+        {"a=\"torn", "a", "\"torn"}, {"a=\"", "a", "\""},
+        {"a b=c=d", "a b", "c=d"},   {"", "", ""},
+        {"just text", "", ""},       {"=b", "", ""},
+        {"# a=b", "", ""},           {"a=b\0c"sv, "", ""}};
+    for (const auto& [line, key, value] : rows) {
         const auto setting = vexo::parseSettingLine(line, "=");
         EXPECT_EQ(setting.has_value(), !key.empty()) << line;
         EXPECT_TRUE(!setting || (setting->key == key && setting->value == value)) << line;

@@ -35,13 +35,10 @@ TEST(CgiText, Cookies) {
 }
 
 TEST(CgiText, ParseToArray) {
-    for (const auto& [text, separator, pieces] :
-         Rows<const char*, const char*, std::vector<std::string>>{{"a,b,,c", ",", {"a", "b", "", "c"}},
-                                                                  {",", ",", {"", ""}},
-                                                                  {"", ",", {""}},
-                                                                  {"a::b:c", "::", {"a", "b:c"}},
-                                                                  {"a,b", "", {"a,b"}},
-                                                                  {"a,b", nullptr, {"a,b"}}}) {
+    const Rows<const char*, const char*, std::vector<std::string>> rows = {
+        {"a,b,,c", ",", {"a", "b", "", "c"}}, {",", ",", {"", ""}}, {"", ",", {""}},
+        {"a::b:c", "::", {"a", "b:c"}},       {"a,b", "", {"a,b"}}, {"a,b", nullptr, {"a,b"}}};
+    for (const auto& [text, separator, pieces] : rows) {
         const Json::Value array = VEXO::WebAPIUtil::ParseToArray(text, separator);
         Json::Value expected(Json::arrayValue);
         for (const std::string& piece : pieces) expected.append(piece);
