@@ -76,6 +76,11 @@ class ORVEL_API FolderSharingLoginManager {
     std::string loginUser_;
 };
 
+// Is a link valid at `now`? The dates are those of its row, seconds since 1970: valid from `available` on, and through
+// the whole of the day of which `expires` is the first or the last second; an `expires` of 0 means always. What
+// GetSharingFolderPath only logs.
+ORVEL_API bool IsLinkOpen(long long available, long long expires, long long now);
+
 }  // namespace OrvelLogin
 
 #endif

@@ -6,6 +6,7 @@
 #include <ctime>
 
 #include "core/owned.h"
+#include "orvel/sharing_link.h"
 #include "sharing/link_window.h"
 #include "util/printable.h"
 #include "vexo/database.h"
@@ -89,3 +90,7 @@ std::string sharedPathOf(const std::string& link) {
 }
 
 }  // namespace orvel
+
+bool OrvelLogin::IsLinkOpen(long long available, long long expires, long long now) {
+    return orvel::isWithin({.available = available, .expires = expires}, now);
+}

@@ -1,0 +1,213 @@
+// CGI program "share": what a visitor without an account sees of a public link.
+//
+// Parameters, from the query or a form:
+//   FOLDER_SHARING   the link; the header Folder-Sharing comes before it
+//   action           none: the page, which asks for the rest
+//                    "login" (posted): with `password`; sets the cookie of the link
+//                    "list": what the shared folder holds, or the shared file alone
+//                    "download": a file with ranges, a folder or several paths as a zip
+//   path, path_raw   below the shared folder (list, download)
+//   sort_by, sort_direction, offset, limit, additional   as for the program "list"; of the additional properties only
+//                    size, time and type
+// A link that is not open for whatever reason, and any path outside it, is missing. What needs a log-in answers 401
+// without one, {"data": {"password": true}} when it takes a password.
+#include <json/value.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <csignal>
+#include <cstdio>
+#include <string>
+#include <vector>
+
+#include "confined.h"
+#include "download/sending.h"
+#include "listing.h"
+#include "orvel/error_state.h"
+#include "orvel/share_path.h"
+#include "reply.h"
+#include "request.h"
+#include "share/place.h"
+#include "share/visit.h"
+#include "text.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr int kShown = ADDITIONAL_SIZE | ADDITIONAL_TIME | ADDITIONAL_TYPE;
+
+// In front of what the library writes: nothing that the page names may come from elsewhere, nobody learns its address.
+constexpr const char* kPageHeaders =
+    "Cache-Control: no-store\r\n"
+    "X-Content-Type-Options: nosniff\r\n"
+    "Referrer-Policy: no-referrer\r\n"
+    "Content-Security-Policy: default-src 'none'; script-src 'self' 'unsafe-inline'; style-src 'self'; img-src 'self'; "
+    "connect-src 'self'; form-action 'self'; base-uri 'none'; frame-ancestors 'none'\r\n";
+
+// The prefix goes into the page as it is.
+bool isTunnel(const std::string& prefix) {
+    const auto fits = [](char c) {
+        return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '/' || c == '-' ||
+               c == '_' || c == '.';
+    };
+    return prefix.empty() ||
+           (prefix.starts_with('/') && !prefix.starts_with("//") && std::all_of(prefix.begin(), prefix.end(), fits));
+}
+
+void writeNotice(Output& out, const char* status, const char* text) {
+    out.text() += std::string("Status: ") + status + "\r\nContent-Type: text/html; charset=UTF-8\r\n" + kPageHeaders +
+                  "\r\n<!DOCTYPE html><meta charset=\"utf-8\"><title>" + text + "</title><p>" + text + "</p>\n";
+}
+
+// A link without a password lets the visitor in at once.
+void servePage(Output& out, Visit& visit) {
+    if (!isTunnel(visit.web().GetParam("tunnel", ""))) return writeNotice(out, "400 Bad Request", "Bad address.");
+    switch (visit.availability()) {
+        case Availability::kBlocked:
+            return writeNotice(out, "403 Forbidden", "Too many failed attempts. Try again later.");
+        case Availability::kNone:
+            return writeNotice(out, "404 Not Found", "This link is not available.");
+        case Availability::kBroken:
+            return writeNotice(out, "500 Internal Server Error", "This link cannot be opened now.");
+        case Availability::kOpen:
+            break;
+    }
+    if (visit.link().passwordHash.empty() && !visit.logIn("")) {
+        return writeNotice(out, "500 Internal Server Error", "This link cannot be opened now.");
+    }
+    printf("Status: 200 OK\r\n%s", kPageHeaders);
+    visit.writePage();
+}
+
+// The cookie of the log-in goes out with the request's own header, so the reply takes that way.
+void serveLogin(Output& out, Visit& visit) {
+    if (!isPosted()) return replyFailure(out, Status::kBadRequest, "", ORV_ERR_PARAMETER, "");
+    if (!visit.logIn(visit.web().GetParam("password", ""))) {
+        return replyFailure(out, Status::kForbidden, "", ORV_ERR_DENIED, "");
+    }
+    printf("Status: 200 OK\r\nCache-Control: no-store\r\nX-Content-Type-Options: nosniff\r\n");
+    visit.web().WriteHeader("application/json; charset=UTF-8");
+    printf("{\"success\":true}");
+    fflush(stdout);
+}
+
+// The shared file as the only item of a list.
+int listFile(const Place& place, Listing& listing) {
+    struct stat status = {};
+    if (fstat(place.found.get(), &status) != 0) return refusalCode(errno, place.realPath);
+    if (!S_ISREG(status.st_mode)) return ORV_ERR_DENIED;
+    DIRENTRY_INFO entry;
+    entry.name = place.name;
+    entry.size = status.st_size;
+    entry.mtime = static_cast<uint32_t>(status.st_mtime);
+    entry.ctime = static_cast<uint32_t>(status.st_ctime);
+    entry.atime = static_cast<uint32_t>(status.st_atime);
+    entry.crtime = entry.mtime;
+    entry.isDirectory = false;
+    listing.entries.push_back(entry);
+    listing.total = 1;
+    return ORV_ERR_NONE;
+}
+
+void serveList(Output& out, Visit& visit, const std::string& wanted) {
+    const VEXO::WebCGI& web = visit.web();
+    const auto offset = numberParam(web, "offset", 0), limit = numberParam(web, "limit", 0);
+    const auto ascending = ascendingParam(web);
+    if (!offset || !limit || !ascending) return replyFailure(out, Status::kBadRequest, "", ORV_ERR_PARAMETER, wanted);
+    Place place;
+    Listing listing;
+    int code = findPlace(visit.link().owner, visit.link().path, wanted, place);
+    const ListRequest request = {.user = visit.link().owner,
+                                 .sid = "",
+                                 .path = place.path,
+                                 .sortBy = web.GetParam("sort_by", ""),
+                                 .ascending = *ascending,
+                                 .offset = *offset,
+                                 .limit = *limit,
+                                 .additional = additionalBits(web.GetParam("additional", "")) & kShown,
+                                 .pattern = "",
+                                 .type = DIR_ENTRY_TYPE_ALL};
+    if (code == ORV_ERR_NONE) code = place.isFile ? listFile(place, listing) : listFolder(request, listing);
+    if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, "", code, wanted);
+    // A visitor's paths begin at the shared folder.
+    for (DIRENTRY_INFO& entry : listing.entries) entry.path = place.isFile ? "" : place.within + "/" + entry.name;
+
+    Json::Value about;
+    about["file"] = place.isFile;
+    putPath(about, "name", place.name);
+    putPath(about, "path", place.within);
+    beginReply(out, Status::kOk, "");
+    out.text() += "{\"success\":true,\"place\":";
+    appendJson(about, out.text());
+    out.text() += ",\"data\":";
+    writeListing(request, listing, appendEntry, out);
+    out.text() += '}';
+}
+
+void serveDownload(Output& out, Visit& visit, std::vector<std::string> wanted) {
+    if (wanted.empty()) wanted.emplace_back();
+    std::vector<Source> sources(wanted.size());
+    for (size_t i = 0; i < wanted.size(); ++i) {
+        Place place;
+        int code = findPlace(visit.link().owner, visit.link().path, wanted[i], place);
+        if (code == ORV_ERR_NONE) code = openFound(place.found, place.realPath, sources[i]);
+        if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), "", code, wanted[i]);
+        sources[i].path = place.path;
+        sources[i].name = place.name;
+    }
+    const User owner = {.name = visit.link().owner, .sid = "", .cookie = ""};
+    if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, owner, sources[0]);
+    serveZip(out, owner, sources, sources.size() == 1 ? sources[0].name : "download");
+}
+
+Status statusOf(Availability availability) {
+    if (availability == Availability::kBlocked) return Status::kForbidden;
+    return availability == Availability::kNone ? Status::kNotFound : Status::kBroken;
+}
+
+int codeOf(Availability availability) {
+    if (availability == Availability::kBlocked) return ORV_ERR_DENIED;
+    return availability == Availability::kNone ? ORV_ERR_MISSING : ORV_ERR_GENERAL;
+}
+
+// What only a visitor who is logged in sees; from here on the process is the link's owner.
+void serveInside(Output& out, Visit& visit, const std::string& action) {
+    if (!visit.isLoggedIn()) {
+        Json::Value how;
+        how["password"] = !visit.link().passwordHash.empty();
+        return reply(out, Status::kNotLoggedIn, "", ORV_ERR_DENIED, "", how);
+    }
+    const auto paths = pathParams(visit.web());
+    if (!paths || (action == "list" && paths->size() > 1)) {
+        return replyFailure(out, Status::kBadRequest, "", ORV_ERR_PARAMETER, "");
+    }
+    const int code = actAs(nullptr, visit.link().owner, IsDirUserHome(visit.link().path, nullptr));
+    if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), "", code, "");
+    if (action == "list") return serveList(out, visit, paths->empty() ? "" : paths->front());
+    serveDownload(out, visit, *paths);
+}
+
+void serve(Output& out) {
+    std::signal(SIGPIPE, SIG_IGN);
+    dropForwardedFor();
+    Visit visit;
+    if (visit.web().BodyRefused()) return replyFailure(out, Status::kTooLarge, "", ORV_ERR_PARAMETER, "");
+    const std::string action = visit.web().GetParam("action", "");
+    if (action.empty()) return servePage(out, visit);
+    if (action != "login" && action != "list" && action != "download") {
+        return replyFailure(out, Status::kBadRequest, "", ORV_ERR_PARAMETER, "");
+    }
+    if (visit.availability() != Availability::kOpen) {
+        return replyFailure(out, statusOf(visit.availability()), "", codeOf(visit.availability()), "");
+    }
+    if (action == "login") return serveLogin(out, visit);
+    serveInside(out, visit, action);
+}
+
+}  // namespace
+}  // namespace orvel::cgi
+
+int main() {
+    return orvel::cgi::runProgram(orvel::cgi::serve);
+}

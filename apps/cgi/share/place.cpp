@@ -1,0 +1,57 @@
+#include "share/place.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <utility>
+
+#include "confined.h"
+#include "orvel/error_state.h"
+#include "orvel/file_info.h"
+#include "orvel/privilege.h"
+#include "reply.h"
+
+namespace orvel::cgi {
+namespace {
+
+std::string lastComponent(const std::string& path) {
+    return path.substr(path.rfind('/') + 1);
+}
+
+// What follows the slashes at the front; "" also for ".".
+std::string relative(const std::string& wanted) {
+    return wanted.substr(std::min(wanted.find_first_not_of('/'), wanted.size()));
+}
+
+}  // namespace
+
+int findPlace(const std::string& owner, const std::string& sharedPath, const std::string& wanted, Place& place) {
+    PathInfo info;
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(owner.c_str(), sharedPath, info)) return lastCode();
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!CheckShareDownloadPrivilege(owner.c_str(), nullptr, info.path.c_str())) return lastCode(ORV_ERR_DENIED);
+
+    const LinkPolicy policy = linkPolicyOf(info.shareName);
+    Descriptor shared;
+    const int code = confinedOpen(info, policy, O_PATH, shared);
+    if (code != ORV_ERR_NONE) return code;
+    struct stat status = {};
+    if (fstat(shared.get(), &status) != 0) return refusalCode(errno, info.realPath);
+    place.isFile = !S_ISDIR(status.st_mode);
+    const std::string rest = relative(wanted), top = realPathOf(shared);
+    if (place.isFile && !rest.empty()) return ORV_ERR_MISSING;
+
+    place.found = rest.empty() ? std::move(shared) : openBeneath(shared, rest, policy, O_PATH);
+    if (!place.found) return refusalCode(errno, info.realPath);
+    place.realPath = realPathOf(place.found);
+    if (top.empty() || !place.realPath.starts_with(top)) return ORV_ERR_DENIED;
+    place.within = place.realPath.substr(top.size());
+    place.path = info.path + place.within;
+    place.name = lastComponent(place.within.empty() ? info.path : place.within);
+    return ORV_ERR_NONE;
+}
+
+}  // namespace orvel::cgi
