@@ -2,7 +2,7 @@
 import assert from "node:assert/strict";
 import { mkdirSync, readdirSync, writeFileSync } from "node:fs";
 import { after, before, test } from "node:test";
-import { launch, openPage, row, rowsReady, screenshot } from "./browser.mjs";
+import { launch, row, rowsReady, screenshot, withPage } from "./browser.mjs";
 
 const LARGE = 100_000;
 let chrome;
@@ -15,24 +15,13 @@ before(async () => {
 });
 after(() => chrome.close());
 
-async function withPage(user, options, run) {
-  const page = await openPage(chrome.browser, user, options);
-  try {
-    await rowsReady(page);
-    await run(page);
-    assert.deepEqual(page.complaints, []);
-  } finally {
-    await page.context().close();
-  }
-}
-
 const names = (page) => page.locator("#view .row:not(.header) .name bdi, #view .row:not(.header) bdi.name").allTextContents();
 const place = (page) => page.evaluate(() => location.hash.slice(1));
 
-test("shares, by user", () => withPage("alice", {}, async (page) => {
+test("shares, by user", () => withPage(chrome, "alice", {}, async (page) => {
   assert.equal(await page.locator(".card").count(), 10);
   await screenshot(page, "home");
-  await withPage("bob", {}, async (other) => {
+  await withPage(chrome, "bob", {}, async (other) => {
     assert.equal(await other.locator(".card", { hasText: "projects" }).count(), 0);
     assert.match(await other.locator(".card", { hasText: "photo" }).textContent(), /Read only/);
   });
@@ -47,7 +36,7 @@ test("shares, by user", () => withPage("alice", {}, async (page) => {
   await page.waitForSelector("#view >> text=01 Track.flac");
 }));
 
-test("sorting keeps folders first, both ways", () => withPage("alice", { path: "/photo" }, async (page) => {
+test("sorting keeps folders first, both ways", () => withPage(chrome, "alice", { path: "/photo" }, async (page) => {
   await screenshot(page, "list");
   await page.click("[data-sort=size]");
   await page.click("[data-sort=size]");
@@ -63,7 +52,7 @@ test("sorting keeps folders first, both ways", () => withPage("alice", { path: "
   await screenshot(page, "grid");
 }));
 
-test("a folder of 100,000: first view, its end, everything chosen", () => withPage("alice", { path: "/home" }, async (page) => {
+test("a folder of 100,000: first view, its end, everything chosen", () => withPage(chrome, "alice", { path: "/home" }, async (page) => {
   const requests = [];
   page.on("request", (request) => { if (request.url().includes("/cgi-bin/list")) requests.push(new URL(request.url()).searchParams); });
   await page.evaluate(() => { location.hash = "/projects/large"; });
@@ -89,7 +78,7 @@ test("a folder of 100,000: first view, its end, everything chosen", () => withPa
   await page.waitForSelector("#status >> text=100,000 selected");
 }));
 
-test("names that programs stumble over", () => withPage("alice", { path: "/worldwide", viewport: { width: 1280, height: 2000 } }, async (page) => {
+test("names that programs stumble over", () => withPage(chrome, "alice", { path: "/worldwide", viewport: { width: 1280, height: 2000 } }, async (page) => {
   const shown = await page.locator("#view .row:not(.header) .cell.name").evaluateAll((cells) => cells.map((cell) => cell.title));
   for (const name of ["<img src=x onerror=alert(1)>.txt", "&amp; &lt;tag&gt;.txt", "single ' double \" back `.txt", "line[␊]break.txt",
     "looks like [RLO]txt.exe", "percent%20sign%2F.txt", "שלום עולם.txt", "#hash.txt", "question?.txt", "caf\uFFFD in Latin-1.txt"]) {
@@ -113,7 +102,7 @@ test("names that programs stumble over", () => withPage("alice", { path: "/world
   }
 }));
 
-test("what one may not open says so, and why", () => withPage("bob", { path: "/projects" }, async (page) => {
+test("what one may not open says so, and why", () => withPage(chrome, "bob", { path: "/projects" }, async (page) => {
   await page.waitForSelector(".state >> text=no permission for “projects”");
   await page.click(".state >> text=Why?");
   await page.waitForSelector(".dialog >> text=You are on the no-access list of “projects”");
@@ -127,7 +116,7 @@ test("what one may not open says so, and why", () => withPage("bob", { path: "/p
 }));
 
 test("dark, German, on a phone", async () => {
-  await withPage("alice", { path: "/photo/2014", colorScheme: "dark", locale: "de-DE" }, async (page) => {
+  await withPage(chrome, "alice", { path: "/photo/2014", colorScheme: "dark", locale: "de-DE" }, async (page) => {
     assert.equal(await page.getAttribute("html", "lang"), "de");
     assert.match(await page.locator("#status").textContent(), /4 Elemente/);
     await screenshot(page, "dark");
@@ -135,7 +124,7 @@ test("dark, German, on a phone", async () => {
     await page.waitForSelector(".dialog >> text=Tastenkürzel");
     await screenshot(page, "help");
   });
-  await withPage("alice", { path: "/photo", viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true }, async (page) => {
+  await withPage(chrome, "alice", { path: "/photo", viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true }, async (page) => {
     await screenshot(page, "phone");
     await row(page, "2016").tap();
     await page.waitForFunction(() => location.hash === "#/photo/2016");
@@ -146,7 +135,7 @@ test("dark, German, on a phone", async () => {
   });
 });
 
-test("a typed path, a filter, a place that is not there any more", () => withPage("alice", { path: "/" }, async (page) => {
+test("a typed path, a filter, a place that is not there any more", () => withPage(chrome, "alice", { path: "/" }, async (page) => {
   await page.keyboard.press("Control+l");
   await page.keyboard.type("/projects/house");
   await page.keyboard.press("Enter");

@@ -1,7 +1,9 @@
 // A browser for the tests: Debian's Chromium through playwright-core, with every complaint of the page collected.
 import { existsSync, mkdirSync, mkdtempSync, rmSync } from "node:fs";
+import assert from "node:assert/strict";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
+import { crc32, deflateSync } from "node:zlib";
 import { chromium } from "playwright-core";
 
 const PROGRAM = process.env.ORVEL_TEST_CHROMIUM ?? "/usr/bin/chromium";
@@ -49,6 +51,23 @@ export async function openPage(browser, user, { path = "/", ...options } = {}) {
   return page;
 }
 
+// What `run` does as `user`; `expected` are complaints that must come.
+export async function withPage({ browser }, user, options, run, expected = []) {
+  const page = await openPage(browser, user, options);
+  try {
+    await rowsReady(page);
+    await run(page);
+    for (const one of expected) assert.ok(page.complaints.some((text) => one.test(text)), `${one} in ${page.complaints}`);
+    assert.deepEqual(page.complaints.filter((text) => !expected.some((one) => one.test(text))), []);
+  } catch (failure) {
+    await screenshot(page, `failed-${user}-${Date.now()}`);
+    failure.message += `\nComplaints: ${page.complaints.join("\n")}`;
+    throw failure;
+  } finally {
+    await page.context().close();
+  }
+}
+
 export async function screenshot(page, name) {
   mkdirSync(SCREENSHOTS, { recursive: true });
   await page.screenshot({ path: join(SCREENSHOTS, `${name}.png`) });
@@ -61,4 +80,35 @@ export async function rowsReady(page) {
 
 export function row(page, name) {
   return page.locator("#view .row:not(.header)").filter({ has: page.locator(".name", { hasText: name }) }).first();
+}
+
+// A PNG of hills under a sky, different for each number.
+export function picture(width, height, number) {
+  const rows = Buffer.alloc(height * (width * 3 + 1));
+  for (let y = 0; y < height; ++y) {
+    for (let x = 0; x < width; ++x) {
+      let layer = 0;
+      for (let i = 1; i <= 4; ++i) {
+        const ridge = height * (0.3 + i * 0.15) + Math.sin(x / (34 + 9 * i) + number * i * 1.7) * 18 + Math.sin(x / 13 + number + i) * 4;
+        if (y > ridge) layer = i;
+      }
+      const hue = (number * 47) % 360 + layer * 14;
+      const light = layer === 0 ? 0.92 - (0.35 * (height - y)) / height : 0.66 - layer * 0.13;
+      const channel = (shift) => Math.round(255 * light * (0.72 + 0.28 * Math.cos(((hue + shift) * Math.PI) / 180)));
+      rows.set([channel(0), channel(120), channel(240)], y * (width * 3 + 1) + 1 + x * 3);
+    }
+  }
+  const chunk = (name, data) => {
+    const body = Buffer.concat([Buffer.from(name), data]);
+    const out = Buffer.alloc(body.length + 8);
+    out.writeUInt32BE(data.length, 0);
+    body.copy(out, 4);
+    out.writeUInt32BE(crc32(body) >>> 0, body.length + 4);
+    return out;
+  };
+  const head = Buffer.alloc(13);
+  head.writeUInt32BE(width, 0);
+  head.writeUInt32BE(height, 4);
+  head.set([8, 2], 8);
+  return Buffer.concat([Buffer.from("\x89PNG\r\n\x1a\n", "latin1"), chunk("IHDR", head), chunk("IDAT", deflateSync(rows)), chunk("IEND", Buffer.alloc(0))]);
 }

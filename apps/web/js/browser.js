@@ -1,11 +1,11 @@
 // Where one is: the folder on screen, its listing, what is chosen in it.
 
-import { get } from "./api.js";
+import { ApiError, get } from "./api.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { emit } from "./events.js";
 import { Listing } from "./listing.js";
-import { normaliseId, parentOf } from "./path.js";
+import { isSearch, normalisePlace, parentOf } from "./path.js";
 import { pref, setPref } from "./prefs.js";
 import { COLUMNS } from "./rows.js";
 import { Selection } from "./selection.js";
@@ -13,11 +13,13 @@ import { t } from "./strings.js";
 
 const ADDITIONAL = "size,time,owner,perm,mount_point_type";
 const FIRST_LOOK = 60;
+const GONE = 408;
 // Most folders are there within this; only slower ones show that something is going on.
 const PATIENCE = 150;
 
 export const browser = {
-  id: "/",
+  id: "/", // of the folder, or "?" and the task of a search
+  lastFolder: "/",
   shares: [],
   user: "",
   listing: null,
@@ -45,16 +47,25 @@ export function shareEntry(id) {
 
 // Opening goes through the address, so that back and forward work.
 export function go(id) {
-  if (normaliseId(location.hash.slice(1)) === id) open(id);
+  if (normalisePlace(location.hash.slice(1)) === id) open(id);
   else location.hash = id;
 }
 
+let toChoose = null;
+
+// The folder that holds the entry, with it chosen.
+export function goTo(entry) {
+  toChoose = entry.id;
+  go(entry.parent);
+}
+
 export function goUp() {
-  if (browser.id !== "/") go(parentOf(browser.id));
+  if (browser.id !== "/") go(isSearch(browser.id) ? browser.lastFolder : parentOf(browser.id));
 }
 
 function columns() {
-  return [COLUMNS.name, COLUMNS.size, COLUMNS.mtime, COLUMNS.type, COLUMNS.owner].map((column) => ({
+  const { name, folder, size, mtime, type, owner } = COLUMNS;
+  return (isSearch(browser.id) ? [name, folder, size, mtime, type] : [name, size, mtime, type, owner]).map((column) => ({
     ...column,
     sorted: column.sort !== browser.sort.by ? null : browser.sort.ascending ? "ascending" : "descending",
   }));
@@ -70,6 +81,19 @@ function makeListing(id) {
       sort_by: browser.sort.by, sort_direction: browser.sort.ascending ? "asc" : "desc",
     }, signal);
     return { total: reply.total, items: reply.items.map(entryOf) };
+  }, changed);
+}
+
+// What a search has found so far; `extra` of the listing tells whether it goes on.
+function makeResults(id) {
+  return new Listing(["all"], async (filetype, offset, limit, signal) => {
+    const reply = await get("search", {
+      action: "list", taskid: id.slice(1), filetype, offset, limit, filter: browser.filter || undefined, additional: ADDITIONAL,
+      sort_by: browser.sort.by, sort_direction: browser.sort.ascending ? "asc" : "desc",
+    }, signal).catch((failure) => {
+      throw failure.code === GONE ? new ApiError({ key: "page:search_gone" }) : failure;
+    });
+    return { ...reply, items: reply.items.map(entryOf) };
   }, changed);
 }
 
@@ -90,6 +114,9 @@ export async function open(id) {
   browser.listing?.cancel();
   browser.filter = "";
   browser.id = id;
+  if (!isSearch(id)) browser.lastFolder = id;
+  const choice = toChoose ?? (parentOf(from) === id ? from : null);
+  toChoose = null;
   emit("place", id);
   if (id === "/") {
     browser.listing = null;
@@ -97,12 +124,12 @@ export async function open(id) {
     emit("shown");
     return;
   }
-  await show(id, mine, parentOf(from) === id ? from : null);
+  await show(id, mine, choice);
   if (mine === turn && browser.listing?.ready) announce(t("announce.opened", { count: browser.listing.total }));
 }
 
 async function show(id, mine, cameFrom) {
-  const listing = makeListing(id);
+  const listing = isSearch(id) ? makeResults(id) : makeListing(id);
   const saved = remembered.get(id);
   await Promise.race([listing.need(0, FIRST_LOOK), new Promise((resolve) => setTimeout(resolve, PATIENCE))]);
   if (mine !== turn) return listing.cancel();

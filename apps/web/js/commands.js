@@ -1,8 +1,9 @@
 // Everything that can be done, once: for the toolbar, the menus, the keyboard and the list of shortcuts.
 
-import { browser, go, goUp, refresh, selectedEntries, setMode, shareEntry } from "./browser.js";
+import { browser, go, goTo, goUp, refresh, selectedEntries, setMode, shareEntry } from "./browser.js";
 import { isReadOnlyShare } from "./entries.js";
 import { copyPath, download, newFolder, rename, showProperties } from "./operations.js";
+import { isSearch } from "./path.js";
 import { editPath } from "./pathbar.js";
 import { preview } from "./preview.js";
 import { chooseFiles } from "./uploads.js";
@@ -28,10 +29,15 @@ export function context() {
   const count = listing?.ready ? selection.count : 0;
   const share = shareEntry(browser.id);
   const folder = browser.id !== "/" && Boolean(listing?.ready);
+  const search = isSearch(browser.id);
+  const first = count > 0 ? listing.item(selection.ranges.list[0][0]) : undefined;
+  const home = search && first ? shareEntry(first.id) : share;
   return {
     folder,
+    search,
     count,
-    single: count === 1 ? listing.item(selection.ranges.list[0][0]) : undefined,
+    canChange: count > 0 && home !== undefined && !isReadOnlyShare(home),
+    single: count === 1 ? first : undefined,
     canWrite: folder && share !== undefined && !isReadOnlyShare(share),
     inBin: /^\/[^/]+\/%23recycle(\/|$)/.test(browser.id),
   };
@@ -58,10 +64,11 @@ addCommand({ id: "preview", icon: "eye", keys: [" "], group: "open", when: ({ si
   run: ({ single }) => preview(single) });
 addCommand({ id: "download", icon: "download", keys: ["Mod+s"], group: "open", when: some,
   run: async () => download(await selectedEntries()) });
-addCommand({ id: "rename", icon: "rename", keys: ["F2"], group: "change", when: ({ single, canWrite, inBin }) => single && canWrite && !inBin,
+addCommand({ id: "rename", icon: "rename", keys: ["F2"], group: "change", when: ({ single, canChange, inBin }) => single && canChange && !inBin,
   run: ({ single }) => rename(single) });
+addCommand({ id: "showInFolder", icon: "folder-open", group: "open", when: ({ single, search }) => single && search, run: ({ single }) => goTo(single) });
 addCommand({ id: "copyPath", icon: "copy", group: "info", when: one, run: ({ single }) => copyPath(single.id) });
-addCommand({ id: "properties", icon: "info", keys: ["Alt+Enter"], group: "info", when: ({ single, folder }) => single || folder,
+addCommand({ id: "properties", icon: "info", keys: ["Alt+Enter"], group: "info", when: ({ single, folder, search }) => single || (folder && !search),
   run: ({ single }) => showProperties(single ?? browser.id) });
 addCommand({ id: "upload", icon: "upload", keys: ["Mod+u"], group: "new", when: ({ canWrite, inBin }) => canWrite && !inBin, run: () => chooseFiles(false) });
 addCommand({ id: "uploadFolder", icon: "upload", group: "new", when: ({ canWrite, inBin }) => canWrite && !inBin, run: () => chooseFiles(true) });

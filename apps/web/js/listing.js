@@ -45,8 +45,9 @@ export class Listing {
   // The rows first..last are in sight. Fetches what is missing around them, cancels what has been passed by.
   need(first, last) {
     const wanted = new Set();
-    if (!this.ready) {
-      for (const one of this.parts) wanted.add(this.keyOf(one, 0));
+    // How many there are is known from the first page.
+    for (const one of this.parts) {
+      if (!one.total && !one.pages.has(0)) wanted.add(this.keyOf(one, 0));
     }
     for (const { one, page } of this.pagesOf(Math.max(0, first - AHEAD), last + AHEAD)) wanted.add(this.keyOf(one, page));
     for (const [key, request] of this.requests) {
@@ -112,8 +113,6 @@ export class Listing {
       one.pages = new Map();
     }
     this.error = null;
-    const unknown = this.parts.filter((one) => one.total === null || one.total === 0);
-    for (const one of unknown) this.load(this.keyOf(one, 0));
     return this.need(first, last);
   }
 

@@ -10,11 +10,12 @@ import { on } from "./events.js";
 import { homeNode, paintVolume } from "./home.js";
 import { setupKeys } from "./keys.js";
 import { newFolder } from "./operations.js";
-import { normaliseId, parentOf } from "./path.js";
+import { isSearch, normalisePlace, parentOf } from "./path.js";
 import { setupPathbar } from "./pathbar.js";
 import { setupPointer } from "./pointer.js";
+import { openSearch, searchFor, setupSearch } from "./search.js";
 import { setupSettings } from "./settings.js";
-import { emptyBin, emptyFolder, failedState, noShares, nothingFound } from "./states.js";
+import { emptyBin, emptyFolder, failedState, nothingMatches, noShares, nothingFound, stillSearching } from "./states.js";
 import { loadStrings, t } from "./strings.js";
 import { setupToolbar } from "./toolbar.js";
 import { setupTree } from "./tree.js";
@@ -62,10 +63,12 @@ function paintListing() {
 function stateOf(listing) {
   if (listing.error) {
     const { id } = browser;
+    if (isSearch(id)) return failedState(listing.error, "", { retry: openSearch, back: goUp });
     const back = parentOf(id) === "/" ? null : goUp;
     return failedState(listing.error, undefined, { retry: () => open(id), back, why: () => showWhy(id) });
   }
   if (!listing.ready || listing.total > 0) return null;
+  if (isSearch(browser.id) && browser.filter === "") return listing.extra.finished ? nothingMatches(openSearch) : stillSearching();
   if (browser.filter !== "") return nothingFound(browser.filter, clearFilter);
   const { canWrite, inBin } = context();
   return inBin ? emptyBin() : emptyFolder({ canWrite, upload: () => chooseFiles(false), newFolder });
@@ -87,19 +90,23 @@ function setupFind() {
   let timer = null;
   input.addEventListener("input", () => {
     clearTimeout(timer);
-    timer = setTimeout(() => setFilter(input.value.trim()), 180);
+    if (browser.id !== "/") timer = setTimeout(() => setFilter(input.value.trim()), 180);
   });
   input.addEventListener("keydown", (event) => {
     if (event.key === "Escape") {
       clearFilter();
       $("view").focus();
     }
-    if (event.key === "ArrowDown" || event.key === "Enter") $("view").focus();
+    if (event.key === "ArrowDown") $("view").focus();
+    // Here is only what lies in this folder: Enter looks below it, and from the start in all shares.
+    if (event.key === "Enter" && input.value.trim() !== "") {
+      clearTimeout(timer);
+      searchFor(input.value.trim());
+    }
   });
   on("place", () => {
     clearTimeout(timer);
     input.value = "";
-    input.disabled = browser.id === "/";
   });
 }
 
@@ -143,9 +150,10 @@ async function start() {
   setupFind();
   setupSidebar();
   setupSettings();
+  setupSearch();
   setupActivity();
   setupDragAndDrop();
-  addEventListener("hashchange", () => open(normaliseId(location.hash.slice(1))));
+  addEventListener("hashchange", () => open(normalisePlace(location.hash.slice(1))));
   addEventListener("beforeunload", (event) => { if (uploadsRunning()) event.preventDefault(); });
   addEventListener("focus", () => { if (context().folder && browser.selection.count === 0) refresh(); });
   try {
@@ -155,7 +163,7 @@ async function start() {
     return;
   }
   document.body.classList.add("started");
-  open(normaliseId(location.hash.slice(1)));
+  open(normalisePlace(location.hash.slice(1)));
   $("view").focus({ preventScroll: true });
 }
 

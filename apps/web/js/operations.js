@@ -8,7 +8,7 @@ import { entryOf, extensionOf } from "./entries.js";
 import { emit } from "./events.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
-import { childOf, decode, encodeName, lastOf, nameOf, parentOf, splitExtension } from "./path.js";
+import { childOf, decode, encodeName, isSearch, lastOf, nameOf, parentOf, splitExtension } from "./path.js";
 import { t } from "./strings.js";
 import { whyNode } from "./why.js";
 
@@ -34,6 +34,11 @@ export async function newFolder() {
   if (browser.id === folder) await refresh([made]);
 }
 
+// The search on screen, whose results follow what is done to them.
+export function searchTask() {
+  return isSearch(browser.id) ? browser.id.slice(1) : undefined;
+}
+
 export async function rename(entry) {
   const [stem] = entry.isFolder ? [entry.name] : splitExtension(entry.name);
   const renamed = await askText({
@@ -41,7 +46,7 @@ export async function rename(entry) {
     check: (text) => (text === entry.name ? "" : checkName(text)),
     submit: async (name) => {
       if (name === entry.name) return entry.id;
-      await post("operation", { action: "rename", path_raw: entry.id, name_raw: encodeName(name) });
+      await post("operation", { action: "rename", path_raw: entry.id, name_raw: encodeName(name), taskid: searchTask() });
       return childOf(entry.parent, encodeName(name));
     },
   });

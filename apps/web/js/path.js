@@ -29,6 +29,15 @@ function normalisePart(part) {
     piece.length === 3 && piece[0] === "%" ? piece.toUpperCase() : encodeName(piece));
 }
 
+// A search stands in the address as "?" and its task.
+export function isSearch(place) {
+  return place.startsWith("?");
+}
+
+export function normalisePlace(text) {
+  return isSearch(text) ? text : normaliseId(text);
+}
+
 // Readable; bytes that are no UTF-8 show as U+FFFD.
 export function decode(id) {
   const bytes = encoder.encode(id);

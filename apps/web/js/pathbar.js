@@ -2,7 +2,7 @@
 
 import { h, icon, nameNode, set } from "./dom.js";
 import { browser, go } from "./browser.js";
-import { ancestry, decode, encodePath, nameOf, normaliseId } from "./path.js";
+import { ancestry, decode, encodePath, isSearch, nameOf, normaliseId } from "./path.js";
 import { isRecycleBin } from "./entries.js";
 import { on } from "./events.js";
 import { t } from "./strings.js";
@@ -11,6 +11,7 @@ const bar = document.getElementById("pathbar");
 
 export function labelOf(id) {
   if (id === "/") return t("place.shares");
+  if (isSearch(id)) return t("place.search");
   if (id === "/home") return t("place.home");
   return isRecycleBin(id) ? t("place.recycle") : nameOf(id);
 }
@@ -23,7 +24,7 @@ export function setupPathbar() {
 }
 
 function paint(id) {
-  const ids = ["/", ...ancestry(id)];
+  const ids = isSearch(id) ? ["/", id] : ["/", ...ancestry(id)];
   bar.replaceChildren(h("ol", {}, ids.map((one, i) => {
     const last = i === ids.length - 1;
     const crumb = h("a.crumb", { href: `#${one}`, "data-id": one, "aria-current": last ? "page" : null, title: last ? null : decode(one) });
@@ -38,7 +39,7 @@ function paint(id) {
 export function editPath() {
   if (bar.querySelector("input")) return;
   const before = browser.id;
-  const text = decode(before);
+  const text = isSearch(before) ? "/" : decode(before);
   const input = h("input.input", { type: "text", value: text, "aria-label": t("path.edit"), spellcheck: "false", autocomplete: "off" });
   let done = false;
   const finish = (accept) => {

@@ -11,7 +11,7 @@ import { thumbnailOf } from "./thumbnails.js";
 // id, and how a cell shows it. `sort` is the server's name of the order.
 export const COLUMNS = {
   name: { id: "name", sort: "name" },
-  folder: { id: "folder", sort: "path", text: (entry) => plainName(decode(entry.parent)) },
+  folder: { id: "folder", sort: "ppath", text: (entry) => plainName(decode(entry.parent)) },
   size: { id: "size", sort: "size", text: (entry) => (entry.size === null ? "" : formatSize(entry.size)) },
   mtime: { id: "mtime", sort: "mtime", text: (entry) => formatTime(entry.mtime), title: (entry) => formatFullTime(entry.mtime) },
   type: { id: "type", sort: "type", text: (entry) => (entry.isFolder ? t("type.folder") : extensionOf(entry)) },

@@ -26,6 +26,16 @@ export function nothingFound(text, clear) {
   return state("search", t("empty.filter", { text }), t("empty.filter.hint"), [{ label: t("filter.clear"), run: clear }]);
 }
 
+export function nothingMatches(refine) {
+  return state("search", t("empty.search"), t("empty.search.hint"), [{ label: t("search.refine"), run: refine }]);
+}
+
+export function stillSearching() {
+  const node = state("search", t("search.running"), t("search.running.hint"));
+  node.classList.add("patient");
+  return node;
+}
+
 export function noShares() {
   return state("lock", t("empty.shares"), t("empty.shares.hint"));
 }

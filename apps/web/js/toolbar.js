@@ -5,11 +5,12 @@ import { command, context, runCommand, shortcutText } from "./commands.js";
 import { $, h, icon, iconButton } from "./dom.js";
 import { on } from "./events.js";
 import { openMenu } from "./menu.js";
+import { searchStatus } from "./search.js";
 import { formatSize } from "./format.js";
 import { t } from "./strings.js";
 
 const SORTS = ["name", "size", "mtime", "type", "user"];
-const ON_CHOSEN = ["open", "preview", "download", "share", "cut", "copy", "copyTo", "moveTo", "rename", "compress", "extract", "restore", "delete"];
+const ON_CHOSEN = ["open", "showInFolder", "preview", "download", "share", "cut", "copy", "copyTo", "moveTo", "rename", "compress", "extract", "restore", "delete"];
 const IN_BAR = ["download", "share", "copyTo", "moveTo", "restore", "rename", "delete"];
 let painted = "";
 
@@ -30,7 +31,7 @@ export function contextItems() {
   if (context().count === 0) {
     return [...items(["newFolder", "upload", "uploadFolder"]), "-", ...items(["paste", "selectAll", "refresh"]), "-", ...items(["emptyBin", "properties"])];
   }
-  return [...items(ON_CHOSEN.slice(0, 4)), "-", ...items(ON_CHOSEN.slice(4, 8)), "-", ...items(["rename", "compress", "extract", "restore"]), "-",
+  return [...items(ON_CHOSEN.slice(0, 5)), "-", ...items(ON_CHOSEN.slice(5, 9)), "-", ...items(["rename", "compress", "extract", "restore"]), "-",
     ...items(["delete", "deleteForever"]), "-", ...items(["copyPath", "properties"])];
 }
 
@@ -48,14 +49,15 @@ function paintToolbar(setSort) {
   bar.hidden = browser.id === "/";
   $("status").hidden = bar.hidden;
   // Painted anew only when something else can be done; the count changes in place.
-  const key = [browser.id, browser.mode, browser.sort.by, now.folder, now.canWrite, now.inBin, now.count > 0, now.count === 1, now.single?.isFolder, now.single?.name].join("|");
+  const key = [browser.id, browser.mode, browser.sort.by, now.folder, now.canWrite, now.inBin, now.count > 0, now.count === 1, now.search && browser.listing?.extra?.finished, now.single?.isFolder, now.single?.name].join("|");
   if (key !== painted) {
     painted = key;
     const left = now.count > 0
       ? [h("span.chosen-count", {}, iconButton("close", t("command.selectNone"), () => runCommand("selectNone")), h("span#chosen-count")),
         ...IN_BAR.map((id) => button(id, id === "delete" ? ".quiet-danger" : "")),
         iconButton("dots", t("menu.more"), (event) => openMenu(contextItems(), { anchor: event.currentTarget }), { "aria-haspopup": "menu" })]
-      : [uploadButton(now), button("newFolder"), button("paste"), button("emptyBin")];
+      : now.search ? [button("stopSearch"), button("search"), button("closeSearch")]
+        : [uploadButton(now), button("newFolder"), button("paste"), button("emptyBin")];
     const right = [sortButton(setSort), h("span.view-switch", { role: "group", "aria-label": t("view.choose") }, ["list", "grid"].map((mode) =>
       iconButton(mode, t(`view.${mode}`), () => runCommand(mode === "list" ? "viewList" : "viewGrid"), { "aria-pressed": String(browser.mode === mode) })))];
     bar.replaceChildren(...[...left, h("span.grow"), ...right].filter(Boolean));
@@ -78,11 +80,12 @@ function sortButton(setSort) {
   { id: "sort-button", "aria-haspopup": "menu" });
 }
 
-function paintStatus({ count, folder }) {
+function paintStatus(now) {
+  const { count, folder } = now;
   const { listing } = browser;
   const parts = [];
   if (folder) {
-    parts.push(h("span", {}, t("status.items", { count: listing.total })));
+    parts.push(now.search ? searchStatus(listing) : h("span", {}, t("status.items", { count: listing.total })));
     if (count > 0) parts.push(h("span", {}, [t("select.count", { count }), sizeOfChosen()].filter(Boolean).join(", ")));
     if (browser.filter) parts.push(h("span", {}, t("status.filtered", { text: browser.filter })));
   }

@@ -216,7 +216,7 @@ class Job {
 }
 
 function ask(job) {
-  const more = job.batch.jobs.filter((one) => one.state === "waiting").length > 0;
+  const more = job.batch.jobs.some((one) => one !== job && ["waiting", "running"].includes(one.state));
   return dialog({ title: t("conflict.title"), fill: (close) => {
     const all = h("input", { type: "checkbox", checked: more });
     const answer = (value) => () => {

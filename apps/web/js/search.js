@@ -1,0 +1,131 @@
+// Searches: asked in the panel, running on the server, their results in the list.
+
+import { post } from "./api.js";
+import { browser, go, refresh } from "./browser.js";
+import { addCommand } from "./commands.js";
+import { toastFailure } from "./dialogs.js";
+import { $, announce, h, iconButton } from "./dom.js";
+import { describe } from "./errors.js";
+import { on } from "./events.js";
+import { isSearch } from "./path.js";
+import { isEmptySearch, paramsOf, searchForm } from "./search_form.js";
+import { t } from "./strings.js";
+
+const POLL = 700;
+const KEPT = "orvel.search";
+let asked = {};
+let timer = null;
+
+export function setupSearch() {
+  on("listing", watch);
+  on("shown", watch);
+  on("place", (id) => {
+    clearTimeout(timer);
+    if (isSearch(id)) asked = recall(id) ?? asked;
+    else closePanel();
+  });
+  $("search-button").addEventListener("click", () => ($("panel").hidden ? openSearch() : closePanel()));
+}
+
+addCommand({ id: "search", icon: "search", keys: ["Mod+Shift+f"], group: "go", run: openSearch });
+addCommand({ id: "stopSearch", icon: "stop", group: "go", when: ({ search }) => search && browser.listing?.extra?.finished === false, run: stopSearch });
+addCommand({ id: "closeSearch", icon: "close", group: "go", when: ({ search }) => search, run: closeSearch });
+
+export function openSearch() {
+  const form = searchForm(asked, start);
+  form.addEventListener("reset", (event) => {
+    event.preventDefault();
+    asked = {};
+    openSearch();
+  });
+  $("panel").replaceChildren(h("header", {}, h("h2", {}, t("command.search")), iconButton("close", t("dialog.close"), closePanel)), form);
+  $("panel").hidden = false;
+  $("search-button").setAttribute("aria-expanded", "true");
+  form.elements.name.focus();
+  form.elements.name.select();
+}
+
+function closePanel() {
+  $("panel").hidden = true;
+  $("search-button").setAttribute("aria-expanded", "false");
+}
+
+// By name alone, below the folder on screen.
+export function searchFor(name) {
+  asked = { name, where: browser.lastFolder === "/" ? "all" : "below" };
+  openSearch();
+  $("panel").querySelector("form").requestSubmit();
+}
+
+async function start(values) {
+  const complaint = $("panel").querySelector(".complaint");
+  const params = paramsOf(values);
+  complaint.textContent = isEmptySearch(params) ? t("search.nothing") : "";
+  if (complaint.textContent) return;
+  asked = values;
+  const before = isSearch(browser.id) ? browser.id : null;
+  try {
+    const { taskid } = await post("search", { action: "start", ...params });
+    sessionStorage.setItem(KEPT, JSON.stringify({ taskid, asked }));
+    if (matchMedia("(max-width: 760px)").matches) closePanel();
+    if (before) clean(before);
+    go(`?${taskid}`);
+  } catch (failure) {
+    const said = describe(failure);
+    complaint.textContent = [failure.data?.parameter && t("search.wrong", { field: t(`search.${failure.data.parameter.split("_")[0]}`) }), said.title].filter(Boolean)[0];
+  }
+}
+
+function recall(id) {
+  try {
+    const kept = JSON.parse(sessionStorage.getItem(KEPT));
+    return kept?.taskid === id.slice(1) ? kept.asked : null;
+  } catch {
+    return null;
+  }
+}
+
+// As long as it runs, what is in sight is asked for again.
+function watch() {
+  const { listing, id } = browser;
+  clearTimeout(timer);
+  if (!isSearch(id) || !listing?.ready || listing.extra?.finished) {
+    if (isSearch(id) && listing?.extra?.finished && listing.told !== true) tell(listing);
+    return;
+  }
+  timer = setTimeout(async () => {
+    if (listing !== browser.listing) return;
+    await refresh();
+    watch();
+  }, POLL);
+}
+
+function tell(listing) {
+  listing.told = true;
+  if (listing.extra.failed) toastFailure({ ...listing.extra.failure, path: "" });
+  announce(t("search.found", { count: listing.total }));
+}
+
+async function stopSearch() {
+  await post("search", { action: "stop", taskid: browser.id.slice(1) }).catch((failure) => toastFailure(failure));
+  refresh();
+}
+
+function clean(id) {
+  post("search", { action: "clean", taskid: id.slice(1) }).catch(() => {});
+}
+
+function closeSearch() {
+  clean(browser.id);
+  closePanel();
+  go(browser.lastFolder);
+}
+
+export function searchStatus(listing) {
+  const { finished, stopped, shares = {} } = listing.extra ?? {};
+  const ways = new Set(Object.values(shares));
+  const how = ways.size === 1 ? t(`search.by.${[...ways][0]}`) : "";
+  const found = t("search.found", { count: listing.total });
+  if (!finished) return h("span.running", {}, h("i.spinner"), [t("search.running"), found].join(" "));
+  return h("span", {}, [found, stopped && t("search.stopped"), how].filter(Boolean).join(" · "));
+}
