@@ -7,6 +7,7 @@
 #include <initializer_list>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include "auto_block_rules.h"
 #include "failure.h"
@@ -22,7 +23,7 @@ namespace {
 
 constexpr const char* kFolder = "/var/lib/vexo";
 constexpr const char* kStore = "/var/lib/vexo/autoblock.db";
-constexpr int kPatience = 3000;  // milliseconds for the locks of others
+constexpr int kPatience = 8000;  // milliseconds for the locks of others
 constexpr size_t kMaxTag = 64;
 constexpr int kMaxRows = 10000;
 
@@ -103,8 +104,9 @@ vexo::Database openStore(bool create) {
     vexo::Database db = vexo::openDatabase(path, SQLITE_OPEN_READWRITE);
     if (!db) return db;
     sqlite3_busy_timeout(db.get(), kPatience);
-    if (!isDone(run(db.get(), kSchema, {}))) return nullptr;
-    return db;
+    // A count that a power failure takes back does no harm, a wait for the disk at each failed log-in does.
+    const bool ready = isDone(run(db.get(), "PRAGMA synchronous=NORMAL", {})) && isDone(run(db.get(), kSchema, {}));
+    return ready ? std::move(db) : nullptr;
 }
 
 bool count(sqlite3* db, std::string_view address, std::string_view tag, const vexo::AutoBlockRules& rules) {

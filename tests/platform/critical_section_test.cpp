@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <atomic>
 #include <cerrno>
 #include <chrono>
@@ -15,7 +16,6 @@
 #include <random>
 #include <string>
 #include <thread>
-#include <vector>
 
 #include "support/appliance.h"
 #include "vexo/error.h"
@@ -104,11 +104,11 @@ TEST_F(CriticalSection, TheTimeIsKeptAndErrnoToo) {
 }
 
 TEST_F(CriticalSection, SixtyFourProcessesAllGetIn) {
-    std::vector<pid_t> children;
-    for (int i = 0; i < 64; ++i) {
-        children.push_back(start([&] {
+    std::array<pid_t, 64> children{};
+    for (pid_t& child : children) {
+        child = start([&] {
             for (int round = 0; round < 3; ++round) pass(2);
-        }));
+        });
     }
     for (const pid_t child : children) {
         int status = 0;
@@ -122,13 +122,13 @@ TEST_F(CriticalSection, SixtyFourProcessesAllGetIn) {
 
 TEST_F(CriticalSection, DeathFreesIt) {
     constexpr int kProcesses = 8;
-    std::vector<pid_t> children;
+    std::array<pid_t, kProcesses> children{};
     const auto begin = [&] {
         return start([&] {
             while (true) pass(1);
         });
     };
-    for (int i = 0; i < kProcesses; ++i) children.push_back(begin());
+    for (pid_t& child : children) child = begin();
     std::minstd_rand random(1);
     for (int kills = 0; kills < 150; ++kills) {
         std::this_thread::sleep_for(milliseconds(5));
