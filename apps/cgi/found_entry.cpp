@@ -67,7 +67,7 @@ BOOL take(__tag_FI_FILE_INFO_DATA* record, void* arg) {
 
 int readResults(const ListRequest& request, FileSearch::OrvSearchDBTask& results, Listing& listing) {
     Page page = {homeOf(request.user), request.additional, listing};
-    const char* sortBy = request.sortBy.empty() ? nullptr : request.sortBy.c_str();
+    const char* sortBy = request.sortBy.empty() ? "name" : request.sortBy.c_str();
     unsigned long long total = 0;
     const bool read = results.queryResult(request.offset, request.limit, sortBy, &request.ascending, &request.type,
                                           request.pattern.c_str(), take, &page, &total);
