@@ -123,10 +123,10 @@ class ORVEL_API OrvSearchWalker {
                 const std::vector<FindATimeComp*>& accessTimeCriteria);
 
     // True: only the entries directly in the chosen folders. False from the start.
-    void setSearchCurrentDir(bool currentOnly) { currentFolderOnly_ = currentOnly; }
+    void setSearchCurrentDir(bool currentOnly);
     // "" before a successful init; then what OrvSearchDBTask takes, until the walker ends.
-    const char* getDBTaskId() const { return taskId_.c_str(); }
-    const char* getDBVol() const { return volume_.c_str(); }
+    [[nodiscard]] const char* getDBTaskId() const;
+    [[nodiscard]] const char* getDBVol() const;
 
  private:
     [[nodiscard]] bool cancelled() const { return cancelFlag_ != nullptr && *cancelFlag_ != 0; }

@@ -50,6 +50,18 @@ OrvSearchWalker::OrvSearchWalker(const char* user, const char* sid, int* cancelF
 
 OrvSearchWalker::~OrvSearchWalker() = default;
 
+void OrvSearchWalker::setSearchCurrentDir(bool currentOnly) {
+    currentFolderOnly_ = currentOnly;
+}
+
+const char* OrvSearchWalker::getDBTaskId() const {
+    return taskId_.c_str();
+}
+
+const char* OrvSearchWalker::getDBVol() const {
+    return volume_.c_str();
+}
+
 bool OrvSearchWalker::init(const std::vector<std::string>& folders, const std::vector<FindComp*>& criteria) {
     const bool ready = orvel::guardedQuietly(false, [&] { return prepare(folders, criteria); });
     if (!ready) {

@@ -84,18 +84,31 @@ inline Rows rowsOf(FileSearch::OrvSearchDBTask& task) {
     return rows;
 }
 
-// A search that must succeed. Its task is gone again.
+// One search; its task goes with it.
+class OneSearch {
+ public:
+    OneSearch(const char* user, const std::vector<std::string>& folders,
+              const std::vector<FileSearch::FindComp*>& criteria, bool withFlag = true)
+        : walker(user, nullptr, withFlag ? &flag : nullptr),
+          ready(walker.init(folders, criteria)),
+          task(walker.getDBVol(), user, walker.getDBTaskId()) {}
+    ~OneSearch() { task.remove(); }
+    OneSearch(const OneSearch&) = delete;
+    OneSearch& operator=(const OneSearch&) = delete;
+
+    int flag = 0;
+    FileSearch::OrvSearchWalker walker;
+    const bool ready;
+    FileSearch::OrvSearchDBTask task;
+};
+
+// The rows of a search that must succeed.
 inline Rows search(const char* user, const Query& query) {
     const Criteria criteria(query.asks);
-    int flag = 0;
-    FileSearch::OrvSearchWalker walker(user, nullptr, &flag);
-    walker.setSearchCurrentDir(query.currentOnly);
-    EXPECT_TRUE(walker.init(query.folders, criteria.all));
-    EXPECT_TRUE(walker.Walk(criteria.accessTimes));
-    FileSearch::OrvSearchDBTask task(walker.getDBVol(), user, walker.getDBTaskId());
-    Rows rows = rowsOf(task);
-    EXPECT_TRUE(task.remove());
-    return rows;
+    OneSearch run(user, query.folders, criteria.all);
+    run.walker.setSearchCurrentDir(query.currentOnly);
+    EXPECT_TRUE(run.ready && run.walker.Walk(criteria.accessTimes));
+    return rowsOf(run.task);
 }
 
 inline std::vector<std::string> keysOf(const Rows& rows) {
