@@ -65,10 +65,11 @@ bool addFunctions(sqlite3* db) {
                SQLITE_OK;
 }
 
-// A file may be made to harm who opens it.
-void limit(sqlite3* db) {
+// A file may be made to harm who opens it; only the central store may say by triggers what is to be done.
+void limit(sqlite3* db, bool ofShare) {
     sqlite3_db_config(db, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
-    sqlite3_db_config(db, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
+    sqlite3_db_config(db, SQLITE_DBCONFIG_TRUSTED_SCHEMA, static_cast<int>(ofShare), nullptr);
+    sqlite3_db_config(db, SQLITE_DBCONFIG_ENABLE_TRIGGER, static_cast<int>(ofShare), nullptr);
     sqlite3_db_config(db, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
     sqlite3_db_config(db, SQLITE_DBCONFIG_ENABLE_LOAD_EXTENSION, 0, nullptr);
     sqlite3_limit(db, SQLITE_LIMIT_LENGTH, 4 << 20);
@@ -162,7 +163,7 @@ bool Database::create(const std::string& path) {
 }
 
 bool Database::configure(OpenMode mode) {
-    limit(db_);
+    limit(db_, mode.ofShare);
     waitForOthers(true);
     if (!addFunctions(db_)) return failSql(db_);
     // Results are worth nothing after a loss of power, but must survive the death of their writer. Pages that a large
