@@ -46,7 +46,7 @@ TEST_F(AclPrivilegeTest, ArgumentsAndMissingFiles) {
     EXPECT_EQ(ACLAccess(none.c_str(), 1), -1);
     EXPECT_EQ(OrvLibGetErr(), 408);
     EXPECT_EQ(GetACLPrivilege(none.c_str()), 0x1FFFU);
-    EXPECT_EQ(takeLogTexts(), Texts{});
+    EXPECT_EQ(takeLogText(), "");
 }
 
 TEST_F(AclPrivilegeTest, PermissionsOfTheCaller) {

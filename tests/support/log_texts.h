@@ -23,6 +23,13 @@ inline std::vector<std::string> takeLogTexts() {
     return texts;
 }
 
+// The same as one text, the lines parted by newlines.
+inline std::string takeLogText() {
+    std::string all;
+    for (const std::string& text : takeLogTexts()) all += (all.empty() ? "" : "\n") + text;
+    return all;
+}
+
 }  // namespace support
 
 #endif
