@@ -54,10 +54,11 @@ export class Card {
   }
 
   // list: {path, text}
-  showErrors(list) {
+  showErrors(list, leftOut = 0) {
     this.errors.hidden = list.length === 0;
     const shown = list.slice(0, MOST_ERRORS).map(({ path, text }) => h("li", { title: plainName(path) }, text));
-    if (list.length > MOST_ERRORS) shown.push(h("li", {}, t("activity.more_errors", { count: list.length - MOST_ERRORS })));
+    const more = leftOut + Math.max(0, list.length - MOST_ERRORS);
+    if (more > 0) shown.push(h("li", {}, t("activity.more_errors", { count: more })));
     this.errors.replaceChildren(...shown);
   }
 

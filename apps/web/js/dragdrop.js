@@ -1,10 +1,13 @@
-// Files from outside dropped on the page.
+// Files from outside dropped on the page, and entries dragged to another folder.
 
 import { browser } from "./browser.js";
 import { crumbId } from "./pathbar.js";
 import { context } from "./commands.js";
-import { $, h, icon } from "./dom.js";
+import { $, h, icon, plainName } from "./dom.js";
+import { iconOf } from "./icons.js";
+import { decode, parentOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
+import { transfer } from "./transfer.js";
 import { treeId } from "./tree.js";
 import { t } from "./strings.js";
 import { fromDrop, holdsFiles } from "./upload_files.js";
@@ -13,6 +16,36 @@ import { startUpload } from "./uploads.js";
 let veil = null;
 let marked = null;
 let depth = 0;
+let dragged = null; // ids
+
+// What is chosen goes along when a chosen row is dragged.
+function begin(event) {
+  const index = browser.view.indexOf(event.target);
+  if (index < 0) return;
+  const { selection, listing, view } = browser;
+  if (!selection.has(index)) selection.pick(index);
+  const entries = selection.ranges.list.flatMap(([first, last]) => Array.from({ length: last - first + 1 }, (_, i) => listing.item(first + i)));
+  // Rows that were never loaded cannot be dragged: the menu moves them.
+  if (entries.some((entry) => !entry)) return event.preventDefault();
+  dragged = entries.map((entry) => entry.id);
+  event.dataTransfer.setData("text/plain", entries.map((entry) => decode(entry.id)).join("\n"));
+  event.dataTransfer.effectAllowed = "copyMove";
+  const ghost = h("div.ghost", {}, icon(iconOf(entries[0]), "file-icon"), entries.length === 1 ? plainName(entries[0].name) : t("select.count", { count: entries.length }));
+  document.body.append(ghost);
+  event.dataTransfer.setDragImage(ghost, -8, -8);
+  setTimeout(() => ghost.remove());
+  for (const [at, row] of view.rows) row.classList.toggle("moving", selection.has(at));
+  return undefined;
+}
+
+function overWithin(event) {
+  const target = folderUnder(event.target);
+  const fits = target && target.node && !dragged.includes(target.id) && (event.ctrlKey || dragged.some((id) => parentOf(id) !== target.id));
+  mark(fits ? target.node : null);
+  if (!fits) return;
+  event.preventDefault();
+  event.dataTransfer.dropEffect = event.ctrlKey ? "copy" : "move";
+}
 
 export function setupDragAndDrop() {
   addEventListener("dragenter", (event) => {
@@ -20,6 +53,12 @@ export function setupDragAndDrop() {
   });
   addEventListener("dragleave", (event) => {
     if (holdsFiles(event.dataTransfer) && --depth <= 0) clear();
+  });
+  addEventListener("dragstart", begin);
+  addEventListener("dragend", () => {
+    for (const node of document.querySelectorAll(".row.moving")) node.classList.remove("moving");
+    dragged = null;
+    clear();
   });
   addEventListener("dragover", over);
   addEventListener("drop", drop);
@@ -36,13 +75,15 @@ export function folderUnder(node) {
 }
 
 function over(event) {
-  if (!holdsFiles(event.dataTransfer)) return;
+  if (dragged) return overWithin(event);
+  if (!holdsFiles(event.dataTransfer)) return undefined;
   event.preventDefault();
   const target = folderUnder(event.target);
   event.dataTransfer.dropEffect = target ? "copy" : "none";
   mark(target?.node ?? null);
   if (target && !target.node) showVeil(target.id);
   else veil?.remove();
+  return undefined;
 }
 
 export function mark(node) {
@@ -66,6 +107,11 @@ function clear() {
 }
 
 async function drop(event) {
+  if (dragged && marked) {
+    event.preventDefault();
+    transfer(event.ctrlKey ? "copy" : "move", dragged, folderUnder(event.target).id);
+    return;
+  }
   if (!holdsFiles(event.dataTransfer)) return;
   event.preventDefault();
   const target = folderUnder(event.target);

@@ -17,6 +17,7 @@ import { openSearch, searchFor, setupSearch } from "./search.js";
 import { setupSettings } from "./settings.js";
 import { emptyBin, emptyFolder, failedState, nothingMatches, noShares, nothingFound, stillSearching } from "./states.js";
 import { loadStrings, t } from "./strings.js";
+import { setupTasks } from "./tasks.js";
 import { setupToolbar } from "./toolbar.js";
 import { setupTree } from "./tree.js";
 import { chooseFiles, uploadsRunning } from "./uploads.js";
@@ -163,6 +164,7 @@ async function start() {
     return;
   }
   document.body.classList.add("started");
+  setupTasks();
   open(normalisePlace(location.hash.slice(1)));
   $("view").focus({ preventScroll: true });
 }

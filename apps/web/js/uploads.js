@@ -3,8 +3,9 @@
 import { ApiError, post, readReply, urlOf } from "./api.js";
 import { Card } from "./activity.js";
 import { browser, refresh } from "./browser.js";
-import { dialog, toastFailure } from "./dialogs.js";
-import { h, nameNode } from "./dom.js";
+import { askConflict, takenNames } from "./conflicts.js";
+import { toastFailure } from "./dialogs.js";
+import { h } from "./dom.js";
 import { describe } from "./errors.js";
 import { emit } from "./events.js";
 import { formatDuration, formatSize } from "./format.js";
@@ -14,7 +15,6 @@ import { t } from "./strings.js";
 import { fromInput } from "./upload_files.js";
 
 const AT_ONCE = 3;
-const NAMES_PER_QUESTION = 100;
 const EXISTS = 414;
 
 const queue = [];
@@ -79,16 +79,8 @@ class Batch {
   async lookForConflicts() {
     const folders = Map.groupBy(this.jobs, (job) => parentOf(job.id));
     for (const [folder, jobs] of folders) {
-      for (let i = 0; i < jobs.length; i += NAMES_PER_QUESTION) {
-        const some = jobs.slice(i, i + NAMES_PER_QUESTION);
-        const pattern = some.map((job) => decode(job.name).replace(/[,\\*?[\]]/g, "?")).join(",");
-        const reply = await post("list", { action: "folder", path_raw: folder, pattern }).catch((failure) => {
-          if (failure.code === 408) return { items: [] }; // the folder is yet to be made
-          throw failure;
-        });
-        const there = new Set(reply.items.map((item) => item.name_raw ?? encodeName(item.name)));
-        for (const job of some) job.meets = there.has(job.name);
-      }
+      const taken = await takenNames(folder, jobs.map((job) => job.name));
+      for (const job of jobs) job.meets = taken.has(job.name);
     }
   }
 
@@ -215,25 +207,12 @@ class Job {
   }
 }
 
-function ask(job) {
+async function ask(job) {
   const more = job.batch.jobs.some((one) => one !== job && ["waiting", "running"].includes(one.state));
-  return dialog({ title: t("conflict.title"), fill: (close) => {
-    const all = h("input", { type: "checkbox", checked: more });
-    const answer = (value) => () => {
-      if (all.checked && more) job.batch.policy = value;
-      close(value);
-    };
-    return [
-      h("div.body", {}, h("p", {}, h("b", {}, nameNode(nameOf(job.id)))), h("p.soft", {}, t("conflict.text", { folder: labelOf(parentOf(job.id)) })),
-        more && h("label.check-line", {}, all, t("conflict.all"))),
-      h("footer", {}, h("button.button", { type: "button", onclick: answer("skip") }, t("conflict.skip")),
-        h("button.button.outlined", { type: "button", onclick: answer("overwrite") }, t("conflict.overwrite")),
-        h("button.button.primary", { type: "button", onclick: answer("both") }, t("conflict.both"))),
-    ];
-  } }).then((answer) => {
-    if (answer === null) job.batch.cancel();
-    return answer;
-  });
+  const said = await askConflict({ name: job.name, folder: parentOf(job.id), more });
+  if (said?.all) job.batch.policy = said.answer;
+  if (!said) job.batch.cancel();
+  return said?.answer ?? null;
 }
 
 export function uploadsRunning() {

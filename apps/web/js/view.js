@@ -115,6 +115,7 @@ export class View {
       row.classList.toggle("above-selected", chosen && this.selection.has(index + 1));
       row.classList.toggle("below-selected", chosen && this.selection.has(index - 1));
     }
+    this.header?.classList.toggle("all", this.listing.ready && this.listing.total > 0 && this.selection.count === this.listing.total);
     const active = this.rows.get(this.selection.cursor);
     if (active) this.root.setAttribute("aria-activedescendant", active.id);
     else this.root.removeAttribute("aria-activedescendant");

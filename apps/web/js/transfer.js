@@ -1,0 +1,128 @@
+// Copying, moving, deleting, packing: what the user says, as tasks.
+
+import { browser, selectedEntries } from "./browser.js";
+import { addCommand } from "./commands.js";
+import { askConflict, takenNames } from "./conflicts.js";
+import { askText, confirm, toast, toastFailure } from "./dialogs.js";
+import { emit } from "./events.js";
+import { checkName } from "./operations.js";
+import { childOf, encodeName, isSearch, isWithin, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
+import { pickFolder } from "./picker.js";
+import { get } from "./api.js";
+import { startTask } from "./tasks.js";
+import { t } from "./strings.js";
+
+const ARCHIVE = /\.(zip|tar|tar\.gz|tgz|tar\.bz2|tbz2?|tar\.xz|txz)$/i;
+const EXISTS = { skip: "skip", overwrite: "overwrite", both: "keep_both" };
+
+let held = null; // {ids, cut}
+
+export function isHeld(id) {
+  return held?.cut === true && held.ids.includes(id);
+}
+
+// Copies or moves ids into a folder; what stands in the way is asked about before anything happens.
+export async function transfer(action, ids, target) {
+  const into = ids.find((id) => isWithin(target, id));
+  if (into) return toastFailure({ code: 1005, key: "error:error_select_conflict", path: `/${nameOf(into)}` });
+  const moving = action === "move" ? ids.filter((id) => parentOf(id) !== target) : ids;
+  if (moving.length === 0) return undefined;
+  try {
+    const beside = action === "copy" && moving.every((id) => parentOf(id) === target);
+    const conflict = beside ? "keep_both" : await conflictFor(target, moving);
+    if (conflict) await startTask(action, moving, { target_raw: target, conflict }, [target]);
+  } catch (failure) {
+    toastFailure(failure, target);
+  }
+  return undefined;
+}
+
+async function conflictFor(target, ids) {
+  const names = ids.map((id) => id.slice(id.lastIndexOf("/") + 1));
+  const taken = [...await takenNames(target, names)];
+  if (taken.length === 0) return "error";
+  const said = await askConflict({ name: taken[0], folder: target, more: false, count: taken.length });
+  return said ? EXISTS[said.answer] : null;
+}
+
+async function to(action) {
+  const ids = (await selectedEntries()).map((entry) => entry.id);
+  const target = await pickFolder({ title: t(`${action}.title`, { count: ids.length }), action: t(`${action}.action`), start: parentOf(ids[0]) });
+  if (target) transfer(action, ids, target);
+}
+
+async function hold(cut) {
+  held = { ids: (await selectedEntries()).map((entry) => entry.id), cut };
+  toast({ text: t(cut ? "held.cut" : "held.copy", { count: held.ids.length }) });
+  emit("selection");
+}
+
+async function paste() {
+  const { ids, cut } = held;
+  if (cut) held = null;
+  await transfer(cut ? "move" : "copy", ids, browser.id);
+}
+
+const bins = new Map(); // share -> whether it has a recycle bin
+
+async function hasBin(share) {
+  if (!bins.has(share)) {
+    const reply = await get("list", { action: "folder", path_raw: share, pattern: "#recycle", filetype: "dir" }).catch(() => ({ items: [] }));
+    bins.set(share, reply.items.some((item) => item.name === "#recycle"));
+  }
+  return bins.get(share);
+}
+
+async function remove(forGood) {
+  const entries = await selectedEntries();
+  const ids = entries.map((entry) => entry.id);
+  const inBin = ids.every((id) => id.split("/")[2] === "%23recycle");
+  const kept = !forGood && !inBin && (await Promise.all([...new Set(ids.map(shareOf))].map(hasBin))).every(Boolean);
+  const what = { count: ids.length, name: entries.length === 1 ? entries[0].name : "" };
+  if (!kept && !(await confirm({ title: t("delete.title", what), text: t(forGood || inBin ? "delete.text" : "delete.nobin", what), action: t("command.deleteForever"), kind: "danger" }))) return;
+  browser.selection.clear();
+  await startTask("delete", ids, { permanent: kept ? undefined : "true" }, kept ? ids.map((id) => `${shareOf(id)}/%23recycle`) : []);
+}
+
+async function restore() {
+  const ids = (await selectedEntries()).map((entry) => entry.id);
+  browser.selection.clear();
+  await startTask("restore", ids, { conflict: "keep_both" }, [shareOf(ids[0])]);
+}
+
+async function emptyBin() {
+  if (await confirm({ title: t("bin.title"), text: t("bin.text"), action: t("command.emptyBin"), kind: "danger" })) {
+    await startTask("empty", [`${shareOf(browser.id)}/%23recycle`], {}, [browser.id]);
+  }
+}
+
+async function compress() {
+  const ids = (await selectedEntries()).map((entry) => entry.id);
+  const folder = parentOf(ids[0]);
+  const stem = ids.length === 1 ? splitExtension(nameOf(ids[0]))[0] : nameOf(folder);
+  const name = await askText({ title: t("compress.title", { count: ids.length }), label: t("name.label"), value: `${stem}.zip`, selectTo: stem.length,
+    action: t("command.compress"), check: checkName, submit: async (text) => (/\.zip$/i.test(text) ? text : `${text}.zip`) });
+  if (!name) return;
+  const target = childOf(folder, encodeName(name));
+  const conflict = await conflictFor(folder, [target]);
+  if (conflict) await startTask("compress", ids, { target_raw: target, conflict }, [folder]);
+}
+
+async function extract({ single }) {
+  const target = await pickFolder({ title: t("extract.title"), action: t("extract.action"), start: single.parent });
+  if (target) await startTask("extract", [single.id], { target_raw: target, conflict: "keep_both" }, [target]);
+}
+
+const chosen = ({ count }) => count > 0;
+const changeable = ({ canChange, inBin }) => canChange && !inBin;
+addCommand({ id: "cut", icon: "cut", keys: ["Mod+x"], group: "change", when: changeable, run: () => hold(true) });
+addCommand({ id: "copy", icon: "copy", keys: ["Mod+c"], group: "change", when: chosen, run: () => hold(false) });
+addCommand({ id: "paste", icon: "paste", keys: ["Mod+v"], group: "change", when: ({ canWrite, inBin }) => held !== null && canWrite && !inBin, run: paste });
+addCommand({ id: "copyTo", icon: "copy", group: "change", when: chosen, run: () => to("copy") });
+addCommand({ id: "moveTo", icon: "move", group: "change", when: changeable, run: () => to("move") });
+addCommand({ id: "compress", icon: "archive", group: "change", when: ({ count, canChange, search, inBin }) => count > 0 && canChange && !search && !inBin, run: compress });
+addCommand({ id: "extract", icon: "extract", group: "change", when: ({ single, inBin }) => single && !inBin && !single.isFolder && ARCHIVE.test(single.name), run: extract });
+addCommand({ id: "restore", icon: "restore", group: "change", when: ({ count, canChange, inBin }) => count > 0 && canChange && inBin, run: restore });
+addCommand({ id: "delete", icon: "trash", keys: ["Delete"], group: "change", danger: true, when: ({ canChange }) => canChange, run: () => remove(false) });
+addCommand({ id: "deleteForever", icon: "trash", keys: ["Shift+Delete"], group: "change", danger: true, when: changeable, run: () => remove(true) });
+addCommand({ id: "emptyBin", icon: "trash", group: "change", danger: true, when: ({ folder, canWrite }) => folder && canWrite && !isSearch(browser.id) && /^\/[^/]+\/%23recycle$/.test(browser.id), run: emptyBin });
