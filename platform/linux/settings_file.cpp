@@ -27,11 +27,6 @@ std::optional<PendingChange> readPending(const std::string& path) {
     return parsePendingChange(text);
 }
 
-void forgetPending(const std::string& path) {
-    const KeepErrno keep;
-    unlink(pendingPath(path).c_str());
-}
-
 bool writeFromStart(int fd, std::string_view text) {
     off_t at = 0;
     while (!text.empty()) {
@@ -44,38 +39,54 @@ bool writeFromStart(int fd, std::string_view text) {
     return true;
 }
 
-// Padded with newlines, so that no reader sees the end of the old text behind the new one.
-bool overwrite(int fd, std::string_view text, size_t oldSize) {
-    std::string padded(text);
-    padded.resize(std::max(text.size(), oldSize), '\n');
-    return writeFromStart(fd, padded) && ftruncate(fd, static_cast<off_t>(text.size())) == 0;
+// A change with all that it takes, so that memory cannot run out half-way.
+struct Change {
+    Change(const std::string& path, PendingChange texts)
+        : pending(pendingPath(path)),
+          temporary(pending + ".new"),
+          announcement(buildPendingChange(texts.before, texts.after)),
+          padded(texts.after),
+          before(std::move(texts.before)),
+          newSize(static_cast<off_t>(texts.after.size())) {
+        padded.resize(std::max(padded.size(), before.size()), '\n');
+    }
+    [[nodiscard]] bool grows() const { return newSize > static_cast<off_t>(before.size()); }
+
+    std::string pending;
+    std::string temporary;
+    std::string announcement;
+    std::string padded;  // with newlines: no reader sees the end of the old text behind the new one
+    std::string before;
+    off_t newSize;
+};
+
+bool overwrite(int fd, std::string_view text, off_t size) {
+    return writeFromStart(fd, text) && ftruncate(fd, size) == 0;
 }
 
 // Makes the announced change; one that the disk does not hold is taken back.
-bool carryOut(int fd, const std::string& path, const PendingChange& change) {
-    const bool done = overwrite(fd, change.after, change.before.size());
+bool carryOut(int fd, const Change& change) {
+    const bool done = overwrite(fd, change.padded, change.newSize);
     const KeepErrno keep;
-    if (done || overwrite(fd, change.before, change.before.size())) forgetPending(path);
+    if (done || overwrite(fd, change.before, static_cast<off_t>(change.before.size()))) unlink(change.pending.c_str());
     return done;
 }
 
 // Lays the change beside the file, as readable as the file. The temporary has one name, since the caller's lock keeps
 // others out: what a killed process left is made use of.
-bool announce(int fd, const std::string& path, const PendingChange& change) {
+bool announce(int fd, const Change& change) {
     struct stat status {};
     if (fstat(fd, &status) != 0) return false;
-    const std::string pending = pendingPath(path);
-    const std::string temporary = pending + ".new";
-    unlink(temporary.c_str());
-    const Descriptor beside = openFile(temporary, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
-    if (beside && writeAll(beside.get(), buildPendingChange(change.before, change.after)) &&
-        fchmod(beside.get(), status.st_mode & 0777) == 0 && rename(temporary.c_str(), pending.c_str()) == 0) {
+    unlink(change.temporary.c_str());
+    const Descriptor beside = openFile(change.temporary, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
+    if (beside && writeAll(beside.get(), change.announcement) && fchmod(beside.get(), status.st_mode & 0777) == 0 &&
+        rename(change.temporary.c_str(), change.pending.c_str()) == 0) {
         return true;
     }
     const KeepErrno keep;
-    if (beside) unlink(temporary.c_str());
+    if (beside) unlink(change.temporary.c_str());
     // A full disk must not keep anybody from taking a right away: what does not grow goes without.
-    return (errno == ENOSPC || errno == EDQUOT) && change.after.size() <= change.before.size();
+    return (errno == ENOSPC || errno == EDQUOT) && !change.grows();
 }
 
 Descriptor openToChange(const std::string& path, bool create) {
@@ -142,13 +153,14 @@ bool changeSettingsFile(const std::string& path, bool create,
     const Descriptor fd = openToChange(path, create);
     std::string text;
     if (!fd || !readAll(fd.get(), text, kMaxFile)) return false;
-    if (const auto unfinished = readPending(path); unfinished && isOnTheWay(text, *unfinished)) {
-        if (!carryOut(fd.get(), path, *unfinished)) return false;
+    if (auto unfinished = readPending(path); unfinished && isOnTheWay(text, *unfinished)) {
         text = unfinished->after;
+        if (!carryOut(fd.get(), Change(path, std::move(*unfinished)))) return false;
     }
-    const PendingChange change{text, edit(text)};
-    if (change.after == change.before) return true;
-    return announce(fd.get(), path, change) && carryOut(fd.get(), path, change);
+    std::string after = edit(text);
+    if (after == text) return true;
+    const Change change(path, {std::move(text), std::move(after)});
+    return announce(fd.get(), change) && carryOut(fd.get(), change);
 }
 
 }  // namespace vexo

@@ -4,9 +4,13 @@
 #include "file_io.h"
 #include "support/testing.h"
 #include "vexo/acl.h"
+#include "vexo/auto_block.h"
 #include "vexo/copy.h"
+#include "vexo/critical_section.h"
+#include "vexo/database.h"
 #include "vexo/ddns.h"
 #include "vexo/filesystem.h"
+#include "vexo/line_file.h"
 #include "vexo/process.h"
 #include "vexo/settings.h"
 #include "vexo/xferlog.h"
@@ -82,6 +86,7 @@ TEST_F(MemoryTest, OperationsFailWithoutAnException) {
     unsigned permission = 0;
     VOLUMEPATHINFO volume;
     VEXODDNS entry;
+    char line[64];
     const VEXOCOPYOPT overwrite{static_cast<uid_t>(-1), static_cast<gid_t>(-1), nullptr, VEXO_COPY_OVERWRITE};
 
     const Rows<const char*, std::function<int()>> rows = {
@@ -100,7 +105,25 @@ TEST_F(MemoryTest, OperationsFailWithoutAnException) {
         {"VEXOFileCopy", [&] { return VEXOFileCopy(source.c_str(), target.c_str(), &overwrite); }},
         {"VLIBCExec", [] { return VLIBCExec("/bin/true", nullptr); }},
         {"VEXOLogKTRFMXferLog", [] { return VEXOLogKTRFMXferLog("::1", "alice", "download", 1, "/photo/a", false); }},
-        {"VEXODDNSConfigGet", [&] { return VEXODDNSConfigGet("provider", &entry); }}};
+        {"VEXODDNSConfigGet", [&] { return VEXODDNSConfigGet("provider", &entry); }},
+        {"VLIBCFileAddLine", [] { return VLIBCFileAddLine("/etc/a-record-file", "a line that is no short one", 512); }},
+        {"VLIBCFileGetLine", [&] { return VLIBCFileGetLine("/etc/a-record-file", "a", line, sizeof line, " "); }},
+        {"VexoCgiBeginCriticalSection",
+         [] {
+             const int handle = VexoCgiBeginCriticalSection("/etc/a-section-with-a-long-name", 0);
+             VexoCgiEndCriticalSection(handle);
+             return handle;
+         }},
+        {"AutoBlockFailLoginSet", [] { return AutoBlockFailLoginSet("2001:db8:1234:5678::1", "FOLDER_SHARING"); }},
+        {"VexoCgiIsDeniedIP", [] { return VexoCgiIsDeniedIP("2001:db8:1234:5678::1"); }},
+        {"VEXODBExecute", [] {
+             PVEXODB db = VEXODBConnect("/var/lib/vexo/autoblock.db");
+             PVEXODBRESULT result = nullptr;
+             const int executed = db == nullptr ? -1 : VEXODBExecute(db, "SELECT * FROM failures", &result);
+             VEXODBFreeResult(result);
+             VEXODBClose(db);
+             return executed;
+         }}};
     for (const auto& [name, run] : rows) {
         SCOPED_TRACE(name);
         ASSERT_GE(run(), 0);
@@ -114,6 +137,26 @@ TEST_F(MemoryTest, OperationsFailWithoutAnException) {
         EXPECT_GT(refusals, 0);
         EXPECT_EQ(openDescriptors(), before);
     }
+}
+
+// A change that was refused half-way is not there, neither in the file nor beside it.
+TEST_F(MemoryTest, SettingsAreChangedOrNot) {
+    const char* known = "";
+    const auto change = [&] {
+        const char* value = *known == '1' ? "2 is a value with a long text" : "1 is a value with a long text";
+        const int result = VLIBCFileSetKeyValue("/etc/x.conf", "a_key_with_a_long_name", value, nullptr);
+        if (result == 0) known = value;
+        return result;
+    };
+    ASSERT_EQ(change(), 0);
+    EXPECT_GT(refuseEach(change,
+                         [&](int result, bool refused) {
+                             EXPECT_EQ(result < 0, refused);
+                             char value[64];
+                             VLIBCFileGetKeyValue("/etc/x.conf", "a_key_with_a_long_name", value, sizeof value, 0);
+                             EXPECT_STREQ(value, known);
+                         }),
+              0);
 }
 
 // What a file held must not be taken for nothing after a reading that failed half-way.
