@@ -17,24 +17,19 @@ TEST(Request, NumbersAreDigitsThatFit) {
 class ForwardedFor : public ApplianceTest {};
 
 TEST_F(ForwardedFor, CountsOnlyFromConfiguredProxies) {
-    struct {
-        const char* proxies;
-        const char* peer;
-        bool kept;
-    } const cases[] = {
-        {"", "127.0.0.1", false},
-        {"10.0.0.1, 10.0.0.2", "10.0.0.2", true},
-        {"10.0.0.1, 10.0.0.2", "10.0.0.20", false},
-        {"10.0.0.1,,", "", false},
-    };
-    for (const auto& request : cases) {
-        writeRootFile("/etc/vexoinfo.conf", std::string("trusted_proxies=\"") + request.proxies + "\"\n");
-        setenv("REMOTE_ADDR", request.peer, 1);
+    for (const auto& [proxies, peer, kept] : Rows<const char*, const char*, bool>{
+             {"", "127.0.0.1", false},
+             {"10.0.0.1, 10.0.0.2", "10.0.0.2", true},
+             {"10.0.0.1, 10.0.0.2", "10.0.0.20", false},
+             {"10.0.0.1,,", "", false},
+         }) {
+        writeRootFile("/etc/vexoinfo.conf", std::string("trusted_proxies=\"") + proxies + "\"\n");
+        setenv("REMOTE_ADDR", peer, 1);
         setenv("HTTP_X_FORWARDED_FOR", "192.0.2.1", 1);
         setenv("HTTP_CLIENT_IP", "192.0.2.2", 1);
         dropForwardedFor();
-        EXPECT_EQ(getenv("HTTP_X_FORWARDED_FOR") != nullptr, request.kept) << request.proxies << " " << request.peer;
-        EXPECT_EQ(getenv("HTTP_CLIENT_IP") != nullptr, request.kept) << request.proxies << " " << request.peer;
+        EXPECT_EQ(getenv("HTTP_X_FORWARDED_FOR") != nullptr, kept) << proxies << " " << peer;
+        EXPECT_EQ(getenv("HTTP_CLIENT_IP") != nullptr, kept) << proxies << " " << peer;
     }
     unsetenv("REMOTE_ADDR");
     unsetenv("HTTP_X_FORWARDED_FOR");

@@ -7,26 +7,23 @@ using namespace orvel::cgi;
 namespace {
 
 TEST(Text, OnlyWellFormedSequencesPass) {
-    struct {
-        std::string bytes, shown;
-    } const cases[] = {
-        {"", ""},
-        {"plain text that is longer than one word", "plain text that is longer than one word"},
-        {"\u00E9\u20AC\U0001F600 \uFFFF", "\u00E9\u20AC\U0001F600 \uFFFF"},
-        {"\xF4\x8F\xBF\xBF", "\xF4\x8F\xBF\xBF"},
-        {"eight by\xE9tes", "eight by\uFFFDtes"},
-        {"\xC0\xAF", "\uFFFD\uFFFD"},                      // overlong
-        {"\xE0\x9F\xBF", "\uFFFD\uFFFD\uFFFD"},            // overlong
-        {"\xF0\x8F\xBF\xBF", "\uFFFD\uFFFD\uFFFD\uFFFD"},  // overlong
-        {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD"},            // surrogate
-        {"\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD"},  // above U+10FFFF
-        {"\xE2\x82", "\uFFFD\uFFFD"},                      // cut short
-        {"\xE2\x82z", "\uFFFD\uFFFDz"},
-        {"\x80\xFF", "\uFFFD\uFFFD"},
-    };
-    for (const auto& text : cases) {
-        EXPECT_EQ(readable(text.bytes), text.shown) << text.shown;
-        EXPECT_EQ(isUtf8(text.bytes), text.bytes == text.shown) << text.shown;
+    for (const auto& [bytes, shown] : Rows<std::string, std::string>{
+             {"", ""},
+             {"plain text that is longer than one word", "plain text that is longer than one word"},
+             {"\u00E9\u20AC\U0001F600 \uFFFF", "\u00E9\u20AC\U0001F600 \uFFFF"},
+             {"\xF4\x8F\xBF\xBF", "\xF4\x8F\xBF\xBF"},
+             {"eight by\xE9tes", "eight by\uFFFDtes"},
+             {"\xC0\xAF", "\uFFFD\uFFFD"},                      // overlong
+             {"\xE0\x9F\xBF", "\uFFFD\uFFFD\uFFFD"},            // overlong
+             {"\xF0\x8F\xBF\xBF", "\uFFFD\uFFFD\uFFFD\uFFFD"},  // overlong
+             {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD"},            // surrogate
+             {"\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD"},  // above U+10FFFF
+             {"\xE2\x82", "\uFFFD\uFFFD"},                      // cut short
+             {"\xE2\x82z", "\uFFFD\uFFFDz"},
+             {"\x80\xFF", "\uFFFD\uFFFD"},
+         }) {
+        EXPECT_EQ(readable(bytes), shown) << shown;
+        EXPECT_EQ(isUtf8(bytes), bytes == shown) << shown;
     }
 }
 
