@@ -3,15 +3,13 @@
 #include <json/json.h>
 #include <syslog.h>
 
-#include <cstdlib>
 #include <sstream>
 
-#include "fault_gate.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 
 namespace {
 
-class ActivityLog : public support::ApplianceTest {
+class ActivityLog : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -25,7 +23,7 @@ class ActivityLog : public support::ApplianceTest {
     // The entries written so far.
     static std::vector<Json::Value> entries() {
         std::vector<Json::Value> result;
-        std::istringstream log(support::readFile(systemRoot() + "/var/log/vexo/xfer.log"));
+        std::istringstream log(readFile(systemRoot() + "/var/log/vexo/xfer.log"));
         for (std::string line; std::getline(log, line);) {
             Json::Value entry;
             std::istringstream(line) >> entry;
@@ -66,23 +64,14 @@ TEST_F(ActivityLog, Entry) {
 }
 
 TEST_F(ActivityLog, Switch) {
-    struct Case {
-        const char* value;  // null: not set
-        bool on;
-    };
-    for (const Case& c : {Case{nullptr, false},
-                          {"no", false},
-                          {"yes ", false},
-                          {"", false},
-                          {"yes", true},
-                          {"Yes", true},
-                          {"YES", true}}) {
+    const Rows<const char*, bool> rows = {{nullptr, false}, {"no", false}, {"yes ", false}, {"", false},
+                                          {"yes", true},    {"Yes", true}, {"YES", true}};
+    for (const auto& [value, on] : rows) {
         writeRootFile("/etc/vexoinfo.conf",
-                      c.value == nullptr ? "" : "pexlanderxferlog=\"" + std::string(c.value) + "\"\n");
+                      value == nullptr ? "" : "pexlanderxferlog=\"" + std::string(value) + "\"\n");
         const std::size_t before = entries().size();
-        EXPECT_EQ(OrvLibDoLog("alice", "/photo/a", 0, ORVEL_ACTION_DELETE, false), c.on)
-            << (c.value ? c.value : "unset");
-        EXPECT_EQ(entries().size(), before + (c.on ? 1 : 0));
+        EXPECT_EQ(OrvLibDoLog("alice", "/photo/a", 0, ORVEL_ACTION_DELETE, false), on) << (value ? value : "unset");
+        EXPECT_EQ(entries().size(), before + (on ? 1 : 0));
     }
     // Off: the arguments are not even looked at.
     writeRootFile("/etc/vexoinfo.conf", "");
@@ -96,7 +85,7 @@ TEST_F(ActivityLog, Refusals) {
         } else {
             setenv("REMOTE_ADDR", client, 1);
         }
-        support::announceLog(" Bad parameters.");
+        announceLog(" Bad parameters.");
         EXPECT_FALSE(OrvLibDoPexlanderLog(user, path, 0, static_cast<ORVEL_ACTIONS>(action), false));
     };
     refused("", "/photo/a", "192.0.2.7", 1);
@@ -110,7 +99,7 @@ TEST_F(ActivityLog, Refusals) {
 TEST_F(ActivityLog, FailureOfTheLog) {
     vexo::gate::fail("VEXOLogKTRFMXferLog", 0x8100);
     EXPECT_FALSE(OrvLibDoPexlanderLog("alice", "/photo/a\nb", 0, ORVEL_ACTION_MKDIR, true));
-    const auto lines = support::takeLog();
+    const auto lines = takeLog();
     ASSERT_EQ(lines.size(), 1U);
     EXPECT_EQ(lines[0].priority, LOG_ERR);
     EXPECT_TRUE(lines[0].text.starts_with("orvelmisc:")) << lines[0].text;

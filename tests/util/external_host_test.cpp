@@ -1,12 +1,6 @@
 #include "orvel/external_host.h"
 
-#include <unistd.h>
-
-#include <cerrno>
-#include <cstdlib>
-
-#include "fault_gate.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "util/host_header.h"
 
 namespace {
@@ -27,7 +21,7 @@ std::string address(const char* httpHost, const char* https = nullptr) {
     return text;
 }
 
-class ExternalHost : public support::ApplianceTest {
+class ExternalHost : public ApplianceTest {
  protected:
     void TearDown() override {
         unsetenv("HTTP_HOST");
@@ -38,31 +32,27 @@ class ExternalHost : public support::ApplianceTest {
 
 TEST(HostHeader, Table) {
     const std::string longest(4095, 'h');
-    struct Case {
-        std::string text, host, port;
-    };
-    const Case cases[] = {
-        {"", "", ""},
-        {"box", "box", ""},
-        {"192.168.1.10:5000", "192.168.1.10", "5000"},
-        {"box:5000/x:1", "box", "5000"},
-        {"box/x:1", "box", ""},
-        {"box:", "box", ""},
-        {"box:/x", "box", ""},
-        {"box:1:2", "box", "1:2"},
-        {":80", "", "80"},
-        {"[fe80::1]:5000", "[fe80::1]", "5000"},
-        {"[fe80::1]", "[fe80::1]", ""},
-        {"[fe80::1]x:80", "[fe80::1]", ""},
-        {"[a/b]:80/", "[a/b]", "80"},
-        {"[fe80", "[fe80", ""},
-        {"[]]:1", "[]", ""},
-        {longest + "xx:" + longest + "yy", longest, longest},
-    };
-    for (const auto& c : cases) {
-        const auto split = orvel::splitHostHeader(c.text.c_str());
-        EXPECT_EQ(split.host, c.host) << c.text;
-        EXPECT_EQ(split.port, c.port) << c.text;
+    for (const auto& [text, host, port] : Rows<std::string, std::string, std::string>{
+             {"", "", ""},
+             {"box", "box", ""},
+             {"192.168.1.10:5000", "192.168.1.10", "5000"},
+             {"box:5000/x:1", "box", "5000"},
+             {"box/x:1", "box", ""},
+             {"box:", "box", ""},
+             {"box:/x", "box", ""},
+             {"box:1:2", "box", "1:2"},
+             {":80", "", "80"},
+             {"[fe80::1]:5000", "[fe80::1]", "5000"},
+             {"[fe80::1]", "[fe80::1]", ""},
+             {"[fe80::1]x:80", "[fe80::1]", ""},
+             {"[a/b]:80/", "[a/b]", "80"},
+             {"[fe80", "[fe80", ""},
+             {"[]]:1", "[]", ""},
+             {longest + "xx:" + longest + "yy", longest, longest},
+         }) {
+        const auto split = orvel::splitHostHeader(text.c_str());
+        EXPECT_EQ(split.host, host) << text;
+        EXPECT_EQ(split.port, port) << text;
     }
     EXPECT_EQ(orvel::splitHostHeader(nullptr).host + orvel::splitHostHeader(nullptr).port, "");
 }
@@ -108,24 +98,19 @@ TEST_F(ExternalHost, DynamicNameNotInUse) {
     writeRootFile("/etc/vexo/ddns.conf", "[acme]\nhostname=\"me.acme.example\"\n");
     const std::string on = "ddns_update=\"yes\"\n";
     const std::string select = "ddns_select=\"acme\"\n";
-    struct Case {
-        const char* supported;
-        std::string settings;
-    };
-    const Case cases[] = {
-        {"supportddns=\"no\"\n", on + select},
-        {"", on + select},
-        {"supportddns=\"Yes\"\n", on + select},  // this one is compared exactly
-        {"supportddns=\"yes\"\n", "ddns_update=\"no\"\n" + select},
-        {"supportddns=\"yes\"\n", "ddns_update=\"yesyesyes\"\n" + select},
-        {"supportddns=\"yes\"\n", select},
-        {"supportddns=\"yes\"\n", on},
-        {"supportddns=\"yes\"\n", on + "ddns_select=\"\"\n"},
-    };
-    for (const auto& c : cases) {
-        writeRootFile("/etc.defaults/vexoinfo.conf", c.supported);
-        writeRootFile("/etc/vexoinfo.conf", c.settings);
-        EXPECT_EQ(address("box:5000"), "http://box:5000") << c.supported << c.settings;
+    for (const auto& [supported, settings] : Rows<const char*, std::string>{
+             {"supportddns=\"no\"\n", on + select},
+             {"", on + select},
+             {"supportddns=\"Yes\"\n", on + select},  // this one is compared exactly
+             {"supportddns=\"yes\"\n", "ddns_update=\"no\"\n" + select},
+             {"supportddns=\"yes\"\n", "ddns_update=\"yesyesyes\"\n" + select},
+             {"supportddns=\"yes\"\n", select},
+             {"supportddns=\"yes\"\n", on},
+             {"supportddns=\"yes\"\n", on + "ddns_select=\"\"\n"},
+         }) {
+        writeRootFile("/etc.defaults/vexoinfo.conf", supported);
+        writeRootFile("/etc/vexoinfo.conf", settings);
+        EXPECT_EQ(address("box:5000"), "http://box:5000") << supported << settings;
     }
 }
 
@@ -134,20 +119,20 @@ TEST_F(ExternalHost, DynamicNameFails) {
     setSetting("ddns_update", "yes");
     setSetting("ddns_select", "ac\tme");
     vexo::gate::fail("VEXODDNSConfigGet", 0xBE00, ENOENT);
-    support::announceLog(
+    announceLog(
         " Failed to get DDNS info by select name ac\\x09me, errno=No such file or directory, vexo_error=[BE00]");
     EXPECT_EQ(address("box:5000"), "http://box:5000");
     vexo::gate::reset();
     // Reads: the external host, ddns_update, ddns_select. The port has been read before them.
     vexo::gate::fail("VLIBCFileGetKeyValue", 0x8100, EIO, 3);
-    support::announceLog(" Failed to get ddns_update of /etc/vexoinfo.conf");
+    announceLog(" Failed to get ddns_update of /etc/vexoinfo.conf");
     EXPECT_EQ(address("box:5000"), "http://box:5000");
     vexo::gate::reset();
     vexo::gate::fail("VLIBCFileGetKeyValue", 0x8100, EIO, 4);
-    support::announceLog(" Failed to get ddns_select of /etc/vexoinfo.conf");
+    announceLog(" Failed to get ddns_select of /etc/vexoinfo.conf");
     EXPECT_EQ(address("box:5000"), "http://box:5000");
     vexo::gate::reset();
-    support::announceLog(" Failed to get ddns_update of /etc/vexoinfo.conf");
+    announceLog(" Failed to get ddns_update of /etc/vexoinfo.conf");
     EXPECT_EQ(unlink((systemRoot() + "/etc/vexoinfo.conf").c_str()), 0);
     EXPECT_EQ(address("box:5000"), "http://box:5000");
 }

@@ -1,13 +1,10 @@
 #include "orvel/file_icon.h"
 
-#include <unistd.h>
-
-#include "fault_gate.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 
 namespace {
 
-class FileIcon : public support::ApplianceTest {
+class FileIcon : public ApplianceTest {
  protected:
     static std::string icon(const char* name, bool isDirectory, const std::string& path, const std::string& share) {
         std::string result = "left over";
@@ -18,9 +15,9 @@ class FileIcon : public support::ApplianceTest {
 
 TEST_F(FileIcon, Files) {
     const std::string web = systemRoot() + "/web";
-    support::writeFile(web + "/images/files_ext/pdf.png", "");
-    support::writeFile(web + "/images/files_ext/m\xC3\x84.png", "");
-    support::makeFolder(web + "/program");
+    writeFile(web + "/images/files_ext/pdf.png", "");
+    writeFile(web + "/images/files_ext/m\xC3\x84.png", "");
+    makeFolder(web + "/program");
     ASSERT_EQ(chdir((web + "/program").c_str()), 0);
     const std::pair<const char*, const char*> cases[] = {
         {"Report.PDF", "pdf.png"}, {"a.tar.pdf", "pdf.png"}, {"x.M\xC3\x84", "m\xC3\x84.png"},
@@ -38,27 +35,22 @@ TEST_F(FileIcon, Folders) {
     addMount("/photo/disk", "ext4");
     addMount("/photo/other", "fuse.something");
     addMount("/photo/#recycle", "cifs");
-    struct Case {
-        const char* path;
-        const char* share;
-        const char* expected;
-    };
-    const Case cases[] = {
-        {"/photo/iso", "/photo", "isomountpoint.png"},
-        {"/photo/nas", "", "remotemountpoint.png"},
-        {"/photo/disk", "/photo", "folder.png"},
-        {"/photo/other", "/photo", "folder.png"},
-        {"/photo/nas/below", "/photo", "folder.png"},
-        {"/photo/#recycle", "/photo", "remotemountpoint.png"},
-        {"/music/#recycle", "/music", "recycle_bin.png"},
-        {"/music/#recycle/", "music", "recycle_bin.png"},
-        {"/music/#recycle", "", "folder.png"},
-        {"/music/#recycle", "/", "folder.png"},
-        {"/music/a/#recycle", "/music/a", "folder.png"},
-        {"/music/#Recycle", "/music", "folder.png"},
-        {"", "/music", "folder.png"},
-    };
-    for (const auto& c : cases) EXPECT_EQ(icon("x", true, c.path, c.share), c.expected) << c.path << " " << c.share;
+    for (const auto& [path, share, expected] : Rows<const char*, const char*, const char*>{
+             {"/photo/iso", "/photo", "isomountpoint.png"},
+             {"/photo/nas", "", "remotemountpoint.png"},
+             {"/photo/disk", "/photo", "folder.png"},
+             {"/photo/other", "/photo", "folder.png"},
+             {"/photo/nas/below", "/photo", "folder.png"},
+             {"/photo/#recycle", "/photo", "remotemountpoint.png"},
+             {"/music/#recycle", "/music", "recycle_bin.png"},
+             {"/music/#recycle/", "music", "recycle_bin.png"},
+             {"/music/#recycle", "", "folder.png"},
+             {"/music/#recycle", "/", "folder.png"},
+             {"/music/a/#recycle", "/music/a", "folder.png"},
+             {"/music/#Recycle", "/music", "folder.png"},
+             {"", "/music", "folder.png"},
+         })
+        EXPECT_EQ(icon("x", true, path, share), expected) << path << " " << share;
     EXPECT_EQ(icon(nullptr, true, "/photo/iso", "/photo"), "misc.png");
     vexo::gate::fail("VEXOGetFSType", 0x8100);
     EXPECT_EQ(icon("iso", true, "/photo/iso", "/photo"), "folder.png");
