@@ -66,7 +66,7 @@ Statement prepare(sqlite3* database, const std::string& sql, const std::vector<s
     Statement statement(made);
     for (size_t i = 0; statement != nullptr && i < values.size(); ++i) {
         sqlite3_bind_text(made, static_cast<int>(i + 1), values[i].data(), static_cast<int>(values[i].size()),
-                          SQLITE_STATIC);
+                          SQLITE_TRANSIENT);
     }
     return statement;
 }

@@ -39,7 +39,10 @@ void writeSystem(const std::string& folder, const std::string& tag, const Record
     appliance::writeNew(folder + "/etc/vexoinfo.conf",
                         "userhome_enable=\"yes\"\nadmin_group=\"administrators\"\nsession_timeout=\"60\"\n", 0644);
     appliance::writeNew(folder + "/etc.defaults/vexoinfo.conf", "support_s2s=\"yes\"\n", 0644);
-    fs::create_directories(folder + "/run");
+    for (const char* made : {"/run", "/tmp", "/var/lib/vexo", "/usr/vexo/etc/pexlander", "/usr/vexo/vexoman/webman"}) {
+        fs::create_directories(folder + made);
+    }
+    chmod((folder + "/tmp").c_str(), 01777);
 }
 
 void make(const std::string& folder) {

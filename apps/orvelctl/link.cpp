@@ -1,0 +1,96 @@
+#include <cstdio>
+#include <ctime>
+
+#include "arguments.h"
+#include "command.h"
+#include "link_making.h"
+#include "link_store.h"
+#include "orvel/sharing_link.h"
+
+namespace orvel::ctl {
+namespace {
+
+// A date as seconds: a number of them, or a day (2024-12-31) as its first second here. 0 for "".
+std::int64_t dateOf(const std::string& text) {
+    if (text.empty()) return 0;
+    tm day = {};
+    const char* end = strptime(text.c_str(), "%Y-%m-%d", &day);
+    if (end != nullptr && *end == '\0') {
+        day.tm_isdst = -1;
+        return mktime(&day);
+    }
+    char* rest = nullptr;
+    const long long seconds = strtoll(text.c_str(), &rest, 10);
+    if (*rest != '\0' || seconds < 0) throw UsageError(text + " is no day (2024-12-31) and no number of seconds");
+    return seconds;
+}
+
+std::string dayText(std::int64_t seconds) {
+    const auto time = static_cast<time_t>(seconds);
+    tm parts = {};
+    char text[32];
+    if (seconds == 0) return "-";
+    if (localtime_r(&time, &parts) == nullptr || strftime(text, sizeof text, "%Y-%m-%d", &parts) == 0) return "?";
+    return text;
+}
+
+const char* stateOf(const cgi::Link& link) {
+    if (!cgi::ownerIsThere(link)) return "owner gone";
+    if (OrvelLogin::IsLinkOpen(link.available, link.expires, time(nullptr))) return "open";
+    return link.available > time(nullptr) ? "not yet" : "expired";
+}
+
+int broken(const cgi::LinkStore& store) {
+    fprintf(stderr, "orvelctl: the link database: %s\n", store.error().c_str());
+    return 1;
+}
+
+int create(const std::vector<std::string>& words) {
+    const Arguments arguments(words, {"--user", "--password", "--from", "--until"}, {}, 1);
+    const cgi::LinkWish wish = {.user = arguments.required("--user"),
+                                .sid = "",
+                                .path = arguments.position(0),
+                                .password = arguments.value("--password", ""),
+                                .available = dateOf(arguments.value("--from", "")),
+                                .expires = dateOf(arguments.value("--until", ""))};
+    cgi::Link link;
+    const int code = cgi::makeLink(wish, link);
+    if (code != 0) return refused(wish.path, code);
+    printf("%s\n%s\n", link.id.c_str(), cgi::linkAddress(link.id).c_str());
+    return 0;
+}
+
+int list(const std::vector<std::string>& words) {
+    const Arguments arguments(words, {"--user"}, {}, 0);
+    std::vector<cgi::Link> links;
+    cgi::LinkStore store;
+    if (!store.list(arguments.value("--user", ""), links)) return broken(store);
+    for (const cgi::Link& link : links) {
+        printf("%s  %-10s  %-10s  %-10s  %-10s  %-8s  %s\n", link.id.c_str(), terminalText(link.owner).c_str(),
+               stateOf(link), dayText(link.available).c_str(), dayText(link.expires).c_str(),
+               link.passwordHash.empty() ? "" : "password", terminalText(link.path).c_str());
+    }
+    return 0;
+}
+
+int revoke(const std::vector<std::string>& words) {
+    const Arguments arguments(words, {"--user"}, {}, 1);
+    bool removed = false;
+    cgi::LinkStore store;
+    if (!store.remove(arguments.position(0), arguments.value("--user", ""), removed)) return broken(store);
+    if (!removed) fprintf(stderr, "orvelctl: no such link\n");
+    return removed ? 0 : 1;
+}
+
+}  // namespace
+
+int link(const std::vector<std::string>& words) {
+    if (words.empty()) throw UsageError("link takes create, list or revoke");
+    const std::vector<std::string> rest(words.begin() + 1, words.end());
+    if (words[0] == "create") return create(rest);
+    if (words[0] == "list") return list(rest);
+    if (words[0] == "revoke") return revoke(rest);
+    throw UsageError("link takes create, list or revoke");
+}
+
+}  // namespace orvel::ctl

@@ -1,0 +1,71 @@
+#include <cstdio>
+
+#include "arguments.h"
+#include "command.h"
+#include "orvel/sharing_settings.h"
+#include "vexo/settings.h"
+#include "vexo/user.h"
+
+namespace orvel::ctl {
+namespace {
+
+constexpr const char* kSettings = "/etc/vexoinfo.conf";
+constexpr const char* kChoice = "PX_SHARING_SETTING";
+
+int get(const std::string& user) {
+    const bool may = OrvLibUserPrivForSharing(user.c_str()) == 1;
+    printf("%s %s create links\n", terminalText(user).c_str(), may ? "may" : "may not");
+    return 0;
+}
+
+int list() {
+    char choice[64] = {};
+    VLIBCFileGetKeyValue(kSettings, kChoice, choice, sizeof choice, 0);
+    printf("%-12s %s\n", "setting", choice[0] == '\0' ? "everybody" : choice);
+    for (const auto& [uid, chosen] : OrvelSharing::SharingManager().getPrivileges()) {
+        VEXOUSER* record = nullptr;
+        const bool known = VEXOUserGetByUID(uid, &record) >= 0;
+        printf("%-12s %s\n", known ? terminalText(record->szName).c_str() : std::to_string(uid).c_str(),
+               chosen ? "chosen" : "not chosen");
+        VEXOUserFree(record);
+    }
+    return 0;
+}
+
+// For everybody: the setting of the appliance.
+int setForAll(const std::string& choice) {
+    const int done = choice == "everybody" ? VLIBCFileRemoveKey(kSettings, kChoice)
+                                           : VLIBCFileSetKeyValue(kSettings, kChoice, choice.c_str(), nullptr);
+    if (done != 0) fprintf(stderr, "orvelctl: %s could not be changed: %m\n", kSettings);
+    return done == 0 ? 0 : 1;
+}
+
+int setForUser(const std::string& user, const std::string& choice) {
+    if (choice != "yes" && choice != "no") throw UsageError("sharing set --user takes yes or no");
+    const bool done = OrvelSharing::SharingManager().setPrivileges({{user, choice == "yes" ? "true" : "false"}});
+    if (!done) fprintf(stderr, "orvelctl: the choice could not be stored; the system log says why\n");
+    return done ? 0 : 1;
+}
+
+int set(const std::vector<std::string>& words) {
+    const Arguments arguments(words, {"--user"}, {}, 1);
+    const std::string& choice = arguments.position(0);
+    if (arguments.has("--user")) return setForUser(arguments.required("--user"), choice);
+    if (choice != "everybody" && choice != "admin_only" && choice != "per_user") {
+        throw UsageError("sharing set takes everybody, admin_only or per_user");
+    }
+    return setForAll(choice);
+}
+
+}  // namespace
+
+int sharing(const std::vector<std::string>& words) {
+    const std::string name = words.empty() ? "" : words[0];
+    const std::vector<std::string> rest(words.empty() ? words.end() : words.begin() + 1, words.end());
+    if (name == "set") return set(rest);
+    if (name == "get") return get(Arguments(rest, {}, {}, 1).position(0));
+    if (name == "list" && rest.empty()) return list();
+    throw UsageError("sharing takes set, get or list");
+}
+
+}  // namespace orvel::ctl
