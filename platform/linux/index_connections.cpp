@@ -47,6 +47,7 @@ class Connections {
 
     Database* find(std::string_view path);
     bool close(const std::string& path);
+    void commitAll();
     void stop();
 
  private:
@@ -67,13 +68,25 @@ class Connections {
 Connections* current = nullptr;
 Connections* inherited = nullptr;  // from the parent process; kept reachable for leak checkers
 
-void forgetAfterFork() {
+// SQLite notes for the whole process which locks it holds, and a child would inherit the notes without the locks: so
+// none is held at a fork, and nobody is inside SQLite.
+void prepareFork() {
+    if (current == nullptr) return;
+    current->mutex.lock();
+    current->commitAll();
+}
+
+void goOnInParent() {
+    if (current != nullptr) current->mutex.unlock();
+}
+
+void beginAnewInChild() {
     inherited = std::exchange(current, nullptr);
 }
 
 Connections& Connections::ofThisProcess() {
     static const bool registered =
-        pthread_atfork(nullptr, nullptr, forgetAfterFork) == 0 && std::atexit(closeDatabases) == 0;
+        pthread_atfork(prepareFork, goOnInParent, beginAnewInChild) == 0 && std::atexit(closeDatabases) == 0;
     // Without either, rows could be lost or written twice.
     if (!registered) throw std::bad_alloc();
     if (current == nullptr) current = new Connections;
@@ -165,6 +178,16 @@ void Connections::commitOld() {
     }
 }
 
+// Failures are told at the next use.
+void Connections::commitAll() {
+    const KeepErrno keep;
+    const RaisedIdentity raised;
+    const QuietFailures quiet;
+    for (const auto& entry : entries_) {
+        if (!entry->database->commit()) entry->failure = QuietFailures::last();
+    }
+}
+
 void Connections::stop() {
     {
         const std::lock_guard<std::mutex> lock(mutex);
@@ -174,8 +197,7 @@ void Connections::stop() {
     if (committer_.joinable()) committer_.join();
     const std::lock_guard<std::mutex> lock(mutex);
     stopping_ = false;
-    const RaisedIdentity raised;
-    for (const auto& entry : entries_) static_cast<void>(entry->database->commit());
+    commitAll();
     entries_.clear();
 }
 

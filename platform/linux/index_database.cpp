@@ -171,8 +171,9 @@ bool Database::configure(OpenMode mode) {
     constexpr const char* common =
         "PRAGMA temp_store=MEMORY;PRAGMA secure_delete=OFF;PRAGMA cache_spill=OFF;"
         "PRAGMA cache_size=-16384;";
-    return execute(db_, common) && execute(db_, mode.ofShare ? "PRAGMA synchronous=FULL;PRAGMA mmap_size=2147418112;"
-                                                             : "PRAGMA synchronous=OFF;PRAGMA mmap_size=0;PRAGMA cell_size_check=ON;");
+    return execute(db_, common) &&
+           execute(db_, mode.ofShare ? "PRAGMA synchronous=FULL;PRAGMA mmap_size=2147418112;"
+                                     : "PRAGMA synchronous=OFF;PRAGMA mmap_size=0;PRAGMA cell_size_check=ON;");
 }
 
 bool Database::makeSchema() {

@@ -19,19 +19,19 @@
 namespace {
 
 namespace fs = std::filesystem;
-using support::Cond;
-using support::Data;
-using support::insert;
+using index_tests::Cond;
+using index_tests::Data;
+using index_tests::insert;
+using index_tests::kEverything;
+using index_tests::node;
+using index_tests::Record;
+using index_tests::Rows;
+using index_tests::select;
+using index_tests::sorted;
 using support::kAliceUid;
-using support::kEverything;
 using support::kUsersGid;
-using support::node;
-using support::Record;
-using support::Rows;
-using support::select;
-using support::sorted;
 
-class IndexFilesTest : public support::IndexTest {
+class IndexFilesTest : public index_tests::IndexTest {
  protected:
     // The error of asking for a count, 0 when that works.
     static int countError(const std::string& db) {
@@ -54,6 +54,16 @@ class IndexFilesTest : public support::IndexTest {
     }
     std::string store_ = systemRoot() + "/var/lib/vexo/index/";
 };
+
+Rows searched(const std::string& out, const Cond* cond) {
+    EXPECT_EQ(FILEIDXDBCreate(out.c_str()), 0);
+    EXPECT_EQ(
+        FILEIDXResultGetAndTableGen("photo", nullptr, cond, out.c_str(), nullptr, nullptr, nullptr, nullptr, nullptr),
+        0);
+    const Rows rows = sorted(select(out));
+    unlink(out.c_str());
+    return rows;
+}
 
 TEST_F(IndexFilesTest, WhatIsNoDatabaseOfOursIsRefused) {
     ASSERT_EQ(insert(db_, {"x"}), 0);
@@ -142,7 +152,7 @@ TEST_F(IndexFilesTest, DamagedDatabasesDoNoHarm) {
         support::writeFile(db_, bad, 0600);
         const FIQUERY query = {{{FI_COL_NAME, 0}, {}}, 1, &name, 0, 50};
         Rows rows;
-        const bool read = FILEIDXDBSelect(db_.c_str(), &query, support::collect, &rows) >= 0;
+        const bool read = FILEIDXDBSelect(db_.c_str(), &query, index_tests::collect, &rows) >= 0;
         const bool written =
             insert(db_, {"new"}) >= 0 && FILEIDXDBDel(db_.c_str(), &name) >= 0 && FILEIDXDBFlush(db_.c_str()) >= 0;
         refused += read && written ? 0 : 1;
@@ -185,42 +195,74 @@ TEST_F(IndexFilesTest, ResultsAreSeenWhileTheSearchRunsAndAfterItDies) {
     EXPECT_EQ(ask("SELECT count(*) FROM pragma_integrity_check WHERE integrity_check='ok'"), 1);
 }
 
-// Kills writers at any moment, in the middle of a commit too.
+// Kills writers at any moment, in the middle of a commit too: of results, and of an index that is searched meanwhile.
 TEST_F(IndexFilesTest, KilledWritersLeaveADatabaseThatReads) {
+    build({{"x"}});
     std::mt19937 random(11);
-    unsigned long long before = 0;
-    for (int round = 0; round < 25; ++round) {
-        const pid_t child = fork();
-        if (child == 0) {
-            for (int i = 0;; ++i) {
-                insert(db_, {.path = std::to_string(round) + "/" + std::to_string(random()) + "/n"});
-                if (i % 50 == 0) FILEIDXDBFlush(db_.c_str());
+    for (const bool ofShare : {false, true}) {
+        unsigned long long before = 0;
+        for (int round = 0; round < 25; ++round) {
+            const pid_t child = fork();
+            if (child == 0) {
+                char path[4096];
+                if (ofShare) FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path, sizeof path);
+                const std::string db = ofShare ? path : db_;
+                for (int i = 0;; ++i) {
+                    insert(db, {.path = std::to_string(round) + "/" + std::to_string(random()) + "/n"});
+                    if (i % 50 == 0) FILEIDXDBFlush(db.c_str());
+                }
             }
+            std::this_thread::sleep_for(std::chrono::milliseconds(5 + random() % 40));
+            kill(child, SIGKILL);
+            waitpid(child, nullptr, 0);
+            const auto now = ofShare ? searched(folder_ + "/out", nullptr).size() : count();
+            EXPECT_GE(now, before);
+            EXPECT_TRUE(ofShare || select(db_).size() == now);
+            before = now;
         }
-        std::this_thread::sleep_for(std::chrono::milliseconds(5 + random() % 40));
-        kill(child, SIGKILL);
-        waitpid(child, nullptr, 0);
-        const auto now = count();
-        EXPECT_GE(now, before);
-        EXPECT_EQ(select(db_).size(), now);
-        before = now;
+        EXPECT_GT(before, 1U);
     }
-    EXPECT_GT(before, 0U);
+    Cond name = node(FI_COL_NAME, FI_OP_WILDCARD, "n");
+    char path[4096];
+    ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path, sizeof path), 0);
+    EXPECT_EQ(select(path, &name).size() + 1, searched(folder_ + "/out", nullptr).size());
+    EXPECT_EQ(FILEIDXIndexEnd("photo", 1), 0);
 }
 
-TEST_F(IndexFilesTest, AForkedChildLeavesItsParentsBatchAlone) {
+// A writer that dies half-way through a large commit: its journal is played back, by readers of a share's index too.
+TEST_F(IndexFilesTest, HalfACommitIsTakenBack) {
+    std::vector<Record> records;
+    for (int i = 0; i < 3000; ++i) records.push_back({.path = "n" + std::to_string(i), .size = 1});
+    build(records);
+    for (const Record& record : records) ASSERT_EQ(insert(db_, record), 0);
+    vexo::fileindex::closeDatabases();
+    for (const std::string& file : {db_, store_ + "photo.db"}) {
+        support::inChild([&] {
+            sqlite3* db = nullptr;
+            EXPECT_EQ(sqlite3_open(file.c_str(), &db), SQLITE_OK);
+            constexpr const char* half = "PRAGMA cache_size=1;BEGIN;UPDATE record SET size=2";
+            EXPECT_EQ(sqlite3_exec(db, half, nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
+            return 0;
+        });
+        EXPECT_TRUE(fs::exists(file + "-journal"));
+    }
+    const Cond changed = node(FI_COL_SIZE, FI_OP_EQUAL, "2");
+    EXPECT_EQ(select(db_, &changed), Rows());
+    EXPECT_EQ(searched(folder_ + "/out", &changed), Rows());
+    EXPECT_EQ(searched(folder_ + "/out", nullptr).size(), records.size());
+    for (const std::string& file : {db_, store_ + "photo.db"}) EXPECT_FALSE(fs::exists(file + "-journal"));
+}
+
+TEST_F(IndexFilesTest, AForkedChildHasConnectionsOfItsOwn) {
     ASSERT_EQ(insert(db_, {"parent"}), 0);
-    EXPECT_EQ(
-        support::inChild([&] { return static_cast<int>(FILEIDXDBFlush(db_.c_str()) >= 0 && !select(db_).empty()); }),
-        0);
-    ASSERT_EQ(FILEIDXDBFlush(db_.c_str()), 0);
     EXPECT_EQ(support::inChild([&] {
-                  const bool done = insert(db_, {"child"}) == 0 && FILEIDXDBFlush(db_.c_str()) == 0;
+                  const bool done = select(db_).size() == 1 && insert(db_, {"child"}) == 0;
                   exit(done ? 5 : 1);  // through the handlers of exit
                   return 0;
               }),
               5);
-    EXPECT_EQ(sorted(select(db_)), (Rows{"photo:child", "photo:parent"}));
+    ASSERT_EQ(insert(db_, {"parent again"}), 0);
+    EXPECT_EQ(sorted(select(db_)), (Rows{"photo:child", "photo:parent", "photo:parent again"}));
 }
 
 TEST_F(IndexFilesTest, AFullDiskTakesTheBatchBackAndNothingElse) {
@@ -299,16 +341,6 @@ TEST_F(IndexFilesTest, AnIndexIsReplacedAsAWholeByOneAtATime) {
     struct stat folder {};
     ASSERT_EQ(stat(store_.c_str(), &folder), 0);
     EXPECT_EQ(folder.st_mode & 0777, 0700U);
-}
-
-Rows searched(const std::string& out, const Cond* cond) {
-    EXPECT_EQ(FILEIDXDBCreate(out.c_str()), 0);
-    EXPECT_EQ(
-        FILEIDXResultGetAndTableGen("photo", nullptr, cond, out.c_str(), nullptr, nullptr, nullptr, nullptr, nullptr),
-        0);
-    const Rows rows = sorted(select(out));
-    unlink(out.c_str());
-    return rows;
 }
 
 TEST_F(IndexFilesTest, AnUpdateKeepsNamesFindable) {

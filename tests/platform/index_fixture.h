@@ -15,7 +15,7 @@
 #include "vexo/index.h"
 #include "vexo/stat.h"
 
-namespace support {
+namespace index_tests {
 
 using Cond = __tag_FI_SQL_COND;
 using Data = __tag_FI_FILE_INFO_DATA;
@@ -104,13 +104,13 @@ inline Rows sorted(Rows rows) {
     return rows;
 }
 
-class IndexTest : public ApplianceTest {
+class IndexTest : public support::ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
         addShare("photo", "vexo:index = yes\n");
         folder_ = shareRoot("photo") + "/tasks";
-        makeFolder(folder_, 0777);
+        support::makeFolder(folder_, 0777);
         db_ = folder_ + "/results";
         ASSERT_EQ(FILEIDXDBCreate(db_.c_str()), 0);
     }
@@ -151,6 +151,6 @@ inline Cond node(int type, int op, const std::string& value, Cond* andNext = nul
     return cond;
 }
 
-}  // namespace support
+}  // namespace index_tests
 
 #endif

@@ -17,16 +17,16 @@
 
 namespace {
 
-using support::Cond;
-using support::Data;
-using support::IndexTest;
-using support::insert;
-using support::kEverything;
-using support::node;
-using support::Record;
-using support::Rows;
-using support::select;
-using support::sorted;
+using index_tests::Cond;
+using index_tests::Data;
+using index_tests::IndexTest;
+using index_tests::insert;
+using index_tests::kEverything;
+using index_tests::node;
+using index_tests::Record;
+using index_tests::Rows;
+using index_tests::select;
+using index_tests::sorted;
 
 // What walks and indexes must agree on: names of every encoding, sizes, owners, times and kinds.
 std::vector<Record> manyRecords() {
