@@ -1,27 +1,17 @@
 // The program search, run as a web server runs it, and what it finds by walking and from indexes.
 //
 // ORVEL_SEARCH_ENTRIES: how many entries the generated tree has, 2,000 without it.
-#include <fcntl.h>
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
+#include <json/value.h>
 
 #include <csignal>
-#include <cstdlib>
-#include <cstring>
-#include <filesystem>
-#include <functional>
-#include <memory>
 #include <set>
 
 #include "apps/program.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "text.h"
 #include "vexo/task.h"
 
-namespace fs = std::filesystem;
 using orvel::cgi::percentEncode;
-using support::CgiReply;
 
 namespace {
 
@@ -29,11 +19,11 @@ constexpr const char* kIndexed = "read only = no\nvexo:index = yes\n";
 constexpr const char* kProperties = "additional=size,owner,time,perm,type,real_path";
 constexpr int kPatience = 30000;  // milliseconds
 
-class SearchCgi : public support::ApplianceTest {
+class SearchCgi : public ApplianceTest {
  protected:
     static CgiReply post(const std::string& program, const std::string& user, const std::string& form) {
         return CgiReply(
-            support::runCgi(program, user, "POST", "", form, {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
+            runCgi(program, user, "POST", "", form, {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
     }
     static CgiReply ask(const std::string& user, const std::string& form) { return post(PROGRAM_SEARCH, user, form); }
     static int code(const CgiReply& reply) { return reply.json["error"]["code"].asInt(); }
@@ -44,8 +34,7 @@ class SearchCgi : public support::ApplianceTest {
         return started().back().second;
     }
     static CgiReply list(const std::string& user, const std::string& id, const std::string& more = "") {
-        return CgiReply(
-            support::runCgi(PROGRAM_SEARCH, user, "GET", "action=list&" + more + "&limit=10000&taskid=" + id));
+        return CgiReply(runCgi(PROGRAM_SEARCH, user, "GET", "action=list&" + more + "&limit=10000&taskid=" + id));
     }
     // Waits until the state of a search satisfies `ready`.
     static CgiReply await(const std::string& user, const std::string& id,
@@ -88,7 +77,7 @@ class SearchCgi : public support::ApplianceTest {
         return result;
     }
     static void index(const std::string& action, const std::string& share) {
-        EXPECT_EQ(support::runProgram({ORVELCTL, "index", action, share}).status, 0) << action << share;
+        EXPECT_EQ(runProgram({ORVELCTL, "index", action, share}).status, 0) << action << share;
     }
     static std::unique_ptr<KTR::Task> record(const std::string& user, const std::string& id) {
         return std::unique_ptr<KTR::Task>(KTR::TaskMgr(user.c_str()).getTask(("Quorvane_Search_" + id).c_str()));
@@ -113,7 +102,7 @@ class SearchCgi : public support::ApplianceTest {
 void generate(const std::string& root, int entries) {
     static constexpr const char* kNames[] = {"Alpha %d.txt", "beta_%d.JPG",     "rep*ort %d.md", "straße%d.txt",
                                              "\xFF%d.bin",   "no extension %d", "r%d.tar.gz",    "it's \"%d\".jpg"};
-    static constexpr uid_t kOwners[] = {support::kAliceUid, support::kBobUid, 0, 65000};
+    static constexpr uid_t kOwners[] = {kAliceUid, kBobUid, 0, 65000};
     std::vector<std::string> folders = {root};
     for (int i = 0; i < entries; ++i) {
         char name[64];
@@ -124,14 +113,14 @@ void generate(const std::string& root, int entries) {
             fs::create_directory(path);
             folders.push_back(path);
         } else {
-            support::writeFile(path, "");
+            writeFile(path, "");
             EXPECT_EQ(truncate(path.c_str(), i % 5 == 0 ? 4096 : i * 37), 0);
         }
-        EXPECT_EQ(chown(path.c_str(), kOwners[i % 4], i % 3 == 0 ? gid_t{support::kUsersGid} : 0), 0);
+        EXPECT_EQ(chown(path.c_str(), kOwners[i % 4], i % 3 == 0 ? gid_t{kUsersGid} : 0), 0);
         const timespec times[] = {{i % 2 == 0 ? 5000 : 50, 0}, {1000000 + i * 10, 0}};
         EXPECT_EQ(utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
     }
-    support::makeFolder(root + "/@tmp/inside alpha.txt");
+    makeFolder(root + "/@tmp/inside alpha.txt");
     fs::create_symlink("/etc", root + "/alpha.link");
     EXPECT_EQ(mkfifo((root + "/alpha.fifo").c_str(), 0666), 0);
 }
@@ -175,8 +164,8 @@ std::vector<Query> singleQueries() {
          [](const File& f) { return f.name.starts_with("straße") || (f.contains("beta_1") && f.name.size() == 11); }},
         {"type=dir", [](const File& f) { return f.isFolder(); }},
         {"extension=txt,GZ", [](const File& f) { return !f.isFolder() && (f.endsWith(".txt") || f.endsWith(".gz")); }},
-        {"owner=alice", [](const File& f) { return f.status.st_uid == support::kAliceUid; }},
-        {"group=users", [](const File& f) { return f.status.st_gid == support::kUsersGid; }},
+        {"owner=alice", [](const File& f) { return f.status.st_uid == kAliceUid; }},
+        {"group=users", [](const File& f) { return f.status.st_gid == kUsersGid; }},
         {"mtime_from=1004000", [](const File& f) { return f.status.st_mtime >= 1004000; }},
         {"mtime_to=1010000&mtime_from=1002000",
          [](const File& f) { return f.status.st_mtime < 1010000 && f.status.st_mtime >= 1002000; }},
@@ -211,12 +200,12 @@ TEST_F(SearchCgi, WalkAndIndexFindWhatAModelFinds) {
     const std::string root = addShare("photo", kIndexed), home = shareRoot("homes") + "/alice";
     addShare("homes", kIndexed);
     const std::string first = root + "/one/Alpha's", second = root + "/two";
-    for (const std::string& folder : {first, second, home}) support::makeFolder(folder);
-    support::makeFolder(root + "/#recycle/alpha/folder");
+    for (const std::string& folder : {first, second, home}) makeFolder(folder);
+    makeFolder(root + "/#recycle/alpha/folder");
     generate(first, entries / 2);
     generate(second, entries / 4);
     generate(home, entries / 4);
-    ASSERT_EQ(chown(home.c_str(), support::kAliceUid, support::kUsersGid), 0);
+    ASSERT_EQ(chown(home.c_str(), kAliceUid, kUsersGid), 0);
 
     struct Scope {
         std::string form;
@@ -269,12 +258,12 @@ TEST_F(SearchCgi, NobodySeesNamesOutOfHisSight) {
         mode_t mode;
     } const folders[] = {{"/open", 0755}, {"/open/secret", 0700}, {"/open/drop", 0733}, {"/open/blind", 0744}};
     for (const auto& [path, mode] : folders) {
-        support::makeFolder(root + path + "/below");
-        support::writeFile(root + path + "/f", "x");
-        support::writeFile(root + path + "/below/f", "x");
+        makeFolder(root + path + "/below");
+        writeFile(root + path + "/f", "x");
+        writeFile(root + path + "/below/f", "x");
     }
-    for (const auto& [path, mode] : folders) support::makeFolder(root + path, mode);
-    support::writeFile(shareRoot("closed") + "/f", "x");
+    for (const auto& [path, mode] : folders) makeFolder(root + path, mode);
+    writeFile(shareRoot("closed") + "/f", "x");
     const std::set<std::string> seen = {"/photo/open",         "/photo/open/f",    "/photo/open/below",
                                         "/photo/open/below/f", "/photo/open/drop", "/photo/open/secret",
                                         "/photo/open/blind"};
@@ -288,13 +277,13 @@ TEST_F(SearchCgi, NobodySeesNamesOutOfHisSight) {
 }
 
 TEST_F(SearchCgi, RequestsAreTakenStrictly) {
-    support::writeFile(shareRoot("photo") + "/file", "x");
+    writeFile(shareRoot("photo") + "/file", "x");
     fs::create_symlink("/etc", shareRoot("photo") + "/outside");
-    support::makeFolder(shareRoot("photo") + "/#recycle/folder");
+    makeFolder(shareRoot("photo") + "/#recycle/folder");
     const std::string longPattern(491, 'a');
     std::string manyPatterns = "a", manyFolders;
     for (int i = 0; i < 100; ++i) manyPatterns += ",a";
-    for (int i = 0; i < 101; ++i) manyFolders += "&path=/photo";
+    for (int i = 0; i < 501; ++i) manyFolders += "&path=/photo";
     struct {
         std::string form;
         int status, code;
@@ -348,70 +337,54 @@ TEST_F(SearchCgi, RequestsAreTakenStrictly) {
     EXPECT_EQ(ask("", "action=list&taskid=5A1F").status, 401);
     for (const std::string action : {"start", "stop", "clean"}) {
         const std::string query = "action=" + action + "&path=/photo&name=a&taskid=5A1F";
-        EXPECT_EQ(CgiReply(support::runCgi(PROGRAM_SEARCH, "alice", "GET", query)).status, 400) << action;
+        EXPECT_EQ(CgiReply(runCgi(PROGRAM_SEARCH, "alice", "GET", query)).status, 400) << action;
     }
 }
 
-// Files whose names cost so much to compare that a search among them runs until it is ended.
-class LongSearch : public SearchCgi {
- protected:
-    void SetUp() override {
-        SearchCgi::SetUp();
-        if (geteuid() != 0) return;
-        const std::string folder = shareRoot("photo") + "/many";
-        for (int i = 0; i < 3000; ++i) support::writeFile(folder + "/" + std::to_string(i) + std::string(200, 'a'), "");
-        std::string hard;
-        for (int i = 0; i < 245; ++i) hard += "*a";
-        patterns_ = "*a";
-        for (int i = 0; i < 99; ++i) patterns_ += "," + hard.substr(0, 488) + "b";
-        // What writes its results each second has some then.
-        id_ = start("alice", "path=/photo&name=" + patterns_);
-        running_ = await("alice", id_, [](const Json::Value& data) { return data["total"].asUInt() > 0; }).json["data"];
-    }
-    [[nodiscard]] pid_t worker() const { return record("alice", id_)->getWorker(); }
-
-    std::string patterns_, id_;
-    Json::Value running_;
-};
-
-TEST_F(LongSearch, ResultsAreSeenWhileItRunsAndAfterItWasStopped) {
+// Names that cost so much to compare that a search among them runs until it is ended.
+TEST_F(SearchCgi, ARunningSearchIsReadStoppedKilledAndCleaned) {
     SKIP_WITHOUT_ROOT();
-    EXPECT_FALSE(running_["finished"].asBool());
+    const std::string folder = shareRoot("photo") + "/many", names(200, 'a');
+    for (int i = 0; i < 3000; ++i) writeFile(folder + "/" + std::to_string(i) + names, "");
+    std::string hard = "b", patterns = "*a";
+    while (hard.size() < 488) hard.insert(0, "*a");
+    for (int i = 0; i < 99; ++i) patterns += "," + hard;
+    std::string id;
+    pid_t worker = 0;
+    const auto begin = [&] {
+        id = start("alice", "path=/photo&name=" + patterns);
+        const auto some = [](const Json::Value& data) { return data["total"].asUInt() > 0; };
+        const Json::Value data = await("alice", id, some).json["data"];
+        EXPECT_FALSE(data["finished"].asBool());
+        worker = record("alice", id)->getWorker();
+        EXPECT_GT(worker, 0);
+        return data["total"].asUInt();
+    };
+
+    unsigned before = begin();
     for (const std::string action : {"list", "stop", "clean"}) {
-        EXPECT_EQ(code(ask("bob", "action=" + action + "&taskid=" + id_)), 408) << "of another user";
+        EXPECT_EQ(code(ask("bob", "action=" + action + "&taskid=" + id)), 408) << "of another user";
     }
-    EXPECT_GT(worker(), 0);
-    EXPECT_TRUE(ask("alice", "action=stop&taskid=" + id_).json["data"]["finished"].asBool());
-    EXPECT_EQ(worker(), 0);
-    const Json::Value after = list("alice", id_).json["data"];
-    EXPECT_TRUE(after["finished"].asBool() && after["stopped"].asBool());
-    EXPECT_FALSE(after["failed"].asBool());
-    EXPECT_GE(after["total"].asUInt(), running_["total"].asUInt());
-    EXPECT_LT(after["total"].asUInt(), 3000U);
-    EXPECT_TRUE(ask("alice", "action=stop&taskid=" + id_).json["data"]["finished"].asBool()) << "again";
-    EXPECT_EQ(list("alice", id_, "limit=10000&offset=1").json["data"]["items"].size(), after["total"].asUInt() - 1);
-}
+    EXPECT_TRUE(ask("alice", "action=stop&taskid=" + id).json["data"]["finished"].asBool());
+    EXPECT_EQ(record("alice", id)->getWorker(), 0);
+    Json::Value after = list("alice", id, "offset=1").json["data"];
+    EXPECT_TRUE(after["finished"].asBool() && after["stopped"].asBool() && !after["failed"].asBool());
+    EXPECT_GE(after["total"].asUInt(), before);
+    EXPECT_EQ(after["items"].size(), after["total"].asUInt() - 1);
+    EXPECT_TRUE(ask("alice", "action=stop&taskid=" + id).json["data"]["finished"].asBool()) << "again";
 
-TEST_F(LongSearch, OneThatWasKilledKeepsItsResults) {
-    SKIP_WITHOUT_ROOT();
-    ASSERT_GT(worker(), 0);
-    EXPECT_EQ(kill(worker(), SIGKILL), 0);
-    const Json::Value after = finished("alice", id_).json["data"];
-    EXPECT_TRUE(after["failed"].asBool());
+    before = begin();
+    EXPECT_EQ(kill(worker, SIGKILL), 0);
+    after = finished("alice", id).json["data"];
     EXPECT_EQ(after["failure"]["code"], 401);
-    EXPECT_GE(after["total"].asUInt(), running_["total"].asUInt());
+    EXPECT_GE(after["total"].asUInt(), before);
     EXPECT_EQ(after["items"].size(), after["total"].asUInt());
-}
 
-TEST_F(LongSearch, CleaningEndsItAndLeavesNothing) {
-    SKIP_WITHOUT_ROOT();
-    const pid_t process = worker();
-    ASSERT_GT(process, 0);
-    EXPECT_TRUE(ask("alice", "action=clean&taskid=" + id_).json["success"].asBool());
-    EXPECT_FALSE(fs::exists("/proc/" + std::to_string(process) + "/exe"));
-    EXPECT_FALSE(fs::exists(database("alice", id_)) || fs::exists(database("alice", id_ + "-journal")));
-    EXPECT_EQ(record("alice", id_), nullptr);
-    EXPECT_EQ(code(list("alice", id_)), 408);
+    begin();
+    EXPECT_TRUE(ask("alice", "action=clean&taskid=" + id).json["success"].asBool());
+    EXPECT_FALSE(fs::exists("/proc/" + std::to_string(worker) + "/exe"));
+    EXPECT_FALSE(fs::exists(database("alice", id)) || fs::exists(database("alice", id + "-journal")));
+    EXPECT_EQ(record("alice", id), nullptr);
 }
 
 TEST_F(SearchCgi, SearchesOfTheDayBeforeYesterdayAreSweptAway) {
@@ -421,11 +394,11 @@ TEST_F(SearchCgi, SearchesOfTheDayBeforeYesterdayAreSweptAway) {
     finished("alice", recent);
     for (const auto& entry : fs::recursive_directory_iterator(systemRoot())) {
         if (entry.path().filename().string().find(old) == std::string::npos) continue;
-        std::string text = support::readFile(entry.path());
+        std::string text = readFile(entry.path());
         const size_t created = text.find("\"created\":");
         ASSERT_NE(created, std::string::npos);
         text.replace(created, 11, "\"created\":0");
-        support::writeFile(entry.path(), text, 0600);
+        writeFile(entry.path(), text, 0600);
     }
     EXPECT_EQ(code(list("alice", old)), 0) << "as long as nobody searches";
     finished("alice", start("alice", "path=/photo&name=a"));
@@ -436,12 +409,12 @@ TEST_F(SearchCgi, SearchesOfTheDayBeforeYesterdayAreSweptAway) {
 
 TEST_F(SearchCgi, ADatabaseThatIsNoneIsRefused) {
     SKIP_WITHOUT_ROOT();
-    for (int i = 0; i < 500; ++i) support::writeFile(shareRoot("photo") + "/" + std::to_string(i), "");
+    for (int i = 0; i < 500; ++i) writeFile(shareRoot("photo") + "/" + std::to_string(i), "");
     const std::string victim = systemRoot() + "/victim";
-    support::writeFile(victim, "victim", 0666);
+    writeFile(victim, "victim", 0666);
     const std::pair<const char*, std::function<void(const std::string&)>> cases[] = {
-        {"garbage", [](const std::string& file) { support::writeFile(file, std::string(9000, 'x')); }},
-        {"empty", [](const std::string& file) { support::writeFile(file, ""); }},
+        {"garbage", [](const std::string& file) { writeFile(file, std::string(9000, 'x')); }},
+        {"empty", [](const std::string& file) { writeFile(file, ""); }},
         {"truncated",
          [](const std::string& file) {
              EXPECT_EQ(truncate(file.c_str(), static_cast<off_t>(fs::file_size(file) / 2)), 0);
@@ -450,7 +423,7 @@ TEST_F(SearchCgi, ADatabaseThatIsNoneIsRefused) {
         {"second name", [&](const std::string& file) { fs::create_hard_link(file, file + "x"); }},
         {"fifo", [](const std::string& file) { fs::remove(file), mkfifo(file.c_str(), 0666); }},
         {"folder", [](const std::string& file) { fs::remove(file), fs::create_directory(file); }},
-        {"of another", [](const std::string& file) { EXPECT_EQ(chown(file.c_str(), support::kBobUid, 0), 0); }},
+        {"of another", [](const std::string& file) { EXPECT_EQ(chown(file.c_str(), kBobUid, 0), 0); }},
         {"gone", [](const std::string& file) { fs::remove(file); }},
     };
     for (const auto& [what, spoil] : cases) {
@@ -464,7 +437,7 @@ TEST_F(SearchCgi, ADatabaseThatIsNoneIsRefused) {
         EXPECT_TRUE(renamed.json["success"].asBool()) << "the operation itself is done: " << what;
         EXPECT_TRUE(ask("alice", "action=clean&taskid=" + id).json["success"].asBool()) << what;
     }
-    EXPECT_EQ(support::readFile(victim), "victim");
+    EXPECT_EQ(readFile(victim), "victim");
 }
 
 TEST_F(SearchCgi, ResultsFollowTheOperations) {
@@ -472,9 +445,9 @@ TEST_F(SearchCgi, ResultsFollowTheOperations) {
     const std::string root = addShare("photo", "read only = no\n"), folder = root + "/_50%*'\"",
                       twin = root + "/x50%*'\"";
     fs::create_directory_symlink("_50%*'\"", root + "/link");
-    for (int i = 0; i < 1000; ++i) support::writeFile(folder + "/deep/" + std::to_string(i) + ".txt", "abc");
-    support::writeFile(twin + "/deep/stays.txt", "abc");
-    EXPECT_EQ(support::runProgram({"/bin/chown", "-R", "20001:20100", root}).status, 0);
+    for (int i = 0; i < 1000; ++i) writeFile(folder + "/deep/" + std::to_string(i) + ".txt", "abc");
+    writeFile(twin + "/deep/stays.txt", "abc");
+    EXPECT_EQ(runProgram({"/bin/chown", "-R", "20001:20100", root}).status, 0);
     const std::string id = start("alice", "path=/photo&extension=txt");
     EXPECT_EQ(finished("alice", id).json["data"]["total"].asUInt(), 1001U);
     const auto operation = [&](const std::string& form) {
@@ -487,7 +460,7 @@ TEST_F(SearchCgi, ResultsFollowTheOperations) {
     operation("action=mkdir&path=/photo/made.txt");
     for (const std::string size : {"12345", "1234567"}) {
         const std::string query = "overwrite=overwrite&path=/photo/up.txt&taskid=" + id;
-        EXPECT_EQ(code(CgiReply(support::runCgi(PROGRAM_UPLOAD, "alice", "PUT", query, size))), 0);
+        EXPECT_EQ(code(CgiReply(runCgi(PROGRAM_UPLOAD, "alice", "PUT", query, size))), 0);
     }
     const Json::Value data = list("alice", id, "additional=size&sort_by=name&sort_direction=desc").json["data"];
     const std::string moved = "/photo/%_ renamed/new place/";

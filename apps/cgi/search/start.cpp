@@ -24,7 +24,7 @@ namespace {
 
 using FileSearch::OrvSearchWalker;
 
-constexpr size_t kMostFolders = 100;
+constexpr size_t kMostFolders = 500;
 
 struct Search {
     std::unique_ptr<OrvSearchWalker> walker;

@@ -88,6 +88,12 @@ void Indexer::writeOwnRow(Entry folder, int64_t seen) {
     rows_.insert(folder);
 }
 
+// All at once: whatever is read between two changes makes the first one wait for the disk.
+void Indexer::writeOwnRows() {
+    for (auto& [folder, seen] : compared_) writeOwnRow(std::move(folder), seen);
+    compared_.clear();
+}
+
 void Indexer::removeTree(const std::string& path, bool isFolder) {
     if (isFolder) {
         counts_.removed += rows_.removeBelow(path);
@@ -154,7 +160,7 @@ void Indexer::visit(const std::string& folder, const Row& stored, bool everythin
     if (stopped()) return;
     const bool differs = !(rows_.rowOf(own) == stored);
     if (differs) ++counts_.changed;
-    if (differs || mayChangeUnseen(timesOf(own.status), seen)) writeOwnRow(std::move(own), seen);
+    if (differs || mayChangeUnseen(timesOf(own.status), seen)) compared_.emplace_back(std::move(own), seen);
 }
 
 // Until a change could no longer fall into the second of an earlier one.
@@ -171,8 +177,9 @@ void Indexer::settle() {
             const int64_t seen = kernelClock();
             if (stopped() || files_.status(folder, own.status) != Presence::kThere || !own.isFolder()) continue;
             compare(folder);
-            if (!stopped()) writeOwnRow(std::move(own), seen);
+            if (!stopped()) compared_.emplace_back(std::move(own), seen);
         }
+        writeOwnRows();
     }
 }
 
@@ -194,6 +201,7 @@ bool Indexer::update(bool everything) {
         visit(folder, stored, everything);
         next = known_.upper_bound(folder);
     }
+    writeOwnRows();
     settle();
     return !stopped();
 }

@@ -5,6 +5,7 @@
 #include <map>
 #include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "index/index_rows.h"
@@ -48,6 +49,7 @@ class Indexer {
     void addTree(Entry top);
     void add(const Entry& entry);
     void writeOwnRow(Entry folder, int64_t seen);
+    void writeOwnRows();
     void removeTree(const std::string& path, bool isFolder);
     void compareEntry(const Entry& entry, const Row* row);
     void compare(const std::string& folder);
@@ -60,10 +62,11 @@ class Indexer {
     const int* stop_;
     Progress progress_;
     IndexCounts counts_;
-    std::map<std::string, Row> known_;  // the folders of the index
-    std::set<std::string> changed_;     // folders that did change
-    std::set<std::string> replaced_;    // all folders below these are compared
-    std::set<std::string> unsettled_;   // folders that may change without showing it
+    std::map<std::string, Row> known_;                 // the folders of the index
+    std::set<std::string> changed_;                    // folders that did change
+    std::set<std::string> replaced_;                   // all folders below these are compared
+    std::vector<std::pair<Entry, int64_t>> compared_;  // folders whose own rows are to be written, and when seen
+    std::set<std::string> unsettled_;                  // folders that may change without showing it
 };
 
 }  // namespace orvel::ctl
