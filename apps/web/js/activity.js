@@ -33,11 +33,12 @@ export class Card {
     this.onRemove = onRemove;
     this.title = h("b", {}, title);
     this.detail = h("span.detail");
+    this.note = h("span.note");
     this.bar = h("div.progress", { role: "progressbar", "aria-label": title, "aria-valuemin": 0, "aria-valuemax": 100 }, h("i"));
     this.errors = h("ul.errors", { hidden: true });
     this.picture = h("span.card-icon", {}, icon(iconName));
     this.button = iconButton("close", t("activity.cancel"), () => (this.finished ? this.remove() : onCancel()));
-    this.node = h("li.activity-card", {}, this.picture, h("div.grow", {}, this.title, this.bar, this.detail, this.errors), this.button);
+    this.node = h("li.activity-card", {}, this.picture, h("div.grow", {}, this.title, this.bar, this.detail, this.note, this.errors), this.button);
     cards.add(this);
     open = true;
     $("activity-list").prepend(this.node);
@@ -45,12 +46,13 @@ export class Card {
   }
 
   // fraction 0..1, or null while nobody knows.
-  progress(fraction, detail) {
+  progress(fraction, detail, note = "") {
     this.bar.classList.toggle("unknown", fraction === null);
     this.bar.firstChild.style.width = fraction === null ? "" : `${Math.round(fraction * 1000) / 10}%`;
     if (fraction === null) this.bar.removeAttribute("aria-valuenow");
     else this.bar.setAttribute("aria-valuenow", Math.round(fraction * 100));
     this.detail.textContent = detail;
+    this.note.textContent = note;
   }
 
   // list: {path, text}
@@ -67,6 +69,7 @@ export class Card {
     this.finished = true;
     this.node.classList.add("finished", kind);
     this.bar.hidden = true;
+    this.note.textContent = "";
     this.picture.replaceChildren(icon({ good: "check", failed: "warning", stopped: "stop" }[kind]));
     this.detail.textContent = detail;
     this.button.setAttribute("aria-label", t("activity.remove"));

@@ -40,6 +40,7 @@ export const $ = (id) => document.getElementById(id);
 
 const BIDI = { "\u202A": "LRE", "\u202B": "RLE", "\u202C": "PDF", "\u202D": "LRO", "\u202E": "RLO", "\u2066": "LRI",
   "\u2067": "RLI", "\u2068": "FSI", "\u2069": "PDI", "\u200E": "LRM", "\u200F": "RLM", "\u061C": "ALM" };
+const CONTROLS = { 7: "BEL", 8: "BS", 9: "TAB", 10: "LF", 11: "VT", 12: "FF", 13: "CR", 27: "ESC", 127: "DEL" };
 const ODD = /[\u0000-\u001F\u007F-\u009F\u202A-\u202E\u2066-\u2069\u200E\u200F\u061C\uFFFD]/u;
 const ODD_RUN = /([\u0000-\u001F\u007F-\u009F\u202A-\u202E\u2066-\u2069\u200E\u200F\u061C\uFFFD])/u;
 const PLAIN = /^[\u0020-\u024F]*$/u;
@@ -74,9 +75,7 @@ export function plainName(name) {
 function markOf(character) {
   const code = character.codePointAt(0);
   if (character === "\uFFFD") return "?";
-  if (code < 0x20) return String.fromCodePoint(0x2400 + code);
-  if (code === 0x7F) return "\u2421";
-  return BIDI[character] ?? code.toString(16).toUpperCase();
+  return CONTROLS[code] ?? BIDI[character] ?? code.toString(16).toUpperCase().padStart(2, "0");
 }
 
 export function announce(text) {

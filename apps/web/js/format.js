@@ -37,6 +37,10 @@ export function formatTime(seconds) {
   return (date.getFullYear() === new Date().getFullYear() ? near : far).format(date);
 }
 
+export function formatDay(seconds) {
+  return seconds ? dateFormats().far.format(new Date(seconds * 1000)) : "";
+}
+
 export function formatFullTime(seconds) {
   return seconds ? dateFormats().full.format(new Date(seconds * 1000)) : "";
 }

@@ -9,6 +9,7 @@ import { setupDragAndDrop } from "./dragdrop.js";
 import { on } from "./events.js";
 import { homeNode, paintVolume } from "./home.js";
 import { setupKeys } from "./keys.js";
+import "./links.js";
 import { newFolder } from "./operations.js";
 import { isSearch, normalisePlace, parentOf } from "./path.js";
 import { setupPathbar } from "./pathbar.js";

@@ -78,8 +78,11 @@ export function download(entries) {
   if (entries.length > 1 || entries[0].isFolder) toast({ text: t("download.zip", { count: entries.length }) });
 }
 
-export async function copyPath(id) {
-  const text = decode(id);
+export function copyPath(id) {
+  return copyText(decode(id), t("path.copied"));
+}
+
+export async function copyText(text, said) {
   try {
     await navigator.clipboard.writeText(text);
   } catch {
@@ -91,7 +94,7 @@ export async function copyPath(id) {
     document.execCommand("copy");
     area.remove();
   }
-  toast({ text: t("path.copied") });
+  toast({ text: said });
 }
 
 async function entryAt(id) {

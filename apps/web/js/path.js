@@ -89,6 +89,6 @@ export function idIn(object, key = "path") {
 
 // "name.tar.gz" gives ["name", ".tar.gz"]; names that begin with a dot have no extension.
 export function splitExtension(name) {
-  const match = /^(.+?)((?:\.tar)?\.[^.\s]{1,10})$/iu.exec(name);
+  const match = /^(.+?)((?:\.tar)?\.[^.\s]{1,10})$/isu.exec(name);
   return match ? [match[1], match[2]] : [name, ""];
 }

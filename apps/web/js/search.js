@@ -124,7 +124,7 @@ function closeSearch() {
 export function searchStatus(listing) {
   const { finished, stopped, shares = {} } = listing.extra ?? {};
   const ways = new Set(Object.values(shares));
-  const how = ways.size === 1 ? t(`search.by.${[...ways][0]}`) : "";
+  const how = ways.size > 0 ? t(`search.by.${ways.size > 1 ? "both" : [...ways][0]}`) : "";
   const found = t("search.found", { count: listing.total });
   if (!finished) return h("span.running", {}, h("i.spinner"), [t("search.running"), found].join(" "));
   return h("span", {}, [found, stopped && t("search.stopped"), how].filter(Boolean).join(" · "));

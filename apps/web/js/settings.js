@@ -1,6 +1,6 @@
 // Choices: light or dark, language; and the list of shortcuts.
 
-import { addCommand, allCommands, shortcutText } from "./commands.js";
+import { addCommand, allCommands, runCommand, shortcutText } from "./commands.js";
 import { dialog } from "./dialogs.js";
 import { $, h } from "./dom.js";
 import { openMenu } from "./menu.js";
@@ -36,6 +36,7 @@ export function setupSettings() {
     "-",
     ...Object.entries(LANGUAGES).map(([tag, name]) => ({ label: name, checked: tag === language, run: () => changeLanguage(tag) })),
     "-",
+    { label: t("command.links"), icon: "link", run: () => runCommand("links") },
     { label: t("command.help"), icon: "help", shortcut: "?", run: showHelp },
   ], { anchor: button }));
   $("find").addEventListener("blur", () => document.querySelector(".top").classList.remove("finding"));

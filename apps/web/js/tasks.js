@@ -103,9 +103,9 @@ function update(task) {
   card.showErrors(errors, task.errors_left_out ?? 0);
   if (!task.finished) {
     const detail = [task.items_total > 1 && t("task.items", { done: task.items_done ?? 0, count: task.items_total }),
-      task.bytes_total > 0 && t("size.of", { done: formatSize(task.bytes_done), total: formatSize(task.bytes_total) }),
-      task.current && plainName(task.current.slice(task.current.lastIndexOf("/") + 1))];
-    card.progress(task.progress > 0 || task.items_done > 0 ? task.progress : null, detail.filter(Boolean).join(" · "));
+      task.bytes_total > 0 && t("size.of", { done: formatSize(task.bytes_done), total: formatSize(task.bytes_total) })];
+    const current = task.current ? plainName(task.current.slice(task.current.lastIndexOf("/") + 1)) : "";
+    card.progress(task.progress > 0 || task.items_done > 0 ? task.progress : null, detail.filter(Boolean).join(" · "), current);
     return;
   }
   const parts = [t("task.done", { count: task.items_done ?? 0 }), task.items_skipped > 0 && t("upload.skipped", { count: task.items_skipped }),
