@@ -56,37 +56,21 @@ TEST_F(IdentityTest, AdministratorStaysRootWithTheGroupsOfItsOwn) {
 }
 
 TEST_F(IdentityTest, RefusedArguments) {
-    struct Case {
-        const char* what;
-        int (*call)();
-        int code;
-        const char* log;  // null: nothing is logged
-    };
-    const Case cases[] = {
-        {"null user", [] { return OrvLibUGIDSet("s", nullptr); }, 400, "orveluser:"},
-        {"unknown user", [] { return OrvLibUGIDSet(nullptr, "nobody-here"); }, 403,
-         "Failed to get GID for user=nobody-here"},
-        {"unknown user with a session", [] { return OrvLibUGIDSet("nosuchsession", "nobody-here"); }, 403,
-         "Failed to get GID for user=nobody-here, sid=nosuchsession"},
-        {"gid: null user", [] { return OrvLibEGIDSet("s", nullptr, 1); }, 400, "bad parameter"},
-        {"gid: nothing known", [] { return OrvLibEGIDSet(nullptr, "alice", static_cast<gid_t>(-1)); }, 400,
-         "bad parameter"},
-        {"gid: unknown session", [] { return OrvLibEGIDSet("nosuchsession", "alice", static_cast<gid_t>(-1)); }, 401,
-         nullptr},
-        {"uid: null user", [] { return OrvLibEUIDSet("s", nullptr, 1); }, 400, "bad parameter"},
-        {"uid: nothing known", [] { return OrvLibEUIDSet(nullptr, "alice", static_cast<uid_t>(-1)); }, 400,
-         "bad parameter"},
-        {"uid: unknown user", [] { return OrvLibEUIDSet(nullptr, "nobody-here", 1); }, 401,
-         "VEXOGroupIsAdminGroupMem(nobody-here) failed. [0x1D00 "},
-        {"uid: unknown session", [] { return OrvLibEUIDSet("nosuchsession", "alice", static_cast<uid_t>(-1)); }, 401,
-         nullptr},
-    };
-    for (const auto& test : cases) {
-        SCOPED_TRACE(test.what);
+    for (const auto& [code, log, call] : Rows<int, std::string, std::function<int()>>{
+             {400, "orveluser:", [] { return OrvLibUGIDSet("s", nullptr); }},
+             {403, "Failed to get GID for user=nobody-here", [] { return OrvLibUGIDSet(nullptr, "nobody-here"); }},
+             {403, "user=nobody-here, sid=none", [] { return OrvLibUGIDSet("none", "nobody-here"); }},
+             {400, "bad parameter", [] { return OrvLibEGIDSet("s", nullptr, 1); }},
+             {400, "bad parameter", [] { return OrvLibEGIDSet(nullptr, "alice", static_cast<gid_t>(-1)); }},
+             {401, "", [] { return OrvLibEGIDSet("none", "alice", static_cast<gid_t>(-1)); }},
+             {400, "bad parameter", [] { return OrvLibEUIDSet("s", nullptr, 1); }},
+             {400, "bad parameter", [] { return OrvLibEUIDSet(nullptr, "alice", static_cast<uid_t>(-1)); }},
+             {401, "(nobody-here) failed. [0x1D00 ", [] { return OrvLibEUIDSet(nullptr, "nobody-here", 1); }},
+             {401, "", [] { return OrvLibEUIDSet("none", "alice", static_cast<uid_t>(-1)); }}}) {
         OrvLibSetErr(0);
-        if (test.log != nullptr) announceLog(test.log);
-        EXPECT_EQ(test.call(), -1);
-        EXPECT_EQ(OrvLibGetErr(), test.code);
+        if (!log.empty()) announceLog(log);
+        EXPECT_EQ(call(), -1);
+        EXPECT_EQ(OrvLibGetErr(), code) << log;
     }
 }
 
