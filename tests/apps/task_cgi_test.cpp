@@ -274,6 +274,8 @@ TEST_F(TaskCgi, SourcesAndTargetsAreJudged) {
         {"alice", "action=copy&path=/photo&target=/video", 0, "/photo 400\n"},
         {"alice", "action=copy&path=/locked/f&target=/video", 0, "/locked/f 407\n"},
         {"alice", "action=copy&path=/fixed/f&target=/video", 0, ""},
+        {"alice", "action=copy&path=/photo/a/&target=/home", 0, ""},
+        {"carol", "action=copy&path=/photo/case/&path=/photo/out&target=/home", 0, ""},
         {"alice", "action=move&path=/fixed/f&target=/video", 0, "/fixed/f 407\n"},
         {"alice", "action=delete&path=/fixed/f", 0, "/fixed/f 407\n"},
         {"bob", "action=delete&path=/photo/a/b/f", 0, "/photo/a/b/f 407\n"},
@@ -290,6 +292,12 @@ TEST_F(TaskCgi, SourcesAndTargetsAreJudged) {
         }
     }
     EXPECT_EQ(readFile(photo_ + "/a (2)/b/f"), "1");
+    EXPECT_EQ(readFile(shareRoot("homes") + "/alice/a/b/f"), "1");
+    for (const char* made : {"/case", "/case/name", "/out"}) {
+        struct stat status {};
+        EXPECT_EQ(lstat((shareRoot("homes") + "/carol" + made).c_str(), &status), 0);
+        EXPECT_EQ(status.st_uid, support::kCarolUid) << made << ": not root's";
+    }
     EXPECT_EQ(readFile(fat + "/case/Name"), "/case/Name");
     for (const char* form : {"action=copy&target=/video", "action=copy&path=/photo/a&target=/video&taskid=../x",
                              "action=copy&path_raw=%25zz&target=/video"}) {
@@ -500,6 +508,7 @@ TEST_F(TaskCgi, WhatIsDeletedCanBePutBack) {
 
     EXPECT_EQ(remove({"/photo/a/b/f.txt", "/photo/a/g"}), "");
     EXPECT_EQ(remove({"/photo/#recycle/a/g"}), "") << "what is in the bin goes for good";
+    EXPECT_EQ(remove({"/photo/#recycle"}), "/photo/#recycle 407\n");
     EXPECT_EQ(remove({"/photo/a"}, "&permanent=true"), "");
     EXPECT_FALSE(fs::exists(photo_ + "/a") || fs::exists(bin + "/a/g"));
     writeFile(bin + "/root's/f", "x");
@@ -520,11 +529,16 @@ struct Packed {
     bool hard = false;
 };
 
-void pack(const std::string& path, const char* format, const char* filter, const std::vector<Packed>& members) {
+void pack(const std::string& path, const char* format, const char* filter, const std::vector<Packed>& members,
+          const char* password = nullptr) {
     archive* out = archive_write_new();
     ASSERT_EQ(archive_write_set_format_by_name(out, format), ARCHIVE_OK);
     if (filter != nullptr) {
         ASSERT_EQ(archive_write_add_filter_by_name(out, filter), ARCHIVE_OK);
+    }
+    if (password != nullptr) {
+        ASSERT_EQ(archive_write_set_options(out, "zip:encryption=zipcrypt"), ARCHIVE_OK);
+        ASSERT_EQ(archive_write_set_passphrase(out, password), ARCHIVE_OK);
     }
     ASSERT_EQ(archive_write_open_filename(out, path.c_str()), ARCHIVE_OK);
     for (const Packed& member : members) {
@@ -611,6 +625,7 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
     for (const char* name : {"/torn.tar.xz", "/cut.zip"}) {
         ASSERT_EQ(truncate((video_ + name).c_str(), static_cast<off_t>(fs::file_size(video_ + name) * 3 / 4)), 0);
     }
+    pack(video_ + "/secret.zip", "zip", nullptr, {{"hidden", AE_IFREG, "1"}}, "password");
     writeFile(video_ + "/none.zip", "no archive at all");
     writeFile(video_ + "/empty.zip", "");
     const auto extract = [](const std::string& name) {
@@ -623,6 +638,7 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
         EXPECT_EQ(extract("huge.zip"), "/video/t/zeros 1007\n/video/huge.zip 1007\n");
     }
     EXPECT_EQ(extract("good.zip"), "");
+    EXPECT_EQ(extract("secret.zip"), "/video/t/hidden 1403\n");
     EXPECT_EQ(extract("none.zip"), "/video/none.zip 1401\n");
     EXPECT_EQ(extract("empty.zip"), "/video/empty.zip 1401\n");
     EXPECT_NE(extract("torn.tar.xz").find("/video/torn.tar.xz 1402"), std::string::npos);

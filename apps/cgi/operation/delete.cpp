@@ -12,14 +12,22 @@ namespace {
 // The bin that takes the item; nothing when it is to be removed for good.
 std::optional<RecycleBin> binFor(const Item& item, bool permanent) {
     auto bin = permanent ? std::nullopt : RecycleBin::of(item.info);
-    if (bin && (bin->is(item) || bin->holds(item))) bin.reset();
+    if (bin && bin->holds(item)) bin.reset();
     return bin;
+}
+
+// The bin itself goes only when that is asked for.
+int openItemToDelete(const Operation& operation, const std::string& path, bool permanent, Item& item) {
+    const int code = openItem(operation.user, path, {Need::kModify}, item);
+    if (code != ORV_ERR_NONE || permanent) return code;
+    const auto bin = RecycleBin::of(item.info);
+    return bin && bin->is(item) ? ORV_ERR_DENIED : ORV_ERR_NONE;
 }
 
 void expectAll(const Operation& operation, bool permanent, Progress& progress) {
     for (const std::string& path : operation.paths) {
         Item item;
-        const bool found = !progress.stopped() && openItem(operation.user, path, {Need::kModify}, item) == 0;
+        const bool found = !progress.stopped() && openItemToDelete(operation, path, permanent, item) == 0;
         if (found && !binFor(item, permanent)) {
             measure(item, progress);
         } else {
@@ -50,7 +58,7 @@ void run(const Operation& operation, bool permanent, Progress& progress) {
     for (const std::string& path : operation.paths) {
         if (progress.stopped()) return;
         Item item;
-        const int code = openItem(operation.user, path, {Need::kModify}, item);
+        const int code = openItemToDelete(operation, path, permanent, item);
         if (code != ORV_ERR_NONE) {
             progress.failed(path, code);
             continue;

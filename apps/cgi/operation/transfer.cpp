@@ -21,6 +21,7 @@ namespace orvel::cgi {
 namespace {
 
 constexpr int kMostNumbers = 9999;
+constexpr int kDeepest = 1000;
 constexpr mode_t kUntilFilled = 0700;
 
 int codeOfCopy() {
@@ -75,7 +76,8 @@ bool Transfer::run(const Item& from, Entry& to) {
 Transfer::Result Transfer::place(const Entry& from, const struct stat& status, Entry& to, Names& taken) {
     if (progress_.stopped()) return Result::kFailed;
     progress_.begin(from.path);
-    if (to.path.size() >= PATH_MAX) return failed(from, ORV_ERR_LONG_PATH);
+    // Nothing could be asked for by a longer path; each level costs two descriptors and some of the stack.
+    if (to.path.size() >= PATH_MAX || depth_ == kDeepest) return failed(from, ORV_ERR_LONG_PATH);
     // One of two names that are one there would replace the other, or mix with it.
     if (rules_.onFat && !taken.insert(to.name).second && rules_.conflict != Conflict::kKeepBoth) {
         return failed(from, ORV_ERR_EXISTS);
@@ -208,7 +210,9 @@ Transfer::Result Transfer::fill(const Entry& from, const struct stat& status, co
     if (!topTarget_) topTarget_ = inside;
     // The tree may lie in itself by way of a mount.
     if (isSame(status, *topTarget_)) return failed(from, ORV_ERR_SELECT_CONFLICT);
+    ++depth_;
     const bool all = fillFrom(from, source, to, target);
+    --depth_;
     if (made) makeAlike(target, status);
     if (progress_.stopped()) return Result::kFailed;
     if (!all && rules_.move) {

@@ -64,6 +64,7 @@ class Transfer {
     const Item* top_ = nullptr;             // of the run
     std::optional<struct stat> topTarget_;  // the folder that it becomes
     bool renaming_ = false;                 // no rename of this run met another file system yet
+    int depth_ = 0;
     long long bytes_ = 0;
 };
 

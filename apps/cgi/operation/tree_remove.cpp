@@ -17,25 +17,27 @@ bool failed(const Entry& entry, Progress& progress, int error) {
     return false;
 }
 
-void removeQuietly(int folder, const std::string& name) {
-    if (unlinkat(folder, name.c_str(), 0) == 0) return;
+constexpr int kDeepest = 3000;  // each level costs a descriptor and some of the stack
+
+void removeQuietly(int folder, const std::string& name, int depth) {
+    if (unlinkat(folder, name.c_str(), 0) == 0 || depth == kDeepest) return;
     const Descriptor inside(openat(folder, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     std::vector<std::string> names;
     if (!inside || !namesIn(inside.get(), Hidden::kInclude, names)) return;
-    for (const std::string& child : names) removeQuietly(inside.get(), child);
+    for (const std::string& child : names) removeQuietly(inside.get(), child, depth + 1);
     unlinkat(folder, name.c_str(), AT_REMOVEDIR);
 }
 
-bool removeIn(const Entry& entry, dev_t device, Progress& progress);
+bool removeIn(const Entry& entry, dev_t device, int depth, Progress& progress);
 
 // Everything in the folder. Errors are reported for each item in it.
-bool emptyFolder(const Entry& entry, dev_t device, Progress& progress) {
+bool emptyFolder(const Entry& entry, dev_t device, int depth, Progress& progress) {
     const Descriptor folder(openat(entry.folder, entry.name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     struct stat status {};
     std::vector<std::string> names;
     if (!folder || fstat(folder.get(), &status) != 0) return failed(entry, progress, errno);
-    if (status.st_dev != device) {
-        progress.failed(entry.path, ORV_ERR_MOUNT_BUSY);
+    if (status.st_dev != device || depth == kDeepest) {
+        progress.failed(entry.path, depth == kDeepest ? ORV_ERR_LONG_PATH : ORV_ERR_MOUNT_BUSY);
         return false;
     }
     if (!namesIn(folder.get(), Hidden::kInclude, names)) return failed(entry, progress, errno);
@@ -43,22 +45,22 @@ bool emptyFolder(const Entry& entry, dev_t device, Progress& progress) {
     for (const std::string& name : names) {
         if (progress.stopped()) return false;
         if (VEXOEAIsHiddenFile(name.c_str()) != 0) {
-            removeQuietly(folder.get(), name);
+            removeQuietly(folder.get(), name, depth);
         } else {
-            all = removeIn(entry.child(folder.get(), name), device, progress) && all;
+            all = removeIn(entry.child(folder.get(), name), device, depth + 1, progress) && all;
         }
     }
     return all;
 }
 
-bool removeIn(const Entry& entry, dev_t device, Progress& progress) {
+bool removeIn(const Entry& entry, dev_t device, int depth, Progress& progress) {
     progress.begin(entry.path);
     struct stat status {};
     if (fstatat(entry.folder, entry.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
         return failed(entry, progress, errno);
     }
     const bool isFolder = S_ISDIR(status.st_mode);
-    if (isFolder && !emptyFolder(entry, device, progress)) return false;
+    if (isFolder && !emptyFolder(entry, device, depth, progress)) return false;
     if (unlinkat(entry.folder, entry.name.c_str(), isFolder ? AT_REMOVEDIR : 0) != 0) {
         return failed(entry, progress, errno);
     }
@@ -74,7 +76,7 @@ bool removeTree(const Entry& entry, Progress& progress) {
     if (fstatat(entry.folder, entry.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
         return failed(entry, progress, errno);
     }
-    return removeIn(entry, status.st_dev, progress);
+    return removeIn(entry, status.st_dev, 0, progress);
 }
 
 void removeHidden(const Entry& entry) {
@@ -82,7 +84,7 @@ void removeHidden(const Entry& entry) {
     std::vector<std::string> names;
     if (!folder || !namesIn(folder.get(), Hidden::kInclude, names)) return;
     for (const std::string& name : names) {
-        if (VEXOEAIsHiddenFile(name.c_str()) != 0) removeQuietly(folder.get(), name);
+        if (VEXOEAIsHiddenFile(name.c_str()) != 0) removeQuietly(folder.get(), name, 0);
     }
 }
 
