@@ -14,6 +14,7 @@
 
 #include "platform/planted_files.h"
 #include "platform/private_mounts.h"
+#include "platform/refuse_calls.h"
 #include "settings_file.h"
 #include "settings_text.h"
 #include "vexo/settings.h"
@@ -106,6 +107,13 @@ TEST_F(SettingsChangeTest, TheFileKeepsItsInodeAndUnfinishedChangesAreEnded) {
     EXPECT_EQ(readFile(file_), "b=\"true\"\n");
     EXPECT_FAILS(VLIBCFileSetKeyValue("/none/x.conf", "a", "1", kFormat), ENOENT, VEXO_ERR_FILE);
 
+    // A writer that the disk leaves in the lurch has announced its change before.
+    inChild([] {
+        if (!refuseCalls({{SYS_pwrite64, EIO}})) return 0;
+        EXPECT_FAILS(VLIBCFileSetKeyValue(kFile, "b", "false", kFormat), EIO, VEXO_ERR_GENERAL);
+        EXPECT_TRUE(fs::exists(VEXO::SystemPath(kFile) + ".pending"));
+        return 0;
+    });
     // A change that its writer did not live to make is there for readers, is made by the next writer, and gives way to
     // whoever wrote the file in another way since.
     const std::string change = vexo::buildPendingChange("b=\"true\"\n", "c=\"1\"\n");
