@@ -74,9 +74,8 @@ class Index : public ApplianceTest {
     static int broken(const std::vector<std::string>& words, int signal, useconds_t after) {
         std::vector<std::string> texts = {ORVELCTL};
         texts.insert(texts.end(), words.begin(), words.end());
-        std::vector<char*> list;
-        for (std::string& text : texts) list.push_back(text.data());
-        list.push_back(nullptr);
+        std::vector<char*> list(texts.size() + 1);
+        std::transform(texts.begin(), texts.end(), list.begin(), [](std::string& text) { return text.data(); });
         pid_t child = 0;
         EXPECT_EQ(posix_spawn(&child, ORVELCTL, nullptr, nullptr, list.data(), environ), 0);
         usleep(after);

@@ -22,15 +22,18 @@
 namespace orvel::cgi {
 namespace {
 
+using FileSearch::OrvSearchDBTask;
 using FileSearch::OrvSearchWalker;
 
 constexpr size_t kMostFolders = 500;
 
 struct Search {
-    std::unique_ptr<OrvSearchWalker> walker;
-    std::unique_ptr<KTR::Task> record;
-    std::string database;
+    Search(const User& user, const Criteria& asked)
+        : walker(user.name.c_str(), user.sid.empty() ? nullptr : user.sid.c_str(), stopFlag()), criteria(asked) {}
+
+    OrvSearchWalker walker;
     const Criteria& criteria;
+    std::unique_ptr<KTR::Task> record;
     Descriptor ready;  // closed once the background process has noted itself
 };
 
@@ -40,7 +43,7 @@ int run(void* arg) {
     if (!search.record->attach()) return 1;
     search.ready = Descriptor();
     VLIBCErrSetEx(0, __FILE__, __LINE__);
-    int code = search.walker->Walk(search.criteria.accessTimes()) ? ORV_ERR_NONE : platformCode();
+    int code = search.walker.Walk(search.criteria.accessTimes()) ? ORV_ERR_NONE : platformCode();
     // Records that could not be stored do not end a walk; only the platform's last error tells of them.
     const int last = VLIBCErrGet();
     const bool lost = last == VEXO_ERR_NO_SPACE || last == VEXO_ERR_QUOTA || last == VEXO_ERR_READ_ONLY;
@@ -61,11 +64,11 @@ Json::Value waysOf(const std::vector<std::string>& folders) {
 }
 
 bool note(Search& search, const std::vector<std::string>& folders, const User& user) {
-    search.record = makeRecord(user.name, search.walker->getDBTaskId());
+    search.record = makeRecord(user.name, search.walker.getDBTaskId());
     if (search.record == nullptr) return false;
     KTR::Task& record = *search.record;
     if (!record.beginUpdate()) return false;
-    record.setProperty(kVolumeProperty, search.walker->getDBVol());
+    record.setProperty(kVolumeProperty, search.walker.getDBVol());
     record.setProperty(kSharesProperty, waysOf(folders));
     return record.endUpdate();
 }
@@ -86,18 +89,15 @@ int launch(Search& search) {
 
 int beginSearch(const User& user, const std::vector<std::string>& folders, bool recursive, const Criteria& criteria,
                 std::string& id) {
-    Search search = {
-        std::make_unique<OrvSearchWalker>(user.name.c_str(), user.sid.empty() ? nullptr : user.sid.c_str(), stopFlag()),
-        nullptr, "", criteria, Descriptor()};
-    search.walker->setSearchCurrentDir(!recursive);
-    if (!search.walker->init(folders, criteria.list())) return platformCode();
-    id = search.walker->getDBTaskId();
-    const std::string volume = search.walker->getDBVol();
-    search.database = FileSearch::OrvSearchDBTask::getDBTaskFilePath(volume.c_str(), user.name.c_str(), id.c_str());
+    Search search(user, criteria);
+    search.walker.setSearchCurrentDir(!recursive);
+    if (!search.walker.init(folders, criteria.list())) return platformCode();
+    id = search.walker.getDBTaskId();
+    const std::string volume = search.walker.getDBVol();
     int code = note(search, folders, user) ? ORV_ERR_NONE : platformCode();
     if (code == ORV_ERR_NONE) code = launch(search);
     if (code == ORV_ERR_NONE) return code;
-    unlink(search.database.c_str());
+    unlink(OrvSearchDBTask::getDBTaskFilePath(volume.c_str(), user.name.c_str(), id.c_str()).c_str());
     if (search.record != nullptr) search.record->remove();
     return code;
 }
