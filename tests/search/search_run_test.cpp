@@ -4,6 +4,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <csignal>
 #include <filesystem>
 #include <string>
@@ -170,18 +171,18 @@ TEST_F(SearchRunTest, CancelLeavesTheResultsSoFar) {
         int seen;  // entries that were looked at
     };
     // 1 ends the walk at once; any other value ends the search behind the folder that is being walked.
-    const Case cases[] = {{0, 1, 0}, {0, 7, 0}, {1, 1, 1}, {1, 2, 2}, {2, 1, 2}, {4, 1, 4}, {4, 2, 6}, {99, 1, 6}};
+    const Case cases[] = {{0, 1, 0}, {0, 7, 0}, {1, 1, 1}, {1, 2, 2}, {3, 2, 3}, {4, 1, 4}, {4, 2, 7}, {99, 1, 7}};
     inOwnProcess([&] {
         for (const Case& test : cases) {
             SCOPED_TRACE(std::to_string(test.raisedAt) + ":" + std::to_string(test.value));
             int* flag = nullptr;
             Probe probe([&](int seen) { *flag = seen == test.raisedAt ? test.value : *flag; });
-            OneSearch run("alice", {"/photo", "/docs"}, probe.alone);
+            OneSearch run("alice", {"/photo/b", "/photo", "/docs"}, probe.alone);
             flag = &run.flag;
             if (test.raisedAt == 0) run.flag = test.value;
             EXPECT_TRUE(run.walker.Walk({}));
             EXPECT_EQ(probe.seen, test.seen);
-            EXPECT_EQ(rowsOf(run.task).size(), static_cast<size_t>(test.seen));
+            EXPECT_EQ(rowsOf(run.task).size(), std::min<size_t>(probe.seen, 6)) << "one of them was met twice";
         }
     });
 }

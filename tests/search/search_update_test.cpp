@@ -30,6 +30,11 @@ class SearchUpdateTest : public SearchFixture {
     void move(const std::string& fromShare, const std::string& from, const std::string& toShare,
               const std::string& to) {
         fs::rename(from, to);
+        // To another file system it is a copy, with a status of its own.
+        std::error_code isFile;
+        for (const auto& entry : fs::recursive_directory_iterator(to, isFile)) {
+            if (entry.is_regular_file()) chmod(entry.path().c_str(), 0640);
+        }
         auto status = statusOf(to);
         EXPECT_TRUE(screen_->updateFile(fromShare, from, toShare, to, status));
         EXPECT_TRUE(screen_->updateFileInFolder(fromShare, from, toShare, to));
