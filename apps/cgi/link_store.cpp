@@ -26,7 +26,7 @@ namespace {
 
 constexpr const char* kFile = "/usr/vexo/etc/pexlander/pxsharing.db";
 constexpr const char* kProgram = "/cgi-bin/share?FOLDER_SHARING=";
-constexpr int kBusyMilliseconds = 10000;
+constexpr int kBusyMilliseconds = 4000;
 constexpr size_t kIdBytes = 16;
 
 // The library reads the first seven columns by these names.
@@ -188,12 +188,14 @@ bool LinkStore::remove(const std::string& id, const std::string& owner, bool& re
 
 std::string hashPassword(const std::string& password) {
     const char* setting = crypt_gensalt("$y$", 0, nullptr, 0);
-    const char* hash = setting == nullptr ? nullptr : crypt(password.c_str(), setting);
+    crypt_data work = {};
+    const char* hash = setting == nullptr ? nullptr : crypt_rn(password.c_str(), setting, &work, sizeof work);
     return hash == nullptr || hash[0] == '*' ? "" : hash;
 }
 
 bool passwordMatches(const std::string& password, const std::string& hash) {
-    const char* made = crypt(password.c_str(), hash.c_str());
+    crypt_data work = {};
+    const char* made = crypt_rn(password.c_str(), hash.c_str(), &work, sizeof work);
     if (made == nullptr || made[0] == '*' || std::strlen(made) != hash.size()) return false;
     unsigned char difference = 0;
     for (size_t i = 0; i < hash.size(); ++i) difference |= static_cast<unsigned char>(made[i] ^ hash[i]);

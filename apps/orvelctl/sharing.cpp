@@ -1,9 +1,14 @@
+#include <fcntl.h>
+#include <sys/file.h>
+
 #include <cstdio>
 
 #include "arguments.h"
 #include "command.h"
+#include "descriptor.h"
 #include "orvel/sharing_settings.h"
 #include "vexo/settings.h"
+#include "vexo/system_root.h"
 #include "vexo/user.h"
 
 namespace orvel::ctl {
@@ -32,8 +37,10 @@ int list() {
     return 0;
 }
 
-// For everybody: the setting of the appliance.
+// For everybody: the setting of the appliance, locked as every change of it is.
 int setForAll(const std::string& choice) {
+    const cgi::Descriptor file(open(VEXO::SystemPath(kSettings).c_str(), O_RDWR | O_CLOEXEC | O_NOFOLLOW));
+    if (file) flock(file.get(), LOCK_EX);
     const int done = choice == "everybody" ? VLIBCFileRemoveKey(kSettings, kChoice)
                                            : VLIBCFileSetKeyValue(kSettings, kChoice, choice.c_str(), nullptr);
     if (done != 0) fprintf(stderr, "orvelctl: %s could not be changed: %m\n", kSettings);

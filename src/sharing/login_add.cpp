@@ -53,7 +53,8 @@ bool draw(const std::string& key, Drawn& drawn) {
     drawn.uptime = system.uptime;
     srand(static_cast<unsigned>(system.uptime));
     const char salt[] = {VEXOUserRandomNumMap2Seed(system.uptime), VEXOUserRandomNumMap2Seed(rand()), '\0'};
-    const char* session = crypt(key.c_str(), salt);
+    crypt_data work = {};
+    const char* session = crypt_rn(key.c_str(), salt, &work, sizeof work);
     if (session == nullptr || session[0] == '*') return false;
     drawn.session = session;
     return true;
