@@ -66,6 +66,7 @@ bool readLink(PVEXODBRESULT result, time_t now, std::string& path) {
         syslog(LOG_ERR, "%s:%d faild to fetch query result", kSource, __LINE__);
         return false;
     }
+    VEXODBFetchField(result, row, "uid");  // kept: fetched twice, and the second answer counts
     if (VEXODBFetchField(result, row, "uid") == nullptr) {
         syslog(LOG_ERR, "%s:%d faild to fetch uid", kSource, __LINE__);
         return false;

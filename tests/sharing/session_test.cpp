@@ -190,7 +190,8 @@ TEST_F(SessionTest, RefusedBeforeAnyRecordIsRead) {
 }
 
 TEST_F(SessionTest, PlantedFiles) {
-    const std::string record = path(orvel::kRecordFile), temporary = path(orvel::kRecordTemporary);
+    const std::string record = path(orvel::kRecordFile), temporary = path(orvel::kRecordTemporary),
+                      lock = path(orvel::kRecordLock);
     const std::string victim = path("/etc/victim"), good = "10.0.0.5,alice,s1,5,99999,1,0,L\n";
     support::writeFile(victim, good);
     const auto plants = std::vector<std::pair<const char*, std::function<void(const std::string&)>>>{
@@ -220,9 +221,12 @@ TEST_F(SessionTest, PlantedFiles) {
         struct stat status = {};
         EXPECT_EQ(lstat(record.c_str(), &status), 0);
         EXPECT_TRUE(S_ISREG(status.st_mode) && (status.st_mode & 07777) == 0600 && status.st_nlink == 1);
+        fs::remove(lock);
+        plant(lock);
+        announceLog("VexoCgiBeginCriticalSection Failed.");
+        EXPECT_EQ(check(), -2);
         EXPECT_EQ(readFile(victim), good);
-        fs::remove(record);
-        fs::remove(temporary);
+        for (const std::string& planted : {record, temporary, lock}) fs::remove(planted);
     }
 }
 
