@@ -1,5 +1,6 @@
 // The criterion on names.
 #include <algorithm>
+#include <cstring>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -26,8 +27,10 @@ bool isPlainSubstring(std::string_view text) {
 
 // The last component, with the "/" behind it when the path ends in one.
 std::string_view lastComponent(std::string_view path) {
-    const auto slash = path.size() < 2 ? std::string_view::npos : path.rfind('/', path.size() - 2);
-    return slash == std::string_view::npos ? path : path.substr(slash + 1);
+    // A search asks this for every entry, mostly with a bare name.
+    const void* slash = path.size() < 2 ? nullptr : memrchr(path.data(), '/', path.size() - 1);
+    return slash == nullptr ? path
+                            : path.substr(static_cast<std::size_t>(static_cast<const char*>(slash) - path.data()) + 1);
 }
 
 }  // namespace
