@@ -53,7 +53,7 @@ bool bindRecord(Statement& statement, const Record& record) {
     int at = 0;
     for (const auto field : kTextFields) {
         const char* text = record.*field;
-        if (!statement.bindBytes(++at, text == nullptr ? "" : text)) return false;
+        if (!statement.bindText(++at, text == nullptr ? "" : text)) return false;
     }
     if (!statement.bind(++at, static_cast<int64_t>(record.isDir != 0))) return false;
     for (const auto field : kLongFields) {

@@ -30,10 +30,10 @@ constexpr int kSetLimit = FI_COL_GROUP + 1;
 
 // Compared word for word before a database is used, so a change here makes another format.
 constexpr std::array<const char*, 4> kSchema = {
-    "CREATE TABLE record(id INTEGER PRIMARY KEY,name BLOB,share BLOB,path BLOB,parent BLOB,share_root BLOB,"
-    "extension BLOB,permission BLOB,owner BLOB,group_name BLOB,is_dir INTEGER,size INTEGER,created INTEGER,"
+    "CREATE TABLE record(id INTEGER PRIMARY KEY,name TEXT,share TEXT,path TEXT,parent TEXT,share_root TEXT,"
+    "extension TEXT,permission TEXT,owner TEXT,group_name TEXT,is_dir INTEGER,size INTEGER,created INTEGER,"
     "changed INTEGER,accessed INTEGER,modified INTEGER,mode INTEGER,uid INTEGER,gid INTEGER)",
-    "CREATE UNIQUE INDEX record_address ON record(share,path)",
+    "CREATE UNIQUE INDEX record_address ON record(path,share)",
     "CREATE TABLE state(records INTEGER,written INTEGER,built INTEGER,updated INTEGER)",
     "CREATE TABLE ranking(id INTEGER PRIMARY KEY,records BLOB)",
 };
@@ -282,7 +282,7 @@ bool Database::clearTarget(const std::vector<const Node*>& set, const Condition&
     if (values.empty()) return true;
     append(values, where.values);
     append(values, where.values);
-    if (!change("DELETE FROM record WHERE (share,path) IN (SELECT " + share + "," + path + " FROM record WHERE " +
+    if (!change("DELETE FROM record WHERE (path,share) IN (SELECT " + path + "," + share + " FROM record WHERE " +
                     where.sql + ") AND NOT (" + where.sql + ")",
                 values)) {
         return false;

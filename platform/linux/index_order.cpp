@@ -4,6 +4,7 @@
 #include <cstring>
 #include <ctime>
 #include <limits>
+#include <map>
 #include <optional>
 
 #include "failure.h"
@@ -60,11 +61,21 @@ bool addKeys(Database& database, const FIQUERY& query, const Condition& conditio
     return step == Statement::kDone;
 }
 
+// The index gives the records of each share in the order of their paths.
 bool addRanks(Database& database, Sorter& sorter) {
     Statement statement;
-    if (!statement.prepare(database.handle(), "SELECT id FROM record ORDER BY share,path")) return false;
+    if (!statement.prepare(database.handle(), "SELECT id,share FROM record ORDER BY path,share")) return false;
+    std::map<std::string, std::vector<int64_t>, std::less<>> shares;
+    auto share = shares.end();
     Statement::Step step = statement.step();
-    for (; step == Statement::kRow; step = statement.step()) sorter.rank(statement.number(0));
+    for (; step == Statement::kRow; step = statement.step()) {
+        const std::string_view name = statement.text(1);
+        if (share == shares.end() || share->first != name) share = shares.try_emplace(std::string(name)).first;
+        share->second.push_back(statement.number(0));
+    }
+    for (const auto& [name, ids] : shares) {
+        for (const int64_t id : ids) sorter.rank(id);
+    }
     return step == Statement::kDone;
 }
 

@@ -23,29 +23,18 @@ bool collect(Statement& statement, int64_t most, std::vector<int64_t>& ids, bool
     return step != Statement::kFailed;
 }
 
-// An index holds one share, under the name that its indexer gave it.
-bool shareOf(sqlite3* db, std::string& share) {
-    Statement statement;
-    if (!statement.prepare(db, "SELECT share FROM record LIMIT 1")) return false;
-    const Statement::Step step = statement.step();
-    if (step == Statement::kRow) share = statement.text(0);
-    return step != Statement::kFailed;
-}
-
 // The records of the folders; `enough` when there are more than `most`.
 bool inFolders(sqlite3* db, const std::vector<Folder>& folders, int64_t most, std::vector<int64_t>& ids, bool& enough) {
-    std::string share;
-    if (!shareOf(db, share)) return false;
     Statement below;
     Statement direct;
-    if (!below.prepare(db, "SELECT id FROM record WHERE share=? AND path>? AND path<?") ||
+    if (!below.prepare(db, "SELECT id FROM record WHERE path>? AND path<?") ||
         !direct.prepare(db, "SELECT id FROM record WHERE parent=?")) {
         return false;
     }
     for (const Folder& folder : folders) {
         Statement& statement = folder.below ? below : direct;
-        const std::vector<Value> values = folder.below ? std::vector<Value>{share, folder.path + "/", folder.path + "0"}
-                                                       : std::vector<Value>{folder.path};
+        const std::vector<Value> values =
+            folder.below ? std::vector<Value>{folder.path + "/", folder.path + "0"} : std::vector<Value>{folder.path};
         if (!statement.bind(values) || !collect(statement, most, ids, enough)) return false;
         statement.reset();
         if (enough) return true;

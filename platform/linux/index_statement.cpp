@@ -68,15 +68,15 @@ bool Statement::bind(int at, int64_t value) {
     return sqlite3_bind_int64(statement_, at, value) == SQLITE_OK || failSql(sqlite3_db_handle(statement_));
 }
 
-bool Statement::bindBytes(int at, std::string_view bytes) {
+bool Statement::bindText(int at, std::string_view text) {
     // A null pointer would be bound as NULL.
-    const char* start = bytes.empty() ? "" : bytes.data();
-    return sqlite3_bind_blob64(statement_, at, start, bytes.size(), SQLITE_STATIC) == SQLITE_OK ||
+    const char* start = text.empty() ? "" : text.data();
+    return sqlite3_bind_text64(statement_, at, start, text.size(), SQLITE_STATIC, SQLITE_UTF8) == SQLITE_OK ||
            failSql(sqlite3_db_handle(statement_));
 }
 
-bool Statement::bindText(int at, std::string_view text) {
-    return sqlite3_bind_text64(statement_, at, text.data(), text.size(), SQLITE_STATIC, SQLITE_UTF8) == SQLITE_OK ||
+bool Statement::bindBytes(int at, std::string_view bytes) {
+    return sqlite3_bind_blob64(statement_, at, bytes.data(), bytes.size(), SQLITE_STATIC) == SQLITE_OK ||
            failSql(sqlite3_db_handle(statement_));
 }
 
@@ -87,7 +87,7 @@ bool Statement::bind(const std::vector<Value>& values) {
         if (const auto* number = std::get_if<int64_t>(&value)) {
             if (!bind(at, *number)) return false;
         } else if (const auto* text = std::get_if<std::string>(&value)) {
-            if (!bindBytes(at, *text)) return false;
+            if (!bindText(at, *text)) return false;
         } else {
             auto* pattern = const_cast<orvel::Wildcard*>(std::get<Pattern>(value).get());
             if (sqlite3_bind_pointer(statement_, at, pattern, "wildcard", nullptr) != SQLITE_OK) {
@@ -114,7 +114,6 @@ bool Statement::run() {
 }
 
 std::string_view Statement::text(int column) const {
-    // The text form of a blob is its bytes with a NUL behind them.
     const auto* bytes = reinterpret_cast<const char*>(sqlite3_column_text(statement_, column));
     if (bytes == nullptr) return "";
     return {bytes, static_cast<size_t>(sqlite3_column_bytes(statement_, column))};

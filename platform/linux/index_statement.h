@@ -17,7 +17,7 @@
 namespace vexo::fileindex {
 
 using Pattern = std::shared_ptr<const orvel::Wildcard>;
-// A value of a statement: a number, a text (bytes), or what vexo_match compares with.
+// A value of a statement: a number, a text, or what vexo_match compares with.
 using Value = std::variant<int64_t, std::string, Pattern>;
 
 // Fills the slot and errno with the last failure of `db`, and gives false.
@@ -57,8 +57,9 @@ class Statement {
     // Values 1, 2, 3... The statement borrows them until it is reset.
     [[nodiscard]] bool bind(const std::vector<Value>& values);
     [[nodiscard]] bool bind(int at, int64_t value);
+    // Texts are any bytes but NUL: SQLite stores, compares and gives them back as they are.
+    [[nodiscard]] bool bindText(int at, std::string_view text);
     [[nodiscard]] bool bindBytes(int at, std::string_view bytes);
-    [[nodiscard]] bool bindText(int at, std::string_view text);  // for full-text expressions alone
 
     enum Step { kFailed = -1, kDone = 0, kRow = 1 };
     [[nodiscard]] Step step();
@@ -67,7 +68,7 @@ class Statement {
     void reset() { sqlite3_reset(statement_); }
 
     [[nodiscard]] int64_t number(int column) const { return sqlite3_column_int64(statement_, column); }
-    // Valid until the next step. A NUL follows the bytes.
+    // Valid until the next step. A NUL follows.
     [[nodiscard]] std::string_view text(int column) const;
 
  private:
