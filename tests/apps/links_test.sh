@@ -56,7 +56,8 @@ expect "a prefix that would end the script" 400 "$(status "$share?FOLDER_SHARING
 file=$(link /photo/shared/one.txt --password 'pass word')
 expect "the page of a password" 200 "$(status "$share?FOLDER_SHARING=$file")"
 expect "listing without it" 401 "$(visit "$file")"
-expect "that it takes one" 1 "$(grep -c '"password":true' "$work/body")"
+expect "its state" 200 "$(status "$share?FOLDER_SHARING=$file&action=state")"
+expect "that it takes one" 1 "$(grep -c '"logged_in":false,"password":true' "$work/body")"
 expect "a wrong one" 403 "$(enter "$file" word)"
 expect "the right one" 200 "$(enter "$file" 'pass word')"
 expect "the file alone" 200 "$(visit "$file")"

@@ -3,6 +3,7 @@
 // Parameters, from the query or a form:
 //   FOLDER_SHARING   the link; the header Folder-Sharing comes before it
 //   action           none: the page, which asks for the rest
+//                    "state": {"logged_in", "password"}, the latter whether the link takes one
 //                    "login" (posted): with `password`; sets the cookie of the link
 //                    "list": what the shared folder holds, or the shared file alone
 //                    "download": a file with ranges, a folder or several paths as a zip
@@ -10,7 +11,7 @@
 //   sort_by, sort_direction, offset, limit, additional   as for the program "list"; of the additional properties only
 //                    size, time and type
 // A link that is not open for whatever reason, and any path outside it, is missing. What needs a log-in answers 401
-// without one, {"data": {"password": true}} when it takes a password.
+// without one.
 #include <json/value.h>
 #include <sys/stat.h>
 
@@ -90,6 +91,13 @@ void serveLogin(Output& out, Visit& visit) {
     visit.web().WriteHeader("application/json; charset=UTF-8");
     printf("{\"success\":true}");
     fflush(stdout);
+}
+
+void serveState(Output& out, Visit& visit) {
+    Json::Value state;
+    state["logged_in"] = visit.isLoggedIn();
+    state["password"] = !visit.link().passwordHash.empty();
+    reply(out, Status::kOk, "", ORV_ERR_NONE, "", state);
 }
 
 // The shared file as the only item of a list.
@@ -173,11 +181,7 @@ int codeOf(Availability availability) {
 
 // What only a visitor who is logged in sees; from here on the process is the link's owner.
 void serveInside(Output& out, Visit& visit, const std::string& action) {
-    if (!visit.isLoggedIn()) {
-        Json::Value how;
-        how["password"] = !visit.link().passwordHash.empty();
-        return reply(out, Status::kNotLoggedIn, "", ORV_ERR_DENIED, "", how);
-    }
+    if (!visit.isLoggedIn()) return replyFailure(out, Status::kNotLoggedIn, "", ORV_ERR_DENIED, "");
     const auto paths = pathParams(visit.web());
     if (!paths || (action == "list" && paths->size() > 1)) {
         return replyFailure(out, Status::kBadRequest, "", ORV_ERR_PARAMETER, "");
@@ -195,12 +199,13 @@ void serve(Output& out) {
     if (visit.web().BodyRefused()) return replyFailure(out, Status::kTooLarge, "", ORV_ERR_PARAMETER, "");
     const std::string action = visit.web().GetParam("action", "");
     if (action.empty()) return servePage(out, visit);
-    if (action != "login" && action != "list" && action != "download") {
+    if (action != "state" && action != "login" && action != "list" && action != "download") {
         return replyFailure(out, Status::kBadRequest, "", ORV_ERR_PARAMETER, "");
     }
     if (visit.availability() != Availability::kOpen) {
         return replyFailure(out, statusOf(visit.availability()), "", codeOf(visit.availability()), "");
     }
+    if (action == "state") return serveState(out, visit);
     if (action == "login") return serveLogin(out, visit);
     serveInside(out, visit, action);
 }

@@ -83,8 +83,8 @@
   function row(item) {
     const more = item.additional || {};
     const name = item.isdir
-      ? make("a", { href: "#" + encodeURIComponent(JSON.stringify(pathField(item))), class: "folder" }, item.name)
-      : make("a", { href: address({ action: "download", ...pathField(item) }), download: "" }, item.name);
+      ? make("a", { href: "#" + encodeURIComponent(JSON.stringify(pathField(item))), class: "folder" }, make("bdi", {}, item.name))
+      : make("a", { href: address({ action: "download", ...pathField(item) }), download: "" }, make("bdi", {}, item.name));
     const changed = more.time ? new Date(more.time.mtime * 1000).toLocaleString(g_Lang) : "";
     return make("tr", {}, make("td", {}, name), make("td", { class: "size" }, item.isdir ? "" : sizeText(more.size || 0)),
       make("td", { class: "time" }, changed));
@@ -114,14 +114,16 @@
     return ask({ action: "list", additional: "size,time", limit: definitions.pageSize, offset, ...path });
   }
 
+  // The page logs in by itself where no password is asked, unless its session has ended since.
   async function open(path) {
-    const { status, json } = await list(path, 0).catch(() => ({ status: 500 }));
-    if (status === 401 && json.data && json.data.password) return askPassword(path);
-    if (status === 401) {
-      // The page logs in by itself where no password is asked; the session has ended since.
+    const state = await ask({ action: "state" }).catch(() => ({ status: 500 }));
+    if (state.status !== 200) return noticeOf(state.status);
+    if (!state.json.data.logged_in) {
+      if (state.json.data.password) return askPassword(path);
       const again = await logIn("").catch(() => ({ status: 500 }));
-      return again.status === 200 ? open(path) : noticeOf(again.status);
+      if (again.status !== 200) return noticeOf(again.status);
     }
+    const { status, json } = await list(path, 0).catch(() => ({ status: 500 }));
     if (status !== 200) return noticeOf(status);
     if (!json.success) return noticeOf(404);
     const place = json.place;
