@@ -66,8 +66,8 @@ int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_COND* path
     using namespace vexo::fileindex;
     VEXO_GATE("FILEIDXResultGetAndTableGen", -1);
     if (share == nullptr || out == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
-    auto where = readCondition(paths, {true, false, false});
-    auto what = readCondition(cond, {false, accessTest != nullptr, true});
+    auto where = readCondition(paths, {.ofSearch = true});
+    auto what = readCondition(cond, {.accessHolds = accessTest != nullptr, .forTrigrams = true});
     if (!where || !what) return -1;
     std::unique_ptr<Database> index;
     std::vector<int64_t> ids;
