@@ -46,6 +46,17 @@ void makeHome(const std::string& user) {
     if (VEXOServiceUserHomeIsEnabled(record->authType, record->uid) == 1) OrvUserHomeFullPathGet(home, user);
 }
 
+// Whether a page of another site sends the request. Browsers add the log-in by themselves, whoever makes them ask, but
+// say whose page it was where something could be changed.
+bool isForeign() {
+    const char* origin = getenv("HTTP_ORIGIN");
+    const char* host = getenv("HTTP_HOST");
+    if (origin == nullptr || host == nullptr) return false;
+    const std::string_view from = origin;
+    const size_t scheme = from.find("://");
+    return scheme == std::string_view::npos || from.substr(scheme + 3) != host;
+}
+
 }  // namespace
 
 void dropForwardedFor() {
@@ -67,7 +78,7 @@ Status admit(User& user) {
 
 bool begin(Output& out, User& user) {
     dropForwardedFor();
-    const Status admitted = admit(user);
+    const Status admitted = isForeign() ? Status::kForbidden : admit(user);
     if (admitted != Status::kOk) replyFailure(out, admitted, "", ORV_ERR_DENIED, "");
     return admitted == Status::kOk;
 }

@@ -28,7 +28,8 @@ void dropForwardedFor();
 // `user` filled, kNotLoggedIn or kForbidden.
 Status admit(User& user);
 
-// Both of the above, with which every program for logged-in users begins. False once the refusal is written to `out`.
+// Both of the above, with which every program for logged-in users begins; what another site's page sends is refused.
+// False once the refusal is written to `out`.
 bool begin(Output& out, User& user);
 
 // Takes on the user's identity for the rest of the process; `sid` may be null. His home folder is made first when
