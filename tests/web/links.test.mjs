@@ -1,0 +1,74 @@
+// Public links: made, opened by a visitor who has no account, revoked.
+import assert from "node:assert/strict";
+import { after, before, test } from "node:test";
+import { launch, row, screenshot, withPage } from "./browser.mjs";
+
+let chrome;
+before(async () => { chrome = await launch(); });
+after(() => chrome.close());
+
+async function makeLink(page, name, password) {
+  await row(page, name).click();
+  await page.click("#toolbar >> text=Share a link");
+  await page.fill("[name=password]", password);
+  await page.click(".dialog >> text=Create link");
+  const address = await page.inputValue(".address");
+  await screenshot(page, "link");
+  await page.keyboard.press("Escape");
+  return address;
+}
+
+async function visit(address, run) {
+  const context = await chrome.browser.newContext({ viewport: { width: 1280, height: 800 }, locale: "en-GB" });
+  const page = await context.newPage();
+  const wrong = [];
+  page.on("pageerror", (error) => wrong.push(error.stack));
+  page.on("console", (message) => { if (message.type() === "error") wrong.push(message.text()); });
+  try {
+    const response = await page.goto(address);
+    await run(page, response.status(), wrong);
+  } finally {
+    await context.close();
+  }
+}
+
+test("a folder with a password, opened elsewhere, then revoked", () => withPage(chrome, "alice", { path: "/projects" }, async (page) => {
+  const address = await makeLink(page, "house", "let me in");
+  await visit(address, async (visitor, status, wrong) => {
+    assert.equal(status, 200);
+    await visitor.fill("input[type=password]", "let me out");
+    await visitor.keyboard.press("Enter");
+    await visitor.waitForFunction(() => document.querySelector(".wrong")?.textContent.trim());
+    await visitor.fill("input[type=password]", "let me in");
+    await visitor.keyboard.press("Enter");
+    await visitor.waitForSelector("text=plan.pdf");
+    await screenshot(visitor, "visitor");
+    const download = visitor.waitForEvent("download");
+    await visitor.click("text=plan.pdf");
+    assert.equal((await download).suggestedFilename(), "plan.pdf");
+    assert.deepEqual(wrong.filter((text) => !text.includes("403")), []);
+  });
+  await page.click("#settings-button");
+  await page.click(".menu >> text=My public links");
+  await page.waitForSelector(".link-list >> text=with password");
+  await screenshot(page, "links");
+  await page.click(".link-list [aria-label=Revoke]");
+  await page.click(".dialog .button.danger");
+  await page.waitForSelector(".link-list >> text=You have no public links");
+  await visit(address, async (visitor, status) => {
+    assert.equal(status, 404);
+    assert.equal(await visitor.locator("text=plan.pdf").count(), 0);
+  });
+}));
+
+test("names of markup reach a visitor as text", () => withPage(chrome, "alice", { path: "/" }, async (page) => {
+  await page.evaluate(() => { location.hash = "/worldwide"; });
+  await page.waitForSelector("#view >> text=#hash.txt");
+  const address = await makeLink(page, "<img src=x onerror", "");
+  await visit(address, async (visitor, status, wrong) => {
+    assert.equal(status, 200);
+    await visitor.waitForSelector("text=<img src=x onerror=alert(1)>.txt");
+    assert.equal(await visitor.locator("img").count(), 0);
+    assert.deepEqual(wrong, []);
+  });
+}));
