@@ -121,18 +121,12 @@ TEST_F(DownloadCgi, RefusalsShowInTheStatus) {
     fs::create_symlink("/etc", root + "/etc");
     fs::create_symlink("../" + fs::path(shareRoot("preview")).filename().string(), root + "/next");
     for (const auto& [user, query, status, code] : Rows<std::string, std::string, int, int>{
-             {"", "path=/photo/folder/f", 401, 407},
-             {"alice", "", 400, 400},
-             {"alice", "path_raw=/photo/%25zz", 400, 400},
-             {"alice", "path=/photo/x", 404, 408},
-             {"alice", "path=/preview/f", 403, 407},
-             {"alice", "path=/preview", 403, 407},
-             {"alice", "path=/photo/pipe", 403, 407},
-             {"alice", "path=/photo/outside", 403, 407},
-             {"alice", "path=/photo/next/f", 403, 407},
-             {"alice", "path=/photo/folder/f&path=/photo/x", 404, 408},
-             {"alice", "path=/photo/folder/f&path=/photo/outside", 403, 407},
-         }) {
+             row("", "path=/photo/folder/f", 401, 407), row("alice", "", 400, 400),
+             row("alice", "path_raw=/photo/%25zz", 400, 400), row("alice", "path=/photo/x", 404, 408),
+             row("alice", "path=/preview/f", 403, 407), row("alice", "path=/preview", 403, 407),
+             row("alice", "path=/photo/pipe", 403, 407), row("alice", "path=/photo/outside", 403, 407),
+             row("alice", "path=/photo/next/f", 403, 407), row("alice", "path=/photo/folder/f&path=/photo/x", 404, 408),
+             row("alice", "path=/photo/folder/f&path=/photo/outside", 403, 407)}) {
         SCOPED_TRACE(query);
         const CgiReply reply(ask(user, query));
         EXPECT_EQ(reply.status, status);

@@ -73,16 +73,13 @@ TEST_F(ListCgi, RefusalsSayWhy) {
     writeFile(root + "/file.txt", "x", 0644);
     addMount(root + "/dead", "nfs");
     for (const auto& [path, code, key] : Rows<std::string, int, std::string>{
-             {"/sealed", 407, "error:error_privilege_not_enough"},
-             {"/", 407, "error:error_privilege_not_enough"},
-             {"/photo/missing", 408, "error:error_no_path"},
-             {"/photo/file.txt/below", 408, "error:error_no_path"},
-             {"photo", 401, "error:error_error_system"},
-             {"", 400, "error:error_error_system"},
-             {"/photo/" + std::string(5000, 'x'), 402, "error:error_error_system"},
-             {"/photo/../photo", 407, "error:error_privilege_not_enough"},
-             {"/photo/dead", 410, "error:conn_rv_fail"},
-         }) {
+             row("/sealed", 407, "error:error_privilege_not_enough"), row("/", 407, "error:error_privilege_not_enough"),
+             row("/photo/missing", 408, "error:error_no_path"),
+             row("/photo/file.txt/below", 408, "error:error_no_path"), row("photo", 401, "error:error_error_system"),
+             row("", 400, "error:error_error_system"),
+             row("/photo/" + std::string(5000, 'x'), 402, "error:error_error_system"),
+             row("/photo/../photo", 407, "error:error_privilege_not_enough"),
+             row("/photo/dead", 410, "error:conn_rv_fail")}) {
         const CgiReply reply = folder("bob", path);
         EXPECT_EQ(reply.status, 200) << path;
         EXPECT_FALSE(reply.json["success"].asBool()) << path;

@@ -103,14 +103,10 @@ TEST(Multipart, MemoryStaysFlat) {
 
 TEST(Multipart, Boundary) {
     for (const auto& [type, boundary] : Rows<std::string, std::string>{
-             {"multipart/form-data; boundary=abc", "abc"},
-             {"Multipart/Form-Data ;charset=x; BOUNDARY=\"a b;c\" ; x=y", "a b;c"},
-             {"multipart/form-data", ""},
-             {"multipart/form-data; boundary=", ""},
-             {"multipart/mixed; boundary=abc", ""},
-             {"multipart/form-data; boundary=" + std::string(71, 'b'), ""},
-             {"", ""},
-         })
+             row("multipart/form-data; boundary=abc", "abc"),
+             row("Multipart/Form-Data ;charset=x; BOUNDARY=\"a b;c\" ; x=y", "a b;c"), row("multipart/form-data", ""),
+             row("multipart/form-data; boundary=", ""), row("multipart/mixed; boundary=abc", ""),
+             row("multipart/form-data; boundary=" + std::string(71, 'b'), ""), row("", "")})
         EXPECT_EQ(orvel::cgi::boundaryOf(type), boundary) << type;
 }
 

@@ -41,23 +41,13 @@ TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
     makeFolder(root + "/root's", 0755);
     fs::create_symlink("/tmp", root + "/outside");
     for (const auto& [user, path, more, code] : Rows<std::string, std::string, std::string, int>{
-             {"alice", "/photo/a", "", 0},
-             {"alice", "/photo/a/", "", 414},
-             {"alice", "/photo/p/q/r", "", 408},
-             {"alice", "/photo/p/q/._r", "&parents=true", 418},
-             {"alice", "/photo/p/q/r", "&parents=true", 0},
-             {"carol", "/photo/c", "", 0},
-             {"bob", "/photo/b", "", 407},
-             {"bob", "/home/b", "", 0},
-             {"alice", "/photo/root's/x", "", 407},
-             {"alice", "/photo/outside/x", "", 407},
-             {"alice", "/photo", "", 400},
-             {"alice", "/photo/a/..", "", 418},
-             {"alice", "/photo/a:b", "", 418},
-             {"alice", "/nowhere/x", "", 408},
-             {"alice", "/usb/a|b", "", 419},
-             {"alice", "/photo/" + std::string(256, 'n'), "", 412},
-         }) {
+             row("alice", "/photo/a", "", 0), row("alice", "/photo/a/", "", 414), row("alice", "/photo/p/q/r", "", 408),
+             row("alice", "/photo/p/q/._r", "&parents=true", 418), row("alice", "/photo/p/q/r", "&parents=true", 0),
+             row("carol", "/photo/c", "", 0), row("bob", "/photo/b", "", 407), row("bob", "/home/b", "", 0),
+             row("alice", "/photo/root's/x", "", 407), row("alice", "/photo/outside/x", "", 407),
+             row("alice", "/photo", "", 400), row("alice", "/photo/a/..", "", 418), row("alice", "/photo/a:b", "", 418),
+             row("alice", "/nowhere/x", "", 408), row("alice", "/usb/a|b", "", 419),
+             row("alice", "/photo/" + std::string(256, 'n'), "", 412)}) {
         EXPECT_EQ(mkdir(user, path, more), code) << path << more;
     }
     const std::pair<std::string, unsigned> made[] = {{root + "/a", kAliceUid},
@@ -87,26 +77,16 @@ TEST_F(OperationCgi, RenamingReplacesNothing) {
     fs::create_symlink("folder", root + "/inside");
     fs::create_symlink("/etc", root + "/outside");
     for (const auto& [user, path, name, code] : Rows<std::string, std::string, std::string, int>{
-             {"alice", "/photo/one", "two", 414},
-             {"alice", "/photo/folder", "one", 414},
-             {"alice", "/photo/one", "one", 0},
-             {"alice", "/photo/folder", "folder", 0},
-             {"alice", "/photo/one", "", 400},
-             {"alice", "/photo/one", "folder/one", 418},
-             {"alice", "/photo/one", "a:b", 418},
-             {"alice", "/photo/one", std::string(256, 'n'), 412},
-             {"alice", "/photo/missing", "x", 408},
-             {"alice", "/photo", "x", 400},
-             {"alice", "/photo/folder/..", "x", 418},
-             {"alice", "/photo/root's/f", "x", 407},
-             {"alice", "/photo/outside/passwd", "x", 407},
-             {"bob", "/photo/one", "x", 407},
-             {"alice", "/archive/f", "x", 407},
-             {"alice", "/usb/f", "a?", 419},
-             {"alice", "/photo/inside/f", "g\nh", 0},
-             {"alice", "/photo/outside", "link", 0},
-             {"alice", "/photo/one", "ONE", 0},
-         }) {
+             row("alice", "/photo/one", "two", 414), row("alice", "/photo/folder", "one", 414),
+             row("alice", "/photo/one", "one", 0), row("alice", "/photo/folder", "folder", 0),
+             row("alice", "/photo/one", "", 400), row("alice", "/photo/one", "folder/one", 418),
+             row("alice", "/photo/one", "a:b", 418), row("alice", "/photo/one", std::string(256, 'n'), 412),
+             row("alice", "/photo/missing", "x", 408), row("alice", "/photo", "x", 400),
+             row("alice", "/photo/folder/..", "x", 418), row("alice", "/photo/root's/f", "x", 407),
+             row("alice", "/photo/outside/passwd", "x", 407), row("bob", "/photo/one", "x", 407),
+             row("alice", "/archive/f", "x", 407), row("alice", "/usb/f", "a?", 419),
+             row("alice", "/photo/inside/f", "g\nh", 0), row("alice", "/photo/outside", "link", 0),
+             row("alice", "/photo/one", "ONE", 0)}) {
         EXPECT_EQ(rename(user, path, name), code) << path << " to " << name;
     }
     EXPECT_EQ(readFile(root + "/ONE"), "/one");

@@ -47,32 +47,19 @@ TEST(Range, OneRangeOfBytesIsServed) {
 TEST(Range, ConditionsAreComparedWithTheFile) {
     const std::int64_t modified = 784111777;  // Sun, 06 Nov 1994 08:49:37 GMT
     for (const auto& [noneMatch, modifiedSince, current] : Rows<const char*, const char*, bool>{
-             {"", "", false},
-             {"\"t\"", "", true},
-             {"\"a\" ,W/\"t\"", "", true},
-             {"*", "", true},
-             {"\"other\"", "Sun, 06 Nov 1994 08:49:37 GMT", false},
-             {"t", "", false},
-             {"", "Sun, 06 Nov 1994 08:49:37 GMT", true},
-             {"", "Sunday, 06-Nov-94 08:49:37 GMT", true},
-             {"", "Sun Nov  6 08:49:38 1994", true},
-             {"", "Sun, 06 Nov 1994 08:49:36 GMT", false},
-             {"", "Sun, 06 Nov 1994 08:49:37 GMT+1", false},
-             {"", "tomorrow", false},
-         }) {
+             row("", "", false), row("\"t\"", "", true), row("\"a\" ,W/\"t\"", "", true), row("*", "", true),
+             row("\"other\"", "Sun, 06 Nov 1994 08:49:37 GMT", false), row("t", "", false),
+             row("", "Sun, 06 Nov 1994 08:49:37 GMT", true), row("", "Sunday, 06-Nov-94 08:49:37 GMT", true),
+             row("", "Sun Nov  6 08:49:38 1994", true), row("", "Sun, 06 Nov 1994 08:49:36 GMT", false),
+             row("", "Sun, 06 Nov 1994 08:49:37 GMT+1", false), row("", "tomorrow", false)}) {
         EXPECT_EQ(isCurrent(noneMatch, modifiedSince, "\"t\"", modified), current) << noneMatch << modifiedSince;
     }
     EXPECT_EQ(httpDate(modified), "Sun, 06 Nov 1994 08:49:37 GMT");
 
     for (const auto& [header, time, counts] : Rows<const char*, std::int64_t, bool>{
-             {"", modified, true},
-             {"\"t\"", modified, true},
-             {"W/\"t\"", modified, false},
-             {"\"u\"", modified, false},
-             {"Sun, 06 Nov 1994 08:49:37 GMT", modified, true},
-             {"Sun, 06 Nov 1994 08:49:38 GMT", modified, false},
-             {"junk", -1, false},
-         })
+             row("", modified, true), row("\"t\"", modified, true), row("W/\"t\"", modified, false),
+             row("\"u\"", modified, false), row("Sun, 06 Nov 1994 08:49:37 GMT", modified, true),
+             row("Sun, 06 Nov 1994 08:49:38 GMT", modified, false), row("junk", -1, false)})
         EXPECT_EQ(rangeCounts(header, "\"t\"", time), counts);
 }
 

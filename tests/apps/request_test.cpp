@@ -18,11 +18,8 @@ class ForwardedFor : public ApplianceTest {};
 
 TEST_F(ForwardedFor, CountsOnlyFromConfiguredProxies) {
     for (const auto& [proxies, peer, kept] : Rows<const char*, const char*, bool>{
-             {"", "127.0.0.1", false},
-             {"10.0.0.1, 10.0.0.2", "10.0.0.2", true},
-             {"10.0.0.1, 10.0.0.2", "10.0.0.20", false},
-             {"10.0.0.1,,", "", false},
-         }) {
+             row("", "127.0.0.1", false), row("10.0.0.1, 10.0.0.2", "10.0.0.2", true),
+             row("10.0.0.1, 10.0.0.2", "10.0.0.20", false), row("10.0.0.1,,", "", false)}) {
         writeRootFile("/etc/vexoinfo.conf", std::string("trusted_proxies=\"") + proxies + "\"\n");
         setenv("REMOTE_ADDR", peer, 1);
         setenv("HTTP_X_FORWARDED_FOR", "192.0.2.1", 1);

@@ -106,21 +106,12 @@ TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
     fs::create_symlink("nowhere", root + "/dangling");
     const auto before = namesIn(root);
     for (const auto& [user, path, expected] : Rows<std::string, std::string, int>{
-             {"bob", "/photo/x", 407},
-             {"alice", "/photo/root's/x", 407},
-             {"alice", "/nowhere/x", 408},
-             {"alice", "/photo", 414},
-             {"alice", "/photo/pipe", 414},
-             {"alice", "/photo/device", 414},
-             {"alice", "/photo/file/x", 408},
-             {"alice", "/photo/outside/orveltest-x", 407},
-             {"alice", "/photo/../orveltest-x", 407},
-             {"alice", "/photo/new/@vexoea/x", 418},
-             {"alice", "/photo/folder/.", 418},
-             {"alice", "/usb/new*/b", 419},
-             {"alice", "/photo/new/" + std::string(256, 'n') + "/x", 412},
-             {"alice", "", 400},
-         }) {
+             row("bob", "/photo/x", 407), row("alice", "/photo/root's/x", 407), row("alice", "/nowhere/x", 408),
+             row("alice", "/photo", 414), row("alice", "/photo/pipe", 414), row("alice", "/photo/device", 414),
+             row("alice", "/photo/file/x", 408), row("alice", "/photo/outside/orveltest-x", 407),
+             row("alice", "/photo/../orveltest-x", 407), row("alice", "/photo/new/@vexoea/x", 418),
+             row("alice", "/photo/folder/.", 418), row("alice", "/usb/new*/b", 419),
+             row("alice", "/photo/new/" + std::string(256, 'n') + "/x", 412), row("alice", "", 400)}) {
         for (const char* mode : {"error", "overwrite"}) {
             SCOPED_TRACE(path + " " + mode);
             const bool shareRoot = path == "/photo" && std::string(mode) == "overwrite";

@@ -6,40 +6,38 @@ namespace {
 class ErrorStateTest : public ApplianceTest {};
 
 TEST_F(ErrorStateTest, EveryCodeHasItsKey) {
-    for (const auto& [code, key] : Rows<int, const char*>{
-             {400, "error_error_system"},
-             {401, "error_error_system"},
-             {402, "error_error_system"},
-             {403, "error_invalid_user_group"},
-             {404, "error_invalid_user_group"},
-             {405, "error_invalid_user_group"},
-             {406, "error_testjoin"},
-             {407, "error_privilege_not_enough"},
-             {408, "error_no_path"},
-             {409, "error_privilege_not_enough"},
-             {410, "conn_rv_fail"},
-             {411, "error_fs_ro"},
-             {412, "error_long_path"},
-             {413, "error_encryption_long_path"},
-             {414, "error_file_exist"},
-             {415, "error_quota_not_enough"},
-             {416, "error_space_not_enough"},
-             {417, "error_io"},
-             {418, "error_reserved_name"},
-             {419, "error_fat_reserved_name"},
-             {420, "error_error_system"},
-             {421, "error_folder_busy"},
-             {1004, "error_overwrite_fail"},
-             {1005, "error_select_conflict"},
-             {1006, "mvcp_filename_illegal"},
-             {1007, "mvcp_file_too_big"},
-             {1400, "error_error_system"},
-             {1401, "error_invalid_archive"},
-             {1402, "error_invalid_archive_data"},
-             {1403, "extract_passwd_missing"},
-             {1404, "error_error_system"},
-             {1405, "error_error_system"},
-         }) {
+    for (const auto& [code, key] : Rows<int, const char*>{row(400, "error_error_system"),
+                                                          row(401, "error_error_system"),
+                                                          row(402, "error_error_system"),
+                                                          row(403, "error_invalid_user_group"),
+                                                          row(404, "error_invalid_user_group"),
+                                                          row(405, "error_invalid_user_group"),
+                                                          row(406, "error_testjoin"),
+                                                          row(407, "error_privilege_not_enough"),
+                                                          row(408, "error_no_path"),
+                                                          row(409, "error_privilege_not_enough"),
+                                                          row(410, "conn_rv_fail"),
+                                                          row(411, "error_fs_ro"),
+                                                          row(412, "error_long_path"),
+                                                          row(413, "error_encryption_long_path"),
+                                                          row(414, "error_file_exist"),
+                                                          row(415, "error_quota_not_enough"),
+                                                          row(416, "error_space_not_enough"),
+                                                          row(417, "error_io"),
+                                                          row(418, "error_reserved_name"),
+                                                          row(419, "error_fat_reserved_name"),
+                                                          row(420, "error_error_system"),
+                                                          row(421, "error_folder_busy"),
+                                                          row(1004, "error_overwrite_fail"),
+                                                          row(1005, "error_select_conflict"),
+                                                          row(1006, "mvcp_filename_illegal"),
+                                                          row(1007, "mvcp_file_too_big"),
+                                                          row(1400, "error_error_system"),
+                                                          row(1401, "error_invalid_archive"),
+                                                          row(1402, "error_invalid_archive_data"),
+                                                          row(1403, "extract_passwd_missing"),
+                                                          row(1404, "error_error_system"),
+                                                          row(1405, "error_error_system")}) {
         EXPECT_EQ(OrvParseErrorToKTRString(code, "other:key"), std::string("error:") + key) << code;
     }
     for (const int code : {0, -1, 399, 422, 1003, 1008, 1399, 1406, 1800, 1803, 1804, 1805}) {
@@ -80,12 +78,9 @@ TEST_F(ErrorStateTest, BusyAsksTheMountTable) {
 TEST_F(ErrorStateTest, LongPathAsksWhetherTheShareIsEncrypted) {
     addShare("secret", "valid users = alice\nvexo:encrypted = yes\n");
     for (const auto& [share, code, left, log] : Rows<const char*, int, int, const char*>{
-             {"secret", 413, 0, ""},
-             {"photo", 412, 0, ""},
-             {"home", 412, 0, ""},
-             {"nowhere", 412, 408, "orveldir:# VEXOShareGet fail nowhere"},
-             {"no\nwhere", 412, 408, "orveldir:# VEXOShareGet fail no\\x0Awhere"},
-         }) {
+             row("secret", 413, 0, ""), row("photo", 412, 0, ""), row("home", 412, 0, ""),
+             row("nowhere", 412, 408, "orveldir:# VEXOShareGet fail nowhere"),
+             row("no\nwhere", 412, 408, "orveldir:# VEXOShareGet fail no\\x0Awhere")}) {
         OrvLibSetErr(0);
         EXPECT_EQ(OrvParseErrnoToError(ENAMETOOLONG, share, nullptr), code) << share;
         EXPECT_EQ(OrvLibGetErr(), left) << share;

@@ -6,28 +6,26 @@ namespace {
 class HomePathTest : public ApplianceTest {};
 
 TEST_F(HomePathTest, LocalUsers) {
-    for (const auto& [path, user, home] : Rows<const char*, const char*, bool>{
-             {"home", nullptr, true},
-             {"/home", nullptr, true},
-             {"/home", "bob", true},
-             {"/home/", nullptr, true},
-             {"/home/x", "alice", true},
-             {"/Home/x", nullptr, false},
-             {"home/x", nullptr, false},
-             {"/homex", nullptr, false},
-             {"", "alice", false},
-             {"/", nullptr, false},
-             {"/homes/alice", nullptr, false},
-             {"/homes", "alice", false},
-             {"/homes/alice", "alice", true},
-             {"/HOMES/Alice/x", "alice", true},
-             {"/homes/alicex", "alice", false},
-             {"/homes/alic", "alice", false},
-             {"/homes/alice/x", "bob", false},
-             {"/homes//alice", "alice", false},
-             {"/homesick/alice", "alice", false},
-             {"/photo/alice", "alice", false},
-         }) {
+    for (const auto& [path, user, home] : Rows<const char*, const char*, bool>{row("home", nullptr, true),
+                                                                               row("/home", nullptr, true),
+                                                                               row("/home", "bob", true),
+                                                                               row("/home/", nullptr, true),
+                                                                               row("/home/x", "alice", true),
+                                                                               row("/Home/x", nullptr, false),
+                                                                               row("home/x", nullptr, false),
+                                                                               row("/homex", nullptr, false),
+                                                                               row("", "alice", false),
+                                                                               row("/", nullptr, false),
+                                                                               row("/homes/alice", nullptr, false),
+                                                                               row("/homes", "alice", false),
+                                                                               row("/homes/alice", "alice", true),
+                                                                               row("/HOMES/Alice/x", "alice", true),
+                                                                               row("/homes/alicex", "alice", false),
+                                                                               row("/homes/alic", "alice", false),
+                                                                               row("/homes/alice/x", "bob", false),
+                                                                               row("/homes//alice", "alice", false),
+                                                                               row("/homesick/alice", "alice", false),
+                                                                               row("/photo/alice", "alice", false)}) {
         EXPECT_EQ(IsDirUserHome(path, user), home) << path << " for " << (user != nullptr ? user : "null");
     }
     EXPECT_EQ(vexo::gate::calls("*"), 0) << "the platform is not asked about local users";

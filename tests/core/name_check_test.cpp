@@ -53,21 +53,17 @@ TEST_F(NameCheckTest, Paths) {
     // `existing` on success; `log` "" for none.
     for (const auto& [path, walkUp, code, platformError, existing, log] :
          Rows<std::string, bool, int, int, std::string, const char*>{
-             {"", true, 400, 0, "", ""},
-             {"relative/x", true, 400, VEXO_ERR_PARAMETER, "", ""},
-             {"/", true, 408, VEXO_ERR_MISSING, "", ""},
-             {"//x", false, 400, 0, "", ""},
-             {"/no-such-volume/a", true, 408, VEXO_ERR_MISSING, "", ""},
-             {disk + "/file/", true, 0, 0, disk + "/file", ""},
-             {disk + "/new/deeper", false, 408, VEXO_ERR_MISSING, "", ""},
-             {disk + "/n?w/..", true, 0, 0, disk, ""},
-             {disk + "/" + longName, true, 0, 0, disk, ""},
-             {disk + "/" + longName, false, 401, VEXO_ERR_GENERAL, "", "Failed to lstat"},
-             {disk + "/fifo", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"},
-             {disk + "/link", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"},
-             {fat + "/a/b?c", true, 419, 0, fat, ""},
-             {fat + "/a/b", true, 0, 0, fat, ""},
-             {dead + "/gone", false, 410, VEXO_ERR_REMOTE_MOUNT, "", ""}}) {
+             row("", true, 400, 0, "", ""), row("relative/x", true, 400, VEXO_ERR_PARAMETER, "", ""),
+             row("/", true, 408, VEXO_ERR_MISSING, "", ""), row("//x", false, 400, 0, "", ""),
+             row("/no-such-volume/a", true, 408, VEXO_ERR_MISSING, "", ""),
+             row(disk + "/file/", true, 0, 0, disk + "/file", ""),
+             row(disk + "/new/deeper", false, 408, VEXO_ERR_MISSING, "", ""),
+             row(disk + "/n?w/..", true, 0, 0, disk, ""), row(disk + "/" + longName, true, 0, 0, disk, ""),
+             row(disk + "/" + longName, false, 401, VEXO_ERR_GENERAL, "", "Failed to lstat"),
+             row(disk + "/fifo", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"),
+             row(disk + "/link", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"),
+             row(fat + "/a/b?c", true, 419, 0, fat, ""), row(fat + "/a/b", true, 0, 0, fat, ""),
+             row(dead + "/gone", false, 410, VEXO_ERR_REMOTE_MOUNT, "", "")}) {
         SCOPED_TRACE(path + (walkUp ? " up" : ""));
         OrvLibSetErr(0);
         VLIBCErrSetEx(0, "", 0);
@@ -126,12 +122,9 @@ TEST_F(NameCheckTest, SupportedFileSystems) {
     addMount("/usbshare1/net", "nfs4");
     addMount("/usbshare1/strange", "fuseblk");
     addMount("/esata1", "cifs");
-    for (const auto& [path, supported] : Rows<std::string, bool>{{internal, true},
-                                                                 {usb, true},
-                                                                 {usb + "/a/b", true},
-                                                                 {usb + "/net/a", false},
-                                                                 {usb + "/strange", false},
-                                                                 {esata, true}}) {
+    for (const auto& [path, supported] :
+         Rows<std::string, bool>{row(internal, true), row(usb, true), row(usb + "/a/b", true),
+                                 row(usb + "/net/a", false), row(usb + "/strange", false), row(esata, true)}) {
         EXPECT_EQ(OrvLibFileSystemSupported(path.c_str()), supported) << path;
     }
     announceLog("Bad parameters: relative");

@@ -41,11 +41,9 @@ TEST(PrivilegeDecision, WhatAMaskForbids) {
 }
 
 TEST(PrivilegeDecision, RequestedPermissions) {
-    for (const auto& [requested, bit] : Rows<int, unsigned>{{ORV_ACCESS_READ, 0x4},
-                                                            {ORV_ACCESS_WRITE, 0x2},
-                                                            {ORV_ACCESS_EXECUTE, 0x1},
-                                                            {ORV_ACCESS_DELETE, 0x200},
-                                                            {ORV_ACCESS_APPEND, 0x8}}) {
+    for (const auto& [requested, bit] :
+         Rows<int, unsigned>{row(ORV_ACCESS_READ, 0x4), row(ORV_ACCESS_WRITE, 0x2), row(ORV_ACCESS_EXECUTE, 0x1),
+                             row(ORV_ACCESS_DELETE, 0x200), row(ORV_ACCESS_APPEND, 0x8)}) {
         EXPECT_TRUE(orvel::aclGrants(bit, requested)) << requested;
         EXPECT_FALSE(orvel::aclGrants(0x1FFF & ~bit, requested)) << requested;
         EXPECT_FALSE(orvel::aclGrants(bit, 31)) << requested;

@@ -26,16 +26,12 @@ class SharePathTest : public ApplianceTest {};
 TEST_F(SharePathTest, Components) {
     const std::string deep = "/" + std::string(4093, 'a') + "bc";
     for (const auto& [text, first, last, log] : Rows<std::string, const char*, const char*, const char*>{
-             {"/a/b/c", "a", "c", ""},
-             {"//a//b//", "a", "b", ""},
-             {"a/b", "a", "b", ""},
-             {"/\xff\xfe/..", "\xff\xfe", "..", ""},
-             {"/only", "only", "only", ""},
-             {"photo", nullptr, nullptr, "orveldir(#): bad path name=photo"},
-             {"", nullptr, nullptr, "orveldir(#): bad path name="},
-             {"/", nullptr, nullptr, "orveldir(#) error path"},
-             {"//", nullptr, nullptr, "orveldir(#) error path"},
-         }) {
+             row("/a/b/c", "a", "c", ""), row("//a//b//", "a", "b", ""), row("a/b", "a", "b", ""),
+             row("/\xff\xfe/..", "\xff\xfe", "..", ""), row("/only", "only", "only", ""),
+             row("photo", nullptr, nullptr, "orveldir(#): bad path name=photo"),
+             row("", nullptr, nullptr, "orveldir(#): bad path name="),
+             row("/", nullptr, nullptr, "orveldir(#) error path"),
+             row("//", nullptr, nullptr, "orveldir(#) error path")}) {
         for (const int wanted : {1, 0}) {
             std::string path = text;
             const std::unique_ptr<char, decltype(&free)> found(OrvLibGetTokOfPath(path.data(), wanted), free);
@@ -58,15 +54,9 @@ TEST_F(SharePathTest, Components) {
 TEST_F(SharePathTest, SharesResolve) {
     const std::string root = shareRoot("photo"), longRest = "/" + std::string(5000, 'x');
     for (const auto& [path, rest] : Rows<std::string, std::string>{
-             {"/photo", ""},
-             {"/photo/2012/a.jpg", "/2012/a.jpg"},
-             {"/photo/", "/"},
-             {"//photo/a", "/a"},
-             {"photo/a", "/a"},
-             {"/photo//a/../b/./", "//a/../b/./"},
-             {"/photo/\xff\n", "/\xff\n"},
-             {"/photo" + longRest, longRest},
-         }) {
+             row("/photo", ""), row("/photo/2012/a.jpg", "/2012/a.jpg"), row("/photo/", "/"), row("//photo/a", "/a"),
+             row("photo/a", "/a"), row("/photo//a/../b/./", "//a/../b/./"), row("/photo/\xff\n", "/\xff\n"),
+             row("/photo" + longRest, longRest)}) {
         const Resolved out = resolve(path.c_str(), "alice");
         EXPECT_EQ(out.result, 1) << path;
         EXPECT_EQ(out.real, root + rest);
@@ -183,10 +173,8 @@ TEST_F(SharePathTest, CanonicalPaths) {
     EXPECT_EQ(std::string(resolved), root + "/a");
 
     for (const auto& [path, failure, code] :
-         Rows<std::string, int, int>{{root + "/none", ENOENT, 408},
-                                     {root + "/file/x", ENOTDIR, 401},
-                                     {"/" + std::string(5000, 'x'), ENAMETOOLONG, 401},
-                                     {"", ENOENT, 408}}) {
+         Rows<std::string, int, int>{row(root + "/none", ENOENT, 408), row(root + "/file/x", ENOTDIR, 401),
+                                     row("/" + std::string(5000, 'x'), ENAMETOOLONG, 401), row("", ENOENT, 408)}) {
         EXPECT_EQ(OrvLibRealFullPathGet(path.c_str(), resolved, 4095), 0);
         EXPECT_EQ(errno, failure);
         EXPECT_EQ(OrvLibGetErr(), code) << path;
@@ -233,12 +221,10 @@ TEST_F(SharePathTest, TranslationFillsAtMostOneByteLess) {
 TEST_F(SharePathTest, TranslationsThatFail) {
     char out[100] = "out", missing[] = "/nowhere/x", slashes[] = "//", home[] = "/home/a";
     for (const auto& [path, place, platform, log] : Rows<char*, char*, int, const char*>{
-             {nullptr, out, 0x0D00, "orveldir(#) bad parameter, oldpath=(null), new path=out"},
-             {missing, nullptr, 0x0D00, "orveldir(#) bad parameter, oldpath=/nowhere/x, new path=(null)"},
-             {slashes, out, 0x8100, "orveldir(#) error path\norveldir(#) OrvLibGetTokOfPath fail"},
-             {missing, out, 0x1400, ""},
-             {home, out, 0x1400, ""},
-         }) {
+             row(nullptr, out, 0x0D00, "orveldir(#) bad parameter, oldpath=(null), new path=out"),
+             row(missing, nullptr, 0x0D00, "orveldir(#) bad parameter, oldpath=/nowhere/x, new path=(null)"),
+             row(slashes, out, 0x8100, "orveldir(#) error path\norveldir(#) OrvLibGetTokOfPath fail"),
+             row(missing, out, 0x1400, ""), row(home, out, 0x1400, "")}) {
         VLIBCErrSetEx(0, "", 0);
         EXPECT_EQ(OrvLibTransFullPath(path, place, sizeof out), -1);
         EXPECT_EQ(VLIBCErrGet(), platform);
@@ -254,12 +240,9 @@ TEST_F(SharePathTest, TranslationsThatFail) {
 
 TEST_F(SharePathTest, EncryptedShares) {
     addShare("secret", "valid users = alice\nvexo:encrypted = yes\n");
-    for (const auto& [share, result, expected, code, log] :
-         Rows<const char*, int, bool, int, const char*>{{"secret", 1, true, 0, ""},
-                                                        {"photo", 1, false, 0, ""},
-                                                        {"home", 1, false, 0, ""},
-                                                        {"/home/x", 1, false, 0, ""},
-                                                        {"none", 0, false, 408, "orveldir:# VEXOShareGet fail none"}}) {
+    for (const auto& [share, result, expected, code, log] : Rows<const char*, int, bool, int, const char*>{
+             row("secret", 1, true, 0, ""), row("photo", 1, false, 0, ""), row("home", 1, false, 0, ""),
+             row("/home/x", 1, false, 0, ""), row("none", 0, false, 408, "orveldir:# VEXOShareGet fail none")}) {
         OrvLibSetErr(0);
         bool encrypted = true;
         EXPECT_EQ(OrvLibCheckEncryptShare(share, &encrypted), result) << share;

@@ -235,6 +235,13 @@ class Failures : public DirectoryWalkerTest {
                 std::sort(lines_.begin(), lines_.end());
                 EXPECT_TRUE(!ignored || lines_ == entries) << testing::PrintToString(lines_);
             }
+            if (!ignored) continue;
+            lines_.clear();
+            cause();
+            walk(Order::kWalk, static_cast<_enum_ignore_err_>(mode), root_ + start, before_, &after_);
+            EXPECT_EQ(std::count_if(lines_.begin(), lines_.end(), [](const auto& line) { return line[0] == '-'; }),
+                      static_cast<long>(entries.size()))
+                << "what is called before is called behind";
         }
     }
 };

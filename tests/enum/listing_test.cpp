@@ -246,11 +246,9 @@ TEST_F(ListingTest, NothingIsAskedWithoutNeedOrTwice) {
     EXPECT_EQ(entries_.back().realPath, real_ + "/d");
     EXPECT_EQ(vexo::gate::calls("VLIBCFileLStatAt"), 0);
     ASSERT_TRUE(list("name", kEverything));
-    for (const auto& [operation, calls] : Rows<const char*, int>{{"VEXOUserGetByUID", 1},
-                                                                 {"VEXOGroupGetByGID", 1},
-                                                                 {"VLIBCFileLStatAt", 4},
-                                                                 {"VEXOACLFolderOpen", 1},
-                                                                 {"VEXOACLPermGet", 0}})
+    for (const auto& [operation, calls] :
+         Rows<const char*, int>{row("VEXOUserGetByUID", 1), row("VEXOGroupGetByGID", 1), row("VLIBCFileLStatAt", 4),
+                                row("VEXOACLFolderOpen", 1), row("VEXOACLPermGet", 0)})
         EXPECT_EQ(vexo::gate::calls(operation), calls) << operation;
 }
 
@@ -322,16 +320,10 @@ TEST_F(ListingTest, FailingStatusOfOneEntry) {
     for (const std::string name : {"/local", "/server"}) makeFolder(real_ + name + "/dir");
     addMount(real_ + "/server/dir", "nfs4");
     for (const auto& [systemCode, remote, result, code] :
-         Rows<int, bool, int, int>{{ENOENT, false, 1, 0},
-                                   {EIO, false, -1, 0},
-                                   {EHOSTDOWN, false, -1, 0},
-                                   {ENOENT, true, 1, 0},
-                                   {EIO, true, 1, 0},
-                                   {ENXIO, true, 1, 0},
-                                   {EHOSTDOWN, true, 1, 0},
-                                   {EACCES, true, -1, ORV_ERR_DENIED},
-                                   {EPERM, false, -1, ORV_ERR_DENIED},
-                                   {ESTALE, true, -1, ORV_ERR_GENERAL}}) {
+         Rows<int, bool, int, int>{row(ENOENT, false, 1, 0), row(EIO, false, -1, 0), row(EHOSTDOWN, false, -1, 0),
+                                   row(ENOENT, true, 1, 0), row(EIO, true, 1, 0), row(ENXIO, true, 1, 0),
+                                   row(EHOSTDOWN, true, 1, 0), row(EACCES, true, -1, ORV_ERR_DENIED),
+                                   row(EPERM, false, -1, ORV_ERR_DENIED), row(ESTALE, true, -1, ORV_ERR_GENERAL)}) {
         SCOPED_TRACE(std::string(strerror(systemCode)) + (remote ? ", remote" : ""));
         const std::string parent = real_ + (remote ? "/server" : "/local"), child = parent + "/dir";
         const bool fatal = result == -1, unreachable = remote && !fatal;

@@ -20,19 +20,10 @@ class MountStatusTest : public ApplianceTest {
 
 TEST_F(MountStatusTest, TypeOfTheMountAtExactlyThisFolder) {
     OrvelMountStatus mounts;
-    for (const auto& [path, type] : Rows<const char*, int>{{"/volume1", 0},
-                                                           {"/volume1/", 0},
-                                                           {"/volume1///", 0},
-                                                           {"/volume1/usb", 1},
-                                                           {"/volume1/usb/deep", 3},
-                                                           {"/with blank", 6},
-                                                           {"/iso", 4},
-                                                           {"/volume1-b", 11},
-                                                           {"/volume1/a", 10},
-                                                           {"/vol", 10},
-                                                           {"/", 10},
-                                                           {"", 10},
-                                                           {nullptr, 10}}) {
+    for (const auto& [path, type] : Rows<const char*, int>{
+             row("/volume1", 0), row("/volume1/", 0), row("/volume1///", 0), row("/volume1/usb", 1),
+             row("/volume1/usb/deep", 3), row("/with blank", 6), row("/iso", 4), row("/volume1-b", 11),
+             row("/volume1/a", 10), row("/vol", 10), row("/", 10), row("", 10), row(nullptr, 10)}) {
         EXPECT_EQ(mounts.getFSTYPE(path), type) << (path == nullptr ? "null" : path);
     }
 }

@@ -81,17 +81,10 @@ TEST_F(UserDirectoryTest, GroupsOfAUser) {
 }
 
 TEST_F(UserDirectoryTest, GroupListThatHoldsNoNumber) {
-    for (const auto& [text, good, gid] : Rows<const char*, bool, unsigned>{{"100", true, 100},
-                                                                           {" 100", true, 100},
-                                                                           {"4294967295", true, 0xFFFFFFFF},
-                                                                           {"4294967301", true, 5},
-                                                                           {"100x", false, 0},
-                                                                           {"100 ", false, 0},
-                                                                           {"", false, 0},
-                                                                           {"-5", false, 0},
-                                                                           {" -5", false, 0},
-                                                                           {"99999999999999999999", false, 0},
-                                                                           {"\n", false, 0}}) {
+    for (const auto& [text, good, gid] : Rows<const char*, bool, unsigned>{
+             row("100", true, 100), row(" 100", true, 100), row("4294967295", true, 0xFFFFFFFF),
+             row("4294967301", true, 5), row("100x", false, 0), row("100 ", false, 0), row("", false, 0),
+             row("-5", false, 0), row(" -5", false, 0), row("99999999999999999999", false, 0), row("\n", false, 0)}) {
         orvel::StringList list(VLIBCSzListAlloc(4));
         for (const char* item : {"7", text, "8"}) {
             auto* raw = list.release();

@@ -243,25 +243,6 @@ TEST_F(AccountTest, Administrators) {
     }
 }
 
-TEST_F(AccountTest, SupplementaryGroups) {
-    SKIP_WITHOUT_ROOT();
-    addGroup("a", 20170, {"alice"});
-    inChild([] {
-        EXPECT_EQ(VEXOUserInitGroups("alice", 777), 0);
-        gid_t gids[16];
-        const int count = getgroups(16, gids);
-        EXPECT_EQ(std::vector<gid_t>(gids, gids + count), (std::vector<gid_t>{777, 20170}));
-        EXPECT_EQ(VEXOUserInitGroups("nobody known", 778), 0);
-        EXPECT_EQ(getgroups(16, gids), 1);
-        return 0;
-    });
-    asUser(kBobUid, kUsersGid, [] {
-        EXPECT_EQ(VEXOUserInitGroups("alice", 0), -1);
-        EXPECT_EQ(errno, EPERM);
-        return 0;
-    });
-}
-
 TEST_F(AccountTest, Lists) {
     addUser("DOM\\dora", 20010, 20190);
     addGroup("DOM\\Domain Users", 20190, {});

@@ -16,13 +16,9 @@ TEST_F(DdnsTest, EntriesByProvider) {
                   "[here.example]\r\nuser=\"u\"\r\nhostname=\"box.here.example\"\r\n"
                   "# [commented]\nhostname=\"second.is.ignored\"\n"
                   "[there]\nuser=\"nobody\"\n[link]\nhostname=\"a/b@c\"\n[last]\nhostname=last.example");
-    for (const auto& [provider, host] : Rows<const char*, const char*>{{"here.example", "box.here.example"},
-                                                                       {"last", "last.example"},
-                                                                       {"Here.Example", nullptr},
-                                                                       {"there", nullptr},
-                                                                       {"link", nullptr},
-                                                                       {"missing", nullptr},
-                                                                       {"", nullptr}}) {
+    for (const auto& [provider, host] : Rows<const char*, const char*>{
+             row("here.example", "box.here.example"), row("last", "last.example"), row("Here.Example", nullptr),
+             row("there", nullptr), row("link", nullptr), row("missing", nullptr), row("", nullptr)}) {
         SCOPED_TRACE(provider);
         EXPECT_EQ(VEXODDNSConfigGet(provider, &entry) >= 0, host != nullptr);
         EXPECT_STREQ(entry.szHostname, host != nullptr ? host : "");

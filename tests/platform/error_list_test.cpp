@@ -67,28 +67,4 @@ TEST_F(PlatformBasics, HashKeepsTheFirstValueAndTheOrder) {
     VLIBCSzHashFree(nullptr);
 }
 
-TEST_F(PlatformBasics, GateFailsTheCallThatWasOrderedAndCounts) {
-    PVLIBCSZLIST list = listOf({});
-    vexo::gate::reset();
-    vexo::gate::fail("VLIBCSzListPush", VEXO_ERR_NO_SPACE, ENOSPC, 2);
-    EXPECT_EQ(VLIBCSzListPush(&list, "a"), 1);
-    errno = 0;
-    EXPECT_EQ(VLIBCSzListPush(&list, "a"), -1);
-    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_NO_SPACE);
-    EXPECT_EQ(errno, ENOSPC);
-    EXPECT_EQ(VLIBCSzListPush(&list, "a"), 2) << "an order strikes once";
-    EXPECT_EQ(vexo::gate::calls("VLIBCSzListPush"), 3);
-    EXPECT_EQ(vexo::gate::calls("VLIBCSzHashAlloc"), 0);
-    vexo::gate::reset();
-    vexo::gate::fail("VLIBCSzListPush", VEXO_ERR_GENERAL);
-    for (int time = 0; time < 2; ++time) EXPECT_EQ(VLIBCSzListPush(&list, "a"), -1) << "0 strikes at every call";
-    vexo::gate::reset();
-    vexo::gate::fail("*", VEXO_ERR_GENERAL, 0, 2);
-    VLIBCSzListFree(VLIBCSzListAlloc(0));
-    EXPECT_EQ(VLIBCSzListPush(&list, "a"), -1) << "the second call of any name";
-    EXPECT_EQ(VLIBCSzListPush(&list, "a"), 3);
-    EXPECT_EQ(vexo::gate::calls("*"), 3);
-    VLIBCSzListFree(list);
-}
-
 }  // namespace

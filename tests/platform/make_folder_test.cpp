@@ -51,12 +51,9 @@ TEST_F(MakeFolderTest, RefusalsTellWhereTheyStopped) {
     fs::create_symlink(root_ + "/elsewhere", root_ + "/link");
     const std::string longName(256, 'n');
     for (const auto& [name, recursive, systemCode, code] : Rows<std::string, int, int, int>{
-             {"a/b/c", 0, ENOENT, VEXO_ERR_MISSING},
-             {"file/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
-             {"file", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
-             {"dangling/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH},
-             {longName, 1, ENAMETOOLONG, VEXO_ERR_NAME_TOO_LONG},
-         }) {
+             row("a/b/c", 0, ENOENT, VEXO_ERR_MISSING), row("file/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH),
+             row("file", 1, ENOTDIR, VEXO_ERR_BAD_PATH), row("dangling/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH),
+             row(longName, 1, ENAMETOOLONG, VEXO_ERR_NAME_TOO_LONG)}) {
         const char* stopAt = "";
         const std::string path = root_ + "/" + name;
         EXPECT_FAILS(VEXOFSMkdirP(path.c_str(), &stopAt, recursive, kKeepUser, kKeepGroup, 0755), systemCode, code);

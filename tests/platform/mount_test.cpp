@@ -28,14 +28,10 @@ TEST_F(MountTest, TypeIsThatOfTheLongestMountAboveThePath) {
     addMount("/volume1/usb", "xfs");
     addMount("/volume1/usb", "vfat");  // mounted over it later
     addMount("/volume1/iso", "udf");
-    for (const auto& [path, type] : Rows<const char*, int>{{"/", 0},
-                                                           {"/volume10/a", 0},
-                                                           {"/volume1", 2},
-                                                           {"/volume1//usb//a", VEXO_FS_FAT},
-                                                           {"/volume1/usbx", 2},
-                                                           {"/volume1/iso/", 5},
-                                                           {"relative", VEXO_FS_UNKNOWN},
-                                                           {"", VEXO_FS_UNKNOWN}})
+    for (const auto& [path, type] :
+         Rows<const char*, int>{row("/", 0), row("/volume10/a", 0), row("/volume1", 2),
+                                row("/volume1//usb//a", VEXO_FS_FAT), row("/volume1/usbx", 2), row("/volume1/iso/", 5),
+                                row("relative", VEXO_FS_UNKNOWN), row("", VEXO_FS_UNKNOWN)})
         EXPECT_EQ(VEXOGetFSType(path, 0), type) << path;
     for (int type = -1; type <= 12; ++type) {
         EXPECT_EQ(VEXOFSIsRemoteFS(type), static_cast<int>(type >= 6 && type <= 8)) << type;
@@ -47,13 +43,9 @@ TEST_F(MountTest, MountPointsAreFoundWithoutTouchingTheFileSystem) {
     addMount("/nowhere/remote", "cifs");
     addMount("/nowhere/my\\040disk", "iso9660");
     addMount("/nowhere/other", "fuse.sshfs");
-    for (const auto& [path, index, remote, typeName] :
-         Rows<const char*, int, int, const char*>{{"//", 0, 0, "ext4"},
-                                                  {"/nowhere/remote///", 1, 1, "cifs"},
-                                                  {"/nowhere/remote/a", -1, 0, ""},
-                                                  {"/nowhere/my disk", 2, 0, "iso9660"},
-                                                  {"/nowhere/other", 3, 0, "fuse.sshfs"},
-                                                  {"", -1, 0, ""}}) {
+    for (const auto& [path, index, remote, typeName] : Rows<const char*, int, int, const char*>{
+             row("//", 0, 0, "ext4"), row("/nowhere/remote///", 1, 1, "cifs"), row("/nowhere/remote/a", -1, 0, ""),
+             row("/nowhere/my disk", 2, 0, "iso9660"), row("/nowhere/other", 3, 0, "fuse.sshfs"), row("", -1, 0, "")}) {
         SCOPED_TRACE(path);
         errno = EHOSTDOWN;
         EXPECT_EQ(VEXOFSIsInMountTable(path), index);

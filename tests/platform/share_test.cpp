@@ -116,16 +116,14 @@ TEST_F(ShareTest, RightsFromLists) {
     addUser("erin", 20030, kUsersGid);
     addGroup("Editors", 20130, {"erin"});
     for (const auto& [options, alice, bob, erin] : Rows<const char*, int, int, int>{
-             {"", 1, 1, 1},
-             {"read only = no\n", 2, 2, 2},
-             {"valid users = ALICE, @editors\nwrite list = bob\n", 1, 2, 1},
-             {"valid users = +Editors\nread list = alice\nread only = no\n", 1, 0, 2},
-             {"valid users = &Editors\ninvalid users = +users\n", 0, 0, 0},
-             {"invalid users = bob @none\nwrite list = bob @Editors\nread only = yes\n", 1, 0, 2},
-             {"valid users = \"\"\nread only = no\n", 0, 0, 0},
-             {"write list = erin\nread list = erin alice\nvalid users = @users\ninvalid users = @\"no such\"\n", 1, 1,
-              2},
-         }) {
+             row("", 1, 1, 1), row("read only = no\n", 2, 2, 2),
+             row("valid users = ALICE, @editors\nwrite list = bob\n", 1, 2, 1),
+             row("valid users = +Editors\nread list = alice\nread only = no\n", 1, 0, 2),
+             row("valid users = &Editors\ninvalid users = +users\n", 0, 0, 0),
+             row("invalid users = bob @none\nwrite list = bob @Editors\nread only = yes\n", 1, 0, 2),
+             row("valid users = \"\"\nread only = no\n", 0, 0, 0),
+             row("write list = erin\nread list = erin alice\nvalid users = @users\ninvalid users = @\"no such\"\n", 1,
+                 1, 2)}) {
         addShare("music", options);
         SDK::Share* share = SDK::Share::LoadShare("music");
         ASSERT_NE(share, nullptr);
@@ -178,11 +176,9 @@ TEST_F(ShareTest, RootsWithVariablesFollowTheUser) {
     define("[own]\npath = /v/%U\n[all]\npath = /v/%S.%g.%u\n[dom]\npath = /%D/%U\n");
     for (const auto& [user, own, all, dom, names] :
          Rows<const char*, const char*, const char*, const char*, const char*>{
-             {"alice", "/v/alice", "/v/all.users.alice", "", "own|all|"},
-             {"DOM\\dora", "/v/dora", "/v/all.users.DOM\\dora", "/DOM/dora", "own|all|dom|"},
-             {"..", "", "/v/all.users...", "", "all|"},
-             {"nobody known", "", "/v/all..", "", "all|"},
-         }) {
+             row("alice", "/v/alice", "/v/all.users.alice", "", "own|all|"),
+             row("DOM\\dora", "/v/dora", "/v/all.users.DOM\\dora", "/DOM/dora", "own|all|dom|"),
+             row("..", "", "/v/all.users...", "", "all|"), row("nobody known", "", "/v/all..", "", "all|")}) {
         setenv("REMOTE_USER", user, 1);
         EXPECT_EQ(rootOf("own"), own) << user;
         EXPECT_EQ(rootOf("all"), all) << user;

@@ -17,6 +17,7 @@
 #include <memory>
 #include <string>
 #include <tuple>
+#include <utility>
 #include <vector>
 
 #include "fault_gate.h"
@@ -30,6 +31,12 @@ namespace support {
 // The rows of a table: for (const auto& [path, type] : Rows<const char*, int>{{"/", 0}, {"/volume1", 2}}) ...
 template <class... Fields>
 using Rows = std::vector<std::tuple<Fields...>>;
+
+// One row, where several short ones stand on a line: Rows<const char*, int>{row("/", 0), row("/volume1", 2)}.
+template <class... Fields>
+std::tuple<Fields...> row(Fields... fields) {
+    return {std::move(fields)...};
+}
 
 // The status of what must be there, no link followed.
 inline struct stat statusOf(const std::string& path) {

@@ -33,23 +33,12 @@ class ExternalHost : public ApplianceTest {
 TEST(HostHeader, Table) {
     const std::string longest(4095, 'h');
     for (const auto& [text, host, port] : Rows<std::string, std::string, std::string>{
-             {"", "", ""},
-             {"box", "box", ""},
-             {"192.168.1.10:5000", "192.168.1.10", "5000"},
-             {"box:5000/x:1", "box", "5000"},
-             {"box/x:1", "box", ""},
-             {"box:", "box", ""},
-             {"box:/x", "box", ""},
-             {"box:1:2", "box", "1:2"},
-             {":80", "", "80"},
-             {"[fe80::1]:5000", "[fe80::1]", "5000"},
-             {"[fe80::1]", "[fe80::1]", ""},
-             {"[fe80::1]x:80", "[fe80::1]", ""},
-             {"[a/b]:80/", "[a/b]", "80"},
-             {"[fe80", "[fe80", ""},
-             {"[]]:1", "[]", ""},
-             {longest + "xx:" + longest + "yy", longest, longest},
-         }) {
+             row("", "", ""), row("box", "box", ""), row("192.168.1.10:5000", "192.168.1.10", "5000"),
+             row("box:5000/x:1", "box", "5000"), row("box/x:1", "box", ""), row("box:", "box", ""),
+             row("box:/x", "box", ""), row("box:1:2", "box", "1:2"), row(":80", "", "80"),
+             row("[fe80::1]:5000", "[fe80::1]", "5000"), row("[fe80::1]", "[fe80::1]", ""),
+             row("[fe80::1]x:80", "[fe80::1]", ""), row("[a/b]:80/", "[a/b]", "80"), row("[fe80", "[fe80", ""),
+             row("[]]:1", "[]", ""), row(longest + "xx:" + longest + "yy", longest, longest)}) {
         const auto split = orvel::splitHostHeader(text.c_str());
         EXPECT_EQ(split.host, host) << text;
         EXPECT_EQ(split.port, port) << text;

@@ -36,20 +36,13 @@ TEST_F(FileIcon, Folders) {
     addMount("/photo/other", "fuse.something");
     addMount("/photo/#recycle", "cifs");
     for (const auto& [path, share, expected] : Rows<const char*, const char*, const char*>{
-             {"/photo/iso", "/photo", "isomountpoint.png"},
-             {"/photo/nas", "", "remotemountpoint.png"},
-             {"/photo/disk", "/photo", "folder.png"},
-             {"/photo/other", "/photo", "folder.png"},
-             {"/photo/nas/below", "/photo", "folder.png"},
-             {"/photo/#recycle", "/photo", "remotemountpoint.png"},
-             {"/music/#recycle", "/music", "recycle_bin.png"},
-             {"/music/#recycle/", "music", "recycle_bin.png"},
-             {"/music/#recycle", "", "folder.png"},
-             {"/music/#recycle", "/", "folder.png"},
-             {"/music/a/#recycle", "/music/a", "folder.png"},
-             {"/music/#Recycle", "/music", "folder.png"},
-             {"", "/music", "folder.png"},
-         })
+             row("/photo/iso", "/photo", "isomountpoint.png"), row("/photo/nas", "", "remotemountpoint.png"),
+             row("/photo/disk", "/photo", "folder.png"), row("/photo/other", "/photo", "folder.png"),
+             row("/photo/nas/below", "/photo", "folder.png"), row("/photo/#recycle", "/photo", "remotemountpoint.png"),
+             row("/music/#recycle", "/music", "recycle_bin.png"), row("/music/#recycle/", "music", "recycle_bin.png"),
+             row("/music/#recycle", "", "folder.png"), row("/music/#recycle", "/", "folder.png"),
+             row("/music/a/#recycle", "/music/a", "folder.png"), row("/music/#Recycle", "/music", "folder.png"),
+             row("", "/music", "folder.png")})
         EXPECT_EQ(icon("x", true, path, share), expected) << path << " " << share;
     EXPECT_EQ(icon(nullptr, true, "/photo/iso", "/photo"), "misc.png");
     vexo::gate::fail("VEXOGetFSType", 0x8100);
