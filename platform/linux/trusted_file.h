@@ -11,7 +11,7 @@
 namespace vexo {
 
 // openFile for such a name: follows no link and waits for nothing. What may not be trusted (isTrusted) is not opened:
-// empty with EACCES.
+// empty with EACCES. A file that is replaced meanwhile is not met: what has the name then is opened.
 [[nodiscard]] Descriptor openTrusted(const std::string& path, int flags, mode_t mode = 0);
 
 // The platform error number for an errno value of such a file.

@@ -2,6 +2,10 @@
 #include "vexo/line_file.h"
 
 #include <sys/mount.h>
+#include <sys/wait.h>
+
+#include <csignal>
+#include <cstdio>
 
 #include "platform/planted_files.h"
 #include "platform/private_mounts.h"
@@ -82,6 +86,24 @@ TEST_F(LineFile, PlantedFilesAreRefusedAtOnce) {
         EXPECT_REFUSED(VLIBCFileAddLine(kFile, "line", 512));
         EXPECT_REFUSED(VexoCgiBeginCriticalSection(kFile, 30000));
     });
+}
+
+// Who looks for a line holds no lock while a check renames its rewrite onto the file.
+TEST_F(LineFile, AFileThatIsReplacedMeanwhileIsReadAllTheSame) {
+    writeFile(file_, "a,b\n", 0600);
+    const pid_t replacer = fork();
+    for (const std::string rewrite = file_ + ".tmp"; replacer == 0;) {
+        writeFile(rewrite, "a,b\n", 0600);
+        if (rename(rewrite.c_str(), file_.c_str()) != 0) _exit(1);
+    }
+    int missed = 0;
+    for (int i = 0; i < 20000; ++i) {
+        char line[8];
+        missed += VLIBCFileGetLine(kFile, "b", line, sizeof line, ",") == 1 ? 0 : 1;
+    }
+    kill(replacer, SIGKILL);
+    waitpid(replacer, nullptr, 0);
+    EXPECT_EQ(missed, 0);
 }
 
 TEST_F(LineFile, WhoActsForAUserWritesAsRoot) {
