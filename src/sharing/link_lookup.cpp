@@ -73,6 +73,7 @@ bool readLink(PVEXODBRESULT result, time_t now, std::string& path) {
     }
     const char* stored = VEXODBFetchField(result, row, "filepath");
     if (stored != nullptr) path = stored;
+    for (const char* unused : {"filename", "password"}) VEXODBFetchField(result, row, unused);  // kept
     return isOpen(result, row, now);
 }
 

@@ -48,7 +48,7 @@ bool isAsWritten(std::string_view bytes, const LoginRecord& record) {
                                record.loginTime.size() + record.accessTime.size() + record.position.size() +
                                record.neverExpires.size() + record.link.size();
     constexpr std::size_t kSeparators = 8;  // the end of the line among them
-    return bytes.size() == fields + kSeparators && record.position.end()[0] == ',' &&
+    return bytes.size() == fields + kSeparators && bytes.ends_with('\n') && record.position.end()[0] == ',' &&
            record.link.end() == bytes.end() - 1;
 }
 

@@ -35,6 +35,12 @@ class LockedFile {
             file_ = openOnce();
         } while (file_ && !lock());
     }
+    // By name, not by closing alone: a forked child may hold the descriptor too.
+    ~LockedFile() {
+        if (file_) flock(file_.get(), LOCK_UN);
+    }
+    LockedFile(const LockedFile&) = delete;
+    LockedFile& operator=(const LockedFile&) = delete;
     explicit operator bool() const { return static_cast<bool>(file_); }
     [[nodiscard]] bool makeReadable() const { return fchmod(file_.get(), 0644) == 0; }
 

@@ -27,6 +27,9 @@ TEST(LoginRecordTest, LinesAsTheyAreReadAndWrittenBack) {
         {"", ""},
         {whole + whole, whole + whole},
         {"a,u,s,1,2,3,4,l", "a,u,s,1,2,3,4,l\n"},                         // torn behind the last field
+        {"a,u,s,1,2,3,4,l\r", "a,u,s,1,2,3,4,l\n"},                       // or within its end
+        {"a,u,s,1,2,3,4,l,", "a,u,s,1,2,3,4,l\n"},                        // or with more behind it
+        {std::string("a,u,s,1,2,3,4,l\0", 16), "a,u,s,1,2,3,4,l\n"},      // or not wholly on the disk
         {"a,u,s,1,2,3\n", "a,u,s,1,2,3,0,0\n"},                           // six fields make a record
         {"a,u,s,1,2,3,7\n", "a,u,s,1,2,3,7,0\n"},                         // seven
         {"a,u,s,1,2\n" + whole, whole},                                   // five do not
