@@ -44,7 +44,11 @@ int main(int argc, char** argv) {
         {"floor: openat, getdents64, statx", {here + "/floor_walk", folder}, {}, {}, {}},
         {"orvel, search that finds 1 in 100", {search, "/bench", "*77.jpg"}, {}, {}, {}},
         {"orvel, search that finds everything", {search, "/bench", "*"}, {}, {}, {}},
-        {"find, every status and 1 in 100 printed", {"find", folder, "-size", "-1000000", ",", "-iname", "*77.jpg"}, {}, {}, {}},
+        {"find, every status and 1 in 100 printed",
+         {"find", folder, "-size", "-1000000", ",", "-iname", "*77.jpg"},
+         {},
+         {},
+         {}},
         {"find, everything printed with ls's columns", {"find", folder, "-ls"}, {}, {}, {}},
     };
     bench::contest(contenders, argc > 2 ? atoi(argv[2]) : 11);
