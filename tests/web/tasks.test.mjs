@@ -2,7 +2,7 @@
 import assert from "node:assert/strict";
 import { existsSync, mkdirSync, readdirSync, writeFileSync } from "node:fs";
 import { after, before, test } from "node:test";
-import { launch, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+import { launch, row, rowsReady, screenshot, URL_OF_PAGE, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const MANY = 20_000;
@@ -74,6 +74,17 @@ test("a search with every kind of criterion, stopped, closed", () => withPage(ch
   await page.waitForSelector(".home");
 }));
 
+test("results from several shares", () => withPage(chrome, "alice", { path: "/" }, async (page) => {
+  await page.fill("#find", "*morn*, *night*, *notes*, plan*, IMG_001?.*");
+  await page.press("#find", "Enter");
+  await page.waitForSelector("#view >> text=plan.pdf");
+  await page.waitForFunction(() => !document.querySelector("#status .running"));
+  await page.click("[data-sort=ppath]");
+  await page.waitForSelector("[aria-sort=ascending] [data-sort=ppath]");
+  await rowsReady(page);
+  await screenshot(page, "search-shares");
+}));
+
 test("copy, reload, cancel; a conflict; delete and restore", () => withPage(chrome, "admin", { path: "/projects" }, async (page) => {
   await row(page, "many").click();
   await page.keyboard.press("Control+c");
@@ -112,6 +123,18 @@ test("copy, reload, cancel; a conflict; delete and restore", () => withPage(chro
   await page.click("#toolbar >> text=Restore");
   await page.waitForSelector(".activity-card.good >> text=Restore 1 item");
   assert.ok(existsSync(`${projects}/<i>odd/needle & four.txt`));
+}));
+
+test("dragged to another folder", () => withPage(chrome, "alice", { path: "/projects" }, async (page) => {
+  await row(page, "left by bob.txt").click({ modifiers: ["Control"] });
+  await row(page, "notes.md").click({ modifiers: ["Control"] });
+  await row(page, "notes.md").dragTo(row(page, "house"));
+  await page.waitForSelector(".activity-card >> text=Move 2 items");
+  await page.waitForFunction(() => !document.querySelector("#view")?.textContent.includes("notes.md"));
+  await page.goto(`${URL_OF_PAGE}#/projects/house`);
+  await row(page, "notes.md").dragTo(page.locator("#tree >> text=projects"));
+  await page.waitForFunction(() => document.querySelectorAll(".activity-card.finished").length === 2);
+  assert.ok(existsSync(`${projects}/notes.md`));
 }));
 
 test("packed, extracted, refused item by item", () => withPage(chrome, "alice", { path: "/projects" }, async (page) => {

@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <initializer_list>
 
+#include "demo/picture.h"
+
 namespace orvel::ctl::appliance {
 namespace {
 
@@ -49,6 +51,18 @@ void fillRecycleBin(Tree& tree) {
     tree.file("#recycle/old drafts/draft 1.odt", 48000, kStart + 950 * kDay);
 }
 
+// Pictures that can be looked at, unlike the others, which are empty space.
+void fillLandscapes(Tree& tree) {
+    static constexpr const char* kTitles[] = {"Early morning", "Noon",        "Blue hour",   "Meadow",
+                                              "Dusk",          "First frost", "Heather",     "After the rain",
+                                              "Harvest",       "Far hills",   "North slope", "Last light"};
+    tree.folder("Landscapes");
+    int number = 0;
+    for (const char* title : kTitles) {
+        tree.textFile("Landscapes/" + std::string(title) + ".png", landscape(number++));
+    }
+}
+
 }  // namespace
 
 void fillPhoto(Tree& tree) {
@@ -62,6 +76,7 @@ void fillPhoto(Tree& tree) {
                   kStart + static_cast<time_t>(numbers.below(4500 * uint64_t{kDay})));
     }
     for (int year = 2012; year <= 2024; ++year) fillYear(tree, year, numbers);
+    fillLandscapes(tree);
     fillRecycleBin(tree);
 }
 

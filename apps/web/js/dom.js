@@ -22,12 +22,21 @@ export function set(node, attributes) {
   return node;
 }
 
+// The icons become part of the document: drawn at once, asked for once.
+export async function loadIcons() {
+  const text = await (await fetch("icons.svg")).text();
+  const sprite = new DOMParser().parseFromString(text, "image/svg+xml").documentElement;
+  sprite.setAttribute("class", "sprite");
+  sprite.setAttribute("aria-hidden", "true");
+  document.body.prepend(document.adoptNode(sprite));
+}
+
 export function icon(name, className = "icon") {
   const svg = document.createElementNS("http://www.w3.org/2000/svg", "svg");
   svg.setAttribute("class", className);
   svg.setAttribute("aria-hidden", "true");
   const use = document.createElementNS("http://www.w3.org/2000/svg", "use");
-  use.setAttribute("href", `icons.svg#${name}`);
+  use.setAttribute("href", `#i-${name}`);
   svg.append(use);
   return svg;
 }
@@ -44,7 +53,7 @@ const CONTROLS = { 7: "BEL", 8: "BS", 9: "TAB", 10: "LF", 11: "VT", 12: "FF", 13
 const ODD = /[\u0000-\u001F\u007F-\u009F\u202A-\u202E\u2066-\u2069\u200E\u200F\u061C\uFFFD]/u;
 const ODD_RUN = /([\u0000-\u001F\u007F-\u009F\u202A-\u202E\u2066-\u2069\u200E\u200F\u061C\uFFFD])/u;
 const PLAIN = /^[\u0020-\u024F]*$/u;
-const TAIL = 9;
+const TAIL = 8;
 
 // A name for people: characters that would hide, move or break text show as marks.
 export function nameNode(name) {
@@ -52,7 +61,7 @@ export function nameNode(name) {
   if (!ODD.test(name)) {
     const cut = name.length - TAIL;
     // The end, with the extension, stays in sight when the name is cut.
-    if (cut > TAIL && PLAIN.test(name)) {
+    if (cut > 5 && PLAIN.test(name)) {
       node.append(h("span.stem", {}, name.slice(0, cut)), h("span.tail", {}, name.slice(cut)));
     } else {
       node.append(h("span.stem", {}, name));

@@ -4,7 +4,7 @@ import { setupActivity } from "./activity.js";
 import { browser, columns, goUp, loadShares, open, refresh, setFilter, setSort, shareEntry } from "./browser.js";
 import { context, runCommand } from "./commands.js";
 import { setWhy } from "./dialogs.js";
-import { $, h } from "./dom.js";
+import { $, h, loadIcons } from "./dom.js";
 import { setupDragAndDrop } from "./dragdrop.js";
 import { on } from "./events.js";
 import { homeNode, paintVolume } from "./home.js";
@@ -136,7 +136,7 @@ function fillTexts() {
 }
 
 async function start() {
-  await loadStrings();
+  await Promise.all([loadStrings(), loadIcons()]);
   fillTexts();
   browser.view = new View($("view"), { onScrolled: scrolled });
   setWhy(showWhy);
