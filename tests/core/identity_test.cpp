@@ -177,11 +177,7 @@ TEST_F(IdentityTest, HandOver) {
     writeFile(target, "x");
     ASSERT_EQ(symlink(target.c_str(), link.c_str()), 0);
 
-    const auto ownerOf = [](const std::string& path) {
-        struct stat status = {};
-        EXPECT_EQ(lstat(path.c_str(), &status), 0);
-        return status.st_uid;
-    };
+    const auto ownerOf = [](const std::string& path) { return statusOf(path).st_uid; };
     EXPECT_EQ(OrvLibChown2Admin(file.c_str(), "alice"), 0);
     EXPECT_EQ(ownerOf(file), kAliceUid);
     EXPECT_EQ(OrvLibChown2Admin(link.c_str(), "alice"), 0);

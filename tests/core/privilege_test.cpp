@@ -242,23 +242,16 @@ TEST_F(PrivilegeTest, Explanations) {
     ASSERT_TRUE(ExplainPrivilege("/mixed/a", "bob", nullptr, reason));
     EXPECT_EQ(reason.rule, PrivilegeRule::kNoAccess);
     EXPECT_TRUE(reason.inNoAccessList && reason.inReadWriteList && !reason.inReadOnlyList);
-    EXPECT_EQ(reason.privilege, 0);
-    EXPECT_EQ(reason.shareName, "mixed");
-    EXPECT_EQ(reason.shareRoot, shareRoot("mixed"));
-    EXPECT_EQ(reason.realPath, shareRoot("mixed") + "/a");
-    EXPECT_EQ(reason.shareMask, 5U);
-    EXPECT_EQ(reason.effectiveMask, 5U);
-    EXPECT_EQ(reason.fsType, "ext4");
-    EXPECT_TRUE(reason.exists);
-    EXPECT_FALSE(reason.remote || reason.readOnly);
-    EXPECT_EQ(reason.aclBits, GetACLPrivilege(reason.realPath.c_str()));
+    EXPECT_TRUE(reason.exists && !reason.remote && !reason.readOnly);
+    EXPECT_EQ(std::tie(reason.privilege, reason.shareMask, reason.effectiveMask), std::make_tuple(0, 5U, 5U));
+    EXPECT_EQ(reason.shareName + reason.fsType, "mixedext4");
+    EXPECT_EQ(reason.realPath, reason.shareRoot + "/a");
+    EXPECT_EQ(reason.aclBits, GetACLPrivilege((shareRoot("mixed") + "/a").c_str()));
 
     ASSERT_TRUE(ExplainPrivilege("/drop/none", "carol", nullptr, reason));
-    EXPECT_TRUE(reason.administrator);
+    EXPECT_TRUE(reason.administrator && !reason.exists);
     EXPECT_EQ(reason.rule, PrivilegeRule::kReadWrite);
-    EXPECT_EQ(reason.shareMask, 2U);
-    EXPECT_EQ(reason.effectiveMask, 0U);
-    EXPECT_FALSE(reason.exists);
+    EXPECT_EQ(std::tie(reason.shareMask, reason.effectiveMask), std::make_tuple(2U, 0U));
 
     ASSERT_TRUE(ExplainPrivilege("/view", "bob", nullptr, reason));
     EXPECT_TRUE(reason.remote && reason.readOnly);

@@ -50,18 +50,14 @@ TEST_F(CriteriaTest, ArgumentsAndResultsOfEachField) {
              {0, nullptr, "a", true, 0, 1},
              {0, "x", nullptr, false, 400, 0},
              {1, "dir", nullptr, true, 0, 1},
-             {1, "DIR", nullptr, true, 0, 1},
              {1, "File", nullptr, true, 0, 1},
              {1, "link", nullptr, true, 0, 0},
              {1, nullptr, "dir", false, 400, 0},
              {2, nullptr, "jpg", true, 0, 2},
-             {2, nullptr, nullptr, false, 400, 0},
              {3, nullptr, "alice", true, 0, 1},
              {3, nullptr, "nobody-here", false, 403, 0},
-             {3, nullptr, nullptr, false, 400, 0},
              {4, nullptr, "users", true, 0, 1},
              {4, nullptr, "nobody-here", false, 404, 0},
-             {4, nullptr, nullptr, false, 400, 0},
              {5, nullptr, "1", false, 400, 0},
              {5, "before", nullptr, false, 400, 0},
              {5, "before", "1", true, 0, 1},
@@ -96,10 +92,8 @@ TEST_F(CriteriaTest, PatternsOfNames) {
         {R"(a\?b?)", R"(0.6.*a\?b?*)", "xa?bcx", "a?b"},  // one escaped "?" speaks for all
         {R"(ab\)", R"(0.6.ab\)", "ab", "xabx"},
         {R"(a\\b)", R"(0.6.*a\\b*)", R"(xa\bx)", "ab"},
-        {"r?port", "0.6.r?port", "rEport", "xreport"},
         {" \t\"two words\"\n", "0.6.*two words*", "x two words", "twowords"},
         {"\"\"", "0.6.*\"\"*", "x\"\"y", "xy"},  // too short to lose its quotes
-        {"\"", "0.6.*\"*", "a\"b", "ab"},
         {"", "0.0.", "", "a"},
         {"   ", "0.0.", "", "   "},
         {"Ä", "0.6.*Ä*", "xäx", "xax"},
@@ -168,7 +162,7 @@ TEST_F(CriteriaTest, SizesAndTypes) {
         {"Less", "100", "7.4.100", {101}, {99, 100}},
         {"", "ten", "7.4.0", {1}, {0}},
         {"greater", "9223372036854775807", "7.4.9223372036854775807", {}, {0, kMax}},
-        {"less", "-1", "7.2.9223372036854775807", {0, kMax - 1}, {}},
+        {"less", "-1", "7.2.9223372036854775807", {0, kMax - 1}, {}},  // counts as the largest
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(std::string(c.op) + " " + c.value);
@@ -207,15 +201,6 @@ TEST_F(CriteriaTest, Times) {
             }
         }
     }
-}
-
-TEST_F(CriteriaTest, NegativeNumbersCountAsTheLargest) {
-    Criteria below, after, junk;
-    ASSERT_TRUE(below.add(FIND_SIZE, "less", "-5") && after.add(FIND_MTIME, "after", "-5"));
-    EXPECT_TRUE(below.match("/f", statusOf(S_IFREG, INT64_MAX - 1)));
-    EXPECT_FALSE(after.match("/f", statusOf(S_IFREG)));
-    ASSERT_TRUE(junk.add(FIND_SIZE, "more", "many"));
-    EXPECT_TRUE(junk.match("/f", statusOf(S_IFREG, 1))) << "no number is 0";
 }
 
 TEST_F(CriteriaTest, OwnersAndGroups) {
