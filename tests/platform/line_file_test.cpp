@@ -92,9 +92,12 @@ TEST_F(LineFile, PlantedFilesAreRefusedAtOnce) {
 TEST_F(LineFile, AFileThatIsReplacedMeanwhileIsReadAllTheSame) {
     writeFile(file_, "a,b\n", 0600);
     const pid_t replacer = fork();
-    for (const std::string rewrite = file_ + ".tmp"; replacer == 0;) {
-        writeFile(rewrite, "a,b\n", 0600);
-        if (rename(rewrite.c_str(), file_.c_str()) != 0) _exit(1);
+    if (replacer == 0) {
+        const std::string rewrite = file_ + ".tmp";
+        do {
+            writeFile(rewrite, "a,b\n", 0600);
+        } while (rename(rewrite.c_str(), file_.c_str()) == 0);
+        _exit(1);
     }
     int missed = 0;
     for (int i = 0; i < 20000; ++i) {
