@@ -60,7 +60,7 @@ Rows searched(const std::string& out, const Cond* cond) {
     EXPECT_EQ(
         FILEIDXResultGetAndTableGen("photo", nullptr, cond, out.c_str(), nullptr, nullptr, nullptr, nullptr, nullptr),
         0);
-    const Rows rows = sorted(select(out));
+    Rows rows = sorted(select(out));
     unlink(out.c_str());
     return rows;
 }
@@ -171,7 +171,7 @@ TEST_F(IndexFilesTest, ResultsAreSeenWhileTheSearchRunsAndAfterItDies) {
         const bool told = write(ready[1], "x", 1) == 1;
         std::this_thread::sleep_for(std::chrono::milliseconds(1500));
         const bool again = write(ready[1], "x", 1) == 1;
-        for (int i = 0; told && again; ++i) insert(db_, {.path = "b" + std::to_string(i)});
+        for (int i = 0; told && again && i < 100000000; ++i) insert(db_, {.path = "b" + std::to_string(i)});
         _exit(0);
     }
     char byte = 0;
@@ -231,8 +231,8 @@ TEST_F(IndexFilesTest, KilledWritersLeaveADatabaseThatReads) {
 
 // A writer that dies half-way through a large commit: its journal is played back, by readers of a share's index too.
 TEST_F(IndexFilesTest, HalfACommitIsTakenBack) {
-    std::vector<Record> records;
-    for (int i = 0; i < 3000; ++i) records.push_back({.path = "n" + std::to_string(i), .size = 1});
+    std::vector<Record> records(3000, {.path = "", .size = 1});
+    for (size_t i = 0; i < records.size(); ++i) records[i].path = "n" + std::to_string(i);
     build(records);
     for (const Record& record : records) ASSERT_EQ(insert(db_, record), 0);
     vexo::fileindex::closeDatabases();
