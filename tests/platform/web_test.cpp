@@ -129,7 +129,8 @@ TEST_F(WebRequest, HeaderWithCookies) {
         return 0;
     });
     EXPECT_EQ(readFile(file),
-              "Set-Cookie: link-1=a b; Path=/\r\nSet-Cookie: x=\r\nContent-Type: text/html; charset=UTF-8\r\n\r\n");
+              "Set-Cookie: link-1=a b; Path=/; HttpOnly; SameSite=Lax\r\n"
+              "Set-Cookie: x=; HttpOnly; SameSite=Lax\r\nContent-Type: text/html; charset=UTF-8\r\n\r\n");
 }
 
 }  // namespace

@@ -157,8 +157,9 @@ TEST_F(SharingLinkTest, LoggedInByACookieOfTheLink) {
         return records.substr(records.find(line) + line.size(), 13);
     };
     const std::string alice = sessionOf("10.0.0.5,alice,"), carol = sessionOf("10.0.0.5,carol,");
-    EXPECT_EQ(header,
-              "Set-Cookie: L=" + alice + "; Path=/\r\nSet-Cookie: K=" + carol + "; Path=/\r\nContent-Type: x\r\n\r\n");
+    const std::string kAttributes = "; Path=/; HttpOnly; SameSite=Lax\r\n";
+    EXPECT_EQ(header, "Set-Cookie: L=" + alice + kAttributes + "Set-Cookie: K=" + carol + kAttributes +
+                          "Content-Type: x\r\n\r\n");
 
     setenv("HTTP_COOKIE", ("L=" + alice + "; K=" + carol).c_str(), 1);
     setenv("HTTP_FOLDER_SHARING", "K", 1);
@@ -237,9 +238,9 @@ TEST_F(SharingLinkTest, ThePageOnStandardOutput) {
     testing::internal::CaptureStdout();
     manager.WriteWebPage(cgi, "digest", "/photo/a'b");
     const std::string plain = testing::internal::GetCapturedStdout();
-    EXPECT_TRUE(
-        plain.starts_with("Set-Cookie: L=s; Path=/\r\nContent-Type: text/html; charset=\"UTF-8\"\r\n\r\n"
-                          "    <!DOCTYPE html>    <html>\n"));
+    EXPECT_TRUE(plain.starts_with(
+        "Set-Cookie: L=s; Path=/; HttpOnly; SameSite=Lax\r\nContent-Type: text/html; charset=\"UTF-8\"\r\n\r\n"
+        "    <!DOCTYPE html>    <html>\n"));
     EXPECT_TRUE(plain.ends_with("<body>\n</body></html>\n"));
     EXPECT_NE(plain.find("var g_FolderPath = '/photo/a\\'b';"), std::string::npos);
     EXPECT_NE(plain.find("var g_MD5 = 'digest';"), std::string::npos);

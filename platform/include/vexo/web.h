@@ -30,7 +30,8 @@ class VEXO_API WebCGI {
     bool BodyRefused() const;
     // The value of the first cookie of that name, `def` when absent.
     std::string GetCookie(const std::string& name, const std::string& def) const;
-    // Keeps a Set-Cookie header for WriteHeader. False, and nothing kept, for a name that is no cookie token or a value
+    // Keeps a Set-Cookie header for WriteHeader ("name=value; Path=...; HttpOnly; SameSite=Lax", and "; Secure" in a
+    // request by HTTPS). False, and nothing kept, for a name that is no cookie token or a value
     // or path with control bytes, ";" or ",".
     bool AddCookieToHeader(const std::string& path, const std::string& name, const std::string& value);
     // Writes the response header to standard output: the kept cookies and the content type, then the empty line.
