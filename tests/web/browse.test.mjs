@@ -1,6 +1,6 @@
 // Looking around: shares, folders, long lists, the keyboard, hostile names, refusals.
 import assert from "node:assert/strict";
-import { mkdirSync, readdirSync, writeFileSync } from "node:fs";
+import { mkdirSync, readdirSync, readFileSync, writeFileSync } from "node:fs";
 import { after, before, test } from "node:test";
 import { launch, row, rowsReady, screenshot, withPage } from "./browser.mjs";
 
@@ -194,8 +194,14 @@ test("a typed path, a filter, a place that is not there any more", () => withPag
   await page.waitForSelector("#view >> text=plan.pdf");
 }));
 
+test("every module is fetched at once", async () => {
+  const web = new URL("../../apps/web/", import.meta.url);
+  const listed = [...readFileSync(new URL("index.html", web), "utf8").matchAll(/(?:href|src)="js\/([\w.]+)"/g)].map((match) => match[1]);
+  assert.deepEqual(listed.sort(), readdirSync(new URL("js", web)).sort());
+});
+
 test("every message key has its words, in both languages", async () => {
-  const source = (await import("node:fs")).readFileSync(new URL("../../src/core/error_state.cpp", import.meta.url), "utf8");
+  const source = readFileSync(new URL("../../src/core/error_state.cpp", import.meta.url), "utf8");
   const keys = [...source.matchAll(/"(error:\w+)"/g)].map((match) => match[1]);
   assert.ok(keys.length > 20);
   const tables = readdirSync(new URL("../../apps/web/strings", import.meta.url));

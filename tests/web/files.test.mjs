@@ -72,6 +72,15 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () => with
   assert.equal(statSync(join(there, "trip/day 1/view 8.png")).size, statSync(join(files, "trip/day 1/view 8.png")).size);
   await page.waitForSelector("#view >> text=trip");
 
+  // Dropped on a folder of the list, from outside.
+  await row(page, "trip").evaluate((target) => {
+    const data = new DataTransfer();
+    data.items.add(new File(["dropped"], "from outside.txt"));
+    for (const type of ["dragenter", "dragover", "drop"]) target.dispatchEvent(new DragEvent(type, { bubbles: true, cancelable: true, dataTransfer: data }));
+  });
+  await card(page, "1 file to trip").filter({ hasText: "1 file uploaded" }).waitFor();
+  assert.equal(readFileSync(join(there, "trip/from outside.txt"), "utf8"), "dropped");
+
   // The network is slow enough that there is something to cancel.
   const session = await page.context().newCDPSession(page);
   await session.send("Network.emulateNetworkConditions", { offline: false, latency: 0, downloadThroughput: -1, uploadThroughput: 4 << 20 });

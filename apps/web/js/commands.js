@@ -51,7 +51,7 @@ export function runCommand(id) {
 
 export function shortcutText(keys) {
   const mac = navigator.platform.startsWith("Mac");
-  const names = { Mod: mac ? "⌘" : "Ctrl", ArrowUp: "↑", ArrowLeft: "←", ArrowRight: "→", Delete: "Del", " ": "Space", Backspace: "⌫" };
+  const names = { Mod: mac ? "⌘" : "Ctrl", ArrowUp: "↑", ArrowLeft: "←", ArrowRight: "→", Delete: "Del", " ": "Space" };
   return keys.split("+").map((key) => names[key] ?? (key.length === 1 ? key.toUpperCase() : key)).join(mac ? "" : "+");
 }
 

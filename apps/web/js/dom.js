@@ -56,12 +56,12 @@ const PLAIN = /^[\u0020-\u024F]*$/u;
 const TAIL = 8;
 
 // A name for people: characters that would hide, move or break text show as marks.
-export function nameNode(name) {
+export function nameNode(name, cutInside = true) {
   const node = h("bdi.name");
   if (!ODD.test(name)) {
     const cut = name.length - TAIL;
     // The end, with the extension, stays in sight when the name is cut.
-    if (cut > 5 && PLAIN.test(name)) {
+    if (cutInside && cut > 5 && PLAIN.test(name)) {
       node.append(h("span.stem", {}, name.slice(0, cut)), h("span.tail", {}, name.slice(cut)));
     } else {
       node.append(h("span.stem", {}, name));

@@ -83,7 +83,7 @@ function tileParts(entry) {
   return [
     check(), more(),
     h("span.tile-picture", {}, picture(entry, "file-icon large"), badges(entry)),
-    h("span.label", { title: plainName(entry.name) }, nameNode(shownName(entry)),
+    h("span.label", { title: plainName(entry.name) }, nameNode(shownName(entry), false),
       h("span.sub", {}, entry.size === null ? t("type.folder") : formatSize(entry.size))),
   ];
 }

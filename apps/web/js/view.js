@@ -7,7 +7,7 @@ import { makeRow, fillRow, makeHeader } from "./rows.js";
 const TALLEST = 12_000_000;
 const OVERSCAN = 6;
 const WAITING_ROWS = 12;
-const TILE = { width: 132, height: 144, gap: 6 };
+const TILE = { width: 132, height: 152, gap: 6 };
 
 export class View {
   constructor(root, { onScrolled }) {
