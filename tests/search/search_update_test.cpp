@@ -128,6 +128,7 @@ TEST_F(SearchUpdateTest, AfterEachOperationTheResultsAreThoseOfANewSearch) {
 }
 
 TEST_F(SearchUpdateTest, BadPathsAndFailingDatabases) {
+    SKIP_WITHOUT_ROOT();
     makeFile(shareRoot("photo") + "/d/f");
     onScreen([&] {
         const Rows before = rowsOf(*screen_);
@@ -262,6 +263,7 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
 }
 
 TEST_F(SearchUpdateTest, ResultFilesThatAreNone) {
+    SKIP_WITHOUT_ROOT();
     const std::string elsewhere = shareRoot("photo") + "/f";
     makeFile(elsewhere);
     onScreen([&] {
