@@ -285,7 +285,7 @@ int main(int argc, char** argv) {
     need(mkdtemp(folder.data()) != nullptr, "making a folder");
     prepareRoot(folder);
     setenv("VEXO_ROOT", (folder + "/root").c_str(), 1);
-    const int rounds = argc > 2 ? atoi(argv[2]) : 7;
+    const int rounds = argc > 2 ? static_cast<int>(strtol(argv[2], nullptr, 10)) : 7;
     const std::string self = std::filesystem::read_symlink("/proc/self/exe");
     const std::string results = folder + "/results";
     prepareNames(folder, results);

@@ -3,10 +3,10 @@
 // Two kinds of database share one layout: the index of a share, a central store that the platform keeps, and result
 // databases, one for each search, which lie where their caller says and may be anybody's garbage: a file that is no
 // regular file, has a second name, belongs neither to root nor to the effective user, or holds no such database is
-// refused. Operations that take a database path keep it open for the process; records inserted are committed in
-// batches, within a second and before anything is read, and at exit; a process that ends by _exit calls FILEIDXDBFlush
-// before. A forked child begins anew and leaves what its parent has open alone. In every database the pair of share and
-// path is unique. Operations may be called from callbacks.
+// refused. Operations that take a database path keep it open for the process; what is written is committed in batches,
+// within a second, before anything is read, before a fork and at exit; a process that ends by _exit calls
+// FILEIDXDBFlush before. A forked child begins anew and leaves what its parent has open alone. In every database the
+// pair of share and path is unique. Operations may be called from callbacks.
 //
 // Where nothing else is said an operation gives 0 or more on success, and on failure <0 with the slot set: 0x0900
 // missing or not to be opened, 0x0300 denied, 0x2900 no space, 0x0D00 a bad argument, 0x8100 anything else, a database
