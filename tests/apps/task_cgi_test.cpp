@@ -379,40 +379,34 @@ TEST_F(LongTask, ProgressIsNeverOutOfStep) {
     EXPECT_EQ(end["progress"], 1.0);
 }
 
-TEST_F(LongTask, CancellingLeavesWholeFilesOnly) {
+TEST_F(LongTask, CancelledOrKilledItLeavesWholeFilesOnly) {
     SKIP_WITHOUT_ROOT();
-    std::string id;
-    const int lock = hold(id);
-    if (lock < 0) GTEST_SKIP() << "the record was replaced while it was locked";
-    EXPECT_EQ(code(ask("alice", "action=clear&taskid=" + id)), 420);
-    EXPECT_EQ(code(ask("bob", "action=cancel&taskid=" + id)), 408) << "another's";
-    EXPECT_EQ(code(ask("alice", "action=cancel&taskid=" + id)), 0);
-    close(lock);
-    const Json::Value task = ended("alice", id);
-    EXPECT_EQ(task["state"], "cancelled");
-    EXPECT_TRUE(task["finished"].asBool());
-    EXPECT_GT(task["items_done"].asInt(), 0);
-    EXPECT_LT(task["progress"].asDouble(), 1.0);
-    expectWhole();
-    EXPECT_EQ(ask("alice", "action=cancel&taskid=" + id).json["data"]["state"], "cancelled") << "no failure";
-    EXPECT_EQ(ask("alice", "action=clear").json["data"]["cleared"], 1);
-    EXPECT_EQ(code(ask("alice", "action=cancel&taskid=" + id)), 408);
-}
-
-TEST_F(LongTask, AKilledOneHasFailed) {
-    SKIP_WITHOUT_ROOT();
-    std::string id;
-    const int lock = hold(id);
-    if (lock < 0) GTEST_SKIP() << "the record was replaced while it was locked";
-    const std::unique_ptr<KTR::Task> task(KTR::TaskMgr("alice").getTask(id.c_str()));
-    EXPECT_EQ(status("alice", id)["state"], "running");
-    ASSERT_GT(task->getWorker(), 1);
-    EXPECT_EQ(kill(task->getWorker(), SIGKILL), 0);
-    close(lock);
-    const Json::Value end = ended("alice", id);
-    EXPECT_EQ(end["state"], "failed");
-    EXPECT_TRUE(end["finished"].asBool());
-    expectWhole();
+    for (const bool killed : {false, true}) {
+        SCOPED_TRACE(killed ? "killed" : "cancelled");
+        std::string id;
+        const int lock = hold(id);
+        if (lock < 0) GTEST_SKIP() << "the record was replaced while it was locked";
+        EXPECT_EQ(status("alice", id)["state"], "running");
+        EXPECT_EQ(code(ask("alice", "action=clear&taskid=" + id)), 420);
+        EXPECT_EQ(code(ask("bob", "action=cancel&taskid=" + id)), 408) << "another's";
+        if (killed) {
+            const std::unique_ptr<KTR::Task> task(KTR::TaskMgr("alice").getTask(id.c_str()));
+            ASSERT_GT(task->getWorker(), 1);
+            EXPECT_EQ(kill(task->getWorker(), SIGKILL), 0);
+        } else {
+            EXPECT_EQ(code(ask("alice", "action=cancel&taskid=" + id)), 0);
+        }
+        close(lock);
+        const Json::Value task = ended("alice", id);
+        EXPECT_EQ(task["state"], killed ? "failed" : "cancelled");
+        EXPECT_TRUE(task["finished"].asBool());
+        EXPECT_LT(task["progress"].asDouble(), 1.0);
+        expectWhole();
+        EXPECT_EQ(code(ask("alice", "action=cancel&taskid=" + id)), 0) << "nothing left to do is no failure";
+        EXPECT_EQ(ask("alice", "action=clear").json["data"]["cleared"], 1);
+        EXPECT_EQ(code(ask("alice", "action=cancel&taskid=" + id)), 408);
+        fs::remove_all(video_ + "/tree");
+    }
 }
 
 TEST_F(TaskCgi, AFullDiskFailsItsItemAndTheRestGoesOn) {
@@ -664,6 +658,40 @@ TEST_F(TaskCgi, WhatWasCompressedComesBackTheSame) {
     EXPECT_EQ(errors(perform("alice", "action=extract" + about({"/video/c (2).zip"}, "/video"))), "");
     EXPECT_EQ(treeOf(photo_ + "/c"), treeOf(video_ + "/c"));
     EXPECT_FALSE(hasParts(video_));
+}
+
+TEST_F(TaskCgi, TheSearchOnScreenFollows) {
+    SKIP_WITHOUT_ROOT();
+    for (const char* file : {"/s/found1", "/s/found2", "/s/d/found3"}) writeFile(photo_ + file, "x", 0666);
+    support::makeFolder(photo_ + "/#recycle", 0777);
+    ASSERT_EQ(chmod((photo_ + "/#recycle").c_str(), 0777), 0);
+    for (const char* folder : {"/s", "/s/d"}) give(photo_ + folder);
+    const auto search = [](const std::string& method, const std::string& form) {
+        return CgiReply(support::runCgi(PROGRAM_SEARCH, "alice", method, method == "GET" ? form : "",
+                                        method == "GET" ? "" : form,
+                                        {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}))
+            .json["data"];
+    };
+    const std::string id = search("POST", "action=start&path=/photo&name=found")["taskid"].asString();
+    const auto found = [&] {
+        Json::Value page;
+        for (int i = 0; i < 500 && !page["finished"].asBool(); ++i) {
+            page = search("GET", "action=list&taskid=" + id);
+            usleep(10000);
+        }
+        std::string all;
+        for (const Json::Value& item : page["items"]) all += item["path"].asString() + " ";
+        return all;
+    };
+    ASSERT_EQ(found(), "/photo/s/found1 /photo/s/found2 /photo/s/d/found3 ");
+    const auto with = "&taskid=" + id;
+    EXPECT_EQ(errors(perform("alice", "action=delete" + with + about({"/photo/s/found1"}))), "");
+    EXPECT_EQ(found(), "/photo/s/found2 /photo/s/d/found3 ");
+    EXPECT_EQ(errors(perform("alice", "action=move" + with + about({"/photo/s/d"}, "/video"))), "");
+    EXPECT_EQ(found(), "/photo/s/found2 /video/d/found3 ");
+    EXPECT_EQ(
+        errors(perform("alice", "action=copy&conflict=keep_both" + with + about({"/photo/s/found2"}, "/photo/s"))), "");
+    EXPECT_EQ(found(), "/photo/s/found2 /photo/s/found2 (2) /video/d/found3 ");
 }
 
 TEST_F(TaskCgi, OnlyOnesOwnOperationsAreShown) {
