@@ -20,7 +20,9 @@ async function measure(open) {
   let requests = 0;
   let bytes = 0;
   session.on("Network.requestWillBeSent", () => ++requests);
-  session.on("Network.loadingFinished", (event) => { bytes += event.encodedDataLength; });
+  session.on("Network.loadingFinished", (event) => {
+    bytes += event.encodedDataLength;
+  });
   const time = await page.evaluate(open);
   await page.waitForTimeout(300);
   await page.context().close();
@@ -28,18 +30,27 @@ async function measure(open) {
 }
 
 // Until the rows in sight are drawn.
-const thePage = () => new Promise((resolve) => {
-  const begun = performance.now();
-  location.hash = "/projects/bench";
-  const look = () => (document.querySelector("#view .row:not(.header) .name")?.textContent.includes("IMG_2026")
-    ? requestAnimationFrame(() => resolve(performance.now() - begun)) : requestAnimationFrame(look));
-  look();
-});
+const thePage = () =>
+  new Promise((resolve) => {
+    const begun = performance.now();
+    location.hash = "/projects/bench";
+    const look = () =>
+      document.querySelector("#view .row:not(.header) .name")?.textContent.includes("IMG_2026")
+        ? requestAnimationFrame(() => resolve(performance.now() - begun))
+        : requestAnimationFrame(look);
+    look();
+  });
 const wholeList = async () => {
   const begun = performance.now();
-  const reply = await fetch("/cgi-bin/list?action=folder&path=/projects/bench&additional=size,time,owner,perm,mount_point_type");
+  const reply = await fetch(
+    "/cgi-bin/list?action=folder&path=/projects/bench&additional=size,time,owner,perm,mount_point_type",
+  );
   const { items } = (await reply.json()).data;
-  const rows = items.slice(0, 30).map((item) => Object.assign(document.createElement("div"), { textContent: `${item.name} ${item.additional.size}` }));
+  const rows = items
+    .slice(0, 30)
+    .map((item) =>
+      Object.assign(document.createElement("div"), { textContent: `${item.name} ${item.additional.size}` }),
+    );
   document.querySelector("main").replaceChildren(...rows);
   await new Promise(requestAnimationFrame);
   return performance.now() - begun;
@@ -53,6 +64,10 @@ for (let i = 0; i < ROUNDS; ++i) {
 await close();
 const of = (name, key) => median(runs[name].map((run) => run[key]));
 for (const name of ["page", "whole"]) {
-  console.log(`${name}: ${of(name, "requests")} requests, ${Math.round(of(name, "bytes") / 1000)} kB, ${Math.round(of(name, "time"))} ms`);
+  console.log(
+    `${name}: ${of(name, "requests")} requests, ${Math.round(of(name, "bytes") / 1000)} kB, ${Math.round(of(name, "time"))} ms`,
+  );
 }
-console.log(`whole/page: bytes ${(of("whole", "bytes") / of("page", "bytes")).toFixed(0)}, time ${(of("whole", "time") / of("page", "time")).toFixed(1)}`);
+console.log(
+  `whole/page: bytes ${(of("whole", "bytes") / of("page", "bytes")).toFixed(0)}, time ${(of("whole", "time") / of("page", "time")).toFixed(1)}`,
+);

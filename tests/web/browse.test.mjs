@@ -15,109 +15,138 @@ before(async () => {
 });
 after(() => chrome.close());
 
-const names = (page) => page.locator("#view .row:not(.header) .name bdi, #view .row:not(.header) bdi.name").allTextContents();
+const names = (page) =>
+  page.locator("#view .row:not(.header) .name bdi, #view .row:not(.header) bdi.name").allTextContents();
 const place = (page) => page.evaluate(() => location.hash.slice(1));
 
-test("shares, by user", () => withPage(chrome, "alice", {}, async (page) => {
-  assert.equal(await page.locator(".card").count(), 10);
-  await screenshot(page, "home");
-  await withPage(chrome, "bob", {}, async (other) => {
-    assert.equal(await other.locator(".card", { hasText: "projects" }).count(), 0);
-    assert.match(await other.locator(".card", { hasText: "photo" }).textContent(), /Read only/);
-  });
-  await page.click(".card >> text=music");
-  await page.waitForFunction(() => document.querySelectorAll("#view .row:not(.header)").length === 3);
-  await page.dblclick("#view >> text=Night Trains");
-  await page.waitForFunction(() => document.querySelectorAll("#view .row:not(.header)").length === 9);
-  assert.equal(await page.locator("[role=treeitem].current").getAttribute("aria-label"), "Night Trains");
-  await page.click("#pathbar >> text=music");
-  await page.waitForSelector("#view .row.selected >> text=Night Trains"); // where one came from
-  await page.goBack();
-  await page.waitForSelector("#view >> text=01 Track.flac");
-}));
+test("shares, by user", () =>
+  withPage(chrome, "alice", {}, async (page) => {
+    assert.equal(await page.locator(".card").count(), 10);
+    await screenshot(page, "home");
+    await withPage(chrome, "bob", {}, async (other) => {
+      assert.equal(await other.locator(".card", { hasText: "projects" }).count(), 0);
+      assert.match(await other.locator(".card", { hasText: "photo" }).textContent(), /Read only/);
+    });
+    await page.click(".card >> text=music");
+    await page.waitForFunction(() => document.querySelectorAll("#view .row:not(.header)").length === 3);
+    await page.dblclick("#view >> text=Night Trains");
+    await page.waitForFunction(() => document.querySelectorAll("#view .row:not(.header)").length === 9);
+    assert.equal(await page.locator("[role=treeitem].current").getAttribute("aria-label"), "Night Trains");
+    await page.click("#pathbar >> text=music");
+    await page.waitForSelector("#view .row.selected >> text=Night Trains"); // where one came from
+    await page.goBack();
+    await page.waitForSelector("#view >> text=01 Track.flac");
+  }));
 
-test("sorting keeps folders first, both ways", () => withPage(chrome, "alice", { path: "/photo" }, async (page) => {
-  await screenshot(page, "list");
-  await page.click("[data-sort=size]");
-  await page.click("[data-sort=size]");
-  await page.waitForSelector("[aria-sort=descending]");
-  await rowsReady(page);
-  assert.match((await names(page))[0], /Landscapes/);
-  await page.press("#view", "End");
-  await page.waitForSelector("#view .row.cursor .size >> text=/^0 B$/");
-  await page.click("[data-sort=name]");
-  await page.click(".view-switch button >> nth=1");
-  await rowsReady(page);
-  assert.equal(await page.getAttribute("#view", "role"), "listbox");
-  await page.dblclick("#view >> text=Landscapes");
-  await page.waitForFunction(() => document.querySelectorAll(".thumbnail.loaded img").length === 12);
-  await row(page, "Dusk.png").click();
-  await screenshot(page, "grid");
-}));
+test("sorting keeps folders first, both ways", () =>
+  withPage(chrome, "alice", { path: "/photo" }, async (page) => {
+    await screenshot(page, "list");
+    await page.click("[data-sort=size]");
+    await page.click("[data-sort=size]");
+    await page.waitForSelector("[aria-sort=descending]");
+    await rowsReady(page);
+    assert.match((await names(page))[0], /Landscapes/);
+    await page.press("#view", "End");
+    await page.waitForSelector("#view .row.cursor .size >> text=/^0 B$/");
+    await page.click("[data-sort=name]");
+    await page.click(".view-switch button >> nth=1");
+    await rowsReady(page);
+    assert.equal(await page.getAttribute("#view", "role"), "listbox");
+    await page.dblclick("#view >> text=Landscapes");
+    await page.waitForFunction(() => document.querySelectorAll(".thumbnail.loaded img").length === 12);
+    await row(page, "Dusk.png").click();
+    await screenshot(page, "grid");
+  }));
 
-test("a folder of 100,000: first view, its end, everything chosen", () => withPage(chrome, "alice", { path: "/home" }, async (page) => {
-  const requests = [];
-  page.on("request", (request) => { if (request.url().includes("/cgi-bin/list")) requests.push(new URL(request.url()).searchParams); });
-  await page.evaluate(() => { location.hash = "/projects/large"; });
-  await page.waitForSelector("#view >> text=entry 000000.txt");
-  assert.equal(await page.getAttribute("#view", "aria-rowcount"), String(LARGE + 1));
-  assert.ok(requests.length <= 2, `${requests.length} requests for the first view`);
-  await page.evaluate(async () => {
-    const view = document.getElementById("view");
-    for (let i = 1; i <= 60; ++i) {
-      view.scrollTop = (view.scrollHeight * 0.99 * i) / 60;
-      await new Promise(requestAnimationFrame);
+test("a folder of 100,000: first view, its end, everything chosen", () =>
+  withPage(chrome, "alice", { path: "/home" }, async (page) => {
+    const requests = [];
+    page.on("request", (request) => {
+      if (request.url().includes("/cgi-bin/list")) requests.push(new URL(request.url()).searchParams);
+    });
+    await page.evaluate(() => {
+      location.hash = "/projects/large";
+    });
+    await page.waitForSelector("#view >> text=entry 000000.txt");
+    assert.equal(await page.getAttribute("#view", "aria-rowcount"), String(LARGE + 1));
+    assert.ok(requests.length <= 2, `${requests.length} requests for the first view`);
+    await page.evaluate(async () => {
+      const view = document.getElementById("view");
+      for (let i = 1; i <= 60; ++i) {
+        view.scrollTop = (view.scrollHeight * 0.99 * i) / 60;
+        await new Promise(requestAnimationFrame);
+      }
+    });
+    await page.waitForSelector("#view >> text=/entry 0990\\d\\d.txt/");
+    assert.ok(
+      requests.length < 40, // of 500 pages, however slow the browser draws
+      `${requests.length} requests after flying by ${LARGE} entries`,
+    );
+    assert.ok((await page.locator("#view .row").count()) < 80);
+    await page.focus("#view");
+    await page.keyboard.type("entry 0734");
+    await page.waitForSelector("#view .row.selected >> text=entry 073400.txt");
+    await page.keyboard.press("Shift+End");
+    await page.waitForSelector(`#status >> text=${(LARGE - 73400).toLocaleString("en-GB")} selected`);
+    await page.keyboard.press("Control+a");
+    await page.waitForSelector("#status >> text=100,000 selected");
+  }));
+
+test("names that programs stumble over", () =>
+  withPage(chrome, "alice", { path: "/worldwide", viewport: { width: 1280, height: 2000 } }, async (page) => {
+    const shown = await page
+      .locator("#view .row:not(.header) .cell.name")
+      .evaluateAll((cells) => cells.map((cell) => cell.title));
+    for (const name of [
+      "<img src=x onerror=alert(1)>.txt",
+      "&amp; &lt;tag&gt;.txt",
+      "single ' double \" back `.txt",
+      "line[LF]break.txt",
+      "looks like [RLO]txt.exe",
+      "percent%20sign%2F.txt",
+      "שלום עולם.txt",
+      "#hash.txt",
+      "question?.txt",
+      "caf\uFFFD in Latin-1.txt",
+    ]) {
+      assert.ok(shown.includes(name), `${name} in ${shown.join("\n")}`);
     }
-  });
-  await page.waitForSelector("#view >> text=/entry 0990\\d\\d.txt/");
-  assert.ok(requests.length < 40, // of 500 pages, however slow the browser draws
-     `${requests.length} requests after flying by ${LARGE} entries`);
-  assert.ok(await page.locator("#view .row").count() < 80);
-  await page.focus("#view");
-  await page.keyboard.type("entry 0734");
-  await page.waitForSelector("#view .row.selected >> text=entry 073400.txt");
-  await page.keyboard.press("Shift+End");
-  await page.waitForSelector(`#status >> text=${(LARGE - 73400).toLocaleString("en-GB")} selected`);
-  await page.keyboard.press("Control+a");
-  await page.waitForSelector("#status >> text=100,000 selected");
-}));
+    assert.equal(await page.locator("#view img, #view b b").count(), 0);
+    await screenshot(page, "hostile-names");
+    for (const [folder, inside] of [
+      [/dossier/, "dedans.txt"],
+      [/папка/, "внутри.txt"],
+    ]) {
+      await page.dblclick(`#view .row:has-text("${folder.source}")`);
+      await page.waitForSelector(`#view >> text=${inside}`);
+      await page.reload(); // the address alone leads back
+      await page.waitForSelector(`#view >> text=${inside}`);
+      await page.keyboard.press("Backspace");
+      await page.waitForSelector("#view >> text=#hash.txt");
+    }
+    for (const name of ["Latin-1.txt", "question?.txt", "percent%20sign"]) {
+      const download = page.waitForEvent("download");
+      await row(page, name).click({ button: "right" });
+      await page.click(".menu >> text=Download");
+      assert.ok((await (await download).createReadStream()).readable);
+    }
+  }));
 
-test("names that programs stumble over", () => withPage(chrome, "alice", { path: "/worldwide", viewport: { width: 1280, height: 2000 } }, async (page) => {
-  const shown = await page.locator("#view .row:not(.header) .cell.name").evaluateAll((cells) => cells.map((cell) => cell.title));
-  for (const name of ["<img src=x onerror=alert(1)>.txt", "&amp; &lt;tag&gt;.txt", "single ' double \" back `.txt", "line[LF]break.txt",
-    "looks like [RLO]txt.exe", "percent%20sign%2F.txt", "שלום עולם.txt", "#hash.txt", "question?.txt", "caf\uFFFD in Latin-1.txt"]) {
-    assert.ok(shown.includes(name), `${name} in ${shown.join("\n")}`);
-  }
-  assert.equal(await page.locator("#view img, #view b b").count(), 0);
-  await screenshot(page, "hostile-names");
-  for (const [folder, inside] of [[/dossier/, "dedans.txt"], [/папка/, "внутри.txt"]]) {
-    await page.dblclick(`#view .row:has-text("${folder.source}")`);
-    await page.waitForSelector(`#view >> text=${inside}`);
-    await page.reload(); // the address alone leads back
-    await page.waitForSelector(`#view >> text=${inside}`);
-    await page.keyboard.press("Backspace");
-    await page.waitForSelector("#view >> text=#hash.txt");
-  }
-  for (const name of ["Latin-1.txt", "question?.txt", "percent%20sign"]) {
-    const download = page.waitForEvent("download");
-    await row(page, name).click({ button: "right" });
-    await page.click(".menu >> text=Download");
-    assert.ok((await (await download).createReadStream()).readable);
-  }
-}));
-
-test("what one may not open says so, and why", () => withPage(chrome, "bob", { path: "/projects" }, async (page) => {
-  await page.waitForSelector(".state >> text=no permission for “projects”");
-  await page.click(".state >> text=Why?");
-  await page.waitForSelector(".dialog >> text=You are on the no-access list of “projects”");
-  await screenshot(page, "why");
-  await page.keyboard.press("Escape");
-  await page.evaluate(() => { location.hash = "/photo/no such folder"; });
-  await page.waitForSelector(".state >> text=“no such folder” is not there");
-  await page.click(".state >> text=Go up");
-  await page.waitForSelector("#view >> text=2012");
-  assert.equal(await page.locator("#toolbar [data-command=newFolder]").count(), 0); // his right is to read
-}));
+test("what one may not open says so, and why", () =>
+  withPage(chrome, "bob", { path: "/projects" }, async (page) => {
+    await page.waitForSelector(".state >> text=no permission for “projects”");
+    await page.click(".state >> text=Why?");
+    await page.waitForSelector(".dialog >> text=You are on the no-access list of “projects”");
+    await screenshot(page, "why");
+    await page.keyboard.press("Escape");
+    await page.evaluate(() => {
+      location.hash = "/photo/no such folder";
+    });
+    await page.waitForSelector(".state >> text=“no such folder” is not there");
+    await page.click(".state >> text=Go up");
+    await page.waitForSelector("#view >> text=2012");
+    assert.equal(await page.locator("#toolbar [data-command=newFolder]").count(), 0); // his right is to read
+  }));
 
 test("dark, German, on a phone", async () => {
   await withPage(chrome, "alice", { path: "/photo", colorScheme: "dark", locale: "de-DE" }, async (page) => {
@@ -128,75 +157,105 @@ test("dark, German, on a phone", async () => {
     await page.waitForSelector(".dialog >> text=Tastenkürzel");
     await screenshot(page, "help");
   });
-  await withPage(chrome, "alice", { path: "/photo", viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true }, async (page) => {
-    await screenshot(page, "phone");
-    await row(page, "2016").tap();
-    await page.waitForFunction(() => location.hash === "#/photo/2016");
-    assert.ok(await page.evaluate(() => document.documentElement.scrollWidth <= innerWidth));
-    await page.tap("#menu-button");
-    await page.tap("#tree >> text=music");
-    await page.waitForSelector("#view >> text=Night Trains");
-  });
+  await withPage(
+    chrome,
+    "alice",
+    { path: "/photo", viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true },
+    async (page) => {
+      await screenshot(page, "phone");
+      await row(page, "2016").tap();
+      await page.waitForFunction(() => location.hash === "#/photo/2016");
+      assert.ok(await page.evaluate(() => document.documentElement.scrollWidth <= innerWidth));
+      await page.tap("#menu-button");
+      await page.tap("#tree >> text=music");
+      await page.waitForSelector("#view >> text=Night Trains");
+    },
+  );
 });
 
-test("mounts, shares that do not answer, slow and broken servers", () => withPage(chrome, "alice", { path: "/" }, async (page) => {
-  const change = (match, edit) => page.route((url) => url.pathname === "/cgi-bin/list" && match(url.searchParams), async (route) => {
-    const response = await route.fetch();
-    const reply = await response.json();
-    edit(reply.data.items);
-    await route.fulfill({ response, json: reply });
-  });
-  await change((params) => params.get("action") === "shares", (items) => {
-    items.find((item) => item.name === "music").additional.mount_point_type = "remotefail";
-    items.find((item) => item.name === "photo").additional.volume_status.readonly = true;
-  });
-  await change((params) => params.get("path_raw") === "/projects", (items) => {
-    ["iso", "remote", "remotefail"].forEach((type, i) => { items[i + 2].additional.mount_point_type = type; });
-  });
-  await page.reload();
-  await page.waitForSelector(".card:has-text('music') >> text=Server does not answer");
-  await page.waitForSelector(".card:has-text('photo') >> text=Read only");
-  assert.equal(await page.locator("#tree .tag.warn").count(), 1);
-  await page.click(".card >> text=projects");
-  for (const kind of ["iso", "remote", "offline"]) await page.waitForSelector(`#view use[href$="kind-folder-${kind}"]`, { state: "attached" });
-  await screenshot(page, "mounts");
+test("mounts, shares that do not answer, slow and broken servers", () =>
+  withPage(
+    chrome,
+    "alice",
+    { path: "/" },
+    async (page) => {
+      const change = (match, edit) =>
+        page.route(
+          (url) => url.pathname === "/cgi-bin/list" && match(url.searchParams),
+          async (route) => {
+            const response = await route.fetch();
+            const reply = await response.json();
+            edit(reply.data.items);
+            await route.fulfill({ response, json: reply });
+          },
+        );
+      await change(
+        (params) => params.get("action") === "shares",
+        (items) => {
+          items.find((item) => item.name === "music").additional.mount_point_type = "remotefail";
+          items.find((item) => item.name === "photo").additional.volume_status.readonly = true;
+        },
+      );
+      await change(
+        (params) => params.get("path_raw") === "/projects",
+        (items) => {
+          ["iso", "remote", "remotefail"].forEach((type, i) => {
+            items[i + 2].additional.mount_point_type = type;
+          });
+        },
+      );
+      await page.reload();
+      await page.waitForSelector(".card:has-text('music') >> text=Server does not answer");
+      await page.waitForSelector(".card:has-text('photo') >> text=Read only");
+      assert.equal(await page.locator("#tree .tag.warn").count(), 1);
+      await page.click(".card >> text=projects");
+      for (const kind of ["iso", "remote", "offline"])
+        await page.waitForSelector(`#view use[href$="kind-folder-${kind}"]`, { state: "attached" });
+      await screenshot(page, "mounts");
 
-  let answer;
-  const held = new Promise((resolve) => { answer = resolve; });
-  await page.route("**/cgi-bin/list?*warehouse*", async (route) => {
-    await held;
-    await route.continue();
-  });
-  await page.click("#tree >> text=warehouse");
-  await page.waitForSelector("#view .row.waiting");
-  await screenshot(page, "waiting");
-  answer();
-  await page.waitForSelector("#view >> text=item-00000.dat");
-  await page.route("**/cgi-bin/list?*preview*", (route) => route.abort("connectionrefused"));
-  await page.click("#tree >> text=preview");
-  await page.waitForSelector(".state >> text=The server does not answer");
-  await screenshot(page, "unreachable");
-  await page.unroute("**/cgi-bin/list?*preview*");
-  await page.click(".state button >> text=Try again");
-  await page.waitForSelector("#view >> text=readme.txt");
-}, [/ERR_CONNECTION_REFUSED/]));
+      let answer;
+      const held = new Promise((resolve) => {
+        answer = resolve;
+      });
+      await page.route("**/cgi-bin/list?*warehouse*", async (route) => {
+        await held;
+        await route.continue();
+      });
+      await page.click("#tree >> text=warehouse");
+      await page.waitForSelector("#view .row.waiting");
+      await screenshot(page, "waiting");
+      answer();
+      await page.waitForSelector("#view >> text=item-00000.dat");
+      await page.route("**/cgi-bin/list?*preview*", (route) => route.abort("connectionrefused"));
+      await page.click("#tree >> text=preview");
+      await page.waitForSelector(".state >> text=The server does not answer");
+      await screenshot(page, "unreachable");
+      await page.unroute("**/cgi-bin/list?*preview*");
+      await page.click(".state button >> text=Try again");
+      await page.waitForSelector("#view >> text=readme.txt");
+    },
+    [/ERR_CONNECTION_REFUSED/],
+  ));
 
-test("a typed path, a filter, a place that is not there any more", () => withPage(chrome, "alice", { path: "/" }, async (page) => {
-  await page.keyboard.press("Control+l");
-  await page.keyboard.type("/projects/house");
-  await page.keyboard.press("Enter");
-  await page.waitForSelector("#view >> text=plan.pdf");
-  assert.equal(await place(page), "/projects/house");
-  await page.keyboard.press("/");
-  await page.keyboard.type("nothing like it");
-  await page.waitForSelector(".state >> text=Nothing here matches");
-  await page.keyboard.press("Escape");
-  await page.waitForSelector("#view >> text=plan.pdf");
-}));
+test("a typed path, a filter, a place that is not there any more", () =>
+  withPage(chrome, "alice", { path: "/" }, async (page) => {
+    await page.keyboard.press("Control+l");
+    await page.keyboard.type("/projects/house");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector("#view >> text=plan.pdf");
+    assert.equal(await place(page), "/projects/house");
+    await page.keyboard.press("/");
+    await page.keyboard.type("nothing like it");
+    await page.waitForSelector(".state >> text=Nothing here matches");
+    await page.keyboard.press("Escape");
+    await page.waitForSelector("#view >> text=plan.pdf");
+  }));
 
 test("every module is fetched at once", async () => {
   const web = new URL("../../apps/web/", import.meta.url);
-  const listed = [...readFileSync(new URL("index.html", web), "utf8").matchAll(/(?:href|src)="js\/([\w.]+)"/g)].map((match) => match[1]);
+  const listed = [...readFileSync(new URL("index.html", web), "utf8").matchAll(/(?:href|src)="js\/([\w.]+)"/g)].map(
+    (match) => match[1],
+  );
   assert.deepEqual(listed.sort(), readdirSync(new URL("js", web)).sort());
 });
 
@@ -209,6 +268,10 @@ test("every message key has its words, in both languages", async () => {
     const table = (await import(`../../apps/web/strings/${file}`, { with: { type: "json" } })).default;
     for (const key of keys) assert.ok(table[key] && table[`${key}.hint`], `${key} in ${file}`);
   }
-  const [de, en] = await Promise.all(tables.sort().map(async (file) => (await import(`../../apps/web/strings/${file}`, { with: { type: "json" } })).default));
+  const [de, en] = await Promise.all(
+    tables
+      .sort()
+      .map(async (file) => (await import(`../../apps/web/strings/${file}`, { with: { type: "json" } })).default),
+  );
   assert.deepEqual(Object.keys(de).sort(), Object.keys(en).sort());
 });

@@ -8,7 +8,11 @@ import { chromium } from "playwright-core";
 
 const PROGRAM = process.env.ORVEL_TEST_CHROMIUM ?? "/usr/bin/chromium";
 export const URL_OF_PAGE = process.env.ORVEL_TEST_URL;
-export const PASSWORDS = { alice: process.env.ORVEL_TEST_ALICE, bob: process.env.ORVEL_TEST_BOB, admin: process.env.ORVEL_TEST_ADMIN };
+export const PASSWORDS = {
+  alice: process.env.ORVEL_TEST_ALICE,
+  bob: process.env.ORVEL_TEST_BOB,
+  admin: process.env.ORVEL_TEST_ADMIN,
+};
 const SCREENSHOTS = process.env.ORVEL_TEST_SCREENSHOTS ?? mkdtempSync(join(tmpdir(), "orvel-screenshots-"));
 
 if (!existsSync(PROGRAM)) throw new Error(`${PROGRAM} is not installed: script/bootstrap does that`);
@@ -18,20 +22,36 @@ export async function launch() {
   const data = mkdtempSync(join(tmpdir(), "orvel-chromium-"));
   const browser = await chromium.launch({
     executablePath: PROGRAM,
-    args: ["--headless", "--no-sandbox", "--disable-gpu", "--disable-quic", "--no-first-run", "--disable-background-networking",
-      "--disable-component-update", "--disable-sync", `--disk-cache-dir=${data}`],
+    args: [
+      "--headless",
+      "--no-sandbox",
+      "--disable-gpu",
+      "--disable-quic",
+      "--no-first-run",
+      "--disable-background-networking",
+      "--disable-component-update",
+      "--disable-sync",
+      `--disk-cache-dir=${data}`,
+    ],
   });
-  return { browser, close: async () => {
-    await browser.close();
-    rmSync(data, { recursive: true, force: true });
-  } };
+  return {
+    browser,
+    close: async () => {
+      await browser.close();
+      rmSync(data, { recursive: true, force: true });
+    },
+  };
 }
 
 // A page of `user`. `complaints` is what must be empty at the end: errors on the console or of scripts, failed requests.
 export async function openPage(browser, user, { path = "/", ...options } = {}) {
   const context = await browser.newContext({
-    viewport: { width: 1280, height: 800 }, locale: "en-GB", colorScheme: "light", reducedMotion: "reduce",
-    httpCredentials: user && { username: user, password: PASSWORDS[user] }, ...options,
+    viewport: { width: 1280, height: 800 },
+    locale: "en-GB",
+    colorScheme: "light",
+    reducedMotion: "reduce",
+    httpCredentials: user && { username: user, password: PASSWORDS[user] },
+    ...options,
   });
   const page = await context.newPage();
   page.complaints = [];
@@ -41,7 +61,8 @@ export async function openPage(browser, user, { path = "/", ...options } = {}) {
   page.on("pageerror", (error) => page.complaints.push(`page: ${error.stack}`));
   page.on("requestfailed", (request) => {
     // What the page itself lets go of, and a download, which leaves its frame, end so.
-    if (request.failure().errorText !== "net::ERR_ABORTED") page.complaints.push(`request: ${request.url()} ${request.failure().errorText}`);
+    if (request.failure().errorText !== "net::ERR_ABORTED")
+      page.complaints.push(`request: ${request.url()} ${request.failure().errorText}`);
   });
   page.on("response", (response) => {
     if (response.status() >= 400) page.complaints.push(`status ${response.status()}: ${response.url()}`);
@@ -57,8 +78,15 @@ export async function withPage({ browser }, user, options, run, expected = []) {
   try {
     await rowsReady(page);
     await run(page);
-    for (const one of expected) assert.ok(page.complaints.some((text) => one.test(text)), `${one} in ${page.complaints}`);
-    assert.deepEqual(page.complaints.filter((text) => !expected.some((one) => one.test(text))), []);
+    for (const one of expected)
+      assert.ok(
+        page.complaints.some((text) => one.test(text)),
+        `${one} in ${page.complaints}`,
+      );
+    assert.deepEqual(
+      page.complaints.filter((text) => !expected.some((one) => one.test(text))),
+      [],
+    );
   } catch (failure) {
     await screenshot(page, `failed-${user}-${Date.now()}`);
     failure.message += `\nComplaints: ${page.complaints.join("\n")}`;
@@ -79,7 +107,10 @@ export async function rowsReady(page) {
 }
 
 export function row(page, name) {
-  return page.locator("#view .row:not(.header)").filter({ has: page.locator(".name", { hasText: name }) }).first();
+  return page
+    .locator("#view .row:not(.header)")
+    .filter({ has: page.locator(".name", { hasText: name }) })
+    .first();
 }
 
 // A PNG of hills under a sky, different for each number.
@@ -89,10 +120,13 @@ export function picture(width, height, number) {
     for (let x = 0; x < width; ++x) {
       let layer = 0;
       for (let i = 1; i <= 4; ++i) {
-        const ridge = height * (0.3 + i * 0.15) + Math.sin(x / (34 + 9 * i) + number * i * 1.7) * 18 + Math.sin(x / 13 + number + i) * 4;
+        const ridge =
+          height * (0.3 + i * 0.15) +
+          Math.sin(x / (34 + 9 * i) + number * i * 1.7) * 18 +
+          Math.sin(x / 13 + number + i) * 4;
         if (y > ridge) layer = i;
       }
-      const hue = (number * 47) % 360 + layer * 14;
+      const hue = ((number * 47) % 360) + layer * 14;
       const light = layer === 0 ? 0.92 - (0.35 * (height - y)) / height : 0.66 - layer * 0.13;
       const channel = (shift) => Math.round(255 * light * (0.72 + 0.28 * Math.cos(((hue + shift) * Math.PI) / 180)));
       rows.set([channel(0), channel(120), channel(240)], y * (width * 3 + 1) + 1 + x * 3);
@@ -110,5 +144,10 @@ export function picture(width, height, number) {
   head.writeUInt32BE(width, 0);
   head.writeUInt32BE(height, 4);
   head.set([8, 2], 8);
-  return Buffer.concat([Buffer.from("\x89PNG\r\n\x1a\n", "latin1"), chunk("IHDR", head), chunk("IDAT", deflateSync(rows)), chunk("IEND", Buffer.alloc(0))]);
+  return Buffer.concat([
+    Buffer.from("\x89PNG\r\n\x1a\n", "latin1"),
+    chunk("IHDR", head),
+    chunk("IDAT", deflateSync(rows)),
+    chunk("IEND", Buffer.alloc(0)),
+  ]);
 }

@@ -34,96 +34,121 @@ async function upload(page, command, paths) {
 
 const card = (page, text) => page.locator(".activity-card", { hasText: text }).first();
 
-test("uploads: files, a folder, a conflict asked about once, cancel", () => withPage(chrome, "alice", { path: "/projects" }, async (page) => {
-  await page.click("#toolbar >> text=New folder");
-  await page.waitForSelector(".dialog .input");
-  await page.keyboard.type("in/out");
-  await page.keyboard.press("Enter");
-  await page.waitForSelector(".dialog .complaint >> text=cannot hold");
-  await page.fill(".dialog .input", "house");
-  await page.keyboard.press("Enter");
-  await page.waitForSelector(".dialog .complaint >> text=exists already");
-  await page.fill(".dialog .input", "incoming “1”");
-  await page.keyboard.press("Enter");
-  await page.waitForSelector("#view .row.selected >> text=incoming");
-  await page.keyboard.press("Enter");
-  await page.waitForSelector(".state >> text=This folder is empty");
-  await screenshot(page, "empty");
+test("uploads: files, a folder, a conflict asked about once, cancel", () =>
+  withPage(chrome, "alice", { path: "/projects" }, async (page) => {
+    await page.click("#toolbar >> text=New folder");
+    await page.waitForSelector(".dialog .input");
+    await page.keyboard.type("in/out");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector(".dialog .complaint >> text=cannot hold");
+    await page.fill(".dialog .input", "house");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector(".dialog .complaint >> text=exists already");
+    await page.fill(".dialog .input", "incoming “1”");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector("#view .row.selected >> text=incoming");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector(".state >> text=This folder is empty");
+    await screenshot(page, "empty");
 
-  const there = join(projects, "incoming “1”");
-  const some = ["one.txt", "two, three*.txt", "four.txt"].map((name) => join(files, name));
-  await upload(page, "Upload files", some);
-  await card(page, "3 files uploaded").waitFor();
-  assert.equal(readFileSync(join(there, "two, three*.txt"), "utf8"), "two, three*.txt, new");
-  await upload(page, "Upload files", some);
-  await page.waitForSelector(".dialog >> text=The file exists already");
-  await screenshot(page, "conflict");
-  await page.click(".dialog >> text=Keep both");
-  await page.waitForSelector("#view >> text=four (2).txt");
-  assert.equal(await page.locator(".dialog").count(), 0);
-  for (const name of some) writeFileSync(name, "newer");
-  await upload(page, "Upload files", some);
-  await page.click(".dialog >> text=Replace");
-  await page.waitForFunction(() => document.querySelectorAll(".activity-card.good").length === 3);
-  assert.equal(readFileSync(join(there, "one.txt"), "utf8"), "newer");
+    const there = join(projects, "incoming “1”");
+    const some = ["one.txt", "two, three*.txt", "four.txt"].map((name) => join(files, name));
+    await upload(page, "Upload files", some);
+    await card(page, "3 files uploaded").waitFor();
+    assert.equal(readFileSync(join(there, "two, three*.txt"), "utf8"), "two, three*.txt, new");
+    await upload(page, "Upload files", some);
+    await page.waitForSelector(".dialog >> text=The file exists already");
+    await screenshot(page, "conflict");
+    await page.click(".dialog >> text=Keep both");
+    await page.waitForSelector("#view >> text=four (2).txt");
+    assert.equal(await page.locator(".dialog").count(), 0);
+    for (const name of some) writeFileSync(name, "newer");
+    await upload(page, "Upload files", some);
+    await page.click(".dialog >> text=Replace");
+    await page.waitForFunction(() => document.querySelectorAll(".activity-card.good").length === 3);
+    assert.equal(readFileSync(join(there, "one.txt"), "utf8"), "newer");
 
-  await upload(page, "Upload a folder", join(files, "trip"));
-  await card(page, "9 files uploaded").waitFor();
-  assert.equal(statSync(join(there, "trip/day 1/view 8.png")).size, statSync(join(files, "trip/day 1/view 8.png")).size);
-  await page.waitForSelector("#view >> text=trip");
+    await upload(page, "Upload a folder", join(files, "trip"));
+    await card(page, "9 files uploaded").waitFor();
+    assert.equal(
+      statSync(join(there, "trip/day 1/view 8.png")).size,
+      statSync(join(files, "trip/day 1/view 8.png")).size,
+    );
+    await page.waitForSelector("#view >> text=trip");
 
-  // Dropped on a folder of the list, from outside.
-  await row(page, "trip").evaluate((target) => {
-    const data = new DataTransfer();
-    data.items.add(new File(["dropped"], "from outside.txt"));
-    for (const type of ["dragenter", "dragover", "drop"]) target.dispatchEvent(new DragEvent(type, { bubbles: true, cancelable: true, dataTransfer: data }));
-  });
-  await card(page, "1 file to trip").filter({ hasText: "1 file uploaded" }).waitFor();
-  assert.equal(readFileSync(join(there, "trip/from outside.txt"), "utf8"), "dropped");
+    // Dropped on a folder of the list, from outside.
+    await row(page, "trip").evaluate((target) => {
+      const data = new DataTransfer();
+      data.items.add(new File(["dropped"], "from outside.txt"));
+      for (const type of ["dragenter", "dragover", "drop"])
+        target.dispatchEvent(new DragEvent(type, { bubbles: true, cancelable: true, dataTransfer: data }));
+    });
+    await card(page, "1 file to trip").filter({ hasText: "1 file uploaded" }).waitFor();
+    assert.equal(readFileSync(join(there, "trip/from outside.txt"), "utf8"), "dropped");
 
-  // The network is slow enough that there is something to cancel.
-  const session = await page.context().newCDPSession(page);
-  await session.send("Network.emulateNetworkConditions", { offline: false, latency: 0, downloadThroughput: -1, uploadThroughput: 4 << 20 });
-  await upload(page, "Upload files", join(files, "large.bin"));
-  await page.waitForFunction(() => Number(document.querySelector(".activity-card [role=progressbar]").getAttribute("aria-valuenow")) > 5);
-  await screenshot(page, "upload");
-  await page.locator(".activity-card").first().locator("button").click();
-  await card(page, "Cancelled").waitFor();
-  assert.ok(!existsSync(join(there, "large.bin")));
-}));
+    // The network is slow enough that there is something to cancel.
+    const session = await page.context().newCDPSession(page);
+    await session.send("Network.emulateNetworkConditions", {
+      offline: false,
+      latency: 0,
+      downloadThroughput: -1,
+      uploadThroughput: 4 << 20,
+    });
+    await upload(page, "Upload files", join(files, "large.bin"));
+    await page.waitForFunction(
+      () => Number(document.querySelector(".activity-card [role=progressbar]").getAttribute("aria-valuenow")) > 5,
+    );
+    await screenshot(page, "upload");
+    await page.locator(".activity-card").first().locator("button").click();
+    await card(page, "Cancelled").waitFor();
+    assert.ok(!existsSync(join(there, "large.bin")));
+  }));
 
-test("previews, thumbnails, rename, downloads", () => withPage(chrome, "alice", { path: "/projects/incoming%20%E2%80%9C1%E2%80%9D/trip" }, async (page) => {
-  await row(page, "list & more").dblclick();
-  await page.waitForSelector(".preview pre >> text=<b>bread</b>");
-  await screenshot(page, "preview-text");
-  await page.keyboard.press("Escape");
-  await row(page, "day 1").dblclick();
-  await page.click(".view-switch button >> nth=1");
-  await page.waitForFunction(() => document.querySelectorAll(".thumbnail.loaded img").length === 8);
-  await screenshot(page, "thumbnails");
-  await row(page, "view 3").click();
-  await page.focus("#view");
-  await page.keyboard.press(" ");
-  await page.waitForSelector(".preview img");
-  await screenshot(page, "preview-image");
-  await page.keyboard.press("ArrowRight");
-  await page.waitForSelector(".preview-title >> text=view 4.png");
-  await page.keyboard.press("Escape");
-  await page.keyboard.press("F2");
-  await page.fill(".dialog .input", "seen <b>here.png");
-  await page.keyboard.press("Enter");
-  await page.waitForSelector("#view .row.selected >> text=seen <b>here.png");
-  await page.keyboard.press("Control+a");
-  const download = page.waitForEvent("download");
-  await page.click("#toolbar >> text=Download");
-  assert.equal((await download).suggestedFilename(), "day 1.zip");
-  assert.equal(readFileSync(await (await download).path()).subarray(0, 2).toString(), "PK");
-}));
+test("previews, thumbnails, rename, downloads", () =>
+  withPage(chrome, "alice", { path: "/projects/incoming%20%E2%80%9C1%E2%80%9D/trip" }, async (page) => {
+    await row(page, "list & more").dblclick();
+    await page.waitForSelector(".preview pre >> text=<b>bread</b>");
+    await screenshot(page, "preview-text");
+    await page.keyboard.press("Escape");
+    await row(page, "day 1").dblclick();
+    await page.click(".view-switch button >> nth=1");
+    await page.waitForFunction(() => document.querySelectorAll(".thumbnail.loaded img").length === 8);
+    await screenshot(page, "thumbnails");
+    await row(page, "view 3").click();
+    await page.focus("#view");
+    await page.keyboard.press(" ");
+    await page.waitForSelector(".preview img");
+    await screenshot(page, "preview-image");
+    await page.keyboard.press("ArrowRight");
+    await page.waitForSelector(".preview-title >> text=view 4.png");
+    await page.keyboard.press("Escape");
+    await page.keyboard.press("F2");
+    await page.fill(".dialog .input", "seen <b>here.png");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector("#view .row.selected >> text=seen <b>here.png");
+    await page.keyboard.press("Control+a");
+    const download = page.waitForEvent("download");
+    await page.click("#toolbar >> text=Download");
+    assert.equal((await download).suggestedFilename(), "day 1.zip");
+    assert.equal(
+      readFileSync(await (await download).path())
+        .subarray(0, 2)
+        .toString(),
+      "PK",
+    );
+  }));
 
 test("another site's page changes nothing", async () => {
   const authorization = `Basic ${Buffer.from(`alice:${PASSWORDS.alice}`).toString("base64")}`;
-  for (const [origin, status] of [["http://elsewhere.example", 403], ["null", 403], [new URL(URL_OF_PAGE).origin, 200]]) {
-    const request = http.request(`${URL_OF_PAGE}cgi-bin/operation`, { method: "POST", headers: { authorization, origin, "Content-Type": "application/x-www-form-urlencoded" } });
+  for (const [origin, status] of [
+    ["http://elsewhere.example", 403],
+    ["null", 403],
+    [new URL(URL_OF_PAGE).origin, 200],
+  ]) {
+    const request = http.request(`${URL_OF_PAGE}cgi-bin/operation`, {
+      method: "POST",
+      headers: { authorization, origin, "Content-Type": "application/x-www-form-urlencoded" },
+    });
     const answered = once(request, "response");
     request.end("action=mkdir&path=/projects/by another site");
     const [response] = await answered;
@@ -133,10 +158,17 @@ test("another site's page changes nothing", async () => {
   }
 });
 
-test("a refused download says so in words", () => withPage(chrome, "alice", { path: "/preview" }, async (page) => {
-  await row(page, "readme.txt").click();
-  await page.click("#toolbar >> text=Download");
-  await page.waitForSelector(".toast.failed >> text=no permission for “readme.txt”");
-  await page.click(".toast >> text=Why?");
-  await page.waitForSelector(".why >> text=The share lets nobody download");
-}, [/403.*download/, /status of 403/]));
+test("a refused download says so in words", () =>
+  withPage(
+    chrome,
+    "alice",
+    { path: "/preview" },
+    async (page) => {
+      await row(page, "readme.txt").click();
+      await page.click("#toolbar >> text=Download");
+      await page.waitForSelector(".toast.failed >> text=no permission for “readme.txt”");
+      await page.click(".toast >> text=Why?");
+      await page.waitForSelector(".why >> text=The share lets nobody download");
+    },
+    [/403.*download/, /status of 403/],
+  ));

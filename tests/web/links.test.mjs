@@ -4,7 +4,9 @@ import { after, before, test } from "node:test";
 import { launch, row, screenshot, withPage } from "./browser.mjs";
 
 let chrome;
-before(async () => { chrome = await launch(); });
+before(async () => {
+  chrome = await launch();
+});
 after(() => chrome.close());
 
 async function makeLink(page, name, password) {
@@ -23,7 +25,9 @@ async function visit(address, run) {
   const page = await context.newPage();
   const wrong = [];
   page.on("pageerror", (error) => wrong.push(error.stack));
-  page.on("console", (message) => { if (message.type() === "error") wrong.push(message.text()); });
+  page.on("console", (message) => {
+    if (message.type() === "error") wrong.push(message.text());
+  });
   try {
     const response = await page.goto(address);
     await run(page, response.status(), wrong);
@@ -32,43 +36,50 @@ async function visit(address, run) {
   }
 }
 
-test("a folder with a password, opened elsewhere, then revoked", () => withPage(chrome, "alice", { path: "/projects" }, async (page) => {
-  const address = await makeLink(page, "house", "let me in");
-  await visit(address, async (visitor, status, wrong) => {
-    assert.equal(status, 200);
-    await visitor.fill("input[type=password]", "let me out");
-    await visitor.keyboard.press("Enter");
-    await visitor.waitForFunction(() => document.querySelector(".wrong")?.textContent.trim());
-    await visitor.fill("input[type=password]", "let me in");
-    await visitor.keyboard.press("Enter");
-    await visitor.waitForSelector("text=plan.pdf");
-    await screenshot(visitor, "visitor");
-    const download = visitor.waitForEvent("download");
-    await visitor.click("text=plan.pdf");
-    assert.equal((await download).suggestedFilename(), "plan.pdf");
-    assert.deepEqual(wrong.filter((text) => !text.includes("403")), []);
-  });
-  await page.click("#settings-button");
-  await page.click(".menu >> text=My public links");
-  await page.waitForSelector(".link-list >> text=with password");
-  await screenshot(page, "links");
-  await page.click(".link-list [aria-label=Revoke]");
-  await page.click(".dialog .button.danger");
-  await page.waitForSelector(".link-list >> text=You have no public links");
-  await visit(address, async (visitor, status) => {
-    assert.equal(status, 404);
-    assert.equal(await visitor.locator("text=plan.pdf").count(), 0);
-  });
-}));
+test("a folder with a password, opened elsewhere, then revoked", () =>
+  withPage(chrome, "alice", { path: "/projects" }, async (page) => {
+    const address = await makeLink(page, "house", "let me in");
+    await visit(address, async (visitor, status, wrong) => {
+      assert.equal(status, 200);
+      await visitor.fill("input[type=password]", "let me out");
+      await visitor.keyboard.press("Enter");
+      await visitor.waitForFunction(() => document.querySelector(".wrong")?.textContent.trim());
+      await visitor.fill("input[type=password]", "let me in");
+      await visitor.keyboard.press("Enter");
+      await visitor.waitForSelector("text=plan.pdf");
+      await screenshot(visitor, "visitor");
+      const download = visitor.waitForEvent("download");
+      await visitor.click("text=plan.pdf");
+      assert.equal((await download).suggestedFilename(), "plan.pdf");
+      assert.deepEqual(
+        wrong.filter((text) => !text.includes("403")),
+        [],
+      );
+    });
+    await page.click("#settings-button");
+    await page.click(".menu >> text=My public links");
+    await page.waitForSelector(".link-list >> text=with password");
+    await screenshot(page, "links");
+    await page.click(".link-list [aria-label=Revoke]");
+    await page.click(".dialog .button.danger");
+    await page.waitForSelector(".link-list >> text=You have no public links");
+    await visit(address, async (visitor, status) => {
+      assert.equal(status, 404);
+      assert.equal(await visitor.locator("text=plan.pdf").count(), 0);
+    });
+  }));
 
-test("names of markup reach a visitor as text", () => withPage(chrome, "alice", { path: "/" }, async (page) => {
-  await page.evaluate(() => { location.hash = "/worldwide"; });
-  await page.waitForSelector("#view >> text=#hash.txt");
-  const address = await makeLink(page, "<img src=x onerror", "");
-  await visit(address, async (visitor, status, wrong) => {
-    assert.equal(status, 200);
-    await visitor.waitForSelector("text=<img src=x onerror=alert(1)>.txt");
-    assert.equal(await visitor.locator("img").count(), 0);
-    assert.deepEqual(wrong, []);
-  });
-}));
+test("names of markup reach a visitor as text", () =>
+  withPage(chrome, "alice", { path: "/" }, async (page) => {
+    await page.evaluate(() => {
+      location.hash = "/worldwide";
+    });
+    await page.waitForSelector("#view >> text=#hash.txt");
+    const address = await makeLink(page, "<img src=x onerror", "");
+    await visit(address, async (visitor, status, wrong) => {
+      assert.equal(status, 200);
+      await visitor.waitForSelector("text=<img src=x onerror=alert(1)>.txt");
+      assert.equal(await visitor.locator("img").count(), 0);
+      assert.deepEqual(wrong, []);
+    });
+  }));

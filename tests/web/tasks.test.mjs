@@ -13,147 +13,160 @@ before(async () => {
   mkdirSync(`${projects}/many/target`, { recursive: true });
   for (let i = 0; i < MANY; ++i) writeFileSync(`${projects}/many/part ${i}.dat`, "x");
   mkdirSync(`${projects}/<i>odd`, { mode: 0o777 });
-  for (const name of ["needle 'one'.txt", "needle & two.txt", "Needle \u202Ethree.txt"]) writeFileSync(`${projects}/<i>odd/${name}`, "needle");
+  for (const name of ["needle 'one'.txt", "needle & two.txt", "Needle \u202Ethree.txt"])
+    writeFileSync(`${projects}/<i>odd/${name}`, "needle");
 });
 after(() => chrome.close());
 
 const card = (page, text) => page.locator(".activity-card", { hasText: text }).first();
 const found = (page, count) => page.waitForSelector(`#status >> text=${count} found`);
 
-test("a search: live, sorted, filtered, true after operations", () => withPage(chrome, "admin", { path: "/projects" }, async (page) => {
-  await page.fill("#find", "needle*");
-  await page.press("#find", "Enter");
-  await found(page, 3);
-  await rowsReady(page);
-  await page.click("[data-sort=name]");
-  await page.waitForSelector("[aria-sort=descending]");
-  await page.fill("#find", "two");
-  await found(page, 1);
-  await page.fill("#find", "");
-  await found(page, 3);
-  await screenshot(page, "search-few");
-  await row(page, "needle & two.txt").click();
-  await page.keyboard.press("F2");
-  await page.fill(".dialog .input", "needle & four.txt");
-  await page.keyboard.press("Enter");
-  await page.waitForSelector("#view >> text=needle & four.txt");
-  await row(page, "needle 'one'").click();
-  await page.keyboard.press("Delete");
-  await found(page, 2);
-  await page.reload(); // the address keeps the search
-  await found(page, 2);
-  await row(page, "four.txt").click({ button: "right" });
-  await page.click(".menu >> text=Show in its folder");
-  await page.waitForSelector("#view .row.selected >> text=needle & four.txt");
-  assert.equal(await page.evaluate(() => location.hash), "#/projects/%3Ci%3Eodd");
-}));
+test("a search: live, sorted, filtered, true after operations", () =>
+  withPage(chrome, "admin", { path: "/projects" }, async (page) => {
+    await page.fill("#find", "needle*");
+    await page.press("#find", "Enter");
+    await found(page, 3);
+    await rowsReady(page);
+    await page.click("[data-sort=name]");
+    await page.waitForSelector("[aria-sort=descending]");
+    await page.fill("#find", "two");
+    await found(page, 1);
+    await page.fill("#find", "");
+    await found(page, 3);
+    await screenshot(page, "search-few");
+    await row(page, "needle & two.txt").click();
+    await page.keyboard.press("F2");
+    await page.fill(".dialog .input", "needle & four.txt");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector("#view >> text=needle & four.txt");
+    await row(page, "needle 'one'").click();
+    await page.keyboard.press("Delete");
+    await found(page, 2);
+    await page.reload(); // the address keeps the search
+    await found(page, 2);
+    await row(page, "four.txt").click({ button: "right" });
+    await page.click(".menu >> text=Show in its folder");
+    await page.waitForSelector("#view .row.selected >> text=needle & four.txt");
+    assert.equal(await page.evaluate(() => location.hash), "#/projects/%3Ci%3Eodd");
+  }));
 
-test("a search with every kind of criterion, stopped, closed", () => withPage(chrome, "alice", { path: "/" }, async (page) => {
-  await page.click("#search-button");
-  await page.click(".search-form >> text=More criteria");
-  await page.fill("[name=name]", "part *");
-  await page.fill("[name=extension]", "dat");
-  await page.selectOption("[name=type]", "file");
-  await page.selectOption("[name=size_op]", "less");
-  await page.fill("[name=size]", "4");
-  await page.fill("[name=mtime_from]", "2020-01-01");
-  await page.fill("[name=owner]", "nobody of that name");
-  await page.click(".search-form >> text=/^Search$/");
-  await page.waitForSelector(".search-form .complaint >> text=Owner");
-  await page.fill("[name=owner]", "");
-  await page.click(".search-form >> text=/^Search$/");
-  await page.waitForSelector("#view .row >> text=part");
-  await screenshot(page, "search");
-  const stop = page.locator("#toolbar >> text=Stop");
-  if (await stop.isVisible()) await stop.click().catch(() => {});
-  await page.waitForFunction(() => !document.querySelector("#status .running"));
-  await page.press("#view", "End");
-  await page.waitForSelector("#view .row.cursor >> text=part");
-  await page.keyboard.press("Escape");
-  await page.click("#toolbar >> text=Close results");
-  await page.waitForSelector(".home");
-}));
+test("a search with every kind of criterion, stopped, closed", () =>
+  withPage(chrome, "alice", { path: "/" }, async (page) => {
+    await page.click("#search-button");
+    await page.click(".search-form >> text=More criteria");
+    await page.fill("[name=name]", "part *");
+    await page.fill("[name=extension]", "dat");
+    await page.selectOption("[name=type]", "file");
+    await page.selectOption("[name=size_op]", "less");
+    await page.fill("[name=size]", "4");
+    await page.fill("[name=mtime_from]", "2020-01-01");
+    await page.fill("[name=owner]", "nobody of that name");
+    await page.click(".search-form >> text=/^Search$/");
+    await page.waitForSelector(".search-form .complaint >> text=Owner");
+    await page.fill("[name=owner]", "");
+    await page.click(".search-form >> text=/^Search$/");
+    await page.waitForSelector("#view .row >> text=part");
+    await screenshot(page, "search");
+    const stop = page.locator("#toolbar >> text=Stop");
+    if (await stop.isVisible()) await stop.click().catch(() => {});
+    await page.waitForFunction(() => !document.querySelector("#status .running"));
+    await page.press("#view", "End");
+    await page.waitForSelector("#view .row.cursor >> text=part");
+    await page.keyboard.press("Escape");
+    await page.click("#toolbar >> text=Close results");
+    await page.waitForSelector(".home");
+  }));
 
-test("results from several shares", () => withPage(chrome, "alice", { path: "/" }, async (page) => {
-  await page.fill("#find", "*morn*, *night*, *notes*, plan*, IMG_001?.*");
-  await page.press("#find", "Enter");
-  await page.waitForSelector("#view >> text=plan.pdf");
-  await page.waitForFunction(() => !document.querySelector("#status .running"));
-  await page.click("[data-sort=ppath]");
-  await page.waitForSelector("[aria-sort=ascending] [data-sort=ppath]");
-  await rowsReady(page);
-  await screenshot(page, "search-shares");
-}));
+test("results from several shares", () =>
+  withPage(chrome, "alice", { path: "/" }, async (page) => {
+    await page.fill("#find", "*morn*, *night*, *notes*, plan*, IMG_001?.*");
+    await page.press("#find", "Enter");
+    await page.waitForSelector("#view >> text=plan.pdf");
+    await page.waitForFunction(() => !document.querySelector("#status .running"));
+    await page.click("[data-sort=ppath]");
+    await page.waitForSelector("[aria-sort=ascending] [data-sort=ppath]");
+    await rowsReady(page);
+    await screenshot(page, "search-shares");
+  }));
 
-test("copy, reload, cancel; a conflict; delete and restore", () => withPage(chrome, "admin", { path: "/projects" }, async (page) => {
-  await row(page, "many").click();
-  await page.keyboard.press("Control+c");
-  await page.evaluate(() => { location.hash = "/projects/house"; });
-  await page.waitForSelector("#view >> text=plan.pdf");
-  await page.focus("#view");
-  await page.keyboard.press("Control+v");
-  await card(page, "Copy").waitFor();
-  await page.reload();
-  await page.waitForFunction(() => document.querySelector(".activity-card .detail")?.textContent.includes(" of "));
-  await screenshot(page, "copy");
-  await card(page, "Copy").locator("button").click();
-  await card(page, "Cancelled").waitFor();
-  assert.ok(readdirSync(`${projects}/house/many`).length < MANY);
+test("copy, reload, cancel; a conflict; delete and restore", () =>
+  withPage(chrome, "admin", { path: "/projects" }, async (page) => {
+    await row(page, "many").click();
+    await page.keyboard.press("Control+c");
+    await page.evaluate(() => {
+      location.hash = "/projects/house";
+    });
+    await page.waitForSelector("#view >> text=plan.pdf");
+    await page.focus("#view");
+    await page.keyboard.press("Control+v");
+    await card(page, "Copy").waitFor();
+    await page.reload();
+    await page.waitForFunction(() => document.querySelector(".activity-card .detail")?.textContent.includes(" of "));
+    await screenshot(page, "copy");
+    await card(page, "Copy").locator("button").click();
+    await card(page, "Cancelled").waitFor();
+    assert.ok(readdirSync(`${projects}/house/many`).length < MANY);
 
-  await page.evaluate(() => { location.hash = "/projects/<i>odd"; });
-  await page.waitForSelector("#view >> text=four.txt");
-  await row(page, "four.txt").click();
-  for (let i = 0; i < 2; ++i) {
-    await page.click("#toolbar >> text=Copy to");
-    await page.click(".picker >> [aria-label='Up one folder']");
+    await page.evaluate(() => {
+      location.hash = "/projects/<i>odd";
+    });
+    await page.waitForSelector("#view >> text=four.txt");
+    await row(page, "four.txt").click();
+    for (let i = 0; i < 2; ++i) {
+      await page.click("#toolbar >> text=Copy to");
+      await page.click(".picker >> [aria-label='Up one folder']");
+      await page.click(".picker >> text=house");
+      await page.click(".picker >> text=Copy here");
+      if (i === 1) await page.click(".dialog >> text=Keep both");
+      await page.waitForFunction((count) => document.querySelectorAll(".activity-card.good").length === count, i + 1);
+    }
+    assert.ok(existsSync(`${projects}/house/needle & four (2).txt`));
+
+    await page.keyboard.press("Delete");
+    await page.waitForSelector(".activity-card.good >> text=Delete 1 item");
+    await page.click("#tree >> text=projects");
+    await page.dblclick("#view >> text=Recycle bin");
+    await row(page, "<i>odd").dblclick();
+    await row(page, "four.txt").click();
+    await screenshot(page, "recycle");
+    await page.click("#toolbar >> text=Restore");
+    await page.waitForSelector(".activity-card.good >> text=Restore 1 item");
+    assert.ok(existsSync(`${projects}/<i>odd/needle & four.txt`));
+  }));
+
+test("dragged to another folder", () =>
+  withPage(chrome, "alice", { path: "/projects" }, async (page) => {
+    await row(page, "left by bob.txt").click({ modifiers: ["Control"] });
+    await row(page, "notes.md").click({ modifiers: ["Control"] });
+    await row(page, "notes.md").dragTo(row(page, "house"));
+    await page.waitForSelector(".activity-card >> text=Move 2 items");
+    await page.waitForFunction(() => !document.querySelector("#view")?.textContent.includes("notes.md"));
+    await page.goto(`${URL_OF_PAGE}#/projects/house`);
+    await row(page, "notes.md").dragTo(page.locator("#tree >> text=projects"));
+    await page.waitForFunction(() => document.querySelectorAll(".activity-card.finished").length === 2);
+    assert.ok(existsSync(`${projects}/notes.md`));
+  }));
+
+test("packed, extracted, refused item by item", () =>
+  withPage(chrome, "alice", { path: "/projects" }, async (page) => {
+    await row(page, "notes.md").click();
+    await page.click("[aria-label='More actions']");
+    await page.click(".menu >> text=Pack as zip");
+    await page.keyboard.press("Enter");
+    await row(page, "notes.zip").click();
+    await page.click("[aria-label='More actions']");
+    await page.click(".menu >> text=Extract to");
     await page.click(".picker >> text=house");
-    await page.click(".picker >> text=Copy here");
-    if (i === 1) await page.click(".dialog >> text=Keep both");
-    await page.waitForFunction((count) => document.querySelectorAll(".activity-card.good").length === count, i + 1);
-  }
-  assert.ok(existsSync(`${projects}/house/needle & four (2).txt`));
-
-  await page.keyboard.press("Delete");
-  await page.waitForSelector(".activity-card.good >> text=Delete 1 item");
-  await page.click("#tree >> text=projects");
-  await page.dblclick("#view >> text=Recycle bin");
-  await row(page, "<i>odd").dblclick();
-  await row(page, "four.txt").click();
-  await screenshot(page, "recycle");
-  await page.click("#toolbar >> text=Restore");
-  await page.waitForSelector(".activity-card.good >> text=Restore 1 item");
-  assert.ok(existsSync(`${projects}/<i>odd/needle & four.txt`));
-}));
-
-test("dragged to another folder", () => withPage(chrome, "alice", { path: "/projects" }, async (page) => {
-  await row(page, "left by bob.txt").click({ modifiers: ["Control"] });
-  await row(page, "notes.md").click({ modifiers: ["Control"] });
-  await row(page, "notes.md").dragTo(row(page, "house"));
-  await page.waitForSelector(".activity-card >> text=Move 2 items");
-  await page.waitForFunction(() => !document.querySelector("#view")?.textContent.includes("notes.md"));
-  await page.goto(`${URL_OF_PAGE}#/projects/house`);
-  await row(page, "notes.md").dragTo(page.locator("#tree >> text=projects"));
-  await page.waitForFunction(() => document.querySelectorAll(".activity-card.finished").length === 2);
-  assert.ok(existsSync(`${projects}/notes.md`));
-}));
-
-test("packed, extracted, refused item by item", () => withPage(chrome, "alice", { path: "/projects" }, async (page) => {
-  await row(page, "notes.md").click();
-  await page.click("[aria-label='More actions']");
-  await page.click(".menu >> text=Pack as zip");
-  await page.keyboard.press("Enter");
-  await row(page, "notes.zip").click();
-  await page.click("[aria-label='More actions']");
-  await page.click(".menu >> text=Extract to");
-  await page.click(".picker >> text=house");
-  await page.click(".picker >> text=Extract here");
-  await page.waitForSelector(".activity-card.good >> text=Extract");
-  assert.ok(existsSync(`${projects}/house/notes.md`));
-  await row(page, "board").click();
-  await page.keyboard.press("Control+c");
-  await page.evaluate(() => { location.hash = "/projects/house"; });
-  await page.waitForSelector("#view >> text=plan.pdf");
-  await page.focus("#view");
-  await page.keyboard.press("Control+v");
-  await page.waitForSelector(".activity-card.failed >> text=no permission for “board”");
-}));
+    await page.click(".picker >> text=Extract here");
+    await page.waitForSelector(".activity-card.good >> text=Extract");
+    assert.ok(existsSync(`${projects}/house/notes.md`));
+    await row(page, "board").click();
+    await page.keyboard.press("Control+c");
+    await page.evaluate(() => {
+      location.hash = "/projects/house";
+    });
+    await page.waitForSelector("#view >> text=plan.pdf");
+    await page.focus("#view");
+    await page.keyboard.press("Control+v");
+    await page.waitForSelector(".activity-card.failed >> text=no permission for “board”");
+  }));

@@ -22,7 +22,8 @@ function paint() {
   $("activity").hidden = cards.size === 0;
   $("activity").classList.toggle("folded", !open);
   $("activity-toggle").setAttribute("aria-expanded", String(open));
-  $("activity-title").textContent = running.length > 0 ? t("activity.running", { count: running.length }) : t("activity.done");
+  $("activity-title").textContent =
+    running.length > 0 ? t("activity.running", { count: running.length }) : t("activity.done");
   $("activity-clear").hidden = running.length === cards.size;
 }
 
@@ -34,11 +35,21 @@ export class Card {
     this.title = h("b", {}, title);
     this.detail = h("span.detail");
     this.note = h("span.note");
-    this.bar = h("div.progress", { role: "progressbar", "aria-label": title, "aria-valuemin": 0, "aria-valuemax": 100 }, h("i"));
+    this.bar = h(
+      "div.progress",
+      { role: "progressbar", "aria-label": title, "aria-valuemin": 0, "aria-valuemax": 100 },
+      h("i"),
+    );
     this.errors = h("ul.errors", { hidden: true });
     this.picture = h("span.card-icon", {}, icon(iconName));
     this.button = iconButton("close", t("activity.cancel"), () => (this.finished ? this.remove() : onCancel()));
-    this.node = h("li.activity-card", {}, this.picture, h("div.grow", {}, this.title, this.bar, this.detail, this.note, this.errors), this.button);
+    this.node = h(
+      "li.activity-card",
+      {},
+      this.picture,
+      h("div.grow", {}, this.title, this.bar, this.detail, this.note, this.errors),
+      this.button,
+    );
     cards.add(this);
     open = true;
     $("activity-list").prepend(this.node);

@@ -65,36 +65,68 @@ export function goUp() {
 
 function columns() {
   const { name, folder, size, mtime, type, owner } = COLUMNS;
-  return (isSearch(browser.id) ? [name, folder, size, mtime, type] : [name, size, mtime, type, owner]).map((column) => ({
-    ...column,
-    sorted: column.sort !== browser.sort.by ? null : browser.sort.ascending ? "ascending" : "descending",
-  }));
+  return (isSearch(browser.id) ? [name, folder, size, mtime, type] : [name, size, mtime, type, owner]).map(
+    (column) => ({
+      ...column,
+      sorted: column.sort !== browser.sort.by ? null : browser.sort.ascending ? "ascending" : "descending",
+    }),
+  );
 }
 
 // Folders come first whichever way the rest is sorted: descending, they are a list of their own.
 function makeListing(id) {
   const parts = browser.sort.ascending ? ["all"] : ["dir", "file"];
   const pattern = browser.filter === "" ? undefined : `*${browser.filter.replace(/[,\\]/g, "?")}*`;
-  return new Listing(parts, async (filetype, offset, limit, signal) => {
-    const reply = await get("list", {
-      action: "folder", path_raw: id, filetype, offset, limit, pattern, additional: ADDITIONAL,
-      sort_by: browser.sort.by, sort_direction: browser.sort.ascending ? "asc" : "desc",
-    }, signal);
-    return { total: reply.total, items: reply.items.map(entryOf) };
-  }, changed);
+  return new Listing(
+    parts,
+    async (filetype, offset, limit, signal) => {
+      const reply = await get(
+        "list",
+        {
+          action: "folder",
+          path_raw: id,
+          filetype,
+          offset,
+          limit,
+          pattern,
+          additional: ADDITIONAL,
+          sort_by: browser.sort.by,
+          sort_direction: browser.sort.ascending ? "asc" : "desc",
+        },
+        signal,
+      );
+      return { total: reply.total, items: reply.items.map(entryOf) };
+    },
+    changed,
+  );
 }
 
 // What a search has found so far; `extra` of the listing tells whether it goes on.
 function makeResults(id) {
-  return new Listing(["all"], async (filetype, offset, limit, signal) => {
-    const reply = await get("search", {
-      action: "list", taskid: id.slice(1), filetype, offset, limit, filter: browser.filter || undefined, additional: ADDITIONAL,
-      sort_by: browser.sort.by, sort_direction: browser.sort.ascending ? "asc" : "desc",
-    }, signal).catch((failure) => {
-      throw failure.code === GONE ? new ApiError({ key: "page:search_gone" }) : failure;
-    });
-    return { ...reply, items: reply.items.map(entryOf) };
-  }, changed);
+  return new Listing(
+    ["all"],
+    async (filetype, offset, limit, signal) => {
+      const reply = await get(
+        "search",
+        {
+          action: "list",
+          taskid: id.slice(1),
+          filetype,
+          offset,
+          limit,
+          filter: browser.filter || undefined,
+          additional: ADDITIONAL,
+          sort_by: browser.sort.by,
+          sort_direction: browser.sort.ascending ? "asc" : "desc",
+        },
+        signal,
+      ).catch((failure) => {
+        throw failure.code === GONE ? new ApiError({ key: "page:search_gone" }) : failure;
+      });
+      return { ...reply, items: reply.items.map(entryOf) };
+    },
+    changed,
+  );
 }
 
 function changed(listing) {

@@ -52,34 +52,127 @@ export function runCommand(id) {
 export function shortcutText(keys) {
   const mac = navigator.platform.startsWith("Mac");
   const names = { Mod: mac ? "⌘" : "Ctrl", ArrowUp: "↑", ArrowLeft: "←", ArrowRight: "→", Delete: "Del", " ": "Space" };
-  return keys.split("+").map((key) => names[key] ?? (key.length === 1 ? key.toUpperCase() : key)).join(mac ? "" : "+");
+  return keys
+    .split("+")
+    .map((key) => names[key] ?? (key.length === 1 ? key.toUpperCase() : key))
+    .join(mac ? "" : "+");
 }
 
 const some = ({ count }) => count > 0;
 const one = ({ single }) => single !== undefined;
 
-addCommand({ id: "open", icon: "folder-open", keys: ["Enter"], group: "open", when: one, run: ({ single }) =>
-  (single.isFolder ? go(single.id) : preview(single)) });
-addCommand({ id: "preview", icon: "eye", keys: [" "], group: "open", when: ({ single }) => single && !single.isFolder,
-  run: ({ single }) => preview(single) });
-addCommand({ id: "download", icon: "download", keys: ["Mod+s"], group: "open", when: some,
-  run: async () => download(await selectedEntries()) });
-addCommand({ id: "rename", icon: "rename", keys: ["F2"], group: "change", when: ({ single, canChange, inBin }) => single && canChange && !inBin,
-  run: ({ single }) => rename(single) });
-addCommand({ id: "showInFolder", icon: "folder-open", group: "open", when: ({ single, search }) => single && search, run: ({ single }) => goTo(single) });
+addCommand({
+  id: "open",
+  icon: "folder-open",
+  keys: ["Enter"],
+  group: "open",
+  when: one,
+  run: ({ single }) => (single.isFolder ? go(single.id) : preview(single)),
+});
+addCommand({
+  id: "preview",
+  icon: "eye",
+  keys: [" "],
+  group: "open",
+  when: ({ single }) => single && !single.isFolder,
+  run: ({ single }) => preview(single),
+});
+addCommand({
+  id: "download",
+  icon: "download",
+  keys: ["Mod+s"],
+  group: "open",
+  when: some,
+  run: async () => download(await selectedEntries()),
+});
+addCommand({
+  id: "rename",
+  icon: "rename",
+  keys: ["F2"],
+  group: "change",
+  when: ({ single, canChange, inBin }) => single && canChange && !inBin,
+  run: ({ single }) => rename(single),
+});
+addCommand({
+  id: "showInFolder",
+  icon: "folder-open",
+  group: "open",
+  when: ({ single, search }) => single && search,
+  run: ({ single }) => goTo(single),
+});
 addCommand({ id: "copyPath", icon: "copy", group: "info", when: one, run: ({ single }) => copyPath(single.id) });
-addCommand({ id: "properties", icon: "info", keys: ["Alt+Enter"], group: "info", when: ({ single, folder, search }) => single || (folder && !search),
-  run: ({ single }) => showProperties(single ?? browser.id) });
-addCommand({ id: "upload", icon: "upload", keys: ["Mod+u"], group: "new", when: ({ canWrite, inBin }) => canWrite && !inBin, run: () => chooseFiles(false) });
-addCommand({ id: "uploadFolder", icon: "upload", group: "new", when: ({ canWrite, inBin }) => canWrite && !inBin, run: () => chooseFiles(true) });
-addCommand({ id: "newFolder", icon: "new-folder", keys: ["Alt+n"], group: "new", when: ({ canWrite, inBin }) => canWrite && !inBin, run: () => newFolder() });
-addCommand({ id: "selectAll", icon: "check", keys: ["Mod+a"], group: "select", when: ({ folder }) => folder,
-  run: () => browser.selection.all(browser.listing.total) });
-addCommand({ id: "selectNone", icon: "close", keys: ["Escape"], group: "select", when: some, run: () => browser.selection.clear() });
+addCommand({
+  id: "properties",
+  icon: "info",
+  keys: ["Alt+Enter"],
+  group: "info",
+  when: ({ single, folder, search }) => single || (folder && !search),
+  run: ({ single }) => showProperties(single ?? browser.id),
+});
+addCommand({
+  id: "upload",
+  icon: "upload",
+  keys: ["Mod+u"],
+  group: "new",
+  when: ({ canWrite, inBin }) => canWrite && !inBin,
+  run: () => chooseFiles(false),
+});
+addCommand({
+  id: "uploadFolder",
+  icon: "upload",
+  group: "new",
+  when: ({ canWrite, inBin }) => canWrite && !inBin,
+  run: () => chooseFiles(true),
+});
+addCommand({
+  id: "newFolder",
+  icon: "new-folder",
+  keys: ["Alt+n"],
+  group: "new",
+  when: ({ canWrite, inBin }) => canWrite && !inBin,
+  run: () => newFolder(),
+});
+addCommand({
+  id: "selectAll",
+  icon: "check",
+  keys: ["Mod+a"],
+  group: "select",
+  when: ({ folder }) => folder,
+  run: () => browser.selection.all(browser.listing.total),
+});
+addCommand({
+  id: "selectNone",
+  icon: "close",
+  keys: ["Escape"],
+  group: "select",
+  when: some,
+  run: () => browser.selection.clear(),
+});
 addCommand({ id: "refresh", icon: "refresh", keys: ["Alt+r"], group: "view", run: () => refresh() });
-addCommand({ id: "viewList", icon: "list", keys: ["Alt+1"], group: "view", when: ({ folder }) => folder, run: () => setMode("list") });
-addCommand({ id: "viewGrid", icon: "grid", keys: ["Alt+2"], group: "view", when: ({ folder }) => folder, run: () => setMode("grid") });
-addCommand({ id: "up", icon: "up", keys: ["Backspace", "Alt+ArrowUp"], group: "go", when: () => browser.id !== "/", run: goUp });
+addCommand({
+  id: "viewList",
+  icon: "list",
+  keys: ["Alt+1"],
+  group: "view",
+  when: ({ folder }) => folder,
+  run: () => setMode("list"),
+});
+addCommand({
+  id: "viewGrid",
+  icon: "grid",
+  keys: ["Alt+2"],
+  group: "view",
+  when: ({ folder }) => folder,
+  run: () => setMode("grid"),
+});
+addCommand({
+  id: "up",
+  icon: "up",
+  keys: ["Backspace", "Alt+ArrowUp"],
+  group: "go",
+  when: () => browser.id !== "/",
+  run: goUp,
+});
 addCommand({ id: "back", icon: "back", keys: ["Alt+ArrowLeft"], group: "go", run: () => history.back() });
 addCommand({ id: "forward", icon: "forward", keys: ["Alt+ArrowRight"], group: "go", run: () => history.forward() });
 addCommand({ id: "editPath", icon: "rename", keys: ["Mod+l"], group: "go", run: editPath });

@@ -15,7 +15,10 @@ export async function takenNames(folder, names) {
   const taken = new Set();
   for (let i = 0; i < names.length; i += NAMES_PER_QUESTION) {
     // The program takes patterns; a character that means something in one stands for any here.
-    const pattern = names.slice(i, i + NAMES_PER_QUESTION).map((name) => decode(name).replace(/[,\\*?[\]\uFFFD]/g, "?")).join(",");
+    const pattern = names
+      .slice(i, i + NAMES_PER_QUESTION)
+      .map((name) => decode(name).replace(/[,\\*?[\]\uFFFD]/g, "?"))
+      .join(",");
     const reply = await post("list", { action: "folder", path_raw: folder, pattern }).catch((failure) => {
       if (failure.code === MISSING) return { items: [] }; // is yet to be made
       throw failure;
@@ -27,16 +30,27 @@ export async function takenNames(folder, names) {
 
 // {answer: "skip", "overwrite" or "both", all}; null when it shall not go on. `more`: there are others to decide about.
 export function askConflict({ name, folder, more, count = 1 }) {
-  return dialog({ title: count > 1 ? t("conflict.title.many", { count }) : t("conflict.title"), fill: (close) => {
-    const all = h("input", { type: "checkbox", checked: more });
-    const answer = (value) => () => close({ answer: value, all: more && all.checked });
-    return [
-      h("div.body", {}, count > 1 ? null : h("p", {}, h("b", {}, nameNode(decode(name)))),
-        h("p.soft", {}, t(count > 1 ? "conflict.text.many" : "conflict.text", { folder: labelOf(folder) })),
-        more && h("label.check-line", {}, all, t("conflict.all"))),
-      h("footer", {}, h("button.button", { type: "button", onclick: answer("skip") }, t("conflict.skip")),
-        h("button.button.outlined", { type: "button", onclick: answer("overwrite") }, t("conflict.overwrite")),
-        h("button.button.primary", { type: "button", onclick: answer("both") }, t("conflict.both"))),
-    ];
-  } });
+  return dialog({
+    title: count > 1 ? t("conflict.title.many", { count }) : t("conflict.title"),
+    fill: (close) => {
+      const all = h("input", { type: "checkbox", checked: more });
+      const answer = (value) => () => close({ answer: value, all: more && all.checked });
+      return [
+        h(
+          "div.body",
+          {},
+          count > 1 ? null : h("p", {}, h("b", {}, nameNode(decode(name)))),
+          h("p.soft", {}, t(count > 1 ? "conflict.text.many" : "conflict.text", { folder: labelOf(folder) })),
+          more && h("label.check-line", {}, all, t("conflict.all")),
+        ),
+        h(
+          "footer",
+          {},
+          h("button.button", { type: "button", onclick: answer("skip") }, t("conflict.skip")),
+          h("button.button.outlined", { type: "button", onclick: answer("overwrite") }, t("conflict.overwrite")),
+          h("button.button.primary", { type: "button", onclick: answer("both") }, t("conflict.both")),
+        ),
+      ];
+    },
+  });
 }

@@ -16,8 +16,14 @@ export function dialog({ title, className = "", fill, wide = false }) {
       node.close();
     };
     node.append(
-      h("header", {}, h("h2#dialog-title", {}, title), iconButton("close", t("dialog.close"), () => close(null))),
-      ...fill(close));
+      h(
+        "header",
+        {},
+        h("h2#dialog-title", {}, title),
+        iconButton("close", t("dialog.close"), () => close(null)),
+      ),
+      ...fill(close),
+    );
     node.addEventListener("close", () => {
       node.remove();
       resolve(answer);
@@ -33,48 +39,83 @@ export function dialog({ title, className = "", fill, wide = false }) {
 
 // One line of text. `check(text)` gives a complaint or "", `submit(text)` does it and throws what fails.
 export function askText({ title, label, value = "", selectTo = null, action, check = () => "", submit }) {
-  return dialog({ title, fill: (close) => {
-    const input = h("input.input", { type: "text", value, autofocus: true, spellcheck: "false", autocomplete: "off", maxlength: 255 });
-    const complaint = h("span.complaint", { role: "alert" });
-    const button = h("button.button.primary", { type: "submit" }, action);
-    const complain = (text) => {
-      complaint.textContent = text;
-      input.setAttribute("aria-invalid", String(text !== ""));
-    };
-    const form = h("form", { onsubmit: async (event) => {
-      event.preventDefault();
-      const text = input.value;
-      const wrong = check(text);
-      if (wrong) return complain(wrong);
-      button.disabled = true;
-      try {
-        close(await submit(text) ?? text);
-      } catch (failure) {
-        const { title: said, hint } = describe(failure);
-        complain([said, hint].filter(Boolean).join(" "));
-        button.disabled = false;
-        input.focus();
-      }
-    } }, h("label.field", {}, h("span", {}, label), input, complaint),
-      h("footer", {}, h("button.button", { type: "button", onclick: () => close(null) }, t("dialog.cancel")), button));
-    input.addEventListener("input", () => complain(""));
-    requestAnimationFrame(() => input.setSelectionRange(0, selectTo ?? input.value.length));
-    return [form];
-  } });
+  return dialog({
+    title,
+    fill: (close) => {
+      const input = h("input.input", {
+        type: "text",
+        value,
+        autofocus: true,
+        spellcheck: "false",
+        autocomplete: "off",
+        maxlength: 255,
+      });
+      const complaint = h("span.complaint", { role: "alert" });
+      const button = h("button.button.primary", { type: "submit" }, action);
+      const complain = (text) => {
+        complaint.textContent = text;
+        input.setAttribute("aria-invalid", String(text !== ""));
+      };
+      const form = h(
+        "form",
+        {
+          onsubmit: async (event) => {
+            event.preventDefault();
+            const text = input.value;
+            const wrong = check(text);
+            if (wrong) return complain(wrong);
+            button.disabled = true;
+            try {
+              close((await submit(text)) ?? text);
+            } catch (failure) {
+              const { title: said, hint } = describe(failure);
+              complain([said, hint].filter(Boolean).join(" "));
+              button.disabled = false;
+              input.focus();
+            }
+          },
+        },
+        h("label.field", {}, h("span", {}, label), input, complaint),
+        h("footer", {}, h("button.button", { type: "button", onclick: () => close(null) }, t("dialog.cancel")), button),
+      );
+      input.addEventListener("input", () => complain(""));
+      requestAnimationFrame(() => input.setSelectionRange(0, selectTo ?? input.value.length));
+      return [form];
+    },
+  });
 }
 
 // Buttons: [{label, value, kind}]; the last one is the default.
 export function choose({ title, body, buttons, className }) {
-  return dialog({ title, className, fill: (close) => [
-    h("div.body", {}, body),
-    h("footer", {}, buttons.map((button) =>
-      h(`button.button${button.kind ? `.${button.kind}` : ""}`, { type: "button", onclick: () => close(button.value) }, button.label))),
-  ] });
+  return dialog({
+    title,
+    className,
+    fill: (close) => [
+      h("div.body", {}, body),
+      h(
+        "footer",
+        {},
+        buttons.map((button) =>
+          h(
+            `button.button${button.kind ? `.${button.kind}` : ""}`,
+            { type: "button", onclick: () => close(button.value) },
+            button.label,
+          ),
+        ),
+      ),
+    ],
+  });
 }
 
 export function confirm({ title, text, action, kind = "primary" }) {
-  return choose({ title, body: h("p", {}, text),
-    buttons: [{ label: t("dialog.cancel"), value: false }, { label: action, value: true, kind }] });
+  return choose({
+    title,
+    body: h("p", {}, text),
+    buttons: [
+      { label: t("dialog.cancel"), value: false },
+      { label: action, value: true, kind },
+    ],
+  });
 }
 
 let onWhy = () => {};
@@ -88,10 +129,24 @@ export function toast({ text, hint = "", kind = "", actions = [], life = kind ==
   const node = h("div.toast", { role: kind === "failed" ? "alert" : "status" });
   if (kind) node.classList.add(kind);
   const remove = () => node.remove();
-  node.append(icon(kind === "failed" ? "warning" : "check"),
+  node.append(
+    icon(kind === "failed" ? "warning" : "check"),
     h("div.grow", {}, h("b", {}, text), hint && h("p", {}, hint)),
-    ...actions.map(({ label, run }) => h("button.button", { type: "button", onclick: () => { remove(); run(); } }, label)),
-    iconButton("close", t("dialog.close"), remove));
+    ...actions.map(({ label, run }) =>
+      h(
+        "button.button",
+        {
+          type: "button",
+          onclick: () => {
+            remove();
+            run();
+          },
+        },
+        label,
+      ),
+    ),
+    iconButton("close", t("dialog.close"), remove),
+  );
   rack.append(node);
   while (rack.children.length > 3) rack.firstChild.remove();
   setTimeout(remove, life);

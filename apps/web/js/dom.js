@@ -47,8 +47,20 @@ export function iconButton(name, label, onclick, extra = {}) {
 
 export const $ = (id) => document.getElementById(id);
 
-const BIDI = { "\u202A": "LRE", "\u202B": "RLE", "\u202C": "PDF", "\u202D": "LRO", "\u202E": "RLO", "\u2066": "LRI",
-  "\u2067": "RLI", "\u2068": "FSI", "\u2069": "PDI", "\u200E": "LRM", "\u200F": "RLM", "\u061C": "ALM" };
+const BIDI = {
+  "\u202A": "LRE",
+  "\u202B": "RLE",
+  "\u202C": "PDF",
+  "\u202D": "LRO",
+  "\u202E": "RLO",
+  "\u2066": "LRI",
+  "\u2067": "RLI",
+  "\u2068": "FSI",
+  "\u2069": "PDI",
+  "\u200E": "LRM",
+  "\u200F": "RLM",
+  "\u061C": "ALM",
+};
 const CONTROLS = { 7: "BEL", 8: "BS", 9: "TAB", 10: "LF", 11: "VT", 12: "FF", 13: "CR", 27: "ESC", 127: "DEL" };
 const ODD = /[\u0000-\u001F\u007F-\u009F\u202A-\u202E\u2066-\u2069\u200E\u200F\u061C\uFFFD]/u;
 const ODD_RUN = /([\u0000-\u001F\u007F-\u009F\u202A-\u202E\u2066-\u2069\u200E\u200F\u061C\uFFFD])/u;
@@ -90,5 +102,7 @@ function markOf(character) {
 export function announce(text) {
   const live = $("live");
   live.textContent = "";
-  requestAnimationFrame(() => { live.textContent = text; });
+  requestAnimationFrame(() => {
+    live.textContent = text;
+  });
 }

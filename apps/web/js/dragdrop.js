@@ -24,13 +24,20 @@ function begin(event) {
   if (index < 0) return;
   const { selection, listing, view } = browser;
   if (!selection.has(index)) selection.pick(index);
-  const entries = selection.ranges.list.flatMap(([first, last]) => Array.from({ length: last - first + 1 }, (_, i) => listing.item(first + i)));
+  const entries = selection.ranges.list.flatMap(([first, last]) =>
+    Array.from({ length: last - first + 1 }, (_, i) => listing.item(first + i)),
+  );
   // Rows that were never loaded cannot be dragged: the menu moves them.
   if (entries.some((entry) => !entry)) return event.preventDefault();
   dragged = entries.map((entry) => entry.id);
   event.dataTransfer.setData("text/plain", entries.map((entry) => decode(entry.id)).join("\n"));
   event.dataTransfer.effectAllowed = "copyMove";
-  const ghost = h("div.ghost", {}, icon(iconOf(entries[0]), "file-icon"), entries.length === 1 ? plainName(entries[0].name) : t("select.count", { count: entries.length }));
+  const ghost = h(
+    "div.ghost",
+    {},
+    icon(iconOf(entries[0]), "file-icon"),
+    entries.length === 1 ? plainName(entries[0].name) : t("select.count", { count: entries.length }),
+  );
   document.body.append(ghost);
   event.dataTransfer.setDragImage(ghost, -8, -8);
   setTimeout(() => ghost.remove());
@@ -40,7 +47,11 @@ function begin(event) {
 
 function overWithin(event) {
   const target = folderUnder(event.target);
-  const fits = target && target.node && !dragged.includes(target.id) && (event.ctrlKey || dragged.some((id) => parentOf(id) !== target.id));
+  const fits =
+    target &&
+    target.node &&
+    !dragged.includes(target.id) &&
+    (event.ctrlKey || dragged.some((id) => parentOf(id) !== target.id));
   mark(fits ? target.node : null);
   if (!fits) return;
   event.preventDefault();

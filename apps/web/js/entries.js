@@ -14,7 +14,7 @@ export function entryOf(item) {
     parent: parentOf(id),
     isFolder: item.isdir,
     kind: kindOf(item.name, item.isdir, id, more.mount_point_type ?? ""),
-    size: item.isdir ? null : more.size ?? null,
+    size: item.isdir ? null : (more.size ?? null),
     mtime: more.time?.mtime ?? 0,
     time: more.time,
     owner: more.owner?.user || (more.owner ? String(more.owner.uid) : ""),

@@ -54,6 +54,14 @@ export function formatDuration(seconds) {
 
 // "755" as "rwxr-xr-x".
 export function formatMode(posix) {
-  return String(posix).padStart(3, "0").split("").map((digit) =>
-    "rwx".split("").map((letter, i) => (digit & (4 >> i) ? letter : "-")).join("")).join("");
+  return String(posix)
+    .padStart(3, "0")
+    .split("")
+    .map((digit) =>
+      "rwx"
+        .split("")
+        .map((letter, i) => (digit & (4 >> i) ? letter : "-"))
+        .join(""),
+    )
+    .join("");
 }

@@ -9,15 +9,27 @@ import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
 
 export function homeNode() {
-  return h("section.home", { tabindex: -1, "aria-label": t("place.shares") },
+  return h(
+    "section.home",
+    { tabindex: -1, "aria-label": t("place.shares") },
     h("h1", {}, browser.user ? t("home.hello", { user: plainName(browser.user) }) : t("place.shares")),
     h("p.lead", {}, t("home.lead", { count: browser.shares.length })),
-    h("ul.cards", {}, browser.shares.map((share) => h("li", {}, cardOf(share)))));
+    h(
+      "ul.cards",
+      {},
+      browser.shares.map((share) => h("li", {}, cardOf(share))),
+    ),
+  );
 }
 
 function cardOf(share) {
-  return h("a.card", { href: `#${share.id}`, "data-id": share.id }, icon(iconOf(share), "file-icon"),
-    h("b", {}, nameNode(labelOf(share.id))), h("span.about", {}, aboutOf(share)));
+  return h(
+    "a.card",
+    { href: `#${share.id}`, "data-id": share.id },
+    icon(iconOf(share), "file-icon"),
+    h("b", {}, nameNode(labelOf(share.id))),
+    h("span.about", {}, aboutOf(share)),
+  );
 }
 
 function aboutOf(share) {
@@ -37,5 +49,8 @@ export function paintVolume(node, share) {
   const used = volume.totalspace - volume.freespace;
   const bar = h("div.progress", { role: "presentation" }, h("i"));
   bar.firstChild.style.width = `${Math.min(100, (100 * used) / volume.totalspace)}%`;
-  node.replaceChildren(bar, h("span", {}, t("volume.free", { free: formatSize(volume.freespace), total: formatSize(volume.totalspace) })));
+  node.replaceChildren(
+    bar,
+    h("span", {}, t("volume.free", { free: formatSize(volume.freespace), total: formatSize(volume.totalspace) })),
+  );
 }

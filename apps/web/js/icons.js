@@ -19,11 +19,21 @@ const KINDS = {
   font: "ttf otf woff woff2",
 };
 
-const BY_EXTENSION = new Map(Object.entries(KINDS).flatMap(([kind, list]) => list.split(" ").map((ext) => [ext, kind])));
+const BY_EXTENSION = new Map(
+  Object.entries(KINDS).flatMap(([kind, list]) => list.split(" ").map((ext) => [ext, kind])),
+);
 const PREVIEW_IMAGES = new Set(["jpg", "jpeg", "png", "gif", "bmp", "webp", "ico", "avif", "svg"]);
 
 export function kindOf(name, isFolder, id, mount) {
-  if (!isFolder) return BY_EXTENSION.get(splitExtension(name)[1].replace(/^\.tar/i, "").slice(1).toLowerCase()) ?? "misc";
+  if (!isFolder)
+    return (
+      BY_EXTENSION.get(
+        splitExtension(name)[1]
+          .replace(/^\.tar/i, "")
+          .slice(1)
+          .toLowerCase(),
+      ) ?? "misc"
+    );
   if (mount === "remotefail") return "folder-offline";
   if (mount === "remote") return "folder-remote";
   if (mount === "iso") return "folder-iso";

@@ -35,8 +35,12 @@ function matches(event, keys) {
   const wanted = new Set(keys.split("+"));
   const mod = event.ctrlKey || event.metaKey;
   const key = [...wanted].at(-1);
-  return mod === wanted.has("Mod") && event.altKey === wanted.has("Alt") && event.shiftKey === (wanted.has("Shift") || (event.shiftKey && key === "?")) &&
-    (event.key === key || event.key.toLowerCase() === key);
+  return (
+    mod === wanted.has("Mod") &&
+    event.altKey === wanted.has("Alt") &&
+    event.shiftKey === (wanted.has("Shift") || (event.shiftKey && key === "?")) &&
+    (event.key === key || event.key.toLowerCase() === key)
+  );
 }
 
 function moved(event) {
@@ -45,7 +49,14 @@ function moved(event) {
   const across = view.shape.across;
   const page = view.linesPerPage() * across;
   const { cursor } = selection;
-  const steps = { ArrowDown: cursor + across, ArrowUp: cursor - across, Home: 0, End: listing.total - 1, PageDown: cursor + page, PageUp: cursor - page };
+  const steps = {
+    ArrowDown: cursor + across,
+    ArrowUp: cursor - across,
+    Home: 0,
+    End: listing.total - 1,
+    PageDown: cursor + page,
+    PageUp: cursor - page,
+  };
   if (across > 1) Object.assign(steps, { ArrowRight: cursor + 1, ArrowLeft: cursor - 1 });
   if (event.key === " " && (event.ctrlKey || event.metaKey)) {
     selection.pick(cursor, { ctrl: true });
@@ -53,7 +64,8 @@ function moved(event) {
   }
   if (!(event.key in steps)) return false;
   // The first key after arriving chooses the first row instead of jumping over it.
-  const fresh = selection.count === 0 && cursor === 0 && ["ArrowDown", "ArrowRight"].includes(event.key) && !event.shiftKey;
+  const fresh =
+    selection.count === 0 && cursor === 0 && ["ArrowDown", "ArrowRight"].includes(event.key) && !event.shiftKey;
   const index = fresh ? 0 : Math.min(listing.total - 1, Math.max(0, steps[event.key]));
   if (event.ctrlKey && !event.shiftKey) selection.move(index);
   else selection.pick(index, { shift: event.shiftKey, ctrl: event.ctrlKey });

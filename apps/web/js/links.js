@@ -11,41 +11,129 @@ import { copyText } from "./operations.js";
 import { decode, idIn, nameOf } from "./path.js";
 import { t } from "./strings.js";
 
-addCommand({ id: "share", icon: "link", keys: ["Mod+k"], group: "info", when: ({ single, inBin }) => single && !inBin, run: ({ single }) => makeLink(single) });
+addCommand({
+  id: "share",
+  icon: "link",
+  keys: ["Mod+k"],
+  group: "info",
+  when: ({ single, inBin }) => single && !inBin,
+  run: ({ single }) => makeLink(single),
+});
 addCommand({ id: "links", icon: "link", group: "info", run: showLinks });
 
 const dayStart = (day) => (day ? Math.floor(new Date(`${day}T00:00:00`).getTime() / 1000) : undefined);
 
 async function makeLink(entry) {
-  const link = await dialog({ title: t("link.title"), fill: (close) => {
-    const complaint = h("span.complaint", { role: "alert" });
-    const field = (key, node, hint) => h("label.field", {}, h("span", {}, t(`link.${key}`)), node, hint && h("span.soft", {}, hint));
-    const form = h("form", { onsubmit: async (event) => {
-      event.preventDefault();
-      const { password, available, expires } = Object.fromEntries(new FormData(form));
-      try {
-        close(await post("link", { action: "create", path_raw: entry.id, password: password || undefined, available: dayStart(available), expires: dayStart(expires) }));
-      } catch (failure) {
-        const said = describe(failure);
-        complaint.textContent = available && !expires ? t("link.window") : [said.title, said.hint].filter(Boolean).join(". ");
-      }
-    } }, h("div.hero", {}, icon(iconOf(entry), "file-icon"), h("b.grow", {}, nameNode(entry.name))),
-    h("div.fields.link-fields", {}, field("password", h("input.input", { name: "password", type: "text", autocomplete: "off", spellcheck: "false", autofocus: true, placeholder: t("link.password.none") })),
-      h("div.pair", {}, field("available", h("input.input", { name: "available", type: "date" })), field("expires", h("input.input", { name: "expires", type: "date" }))),
-      h("p.soft", {}, t(entry.isFolder ? "link.about.folder" : "link.about.file")), complaint),
-    h("footer", {}, h("button.button", { type: "button", onclick: () => close(null) }, t("dialog.cancel")), h("button.button.primary", { type: "submit" }, icon("link"), t("link.create"))));
-    return [form];
-  } });
+  const link = await dialog({
+    title: t("link.title"),
+    fill: (close) => {
+      const complaint = h("span.complaint", { role: "alert" });
+      const field = (key, node, hint) =>
+        h("label.field", {}, h("span", {}, t(`link.${key}`)), node, hint && h("span.soft", {}, hint));
+      const form = h(
+        "form",
+        {
+          onsubmit: async (event) => {
+            event.preventDefault();
+            const { password, available, expires } = Object.fromEntries(new FormData(form));
+            try {
+              close(
+                await post("link", {
+                  action: "create",
+                  path_raw: entry.id,
+                  password: password || undefined,
+                  available: dayStart(available),
+                  expires: dayStart(expires),
+                }),
+              );
+            } catch (failure) {
+              const said = describe(failure);
+              complaint.textContent =
+                available && !expires ? t("link.window") : [said.title, said.hint].filter(Boolean).join(". ");
+            }
+          },
+        },
+        h("div.hero", {}, icon(iconOf(entry), "file-icon"), h("b.grow", {}, nameNode(entry.name))),
+        h(
+          "div.fields.link-fields",
+          {},
+          field(
+            "password",
+            h("input.input", {
+              name: "password",
+              type: "text",
+              autocomplete: "off",
+              spellcheck: "false",
+              autofocus: true,
+              placeholder: t("link.password.none"),
+            }),
+          ),
+          h(
+            "div.pair",
+            {},
+            field("available", h("input.input", { name: "available", type: "date" })),
+            field("expires", h("input.input", { name: "expires", type: "date" })),
+          ),
+          h("p.soft", {}, t(entry.isFolder ? "link.about.folder" : "link.about.file")),
+          complaint,
+        ),
+        h(
+          "footer",
+          {},
+          h("button.button", { type: "button", onclick: () => close(null) }, t("dialog.cancel")),
+          h("button.button.primary", { type: "submit" }, icon("link"), t("link.create")),
+        ),
+      );
+      return [form];
+    },
+  });
   if (link) showLink(link);
 }
 
 function showLink(link) {
-  const input = h("input.input.address", { type: "text", readonly: true, value: addressOf(link), "aria-label": t("link.address") });
-  const done = dialog({ title: t("link.made"), fill: () => [
-    h("div.body", {}, h("div.address-line", {}, input, h("button.button.primary", { type: "button", autofocus: true, onclick: () => copyLink(link) }, icon("copy"), t("link.copy"))),
-      h("p.soft", {}, [link.has_password ? t("link.tell_password") : t("link.open_to_all"), windowOf(link)].filter(Boolean).join(" "))),
-    h("footer", {}, h("a.button.outlined", { href: addressOf(link), target: "_blank", rel: "noopener" }, icon("eye"), t("link.visit"))),
-  ] });
+  const input = h("input.input.address", {
+    type: "text",
+    readonly: true,
+    value: addressOf(link),
+    "aria-label": t("link.address"),
+  });
+  const done = dialog({
+    title: t("link.made"),
+    fill: () => [
+      h(
+        "div.body",
+        {},
+        h(
+          "div.address-line",
+          {},
+          input,
+          h(
+            "button.button.primary",
+            { type: "button", autofocus: true, onclick: () => copyLink(link) },
+            icon("copy"),
+            t("link.copy"),
+          ),
+        ),
+        h(
+          "p.soft",
+          {},
+          [link.has_password ? t("link.tell_password") : t("link.open_to_all"), windowOf(link)]
+            .filter(Boolean)
+            .join(" "),
+        ),
+      ),
+      h(
+        "footer",
+        {},
+        h(
+          "a.button.outlined",
+          { href: addressOf(link), target: "_blank", rel: "noopener" },
+          icon("eye"),
+          t("link.visit"),
+        ),
+      ),
+    ],
+  });
   input.select();
   return done;
 }
@@ -61,7 +149,10 @@ function copyLink(link) {
 
 function windowOf(link) {
   if (!link.expires) return "";
-  return t(link.available ? "link.between" : "link.until", { from: formatDay(link.available), to: formatDay(link.expires) });
+  return t(link.available ? "link.between" : "link.until", {
+    from: formatDay(link.available),
+    to: formatDay(link.expires),
+  });
 }
 
 async function showLinks() {
@@ -71,27 +162,71 @@ async function showLinks() {
   } catch (failure) {
     return toastFailure(failure);
   }
-  return dialog({ title: t("command.links"), wide: true, className: "links", fill: () => {
-    const list = h("ul.link-list");
-    const paint = () => list.replaceChildren(...(items.length > 0 ? items.map(rowOf) : [h("li.none", {}, icon("link"), h("span", {}, t("link.none")))]));
-    const rowOf = (link) => h("li", {},
-      h("span.card-icon", {}, icon(link.has_password ? "lock" : "link")),
-      h("div.grow", {}, h("b", { title: plainName(decode(idIn(link))) }, nameNode(nameOf(idIn(link)))),
-        h("span.soft", {}, [plainName(decode(idIn(link))), link.has_password && t("link.protected"), windowOf(link) || t("link.forever")].filter(Boolean).join(" · "))),
-      h("a.icon-button", { href: addressOf(link), target: "_blank", rel: "noopener", "aria-label": t("link.visit"), title: t("link.visit") }, icon("eye")),
-      iconButton("copy", t("link.copy"), () => copyLink(link)),
-      iconButton("trash", t("link.revoke"), async () => {
-        if (!(await confirm({ title: t("link.revoke.title"), text: t("link.revoke.text"), action: t("link.revoke"), kind: "danger" }))) return;
-        try {
-          await post("link", { action: "revoke", id: link.id });
-          items = items.filter((one) => one !== link);
-          paint();
-          toast({ text: t("link.revoked") });
-        } catch (failure) {
-          toastFailure(failure);
-        }
-      }));
-    paint();
-    return [list];
-  } });
+  return dialog({
+    title: t("command.links"),
+    wide: true,
+    className: "links",
+    fill: () => {
+      const list = h("ul.link-list");
+      const paint = () =>
+        list.replaceChildren(
+          ...(items.length > 0 ? items.map(rowOf) : [h("li.none", {}, icon("link"), h("span", {}, t("link.none")))]),
+        );
+      const rowOf = (link) =>
+        h(
+          "li",
+          {},
+          h("span.card-icon", {}, icon(link.has_password ? "lock" : "link")),
+          h(
+            "div.grow",
+            {},
+            h("b", { title: plainName(decode(idIn(link))) }, nameNode(nameOf(idIn(link)))),
+            h(
+              "span.soft",
+              {},
+              [
+                plainName(decode(idIn(link))),
+                link.has_password && t("link.protected"),
+                windowOf(link) || t("link.forever"),
+              ]
+                .filter(Boolean)
+                .join(" · "),
+            ),
+          ),
+          h(
+            "a.icon-button",
+            {
+              href: addressOf(link),
+              target: "_blank",
+              rel: "noopener",
+              "aria-label": t("link.visit"),
+              title: t("link.visit"),
+            },
+            icon("eye"),
+          ),
+          iconButton("copy", t("link.copy"), () => copyLink(link)),
+          iconButton("trash", t("link.revoke"), async () => {
+            if (
+              !(await confirm({
+                title: t("link.revoke.title"),
+                text: t("link.revoke.text"),
+                action: t("link.revoke"),
+                kind: "danger",
+              }))
+            )
+              return;
+            try {
+              await post("link", { action: "revoke", id: link.id });
+              items = items.filter((one) => one !== link);
+              paint();
+              toast({ text: t("link.revoked") });
+            } catch (failure) {
+              toastFailure(failure);
+            }
+          }),
+        );
+      paint();
+      return [list];
+    },
+  });
 }

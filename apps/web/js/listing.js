@@ -49,7 +49,8 @@ export class Listing {
     for (const one of this.parts) {
       if (!one.total && !one.pages.has(0)) wanted.add(this.keyOf(one, 0));
     }
-    for (const { one, page } of this.pagesOf(Math.max(0, first - AHEAD), last + AHEAD)) wanted.add(this.keyOf(one, page));
+    for (const { one, page } of this.pagesOf(Math.max(0, first - AHEAD), last + AHEAD))
+      wanted.add(this.keyOf(one, page));
     for (const [key, request] of this.requests) {
       if (!wanted.has(key)) request.abort();
     }
@@ -63,7 +64,8 @@ export class Listing {
       const total = one.total ?? 0;
       const from = Math.max(first, start) - start;
       const to = Math.min(last, start + total - 1) - start;
-      for (let page = Math.floor(from / PAGE); page <= Math.floor(to / PAGE) && to >= from; ++page) pages.push({ one, page });
+      for (let page = Math.floor(from / PAGE); page <= Math.floor(to / PAGE) && to >= from; ++page)
+        pages.push({ one, page });
       start += total;
     }
     return pages;

@@ -16,7 +16,15 @@ import { setupPathbar } from "./pathbar.js";
 import { setupPointer } from "./pointer.js";
 import { openSearch, searchFor, setupSearch } from "./search.js";
 import { setupSettings } from "./settings.js";
-import { emptyBin, emptyFolder, failedState, nothingMatches, noShares, nothingFound, stillSearching } from "./states.js";
+import {
+  emptyBin,
+  emptyFolder,
+  failedState,
+  nothingMatches,
+  noShares,
+  nothingFound,
+  stillSearching,
+} from "./states.js";
 import { loadStrings, t } from "./strings.js";
 import { setupTasks } from "./tasks.js";
 import { setupToolbar } from "./toolbar.js";
@@ -51,6 +59,8 @@ function showPlace() {
     browser.view.show(browser.listing, browser.selection, browser.mode, columns());
     paintListing();
   }
+  // The keyboard works from the start.
+  if (!home && document.activeElement === document.body) $("view").focus({ preventScroll: true });
   paintVolume($("volume"), shareEntry(browser.id));
 }
 
@@ -70,7 +80,8 @@ function stateOf(listing) {
     return failedState(listing.error, undefined, { retry: () => open(id), back, why: () => showWhy(id) });
   }
   if (!listing.ready || listing.total > 0) return null;
-  if (isSearch(browser.id) && browser.filter === "") return listing.extra.finished ? nothingMatches(openSearch) : stillSearching();
+  if (isSearch(browser.id) && browser.filter === "")
+    return listing.extra.finished ? nothingMatches(openSearch) : stillSearching();
   if (browser.filter !== "") return nothingFound(browser.filter, clearFilter);
   const { canWrite, inBin } = context();
   return inBin ? emptyBin() : emptyFolder({ canWrite, upload: () => chooseFiles(false), newFolder });
@@ -122,7 +133,9 @@ function setupSidebar() {
     document.body.append(h("div.side-scrim", { onclick: close }));
   });
   on("place", close);
-  addEventListener("keydown", (event) => { if (event.key === "Escape") close(); });
+  addEventListener("keydown", (event) => {
+    if (event.key === "Escape") close();
+  });
 }
 
 function fillTexts() {
@@ -132,7 +145,8 @@ function fillTexts() {
     if (node.tagName === "BUTTON") node.title = t(node.dataset.label);
   }
   for (const node of document.querySelectorAll("[data-placeholder]")) node.placeholder = t(node.dataset.placeholder);
-  for (const node of document.querySelectorAll("[data-run]")) node.addEventListener("click", () => runCommand(node.dataset.run));
+  for (const node of document.querySelectorAll("[data-run]"))
+    node.addEventListener("click", () => runCommand(node.dataset.run));
 }
 
 async function start() {
@@ -143,7 +157,9 @@ async function start() {
   on("shown", showPlace);
   on("listing", paintListing);
   on("selection", () => browser.listing && browser.view.listing === browser.listing && browser.view.paintSelection());
-  on("shares", () => { if (browser.id === "/" && homeShown) showPlace(); });
+  on("shares", () => {
+    if (browser.id === "/" && homeShown) showPlace();
+  });
   setupToolbar(setSort);
   setupPathbar();
   setupTree();
@@ -156,8 +172,12 @@ async function start() {
   setupActivity();
   setupDragAndDrop();
   addEventListener("hashchange", () => open(normalisePlace(location.hash.slice(1))));
-  addEventListener("beforeunload", (event) => { if (uploadsRunning()) event.preventDefault(); });
-  addEventListener("focus", () => { if (context().folder && browser.selection.count === 0) refresh(); });
+  addEventListener("beforeunload", (event) => {
+    if (uploadsRunning()) event.preventDefault();
+  });
+  addEventListener("focus", () => {
+    if (context().folder && browser.selection.count === 0) refresh();
+  });
   try {
     await loadShares();
   } catch (failure) {
@@ -167,7 +187,6 @@ async function start() {
   document.body.classList.add("started");
   setupTasks();
   open(normalisePlace(location.hash.slice(1)));
-  $("view").focus({ preventScroll: true });
 }
 
 start();

@@ -40,16 +40,25 @@ export function openMenu(items, { x, y, anchor = null }) {
 
 function itemNode(item, close) {
   const radio = item.checked !== undefined;
-  return h("button.menu-item", {
-    type: "button", role: radio ? "menuitemradio" : "menuitem", tabindex: -1, disabled: item.disabled,
-    "aria-checked": radio ? String(item.checked) : null, "data-danger": item.danger ? "" : null,
-    onclick: () => {
-      close();
-      item.run();
+  return h(
+    "button.menu-item",
+    {
+      type: "button",
+      role: radio ? "menuitemradio" : "menuitem",
+      tabindex: -1,
+      disabled: item.disabled,
+      "aria-checked": radio ? String(item.checked) : null,
+      "data-danger": item.danger ? "" : null,
+      onclick: () => {
+        close();
+        item.run();
+      },
+      onpointermove: (event) => event.currentTarget.focus({ preventScroll: true }),
     },
-    onpointermove: (event) => event.currentTarget.focus({ preventScroll: true }),
-  }, icon(radio ? (item.checked ? "check" : "blank") : item.icon ?? "blank"), h("span.grow", {}, item.label),
-    item.shortcut && h("kbd", {}, item.shortcut));
+    icon(radio ? (item.checked ? "check" : "blank") : (item.icon ?? "blank")),
+    h("span.grow", {}, item.label),
+    item.shortcut && h("kbd", {}, item.shortcut),
+  );
 }
 
 function place(menu, x, y, anchor) {
@@ -59,7 +68,8 @@ function place(menu, x, y, anchor) {
   let left = box ? (box.right - width > 8 && box.left + width > innerWidth - 8 ? box.right - width : box.left) : x;
   let top = box ? box.bottom + 4 : y;
   if (left + width > innerWidth - 8) left = Math.max(8, (box ? innerWidth - 8 : x) - width);
-  if (top + height > innerHeight - 8) top = Math.max(8, box ? box.top - height - 4 : Math.min(y, innerHeight - 8) - height);
+  if (top + height > innerHeight - 8)
+    top = Math.max(8, box ? box.top - height - 4 : Math.min(y, innerHeight - 8) - height);
   menu.style.left = `${left}px`;
   menu.style.top = `${Math.max(8, top)}px`;
 }

@@ -22,7 +22,11 @@ export function checkName(text) {
 export async function newFolder() {
   const folder = browser.id;
   const made = await askText({
-    title: t("newFolder.title"), label: t("name.label"), value: t("newFolder.name"), action: t("newFolder.action"), check: checkName,
+    title: t("newFolder.title"),
+    label: t("name.label"),
+    value: t("newFolder.name"),
+    action: t("newFolder.action"),
+    check: checkName,
     submit: async (name) => {
       const id = childOf(folder, encodeName(name));
       await post("operation", { action: "mkdir", path_raw: id });
@@ -42,11 +46,20 @@ export function searchTask() {
 export async function rename(entry) {
   const [stem] = entry.isFolder ? [entry.name] : splitExtension(entry.name);
   const renamed = await askText({
-    title: t("rename.title"), label: t("name.label"), value: entry.name, selectTo: stem.length, action: t("rename.action"),
+    title: t("rename.title"),
+    label: t("name.label"),
+    value: entry.name,
+    selectTo: stem.length,
+    action: t("rename.action"),
     check: (text) => (text === entry.name ? "" : checkName(text)),
     submit: async (name) => {
       if (name === entry.name) return entry.id;
-      await post("operation", { action: "rename", path_raw: entry.id, name_raw: encodeName(name), taskid: searchTask() });
+      await post("operation", {
+        action: "rename",
+        path_raw: entry.id,
+        name_raw: encodeName(name),
+        taskid: searchTask(),
+      });
       return childOf(entry.parent, encodeName(name));
     },
   });
@@ -61,7 +74,10 @@ export function download(entries) {
   const frame = h("iframe", { name: `download-${Date.now()}`, hidden: true, title: "" });
   const form = h("form", { method: "post", action: `${PROGRAMS}download`, target: frame.name, hidden: true });
   for (const entry of entries) form.append(h("input", { type: "hidden", name: "path_raw", value: entry.id }));
-  if (entries.length > 1) form.append(h("input", { type: "hidden", name: "name", value: plainName(nameOf(parentOf(entries[0].id))) || "download" }));
+  if (entries.length > 1)
+    form.append(
+      h("input", { type: "hidden", name: "name", value: plainName(nameOf(parentOf(entries[0].id))) || "download" }),
+    );
   document.body.append(frame, form);
   frame.addEventListener("load", () => {
     const text = frame.contentDocument?.body?.textContent ?? "";
@@ -100,8 +116,12 @@ export async function copyText(text, said) {
 async function entryAt(id) {
   if (parentOf(id) === "/") return browser.shares.find((share) => share.id === id);
   const name = lastOf(id);
-  const reply = await get("list", { action: "folder", path_raw: parentOf(id), pattern: decode(name).replace(/[,\\*?[\]]/g, "?"),
-    additional: "size,time,owner,perm,mount_point_type" });
+  const reply = await get("list", {
+    action: "folder",
+    path_raw: parentOf(id),
+    pattern: decode(name).replace(/[,\\*?[\]]/g, "?"),
+    additional: "size,time,owner,perm,mount_point_type",
+  });
   return reply.items.map(entryOf).find((entry) => entry.encodedName === name);
 }
 
@@ -115,18 +135,49 @@ export async function showProperties(what) {
   }
   if (!entry) return undefined;
   const line = (key, value) => value && [h("dt", {}, t(`properties.${key}`)), h("dd", {}, value)];
-  return dialog({ title: t("command.properties"), className: "properties", fill: () => [
-    h("div.hero", {}, icon(iconOf(entry), "file-icon"), h("div.grow", {}, h("b", {}, nameNode(entry.name)),
-      h("span.soft", {}, entry.isFolder ? t("type.folder") : extensionOf(entry) || t("type.file")))),
-    h("dl", {}, line("path", h("code", {}, plainName(decode(entry.id)))),
-      line("size", entry.size !== null && `${formatSize(entry.size)} (${t("size.bytes", { count: entry.size })})`),
-      line("modified", formatFullTime(entry.mtime)), line("created", formatFullTime(entry.time?.crtime)),
-      line("owner", entry.owner && `${entry.owner} · ${entry.group}`),
-      line("mode", entry.perm?.posix !== undefined && h("code", {}, `${formatMode(entry.perm.posix)}`)),
-      line("volume", entry.volume && t("volume.free", { free: formatSize(entry.volume.freespace), total: formatSize(entry.volume.totalspace) }))),
-    whyNode(entry.id),
-    h("footer", {}, h("button.button.outlined", { type: "button", onclick: () => copyPath(entry.id) }, icon("copy"), t("command.copyPath"))),
-  ] });
+  return dialog({
+    title: t("command.properties"),
+    className: "properties",
+    fill: () => [
+      h(
+        "div.hero",
+        {},
+        icon(iconOf(entry), "file-icon"),
+        h(
+          "div.grow",
+          {},
+          h("b", {}, nameNode(entry.name)),
+          h("span.soft", {}, entry.isFolder ? t("type.folder") : extensionOf(entry) || t("type.file")),
+        ),
+      ),
+      h(
+        "dl",
+        {},
+        line("path", h("code", {}, plainName(decode(entry.id)))),
+        line("size", entry.size !== null && `${formatSize(entry.size)} (${t("size.bytes", { count: entry.size })})`),
+        line("modified", formatFullTime(entry.mtime)),
+        line("created", formatFullTime(entry.time?.crtime)),
+        line("owner", entry.owner && `${entry.owner} · ${entry.group}`),
+        line("mode", entry.perm?.posix !== undefined && h("code", {}, `${formatMode(entry.perm.posix)}`)),
+        line(
+          "volume",
+          entry.volume &&
+            t("volume.free", { free: formatSize(entry.volume.freespace), total: formatSize(entry.volume.totalspace) }),
+        ),
+      ),
+      whyNode(entry.id),
+      h(
+        "footer",
+        {},
+        h(
+          "button.button.outlined",
+          { type: "button", onclick: () => copyPath(entry.id) },
+          icon("copy"),
+          t("command.copyPath"),
+        ),
+      ),
+    ],
+  });
 }
 
 export function focusView() {

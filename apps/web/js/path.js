@@ -26,7 +26,8 @@ export function normaliseId(text) {
 function normalisePart(part) {
   const whole = part.replace(/%(?![0-9A-Fa-f]{2})/g, "%25");
   return whole.replace(/%[0-9A-Fa-f]{2}|[^A-Za-z0-9\-._~]/gu, (piece) =>
-    piece.length === 3 && piece[0] === "%" ? piece.toUpperCase() : encodeName(piece));
+    piece.length === 3 && piece[0] === "%" ? piece.toUpperCase() : encodeName(piece),
+  );
 }
 
 // A search stands in the address as "?" and its task.

@@ -25,13 +25,24 @@ export function setupPathbar() {
 
 function paint(id) {
   const ids = isSearch(id) ? ["/", id] : ["/", ...ancestry(id)];
-  bar.replaceChildren(h("ol", {}, ids.map((one, i) => {
-    const last = i === ids.length - 1;
-    const crumb = h("a.crumb", { href: `#${one}`, "data-id": one, "aria-current": last ? "page" : null, title: last ? null : decode(one) });
-    if (i === 0 && !last) set(crumb, { "aria-label": labelOf(one) }).append(icon("kind-share"));
-    else crumb.append(nameNode(labelOf(one)));
-    return h("li", {}, crumb);
-  })));
+  bar.replaceChildren(
+    h(
+      "ol",
+      {},
+      ids.map((one, i) => {
+        const last = i === ids.length - 1;
+        const crumb = h("a.crumb", {
+          href: `#${one}`,
+          "data-id": one,
+          "aria-current": last ? "page" : null,
+          title: last ? null : decode(one),
+        });
+        if (i === 0 && !last) set(crumb, { "aria-label": labelOf(one) }).append(icon("kind-share"));
+        else crumb.append(nameNode(labelOf(one)));
+        return h("li", {}, crumb);
+      }),
+    ),
+  );
   bar.querySelector("ol").scrollLeft = 1e6;
   document.title = `${labelOf(id)} – Orvel`;
 }
@@ -40,7 +51,13 @@ export function editPath() {
   if (bar.querySelector("input")) return;
   const before = browser.id;
   const text = isSearch(before) ? "/" : decode(before);
-  const input = h("input.input", { type: "text", value: text, "aria-label": t("path.edit"), spellcheck: "false", autocomplete: "off" });
+  const input = h("input.input", {
+    type: "text",
+    value: text,
+    "aria-label": t("path.edit"),
+    spellcheck: "false",
+    autocomplete: "off",
+  });
   let done = false;
   const finish = (accept) => {
     if (done) return;

@@ -16,48 +16,78 @@ import { t } from "./strings.js";
 // The id of the folder, or null.
 export function pickFolder({ title, action, start }) {
   let here = start;
-  return dialog({ title, className: "picker", fill: (close) => {
-    const list = h("ul.picker-list", { role: "listbox", tabindex: 0, "aria-label": title });
-    const place = h("b.grow");
-    const up = iconButton("up", t("command.up"), () => enter(parentOf(here)));
-    const make = iconButton("new-folder", t("command.newFolder"), async () => {
-      const folder = here;
-      const made = await askText({ title: t("newFolder.title"), label: t("name.label"), value: t("newFolder.name"), action: t("newFolder.action"), check: checkName,
-        submit: async (name) => {
-          const id = childOf(folder, encodeName(name));
-          await post("operation", { action: "mkdir", path_raw: id });
-          return id;
-        } });
-      if (!made) return;
-      emit("folders-changed", { ids: [folder] });
-      enter(made);
-    });
-    const button = h("button.button.primary", { type: "button", onclick: () => close(here) }, action);
+  return dialog({
+    title,
+    className: "picker",
+    fill: (close) => {
+      const list = h("ul.picker-list", { role: "listbox", tabindex: 0, "aria-label": title });
+      const place = h("b.grow");
+      const up = iconButton("up", t("command.up"), () => enter(parentOf(here)));
+      const make = iconButton("new-folder", t("command.newFolder"), async () => {
+        const folder = here;
+        const made = await askText({
+          title: t("newFolder.title"),
+          label: t("name.label"),
+          value: t("newFolder.name"),
+          action: t("newFolder.action"),
+          check: checkName,
+          submit: async (name) => {
+            const id = childOf(folder, encodeName(name));
+            await post("operation", { action: "mkdir", path_raw: id });
+            return id;
+          },
+        });
+        if (!made) return;
+        emit("folders-changed", { ids: [folder] });
+        enter(made);
+      });
+      const button = h("button.button.primary", { type: "button", onclick: () => close(here) }, action);
 
-    async function enter(id) {
-      here = id;
-      place.replaceChildren(nameNode(labelOf(id)));
-      up.disabled = id === "/";
-      const share = browser.shares.find((one) => one.id === shareOf(id));
-      const usable = id !== "/" && share !== undefined && !isReadOnlyShare(share);
-      button.disabled = make.disabled = !usable;
-      try {
-        const folders = await foldersOf(id);
-        if (here !== id) return;
-        list.replaceChildren(...folders.map(({ id: child, kind }) => h("li", {}, h("button.picker-item", { type: "button", onclick: () => enter(child) },
-          icon(`kind-${kind}`, "file-icon"), nameNode(labelOf(child)), h("span.grow"), icon("chevron-right", "icon small")))));
-        if (folders.length === 0) list.replaceChildren(h("li.soft", {}, t("picker.empty")));
-      } catch (failure) {
-        if (here === id) list.replaceChildren(h("li.soft", {}, describe(failure).title));
+      async function enter(id) {
+        here = id;
+        place.replaceChildren(nameNode(labelOf(id)));
+        up.disabled = id === "/";
+        const share = browser.shares.find((one) => one.id === shareOf(id));
+        const usable = id !== "/" && share !== undefined && !isReadOnlyShare(share);
+        button.disabled = make.disabled = !usable;
+        try {
+          const folders = await foldersOf(id);
+          if (here !== id) return;
+          list.replaceChildren(
+            ...folders.map(({ id: child, kind }) =>
+              h(
+                "li",
+                {},
+                h(
+                  "button.picker-item",
+                  { type: "button", onclick: () => enter(child) },
+                  icon(`kind-${kind}`, "file-icon"),
+                  nameNode(labelOf(child)),
+                  h("span.grow"),
+                  icon("chevron-right", "icon small"),
+                ),
+              ),
+            ),
+          );
+          if (folders.length === 0) list.replaceChildren(h("li.soft", {}, t("picker.empty")));
+        } catch (failure) {
+          if (here === id) list.replaceChildren(h("li.soft", {}, describe(failure).title));
+        }
       }
-    }
-    enter(start);
-    return [h("div.picker-place", {}, up, place, make), list, h("footer", {}, h("button.button", { type: "button", onclick: () => close(null) }, t("dialog.cancel")), button)];
-  } });
+      enter(start);
+      return [
+        h("div.picker-place", {}, up, place, make),
+        list,
+        h("footer", {}, h("button.button", { type: "button", onclick: () => close(null) }, t("dialog.cancel")), button),
+      ];
+    },
+  });
 }
 
 async function foldersOf(id) {
   if (id === "/") return browser.shares;
   const { items } = await get("operation", { action: "subfolders", path_raw: id });
-  return items.map((folder) => ({ id: idIn(folder), kind: kindOf(folder.name, true, idIn(folder), folder.mount_type ?? "") })).filter(({ kind }) => kind !== "recycle");
+  return items
+    .map((folder) => ({ id: idIn(folder), kind: kindOf(folder.name, true, idIn(folder), folder.mount_type ?? "") }))
+    .filter(({ kind }) => kind !== "recycle");
 }

@@ -30,7 +30,8 @@ function clicked(event) {
   const { selection, listing } = browser;
   const sort = event.target.closest("[data-sort]");
   if (sort) return setSort(sort.dataset.sort);
-  if (event.target.closest("[data-all]")) return selection.count === listing.total ? selection.clear() : selection.all(listing.total);
+  if (event.target.closest("[data-all]"))
+    return selection.count === listing.total ? selection.clear() : selection.all(listing.total);
   const index = indexOf(event);
   if (index < 0) return selection.clear();
   const shift = event.shiftKey;

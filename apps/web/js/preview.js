@@ -4,7 +4,7 @@ import { urlOf } from "./api.js";
 import { browser } from "./browser.js";
 import { h, icon, iconButton, nameNode } from "./dom.js";
 import { describe } from "./errors.js";
-import { formatFullTime, formatSize } from "./format.js";
+import { formatSize, formatTime } from "./format.js";
 import { canShowImage, iconOf } from "./icons.js";
 import { download } from "./operations.js";
 import { t } from "./strings.js";
@@ -19,11 +19,18 @@ export function preview(entry) {
   const node = h("dialog.preview", { "aria-label": t("preview.title") });
   const title = h("div.preview-title");
   const stage = h("div.stage");
-  node.append(h("header", {}, title,
-    iconButton("download", t("command.download"), () => download([shown.entry])),
-    iconButton("close", t("dialog.close"), () => node.close())), stage,
+  node.append(
+    h(
+      "header",
+      {},
+      title,
+      iconButton("download", t("command.download"), () => download([shown.entry])),
+      iconButton("close", t("dialog.close"), () => node.close()),
+    ),
+    stage,
     iconButton("back", t("preview.previous"), () => step(-1), { "data-step": "previous" }),
-    iconButton("forward", t("preview.next"), () => step(1), { "data-step": "next" }));
+    iconButton("forward", t("preview.next"), () => step(1), { "data-step": "next" }),
+  );
   node.addEventListener("close", () => {
     shown.abort.abort();
     node.remove();
@@ -62,8 +69,11 @@ async function fill(entry) {
   shown.abort.abort();
   const abort = new AbortController();
   Object.assign(shown, { entry, abort });
-  const about = [entry.size !== null && formatSize(entry.size), formatFullTime(entry.mtime)].filter(Boolean).join(" · ");
-  shown.title.replaceChildren(icon(iconOf(entry), "file-icon"), h("div.grow", {}, h("b", {}, nameNode(entry.name)), h("span", {}, about)));
+  const about = [entry.size !== null && formatSize(entry.size), formatTime(entry.mtime)].filter(Boolean).join(" · ");
+  shown.title.replaceChildren(
+    icon(iconOf(entry), "file-icon"),
+    h("div.grow", {}, h("b", {}, nameNode(entry.name)), h("span", {}, about)),
+  );
   shown.stage.replaceChildren(h("div.progress.unknown.slow", {}, h("i")));
   const { stage } = shown;
   try {
@@ -113,10 +123,22 @@ async function textOf(entry, signal) {
   const bytes = new Uint8Array(await response.arrayBuffer());
   if (bytes.subarray(0, 4096).includes(0)) return message(entry, t("preview.none"));
   const text = h("pre", { tabindex: 0 }, new TextDecoder().decode(bytes));
-  return entry.size > TEXT_START ? h("div.text-part", {}, text, h("p.soft", {}, t("preview.start", { size: formatSize(TEXT_START) }))) : text;
+  return entry.size > TEXT_START
+    ? h("div.text-part", {}, text, h("p.soft", {}, t("preview.start", { size: formatSize(TEXT_START) })))
+    : text;
 }
 
 function message(entry, text) {
-  return h("div.no-preview", {}, icon(iconOf(entry), "file-icon huge"), h("p", {}, text),
-    h("button.button.outlined", { type: "button", onclick: () => download([entry]) }, icon("download"), t("command.download")));
+  return h(
+    "div.no-preview",
+    {},
+    icon(iconOf(entry), "file-icon huge"),
+    h("p", {}, text),
+    h(
+      "button.button.outlined",
+      { type: "button", onclick: () => download([entry]) },
+      icon("download"),
+      t("command.download"),
+    ),
+  );
 }

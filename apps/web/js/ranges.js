@@ -47,7 +47,10 @@ export class Ranges {
   remove(first, last) {
     this.list = this.list.flatMap(([a, b]) => {
       if (b < first || a > last) return [[a, b]];
-      return [[a, first - 1], [last + 1, b]].filter(([from, to]) => from <= to);
+      return [
+        [a, first - 1],
+        [last + 1, b],
+      ].filter(([from, to]) => from <= to);
     });
   }
 

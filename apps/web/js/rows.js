@@ -13,18 +13,41 @@ export const COLUMNS = {
   name: { id: "name", sort: "name" },
   folder: { id: "folder", sort: "ppath", text: (entry) => plainName(decode(entry.parent)) },
   size: { id: "size", sort: "size", text: (entry) => (entry.size === null ? "" : formatSize(entry.size)) },
-  mtime: { id: "mtime", sort: "mtime", text: (entry) => formatTime(entry.mtime), title: (entry) => formatFullTime(entry.mtime) },
+  mtime: {
+    id: "mtime",
+    sort: "mtime",
+    text: (entry) => formatTime(entry.mtime),
+    title: (entry) => formatFullTime(entry.mtime),
+  },
   type: { id: "type", sort: "type", text: (entry) => (entry.isFolder ? t("type.folder") : extensionOf(entry)) },
   owner: { id: "owner", sort: "user", text: (entry) => entry.owner },
 };
 
 export function makeHeader(columns) {
-  return h("div.row.header", { role: "row", "aria-rowindex": 1 },
-    h("span.check-cell", { role: "columnheader" }, h("button.check", { type: "button", "data-all": "", "aria-label": t("select.all") })),
-    columns.map((column) => h(`span.cell.${column.id}`, { role: "columnheader", "aria-sort": column.sorted ?? "none" },
-      column.sort === null ? h("span.sort", {}, t(`column.${column.id}`))
-        : h("button.sort", { type: "button", "data-sort": column.sort }, t(`column.${column.id}`), icon("chevron-down", "icon arrow")))),
-    h("span.more-cell", { role: "columnheader" }));
+  return h(
+    "div.row.header",
+    { role: "row", "aria-rowindex": 1 },
+    h(
+      "span.check-cell",
+      { role: "columnheader" },
+      h("button.check", { type: "button", "data-all": "", "aria-label": t("select.all") }),
+    ),
+    columns.map((column) =>
+      h(
+        `span.cell.${column.id}`,
+        { role: "columnheader", "aria-sort": column.sorted ?? "none" },
+        column.sort === null
+          ? h("span.sort", {}, t(`column.${column.id}`))
+          : h(
+              "button.sort",
+              { type: "button", "data-sort": column.sort },
+              t(`column.${column.id}`),
+              icon("chevron-down", "icon arrow"),
+            ),
+      ),
+    ),
+    h("span.more-cell", { role: "columnheader" }),
+  );
 }
 
 export function makeRow(index, mode) {
@@ -56,7 +79,11 @@ function check() {
 }
 
 function more() {
-  return h("button.more", { type: "button", tabindex: -1, "aria-label": t("menu.open"), title: t("menu.open") }, icon("dots"));
+  return h(
+    "button.more",
+    { type: "button", tabindex: -1, "aria-label": t("menu.open"), title: t("menu.open") },
+    icon("dots"),
+  );
 }
 
 function badges(entry) {
@@ -67,13 +94,27 @@ function badges(entry) {
 }
 
 function listCells(entry, columns) {
-  const cells = columns.map((column) => column.id === "name" ? null : h(`span.cell.${column.id}`,
-    { role: "gridcell", title: column.title?.(entry) ?? null }, column.id === "folder" ? nameNode(column.text(entry)) : column.text(entry)));
-  const sub = [formatTime(entry.mtime), entry.size === null ? null : formatSize(entry.size)].filter(Boolean).join(" · ");
+  const cells = columns.map((column) =>
+    column.id === "name"
+      ? null
+      : h(
+          `span.cell.${column.id}`,
+          { role: "gridcell", title: column.title?.(entry) ?? null },
+          column.id === "folder" ? nameNode(column.text(entry)) : column.text(entry),
+        ),
+  );
+  const sub = [formatTime(entry.mtime), entry.size === null ? null : formatSize(entry.size)]
+    .filter(Boolean)
+    .join(" · ");
   return [
     h("span.check-cell", { role: "gridcell" }, check()),
-    h("span.cell.name", { role: "gridcell", title: plainName(entry.name) }, picture(entry, "file-icon"),
-      h("span.label", {}, nameNode(shownName(entry)), h("span.sub", {}, sub)), badges(entry)),
+    h(
+      "span.cell.name",
+      { role: "gridcell", title: plainName(entry.name) },
+      picture(entry, "file-icon"),
+      h("span.label", {}, nameNode(shownName(entry)), h("span.sub", {}, sub)),
+      badges(entry),
+    ),
     ...cells.filter(Boolean),
     h("span.more-cell", { role: "gridcell" }, more()),
   ];
@@ -81,10 +122,15 @@ function listCells(entry, columns) {
 
 function tileParts(entry) {
   return [
-    check(), more(),
+    check(),
+    more(),
     h("span.tile-picture", {}, picture(entry, "file-icon large"), badges(entry)),
-    h("span.label", { title: plainName(entry.name) }, nameNode(shownName(entry), false),
-      h("span.sub", {}, entry.size === null ? t("type.folder") : formatSize(entry.size))),
+    h(
+      "span.label",
+      { title: plainName(entry.name) },
+      nameNode(shownName(entry), false),
+      h("span.sub", {}, entry.size === null ? t("type.folder") : formatSize(entry.size)),
+    ),
   ];
 }
 

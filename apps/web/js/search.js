@@ -28,7 +28,13 @@ export function setupSearch() {
 }
 
 addCommand({ id: "search", icon: "search", keys: ["Mod+Shift+f"], group: "go", run: openSearch });
-addCommand({ id: "stopSearch", icon: "stop", group: "go", when: ({ search }) => search && browser.listing?.extra?.finished === false, run: stopSearch });
+addCommand({
+  id: "stopSearch",
+  icon: "stop",
+  group: "go",
+  when: ({ search }) => search && browser.listing?.extra?.finished === false,
+  run: stopSearch,
+});
 addCommand({ id: "closeSearch", icon: "close", group: "go", when: ({ search }) => search, run: closeSearch });
 
 export function openSearch() {
@@ -38,7 +44,10 @@ export function openSearch() {
     asked = {};
     openSearch();
   });
-  $("panel").replaceChildren(h("header", {}, h("h2", {}, t("command.search")), iconButton("close", t("dialog.close"), closePanel)), form);
+  $("panel").replaceChildren(
+    h("header", {}, h("h2", {}, t("command.search")), iconButton("close", t("dialog.close"), closePanel)),
+    form,
+  );
   $("panel").hidden = false;
   $("search-button").setAttribute("aria-expanded", "true");
   form.elements.name.focus();
@@ -72,7 +81,10 @@ async function start(values) {
     go(`?${taskid}`);
   } catch (failure) {
     const said = describe(failure);
-    complaint.textContent = [failure.data?.parameter && t("search.wrong", { field: t(`search.${failure.data.parameter.split("_")[0]}`) }), said.title].filter(Boolean)[0];
+    complaint.textContent = [
+      failure.data?.parameter && t("search.wrong", { field: t(`search.${failure.data.parameter.split("_")[0]}`) }),
+      said.title,
+    ].filter(Boolean)[0];
   }
 }
 

@@ -13,27 +13,109 @@ const DAY = 86400;
 export function searchForm(values, submit) {
   const folder = browser.lastFolder;
   const field = (key, node) => h("label.field", {}, h("span", {}, t(`search.${key}`)), node);
-  const text = (name, placeholder = "") => field(name, h("input.input", { name, type: "text", value: values[name] ?? "", placeholder, autocomplete: "off", spellcheck: "false" }));
-  const choice = (name, options) => field(name, h("select.input", { name }, options.map(([value, label]) =>
-    h("option", { value, selected: (values[name] ?? options[0][0]) === value }, label))));
-  const range = (name) => h("fieldset.range", {}, h("legend", {}, t(`search.${name}`)), ["from", "to"].map((end) =>
-    h("input.input", { type: "date", name: `${name}_${end}`, value: values[`${name}_${end}`] ?? "", "aria-label": t(`search.${end}`) })));
-  const places = folder === "/" ? [["all", t("search.where.all")]]
-    : [["below", t("search.where.below", { folder: labelOf(folder) })], ["here", t("search.where.here", { folder: labelOf(folder) })], ["all", t("search.where.all")]];
-  const unit = h("select.input", { name: "unit", "aria-label": t("search.unit") }, Object.keys(UNITS).map((name) => h("option", { selected: (values.unit ?? "MB") === name }, name)));
-  const more = h("details", { open: ["owner", "group", "crtime_from", "crtime_to", "atime_from", "atime_to"].some((name) => values[name]) },
-    h("summary", {}, icon("chevron-right", "icon small"), t("search.more")), h("div.fields", {}, range("crtime"), range("atime"), text("owner"), text("group")));
-  return h("form.search-form", { onsubmit: (event) => {
-    event.preventDefault();
-    submit(Object.fromEntries(new FormData(event.target)));
-  } }, text("name", t("search.name.hint")), choice("where", places),
-  choice("type", [["all", t("search.type.all")], ["file", t("search.type.file")], ["dir", t("search.type.dir")]]),
-  text("extension", "jpg, png"), range("mtime"),
-  h("fieldset.range.size-range", {}, h("legend", {}, t("search.size")),
-    h("select.input", { name: "size_op", "aria-label": t("search.size.op") }, ["greater", "less", "equal"].map((op) => h("option", { value: op, selected: values.size_op === op }, t(`search.size.${op}`)))),
-    h("input.input", { name: "size", type: "number", min: 0, step: "any", value: values.size ?? "", "aria-label": t("search.size") }), unit),
-  more, h("span.complaint", { role: "alert" }),
-  h("footer", {}, h("button.button", { type: "reset" }, t("search.reset")), h("button.button.primary", { type: "submit" }, icon("search"), t("search.start"))));
+  const text = (name, placeholder = "") =>
+    field(
+      name,
+      h("input.input", {
+        name,
+        type: "text",
+        value: values[name] ?? "",
+        placeholder,
+        autocomplete: "off",
+        spellcheck: "false",
+      }),
+    );
+  const choice = (name, options) =>
+    field(
+      name,
+      h(
+        "select.input",
+        { name },
+        options.map(([value, label]) =>
+          h("option", { value, selected: (values[name] ?? options[0][0]) === value }, label),
+        ),
+      ),
+    );
+  const range = (name) =>
+    h(
+      "fieldset.range",
+      {},
+      h("legend", {}, t(`search.${name}`)),
+      ["from", "to"].map((end) =>
+        h("input.input", {
+          type: "date",
+          name: `${name}_${end}`,
+          value: values[`${name}_${end}`] ?? "",
+          "aria-label": t(`search.${end}`),
+        }),
+      ),
+    );
+  const places =
+    folder === "/"
+      ? [["all", t("search.where.all")]]
+      : [
+          ["below", t("search.where.below", { folder: labelOf(folder) })],
+          ["here", t("search.where.here", { folder: labelOf(folder) })],
+          ["all", t("search.where.all")],
+        ];
+  const unit = h(
+    "select.input",
+    { name: "unit", "aria-label": t("search.unit") },
+    Object.keys(UNITS).map((name) => h("option", { selected: (values.unit ?? "MB") === name }, name)),
+  );
+  const more = h(
+    "details",
+    { open: ["owner", "group", "crtime_from", "crtime_to", "atime_from", "atime_to"].some((name) => values[name]) },
+    h("summary", {}, icon("chevron-right", "icon small"), t("search.more")),
+    h("div.fields", {}, range("crtime"), range("atime"), text("owner"), text("group")),
+  );
+  return h(
+    "form.search-form",
+    {
+      onsubmit: (event) => {
+        event.preventDefault();
+        submit(Object.fromEntries(new FormData(event.target)));
+      },
+    },
+    text("name", t("search.name.hint")),
+    choice("where", places),
+    choice("type", [
+      ["all", t("search.type.all")],
+      ["file", t("search.type.file")],
+      ["dir", t("search.type.dir")],
+    ]),
+    text("extension", "jpg, png"),
+    range("mtime"),
+    h(
+      "fieldset.range.size-range",
+      {},
+      h("legend", {}, t("search.size")),
+      h(
+        "select.input",
+        { name: "size_op", "aria-label": t("search.size.op") },
+        ["greater", "less", "equal"].map((op) =>
+          h("option", { value: op, selected: values.size_op === op }, t(`search.size.${op}`)),
+        ),
+      ),
+      h("input.input", {
+        name: "size",
+        type: "number",
+        min: 0,
+        step: "any",
+        value: values.size ?? "",
+        "aria-label": t("search.size"),
+      }),
+      unit,
+    ),
+    more,
+    h("span.complaint", { role: "alert" }),
+    h(
+      "footer",
+      {},
+      h("button.button", { type: "reset" }, t("search.reset")),
+      h("button.button.primary", { type: "submit" }, icon("search"), t("search.start")),
+    ),
+  );
 }
 
 // Local days as seconds; "to" counts its own day in.
@@ -46,8 +128,11 @@ export function paramsOf(values) {
   const params = {
     path_raw: values.where === "all" ? browser.shares.map((share) => share.id) : [folder],
     recursive: String(values.where !== "here"),
-    name: values.name.trim(), type: values.type, extension: values.extension.replace(/[.*\s]/g, ""),
-    owner: values.owner.trim(), group: values.group.trim(),
+    name: values.name.trim(),
+    type: values.type,
+    extension: values.extension.replace(/[.*\s]/g, ""),
+    owner: values.owner.trim(),
+    group: values.group.trim(),
   };
   for (const time of TIMES) {
     if (values[`${time}_from`]) params[`${time}_from`] = secondsOf(values[`${time}_from`], 0);

@@ -11,11 +11,18 @@ const THEMES = ["system", "light", "dark"];
 const GROUPS = ["go", "open", "select", "change", "new", "view", "info"];
 
 addCommand({ id: "help", icon: "help", keys: ["?", "F1"], group: "info", run: showHelp });
-addCommand({ id: "find", icon: "filter", keys: ["/", "Mod+f"], group: "go", when: ({ folder }) => folder, run: () => {
-  document.querySelector(".top").classList.add("finding");
-  $("find").focus();
-  $("find").select();
-} });
+addCommand({
+  id: "find",
+  icon: "filter",
+  keys: ["/", "Mod+f"],
+  group: "go",
+  when: ({ folder }) => folder,
+  run: () => {
+    document.querySelector(".top").classList.add("finding");
+    $("find").focus();
+    $("find").select();
+  },
+});
 
 function applyTheme() {
   const theme = pref("theme", "system");
@@ -31,14 +38,27 @@ function setTheme(theme) {
 export function setupSettings() {
   applyTheme();
   const button = $("settings-button");
-  button.addEventListener("click", () => openMenu([
-    ...THEMES.map((theme) => ({ label: t(`theme.${theme}`), checked: pref("theme", "system") === theme, run: () => setTheme(theme) })),
-    "-",
-    ...Object.entries(LANGUAGES).map(([tag, name]) => ({ label: name, checked: tag === language, run: () => changeLanguage(tag) })),
-    "-",
-    { label: t("command.links"), icon: "link", run: () => runCommand("links") },
-    { label: t("command.help"), icon: "help", shortcut: "?", run: showHelp },
-  ], { anchor: button }));
+  button.addEventListener("click", () =>
+    openMenu(
+      [
+        ...THEMES.map((theme) => ({
+          label: t(`theme.${theme}`),
+          checked: pref("theme", "system") === theme,
+          run: () => setTheme(theme),
+        })),
+        "-",
+        ...Object.entries(LANGUAGES).map(([tag, name]) => ({
+          label: name,
+          checked: tag === language,
+          run: () => changeLanguage(tag),
+        })),
+        "-",
+        { label: t("command.links"), icon: "link", run: () => runCommand("links") },
+        { label: t("command.help"), icon: "help", shortcut: "?", run: showHelp },
+      ],
+      { anchor: button },
+    ),
+  );
   $("find").addEventListener("blur", () => document.querySelector(".top").classList.remove("finding"));
 }
 
@@ -46,8 +66,24 @@ function showHelp() {
   const keysOf = (command) => command.keys.map((keys) => h("kbd", {}, shortcutText(keys)));
   const sections = GROUPS.map((group) => {
     const rows = allCommands().filter((command) => command.group === group && command.keys.length > 0);
-    return rows.length > 0 && h("section", {}, h("h3", {}, t(`group.${group}`)),
-      h("dl", {}, rows.map((command) => [h("dt", {}, t(`command.${command.id}`)), h("dd", {}, keysOf(command))])));
+    return (
+      rows.length > 0 &&
+      h(
+        "section",
+        {},
+        h("h3", {}, t(`group.${group}`)),
+        h(
+          "dl",
+          {},
+          rows.map((command) => [h("dt", {}, t(`command.${command.id}`)), h("dd", {}, keysOf(command))]),
+        ),
+      )
+    );
   });
-  dialog({ title: t("command.help"), wide: true, className: "help", fill: () => [h("div.help-grid", {}, sections.filter(Boolean))] });
+  dialog({
+    title: t("command.help"),
+    wide: true,
+    className: "help",
+    fill: () => [h("div.help-grid", {}, sections.filter(Boolean))],
+  });
 }

@@ -5,17 +5,37 @@ import { describe } from "./errors.js";
 import { t } from "./strings.js";
 
 function state(iconName, title, text, actions = [], failed = false) {
-  const node = h("section.state", { role: failed ? "alert" : "status" }, h("div.picture", {}, icon(iconName)), h("h2", {}, title),
+  const node = h(
+    "section.state",
+    { role: failed ? "alert" : "status" },
+    h("div.picture", {}, icon(iconName)),
+    h("h2", {}, title),
     text && h("p", {}, text),
-    actions.length > 0 && h("div.actions", {}, actions.map(({ label, run, kind = "outlined" }) =>
-      h(`button.button.${kind}`, { type: "button", onclick: run }, label))));
+    actions.length > 0 &&
+      h(
+        "div.actions",
+        {},
+        actions.map(({ label, run, kind = "outlined" }) =>
+          h(`button.button.${kind}`, { type: "button", onclick: run }, label),
+        ),
+      ),
+  );
   node.classList.toggle("failed", failed);
   return node;
 }
 
 export function emptyFolder({ canWrite, upload, newFolder }) {
-  return state("folder-open", t("empty.folder"), canWrite ? t("empty.folder.hint") : "",
-    canWrite ? [{ label: t("command.upload"), run: upload }, { label: t("command.newFolder"), run: newFolder }] : []);
+  return state(
+    "folder-open",
+    t("empty.folder"),
+    canWrite ? t("empty.folder.hint") : "",
+    canWrite
+      ? [
+          { label: t("command.upload"), run: upload },
+          { label: t("command.newFolder"), run: newFolder },
+        ]
+      : [],
+  );
 }
 
 export function emptyBin() {
@@ -23,7 +43,9 @@ export function emptyBin() {
 }
 
 export function nothingFound(text, clear) {
-  return state("search", t("empty.filter", { text }), t("empty.filter.hint"), [{ label: t("filter.clear"), run: clear }]);
+  return state("search", t("empty.filter", { text }), t("empty.filter.hint"), [
+    { label: t("filter.clear"), run: clear },
+  ]);
 }
 
 export function nothingMatches(refine) {

@@ -10,7 +10,8 @@ export let language = "en";
 export let locale = "en";
 
 export async function loadStrings() {
-  const wanted = pref("language", null) ?? navigator.languages.map((tag) => tag.slice(0, 2)).find((tag) => tag in LANGUAGES);
+  const wanted =
+    pref("language", null) ?? navigator.languages.map((tag) => tag.slice(0, 2)).find((tag) => tag in LANGUAGES);
   language = wanted in LANGUAGES ? wanted : "en";
   const load = async (name) => (await fetch(`strings/${name}.json`)).json();
   [fallback, table] = await Promise.all([load("en"), language === "en" ? {} : load(language)]);

@@ -15,7 +15,15 @@ import { t } from "./strings.js";
 
 const POLL = 600;
 const LONGEST_FORM = 900_000; // bytes of a request, below what the web server takes
-const ICONS = { copy: "copy", move: "move", delete: "trash", restore: "restore", empty: "trash", compress: "archive", extract: "extract" };
+const ICONS = {
+  copy: "copy",
+  move: "move",
+  delete: "trash",
+  restore: "restore",
+  empty: "trash",
+  compress: "archive",
+  extract: "extract",
+};
 
 const cards = new Map(); // task -> {card, affected: [folder]}
 let timer = null;
@@ -34,7 +42,10 @@ export async function startTask(action, ids, params, affected) {
   for (const some of chunks(ids)) {
     try {
       const { taskid } = await post("operation", { action, path_raw: some, ...params, taskid: searchTask() });
-      show({ taskid, action, state: "running", items_total: some.length, items_done: 0, progress: 0 }, [...affected, ...new Set(some.map(parentOf))]);
+      show({ taskid, action, state: "running", items_total: some.length, items_done: 0, progress: 0 }, [
+        ...affected,
+        ...new Set(some.map(parentOf)),
+      ]);
     } catch (failure) {
       toastFailure(failure, some[0]);
       return false;
@@ -59,11 +70,14 @@ function chunks(ids) {
 
 function show(task, affected) {
   const card = new Card({
-    iconName: ICONS[task.action] ?? "activity", title: titleOf(task), onRemove: () => {
+    iconName: ICONS[task.action] ?? "activity",
+    title: titleOf(task),
+    onRemove: () => {
       cards.delete(task.taskid);
       clear(task.taskid);
     },
-    onCancel: () => post("operation", { action: "cancel", taskid: task.taskid }).then((now) => update({ ...now }), toastFailure),
+    onCancel: () =>
+      post("operation", { action: "cancel", taskid: task.taskid }).then((now) => update({ ...now }), toastFailure),
   });
   cards.set(task.taskid, { card, affected });
   update(task);
@@ -102,15 +116,25 @@ function update(task) {
   const errors = (task.errors ?? []).map((one) => ({ path: one.path, text: describe(one, one.path).title }));
   card.showErrors(errors, task.errors_left_out ?? 0);
   if (!task.finished) {
-    const detail = [task.items_total > 1 && t("task.items", { done: task.items_done ?? 0, count: task.items_total }),
-      task.bytes_total > 0 && t("size.of", { done: formatSize(task.bytes_done), total: formatSize(task.bytes_total) })];
+    const detail = [
+      task.items_total > 1 && t("task.items", { done: task.items_done ?? 0, count: task.items_total }),
+      task.bytes_total > 0 && t("size.of", { done: formatSize(task.bytes_done), total: formatSize(task.bytes_total) }),
+    ];
     const current = task.current ? plainName(task.current.slice(task.current.lastIndexOf("/") + 1)) : "";
-    card.progress(task.progress > 0 || task.items_done > 0 ? task.progress : null, detail.filter(Boolean).join(" · "), current);
+    card.progress(
+      task.progress > 0 || task.items_done > 0 ? task.progress : null,
+      detail.filter(Boolean).join(" · "),
+      current,
+    );
     return;
   }
-  const parts = [t("task.done", { count: task.items_done ?? 0 }), task.items_skipped > 0 && t("upload.skipped", { count: task.items_skipped }),
-    task.items_failed > 0 && t("upload.failed", { count: task.items_failed })];
-  const kind = task.state === "cancelled" ? "stopped" : task.state === "failed" || task.items_failed > 0 ? "failed" : "good";
+  const parts = [
+    t("task.done", { count: task.items_done ?? 0 }),
+    task.items_skipped > 0 && t("upload.skipped", { count: task.items_skipped }),
+    task.items_failed > 0 && t("upload.failed", { count: task.items_failed }),
+  ];
+  const kind =
+    task.state === "cancelled" ? "stopped" : task.state === "failed" || task.items_failed > 0 ? "failed" : "good";
   card.finish(kind, [task.state === "cancelled" && t("task.cancelled"), ...parts].filter(Boolean).join(" · "));
   emit("folders-changed", { ids: [...new Set([...affected, browser.id])] });
   refresh();

@@ -10,7 +10,22 @@ import { formatSize } from "./format.js";
 import { t } from "./strings.js";
 
 const SORTS = ["name", "size", "mtime", "type", "user"];
-const ON_CHOSEN = ["open", "showInFolder", "preview", "download", "share", "cut", "copy", "copyTo", "moveTo", "rename", "compress", "extract", "restore", "delete"];
+const ON_CHOSEN = [
+  "open",
+  "showInFolder",
+  "preview",
+  "download",
+  "share",
+  "cut",
+  "copy",
+  "copyTo",
+  "moveTo",
+  "rename",
+  "compress",
+  "extract",
+  "restore",
+  "delete",
+];
 const IN_BAR = ["download", "share", "copyTo", "moveTo", "restore", "rename", "delete"];
 let painted = "";
 
@@ -22,25 +37,49 @@ export function setupToolbar(setSort) {
 export function menuItem(id) {
   const found = command(id);
   if (!found?.when(context())) return null;
-  return { label: t(`command.${id}`), icon: found.icon, danger: found.danger, run: () => runCommand(id),
-    shortcut: found.keys[0] && shortcutText(found.keys[0]) };
+  return {
+    label: t(`command.${id}`),
+    icon: found.icon,
+    danger: found.danger,
+    run: () => runCommand(id),
+    shortcut: found.keys[0] && shortcutText(found.keys[0]),
+  };
 }
 
 export function contextItems() {
   const items = (ids) => ids.map(menuItem).filter(Boolean);
   if (context().count === 0) {
-    return [...items(["newFolder", "upload", "uploadFolder"]), "-", ...items(["paste", "selectAll", "refresh"]), "-", ...items(["emptyBin", "properties"])];
+    return [
+      ...items(["newFolder", "upload", "uploadFolder"]),
+      "-",
+      ...items(["paste", "selectAll", "refresh"]),
+      "-",
+      ...items(["emptyBin", "properties"]),
+    ];
   }
-  return [...items(ON_CHOSEN.slice(0, 5)), "-", ...items(ON_CHOSEN.slice(5, 9)), "-", ...items(["rename", "compress", "extract", "restore"]), "-",
-    ...items(["delete", "deleteForever"]), "-", ...items(["copyPath", "properties"])];
+  return [
+    ...items(ON_CHOSEN.slice(0, 5)),
+    "-",
+    ...items(ON_CHOSEN.slice(5, 9)),
+    "-",
+    ...items(["rename", "compress", "extract", "restore"]),
+    "-",
+    ...items(["delete", "deleteForever"]),
+    "-",
+    ...items(["copyPath", "properties"]),
+  ];
 }
 
 function button(id, className = "") {
   const found = command(id);
   if (!found?.when(context())) return null;
   const keys = found.keys[0] ? ` (${shortcutText(found.keys[0])})` : "";
-  return h(`button.button${className}`, { type: "button", "data-command": id, title: t(`command.${id}`) + keys, onclick: () => runCommand(id) },
-    icon(found.icon), h("span", {}, t(`command.${id}`)));
+  return h(
+    `button.button${className}`,
+    { type: "button", "data-command": id, title: t(`command.${id}`) + keys, onclick: () => runCommand(id) },
+    icon(found.icon),
+    h("span", {}, t(`command.${id}`)),
+  );
 }
 
 function paintToolbar(setSort) {
@@ -49,17 +88,50 @@ function paintToolbar(setSort) {
   bar.hidden = browser.id === "/";
   $("status").hidden = bar.hidden;
   // Painted anew only when something else can be done; the count changes in place.
-  const key = [browser.id, browser.mode, browser.sort.by, now.folder, now.canWrite, now.inBin, now.count > 0, now.count === 1, now.search && browser.listing?.extra?.finished, now.single?.isFolder, now.single?.name].join("|");
+  const key = [
+    browser.id,
+    browser.mode,
+    browser.sort.by,
+    now.folder,
+    now.canWrite,
+    now.inBin,
+    now.count > 0,
+    now.count === 1,
+    now.search && browser.listing?.extra?.finished,
+    now.single?.isFolder,
+    now.single?.name,
+  ].join("|");
   if (key !== painted) {
     painted = key;
-    const left = now.count > 0
-      ? [h("span.chosen-count", {}, iconButton("close", t("command.selectNone"), () => runCommand("selectNone")), h("span#chosen-count")),
-        ...IN_BAR.map((id) => button(id, id === "delete" ? ".quiet-danger" : "")),
-        iconButton("dots", t("menu.more"), (event) => openMenu(contextItems(), { anchor: event.currentTarget }), { "aria-haspopup": "menu" })]
-      : now.search ? [button("stopSearch"), button("search"), button("closeSearch")]
-        : [uploadButton(now), button("newFolder"), button("paste"), button("emptyBin")];
-    const right = [sortButton(setSort), h("span.view-switch", { role: "group", "aria-label": t("view.choose") }, ["list", "grid"].map((mode) =>
-      iconButton(mode, t(`view.${mode}`), () => runCommand(mode === "list" ? "viewList" : "viewGrid"), { "aria-pressed": String(browser.mode === mode) })))];
+    const left =
+      now.count > 0
+        ? [
+            h(
+              "span.chosen-count",
+              {},
+              iconButton("close", t("command.selectNone"), () => runCommand("selectNone")),
+              h("span#chosen-count"),
+            ),
+            ...IN_BAR.map((id) => button(id, id === "delete" ? ".quiet-danger" : "")),
+            iconButton("dots", t("menu.more"), (event) => openMenu(contextItems(), { anchor: event.currentTarget }), {
+              "aria-haspopup": "menu",
+            }),
+          ]
+        : now.search
+          ? [button("stopSearch"), button("search"), button("closeSearch")]
+          : [uploadButton(now), button("newFolder"), button("paste"), button("emptyBin")];
+    const right = [
+      sortButton(setSort),
+      h(
+        "span.view-switch",
+        { role: "group", "aria-label": t("view.choose") },
+        ["list", "grid"].map((mode) =>
+          iconButton(mode, t(`view.${mode}`), () => runCommand(mode === "list" ? "viewList" : "viewGrid"), {
+            "aria-pressed": String(browser.mode === mode),
+          }),
+        ),
+      ),
+    ];
     bar.replaceChildren(...[...left, h("span.grow"), ...right].filter(Boolean));
     bar.classList.toggle("on-chosen", now.count > 0);
   }
@@ -69,15 +141,36 @@ function paintToolbar(setSort) {
 }
 
 function uploadButton({ canWrite }) {
-  if (!canWrite) return h("span.soft.hint-readonly", {}, browser.listing?.ready ? [icon("read-only", "icon small"), t("share.read")] : "");
-  return h("button.button.primary", { type: "button", "aria-haspopup": "menu", onclick: (event) =>
-    openMenu([menuItem("upload"), menuItem("uploadFolder")].filter(Boolean), { anchor: event.currentTarget }) }, icon("upload"), h("span", {}, t("command.uploadMenu")));
+  if (!canWrite)
+    return h(
+      "span.soft.hint-readonly",
+      {},
+      browser.listing?.ready ? [icon("read-only", "icon small"), t("share.read")] : "",
+    );
+  return h(
+    "button.button.primary",
+    {
+      type: "button",
+      "aria-haspopup": "menu",
+      onclick: (event) =>
+        openMenu([menuItem("upload"), menuItem("uploadFolder")].filter(Boolean), { anchor: event.currentTarget }),
+    },
+    icon("upload"),
+    h("span", {}, t("command.uploadMenu")),
+  );
 }
 
 function sortButton(setSort) {
-  return iconButton("sort", t("sort.by", { column: t(`sort.${browser.sort.by}`) }), (event) => openMenu(
-    SORTS.map((by) => ({ label: t(`sort.${by}`), checked: browser.sort.by === by, run: () => setSort(by) })), { anchor: event.currentTarget }),
-  { id: "sort-button", "aria-haspopup": "menu" });
+  return iconButton(
+    "sort",
+    t("sort.by", { column: t(`sort.${browser.sort.by}`) }),
+    (event) =>
+      openMenu(
+        SORTS.map((by) => ({ label: t(`sort.${by}`), checked: browser.sort.by === by, run: () => setSort(by) })),
+        { anchor: event.currentTarget },
+      ),
+    { id: "sort-button", "aria-haspopup": "menu" },
+  );
 }
 
 function paintStatus(now) {

@@ -39,7 +39,7 @@ export async function transfer(action, ids, target) {
 
 async function conflictFor(target, ids) {
   const names = ids.map((id) => id.slice(id.lastIndexOf("/") + 1));
-  const taken = [...await takenNames(target, names)];
+  const taken = [...(await takenNames(target, names))];
   if (taken.length === 0) return "error";
   const said = await askConflict({ name: taken[0], folder: target, more: false, count: taken.length });
   return said ? EXISTS[said.answer] : null;
@@ -47,7 +47,11 @@ async function conflictFor(target, ids) {
 
 async function to(action) {
   const ids = (await selectedEntries()).map((entry) => entry.id);
-  const target = await pickFolder({ title: t(`${action}.title`, { count: ids.length }), action: t(`${action}.action`), start: parentOf(ids[0]) });
+  const target = await pickFolder({
+    title: t(`${action}.title`, { count: ids.length }),
+    action: t(`${action}.action`),
+    start: parentOf(ids[0]),
+  });
   if (target) transfer(action, ids, target);
 }
 
@@ -67,8 +71,13 @@ const bins = new Map(); // share -> whether it has a recycle bin
 
 async function hasBin(share) {
   if (!bins.has(share)) {
-    const reply = await get("list", { action: "folder", path_raw: share, pattern: "#recycle", filetype: "dir" }).catch(() => ({ items: [] }));
-    bins.set(share, reply.items.some((item) => item.name === "#recycle"));
+    const reply = await get("list", { action: "folder", path_raw: share, pattern: "#recycle", filetype: "dir" }).catch(
+      () => ({ items: [] }),
+    );
+    bins.set(
+      share,
+      reply.items.some((item) => item.name === "#recycle"),
+    );
   }
   return bins.get(share);
 }
@@ -79,9 +88,23 @@ async function remove(forGood) {
   const inBin = ids.every((id) => id.split("/")[2] === "%23recycle");
   const kept = !forGood && !inBin && (await Promise.all([...new Set(ids.map(shareOf))].map(hasBin))).every(Boolean);
   const what = { count: ids.length, name: entries.length === 1 ? entries[0].name : "" };
-  if (!kept && !(await confirm({ title: t("delete.title", what), text: t(forGood || inBin ? "delete.text" : "delete.nobin", what), action: t("command.deleteForever"), kind: "danger" }))) return;
+  if (
+    !kept &&
+    !(await confirm({
+      title: t("delete.title", what),
+      text: t(forGood || inBin ? "delete.text" : "delete.nobin", what),
+      action: t("command.deleteForever"),
+      kind: "danger",
+    }))
+  )
+    return;
   browser.selection.clear();
-  await startTask("delete", ids, { permanent: kept ? undefined : "true" }, kept ? ids.map((id) => `${shareOf(id)}/%23recycle`) : []);
+  await startTask(
+    "delete",
+    ids,
+    { permanent: kept ? undefined : "true" },
+    kept ? ids.map((id) => `${shareOf(id)}/%23recycle`) : [],
+  );
 }
 
 async function restore() {
@@ -100,8 +123,15 @@ async function compress() {
   const ids = (await selectedEntries()).map((entry) => entry.id);
   const folder = parentOf(ids[0]);
   const stem = ids.length === 1 ? splitExtension(nameOf(ids[0]))[0] : nameOf(folder);
-  const name = await askText({ title: t("compress.title", { count: ids.length }), label: t("name.label"), value: `${stem}.zip`, selectTo: stem.length,
-    action: t("command.compress"), check: checkName, submit: async (text) => (/\.zip$/i.test(text) ? text : `${text}.zip`) });
+  const name = await askText({
+    title: t("compress.title", { count: ids.length }),
+    label: t("name.label"),
+    value: `${stem}.zip`,
+    selectTo: stem.length,
+    action: t("command.compress"),
+    check: checkName,
+    submit: async (text) => (/\.zip$/i.test(text) ? text : `${text}.zip`),
+  });
   if (!name) return;
   const target = childOf(folder, encodeName(name));
   const conflict = await conflictFor(folder, [target]);
@@ -117,12 +147,61 @@ const chosen = ({ count }) => count > 0;
 const changeable = ({ canChange, inBin }) => canChange && !inBin;
 addCommand({ id: "cut", icon: "cut", keys: ["Mod+x"], group: "change", when: changeable, run: () => hold(true) });
 addCommand({ id: "copy", icon: "copy", keys: ["Mod+c"], group: "change", when: chosen, run: () => hold(false) });
-addCommand({ id: "paste", icon: "paste", keys: ["Mod+v"], group: "change", when: ({ canWrite, inBin }) => held !== null && canWrite && !inBin, run: paste });
+addCommand({
+  id: "paste",
+  icon: "paste",
+  keys: ["Mod+v"],
+  group: "change",
+  when: ({ canWrite, inBin }) => held !== null && canWrite && !inBin,
+  run: paste,
+});
 addCommand({ id: "copyTo", icon: "copy", group: "change", when: chosen, run: () => to("copy") });
 addCommand({ id: "moveTo", icon: "move", group: "change", when: changeable, run: () => to("move") });
-addCommand({ id: "compress", icon: "archive", group: "change", when: ({ count, canChange, search, inBin }) => count > 0 && canChange && !search && !inBin, run: compress });
-addCommand({ id: "extract", icon: "extract", group: "change", when: ({ single, inBin }) => single && !inBin && !single.isFolder && ARCHIVE.test(single.name), run: extract });
-addCommand({ id: "restore", icon: "restore", group: "change", when: ({ count, canChange, inBin }) => count > 0 && canChange && inBin, run: restore });
-addCommand({ id: "delete", icon: "trash", keys: ["Delete"], group: "change", danger: true, when: ({ canChange }) => canChange, run: () => remove(false) });
-addCommand({ id: "deleteForever", icon: "trash", keys: ["Shift+Delete"], group: "change", danger: true, when: changeable, run: () => remove(true) });
-addCommand({ id: "emptyBin", icon: "trash", group: "change", danger: true, when: ({ folder, canWrite }) => folder && canWrite && !isSearch(browser.id) && /^\/[^/]+\/%23recycle$/.test(browser.id), run: emptyBin });
+addCommand({
+  id: "compress",
+  icon: "archive",
+  group: "change",
+  when: ({ count, canChange, search, inBin }) => count > 0 && canChange && !search && !inBin,
+  run: compress,
+});
+addCommand({
+  id: "extract",
+  icon: "extract",
+  group: "change",
+  when: ({ single, inBin }) => single && !inBin && !single.isFolder && ARCHIVE.test(single.name),
+  run: extract,
+});
+addCommand({
+  id: "restore",
+  icon: "restore",
+  group: "change",
+  when: ({ count, canChange, inBin }) => count > 0 && canChange && inBin,
+  run: restore,
+});
+addCommand({
+  id: "delete",
+  icon: "trash",
+  keys: ["Delete"],
+  group: "change",
+  danger: true,
+  when: ({ canChange }) => canChange,
+  run: () => remove(false),
+});
+addCommand({
+  id: "deleteForever",
+  icon: "trash",
+  keys: ["Shift+Delete"],
+  group: "change",
+  danger: true,
+  when: changeable,
+  run: () => remove(true),
+});
+addCommand({
+  id: "emptyBin",
+  icon: "trash",
+  group: "change",
+  danger: true,
+  when: ({ folder, canWrite }) =>
+    folder && canWrite && !isSearch(browser.id) && /^\/[^/]+\/%23recycle$/.test(browser.id),
+  run: emptyBin,
+});

@@ -35,10 +35,21 @@ function paintShares() {
 
 function makeItem(id, label, kind, level, share = null) {
   const group = h("ul", { role: "group", hidden: true });
-  const line = h("div.tree-line", {}, h("button.twist", { type: "button", tabindex: -1, "aria-hidden": "true" }, icon("chevron-right", "icon small")),
-    icon(`kind-${kind}`, "file-icon"), nameNode(label), share && h("span.marks", {}, marksOf(share)));
+  const line = h(
+    "div.tree-line",
+    {},
+    h("button.twist", { type: "button", tabindex: -1, "aria-hidden": "true" }, icon("chevron-right", "icon small")),
+    icon(`kind-${kind}`, "file-icon"),
+    nameNode(label),
+    share && h("span.marks", {}, marksOf(share)),
+  );
   line.style.setProperty("--level", level);
-  const item = h("li", { role: "treeitem", "aria-expanded": "false", "aria-level": level, "aria-label": plainName(label), tabindex: -1 }, line, group);
+  const item = h(
+    "li",
+    { role: "treeitem", "aria-expanded": "false", "aria-level": level, "aria-label": plainName(label), tabindex: -1 },
+    line,
+    group,
+  );
   item.dataset.id = id;
   nodes.set(id, { item, group, loaded: false });
   return item;
@@ -72,10 +83,16 @@ async function load(id, node) {
   }
   const level = Number(node.item.getAttribute("aria-level")) + 1;
   const kept = new Map([...node.group.children].map((item) => [item.dataset.id, item]));
-  node.group.replaceChildren(...items.slice(0, MOST).map((folder) => {
-    const child = idIn(folder);
-    return kept.get(child) ?? makeItem(child, labelOf(child), kindOf(folder.name, true, child, folder.mount_type ?? ""), level);
-  }), ...(items.length > MOST ? [moreItem(id, items.length - MOST, level)] : []));
+  node.group.replaceChildren(
+    ...items.slice(0, MOST).map((folder) => {
+      const child = idIn(folder);
+      return (
+        kept.get(child) ??
+        makeItem(child, labelOf(child), kindOf(folder.name, true, child, folder.mount_type ?? ""), level)
+      );
+    }),
+    ...(items.length > MOST ? [moreItem(id, items.length - MOST, level)] : []),
+  );
   if (items.length === 0) node.item.removeAttribute("aria-expanded");
   paintCurrent();
 }
@@ -90,7 +107,8 @@ function moreItem(id, count, level) {
 
 function reload(id) {
   const node = nodes.get(id);
-  if (!node?.loaded) return node?.item.setAttribute("aria-expanded", node.item.getAttribute("aria-expanded") ?? "false");
+  if (!node?.loaded)
+    return node?.item.setAttribute("aria-expanded", node.item.getAttribute("aria-expanded") ?? "false");
   return load(id, node);
 }
 

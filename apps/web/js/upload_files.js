@@ -7,7 +7,10 @@ export function fromInput(input) {
 
 // The data of a drop is gone after its event: what is in it is taken at once, the folders are read after.
 export function fromDrop(transfer) {
-  const entries = [...transfer.items].filter((item) => item.kind === "file").map((item) => item.webkitGetAsEntry?.()).filter(Boolean);
+  const entries = [...transfer.items]
+    .filter((item) => item.kind === "file")
+    .map((item) => item.webkitGetAsEntry?.())
+    .filter(Boolean);
   const plain = entries.length === 0 ? [...transfer.files] : [];
   return async () => {
     const found = plain.map((file) => ({ file, parts: [file.name] }));

@@ -63,15 +63,19 @@ class Batch {
     this.bytes = this.jobs.reduce((sum, job) => sum + job.file.size, 0);
     this.begun = performance.now();
     this.card = new Card({
-      iconName: "upload", onCancel: () => this.cancel(),
+      iconName: "upload",
+      onCancel: () => this.cancel(),
       title: t("upload.title", { count: this.jobs.length, folder: labelOf(target) }),
     });
   }
 
   async makeEmptyFolders(folders) {
     for (const { parts } of folders) {
-      await post("operation", { action: "mkdir", parents: "true", path_raw: idFor(this.target, parts) })
-        .catch((failure) => { if (failure.code !== EXISTS) throw failure; });
+      await post("operation", { action: "mkdir", parents: "true", path_raw: idFor(this.target, parts) }).catch(
+        (failure) => {
+          if (failure.code !== EXISTS) throw failure;
+        },
+      );
     }
   }
 
@@ -79,7 +83,10 @@ class Batch {
   async lookForConflicts() {
     const folders = Map.groupBy(this.jobs, (job) => parentOf(job.id));
     for (const [folder, jobs] of folders) {
-      const taken = await takenNames(folder, jobs.map((job) => job.name));
+      const taken = await takenNames(
+        folder,
+        jobs.map((job) => job.name),
+      );
       for (const job of jobs) job.meets = taken.has(job.name);
     }
   }
@@ -94,22 +101,36 @@ class Batch {
     const count = (...states) => this.jobs.filter((job) => states.includes(job.state)).length;
     const failed = this.jobs.filter((job) => job.state === "failed");
     const left = count("waiting", "running");
-    const loaded = this.jobs.reduce((sum, job) => sum + (job.state === "running" || job.state === "waiting" ? job.loaded : job.file.size), 0);
-    this.card.showErrors(failed.map((job) => ({ path: decode(job.id), text: describe(job.failure, decode(job.id)).title })));
+    const loaded = this.jobs.reduce(
+      (sum, job) => sum + (job.state === "running" || job.state === "waiting" ? job.loaded : job.file.size),
+      0,
+    );
+    this.card.showErrors(
+      failed.map((job) => ({ path: decode(job.id), text: describe(job.failure, decode(job.id)).title })),
+    );
     if (left > 0) {
       const seconds = ((performance.now() - this.begun) / 1000) * ((this.bytes - loaded) / Math.max(1, loaded));
-      const detail = [t("upload.progress", { done: this.jobs.length - left, count: this.jobs.length }),
-        t("size.of", { done: formatSize(loaded), total: formatSize(this.bytes) }), loaded > 0 && formatDuration(seconds)];
+      const detail = [
+        t("upload.progress", { done: this.jobs.length - left, count: this.jobs.length }),
+        t("size.of", { done: formatSize(loaded), total: formatSize(this.bytes) }),
+        loaded > 0 && formatDuration(seconds),
+      ];
       this.card.progress(this.bytes > 0 ? loaded / this.bytes : null, detail.filter(Boolean).join(" · "));
       this.changed(2000);
       return;
     }
     this.changed(0);
     const done = count("done");
-    const detail = [t("upload.done", { count: done }), count("skipped") > 0 && t("upload.skipped", { count: count("skipped") }),
-      failed.length > 0 && t("upload.failed", { count: failed.length })];
+    const detail = [
+      t("upload.done", { count: done }),
+      count("skipped") > 0 && t("upload.skipped", { count: count("skipped") }),
+      failed.length > 0 && t("upload.failed", { count: failed.length }),
+    ];
     const kind = failed.length > 0 ? "failed" : count("cancelled") > 0 ? "stopped" : "good";
-    this.card.finish(kind, count("cancelled") > 0 ? t("upload.cancelled", { count: done }) : detail.filter(Boolean).join(" · "));
+    this.card.finish(
+      kind,
+      count("cancelled") > 0 ? t("upload.cancelled", { count: done }) : detail.filter(Boolean).join(" · "),
+    );
   }
 
   // The list follows, though not at every file.

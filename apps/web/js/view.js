@@ -80,7 +80,10 @@ export class View {
     for (let index = first; index <= last; ++index) this.place(index, box);
     this.root.setAttribute("aria-rowcount", this.listing.ready ? this.listing.total + 1 : -1);
     this.root.setAttribute("aria-busy", String(!this.listing.ready));
-    this.inSight = [Math.floor(box.top / box.height) * box.across, Math.ceil((box.top + box.room) / box.height) * box.across];
+    this.inSight = [
+      Math.floor(box.top / box.height) * box.across,
+      Math.ceil((box.top + box.room) / box.height) * box.across,
+    ];
     this.paintSelection();
   }
 
@@ -115,7 +118,10 @@ export class View {
       row.classList.toggle("above-selected", chosen && this.selection.has(index + 1));
       row.classList.toggle("below-selected", chosen && this.selection.has(index - 1));
     }
-    this.header?.classList.toggle("all", this.listing.ready && this.listing.total > 0 && this.selection.count === this.listing.total);
+    this.header?.classList.toggle(
+      "all",
+      this.listing.ready && this.listing.total > 0 && this.selection.count === this.listing.total,
+    );
     const active = this.rows.get(this.selection.cursor);
     if (active) this.root.setAttribute("aria-activedescendant", active.id);
     else this.root.removeAttribute("aria-activedescendant");
