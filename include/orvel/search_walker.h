@@ -1,6 +1,6 @@
 // A running search: chosen folders and criteria in, a task with its results out. Shares that the file index covers are
-// answered from it, the others are walked, and so are folders that no index holds (hidden ones, recycle bins, those
-// behind links); both give the same records.
+// answered from it, the others are walked, and so are folders that no index holds (hidden ones, recycle bins, network
+// mounts, those behind links); both give the same records.
 //
 // Failures are reported by result and by the platform's error number, and logged at LOG_ERR where a function does not
 // say otherwise; the library code is not set here (look-ups of privileges and paths set theirs). Constructing an object
@@ -52,10 +52,13 @@ class ORVEL_API OrvSearchCallBack : public OrvDirectoryWalkerCallBack {
     // `context`: the share's root; `extra`: the share's name (null counts as "").
     bool operator()(const std::string& displayPath, const std::string& context, const std::string& realPath,
                     const std::string& name, _tag_VEXOSTAT_& status, const std::string* extra) override;
+    // The platform error of the last record that could not be stored; 0: none was lost.
+    [[nodiscard]] int lossReason() const { return lossReason_; }
 
  private:
     FileRecord record_;
     std::string database_;
+    int lossReason_ = 0;
 };
 
 // Tests each entry against the criteria and hands what matches on to the result callback. `criteria` must outlive it;
@@ -67,6 +70,7 @@ class ORVEL_API OrvSearchCompWalkerCB : public OrvDirectoryWalkerCallBack {
     ~OrvSearchCompWalkerCB() override;
     bool operator()(const std::string& displayPath, const std::string& context, const std::string& realPath,
                     const std::string& name, _tag_VEXOSTAT_& status, const std::string* extra) override;
+    [[nodiscard]] int lossReason() const { return results_->lossReason(); }  // as of the result callback
 
  private:
     std::unique_ptr<OrvSearchCallBack> results_;
@@ -113,7 +117,8 @@ class ORVEL_API OrvSearchWalker {
     bool BuildDirMap(const std::vector<std::string>& folders);
 
     // Searches. `accessTimeCriteria`: those of the criteria that ask for access times, which an index cannot know. True
-    // when everything was searched or the search was cancelled; the results so far stay. False with the platform error
+    // when everything was searched or the search was cancelled; the results so far stay. Where some could not be stored
+    // it is true as well, with the platform error of the last of them. False with the platform error
     // 0x0D00 (not initialised, or the index failed), 0x0600 or 0x0300 (a chosen folder is missing or denied; not
     // logged), 0x8100 (another failure of its status), 0x8000 (the walk failed). A chosen path that is no folder is
     // passed over. Side effect: the current directory.

@@ -23,12 +23,20 @@ bool leadsThroughLinks(const PathInfo& folder, std::string_view within) {
     return root != nullptr && resolved != nullptr && below(root.get(), within) != resolved.get();
 }
 
+// An indexer does not enter these; the mount table tells without asking the server.
+bool isNetworkMount(const std::string& realPath) {
+    return VEXOFSIsInMountTable(realPath.c_str()) >= 0 && VEXOFSIsRemoteFS() == 1;
+}
+
 bool isLeftOut(const std::string& shareRoot, std::string_view within) {
     const std::string top = below(shareRoot, within.substr(0, within.find('/')));
     if (VEXOShareIsShareRecycle(top.c_str()) == 1) return true;
+    std::string at = shareRoot;
     while (!within.empty()) {
         const std::size_t end = std::min(within.find('/'), within.size());
-        if (VEXOEAIsHiddenFile(std::string(within.substr(0, end)).c_str()) == 1) return true;
+        const std::string name(within.substr(0, end));
+        at += '/' + name;
+        if (VEXOEAIsHiddenFile(name.c_str()) == 1 || isNetworkMount(at)) return true;
         within.remove_prefix(std::min(end + 1, within.size()));
     }
     return false;

@@ -6,6 +6,7 @@
 #include "core/boundary.h"
 #include "orvel/search_walker.h"
 #include "util/printable.h"
+#include "vexo/error.h"
 
 namespace FileSearch {
 namespace {
@@ -52,6 +53,7 @@ bool OrvSearchCallBack::operator()(const std::string& /*displayPath*/, const std
         const PathFault fault = record_.fill(realPath, context, extra == nullptr ? none : *extra, name, status);
         if (!reportFault(fault, realPath)) return true;
         if (FILEIDXOutputDBInsert(database_.c_str(), &record_.data()) < 0) {
+            lossReason_ = VLIBCErrGet();
             syslog(LOG_ERR, "%s:%d Fail to insert data into DB %s", kSource, __LINE__,
                    orvel::printable(database_).c_str());
         }

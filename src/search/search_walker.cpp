@@ -125,6 +125,9 @@ bool OrvSearchWalker::search(const std::vector<FindATimeComp*>& accessTimeCriter
     // Whoever waits for the end reads them in another process.
     if (FILEIDXDBFlush(database_.c_str()) < 0) {
         syslog(LOG_ERR, "%s:%d Fail to insert data into DB %s", kSource, __LINE__, orvel::printable(database_).c_str());
+    } else if (callback_->lossReason() != 0) {
+        // What was met since may have left another error.
+        VLIBCErrSetEx(callback_->lossReason(), kSource, __LINE__);
     }
     return true;
 }

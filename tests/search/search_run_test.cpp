@@ -172,6 +172,19 @@ TEST_F(SearchRunTest, CancelLeavesTheResultsSoFar) {
     });
 }
 
+TEST_F(SearchRunTest, LostRecordsAreToldAtTheEnd) {
+    for (const char* name : {"/a", "/b", "/c"}) writeFile(shareRoot("photo") + name, "");
+    inOwnProcess([&] {
+        Probe probe([](int) { VLIBCErrSetEx(VEXO_ERR_MISSING, "", 0); });  // as what vanishes during a walk
+        OneSearch run("alice", {"/photo"}, probe.alone);
+        vexo::gate::fail("FILEIDXOutputDBInsert", VEXO_ERR_NO_SPACE, ENOSPC, 1);
+        EXPECT_TRUE(run.walker.Walk({}));
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_NO_SPACE);
+        EXPECT_EQ(takeLogTexts().size(), 1U);
+        EXPECT_EQ(rowsOf(run.task).size(), 2U);
+    });
+}
+
 TEST_F(SearchRunTest, ResultsOutliveTheSearchThatWasKilled) {
     for (int i = 0; i < 300; ++i) writeFile(shareRoot("photo") + "/" + std::to_string(i), "");
     for (const int killedAt : {2, 300}) {

@@ -166,6 +166,13 @@ TEST_F(SearchWalkerTest, WalkIndexAndModelAgree) {
         const timespec times[] = {{2000000000, 0}, {0, UTIME_OMIT}};
         EXPECT_EQ(utimensat(AT_FDCWD, file.c_str(), times, 0), 0);
         EXPECT_EQ(keysOf(search("alice", sinceNow)), std::vector<std::string>{"photo/2012/a.txt"});
+
+        // What no indexer enters is walked.
+        makeFile(shareRoot("photo") + "/2012/far/later");
+        const Query far{{"/photo/2012/far"}, {{0, nullptr, "later"}}};
+        EXPECT_EQ(search("alice", far).size(), 0U);
+        addMount(shareRoot("photo") + "/2012", "nfs");
+        EXPECT_EQ(keysOf(search("alice", far)), std::vector<std::string>{"photo/2012/far/later"});
     });
 }
 
