@@ -23,8 +23,15 @@ int openArchive(const Job& job, const std::string& path, Item& item, Descriptor&
     const int code = openItem(job.operation.user, path, {Need::kRead}, item);
     if (code != ORV_ERR_NONE) return code;
     if (!S_ISREG(item.status.st_mode)) return ORV_ERR_ARCHIVE;
-    file = Descriptor(openat(item.place.folder.get(), item.place.name.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
+    file = Descriptor(
+        openat(item.place.folder.get(), item.place.name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
     return file ? ORV_ERR_NONE : OrvParseErrnoToError(errno, nullptr, nullptr);
+}
+
+// The items are the members; an archive is one more when it fails.
+void failed(const std::string& path, int code, Progress& progress) {
+    progress.expect(1, 0);
+    progress.failed(path, code);
 }
 
 void extractOne(const Job& job, const std::string& path, Progress& progress) {
@@ -32,12 +39,12 @@ void extractOne(const Job& job, const std::string& path, Progress& progress) {
     Item item;
     Descriptor file;
     int code = openArchive(job, path, item, file);
-    if (code != ORV_ERR_NONE) return progress.failed(path, code);
+    if (code != ORV_ERR_NONE) return failed(path, code, progress);
     Unpacker unpacker(
         progress,
         {.folder = job.folder, .path = job.info.path, .conflict = job.conflict, .owner = ownerFor(user.name)});
     code = unpacker.run(file.get(), UnpackLimits::of(item.status.st_size));
-    if (code != ORV_ERR_NONE) progress.failed(path, code);
+    if (code != ORV_ERR_NONE) failed(path, code, progress);
     if (unpacker.names().empty()) return;
     // The log knows no kind of its own for it.
     OrvLibDoLog(user.name, item.info.path, unpacker.bytes(), ORVEL_ACTION_COPY, false);

@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <sys/random.h>
+#include <unistd.h>
 
 #include <array>
 #include <cerrno>
@@ -30,6 +31,17 @@ bool putLink(int folder, const std::string& name, const char* text, bool replace
     return false;
 }
 
+bool putHardLink(int fromFolder, const std::string& from, int folder, const std::string& name, bool replace) {
+    if (!replace) return linkat(fromFolder, from.c_str(), folder, name.c_str(), 0) == 0;
+    const std::string part = partName();
+    if (part.empty() || linkat(fromFolder, from.c_str(), folder, part.c_str(), 0) != 0) return false;
+    const bool renamed = renameat(folder, part.c_str(), folder, name.c_str()) == 0;
+    const int error = errno;
+    unlinkat(folder, part.c_str(), 0);  // still there, too, when both were names of one file
+    errno = error;
+    return renamed;
+}
+
 NewFile::~NewFile() {
     if (!name_.empty()) unlinkat(folder_, name_.c_str(), 0);
 }
@@ -52,6 +64,8 @@ bool NewFile::giveName(const std::string& name) {
 
 bool NewFile::publish(const std::string& name, bool replace) {
     if (!replace && name_.empty()) return giveName(name);
+    // A power cut must leave the old content or the new one, not an empty file.
+    if (replace && fdatasync(file_.get()) != 0) return false;
     if (name_.empty()) {
         std::string part = partName();
         if (part.empty() || !giveName(part)) return false;

@@ -15,6 +15,10 @@ std::string partName();
 // errno.
 bool putLink(int folder, const std::string& name, const char* text, bool replace);
 
+// Gives the file `from` in the open folder `fromFolder` one more name, in place of what has that name when `replace`.
+// As above.
+bool putHardLink(int fromFolder, const std::string& from, int folder, const std::string& name, bool replace);
+
 // Has no name at all where the file system can do that, so that not even a killed process leaves anything behind; else
 // a hidden one. Unless it was published it is gone with its owner.
 class NewFile {
@@ -28,8 +32,8 @@ class NewFile {
     // Creates it, closed to others, for writing. False with errno.
     bool create();
     [[nodiscard]] int get() const { return file_.get(); }
-    // Gives it its name, in place of what has that name when `replace`; else EEXIST when there is something. False with
-    // errno; it can be tried again.
+    // Gives it its name, in place of what has that name when `replace` (once it is on the disk); else EEXIST when there
+    // is something. False with errno; it can be tried again.
     bool publish(const std::string& name, bool replace);
 
  private:

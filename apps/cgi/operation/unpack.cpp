@@ -88,6 +88,10 @@ struct Unpacker::Member {
     std::string name;
     std::string path;   // share-relative
     Descriptor folder;  // that holds it
+    // Archives do not tell the type of a further name.
+    [[nodiscard]] mode_t type() const {
+        return archive_entry_hardlink(entry) != nullptr ? mode_t{AE_IFREG} : archive_entry_filetype(entry);
+    }
     [[nodiscard]] mode_t mode() const { return archive_entry_perm(entry); }
     [[nodiscard]] timespec modified() const {
         if (archive_entry_mtime_is_set(entry) == 0) return {0, UTIME_NOW};
@@ -106,7 +110,7 @@ UnpackLimits UnpackLimits::of(long long archiveSize) {
 
 int Unpacker::run(int file, const UnpackLimits& limits) {
     limits_ = limits;
-    bytes_ = members_ = consumed_ = 0;
+    bytes_ = members_ = folders_ = consumed_ = 0;
     exceeded_ = torn_ = false;
     const auto source = openArchive(file);
     const int code = source == nullptr ? static_cast<int>(ORV_ERR_ARCHIVE) : readAll(source.get());
@@ -126,10 +130,15 @@ int Unpacker::readAll(archive* source) {
         take(source, entry);
         if (exceeded_) return ORV_ERR_FILE_TOO_BIG;
         if (torn_) return ORV_ERR_ARCHIVE_DATA;
-        const long long consumed = archive_filter_bytes(source, -1);
-        progress_.bytes(std::max(consumed - consumed_, 0LL));
-        consumed_ = std::max(consumed, consumed_);
+        tellConsumed(source);
     }
+}
+
+// How much of the archive was read.
+void Unpacker::tellConsumed(archive* source) {
+    const long long consumed = archive_filter_bytes(source, -1);
+    progress_.bytes(std::max(consumed - consumed_, 0LL));
+    consumed_ = std::max(consumed, consumed_);
 }
 
 void Unpacker::take(archive* source, archive_entry* entry) {
@@ -182,6 +191,9 @@ int Unpacker::place(archive* source, Member& member) {
 // Opens the folder, of which missing parts are made. Links in it are not followed.
 int Unpacker::enter(const std::vector<std::string>& folders, Descriptor& folder) {
     constexpr int flags = O_PATH | O_DIRECTORY;
+    // Where the system keeps its own is closed also when it is there.
+    const auto isHidden = [](const std::string& name) { return VEXOEAIsHiddenFile(name.c_str()) != 0; };
+    if (std::any_of(folders.begin(), folders.end(), isHidden)) return ORV_ERR_RESERVED_NAME;
     folder = openBeneath(target_.folder, joined(folders), LinkPolicy::kNone, flags);
     if (folder) return ORV_ERR_NONE;
     if (errno != ENOENT) return refusalCode(errno, "");
@@ -191,6 +203,8 @@ int Unpacker::enter(const std::vector<std::string>& folders, Descriptor& folder)
         if (!next && errno == ENOENT) {
             const int code = checkName(folder, name);
             if (code != ORV_ERR_NONE) return code;
+            exceeded_ = ++folders_ > limits_.members;  // one member may lie in thousands
+            if (exceeded_) return ORV_ERR_FILE_TOO_BIG;
             if (mkdirat(folder.get(), name.c_str(), 0755) != 0) return codeOf(errno);
             next = openBeneath(folder, name, LinkPolicy::kNone, flags);
             [[maybe_unused]] const int ignored =
@@ -224,8 +238,7 @@ int Unpacker::nameIt(Member& member, bool (*give)(void* what, const std::string&
         case Conflict::kSkip:
             return kSkipped;
         case Conflict::kOverwrite:
-            if (struct stat there{};
-                member.isThere(there) && (there.st_mode & S_IFMT) != archive_entry_filetype(member.entry)) {
+            if (struct stat there{}; member.isThere(there) && (there.st_mode & S_IFMT) != member.type()) {
                 return ORV_ERR_EXISTS;
             }
             return give(what, wanted, true) ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
@@ -237,6 +250,7 @@ int Unpacker::nameIt(Member& member, bool (*give)(void* what, const std::string&
         given = give(what, member.name, false);
         if (!given && errno != EEXIST) break;
     }
+    if (given) numbered_[joined(member.folders) + "/" + wanted] = member.name;
     return given ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
 }
 
@@ -256,17 +270,22 @@ int Unpacker::makeFile(archive* source, Member& member) {
     ignored = fchmod(file.get(), (member.mode() & 0755) | 0600);
     const std::array<timespec, 2> when = {timespec{0, UTIME_NOW}, member.modified()};
     futimens(file.get(), when.data());
-    return nameIt(
+    struct stat made {};
+    if (fstat(file.get(), &made) != 0) return codeOf(errno);
+    const int named = nameIt(
         member,
         [](void* what, const std::string& name, bool replace) {
             return static_cast<NewFile*>(what)->publish(name, replace);
         },
         &file);
+    if (named == ORV_ERR_NONE) unpacked_.insert({made.st_dev, made.st_ino});
+    return named;
 }
 
 // Writes the member's data; what the archive leaves out stays a hole.
 int Unpacker::fill(archive* source, const Member& member, int file) {
     long long end = archive_entry_size_is_set(member.entry) != 0 ? archive_entry_size(member.entry) : 0;
+    end = std::max(end, 0LL);
     const long long before = bytes_;
     for (;;) {
         const void* block = nullptr;
@@ -293,6 +312,7 @@ int Unpacker::fill(archive* source, const Member& member, int file) {
         }
         end = std::max(end, static_cast<long long>(offset) + static_cast<long long>(size));
         bytes_ = before + end;
+        tellConsumed(source);
     }
     bytes_ = before + end;
     return ftruncate(file, end) == 0 ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
@@ -314,29 +334,43 @@ int Unpacker::makeLink(Member& member) {
         &link);
 }
 
+// Opens the folder of the file that this unpacking made for the member of that path, and tells the name that it got.
+// What else has the member's name is the user's. False with the library code.
+bool Unpacker::findUnpacked(std::vector<std::string> components, Descriptor& folder, std::string& name,
+                            int& code) const {
+    const auto numbered = numbered_.find(joined(components));
+    std::vector<std::string> names = {components.back()};
+    if (numbered != numbered_.end()) names.push_back(numbered->second);
+    components.pop_back();
+    folder = openBeneath(target_.folder, joined(components), LinkPolicy::kNone, O_PATH | O_DIRECTORY);
+    code = folder ? static_cast<int>(ORV_ERR_MISSING) : refusalCode(errno, "");
+    for (const std::string& candidate : names) {
+        struct stat status {};
+        if (!folder || fstatat(folder.get(), candidate.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) continue;
+        name = candidate;
+        if (unpacked_.count({status.st_dev, status.st_ino}) != 0) return true;
+    }
+    return false;
+}
+
 // One more name of a member that was unpacked before.
 int Unpacker::makeHardLink(Member& member) {
-    auto other = memberComponents(archive_entry_hardlink(member.entry));
+    const auto other = memberComponents(archive_entry_hardlink(member.entry));
     if (!other) return ORV_ERR_ILLEGAL_NAME;
-    const std::string name = other->back();
-    other->pop_back();
+    struct stat there {};
+    if (member.isThere(there) && target_.conflict == Conflict::kSkip) return kSkipped;
     struct Names {
         Descriptor from;
         std::string name;
         const Descriptor& to;
-    } names = {openBeneath(target_.folder, joined(*other), LinkPolicy::kNone, O_PATH | O_DIRECTORY), name,
-               member.folder};
-    struct stat status {};
-    if (!names.from || fstatat(names.from.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
-        return refusalCode(errno, "");
-    }
-    if (!S_ISREG(status.st_mode)) return ORV_ERR_DENIED;
+    } names = {Descriptor(), "", member.folder};
+    int code = ORV_ERR_NONE;
+    if (!findUnpacked(*other, names.from, names.name, code)) return code;
     return nameIt(
         member,
         [](void* what, const std::string& asName, bool replace) {
             const auto& pair = *static_cast<Names*>(what);
-            if (replace && unlinkat(pair.to.get(), asName.c_str(), 0) != 0) return false;
-            return linkat(pair.from.get(), pair.name.c_str(), pair.to.get(), asName.c_str(), 0) == 0;
+            return putHardLink(pair.from.get(), pair.name, pair.to.get(), asName, replace);
         },
         &names);
 }

@@ -2,8 +2,12 @@
 #ifndef ORVEL_CGI_OPERATION_UNPACK_H
 #define ORVEL_CGI_OPERATION_UNPACK_H
 
+#include <sys/types.h>
+
+#include <map>
 #include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "operation/conflict.h"
@@ -17,7 +21,7 @@ namespace orvel::cgi {
 
 // What an archive may come to. Settings "extract_max_ratio" (bytes for each byte of the archive, 200; archives that
 // come to less than 64 MiB are never measured by it), "extract_max_size" (MiB, 1048576) and "extract_max_members"
-// (1000000).
+// (1000000; it also bounds the folders that are made).
 struct UnpackLimits {
     long long bytes, members;
     static UnpackLimits of(long long archiveSize);
@@ -25,8 +29,8 @@ struct UnpackLimits {
 
 // Unpacks zip and tar, these also compressed as a whole, into one folder. Nothing of a member's name or of links in the
 // folder leads out of it; a member appears under its name whole or not at all. What cannot be unpacked is reported,
-// each member for itself, and the rest goes on: names that lead out or may not be used, links that lead out, devices,
-// encrypted members. Names are the bytes that the archive has.
+// each member for itself, and the rest goes on: names that lead out or may not be used, links that lead out, hard links
+// to what was not unpacked, devices, encrypted members. Names are the bytes that the archive has.
 class Unpacker {
  public:
     struct Target {
@@ -62,14 +66,18 @@ class Unpacker {
     int makeHardLink(Member& member);
     int fill(archive* source, const Member& member, int file);
     int nameIt(Member& member, bool (*give)(void* what, const std::string& name, bool replace), void* what);
+    bool findUnpacked(std::vector<std::string> components, Descriptor& folder, std::string& name, int& code) const;
+    void tellConsumed(archive* source);
     void finishFolders();
 
     Progress& progress_;
     Target target_;
     UnpackLimits limits_{};
     std::set<std::string> names_;
+    std::set<std::pair<dev_t, ino_t>> unpacked_;   // files, for their further names
+    std::map<std::string, std::string> numbered_;  // by path below the target: the name that a member got instead
     std::vector<MadeFolder> madeFolders_;
-    long long bytes_ = 0, members_ = 0, consumed_ = 0;
+    long long bytes_ = 0, members_ = 0, folders_ = 0, consumed_ = 0;
     bool exceeded_ = false, torn_ = false;
 };
 
