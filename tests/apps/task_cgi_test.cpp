@@ -505,9 +505,19 @@ TEST_F(TaskCgi, WhatIsDeletedCanBePutBack) {
     EXPECT_EQ(remove({"/photo/#recycle"}), "/photo/#recycle 407\n");
     EXPECT_EQ(remove({"/photo/a"}, "&permanent=true"), "");
     EXPECT_FALSE(fs::exists(photo_ + "/a") || fs::exists(bin + "/a/g"));
+    ASSERT_EQ(chmod(bin.c_str(), 0700), 0);
+    writeFile(photo_ + "/kept", "x", 0666);
+    EXPECT_EQ(remove({"/photo/kept"}), "/photo/kept 407\n") << "a bin that is closed is a bin";
+    EXPECT_EQ(readFile(photo_ + "/kept"), "x");
+    ASSERT_EQ(chmod(bin.c_str(), 0777), 0);
+    writeFile(bin + "/@tmp (#2)", "x", 0666);
+    EXPECT_EQ(restore({"/photo/#recycle/@tmp (#2)"}), "/photo/#recycle/@tmp (#2) 418\n");
+    fs::remove(bin + "/@tmp (#2)");
     writeFile(bin + "/root's/f", "x");
     EXPECT_EQ(code(ask("bob", "action=empty&path=/photo")), 407);
-    EXPECT_EQ(errors(perform("alice", "action=empty&path=/photo")), "/photo/#recycle/root's/f 407\n");
+    const Json::Value emptied = perform("alice", "action=empty&path=/photo");
+    EXPECT_EQ(errors(emptied), "/photo/#recycle/root's/f 407\n");
+    EXPECT_EQ(emptied["items_skipped"], 1) << "the folder that stays with it";
     EXPECT_FALSE(fs::exists(bin + "/a"));
     EXPECT_EQ(code(ask("alice", "action=empty&path=/video")), 408) << "no bin";
     const std::string log = readFile(systemRoot() + "/var/log/vexo/xfer.log");
@@ -574,6 +584,7 @@ TEST_F(TaskCgi, HostileArchivesReachNothingOutside) {
                                          {"pipe", AE_IFIFO, ""},
                                          {"good/\xFFraw", AE_IFREG, "3"},
                                          {"@vexoea/x", AE_IFREG, "x"},
+                                         {"@tmp/x", AE_IFREG, "x"},
                                          {"a:b", AE_IFREG, "x"},
                                          {"./", AE_IFDIR, ""},
                                          {"folder/", AE_IFDIR, ""},
@@ -582,12 +593,15 @@ TEST_F(TaskCgi, HostileArchivesReachNothingOutside) {
     support::makeFolder(photo_ + "/t", 0777);
     ASSERT_EQ(chmod((photo_ + "/t").c_str(), 0777), 0);
     fs::create_symlink("/etc", photo_ + "/t/planted");
+    support::makeFolder(photo_ + "/t/@tmp", 0777);
+    ASSERT_EQ(chmod((photo_ + "/t/@tmp").c_str(), 0777), 0);
     const Json::Value task =
         perform("alice", "action=extract&conflict=keep_both" + about({"/video/h.tar.gz"}, "/photo/t"));
     EXPECT_EQ(errors(task),
               "/photo/t//abs 1006\n/photo/t/../up 1006\n/photo/t/good/../../up 1006\n/photo/t/good/out 407\n"
               "/photo/t/good/up 407\n/photo/t/door/through 407\n/photo/t/planted/x 407\n/photo/t/good/stolen 1006\n"
               "/photo/t/good/stolen2 407\n/photo/t/device 407\n/photo/t/pipe 407\n/photo/t/@vexoea/x 418\n"
+              "/photo/t/@tmp/x 418\n"
               "/photo/t/a:b 418\n");
     EXPECT_EQ(task["state"], "done");
     EXPECT_EQ(readFile(photo_ + "/t/good/a") + readFile(photo_ + "/t/good/a (2)"), "12");
@@ -602,9 +616,45 @@ TEST_F(TaskCgi, HostileArchivesReachNothingOutside) {
     EXPECT_EQ(status.st_uid, support::kAliceUid);
 }
 
+TEST_F(TaskCgi, FurtherNamesAreOfWhatWasUnpacked) {
+    SKIP_WITHOUT_ROOT();
+    pack(video_ + "/h.tar", "ustar", nullptr,
+         {{"a", AE_IFREG, "new"},
+          {"a", AE_IFREG, "a", true},
+          {"b", AE_IFREG, "a", true},
+          {"c", AE_IFREG, "a", true},
+          {"d", AE_IFREG, "mine", true}});
+    struct {
+        const char *policy, *errors, *tree;
+    } const cases[] = {{"error", "/photo/t/a 414\n/photo/t/a 408\n/photo/t/b 408\n/photo/t/c 408\n/photo/t/d 408\n",
+                        "a=old b=old mine=mine"},
+                       {"skip", "/photo/t/c 408\n/photo/t/d 408\n", "a=old b=old mine=mine"},
+                       {"overwrite", "/photo/t/d 408\n", "a=new b=new c=new mine=mine"},
+                       {"keep_both", "/photo/t/d 408\n", "a (2)=new a (3)=new a=old b (2)=new b=old c=new mine=mine"}};
+    for (const auto& [policy, refused, tree] : cases) {
+        SCOPED_TRACE(policy);
+        fs::remove_all(photo_ + "/t");
+        for (const char* file : {"/t/a", "/t/b"}) writeFile(photo_ + file, "old", 0666);
+        writeFile(photo_ + "/t/mine", "mine", 0666);
+        for (const char* name : {"/t", "/t/a", "/t/b", "/t/mine"}) give(photo_ + name);
+        const Json::Value task =
+            perform("alice", "action=extract&conflict=" + std::string(policy) + about({"/video/h.tar"}, "/photo/t"));
+        EXPECT_EQ(errors(task), refused);
+        std::vector<std::string> found;
+        for (const auto& entry : fs::directory_iterator(photo_ + "/t")) {
+            found.push_back(entry.path().filename().string() + "=" + readFile(entry.path()));
+        }
+        std::sort(found.begin(), found.end());
+        std::string all;
+        for (const std::string& line : found) all += (all.empty() ? "" : " ") + line;
+        EXPECT_EQ(all, tree);
+    }
+}
+
 TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
     SKIP_WITHOUT_ROOT();
     setSetting("extract_max_ratio", "20");
+    setSetting("extract_max_members", "20");
     support::makeFolder(video_ + "/t", 0777);
     ASSERT_EQ(chmod((video_ + "/t").c_str(), 0777), 0);
     const std::string zeros(70 << 20, '\0');
@@ -631,6 +681,10 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
         fs::copy(huge, video_ + "/huge.zip");
         EXPECT_EQ(extract("huge.zip"), "/video/t/zeros 1007\n/video/huge.zip 1007\n");
     }
+    std::string deep = "deep";
+    while (deep.size() < 60) deep += "/d";
+    pack(video_ + "/deep.tar", "ustar", nullptr, {{(deep + "/x").c_str(), AE_IFREG, "1"}});
+    EXPECT_EQ(extract("deep.tar"), "/video/t/" + deep + "/x 1007\n/video/deep.tar 1007\n");
     EXPECT_EQ(extract("good.zip"), "");
     EXPECT_EQ(extract("secret.zip"), "/video/t/hidden 1403\n");
     EXPECT_EQ(extract("none.zip"), "/video/none.zip 1401\n");

@@ -9,26 +9,25 @@
 namespace orvel::cgi {
 namespace {
 
-// The bin that takes the item; nothing when it is to be removed for good.
-std::optional<RecycleBin> binFor(const Item& item, bool permanent) {
-    auto bin = permanent ? std::nullopt : RecycleBin::of(item.info);
-    if (bin && bin->holds(item)) bin.reset();
-    return bin;
-}
-
-// The bin itself goes only when that is asked for.
-int openItemToDelete(const Operation& operation, const std::string& path, bool permanent, Item& item) {
-    const int code = openItem(operation.user, path, {Need::kModify}, item);
+// Opens the item and the bin that takes it; none when it is to be removed for good. The bin itself goes only when that
+// is asked for.
+int openItemToDelete(const Operation& operation, const std::string& path, bool permanent, Item& item,
+                     std::optional<RecycleBin>& bin) {
+    int code = openItem(operation.user, path, {Need::kModify}, item);
     if (code != ORV_ERR_NONE || permanent) return code;
-    const auto bin = RecycleBin::of(item.info);
-    return bin && bin->is(item) ? ORV_ERR_DENIED : ORV_ERR_NONE;
+    code = RecycleBin::open(item.info, bin);
+    if (code != ORV_ERR_NONE || !bin) return code;
+    if (bin->is(item)) return ORV_ERR_DENIED;
+    if (bin->holds(item)) bin.reset();
+    return ORV_ERR_NONE;
 }
 
 void expectAll(const Operation& operation, bool permanent, Progress& progress) {
     for (const std::string& path : operation.paths) {
         Item item;
-        const bool found = !progress.stopped() && openItemToDelete(operation, path, permanent, item) == 0;
-        if (found && !binFor(item, permanent)) {
+        std::optional<RecycleBin> bin;
+        const bool found = !progress.stopped() && openItemToDelete(operation, path, permanent, item, bin) == 0;
+        if (found && !bin) {
             measure(item, progress);
         } else {
             progress.expect(1, 0);
@@ -58,12 +57,12 @@ void run(const Operation& operation, bool permanent, Progress& progress) {
     for (const std::string& path : operation.paths) {
         if (progress.stopped()) return;
         Item item;
-        const int code = openItemToDelete(operation, path, permanent, item);
+        std::optional<RecycleBin> bin;
+        const int code = openItemToDelete(operation, path, permanent, item, bin);
         if (code != ORV_ERR_NONE) {
             progress.failed(path, code);
             continue;
         }
-        const auto bin = binFor(item, permanent);
         const bool gone = bin ? recycle(*bin, item, owner, progress) : removeTree(item.entry(), progress);
         if (!gone) continue;
         OrvLibDoLog(user, item.info.path, 0, ORVEL_ACTION_DELETE, false);

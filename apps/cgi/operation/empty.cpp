@@ -56,9 +56,10 @@ int emptyOperation(Operation& operation) {
     PathInfo info;
     OrvLibSetErr(ORV_ERR_NONE);
     if (!PathInfoFactory::create(operation.user.name.c_str(), operation.paths.front(), info)) return lastCode();
-    const int code = judge(operation.user, info.path, Need::kModify);
+    int code = judge(operation.user, info.path, Need::kModify);
+    std::optional<RecycleBin> bin;
+    if (code == ORV_ERR_NONE) code = RecycleBin::open(info, bin);
     if (code != ORV_ERR_NONE) return code;
-    const auto bin = RecycleBin::of(info);
     if (!bin) return ORV_ERR_MISSING;
     return startTask(operation, "empty", [&](Progress& progress) { run(operation, *bin, info, progress); });
 }

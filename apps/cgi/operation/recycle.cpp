@@ -94,20 +94,24 @@ std::string nextBinName(const std::string& name, int number, bool /*isFolder*/) 
     return binName(originalName(name), number);
 }
 
-std::optional<RecycleBin> RecycleBin::of(const PathInfo& info) {
-    RecycleBin bin;
-    bin.root_ = Descriptor(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    bin.folder_ = Descriptor(openat(bin.root_.get(), kBin, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-    if (!bin.folder_) return std::nullopt;
-    bin.shareName_ = info.shareName;
-    bin.rootPath_ = realPathOf(bin.root_);
-    bin.path_ = realPathOf(bin.folder_);
-    return bin;
+int RecycleBin::open(const PathInfo& info, std::optional<RecycleBin>& bin) {
+    RecycleBin found;
+    found.root_ = Descriptor(::open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    if (!found.root_) return refusalCode(errno, info.shareRoot);
+    found.folder_ = Descriptor(openat(found.root_.get(), kBin, kOpenFolder));
+    const bool none = !found.folder_ && (errno == ENOENT || errno == ENOTDIR || errno == ELOOP);
+    if (!found.folder_) return none ? static_cast<int>(ORV_ERR_NONE) : refusalCode(errno, info.shareRoot);
+    found.shareName_ = info.shareName;
+    found.rootPath_ = realPathOf(found.root_);
+    found.path_ = realPathOf(found.folder_);
+    bin = std::move(found);
+    return ORV_ERR_NONE;
 }
 
 int RecycleBin::placeFor(const Item& item, const Owner& owner, Descriptor& folder, Entry& place) const {
     Descriptor original(openat(root_.get(), ".", kOpenFolder));
     folder = Descriptor(openat(folder_.get(), ".", kOpenFolder));
+    if (!original || !folder) return OrvParseErrnoToError(errno, nullptr, nullptr);
     std::string path = sharePath();
     for (const std::string& name : foldersOf(item, rootPath_)) {
         original = Descriptor(openat(original.get(), name.c_str(), kOpenFolder));
@@ -129,11 +133,13 @@ std::string RecycleBin::originOf(const Item& item) const {
 void RecycleBin::prune(const Item& item) const {
     std::vector<std::string> folders = foldersOf(item, path_);
     while (!folders.empty()) {
-        std::string path = ".";
-        for (const std::string& name : folders) path += "/" + name;
-        // A link in the way was put there since; rmdir removes none.
-        if (unlinkat(folder_.get(), path.c_str(), AT_REMOVEDIR) != 0) return;
+        const std::string name = std::move(folders.back());
         folders.pop_back();
+        std::string path = ".";
+        for (const std::string& above : folders) path += "/" + above;
+        // No link that was put in the way since may lead to somebody else's folders.
+        const Descriptor parent = openBeneath(folder_, path, LinkPolicy::kNone, O_PATH | O_DIRECTORY);
+        if (!parent || unlinkat(parent.get(), name.c_str(), AT_REMOVEDIR) != 0) return;
     }
 }
 

@@ -21,8 +21,9 @@ std::string nextBinName(const std::string& name, int number, bool isFolder);
 
 class RecycleBin {
  public:
-    // That of the share of `info`; nothing where it has none (or a link in its place).
-    static std::optional<RecycleBin> of(const PathInfo& info);
+    // That of the share of `info`; nothing where it has none (or a link in its place). 0, or a library code when that
+    // could not be told: what is deleted must then not go for good.
+    static int open(const PathInfo& info, std::optional<RecycleBin>& bin);
 
     // Whether the item is the bin itself, and whether it lies in it.
     [[nodiscard]] bool is(const Item& item) const { return item.realPath() == path_; }
@@ -41,7 +42,7 @@ class RecycleBin {
     [[nodiscard]] std::string sharePath() const { return "/" + shareName_ + "/#recycle"; }
 
  private:
-    Descriptor root_, folder_;
+    Descriptor root_, folder_;                 // opened O_PATH
     std::string shareName_, rootPath_, path_;  // real paths
 };
 

@@ -5,6 +5,7 @@
 #include "operation/transfer_job.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
+#include "vexo/filesystem.h"
 
 namespace orvel::cgi {
 namespace {
@@ -15,6 +16,9 @@ int openOrigin(const User& user, const std::string& path, Conflict& conflict, Pa
     if (!PathInfoFactory::create(user.name.c_str(), path, info)) return lastCode();
     const int code = judgeTarget(user, info, conflict);
     if (code != ORV_ERR_NONE) return code;
+    // A name that was marked by hand may lead to any.
+    const std::string name = info.path.substr(info.path.rfind('/') + 1);
+    if (VEXOEAIsHiddenFile(name.c_str()) != 0) return ORV_ERR_RESERVED_NAME;
     return openTarget(info, linkPolicyOf(info.shareName), user.name, Missing::kMake, place);
 }
 
@@ -23,7 +27,8 @@ void restoreOne(const Operation& operation, const std::string& path, Conflict co
     const User& user = operation.user;
     Item item;
     int code = openItem(user, path, {Need::kModify}, item);
-    const auto bin = code == ORV_ERR_NONE ? RecycleBin::of(item.info) : std::nullopt;
+    std::optional<RecycleBin> bin;
+    if (code == ORV_ERR_NONE) code = RecycleBin::open(item.info, bin);
     if (code == ORV_ERR_NONE && (!bin || !bin->holds(item))) code = ORV_ERR_PARAMETER;
     PathInfo info;
     Target place;
