@@ -127,7 +127,8 @@ void run(const Job& job, Progress& progress) {
     const int code = publish(job, file, name);
     if (code != ORV_ERR_NONE) return progress.broken(job.info.path, code);
     // The log knows no kind of its own for it.
-    OrvLibDoLog(operation.user.name, job.info.path, zip.bytes(), ORVEL_ACTION_COPY, false);
+    const std::string made = job.info.path.substr(0, job.info.path.rfind('/') + 1) + name;
+    OrvLibDoLog(operation.user.name, made, zip.bytes(), ORVEL_ACTION_COPY, false);
     ShownSearch(operation.user.name, operation.web.GetParam("taskid", "")).added({job.info, job.place.folder, name});
 }
 

@@ -8,6 +8,7 @@
 #include "reply.h"
 #include "shown_search.h"
 #include "target.h"
+#include "vexo/filesystem.h"
 
 namespace orvel::cgi {
 int renameOperation(Operation& operation) {
@@ -17,6 +18,7 @@ int renameOperation(Operation& operation) {
     Target target;
     const int code = openTarget(info, linkPolicyOf(info.shareName), operation.user.name, Missing::kRefuse, target);
     if (code != ORV_ERR_NONE) return code;
+    if (VEXOEAIsHiddenFile(target.name.c_str()) != 0) return ORV_ERR_MISSING;
     OrvLibSetErr(ORV_ERR_NONE);
     if (OrvCheckFileName(realPathOf(target.folder).c_str(), name->c_str()) != 0) return lastCode(ORV_ERR_GENERAL);
     if (!renameNew(target.folder.get(), target.name, target.folder.get(), *name)) {

@@ -17,14 +17,17 @@ bool isOperation(const std::string& id) {
 
 }  // namespace
 
-Json::Value taskReply(const KTR::Task& task) {
+Json::Value taskReply(KTR::Task& task) {
+    // What was read while it was still at work is not its last word.
+    const bool finished = task.isFinished();
+    if (finished) task.reload();
     const Json::Value data = task.getProperty("data");
     Json::Value shown = data.isObject() ? data : Json::Value(Json::objectValue);
     shown["taskid"] = task.getName();
     shown["created"] = Json::Int64{task.getCreateTime()};
     const Json::Value progress = task.getProperty("progress");
     shown["progress"] = progress.isDouble() ? progress : Json::Value(0.0);
-    shown["finished"] = task.isFinished();
+    shown["finished"] = finished;
     if (task.hasFailed() && (!shown["state"].isString() || shown["state"] == "running")) shown["state"] = "failed";
     return shown;
 }

@@ -13,8 +13,8 @@
 namespace orvel::cgi {
 
 // {"taskid","created","progress","finished"} with the members of its "data" beside them. A task whose process ended
-// without a last word is shown as "failed".
-Json::Value taskReply(const KTR::Task& task);
+// without a last word is shown as "failed". Side effect: the record of one that has ended is read anew.
+Json::Value taskReply(KTR::Task& task);
 
 // The background operation "taskid" of the user, null when he has no such one; and all of them, false when they cannot
 // be listed. Searches have records of the same kind, but are no operations.

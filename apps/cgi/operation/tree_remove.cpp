@@ -50,6 +50,7 @@ bool emptyFolder(const Entry& entry, dev_t device, int depth, Progress& progress
             all = removeIn(entry.child(folder.get(), name), device, depth + 1, progress) && all;
         }
     }
+    if (!all) progress.skipped();  // it stays, with what stayed in it
     return all;
 }
 
