@@ -6,6 +6,7 @@
 
 #include "apps/program.h"
 #include "index/folder_state.h"
+#include "index/share_files.h"
 #include "support/testing.h"
 
 using namespace orvel::ctl;
@@ -138,6 +139,18 @@ TEST_F(Index, NetworkMountsStayOut) {
     EXPECT_EQ(run({"index", "update", "photo"}).status, 1);
     EXPECT_EQ(run({"index", "build", "photo"}).status, 1);
     EXPECT_EQ(asUser(kAliceUid, kUsersGid, [] { return run({"index", "build", "photo"}).status; }), 1);
+}
+
+// A user may put a link where the indexer, as root, saw a folder a moment before.
+TEST_F(Index, NoLinkIsFollowed) {
+    file("/in/deep/f");
+    fs::create_symlink(root_ + "/in", root_ + "/link");
+    int stop = 0;
+    const ShareFiles files(root_, &stop);
+    for (const char* folder : {"", "in", "in/deep", "link", "link/deep"}) {
+        const size_t expected = *folder == '\0' || *folder == 'i' ? 1 : 0;
+        EXPECT_EQ(files.list(folder).size(), expected) << folder;
+    }
 }
 
 TEST_F(Index, WorkThatIsBrokenOffLosesNothing) {

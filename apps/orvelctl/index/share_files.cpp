@@ -1,10 +1,12 @@
 #include "index/share_files.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
 
 #include <cerrno>
 #include <climits>
 
+#include "confined.h"
 #include "orvel/directory_walker.h"
 #include "vexo/filesystem.h"
 
@@ -13,18 +15,21 @@ namespace {
 
 class Collector final : public OrvDirectoryWalkerCallBack {
  public:
-    explicit Collector(std::string prefix) : prefix_(std::move(prefix)) {}
+    // `prefix`: the folder's path within the share, with a "/" behind it.
+    Collector(size_t folderLength, std::string prefix) : folderLength_(folderLength), prefix_(std::move(prefix)) {}
 
-    bool operator()(const std::string&, const std::string&, const std::string& realPath, const std::string& name,
+    bool operator()(const std::string&, const std::string&, const std::string&, const std::string& name,
                     _tag_VEXOSTAT_& status, const std::string*) override {
         const bool kept = S_ISREG(status.st_mode) || S_ISDIR(status.st_mode);
-        if (kept && realPath.size() < PATH_MAX) entries.push_back({name, prefix_ + name, status});
+        const bool fits = folderLength_ + 1 + name.size() < PATH_MAX;
+        if (kept && fits) entries.push_back({name, prefix_ + name, status});
         return true;
     }
 
     std::vector<Entry> entries;
 
  private:
+    size_t folderLength_;  // of its real path
     std::string prefix_;
 };
 
@@ -34,11 +39,22 @@ bool Entry::isFolder() const {
     return S_ISDIR(status.st_mode);
 }
 
+ShareFiles::ShareFiles(std::string root, int* stop)
+    : root_(std::move(root)), opened_(open(root_.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC)), stop_(stop) {}
+
+// The indexer is root and users move their folders while it works: a link that took the place of one must not bring
+// names from elsewhere into the index.
 std::vector<Entry> ShareFiles::list(const std::string& folder) const {
-    Collector collector(folder.empty() ? "" : folder + "/");
+    cgi::Descriptor below;
+    if (!folder.empty()) {
+        below = cgi::openBeneath(opened_, folder, cgi::LinkPolicy::kNone, O_PATH | O_DIRECTORY);
+        if (!below) return {};
+    }
+    Collector collector(realPath(folder).size(), folder.empty() ? "" : folder + "/");
     // As a search does it: what cannot be read is passed over.
     OrvDirectoryWalker walker(ENUM_IGNORE_ALL_ERR, stop_);
-    walker.Walk_FirstFolder_First(folder, root_, realPath(folder), collector, nullptr, folder.empty(), true);
+    walker.Walk_FirstFolder_First(folder, root_, below ? below.path() : root_, collector, nullptr, folder.empty(),
+                                  true);
     std::erase_if(collector.entries,
                   [this](const Entry& entry) { return entry.isFolder() && isRemoteMount(entry.path); });
     return std::move(collector.entries);

@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include "descriptor.h"
 #include "vexo/stat.h"
 
 namespace orvel::ctl {
@@ -23,7 +24,7 @@ enum class Presence { kGone, kThere, kUnknown /* an error keeps from telling */ 
 class ShareFiles {
  public:
     // `root`: real path of the share's root. A nonzero `*stop` ends a listing early.
-    ShareFiles(std::string root, int* stop) : root_(std::move(root)), stop_(stop) {}
+    ShareFiles(std::string root, int* stop);
 
     [[nodiscard]] const std::string& root() const { return root_; }
     [[nodiscard]] std::string realPath(const std::string& path) const {
@@ -31,7 +32,7 @@ class ShareFiles {
     }
 
     // What a walk reports of one folder ("" is the root), without network mounts and without paths too long to be
-    // asked for. Empty when it cannot be read.
+    // asked for. Empty when it cannot be read, or is reached through a link.
     [[nodiscard]] std::vector<Entry> list(const std::string& folder) const;
     // The status of a file or folder.
     [[nodiscard]] Presence status(const std::string& path, _tag_VEXOSTAT_& status) const;
@@ -40,6 +41,7 @@ class ShareFiles {
 
  private:
     std::string root_;
+    cgi::Descriptor opened_;  // the root
     int* stop_;
 };
 
