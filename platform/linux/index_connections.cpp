@@ -36,6 +36,22 @@ struct Entry {
     unsigned long long used;
 };
 
+// For its lifetime the calling thread takes no signals, nor do those that it starts.
+class NoSignals {
+ public:
+    NoSignals() : before_() {
+        sigset_t all;
+        sigfillset(&all);
+        pthread_sigmask(SIG_SETMASK, &all, &before_);
+    }
+    ~NoSignals() { pthread_sigmask(SIG_SETMASK, &before_, nullptr); }
+    NoSignals(const NoSignals&) = delete;
+    NoSignals& operator=(const NoSignals&) = delete;
+
+ private:
+    sigset_t before_;
+};
+
 // What one process has open. It is never destroyed, so that it serves also at exit; a forked child begins with an empty
 // one and leaves its parent's connections alone, as SQLite demands.
 class Connections {
@@ -150,18 +166,14 @@ bool Connections::close(const std::string& path) {
     return done;
 }
 
-// The thread takes no signals: they are for the program.
+// The thread takes no signals: they are for the program, which gets them again also when there is no thread to be had.
 void Connections::startCommitter() {
     if (committer_.joinable()) {
         changed_.notify_one();
         return;
     }
-    sigset_t all;
-    sigset_t before;
-    sigfillset(&all);
-    pthread_sigmask(SIG_SETMASK, &all, &before);
+    const NoSignals quiet;
     committer_ = std::thread([this] { commitOld(); });
-    pthread_sigmask(SIG_SETMASK, &before, nullptr);
 }
 
 void Connections::commitOld() {
