@@ -12,7 +12,7 @@ export class ApiError extends Error {
 
 export const PROGRAMS = "/cgi-bin/";
 
-export function encodeParams(params) {
+function encodeParams(params) {
   const text = new URLSearchParams();
   for (const [name, value] of Object.entries(params)) {
     if (value === undefined || value === null) continue;

@@ -27,6 +27,7 @@ export const browser = {
   mode: pref("mode", "list"),
   sort: pref("sort", { by: "name", ascending: true }),
   filter: "",
+  kind: "all", // of what a search shows: "file", "dir"
   view: null,
 };
 
@@ -104,7 +105,7 @@ function makeListing(id) {
 // What a search has found so far; `extra` of the listing tells whether it goes on.
 function makeResults(id) {
   return new Listing(
-    ["all"],
+    [browser.kind],
     async (filetype, offset, limit, signal) => {
       const reply = await get(
         "search",
@@ -145,8 +146,11 @@ export async function open(id) {
   remember();
   browser.listing?.cancel();
   browser.filter = "";
+  browser.kind = "all";
   browser.id = id;
   if (!isSearch(id)) browser.lastFolder = id;
+  // A folder has no column of folders.
+  if (!isSearch(id) && browser.sort.by === COLUMNS.folder.sort) browser.sort = { by: "name", ascending: true };
   const choice = toChoose ?? (parentOf(from) === id ? from : null);
   toChoose = null;
   emit("place", id);
@@ -200,6 +204,11 @@ export function setSort(by) {
   const ascending = browser.sort.by === by ? !browser.sort.ascending : true;
   browser.sort = { by, ascending };
   setPref("sort", browser.sort);
+  reopen();
+}
+
+export function setKind(kind) {
+  browser.kind = kind;
   reopen();
 }
 

@@ -76,7 +76,7 @@ export function setupDragAndDrop() {
 }
 
 // The folder under the pointer: a row, a tree item, a part of the path, else the folder on screen.
-export function folderUnder(node) {
+function folderUnder(node) {
   const index = browser.view.indexOf(node);
   const entry = index >= 0 ? browser.listing?.item(index) : undefined;
   if (entry?.isFolder) return { id: entry.id, node: browser.view.rowAt(index) };

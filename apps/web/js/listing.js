@@ -5,7 +5,7 @@
 
 import { isAbort } from "./api.js";
 
-export const PAGE = 200;
+const PAGE = 200;
 const AHEAD = 60;
 
 export class Listing {

@@ -1,7 +1,18 @@
 // Starts the page.
 
 import { setupActivity } from "./activity.js";
-import { browser, columns, goUp, loadShares, open, refresh, setFilter, setSort, shareEntry } from "./browser.js";
+import {
+  browser,
+  columns,
+  goUp,
+  loadShares,
+  open,
+  refresh,
+  setFilter,
+  setKind,
+  setSort,
+  shareEntry,
+} from "./browser.js";
 import { context, runCommand } from "./commands.js";
 import { setWhy } from "./dialogs.js";
 import { $, h, loadIcons } from "./dom.js";
@@ -80,15 +91,16 @@ function stateOf(listing) {
     return failedState(listing.error, undefined, { retry: () => open(id), back, why: () => showWhy(id) });
   }
   if (!listing.ready || listing.total > 0) return null;
-  if (isSearch(browser.id) && browser.filter === "")
+  if (isSearch(browser.id) && browser.filter === "" && browser.kind === "all")
     return listing.extra.finished ? nothingMatches(openSearch) : stillSearching();
-  if (browser.filter !== "") return nothingFound(browser.filter, clearFilter);
+  if (browser.filter !== "" || browser.kind !== "all") return nothingFound(browser.filter, clearFilter);
   const { canWrite, inBin } = context();
   return inBin ? emptyBin() : emptyFolder({ canWrite, upload: () => chooseFiles(false), newFolder });
 }
 
 function clearFilter() {
   $("find").value = "";
+  if (browser.kind !== "all") setKind("all");
   setFilter("");
 }
 

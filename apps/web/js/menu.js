@@ -4,7 +4,7 @@ import { h, icon } from "./dom.js";
 
 let current = null;
 
-export function closeMenu() {
+function closeMenu() {
   current?.close();
 }
 

@@ -3,7 +3,7 @@
 import { get, post, PROGRAMS, readReply } from "./api.js";
 import { browser, refresh } from "./browser.js";
 import { askText, dialog, toast, toastFailure } from "./dialogs.js";
-import { $, h, icon, nameNode, plainName } from "./dom.js";
+import { h, icon, nameNode, plainName } from "./dom.js";
 import { entryOf, extensionOf } from "./entries.js";
 import { emit } from "./events.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
@@ -178,8 +178,4 @@ export async function showProperties(what) {
       ),
     ],
   });
-}
-
-export function focusView() {
-  $("view").focus({ preventScroll: true });
 }

@@ -43,7 +43,7 @@ export function emptyBin() {
 }
 
 export function nothingFound(text, clear) {
-  return state("search", t("empty.filter", { text }), t("empty.filter.hint"), [
+  return state("search", text === "" ? t("empty.kind") : t("empty.filter", { text }), t("empty.filter.hint"), [
     { label: t("filter.clear"), run: clear },
   ]);
 }

@@ -1,6 +1,6 @@
 // The bar above the list: what can be done here, or with what is chosen.
 
-import { browser } from "./browser.js";
+import { browser, setKind } from "./browser.js";
 import { command, context, runCommand, shortcutText } from "./commands.js";
 import { $, h, icon, iconButton } from "./dom.js";
 import { on } from "./events.js";
@@ -10,6 +10,8 @@ import { formatSize } from "./format.js";
 import { t } from "./strings.js";
 
 const SORTS = ["name", "size", "mtime", "type", "user"];
+const SORTS_OF_RESULTS = ["name", "ppath", "size", "mtime", "type"];
+const KINDS = ["all", "file", "dir"];
 const ON_CHOSEN = [
   "open",
   "showInFolder",
@@ -34,7 +36,7 @@ export function setupToolbar(setSort) {
   for (const name of ["shown", "selection", "listing", "shares"]) on(name, paint);
 }
 
-export function menuItem(id) {
+function menuItem(id) {
   const found = command(id);
   if (!found?.when(context())) return null;
   return {
@@ -98,6 +100,7 @@ function paintToolbar(setSort) {
     now.count > 0,
     now.count === 1,
     now.search && browser.listing?.extra?.finished,
+    browser.kind,
     now.single?.isFolder,
     now.single?.name,
   ].join("|");
@@ -118,7 +121,7 @@ function paintToolbar(setSort) {
             }),
           ]
         : now.search
-          ? [button("stopSearch"), button("search"), button("closeSearch")]
+          ? [button("stopSearch"), button("search"), kindButton(), button("closeSearch")]
           : [uploadButton(now), button("newFolder"), button("paste"), button("emptyBin")];
     const right = [
       sortButton(setSort),
@@ -160,13 +163,32 @@ function uploadButton({ canWrite }) {
   );
 }
 
+// What of the results is shown.
+function kindButton() {
+  const items = KINDS.map((kind) => ({
+    label: t(`search.type.${kind}`),
+    checked: browser.kind === kind,
+    run: () => setKind(kind),
+  }));
+  return h(
+    "button.button",
+    { type: "button", "aria-haspopup": "menu", onclick: (event) => openMenu(items, { anchor: event.currentTarget }) },
+    icon("filter"),
+    h("span", {}, t(`search.type.${browser.kind}`)),
+  );
+}
+
 function sortButton(setSort) {
   return iconButton(
     "sort",
     t("sort.by", { column: t(`sort.${browser.sort.by}`) }),
     (event) =>
       openMenu(
-        SORTS.map((by) => ({ label: t(`sort.${by}`), checked: browser.sort.by === by, run: () => setSort(by) })),
+        (context().search ? SORTS_OF_RESULTS : SORTS).map((by) => ({
+          label: t(`sort.${by}`),
+          checked: browser.sort.by === by,
+          run: () => setSort(by),
+        })),
         { anchor: event.currentTarget },
       ),
     { id: "sort-button", "aria-haspopup": "menu" },

@@ -17,10 +17,6 @@ const EXISTS = { skip: "skip", overwrite: "overwrite", both: "keep_both" };
 
 let held = null; // {ids, cut}
 
-export function isHeld(id) {
-  return held?.cut === true && held.ids.includes(id);
-}
-
 // Copies or moves ids into a folder; what stands in the way is asked about before anything happens.
 export async function transfer(action, ids, target) {
   const into = ids.find((id) => isWithin(target, id));

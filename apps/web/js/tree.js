@@ -55,7 +55,7 @@ function makeItem(id, label, kind, level, share = null) {
   return item;
 }
 
-export function marksOf(share) {
+function marksOf(share) {
   return [
     isOffline(share) && h("span.tag.warn", { title: t("mark.offline") }, icon("offline")),
     isReadOnlyShare(share) && h("span.tag", { title: t("mark.readonly") }, icon("read-only")),
