@@ -453,6 +453,10 @@ TEST_F(TaskCgi, MovesAreRenamesOrCopiesThatGo) {
         EXPECT_EQ(readFile(other + "/e/sub/y"), "/e/sub/y");
         EXPECT_FALSE(fs::exists(photo_ + "/e")) << "with what is never shown";
         EXPECT_EQ(readFile(other + "/z") + readFile(photo_ + "/stuck/z"), "/stuck/z/stuck/z") << "lost nowhere";
+        if (mount("none", (video_ + "/d").c_str(), "tmpfs", 0, "mode=0777") != 0) return support::kNoPrivateMounts;
+        writeFile(video_ + "/d/theirs", "x", 0666);
+        EXPECT_EQ(errors(perform("alice", "action=delete" + about({"/video/d"}))), "/video/d 421\n");
+        EXPECT_EQ(readFile(video_ + "/d/theirs"), "x") << "mounted ones stay";
         return 0;
     }));
 }

@@ -19,12 +19,14 @@ bool failed(const Entry& entry, Progress& progress, int error) {
 
 constexpr int kDeepest = 3000;  // each level costs a descriptor and some of the stack
 
-void removeQuietly(int folder, const std::string& name, int depth) {
+void removeQuietly(int folder, const std::string& name, dev_t device, int depth) {
     if (unlinkat(folder, name.c_str(), 0) == 0 || depth == kDeepest) return;
     const Descriptor inside(openat(folder, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    struct stat status {};
     std::vector<std::string> names;
-    if (!inside || !namesIn(inside.get(), Hidden::kInclude, names)) return;
-    for (const std::string& child : names) removeQuietly(inside.get(), child, depth + 1);
+    if (!inside || fstat(inside.get(), &status) != 0 || status.st_dev != device) return;
+    if (!namesIn(inside.get(), Hidden::kInclude, names)) return;
+    for (const std::string& child : names) removeQuietly(inside.get(), child, device, depth + 1);
     unlinkat(folder, name.c_str(), AT_REMOVEDIR);
 }
 
@@ -45,7 +47,7 @@ bool emptyFolder(const Entry& entry, dev_t device, int depth, Progress& progress
     for (const std::string& name : names) {
         if (progress.stopped()) return false;
         if (VEXOEAIsHiddenFile(name.c_str()) != 0) {
-            removeQuietly(folder.get(), name, depth);
+            removeQuietly(folder.get(), name, device, depth);
         } else {
             all = removeIn(entry.child(folder.get(), name), device, depth + 1, progress) && all;
         }
@@ -74,18 +76,18 @@ bool removeIn(const Entry& entry, dev_t device, int depth, Progress& progress) {
 
 bool removeTree(const Entry& entry, Progress& progress) {
     struct stat status {};
-    if (fstatat(entry.folder, entry.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
-        return failed(entry, progress, errno);
-    }
+    // Its folder's, since the entry itself may be where another file system is mounted.
+    if (fstat(entry.folder, &status) != 0) return failed(entry, progress, errno);
     return removeIn(entry, status.st_dev, 0, progress);
 }
 
 void removeHidden(const Entry& entry) {
     const Descriptor folder(openat(entry.folder, entry.name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    struct stat status {};
     std::vector<std::string> names;
-    if (!folder || !namesIn(folder.get(), Hidden::kInclude, names)) return;
+    if (!folder || fstat(folder.get(), &status) != 0 || !namesIn(folder.get(), Hidden::kInclude, names)) return;
     for (const std::string& name : names) {
-        if (VEXOEAIsHiddenFile(name.c_str()) != 0) removeQuietly(folder.get(), name, 0);
+        if (VEXOEAIsHiddenFile(name.c_str()) != 0) removeQuietly(folder.get(), name, status.st_dev, 0);
     }
 }
 
