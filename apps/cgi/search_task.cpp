@@ -16,7 +16,8 @@ namespace {
 
 constexpr const char* kPrefix = "Quorvane_Search_";
 constexpr size_t kLongestId = 16;  // two numbers of 32 bits
-constexpr long long kKept = 2LL * 24 * 60 * 60;
+// A minute less than CleanTimeOutTasks keeps their records: without those nobody would find the results any more.
+constexpr unsigned long long kKept = 2ULL * 24 * 60 * 60 - 60;
 constexpr int kPatience = 2000;  // milliseconds
 
 // The C library's own declarations lack C linkage in some of its versions.
@@ -31,6 +32,13 @@ void send(const Descriptor& process, int signal) {
 bool hasEnded(const Descriptor& process, int milliseconds) {
     pollfd watched = {process.get(), POLLIN, 0};
     return poll(&watched, 1, milliseconds) == 1;
+}
+
+// A time as far in the future counts, too; it is what a record claims.
+bool isOld(long long created) {
+    const long long now = time(nullptr);
+    const auto a = static_cast<unsigned long long>(now), b = static_cast<unsigned long long>(created);
+    return (now > created ? a - b : b - a) >= kKept;
 }
 
 }  // namespace
@@ -78,12 +86,11 @@ bool removeTask(const SearchTask& task) {
 void sweepTasks(const std::string& user) {
     Json::Value names(Json::arrayValue);
     if (!KTR::TaskMgr(user.c_str()).getAllTaskId(kPrefix, names)) return;
-    const long long now = time(nullptr);
     for (const Json::Value& name : names) {
         const std::string id = name.asString().substr(std::string(kPrefix).size());
         SearchTask task;
         if (!isTaskId(id) || findTask(user, id, task) != ORV_ERR_NONE) continue;
-        if (task.record->isFinished() && task.record->getCreateTime() < now - kKept) removeTask(task);
+        if (task.record->isFinished() && isOld(task.record->getCreateTime())) removeTask(task);
     }
 }
 

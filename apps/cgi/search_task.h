@@ -35,7 +35,7 @@ bool endWork(KTR::Task& record, bool forGood);
 // Removes database and record. False when the record stays.
 bool removeTask(const SearchTask& task);
 
-// Removes the user's searches that ended and began more than two days ago.
+// Removes the searches of the user that ended and whose beginning lies nearly two days away.
 void sweepTasks(const std::string& user);
 
 }  // namespace orvel::cgi
