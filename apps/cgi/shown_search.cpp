@@ -53,8 +53,12 @@ void ShownSearch::moved(const ChangedFile& from, const ChangedFile& to) {
     _tag_VEXOSTAT_ status;
     if (task_.results == nullptr) return;
     const std::string source = rowPath(from), target = rowPath(to);
-    if (source.empty() || target.empty() || !statusOf(target, status)) return;
+    if (source.empty()) return;
     const std::string sourceShare = definedShareName(from.info.shareName);
+    if (target.empty() || !statusOf(target, status)) {  // whatever became of it, it is there no more
+        task_.results->delRecs(sourceShare, source);
+        return;
+    }
     const std::string targetShare = definedShareName(to.info.shareName);
     task_.results->updateFile(sourceShare, source, targetShare, target, status);
     if (S_ISDIR(status.st_mode)) task_.results->updateFileInFolder(sourceShare, source, targetShare, target);

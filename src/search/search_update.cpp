@@ -127,16 +127,16 @@ bool OrvSearchDBTask::updateFileInFolder(std::string shareName, std::string path
         const RecordCondition below(from, Reach::kBelow);
         if (!ResultDatabase(filePath_).select(below, collect, &records) || !records.complete) return false;
         const std::size_t prefix = from.within.empty() ? 0 : from.within.size() + 1;
+        bool all = true;  // one that cannot be moved keeps no other from it
         for (MovedRecord& record : records.list) {
             const std::string target = to.realPath + "/" + record.within.substr(prefix);
             _tag_VEXOSTAT_ present{};
             const bool readable = VLIBCFileLStat(target.c_str(), kStatusFlags, &present) >= 0;
-            if (!updateFile(from.share, from.shareRoot + "/" + record.within, to.share, target,
-                            readable ? present : record.status)) {
-                return false;
-            }
+            all = updateFile(from.share, from.shareRoot + "/" + record.within, to.share, target,
+                             readable ? present : record.status) &&
+                  all;
         }
-        return true;
+        return all;
     });
 }
 
