@@ -1,19 +1,17 @@
 // Where one is: the folder on screen, its listing, what is chosen in it.
 
-import { ApiError, get } from "./api.js";
+import { get } from "./api.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { emit } from "./events.js";
-import { Listing } from "./listing.js";
 import { isSearch, normalisePlace, parentOf } from "./path.js";
 import { pref, setPref } from "./prefs.js";
 import { COLUMNS } from "./rows.js";
 import { Selection } from "./selection.js";
+import { folderListing, searchResults } from "./sources.js";
 import { t } from "./strings.js";
 
-const ADDITIONAL = "size,time,owner,perm,mount_point_type";
 const FIRST_LOOK = 60;
-const GONE = 408;
 // Most folders are there within this; only slower ones show that something is going on.
 const PATIENCE = 150;
 
@@ -74,62 +72,6 @@ function columns() {
   );
 }
 
-// Folders come first whichever way the rest is sorted: descending, they are a list of their own.
-function makeListing(id) {
-  const parts = browser.sort.ascending ? ["all"] : ["dir", "file"];
-  const pattern = browser.filter === "" ? undefined : `*${browser.filter.replace(/[,\\]/g, "?")}*`;
-  return new Listing(
-    parts,
-    async (filetype, offset, limit, signal) => {
-      const reply = await get(
-        "list",
-        {
-          action: "folder",
-          path_raw: id,
-          filetype,
-          offset,
-          limit,
-          pattern,
-          additional: ADDITIONAL,
-          sort_by: browser.sort.by,
-          sort_direction: browser.sort.ascending ? "asc" : "desc",
-        },
-        signal,
-      );
-      return { total: reply.total, items: reply.items.map(entryOf) };
-    },
-    changed,
-  );
-}
-
-// What a search has found so far; `extra` of the listing tells whether it goes on.
-function makeResults(id) {
-  return new Listing(
-    [browser.kind],
-    async (filetype, offset, limit, signal) => {
-      const reply = await get(
-        "search",
-        {
-          action: "list",
-          taskid: id.slice(1),
-          filetype,
-          offset,
-          limit,
-          filter: browser.filter || undefined,
-          additional: ADDITIONAL,
-          sort_by: browser.sort.by,
-          sort_direction: browser.sort.ascending ? "asc" : "desc",
-        },
-        signal,
-      ).catch((failure) => {
-        throw failure.code === GONE ? new ApiError({ key: "page:search_gone" }) : failure;
-      });
-      return { ...reply, items: reply.items.map(entryOf) };
-    },
-    changed,
-  );
-}
-
 function changed(listing) {
   if (listing !== browser.listing) return;
   emit("listing");
@@ -165,7 +107,7 @@ export async function open(id) {
 }
 
 async function show(id, mine, cameFrom) {
-  const listing = isSearch(id) ? makeResults(id) : makeListing(id);
+  const listing = isSearch(id) ? searchResults(id.slice(1), browser, changed) : folderListing(id, browser, changed);
   const saved = remembered.get(id);
   await Promise.race([listing.need(0, FIRST_LOOK), new Promise((resolve) => setTimeout(resolve, PATIENCE))]);
   if (mine !== turn) return listing.cancel();
