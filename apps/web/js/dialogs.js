@@ -87,6 +87,8 @@ export function askText({ title, label, value = "", selectTo = null, action, che
 
 // Buttons: [{label, value, kind}]; the last one is the default.
 export function choose({ title, body, buttons, className }) {
+  // What cannot be undone is not what Enter does by itself.
+  const careful = buttons.some((button) => button.kind === "danger");
   return dialog({
     title,
     className,
@@ -95,10 +97,10 @@ export function choose({ title, body, buttons, className }) {
       h(
         "footer",
         {},
-        buttons.map((button) =>
+        buttons.map((button, i) =>
           h(
             `button.button${button.kind ? `.${button.kind}` : ""}`,
-            { type: "button", onclick: () => close(button.value) },
+            { type: "button", autofocus: careful && i === 0, onclick: () => close(button.value) },
             button.label,
           ),
         ),
@@ -150,6 +152,10 @@ export function toast({ text, hint = "", kind = "", actions = [], life = kind ==
   rack.append(node);
   while (rack.children.length > 3) rack.firstChild.remove();
   setTimeout(remove, life);
+}
+
+export function dismissToasts() {
+  document.getElementById("toasts").replaceChildren();
 }
 
 // `id` is what the failure was about, for asking why.

@@ -3,7 +3,7 @@
 import { browser, selectedEntries } from "./browser.js";
 import { addCommand } from "./commands.js";
 import { askConflict, takenNames } from "./conflicts.js";
-import { askText, confirm, toast, toastFailure } from "./dialogs.js";
+import { askText, confirm, dismissToasts, toast, toastFailure } from "./dialogs.js";
 import { emit } from "./events.js";
 import { checkName } from "./operations.js";
 import { childOf, encodeName, isSearch, isWithin, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
@@ -60,6 +60,7 @@ async function hold(cut) {
 async function paste() {
   const { ids, cut } = held;
   if (cut) held = null;
+  dismissToasts();
   await transfer(cut ? "move" : "copy", ids, browser.id);
 }
 
