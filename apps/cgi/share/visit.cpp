@@ -37,7 +37,7 @@ std::string harmless(std::string path) {
     // U+2028 and U+2029 end a line of a script.
     for (const char* separator : {"\xE2\x80\xA8", "\xE2\x80\xA9"}) {
         for (size_t at = path.find(separator); at != std::string::npos; at = path.find(separator)) {
-            path.replace(at, 3, "_");
+            path.replace(at, 3, 1, '_');
         }
     }
     return path;
