@@ -346,8 +346,8 @@ TEST_F(SearchCgi, ARunningSearchIsReadStoppedKilledAndCleaned) {
     SKIP_WITHOUT_ROOT();
     const std::string front = shareRoot("photo") + "/many/" + std::string(200, 'a');
     for (int i = 0; i < 3000; ++i) writeFile(front + std::to_string(i), "");
-    std::string hard = "b", patterns = "a";
-    while (hard.size() < 488) hard.insert(0, "*a");
+    const std::string hard = "*" + std::string(100, 'a') + "b*";
+    std::string patterns = "a";
     for (int i = 0; i < 99; ++i) patterns += "," + hard;
     std::string id;
     pid_t worker = 0;
@@ -357,11 +357,11 @@ TEST_F(SearchCgi, ARunningSearchIsReadStoppedKilledAndCleaned) {
         const Json::Value data = await("alice", id, some).json["data"];
         EXPECT_FALSE(data["finished"].asBool());
         worker = record("alice", id)->getWorker();
-        EXPECT_GT(worker, 0);
         return data["total"].asUInt();
     };
 
     unsigned before = begin();
+    ASSERT_GT(worker, 0);
     for (const std::string action : {"list", "stop", "clean"}) {
         std::string form = "action=" + action;
         EXPECT_EQ(code(ask("bob", form += "&taskid=" + id)), 408) << "of another user";
@@ -375,6 +375,7 @@ TEST_F(SearchCgi, ARunningSearchIsReadStoppedKilledAndCleaned) {
     EXPECT_TRUE(ask("alice", "action=stop&taskid=" + id).json["data"]["finished"].asBool()) << "again";
 
     before = begin();
+    ASSERT_GT(worker, 0);
     EXPECT_EQ(kill(worker, SIGKILL), 0);
     after = finished("alice", id).json["data"];
     EXPECT_EQ(after["failure"]["code"], 401);
@@ -382,6 +383,7 @@ TEST_F(SearchCgi, ARunningSearchIsReadStoppedKilledAndCleaned) {
     EXPECT_EQ(after["items"].size(), after["total"].asUInt());
 
     begin();
+    ASSERT_GT(worker, 0);
     EXPECT_TRUE(ask("alice", "action=clean&taskid=" + id).json["success"].asBool());
     EXPECT_FALSE(fs::exists("/proc/" + std::to_string(worker) + "/exe"));
     EXPECT_FALSE(fs::exists(database("alice", id)) || fs::exists(database("alice", id + "-journal")));
