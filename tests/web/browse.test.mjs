@@ -92,6 +92,35 @@ test("a folder of 100,000: first view, its end, everything chosen", () =>
     await page.waitForSelector("#status >> text=100,000 selected");
   }));
 
+test("a list of a million rows reaches its end", () =>
+  withPage(chrome, "alice", { path: "/" }, async (page) => {
+    const total = 1_000_000;
+    await page.route("**/cgi-bin/list?*warehouse*", (route) => {
+      const params = new URL(route.request().url()).searchParams;
+      const offset = Number(params.get("offset"));
+      const items = Array.from({ length: Math.min(Number(params.get("limit")), total - offset) }, (_, i) => ({
+        name: `row ${offset + i}`,
+        path: `/warehouse/row ${offset + i}`,
+        isdir: false,
+      }));
+      return route.fulfill({ json: { success: true, data: { total, offset, items } } });
+    });
+    await page.click("#tree >> text=warehouse");
+    await page.waitForSelector("#view >> text=/^row 0$/");
+    await page.press("#view", "End");
+    const last = page.locator("#view .row.cursor", { hasText: `row ${total - 1}` });
+    await last.waitFor();
+    const [row, view] = [await last.boundingBox(), await page.locator("#view").boundingBox()];
+    assert.ok(row.y + row.height <= view.y + view.height + 1);
+    for (let i = 0; i < 3; ++i) await page.press("#view", "PageUp");
+    await page.waitForSelector("#view .row.cursor");
+    assert.ok(await page.locator("#view .row.cursor").isVisible());
+    await page.locator("#view").evaluate((node) => {
+      node.scrollTop = node.scrollHeight / 2;
+    });
+    await page.waitForSelector("#view >> text=/^row (49|50)\\d{4}$/");
+  }));
+
 test("names that programs stumble over", () =>
   withPage(chrome, "alice", { path: "/worldwide", viewport: { width: 1280, height: 2000 } }, async (page) => {
     const shown = await page

@@ -56,8 +56,8 @@ export class View {
   measure() {
     const { across, height, width } = this.shape;
     const lines = Math.ceil(this.count / across);
-    const headerHeight = this.header?.offsetHeight ?? 0;
-    const room = this.root.clientHeight - headerHeight;
+    // Below the header, which stays in sight, and its margin.
+    const room = this.root.clientHeight - this.canvas.offsetTop;
     const whole = lines * height;
     const shown = Math.min(whole, TALLEST);
     const scale = shown > room ? (whole - room) / (shown - room) : 1;
