@@ -19,9 +19,9 @@ class MakeFolderTest : public ApplianceTest {
     static std::string expected(uid_t uid, mode_t mode) {
         return std::to_string(uid) + (uid == 0 ? " " : " users ") + std::to_string(S_IFDIR | mode);
     }
-    int make(const std::string& path, uid_t uid, mode_t mode, int recursive = 1, const char** stopAt = nullptr) {
+    int make(const std::string& path, uid_t uid, mode_t mode, int recursive = 1) {
         const gid_t gid = uid == kKeepUser ? kKeepGroup : gid_t{kUsersGid};
-        return VEXOFSMkdirP((root_ + path).c_str(), stopAt, recursive, uid, gid, mode);
+        return VEXOFSMkdirP((root_ + path).c_str(), nullptr, recursive, uid, gid, mode);
     }
     std::string root_ = shareRoot("photo");
 };
@@ -72,7 +72,8 @@ TEST_F(MakeFolderTest, AFolderThatCannotBeHandedOverIsNotLeft) {
     SKIP_WITHOUT_ROOT();
     const auto body = [&] {
         const char* stopAt = "";
-        EXPECT_FAILS(make("/mine", kBobUid, 0755, 1, &stopAt), EPERM, VEXO_ERR_DENIED);
+        const std::string path = root_ + "/mine";
+        EXPECT_FAILS(VEXOFSMkdirP(path.c_str(), &stopAt, 1, kBobUid, kUsersGid, 0755), EPERM, VEXO_ERR_DENIED);
         EXPECT_STREQ(stopAt, "mine");
         EXPECT_FALSE(fs::exists(root_ + "/mine"));
         return make("/mine", kAliceUid, 0700);
