@@ -3,6 +3,12 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 
+#include <cerrno>
+#include <climits>
+#include <exception>
+#include <utility>
+#include <vector>
+
 #include "confined.h"
 #include "orvel/user_directory.h"
 #include "vexo/stat.h"
@@ -22,6 +28,24 @@ std::string rowPath(const ChangedFile& file) {
 
 bool statusOf(const std::string& path, _tag_VEXOSTAT_& status) {
     return VLIBCFileLStat(path.c_str(), VEXO_STAT_BASIC | VEXO_STAT_CREATE_TIME, &status) >= 0;
+}
+
+// The rows whose files are gone from a folder.
+struct GoneRows {
+    std::string below;                                      // the folder's path and "/"
+    std::vector<std::pair<std::string, std::string>> list;  // share, path
+};
+
+BOOL collectGone(__tag_FI_FILE_INFO_DATA* row, void* gone) try {
+    auto& rows = *static_cast<GoneRows*>(gone);
+    const std::string path = std::string(row->szShareRoot) + "/" + row->szPath;
+    struct stat status {};
+    if (path.starts_with(rows.below) && lstat(path.c_str(), &status) != 0 && (errno == ENOENT || errno == ENOTDIR)) {
+        rows.list.emplace_back(row->szShare, path);
+    }
+    return 1;
+} catch (const std::exception&) {
+    return 0;
 }
 
 }  // namespace
@@ -47,6 +71,17 @@ void ShownSearch::removed(const ChangedFile& file) {
     if (task_.results == nullptr) return;
     const std::string path = rowPath(file);
     if (!path.empty()) task_.results->delRecs(definedShareName(file.info.shareName), path);
+}
+
+void ShownSearch::reduced(const ChangedFile& folder) {
+    if (task_.results == nullptr) return;
+    GoneRows gone;
+    gone.below = rowPath(folder) + "/";
+    FIQUERY everyRow{};
+    everyRow.limit = ULONG_MAX;
+    // A database that is read is not written to: first all of them.
+    if (FILEIDXDBSelect(task_.results->getDBTaskFilePath(), &everyRow, collectGone, &gone) < 0) return;
+    for (const auto& [share, path] : gone.list) task_.results->delRecs(share, path);
 }
 
 void ShownSearch::moved(const ChangedFile& from, const ChangedFile& to) {

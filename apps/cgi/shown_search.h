@@ -28,6 +28,8 @@ class ShownSearch {
     void added(const ChangedFile& file);
     // It is gone, with everything below it.
     void removed(const ChangedFile& file);
+    // Some of what is below it may be gone.
+    void reduced(const ChangedFile& folder);
     // What was `from` is `to` now, with everything below it.
     void moved(const ChangedFile& from, const ChangedFile& to);
 

@@ -1,9 +1,9 @@
+#include "operation/change_notices.h"
 #include "operation/operation.h"
 #include "operation/recycle.h"
 #include "operation/task_start.h"
 #include "operation/transfer.h"
 #include "operation/tree_remove.h"
-#include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 
 namespace orvel::cgi {
@@ -52,7 +52,7 @@ bool recycle(const RecycleBin& bin, const Item& item, const Owner& owner, Progre
 void run(const Operation& operation, bool permanent, Progress& progress) {
     const std::string& user = operation.user.name;
     const Owner owner = ownerFor(user);
-    ShownSearch search(user, operation.web.GetParam("taskid", ""));
+    ChangeNotices notices(operation);
     expectAll(operation, permanent, progress);
     for (const std::string& path : operation.paths) {
         if (progress.stopped()) return;
@@ -63,10 +63,11 @@ void run(const Operation& operation, bool permanent, Progress& progress) {
             progress.failed(path, code);
             continue;
         }
+        const long long before = progress.itemsDone();
         const bool gone = bin ? recycle(*bin, item, owner, progress) : removeTree(item.entry(), progress);
-        if (!gone) continue;
-        OrvLibDoLog(user, item.info.path, 0, ORVEL_ACTION_DELETE, false);
-        search.removed(item.changed());
+        if (gone || progress.itemsDone() != before) {
+            notices.deleted(item.info.path, item.changed(), gone);
+        }
     }
 }
 

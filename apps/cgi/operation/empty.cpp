@@ -3,11 +3,11 @@
 #include <cerrno>
 
 #include "folder_names.h"
+#include "operation/change_notices.h"
 #include "operation/operation.h"
 #include "operation/recycle.h"
 #include "operation/task_start.h"
 #include "operation/tree_remove.h"
-#include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 
 namespace orvel::cgi {
@@ -36,7 +36,7 @@ bool look(const RecycleBin& bin, Item& item) {
 }
 
 void run(const Operation& operation, const RecycleBin& bin, const PathInfo& info, Progress& progress) {
-    ShownSearch search(operation.user.name, operation.web.GetParam("taskid", ""));
+    ChangeNotices notices(operation);
     std::vector<Item> items = itemsIn(bin, info, progress);
     for (Item& item : items) {
         if (!progress.stopped() && look(bin, item)) measure(item, progress);
@@ -44,9 +44,11 @@ void run(const Operation& operation, const RecycleBin& bin, const PathInfo& info
     }
     for (const Item& item : items) {
         if (progress.stopped()) return;
-        if (!removeTree({bin.folder().get(), item.place.name, item.info.path}, progress)) continue;
-        OrvLibDoLog(operation.user.name, item.info.path, 0, ORVEL_ACTION_DELETE, false);
-        search.removed({info, bin.folder(), item.place.name});
+        const long long before = progress.itemsDone();
+        const bool gone = removeTree({bin.folder().get(), item.place.name, item.info.path}, progress);
+        if (gone || progress.itemsDone() != before) {
+            notices.deleted(item.info.path, {info, bin.folder(), item.place.name}, gone);
+        }
     }
 }
 

@@ -1,9 +1,9 @@
+#include "operation/change_notices.h"
 #include "operation/operation.h"
 #include "operation/recycle.h"
 #include "operation/task_start.h"
 #include "operation/transfer.h"
 #include "operation/transfer_job.h"
-#include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 #include "vexo/filesystem.h"
 
@@ -22,7 +22,7 @@ int openOrigin(const User& user, const std::string& path, Conflict& conflict, Pa
     return openTarget(info, linkPolicyOf(info.shareName), user.name, Missing::kMake, place);
 }
 
-void restoreOne(const Operation& operation, const std::string& path, Conflict conflict, ShownSearch& search,
+void restoreOne(const Operation& operation, const std::string& path, Conflict conflict, ChangeNotices& notices,
                 Progress& progress) {
     const User& user = operation.user;
     Item item;
@@ -37,10 +37,11 @@ void restoreOne(const Operation& operation, const std::string& path, Conflict co
 
     Transfer transfer(progress, {.conflict = conflict, .move = true, .owner = ownerFor(user.name), .onFat = false});
     Entry to = {place.folder.get(), place.name, info.path};
-    if (!transfer.run(item, to)) return removeMadeFolders(place);
-    OrvLibDoLog(user.name, item.info.path, transfer.bytes(), ORVEL_ACTION_MOVE, false);
-    search.moved(item.changed(), {info, place.folder, to.name});
-    bin->prune(item);
+    const long long before = progress.itemsDone();
+    const bool whole = transfer.run(item, to);
+    if (!whole && transfer.bytes() == 0 && progress.itemsDone() == before) return removeMadeFolders(place);
+    notices.moved(item, {info, place.folder, to.name}, transfer.bytes(), whole);
+    if (whole) bin->prune(item);
 }
 
 }  // namespace
@@ -49,10 +50,10 @@ int restoreOperation(Operation& operation) {
     const auto conflict = conflictOf(operation.web.GetParam("conflict", "error"));
     if (!conflict) return ORV_ERR_PARAMETER;
     return startTask(operation, "restore", [&](Progress& progress) {
-        ShownSearch search(operation.user.name, operation.web.GetParam("taskid", ""));
+        ChangeNotices notices(operation);
         progress.expect(static_cast<long long>(operation.paths.size()), 0);
         for (const std::string& path : operation.paths) {
-            if (!progress.stopped()) restoreOne(operation, path, *conflict, search, progress);
+            if (!progress.stopped()) restoreOne(operation, path, *conflict, notices, progress);
         }
     });
 }

@@ -1,9 +1,8 @@
 #include "operation/transfer_job.h"
 
-#include "operation/item.h"
+#include "operation/change_notices.h"
 #include "operation/task_start.h"
 #include "operation/transfer.h"
-#include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 #include "orvel/name_check.h"
 #include "orvel/privilege.h"
@@ -48,19 +47,8 @@ void expectAll(const Job& job, Progress& progress) {
     }
 }
 
-void tell(const Job& job, const Item& item, const Entry& made, long long bytes, ShownSearch& search) {
-    OrvLibDoLog(job.operation.user.name, item.info.path, bytes, job.move ? ORVEL_ACTION_MOVE : ORVEL_ACTION_COPY,
-                false);
-    const ChangedFile there = {job.info, job.folder, made.name};
-    if (job.move) {
-        search.moved(item.changed(), there);
-    } else {
-        search.added(there);
-    }
-}
-
 void run(const Job& job, Progress& progress) {
-    ShownSearch search(job.operation.user.name, job.operation.web.GetParam("taskid", ""));
+    ChangeNotices notices(job.operation);
     expectAll(job, progress);
     Transfer transfer(progress, {.conflict = job.conflict,
                                  .move = job.move,
@@ -76,7 +64,15 @@ void run(const Job& job, Progress& progress) {
             continue;
         }
         Entry to = {job.folder.get(), item.place.name, job.info.path + "/" + item.place.name};
-        if (transfer.run(item, to)) tell(job, item, to, transfer.bytes(), search);
+        const long long before = progress.itemsDone();
+        const bool whole = transfer.run(item, to);
+        if (!whole && transfer.bytes() == 0 && progress.itemsDone() == before) continue;
+        const ChangedFile there = {job.info, job.folder, to.name};
+        if (job.move) {
+            notices.moved(item, there, transfer.bytes(), whole);
+        } else {
+            notices.copied(item, there, transfer.bytes());
+        }
     }
 }
 

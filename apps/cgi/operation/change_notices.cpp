@@ -1,0 +1,34 @@
+#include "operation/change_notices.h"
+
+#include "orvel/activity_log.h"
+
+namespace orvel::cgi {
+
+ChangeNotices::ChangeNotices(const Operation& operation)
+    : user_(operation.user.name), search_(user_, operation.web.GetParam("taskid", "")) {}
+
+void ChangeNotices::deleted(const std::string& path, const ChangedFile& file, bool whole) {
+    OrvLibDoLog(user_, path, 0, ORVEL_ACTION_DELETE, false);
+    if (whole) {
+        search_.removed(file);
+    } else {
+        search_.reduced(file);
+    }
+}
+
+void ChangeNotices::copied(const Item& from, const ChangedFile& to, long long bytes) {
+    OrvLibDoLog(user_, from.info.path, bytes, ORVEL_ACTION_COPY, false);
+    search_.added(to);
+}
+
+void ChangeNotices::moved(const Item& from, const ChangedFile& to, long long bytes, bool whole) {
+    OrvLibDoLog(user_, from.info.path, bytes, ORVEL_ACTION_MOVE, false);
+    if (whole) {
+        search_.moved(from.changed(), to);
+    } else {
+        search_.added(to);
+        search_.reduced(from.changed());
+    }
+}
+
+}  // namespace orvel::cgi

@@ -1,0 +1,30 @@
+// Who is told once an operation has changed files: the transfer log, and the search that the user has on screen.
+#ifndef ORVEL_CGI_OPERATION_CHANGE_NOTICES_H
+#define ORVEL_CGI_OPERATION_CHANGE_NOTICES_H
+
+#include <string>
+
+#include "operation/item.h"
+#include "operation/operation.h"
+#include "shown_search.h"
+
+namespace orvel::cgi {
+
+// `whole`: false when some of the item failed, or was not reached, but not all of it.
+class ChangeNotices {
+ public:
+    explicit ChangeNotices(const Operation& operation);
+
+    // `path`: the share-relative path of `file`.
+    void deleted(const std::string& path, const ChangedFile& file, bool whole);
+    void copied(const Item& from, const ChangedFile& to, long long bytes);
+    void moved(const Item& from, const ChangedFile& to, long long bytes, bool whole);
+
+ private:
+    const std::string& user_;
+    ShownSearch search_;
+};
+
+}  // namespace orvel::cgi
+
+#endif
