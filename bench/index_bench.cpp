@@ -145,7 +145,7 @@ int searchIndex(const std::string& folder, const std::string& pattern) {
     FIQUERY query{};
     unsigned long long count = 0;
     need(FILEIDXCountGet(out.c_str(), &query, &count) == 0, "counting");
-    fprintf(stderr, "%llu\n", count);
+    need(count > 0, "finding");
     return 0;
 }
 
