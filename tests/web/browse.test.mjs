@@ -251,7 +251,10 @@ test("mounts, shares that do not answer, slow and broken servers", () =>
         await route.continue();
       });
       await page.click("#tree >> text=warehouse");
-      await page.waitForSelector("#view .row.waiting");
+      await page.waitForFunction(() => {
+        const bone = document.querySelector("#view .row.waiting .bone");
+        return bone && getComputedStyle(bone).opacity === "1";
+      });
       await screenshot(page, "waiting");
       answer();
       await page.waitForSelector("#view >> text=item-00000.dat");

@@ -41,6 +41,7 @@ test("a folder with a password, opened elsewhere, then revoked", () =>
     const address = await makeLink(page, "house", "let me in");
     await visit(address, async (visitor, status, wrong) => {
       assert.equal(status, 200);
+      await screenshot(visitor, "visitor-door");
       await visitor.fill("input[type=password]", "let me out");
       await visitor.keyboard.press("Enter");
       await visitor.waitForFunction(() => document.querySelector(".wrong")?.textContent.trim());
@@ -79,7 +80,8 @@ test("names of markup reach a visitor as text", () =>
     await visit(address, async (visitor, status, wrong) => {
       assert.equal(status, 200);
       await visitor.waitForSelector("text=<img src=x onerror=alert(1)>.txt");
-      assert.equal(await visitor.locator("img").count(), 0);
+      assert.equal(await visitor.locator("main img").count(), 0);
+      await screenshot(visitor, "visitor-file");
       assert.deepEqual(wrong, []);
     });
   }));

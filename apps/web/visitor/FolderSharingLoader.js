@@ -68,16 +68,38 @@
         input.select();
       }
     }, make("label", { for: "password" }, texts.password), input, button, wrong);
-    show(make("h1", {}, texts.title), form);
+    show(make("div", { class: "door" }, make("h1", {}, texts.title), form));
     input.focus();
   }
 
   function sizeText(bytes) {
     const units = ["B", "KB", "MB", "GB", "TB"];
     let unit = 0;
-    while (bytes >= 1000 && unit < units.length - 1) { bytes /= 1000; unit += 1; }
-    const digits = unit === 0 ? 0 : 1;
+    while (bytes >= 1000 && unit < units.length - 1) { bytes /= 1024; unit += 1; }
+    const digits = unit === 0 || bytes >= 100 ? 0 : bytes >= 10 ? 1 : 2;
     return new Intl.NumberFormat(g_Lang, { maximumFractionDigits: digits }).format(bytes) + " " + units[unit];
+  }
+
+  function dayText(time) {
+    if (!time) return "";
+    return new Date(time.mtime * 1000).toLocaleDateString(g_Lang, { day: "numeric", month: "short", year: "numeric" });
+  }
+
+  const shapes = {
+    folder: "M3 7a2 2 0 0 1 2-2h4.2l2 2.2H19a2 2 0 0 1 2 2V17a2 2 0 0 1-2 2H5a2 2 0 0 1-2-2z",
+    file: "M6 3.5h7.5L18.5 8.5V20a.5.5 0 0 1-.5.5H6a.5.5 0 0 1-.5-.5V4a.5.5 0 0 1 .5-.5zM13.5 3.5V8.5H18.5"
+  };
+
+  function picture(kind) {
+    const space = "http://www.w3.org/2000/svg";
+    const drawing = document.createElementNS(space, "svg");
+    for (const [name, value] of Object.entries({ viewBox: "0 0 24 24", class: "picture " + kind, "aria-hidden": "true" })) {
+      drawing.setAttribute(name, value);
+    }
+    const shape = document.createElementNS(space, "path");
+    shape.setAttribute("d", shapes[kind]);
+    drawing.append(shape);
+    return drawing;
   }
 
   function row(item) {
@@ -85,9 +107,9 @@
     const name = item.isdir
       ? make("a", { href: "#" + encodeURIComponent(JSON.stringify(pathField(item))), class: "folder" }, make("bdi", {}, item.name))
       : make("a", { href: address({ action: "download", ...pathField(item) }), download: "" }, make("bdi", {}, item.name));
-    const changed = more.time ? new Date(more.time.mtime * 1000).toLocaleString(g_Lang) : "";
-    return make("tr", {}, make("td", {}, name), make("td", { class: "size" }, item.isdir ? "" : sizeText(more.size || 0)),
-      make("td", { class: "time" }, changed));
+    const size = item.isdir ? "" : sizeText(more.size || 0);
+    return make("tr", {}, make("td", { class: "name" }, picture(item.isdir ? "folder" : "file"), name),
+      make("td", { class: "size" }, size), make("td", { class: "time" }, dayText(more.time)));
   }
 
   function table(data, path) {
@@ -114,6 +136,13 @@
     return ask({ action: "list", additional: "size,time", limit: definitions.pageSize, offset, ...path });
   }
 
+  function showFile(place, item, button) {
+    const more = (item && item.additional) || {};
+    const about = [sizeText(more.size || 0), dayText(more.time)].filter((text) => text !== "").join(" · ");
+    show(make("div", { class: "single" }, picture("file"), make("h1", {}, make("bdi", {}, place.name)),
+      make("p", { class: "about" }, about), button));
+  }
+
   // The page logs in by itself where no password is asked, unless its session has ended since.
   async function open(path) {
     const state = await ask({ action: "state" }).catch(() => ({ status: 500 }));
@@ -126,16 +155,16 @@
     const { status, json } = await list(path, 0).catch(() => ({ status: 500 }));
     if (status !== 200) return noticeOf(status);
     if (!json.success) return noticeOf(404);
-    const place = json.place;
-    const parts = [make("h1", {}, place.name)];
-    if (place.path) parts.push(make("p", {}, make("a", { href: "#" }, texts.top)));
-    if (json.data.items.length > 0) {
-      const text = place.file ? texts.download : texts.downloadAll;
-      parts.push(make("p", {}, make("a", { class: "button", href: address({ action: "download", ...pathField(place) }) }, text)));
-      parts.push(...table(json.data, path));
-    } else {
-      parts.push(make("p", { class: "notice" }, texts.empty));
-    }
+    const { place, data } = json;
+    const button = make("a", { class: "button", href: address({ action: "download", ...pathField(place) }) },
+      place.file ? texts.download : texts.downloadAll);
+    if (place.file) return showFile(place, data.items[0], button);
+    const head = make("header", {}, picture("folder"), make("h1", {}, make("bdi", {}, place.name)));
+    if (data.items.length > 0) head.append(button);
+    const parts = [head];
+    if (place.path) parts.push(make("p", { class: "way" }, make("a", { href: "#" }, texts.top)));
+    if (data.items.length > 0) parts.push(...table(data, path));
+    else parts.push(make("p", { class: "notice" }, texts.empty));
     show(...parts);
   }
 
@@ -153,7 +182,8 @@
   document.addEventListener("DOMContentLoaded", () => {
     document.documentElement.lang = g_Lang;
     view = make("main", {});
-    document.body.append(view);
+    const mark = make("img", { src: g_Tunnel + "/favicon.svg", alt: "", width: "26", height: "26" });
+    document.body.append(make("div", { class: "brand" }, mark, "Orvel"), view);
     window.addEventListener("hashchange", openCurrent);
     openCurrent();
   });
