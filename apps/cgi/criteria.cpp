@@ -16,7 +16,7 @@ using namespace FileSearch;
 constexpr size_t kLongestPattern = 490;
 constexpr size_t kMostPatterns = 100;
 
-enum class Value { kText, kPatterns, kNumber, kKind };
+enum class Value { kText, kPatterns, kExtensions, kNumber, kKind };
 
 struct Criterion {
     const char* name;
@@ -27,7 +27,7 @@ struct Criterion {
 
 constexpr Criterion kCriteria[] = {{"name", FIND_NAME, nullptr, Value::kPatterns},
                                    {"type", FIND_TYPE, nullptr, Value::kKind},
-                                   {"extension", FIND_EXTENSION, nullptr, Value::kPatterns},
+                                   {"extension", FIND_EXTENSION, nullptr, Value::kExtensions},
                                    {"owner", FIND_OWNER, nullptr, Value::kText},
                                    {"group", FIND_GROUP, nullptr, Value::kText},
                                    {"mtime_from", FIND_MTIME, "from", Value::kNumber},
@@ -41,14 +41,18 @@ constexpr Criterion kCriteria[] = {{"name", FIND_NAME, nullptr, Value::kPatterns
                                    {"size_greater", FIND_SIZE, "greater", Value::kNumber}};
 
 // The elements that hold more than blanks, again separated by commas; "" when one is too long or they are too many.
-std::string usablePatterns(std::string_view list) {
+// Blanks around an element belong to it, unless `trim` is set.
+std::string usablePatterns(std::string_view list, bool trim) {
+    constexpr const char* blanks = " \t\r\n\v\f";
     std::string usable;
     size_t count = 0;
     while (!list.empty()) {
         const size_t end = std::min(list.find(','), list.size());
-        const std::string_view element = list.substr(0, end);
+        std::string_view element = list.substr(0, end);
         list.remove_prefix(std::min(end + 1, list.size()));
-        if (element.find_first_not_of(" \t\r\n\v\f") == std::string_view::npos) continue;
+        const size_t first = element.find_first_not_of(blanks);
+        if (first == std::string_view::npos) continue;
+        if (trim) element = element.substr(first, element.find_last_not_of(blanks) + 1 - first);
         if (element.size() > kLongestPattern || ++count > kMostPatterns) return "";
         if (!usable.empty()) usable += ',';
         usable += element;
@@ -65,8 +69,9 @@ int addCriterion(const Criterion& criterion, const std::string& value, Criteria&
         case Value::kNumber:
             if (!parseNumber(value)) return ORV_ERR_PARAMETER;
             return criteria.add(criterion.field, criterion.op, value);
-        case Value::kPatterns: {
-            const std::string patterns = usablePatterns(value);
+        case Value::kPatterns:
+        case Value::kExtensions: {
+            const std::string patterns = usablePatterns(value, criterion.value == Value::kExtensions);
             return patterns.empty() ? ORV_ERR_PARAMETER : criteria.add(criterion.field, criterion.op, patterns);
         }
         case Value::kText:

@@ -6,6 +6,7 @@ import { copyPath, download, newFolder, rename, showProperties } from "./operati
 import { isSearch } from "./path.js";
 import { editPath } from "./pathbar.js";
 import { preview } from "./preview.js";
+import { t } from "./strings.js";
 import { chooseFiles } from "./uploads.js";
 
 const commands = new Map();
@@ -51,7 +52,18 @@ export function runCommand(id) {
 
 export function shortcutText(keys) {
   const mac = navigator.platform.startsWith("Mac");
-  const names = { Mod: mac ? "⌘" : "Ctrl", ArrowUp: "↑", ArrowLeft: "←", ArrowRight: "→", Delete: "Del", " ": "Space" };
+  const names = {
+    Mod: mac ? "⌘" : t("key.ctrl"),
+    Shift: t("key.shift"),
+    ArrowUp: "↑",
+    ArrowLeft: "←",
+    ArrowRight: "→",
+    Delete: t("key.delete"),
+    Backspace: t("key.backspace"),
+    Enter: t("key.enter"),
+    Escape: t("key.escape"),
+    " ": t("key.space"),
+  };
   return keys
     .split("+")
     .map((key) => names[key] ?? (key.length === 1 ? key.toUpperCase() : key))
