@@ -1,12 +1,14 @@
 #include "share/visit.h"
 
 #include <algorithm>
+#include <cstdio>
 #include <cstdlib>
 #include <ctime>
 #include <optional>
 #include <string_view>
 
 #include "vexo/auto_block.h"
+#include "vexo/error.h"
 
 namespace orvel::cgi {
 namespace {
@@ -48,7 +50,10 @@ std::string harmless(std::string path) {
 Visit::Visit() : availability_(find()) {}
 
 Availability Visit::find() {
-    if (VexoCgiIsDeniedIP(clientAddress().c_str()) == 1) return Availability::kBlocked;
+    const int denied = VexoCgiIsDeniedIP(clientAddress().c_str());
+    if (denied == 1) return Availability::kBlocked;
+    // A broken list must not close every link: nobody is blocked then, and the server's log says so.
+    if (denied < 0) fprintf(stderr, "share: blocked addresses cannot be told [0x%04X]\n", VLIBCErrGet());
     const std::string id = linkIdOf(web_);
     if (id.empty()) return Availability::kNone;
     std::optional<Link> found;
