@@ -162,9 +162,13 @@ test("packed, extracted, refused item by item", () =>
     await page.click("[aria-label='More actions']");
     await page.click(".menu >> text=Extract to");
     await page.click(".picker >> text=house");
+    await page.click(".picker [aria-label='New folder']");
+    await page.fill(".dialog:last-of-type input", "unpacked");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector(".picker b >> text=unpacked");
     await page.click(".picker >> text=Extract here");
     await page.waitForSelector(".activity-card.good >> text=Extract");
-    assert.ok(existsSync(`${projects}/house/notes.md`));
+    assert.ok(existsSync(`${projects}/house/unpacked/notes.md`));
     await row(page, "board").click();
     await page.keyboard.press("Control+c");
     await page.evaluate(() => {

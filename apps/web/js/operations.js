@@ -19,8 +19,8 @@ export function checkName(text) {
   return new TextEncoder().encode(text).length > 255 ? t("name.long") : "";
 }
 
-export async function newFolder() {
-  const folder = browser.id;
+// Asks for a name and makes a folder in `folder`. Its id, or nothing.
+export async function makeFolder(folder) {
   const made = await askText({
     title: t("newFolder.title"),
     label: t("name.label"),
@@ -33,9 +33,14 @@ export async function newFolder() {
       return id;
     },
   });
-  if (!made) return;
-  emit("folders-changed", { ids: [folder] });
-  if (browser.id === folder) await refresh([made]);
+  if (made) emit("folders-changed", { ids: [folder] });
+  return made;
+}
+
+export async function newFolder() {
+  const folder = browser.id;
+  const made = await makeFolder(folder);
+  if (made && browser.id === folder) await refresh([made]);
 }
 
 // The search on screen, whose results follow what is done to them.

@@ -1,15 +1,14 @@
 // Choosing a folder.
 
-import { get, post } from "./api.js";
+import { get } from "./api.js";
 import { browser } from "./browser.js";
-import { askText, dialog } from "./dialogs.js";
+import { dialog } from "./dialogs.js";
 import { h, icon, iconButton, nameNode } from "./dom.js";
 import { describe } from "./errors.js";
 import { isReadOnlyShare } from "./entries.js";
-import { emit } from "./events.js";
 import { kindOf } from "./icons.js";
-import { checkName } from "./operations.js";
-import { childOf, encodeName, idIn, parentOf, shareOf } from "./path.js";
+import { makeFolder } from "./operations.js";
+import { idIn, parentOf, shareOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
 
@@ -24,22 +23,8 @@ export function pickFolder({ title, action, start }) {
       const place = h("b.grow");
       const up = iconButton("up", t("command.up"), () => enter(parentOf(here)));
       const make = iconButton("new-folder", t("command.newFolder"), async () => {
-        const folder = here;
-        const made = await askText({
-          title: t("newFolder.title"),
-          label: t("name.label"),
-          value: t("newFolder.name"),
-          action: t("newFolder.action"),
-          check: checkName,
-          submit: async (name) => {
-            const id = childOf(folder, encodeName(name));
-            await post("operation", { action: "mkdir", path_raw: id });
-            return id;
-          },
-        });
-        if (!made) return;
-        emit("folders-changed", { ids: [folder] });
-        enter(made);
+        const made = await makeFolder(here);
+        if (made) enter(made);
       });
       const button = h("button.button.primary", { type: "button", onclick: () => close(here) }, action);
 
