@@ -1,5 +1,5 @@
 // Any share definitions: what comes out is sound, and nothing in them hides the section behind them.
-#include "share_definitions.h"
+#include "shares/share_definitions.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -8,7 +8,7 @@
 #include <string>
 #include <string_view>
 
-#include "share_options.h"
+#include "shares/share_options.h"
 
 namespace {
 

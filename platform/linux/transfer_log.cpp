@@ -7,7 +7,7 @@
 
 #include "failure.h"
 #include "fault_gate.h"
-#include "file_io.h"
+#include "io/file_io.h"
 #include "raise.h"
 #include "transfer_entry.h"
 #include "vexo/filesystem.h"

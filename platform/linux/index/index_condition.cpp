@@ -1,0 +1,260 @@
+#include "index/index_condition.h"
+
+#include <algorithm>
+#include <cstdlib>
+#include <cstring>
+#include <iterator>
+#include <memory>
+#include <string_view>
+
+#include "failure.h"
+#include "index/index_columns.h"
+
+namespace vexo::fileindex {
+namespace {
+
+using Node = __tag_FI_SQL_COND;
+
+constexpr int kEscape = '\\';
+constexpr size_t kNamePatternLimit = 493;  // as much as the criterion on names compares
+constexpr const char* kNobody = "4294967295";
+constexpr int kDepthLimit = 100;  // SQLite takes expressions of depth 1,000
+constexpr int kNodeLimit = 20000;
+constexpr size_t kTrigramsOfPattern = 16;
+constexpr size_t kTrigramsLimit = 65536;  // bytes; beyond, looking at every name is the shorter way
+
+std::string_view textOf(const Node& node) {
+    return {node.szValue, strnlen(node.szValue, sizeof node.szValue)};
+}
+
+// The folder that a path condition is about.
+std::string folderOf(const Node& node, bool ofSearch) {
+    std::string_view text = textOf(node);
+    if (ofSearch) {
+        text.remove_prefix(std::min(text.find_first_not_of('/'), text.size()));
+        text.remove_prefix(std::min(text.find('/'), text.size()));
+    }
+    std::string folder;
+    for (const char c : text) {
+        if (c != '/' || (!folder.empty() && folder.back() != '/')) folder += c;
+    }
+    if (folder.ends_with('/')) folder.pop_back();
+    return folder;
+}
+
+bool isBelowForm(const Node& node, bool ofSearch) {
+    return !ofSearch && textOf(node).ends_with("/*");
+}
+
+const char* numberComparison(__tag_FI_SQL_COND_OP op) {
+    switch (op) {
+        case FI_OP_EQUAL:
+            return "=";
+        case FI_OP_LESS:
+            return "<";
+        case FI_OP_GREATER:
+            return ">";
+        case FI_OP_GREATER_EQUAL:
+            return ">=";
+        default:
+            return nullptr;
+    }
+}
+
+// The trigrams of a pattern's literals as full-text terms; every fitting name holds all of them.
+std::optional<std::string> trigramsOf(const orvel::Wildcard& pattern) {
+    std::string terms;
+    size_t count = 0;
+    for (const std::string& literal : pattern.literals()) {
+        std::vector<size_t> starts;  // of its characters, and its end
+        for (size_t at = 0; at < literal.size(); ++at) {
+            if ((static_cast<unsigned char>(literal[at]) & 0xC0U) != 0x80U) starts.push_back(at);
+        }
+        starts.push_back(literal.size());
+        for (size_t i = 0; i + 3 < starts.size() && count < kTrigramsOfPattern; ++i, ++count) {
+            terms += count == 0 ? "\"" : " AND \"";
+            for (size_t at = starts[i]; at < starts[i + 3]; ++at) {
+                terms += literal[at];
+                if (literal[at] == '"') terms += '"';
+            }
+            terms += '"';
+        }
+    }
+    if (count == 0) return {};
+    return "(" + terms + ")";
+}
+
+Condition always() {
+    return {"1", {}, {}, {}};
+}
+
+void appendValues(Condition& to, Condition& from) {
+    std::move(from.values.begin(), from.values.end(), std::back_inserter(to.values));
+}
+
+Condition either(Condition a, Condition b) {
+    a.sql = "(" + a.sql + " OR " + b.sql + ")";
+    appendValues(a, b);
+    if (a.folders && b.folders) {
+        std::move(b.folders->begin(), b.folders->end(), std::back_inserter(*a.folders));
+    } else {
+        a.folders.reset();
+    }
+    if (a.trigrams && b.trigrams) {
+        a.trigrams = "(" + *a.trigrams + " OR " + *b.trigrams + ")";
+    } else {
+        a.trigrams.reset();
+    }
+    return a;
+}
+
+// Halves, so that a long list of alternatives does not become a deep expression.
+Condition anyOf(std::vector<Condition>& parts, size_t from, size_t to) {
+    if (to - from == 1) return std::move(parts[from]);
+    const size_t middle = from + (to - from) / 2;
+    Condition left = anyOf(parts, from, middle);
+    return either(std::move(left), anyOf(parts, middle, to));
+}
+
+class Reader {
+ public:
+    explicit Reader(const Reading& reading) : reading_(reading) {}
+
+    std::optional<Condition> chain(const Node* first, int depth) {
+        std::vector<Group> groups;
+        const Node* shared = nullptr;
+        for (const Node* node = first; node != nullptr && shared == nullptr; node = node->pOrNext) {
+            if (--budget_ < 0) return {};
+            shared = node->pAndNext;
+        }
+        for (const Node* node = first; node != nullptr; node = node->pOrNext) {
+            if (--budget_ < 0) return {};
+            const Node* link = node->pAndNext != nullptr ? node->pAndNext : shared;
+            std::optional<Condition> own = isWidened(*node, link) ? always() : test(*node);
+            if (!own) return {};
+            addTo(groups, link, std::move(*own));
+        }
+        return join(groups, depth);
+    }
+
+ private:
+    // The members of a chain that share an and-link, which is then written once.
+    struct Group {
+        const Node* link;
+        std::vector<Condition> members;
+    };
+
+    static void addTo(std::vector<Group>& groups, const Node* link, Condition member) {
+        const auto found =
+            std::find_if(groups.begin(), groups.end(), [&](const Group& group) { return group.link == link; });
+        Group& group = found == groups.end() ? groups.emplace_back(Group{link, {}}) : *found;
+        group.members.push_back(std::move(member));
+    }
+
+    std::optional<Condition> join(std::vector<Group>& groups, int depth) {
+        std::vector<Condition> parts;
+        for (Group& group : groups) {
+            Condition members = anyOf(group.members, 0, group.members.size());
+            if (group.link != nullptr) {
+                std::optional<Condition> link;
+                if (depth < kDepthLimit) link = chain(group.link, depth + 1);
+                if (!link) return {};
+                members = both(std::move(members), std::move(*link));
+            }
+            parts.push_back(std::move(members));
+        }
+        return anyOf(parts, 0, parts.size());
+    }
+
+    // "Directly in V" that is and-linked with "below V" says the latter.
+    [[nodiscard]] bool isWidened(const Node& node, const Node* link) const {
+        return node.type == FI_COL_PATH && node.op == FI_OP_PATH && link != nullptr && link->type == FI_COL_PATH &&
+               link->op == FI_OP_BELOW && textOf(node) == textOf(*link);
+    }
+
+    [[nodiscard]] std::optional<Condition> test(const Node& node) const {
+        const Column* column = columnOf(node.type);
+        if (column == nullptr) return {};
+        if (node.type == FI_COL_ACCESS_TIME && reading_.accessHolds) return always();
+        if (node.op == FI_OP_PATH || node.op == FI_OP_BELOW) {
+            if (node.type != FI_COL_PATH) return {};
+            return pathTest(node);
+        }
+        if (!column->isText) return numberTest(node, *column);
+        if (node.op == FI_OP_EQUAL) return Condition{std::string(column->name) + "=?", {valueOf(node)}, {}, {}};
+        if (node.op == FI_OP_WILDCARD) return patternTest(node, *column);
+        return {};
+    }
+
+    static std::optional<Condition> numberTest(const Node& node, const Column& column) {
+        const char* comparison = numberComparison(node.op);
+        if (comparison == nullptr) return {};
+        // The id that stands for nobody is nobody's, as for the criteria.
+        const bool isId = node.type == FI_COL_UID || node.type == FI_COL_GID;
+        if (isId && node.op == FI_OP_EQUAL && textOf(node) == kNobody) return Condition{"0", {}, {}, {}};
+        return Condition{std::string(column.name) + comparison + "?", {valueOf(node)}, {}, {}};
+    }
+
+    [[nodiscard]] std::optional<Condition> patternTest(const Node& node, const Column& column) const {
+        const bool isName = node.type == FI_COL_NAME;
+        const std::string_view text = textOf(node).substr(0, isName ? kNamePatternLimit : std::string_view::npos);
+        const auto pattern = std::make_shared<const orvel::Wildcard>(text, kEscape);
+        Condition out{std::string("vexo_match(?,") + column.name + ")", {Value(Pattern(pattern))}, {}, {}};
+        if (isName && reading_.forTrigrams) out.trigrams = trigramsOf(*pattern);
+        return out;
+    }
+
+    [[nodiscard]] Condition pathTest(const Node& node) const {
+        std::string folder = folderOf(node, reading_.ofSearch);
+        bool below = node.op == FI_OP_BELOW;
+        if (node.op == FI_OP_PATH && isBelowForm(node, reading_.ofSearch)) {
+            folder.resize(folder.size() - 1);
+            if (folder.ends_with('/')) folder.pop_back();
+            below = true;
+        }
+        if (folder.empty() && below) return always();
+        Condition out{"parent=?", {Value(folder)}, {{{folder, below}}}, {}};
+        if (folder.empty()) return out;
+        const Condition inRange{"(path>? AND path<?)", {Value(folder + "/"), Value(folder + "0")}, {}, {}};
+        if (!below) return both(inRange, std::move(out));
+        out.sql = inRange.sql;
+        out.values = inRange.values;
+        return out;
+    }
+
+    const Reading reading_;
+    int budget_ = kNodeLimit;
+};
+
+}  // namespace
+
+Condition both(Condition a, Condition b) {
+    a.sql = "(" + a.sql + " AND " + b.sql + ")";
+    appendValues(a, b);
+    if (!a.folders) a.folders = std::move(b.folders);
+    if (a.trigrams && b.trigrams) {
+        a.trigrams = "(" + *a.trigrams + " AND " + *b.trigrams + ")";
+    } else if (!a.trigrams) {
+        a.trigrams = std::move(b.trigrams);
+    }
+    return a;
+}
+
+Value valueOf(const __tag_FI_SQL_COND& node) {
+    const Column* column = columnOf(node.type);
+    if (column != nullptr && column->isText) return std::string(textOf(node));
+    return static_cast<int64_t>(std::strtoll(std::string(textOf(node)).c_str(), nullptr, 10));
+}
+
+std::optional<Condition> readCondition(const __tag_FI_SQL_COND* tree, const Reading& reading) {
+    if (tree == nullptr) return always();
+    std::optional<Condition> condition = Reader(reading).chain(tree, 0);
+    if (!condition) {
+        fail(VEXO_ERR_PARAMETER, EINVAL);
+        return {};
+    }
+    if (condition->trigrams && condition->trigrams->size() > kTrigramsLimit) condition->trigrams.reset();
+    return condition;
+}
+
+}  // namespace vexo::fileindex

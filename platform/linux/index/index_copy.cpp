@@ -1,0 +1,82 @@
+// Copying what a search asks for out of a share's index.
+#include <algorithm>
+#include <exception>
+#include <memory>
+#include <utility>
+#include <vector>
+
+#include "failure.h"
+#include "fault_gate.h"
+#include "index/index_columns.h"
+#include "index/index_condition.h"
+#include "index/index_connections.h"
+#include "index/index_reading.h"
+#include "index/index_search.h"
+#include "index/index_store.h"
+#include "raise.h"
+#include "vexo/index.h"
+
+namespace vexo::fileindex {
+namespace {
+
+// What the caller tells about single records; see FILEIDXResultGetAndTableGen.
+struct Tests {
+    BOOL (*access)(__tag_FI_FILE_INFO_DATA*, void*);
+    void* accessArgument;
+    BOOL (*folder)(const char*, void*);
+    void* folderArgument;
+};
+
+bool holds(const Tests& tests, __tag_FI_FILE_INFO_DATA& record) {
+    if (tests.folder != nullptr && tests.folder(record.szParent, tests.folderArgument) == 0) return false;
+    return tests.access == nullptr || tests.access(&record, tests.accessArgument) != 0;
+}
+
+bool insertInto(const char* out, const std::vector<__tag_FI_FILE_INFO_DATA>& records) {
+    const Lease lease(out);
+    return lease && std::all_of(records.begin(), records.end(), [&](const auto& r) { return lease->insert(r); });
+}
+
+bool copy(Database& index, const std::vector<int64_t>& ids, const char* out, const Tests& tests, const int* cancel) {
+    PartReader reader(ids);
+    while (!reader.atEnd() && !isCancelled(cancel)) {
+        std::vector<OwnedRecord> part;
+        {
+            const RaisedIdentity raised;
+            if (!reader.read(index, part)) return false;
+        }
+        std::vector<__tag_FI_FILE_INFO_DATA> kept;
+        for (const OwnedRecord& record : part) {
+            if (isCancelled(cancel)) break;
+            __tag_FI_FILE_INFO_DATA view = record.view();
+            if (holds(tests, view)) kept.push_back(view);
+        }
+        if (!kept.empty() && !insertInto(out, kept)) return false;
+    }
+    const Lease lease(out);
+    return lease && lease->commit();
+}
+
+}  // namespace
+}  // namespace vexo::fileindex
+
+int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_COND* paths, const __tag_FI_SQL_COND* cond,
+                                const char* out, BOOL (*accessTest)(__tag_FI_FILE_INFO_DATA*, void*), void* accessArg,
+                                int* cancel, BOOL (*folderTest)(const char*, void*), void* folderArg) try {
+    using namespace vexo::fileindex;
+    VEXO_GATE("FILEIDXResultGetAndTableGen", -1);
+    if (share == nullptr || out == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    auto where = readCondition(paths, {.ofSearch = true});
+    auto what = readCondition(cond, {.accessHolds = accessTest != nullptr, .forTrigrams = true});
+    if (!where || !what) return -1;
+    std::unique_ptr<Database> index;
+    std::vector<int64_t> ids;
+    {
+        const vexo::RaisedIdentity raised;
+        index = openIndex(share);
+        if (index == nullptr || !searchIndex(*index, both(std::move(*where), std::move(*what)), cancel, ids)) return -1;
+    }
+    return copy(*index, ids, out, {accessTest, accessArg, folderTest, folderArg}, cancel) ? 0 : -1;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}

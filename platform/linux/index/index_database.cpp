@@ -1,0 +1,221 @@
+#include "index/index_database.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <ctime>
+#include <utility>
+
+#include "failure.h"
+#include "index/index_columns.h"
+#include "index/index_vfs.h"
+#include "io/file_io.h"
+#include "vexo/error.h"
+
+namespace vexo::fileindex {
+namespace {
+
+constexpr int kBusyMilliseconds = 10000;
+constexpr int kSoonMilliseconds = 100;
+
+// Compared word for word before a database is used, so a change here makes another format.
+constexpr std::array<const char*, 4> kSchema = {
+    "CREATE TABLE record(id INTEGER PRIMARY KEY,name TEXT,share TEXT,path TEXT,parent TEXT,share_root TEXT,"
+    "extension TEXT,permission TEXT,owner TEXT,group_name TEXT,is_dir INTEGER,size INTEGER,created INTEGER,"
+    "changed INTEGER,accessed INTEGER,modified INTEGER,mode INTEGER,uid INTEGER,gid INTEGER)",
+    "CREATE UNIQUE INDEX record_address ON record(path,share)",
+    "CREATE TABLE state(records INTEGER,written INTEGER,built INTEGER,updated INTEGER)",
+    "CREATE TABLE ranking(id INTEGER PRIMARY KEY,records BLOB)",
+};
+
+void matchFunction(sqlite3_context* context, int, sqlite3_value** values) {
+    const auto* pattern = static_cast<const orvel::Wildcard*>(sqlite3_value_pointer(values[0], "wildcard"));
+    const auto* text = static_cast<const char*>(sqlite3_value_blob(values[1]));
+    const auto length = static_cast<size_t>(sqlite3_value_bytes(values[1]));
+    const std::string_view name = text == nullptr ? std::string_view() : std::string_view(text, length);
+    sqlite3_result_int(context, static_cast<int>(pattern != nullptr && pattern->match(name)));
+}
+
+void comparableFunction(sqlite3_context* context, int, sqlite3_value** values) {
+    try {
+        const auto* text = static_cast<const char*>(sqlite3_value_blob(values[0]));
+        const auto length = static_cast<size_t>(sqlite3_value_bytes(values[0]));
+        std::string out;
+        if (text != nullptr) orvel::appendComparable({text, length}, out);
+        sqlite3_result_text64(context, out.data(), out.size(), SQLITE_TRANSIENT, SQLITE_UTF8);
+    } catch (...) {
+        sqlite3_result_error_nomem(context);
+    }
+}
+
+bool addFunctions(sqlite3* db) {
+    constexpr int flags = SQLITE_UTF8 | SQLITE_DETERMINISTIC | SQLITE_INNOCUOUS;
+    return sqlite3_create_function(db, "vexo_match", 2, flags, nullptr, matchFunction, nullptr, nullptr) == SQLITE_OK &&
+           sqlite3_create_function(db, "vexo_comparable", 1, flags, nullptr, comparableFunction, nullptr, nullptr) ==
+               SQLITE_OK;
+}
+
+// A file may be made to harm who opens it; only the central store may say by triggers what is to be done.
+void limit(sqlite3* db, bool ofShare) {
+    sqlite3_db_config(db, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
+    sqlite3_db_config(db, SQLITE_DBCONFIG_TRUSTED_SCHEMA, static_cast<int>(ofShare), nullptr);
+    sqlite3_db_config(db, SQLITE_DBCONFIG_ENABLE_TRIGGER, static_cast<int>(ofShare), nullptr);
+    sqlite3_db_config(db, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
+    sqlite3_db_config(db, SQLITE_DBCONFIG_ENABLE_LOAD_EXTENSION, 0, nullptr);
+    sqlite3_limit(db, SQLITE_LIMIT_LENGTH, 4 << 20);
+    sqlite3_limit(db, SQLITE_LIMIT_COLUMN, 100);
+    sqlite3_limit(db, SQLITE_LIMIT_ATTACHED, 0);
+    sqlite3_limit(db, SQLITE_LIMIT_WORKER_THREADS, 0);
+}
+
+}  // namespace
+
+const char* const kShareSchema =
+    "CREATE INDEX record_parent ON record(parent);"
+    "CREATE VIRTUAL TABLE trigram USING fts5(name,content='',columnsize=0,detail=none,"
+    "tokenize='trigram case_sensitive 1');"
+    "INSERT INTO trigram(rowid,name) SELECT id,vexo_comparable(name) FROM record;"
+    "CREATE TRIGGER record_insert AFTER INSERT ON record BEGIN "
+    "INSERT INTO trigram(rowid,name) VALUES(new.id,vexo_comparable(new.name));END;"
+    "CREATE TRIGGER record_delete AFTER DELETE ON record BEGIN "
+    "INSERT INTO trigram(trigram,rowid,name) VALUES('delete',old.id,vexo_comparable(old.name));END;"
+    "CREATE TRIGGER record_update AFTER UPDATE OF name ON record BEGIN "
+    "INSERT INTO trigram(trigram,rowid,name) VALUES('delete',old.id,vexo_comparable(old.name));"
+    "INSERT INTO trigram(rowid,name) VALUES(new.id,vexo_comparable(new.name));END;";
+
+Database::~Database() {
+    const KeepErrno keep;
+    insert_ = Statement();
+    sqlite3_close_v2(db_);
+}
+
+std::unique_ptr<Database> Database::open(const std::string& path, OpenMode mode) {
+    const std::string resolved = resolveFolder(path);
+    struct stat status {};
+    if (resolved.empty() || lstat(resolved.c_str(), &status) != 0) {
+        fail(errno == EACCES ? VEXO_ERR_DENIED : VEXO_ERR_FILE);
+        return nullptr;
+    }
+    if (!isTrusted(status, S_IFREG)) {
+        fail(VEXO_ERR_FILE, EACCES);
+        return nullptr;
+    }
+    const int flags = SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_NOFOLLOW | SQLITE_OPEN_EXRESCODE |
+                      (mode.readOnly ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE);
+    sqlite3* db = nullptr;
+    const int result = sqlite3_open_v2(resolved.c_str(), &db, flags, trustedFileSystem());
+    std::unique_ptr<Database> database(new Database(path, db));
+    if (result != SQLITE_OK) {
+        failSql(db, result);
+        return nullptr;
+    }
+    if (database->configure(mode) && database->hasOurSchema(mode.ofShare)) return database;
+    // What a killed writer began must be taken back before anybody reads, and only a writer can.
+    const bool unfinished = sqlite3_extended_errcode(db) == SQLITE_READONLY_ROLLBACK;
+    database.reset();
+    if (!unfinished || !mode.readOnly || open(path, {false, mode.ofShare}) == nullptr) return nullptr;
+    return open(path, mode);
+}
+
+bool Database::create(const std::string& path) {
+    const std::string resolved = resolveFolder(path);
+    if (resolved.empty() || !openFile(resolved, O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW, 0600)) {
+        const int code = errorOfErrno(errno);
+        fail(code == VEXO_ERR_MISSING ? static_cast<int>(VEXO_ERR_FILE) : code);
+        return false;
+    }
+    // A journal that an earlier file of this name left behind is not ours to play back.
+    unlink((resolved + "-journal").c_str());
+    sqlite3* db = nullptr;
+    constexpr int flags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_NOFOLLOW | SQLITE_OPEN_EXRESCODE;
+    const int result = sqlite3_open_v2(resolved.c_str(), &db, flags, trustedFileSystem());
+    Database database(resolved, db);
+    const bool opened = result == SQLITE_OK || failSql(db, result);
+    if (opened && database.configure({}) && database.makeSchema()) return true;
+    const KeepErrno keep;
+    database.rollBack();
+    unlink(resolved.c_str());
+    return false;
+}
+
+bool Database::configure(OpenMode mode) {
+    limit(db_, mode.ofShare);
+    waitForOthers(true);
+    if (!addFunctions(db_)) return failSql(db_);
+    // Results are worth nothing after a loss of power, but must survive the death of their writer. Pages that a large
+    // batch changed wait in memory: written early, they would lock readers out for the rest of the batch.
+    constexpr const char* common =
+        "PRAGMA temp_store=MEMORY;PRAGMA secure_delete=OFF;PRAGMA cache_spill=OFF;"
+        "PRAGMA cache_size=-16384;";
+    return execute(db_, common) &&
+           execute(db_, mode.ofShare ? "PRAGMA synchronous=FULL;PRAGMA mmap_size=2147418112;"
+                                     : "PRAGMA synchronous=OFF;PRAGMA mmap_size=0;PRAGMA cell_size_check=ON;");
+}
+
+bool Database::makeSchema() {
+    const std::string identity =
+        "PRAGMA page_size=8192;PRAGMA auto_vacuum=NONE;BEGIN;PRAGMA application_id=" + std::to_string(kApplicationId) +
+        ";";
+    if (!execute(db_, identity.c_str())) return false;
+    for (const char* sql : kSchema) {
+        if (!execute(db_, sql)) return false;
+    }
+    return execute(db_, "INSERT INTO state VALUES(0,0,0,0);COMMIT");
+}
+
+bool Database::hasOurSchema(bool ofShare) {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT coalesce(sql,'') FROM sqlite_schema ORDER BY rowid")) return false;
+    size_t rows = 0;
+    Statement::Step step = statement.step();
+    for (; step == Statement::kRow; step = statement.step()) {
+        const bool known = rows < kSchema.size() ? statement.text(0) == kSchema[rows] : ofShare;
+        ++rows;
+        if (!known) break;
+    }
+    if (step == Statement::kFailed) return false;
+    if (step == Statement::kDone && rows >= kSchema.size()) return true;
+    fail(VEXO_ERR_GENERAL, EINVAL);
+    return false;
+}
+
+void Database::waitForOthers(bool wait) {
+    sqlite3_busy_timeout(db_, wait ? kBusyMilliseconds : kSoonMilliseconds);
+}
+
+bool Database::select(const Condition& condition, std::vector<int64_t>& ids) {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT id FROM record WHERE " + condition.sql + " ORDER BY id") ||
+        !statement.bind(condition.values)) {
+        return false;
+    }
+    Statement::Step step = statement.step();
+    for (; step == Statement::kRow; step = statement.step()) ids.push_back(statement.number(0));
+    return step == Statement::kDone;
+}
+
+bool Database::count(const Condition& condition, int64_t& count) {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT count(*) FROM record WHERE " + condition.sql) ||
+        !statement.bind(condition.values) || statement.step() != Statement::kRow) {
+        return false;
+    }
+    count = statement.number(0);
+    return true;
+}
+
+bool Database::readState(State& state) {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT records,written,built,updated FROM state") ||
+        statement.step() != Statement::kRow) {
+        return false;
+    }
+    state = {std::max<int64_t>(statement.number(0), 0), statement.number(1), statement.number(2), statement.number(3)};
+    return true;
+}
+
+}  // namespace vexo::fileindex

@@ -1,0 +1,273 @@
+// The store of the shares' indexes: building, replacing, asking about them.
+#include "index/index_store.h"
+
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+#include <ctime>
+#include <exception>
+#include <map>
+
+#include "failure.h"
+#include "fault_gate.h"
+#include "index/index_connections.h"
+#include "io/file_io.h"
+#include "raise.h"
+#include "shares/share_record.h"
+#include "shares/share_store.h"
+#include "vexo/filesystem.h"
+#include "vexo/index.h"
+#include "vexo/system_root.h"
+#include "vexo/text.h"
+
+namespace vexo::fileindex {
+namespace {
+
+constexpr const char* kFolder = "/var/lib/vexo/index";
+constexpr const char* kParent = "/var/lib/vexo";
+
+// What this process is writing of a share.
+struct Work {
+    int mode;
+    Descriptor lock;
+};
+
+// Never destroyed: the locks go with the process.
+std::map<std::string, Work>& works() {
+    static auto& value = *new std::map<std::string, Work>;
+    return value;
+}
+
+std::string storePath(std::string_view share, const char* suffix) {
+    return VEXO::SystemPath(kFolder) + "/" + storeName(share) + suffix;
+}
+
+std::string newPath(std::string_view share) {
+    return storePath(share, ".new");
+}
+
+bool makeStore() {
+    constexpr uid_t keep = static_cast<uid_t>(-1);
+    return VEXOFSMkdirP(VEXO::SystemPath(kParent).c_str(), nullptr, 1, keep, keep, 0755) == 0 &&
+           VEXOFSMkdirP(VEXO::SystemPath(kFolder).c_str(), nullptr, 1, keep, keep, 0700) == 0;
+}
+
+// The lock that everybody takes who writes the share's index. Empty with the slot filled: 0x0800 somebody has it.
+Descriptor lockIndex(std::string_view share) {
+    Descriptor lock = openFile(storePath(share, ".lock"), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK, 0600);
+    int result = lock ? 0 : -1;
+    do {
+        if (lock) result = flock(lock.get(), LOCK_EX | LOCK_NB);
+    } while (result != 0 && errno == EINTR);
+    if (result == 0) return lock;
+    fail(errno == EWOULDBLOCK ? static_cast<int>(VEXO_ERR_EXISTS) : errorOfErrno(errno));
+    return Descriptor();
+}
+
+bool removeFile(const std::string& path) {
+    for (const char* suffix : {"-journal", ""}) {
+        if (unlink((path + suffix).c_str()) == 0 || errno == ENOENT) continue;
+        fail(errorOfErrno(errno));
+        return false;
+    }
+    return true;
+}
+
+bool indexExists(std::string_view share) {
+    struct stat status {};
+    return lstat(indexPath(share).c_str(), &status) == 0 && isTrusted(status, S_IFREG);
+}
+
+bool begin(const std::string& share, int mode) {
+    const RaisedIdentity raised;
+    if (!makeStore()) return false;
+    Work work{mode, lockIndex(share)};
+    if (!work.lock) return false;
+    if (mode == FI_INDEX_BUILD) {
+        if (!removeFile(newPath(share)) || !Database::create(newPath(share))) return false;
+        // Until it is complete nobody needs it after a loss of power.
+        admitDatabase(newPath(share), {});
+    } else {
+        if (!indexExists(share)) {
+            fail(VEXO_ERR_MISSING, ENOENT);
+            return false;
+        }
+        admitDatabase(indexPath(share), {false, true});
+    }
+    works()[share] = std::move(work);
+    return true;
+}
+
+bool noteTime(sqlite3* db, bool built) {
+    const std::string now = std::to_string(time(nullptr));
+    const std::string sql = std::string("UPDATE state SET ") + (built ? "built=" + now + "," : "") + "updated=" + now;
+    return execute(db, sql.c_str());
+}
+
+bool synchronise(const std::string& path, int flags) {
+    const Descriptor fd = openFile(path, flags);
+    if (fd && fsync(fd.get()) == 0) return true;
+    fail(errorOfErrno(errno));
+    return false;
+}
+
+// The records become an index: trigrams and all.
+bool complete(const std::string& path) {
+    const std::unique_ptr<Database> database = Database::open(path, {});
+    if (database == nullptr) return false;
+    sqlite3* db = database->handle();
+    return execute(db, "BEGIN") && execute(db, kShareSchema) && noteTime(db, true) && execute(db, "COMMIT");
+}
+
+bool replaceIndex(std::string_view share) {
+    const std::string path = newPath(share);
+    if (!synchronise(path, O_RDONLY)) return false;
+    if (rename(path.c_str(), indexPath(share).c_str()) != 0) {
+        fail(errorOfErrno(errno));
+        return false;
+    }
+    return synchronise(VEXO::SystemPath(kFolder), O_RDONLY | O_DIRECTORY);
+}
+
+bool endBuild(const std::string& share, bool done) {
+    const std::string path = newPath(share);
+    const bool written = dismissDatabase(path);
+    if (done && written && complete(path) && replaceIndex(share)) return true;
+    const KeepErrno keep;
+    return removeFile(path) && !done;
+}
+
+bool endUpdate(const std::string& share, bool done) {
+    if (!dismissDatabase(indexPath(share))) return false;
+    if (!done) return true;
+    const std::unique_ptr<Database> database = Database::open(indexPath(share), {false, true});
+    return database != nullptr && noteTime(database->handle(), false);
+}
+
+// The share's name as it is defined; "" with the slot filled when there is none.
+std::string definedName(const char* share) {
+    const ShareRecord record = loadShare(share);
+    return record == nullptr ? std::string() : std::string(record->szName);
+}
+
+bool readStatus(const std::string& share, FIINDEXSTATUS& status) {
+    const std::unique_ptr<Database> database = openIndex(share);
+    if (database == nullptr) return false;
+    struct stat file {};
+    State state{};
+    int64_t folders = 0;
+    if (!database->readState(state) || !database->count({"is_dir=1", {}, {}, {}}, folders)) return false;
+    if (lstat(indexPath(share).c_str(), &file) != 0) {
+        fail(errorOfErrno(errno));
+        return false;
+    }
+    status = {static_cast<unsigned long long>(state.records), static_cast<unsigned long long>(folders), file.st_size,
+              state.built, state.updated};
+    return true;
+}
+
+}  // namespace
+
+std::string storeName(std::string_view share) {
+    static constexpr char digits[] = "0123456789ABCDEF";
+    std::string folded;
+    VEXO::AppendFoldKey(share, folded);
+    std::string out;
+    for (const char c : folded) {
+        const auto byte = static_cast<unsigned char>(c);
+        const bool plain = byte > ' ' && byte != 0x7F && strchr("%/.", c) == nullptr;
+        if (plain) {
+            out += c;
+        } else {
+            out += '%';
+            out += digits[byte >> 4];
+            out += digits[byte & 15];
+        }
+    }
+    return out;
+}
+
+std::string indexPath(std::string_view share) {
+    return storePath(share, ".db");
+}
+
+std::unique_ptr<Database> openIndex(std::string_view share) {
+    if (!indexExists(share)) {
+        fail(VEXO_ERR_MISSING, ENOENT);
+        return nullptr;
+    }
+    return Database::open(indexPath(share), {true, true});
+}
+
+}  // namespace vexo::fileindex
+
+using vexo::fileindex::definedName;
+
+int FILEIDXIsIndexEnable(const char* share) try {
+    VEXO_GATE("FILEIDXIsIndexEnable", 0);
+    const auto shares = share == nullptr ? nullptr : vexo::currentShares();
+    const vexo::ShareDefinition* definition = shares == nullptr ? nullptr : shares->find(share);
+    if (definition == nullptr || !definition->index) return 0;
+    const vexo::KeepErrno keep;
+    const vexo::RaisedIdentity raised;
+    return static_cast<int>(vexo::fileindex::indexExists(definition->name));
+} catch (const std::exception&) {
+    vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+    return 0;
+}
+
+int FILEIDXIndexBegin(const char* share, int mode, char* path, int size) try {
+    VEXO_GATE("FILEIDXIndexBegin", -1);
+    const bool known = mode == FI_INDEX_BUILD || mode == FI_INDEX_UPDATE;
+    if (share == nullptr || path == nullptr || size <= 0 || !known) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    path[0] = '\0';
+    const std::string name = definedName(share);
+    if (name.empty()) return -1;
+    const std::string file = mode == FI_INDEX_BUILD ? vexo::fileindex::newPath(name) : vexo::fileindex::indexPath(name);
+    if (file.size() >= static_cast<size_t>(size)) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    if (!vexo::fileindex::begin(name, mode)) return -1;
+    memcpy(path, file.c_str(), file.size() + 1);
+    return 0;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int FILEIDXIndexEnd(const char* share, int done) try {
+    VEXO_GATE("FILEIDXIndexEnd", -1);
+    const std::string name = share == nullptr ? std::string() : definedName(share);
+    const auto work = vexo::fileindex::works().find(name);
+    if (work == vexo::fileindex::works().end()) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    const vexo::RaisedIdentity raised;
+    const bool ended = work->second.mode == FI_INDEX_BUILD ? vexo::fileindex::endBuild(name, done != 0)
+                                                           : vexo::fileindex::endUpdate(name, done != 0);
+    vexo::fileindex::works().erase(work);
+    return ended ? 0 : -1;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int FILEIDXIndexDrop(const char* share) try {
+    VEXO_GATE("FILEIDXIndexDrop", -1);
+    if (share == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    // A share that is no more may have left its index behind.
+    const vexo::RaisedIdentity raised;
+    if (!vexo::fileindex::makeStore()) return -1;
+    const vexo::Descriptor lock = vexo::fileindex::lockIndex(share);
+    if (!lock) return -1;
+    return vexo::fileindex::removeFile(vexo::fileindex::indexPath(share)) ? 0 : -1;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int FILEIDXIndexStatus(const char* share, FIINDEXSTATUS* status) try {
+    VEXO_GATE("FILEIDXIndexStatus", -1);
+    if (share == nullptr || status == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    *status = {};
+    const vexo::RaisedIdentity raised;
+    return vexo::fileindex::readStatus(share, *status) ? 0 : -1;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}

@@ -1,0 +1,23 @@
+// The central store of the shares' indexes, docs/formats/index.md.
+#ifndef VEXO_LINUX_INDEX_STORE_H
+#define VEXO_LINUX_INDEX_STORE_H
+
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "index/index_database.h"
+
+namespace vexo::fileindex {
+
+// What the files of a share are called in the store: its name folded, so that it is found however it is written.
+[[nodiscard]] std::string storeName(std::string_view share);
+// Where the share's index lies.
+[[nodiscard]] std::string indexPath(std::string_view share);
+
+// The share's index for reading. Null with the slot filled, 0x0600 when there is none. The caller has raised.
+[[nodiscard]] std::unique_ptr<Database> openIndex(std::string_view share);
+
+}  // namespace vexo::fileindex
+
+#endif

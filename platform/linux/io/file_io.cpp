@@ -1,0 +1,116 @@
+#include "io/file_io.h"
+
+#include <cstdio>
+#include <cstdlib>
+#include <ctime>
+
+namespace vexo {
+namespace {
+
+// Makes the rename of a file in `folder` last; a file system that cannot do so is as good as it gets.
+void synchroniseFolder(const std::string& folder) {
+    const Descriptor fd = openFile(folder, O_RDONLY | O_DIRECTORY);
+    if (fd) static_cast<void>(fsync(fd.get()));
+}
+
+bool fillAndRename(int fd, const std::string& temporary, const std::string& path, std::string_view text, mode_t mode) {
+    return writeAll(fd, text) && fchmod(fd, mode) == 0 && fsync(fd) == 0 &&
+           rename(temporary.c_str(), path.c_str()) == 0;
+}
+
+bool isBefore(const timespec& a, const timespec& b) {
+    return a.tv_sec != b.tv_sec ? a.tv_sec < b.tv_sec : a.tv_nsec < b.tv_nsec;
+}
+
+}  // namespace
+
+Descriptor openFile(int folder, const char* path, int flags, mode_t mode) {
+    int fd = -1;
+    do {
+        fd = openat(folder, path, flags | O_CLOEXEC, mode);
+    } while (fd < 0 && errno == EINTR);
+    return Descriptor(fd);
+}
+
+bool readAll(int fd, std::string& out, size_t limit) {
+    char buffer[65536];
+    size_t total = 0;
+    while (true) {
+        const ssize_t got = read(fd, buffer, sizeof buffer);
+        if (got == 0) return true;
+        if (got < 0) {
+            if (errno == EINTR) continue;
+            return false;
+        }
+        total += static_cast<size_t>(got);
+        if (total > limit) {
+            errno = EFBIG;
+            return false;
+        }
+        out.append(buffer, static_cast<size_t>(got));
+    }
+}
+
+bool writeAll(int fd, std::string_view text) {
+    while (!text.empty()) {
+        const ssize_t written = write(fd, text.data(), text.size());
+        if (written >= 0) {
+            text.remove_prefix(static_cast<size_t>(written));
+        } else if (errno != EINTR) {
+            return false;
+        }
+    }
+    return true;
+}
+
+bool readRegularFile(const std::string& path, size_t limit, std::string& text, FileVersion& version) {
+    const Descriptor fd = openFile(path, O_RDONLY | O_NONBLOCK | O_NOCTTY);
+    struct stat status {};
+    if (!fd || fstat(fd.get(), &status) != 0) return false;
+    if (!S_ISREG(status.st_mode)) {
+        errno = EINVAL;
+        return false;
+    }
+    version = FileVersion(status);
+    text.clear();
+    return readAll(fd.get(), text, limit);
+}
+
+bool replaceFile(const std::string& path, std::string_view text, mode_t mode) {
+    const std::string folder = path.substr(0, path.rfind('/') + 1);
+    std::string temporary = folder + ".new-XXXXXX";
+    const Descriptor fd(mkostemp(temporary.data(), O_CLOEXEC));
+    if (!fd) return false;
+    if (!fillAndRename(fd.get(), temporary, path, text, mode)) {
+        const int savedErrno = errno;
+        unlink(temporary.c_str());
+        errno = savedErrno;
+        return false;
+    }
+    synchroniseFolder(folder.empty() ? "." : folder);
+    return true;
+}
+
+bool isTrusted(const struct stat& status, mode_t type) {
+    const bool ours = status.st_uid == 0 || status.st_uid == geteuid();
+    const bool oneName = type != S_IFREG || status.st_nlink == 1;
+    return (status.st_mode & S_IFMT) == type && ours && oneName && (status.st_mode & (S_IWGRP | S_IWOTH)) == 0;
+}
+
+FileVersion::FileVersion(const struct stat& status)
+    : device_(status.st_dev), inode_(status.st_ino), size_(status.st_size), modified_(status.st_mtim) {
+    // File times come from this clock, so a write after the read gets this time or a later one.
+    timespec now{};
+    settled_ = clock_gettime(CLOCK_REALTIME_COARSE, &now) == 0 && isBefore(modified_, now);
+}
+
+bool FileVersion::isCurrent(const struct stat& status) const {
+    return settled_ && isSame(status);
+}
+
+bool FileVersion::isSame(const struct stat& status) const {
+    return device_ == status.st_dev && inode_ == status.st_ino && size_ == status.st_size &&
+           modified_.tv_sec == status.st_mtim.tv_sec && modified_.tv_nsec == status.st_mtim.tv_nsec;
+}
+
+}  // namespace vexo

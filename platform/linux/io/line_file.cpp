@@ -1,0 +1,119 @@
+#include "vexo/line_file.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <exception>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "failure.h"
+#include "fault_gate.h"
+#include "io/file_io.h"
+#include "io/trusted_file.h"
+#include "raise.h"
+#include "vexo/system_root.h"
+
+namespace {
+
+constexpr size_t kMaxFile = size_t{16} << 20;
+
+bool hasField(std::string_view line, std::string_view key, std::string_view separators) {
+    while (true) {
+        const size_t end = line.find_first_of(separators);
+        if (line.substr(0, end) == key) return true;
+        if (end == std::string_view::npos) return false;
+        line.remove_prefix(end + 1);
+    }
+}
+
+std::optional<std::string_view> findLine(std::string_view text, std::string_view key, std::string_view separators) {
+    while (!text.empty()) {
+        const size_t end = std::min(text.find('\n'), text.size());
+        std::string_view line = text.substr(0, end);
+        text.remove_prefix(std::min(end + 1, text.size()));
+        if (line.ends_with('\r')) line.remove_suffix(1);
+        if (line.find('\0') == std::string_view::npos && hasField(line, key, separators)) return line;
+    }
+    return {};
+}
+
+bool readRecords(const char* file, std::string& text) {
+    const vexo::RaisedIdentity raised;
+    const vexo::Descriptor fd = vexo::openTrusted(VEXO::SystemPath(file), O_RDONLY);
+    return fd && vexo::readAll(fd.get(), text, kMaxFile);
+}
+
+// Whether the file ends within a line; false with errno when that cannot be told.
+bool endsWithinLine(int fd, off_t size, bool& within) {
+    char last = '\n';
+    if (size > 0 && pread(fd, &last, 1, size - 1) != 1) return false;
+    within = last != '\n';
+    return true;
+}
+
+// Appends by one write; what a full disk cut short is taken back.
+bool append(int fd, std::string line) {
+    bool within = false;
+    const off_t end = lseek(fd, 0, SEEK_END);
+    if (end < 0 || !endsWithinLine(fd, end, within)) return false;
+    if (within) line.insert(line.begin(), '\n');
+    ssize_t written = 0;
+    do {
+        written = write(fd, line.data(), line.size());
+    } while (written < 0 && errno == EINTR);
+    if (written == static_cast<ssize_t>(line.size())) return true;
+    const int failure = written < 0 ? errno : ENOSPC;
+    if (written > 0 && ftruncate(fd, end) != 0) return false;
+    errno = failure;
+    return false;
+}
+
+}  // namespace
+
+int VLIBCFileGetLine(const char* file, const char* key, char* line, int size, const char* separators) try {
+    VEXO_GATE("VLIBCFileGetLine", -1);
+    if (file == nullptr || key == nullptr || *key == '\0' || line == nullptr || size <= 0 || separators == nullptr) {
+        return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    }
+    const int before = errno;
+    line[0] = '\0';
+    std::string text;
+    if (!readRecords(file, text)) return vexo::fail(vexo::errorOfFile(errno));
+    errno = before;
+    const auto found = findLine(text, key, separators);
+    if (!found) return 0;
+    line[found->copy(line, static_cast<size_t>(size) - 1)] = '\0';
+    return 1;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int VLIBCFileAddLine(const char* file, const char* line, int max) try {
+    VEXO_GATE("VLIBCFileAddLine", -1);
+    if (file == nullptr || line == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    const std::string_view text = line;
+    if (max < 0 || text.size() > static_cast<size_t>(max) || text.find_first_of("\r\n") != std::string_view::npos) {
+        return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    }
+    const int before = errno;
+    const vexo::RaisedIdentity raised;
+    const vexo::Descriptor fd = vexo::openTrusted(VEXO::SystemPath(file), O_RDWR | O_APPEND | O_CREAT, 0600);
+    if (!fd || !append(fd.get(), std::string(text) + '\n')) return vexo::fail(vexo::errorOfFile(errno));
+    errno = before;
+    return 0;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int VLIBCSysRename(const char* from, const char* to) try {
+    VEXO_GATE("VLIBCSysRename", -1);
+    if (from == nullptr || to == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    const std::string source = VEXO::SystemPath(from);
+    const std::string target = VEXO::SystemPath(to);
+    if (std::rename(source.c_str(), target.c_str()) == 0) return 0;
+    return vexo::fail(vexo::errorOfFile(errno));
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}

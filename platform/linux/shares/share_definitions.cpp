@@ -1,0 +1,243 @@
+#include "shares/share_definitions.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <iterator>
+#include <unordered_map>
+#include <utility>
+
+#include "shares/definition_lines.h"
+#include "vexo/text.h"
+
+namespace vexo {
+namespace {
+
+constexpr int kIncludeDepth = 16;
+constexpr int kIncludedFiles = 128;
+constexpr size_t kGlobal = SIZE_MAX;
+constexpr size_t kNowhere = SIZE_MAX - 1;  // behind a header that names nothing
+
+char lower(char c) {
+    return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c;
+}
+
+// Names and values: blanks at the ends do not count, several in a row are one.
+std::string withSingleBlanks(std::string_view text) {
+    std::string out;
+    for (const char c : trimmed(text)) {
+        if (!isDefinitionBlank(c) || !isDefinitionBlank(out.back())) out += c;
+    }
+    return out;
+}
+
+// Keys: neither blanks nor case count.
+std::string foldedKey(std::string_view text) {
+    std::string out;
+    for (const char c : text) {
+        if (!isDefinitionBlank(c)) out += lower(c);
+    }
+    return out;
+}
+
+struct KnownKey {
+    std::string_view key;
+    ShareOption option;
+    bool opposite = false;  // a synonym that says yes where the option says no
+};
+constexpr KnownKey kKeys[] = {
+    {"path", ShareOption::path},
+    {"directory", ShareOption::path},
+    {"available", ShareOption::available},
+    {"printable", ShareOption::printable},
+    {"printok", ShareOption::printable},
+    {"browseable", ShareOption::browseable},
+    {"browsable", ShareOption::browseable},
+    {"readonly", ShareOption::readOnly},
+    {"writeable", ShareOption::readOnly, true},
+    {"writable", ShareOption::readOnly, true},
+    {"writeok", ShareOption::readOnly, true},
+    {"validusers", ShareOption::validUsers},
+    {"invalidusers", ShareOption::invalidUsers},
+    {"readlist", ShareOption::readList},
+    {"writelist", ShareOption::writeList},
+    {"vexo:restriction", ShareOption::restriction},
+    {"vexo:encrypted", ShareOption::encrypted},
+    {"vexo:index", ShareOption::index},
+    {"vexo:synced", ShareOption::synced},
+    {"vexo:ftp", ShareOption::ftp},
+    {"vexo:acl", ShareOption::acl},
+};
+
+class Parser {
+ public:
+    explicit Parser(const IncludeReader& include) : include_(include) {}
+
+    // `file` names an included text in what is said about its lines.
+    void parse(std::string_view text, const std::string& file) {
+        DefinitionLines lines(text);
+        std::string line;
+        int number = 0;
+        while (lines.next(line, number)) {
+            place_ = "line " + std::to_string(number) + (file.empty() ? "" : " of " + file);
+            if (line.front() == '[') {
+                takeHeader(line);
+            } else {
+                takeOption(line);
+            }
+        }
+    }
+    Definitions result() { return std::move(out_); }
+
+ private:
+    void takeHeader(std::string_view line);
+    void takeOption(std::string_view line);
+    void store(const KnownKey& known, std::string text);
+    void copyFrom(const std::string& name);
+    void includeFile(const std::string& file);
+    void fault(const std::string& what);
+
+    const IncludeReader& include_;
+    Definitions out_;
+    OptionValues defaults_;
+    std::unordered_map<std::string, size_t> byName_;
+    size_t current_ = kGlobal;  // lines above every header are global
+    std::string place_;         // of the line at hand
+    int depth_ = 0;
+    int included_ = 0;
+};
+
+// A section with a line that could have been a restriction is worth nothing, so the fault stays with it.
+void Parser::fault(const std::string& what) {
+    std::string text = place_ + ": " + what;
+    if (current_ == kGlobal || current_ == kNowhere) {
+        out_.problems.push_back(std::move(text));
+    } else if (out_.sections[current_].fault.empty()) {
+        out_.sections[current_].fault = std::move(text);
+    }
+}
+
+void Parser::takeHeader(std::string_view line) {
+    const size_t end = line.find(']');
+    std::string name = end == std::string_view::npos ? std::string() : withSingleBlanks(line.substr(1, end - 1));
+    if (name.empty()) {
+        current_ = kNowhere;
+        fault("a section without a name");
+        return;
+    }
+    const std::string key = foldedKey(name);
+    if (key == "global" || key == "globals") {
+        current_ = kGlobal;
+        return;
+    }
+    const auto [place, isNew] = byName_.emplace(foldedName(name), out_.sections.size());
+    current_ = place->second;
+    if (isNew) out_.sections.push_back({std::move(name), defaults_, {}});
+}
+
+void Parser::takeOption(std::string_view line) {
+    if (current_ == kNowhere) return;
+    const size_t equals = line.find('=');
+    const std::string key = foldedKey(line.substr(0, equals));
+    if (equals == std::string_view::npos || key.empty()) {
+        fault("neither a section nor an option");
+        return;
+    }
+    std::string text = withSingleBlanks(line.substr(equals + 1));
+    if (key == "include") {
+        includeFile(text);
+    } else if (key == "copy") {
+        copyFrom(text);
+    } else {
+        const auto* known =
+            std::find_if(std::begin(kKeys), std::end(kKeys), [&](const auto& k) { return k.key == key; });
+        if (known != std::end(kKeys)) store(*known, std::move(text));
+    }
+}
+
+void Parser::store(const KnownKey& known, std::string text) {
+    if (known.opposite) {
+        // What is no boolean stays as it is, for whoever reads the option to refuse.
+        if (const auto says = parseBoolean(text)) text = *says ? "no" : "yes";
+    }
+    OptionValues& values = current_ == kGlobal ? defaults_ : out_.sections[current_].values;
+    values[static_cast<size_t>(known.option)] = {std::move(text), true, current_ != kGlobal};
+}
+
+// Everything the other section has, its defaults too, except what this one stated itself.
+void Parser::copyFrom(const std::string& name) {
+    if (current_ == kGlobal) return;
+    const auto source = byName_.find(foldedName(name));
+    if (source == byName_.end() || source->second == current_) {
+        fault("copies a section that is not above it");
+        return;
+    }
+    const DefinitionSection& from = out_.sections[source->second];
+    DefinitionSection& to = out_.sections[current_];
+    for (size_t i = 0; i < kShareOptions; ++i) {
+        if (!to.values[i].own) to.values[i] = {from.values[i].text, from.values[i].stated, false};
+    }
+    if (!from.fault.empty()) fault("copies a section with a fault");
+}
+
+void Parser::includeFile(const std::string& file) {
+    const size_t includer = current_;
+    if (depth_ == kIncludeDepth || included_ == kIncludedFiles) {
+        fault("too many files are included");
+        return;
+    }
+    ++included_;
+    const std::optional<std::string> text = include_(file);
+    if (!text) {
+        fault("the included file cannot be read");
+        return;
+    }
+    ++depth_;
+    parse(*text, file);
+    --depth_;
+    // A file that ends behind a broken header must not swallow what its includer says next.
+    if (current_ == kNowhere) current_ = includer;
+}
+
+}  // namespace
+
+Definitions parseDefinitions(std::string_view text, const IncludeReader& include) {
+    Parser parser(include);
+    parser.parse(text, {});
+    return parser.result();
+}
+
+std::vector<std::string> splitList(std::string_view text) {
+    std::vector<std::string> entries;
+    std::string entry;
+    bool quoted = false;
+    bool begun = false;
+    for (const char c : text) {
+        if (c == '"') {
+            quoted = !quoted;
+            begun = true;
+        } else if (quoted || (c != ',' && c != ';' && !isDefinitionBlank(c))) {
+            entry += c;
+            begun = true;
+        } else if (begun) {
+            entries.push_back(std::exchange(entry, {}));
+            begun = false;
+        }
+    }
+    if (begun) entries.push_back(std::move(entry));
+    return entries;
+}
+
+std::optional<bool> parseBoolean(std::string_view text) {
+    const std::string word = foldedKey(text);
+    if (word == "yes" || word == "true" || word == "on" || word == "1") return true;
+    if (word == "no" || word == "false" || word == "off" || word == "0") return false;
+    return std::nullopt;
+}
+
+std::string foldedName(std::string_view name) {
+    std::string key;
+    VEXO::AppendFoldKey(name, key);
+    return key;
+}
+
+}  // namespace vexo
