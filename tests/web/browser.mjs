@@ -13,7 +13,7 @@ export const PASSWORDS = {
   bob: process.env.ORVEL_TEST_BOB,
   admin: process.env.ORVEL_TEST_ADMIN,
 };
-const SCREENSHOTS = process.env.ORVEL_TEST_SCREENSHOTS ?? mkdtempSync(join(tmpdir(), "orvel-screenshots-"));
+const SCREENSHOTS = process.env.ORVEL_TEST_SCREENSHOTS;
 
 if (!existsSync(PROGRAM)) throw new Error(`${PROGRAM} is not installed: script/bootstrap does that`);
 if (!URL_OF_PAGE) throw new Error("ORVEL_TEST_URL is not set: run tests/web/run.sh");
