@@ -2,22 +2,16 @@
 #ifndef ORVEL_TESTS_SEARCH_FIXTURE_H
 #define ORVEL_TESTS_SEARCH_FIXTURE_H
 
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <functional>
 #include <map>
-#include <memory>
-#include <string>
-#include <vector>
 
 #include "orvel/directory_walker.h"
 #include "orvel/file_record.h"
+#include "orvel/identity.h"
 #include "orvel/search_criteria.h"
 #include "orvel/search_task.h"
 #include "orvel/search_walker.h"
-#include "support/appliance.h"
+#include "support/log_texts.h"
+#include "support/testing.h"
 
 namespace support {
 
@@ -56,7 +50,7 @@ class Criteria {
 };
 
 // "share/path" to every other column but the access time, which reading a folder changes.
-using Rows = std::map<std::string, std::string>;
+using Found = std::map<std::string, std::string>;
 
 inline std::string keyOf(const __tag_FI_FILE_INFO_DATA& record) {
     return std::string(record.szShare) + "/" + record.szPath;
@@ -72,12 +66,12 @@ inline BOOL addRow(__tag_FI_FILE_INFO_DATA* record, void* rows) {
                                  record->modified, int64_t{record->mode}, int64_t{record->uid}, int64_t{record->gid}}) {
         (text += std::to_string(number)) += '|';
     }
-    EXPECT_TRUE(static_cast<Rows*>(rows)->emplace(keyOf(*record), text).second) << "twice: " << keyOf(*record);
+    EXPECT_TRUE(static_cast<Found*>(rows)->emplace(keyOf(*record), text).second) << "twice: " << keyOf(*record);
     return 1;
 }
 
-inline Rows rowsOf(FileSearch::OrvSearchDBTask& task) {
-    Rows rows;
+inline Found rowsOf(FileSearch::OrvSearchDBTask& task) {
+    Found rows;
     unsigned long long count = 0;
     EXPECT_TRUE(task.queryResult(0, 1000000, nullptr, nullptr, nullptr, nullptr, addRow, &rows, &count));
     EXPECT_EQ(count, rows.size());
@@ -103,7 +97,7 @@ class OneSearch {
 };
 
 // The rows of a search that must succeed.
-inline Rows search(const char* user, const Query& query) {
+inline Found search(const char* user, const Query& query) {
     const Criteria criteria(query.asks);
     OneSearch run(user, query.folders, criteria.all);
     run.walker.setSearchCurrentDir(query.currentOnly);
@@ -111,7 +105,7 @@ inline Rows search(const char* user, const Query& query) {
     return rowsOf(run.task);
 }
 
-inline std::vector<std::string> keysOf(const Rows& rows) {
+inline std::vector<std::string> keysOf(const Found& rows) {
     std::vector<std::string> keys;
     for (const auto& [key, text] : rows) keys.push_back(key);
     return keys;

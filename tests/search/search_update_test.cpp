@@ -1,24 +1,11 @@
 // Results that stay true: updates after file operations, and pages of them.
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <algorithm>
-#include <filesystem>
-#include <string>
-
-#include "fault_gate.h"
 #include "search/search_fixture.h"
-#include "support/log_texts.h"
-#include "vexo/error.h"
 
 using namespace FileSearch;
-using namespace support;
-namespace fs = std::filesystem;
 
 namespace {
 
-_tag_VEXOSTAT_ statusOf(const std::string& path) {
+_tag_VEXOSTAT_ recordOf(const std::string& path) {
     _tag_VEXOSTAT_ status{};
     EXPECT_EQ(VLIBCFileLStat(path.c_str(), 9, &status), 0) << path;
     return status;
@@ -35,7 +22,7 @@ class SearchUpdateTest : public SearchFixture {
         for (const auto& entry : fs::recursive_directory_iterator(to, isFile)) {
             if (entry.is_regular_file()) chmod(entry.path().c_str(), 0640);
         }
-        auto status = statusOf(to);
+        auto status = recordOf(to);
         EXPECT_TRUE(screen_->updateFile(fromShare, from, toShare, to, status));
         EXPECT_TRUE(screen_->updateFileInFolder(fromShare, from, toShare, to));
         refresh(fromShare, fs::path(from).parent_path());
@@ -49,11 +36,11 @@ class SearchUpdateTest : public SearchFixture {
     void refresh(const std::string& share, const std::string& path, const char* user = nullptr,
                  const char* group = nullptr) {
         if (path == shareRoot("photo") || path == shareRoot("docs")) return;
-        auto status = statusOf(path);
+        auto status = recordOf(path);
         EXPECT_TRUE(screen_->updatePermRecs(share, path, user, group, status));
     }
     void insert(const std::string& share, const std::string& path, const char* owner, const char* group) {
-        auto status = statusOf(path);
+        auto status = recordOf(path);
         EXPECT_TRUE(screen_->insertFile(share, path, owner, group, status));
         refresh(share, fs::path(path).parent_path());
     }
@@ -120,7 +107,7 @@ TEST_F(SearchUpdateTest, AfterEachOperationTheResultsAreThoseOfANewSearch) {
         expectTruth("files added");
 
         makeFile(photo + "/late/f");
-        const Rows before = rowsOf(*screen_);
+        const Found before = rowsOf(*screen_);
         move("photo", photo + "/late", "photo", photo + "/later");
         EXPECT_TRUE(screen_->delRecs("docs", photo + "/dx")) << "another share";
         EXPECT_EQ(rowsOf(*screen_), before) << "what is not among the results stays out of them";
@@ -131,8 +118,8 @@ TEST_F(SearchUpdateTest, BadPathsAndFailingDatabases) {
     SKIP_WITHOUT_ROOT();
     makeFile(shareRoot("photo") + "/d/f");
     onScreen([&] {
-        const Rows before = rowsOf(*screen_);
-        auto status = statusOf(shareRoot("photo") + "/d/f");
+        const Found before = rowsOf(*screen_);
+        auto status = recordOf(shareRoot("photo") + "/d/f");
         const std::string good = shareRoot("photo") + "/d", tooLong = "/tmp/photo/" + std::string(5000, 'x');
         struct Operation {
             std::function<bool(const std::string&)> call;
@@ -177,7 +164,7 @@ TEST_F(SearchUpdateTest, BadPathsAndFailingDatabases) {
 }
 
 struct Page {
-    std::string (*column)(const __tag_FI_FILE_INFO_DATA&);
+    std::function<std::string(const __tag_FI_FILE_INFO_DATA&)> column;
     std::vector<std::string> columns, shares;
 };
 
@@ -185,10 +172,6 @@ BOOL addToPage(__tag_FI_FILE_INFO_DATA* record, void* page) {
     static_cast<Page*>(page)->columns.push_back(static_cast<Page*>(page)->column(*record));
     static_cast<Page*>(page)->shares.emplace_back(record->szShare);
     return 1;
-}
-
-std::string padded(int64_t number) {
-    return std::string(20 - std::to_string(number).size(), '0') + std::to_string(number);
 }
 
 TEST_F(SearchUpdateTest, PagesInEveryOrder) {
@@ -200,37 +183,43 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
         makeFile(path, i * 37 % 60, owners[i % 4], owners[i % 3], i * 41 % 60, i * 43 % 60);
         chmod(path.c_str(), 0600 | (i * 8 % 64));
     }
-    using Record = const __tag_FI_FILE_INFO_DATA&;
-    const std::pair<const char*, std::string (*)(Record)> words[] = {
-        {"name", [](Record r) { return std::string(r.szName); }},
-        {"any other word", [](Record r) { return std::string(r.szName); }},
-        {"size", [](Record r) { return padded(r.size); }},
-        {"mtime", [](Record r) { return padded(r.modified); }},
-        {"crtime", [](Record r) { return padded(r.created); }},
-        {"ctime", [](Record r) { return padded(r.changed); }},
-        {"atime", [](Record r) { return padded(r.accessed); }},
-        {"user", [](Record r) { return std::string(r.szOwner); }},
-        {"group", [](Record r) { return std::string(r.szGroup); }},
-        {"posix", [](Record r) { return std::string(r.szPermission); }},
-        {"type", [](Record r) { return std::string(r.szExtension); }},
-        {"ppath", [](Record r) { return std::string(r.szParent); }},
+    using Data = __tag_FI_FILE_INFO_DATA;
+    const auto text = [](const char* const Data::*member) {
+        return [=](const Data& record) { return std::string(record.*member); };
+    };
+    const auto number = [](int64_t Data::*member) {
+        return [=](const Data& record) {
+            return std::to_string((uint64_t{1} << 62) + static_cast<uint64_t>(record.*member));
+        };
     };
     onScreen([&] {
         unsigned long long count = 0;
-        for (const auto& [word, column] : words) {
+        for (const auto& [word, column] :
+             Rows<std::string, std::function<std::string(const Data&)>>{{"name", text(&Data::szName)},
+                                                                        {"any other word", text(&Data::szName)},
+                                                                        {"size", number(&Data::size)},
+                                                                        {"mtime", number(&Data::modified)},
+                                                                        {"crtime", number(&Data::created)},
+                                                                        {"ctime", number(&Data::changed)},
+                                                                        {"atime", number(&Data::accessed)},
+                                                                        {"user", text(&Data::szOwner)},
+                                                                        {"group", text(&Data::szGroup)},
+                                                                        {"posix", text(&Data::szPermission)},
+                                                                        {"type", text(&Data::szExtension)},
+                                                                        {"ppath", text(&Data::szParent)}}) {
             for (const bool ascending : {true, false}) {
-                SCOPED_TRACE(std::string(word) + (ascending ? " ascending" : " descending"));
+                SCOPED_TRACE(word + (ascending ? " ascending" : " descending"));
                 Page page{column, {}, {}};
                 for (unsigned long offset = 0; offset < 66; offset += 7) {
-                    EXPECT_TRUE(
-                        screen_->queryResult(offset, 7, word, &ascending, nullptr, "", addToPage, &page, &count));
-                    EXPECT_EQ(count, 66U);
+                    EXPECT_TRUE(screen_->queryResult(offset, 7, word.c_str(), &ascending, nullptr, "", addToPage, &page,
+                                                     &count));
                 }
                 auto sorted = page.columns;
                 std::sort(sorted.begin(), sorted.end());
                 if (!ascending) std::reverse(sorted.begin(), sorted.end());
                 EXPECT_EQ(page.columns, sorted);
-                for (size_t i = 1; std::string(word) == "ppath" && i < 66; ++i) {  // shares the other way round
+                EXPECT_EQ(sorted.size(), 66U);
+                for (size_t i = 1; word == "ppath" && i < 66; ++i) {  // shares the other way round
                     if (page.columns[i] != page.columns[i - 1]) continue;
                     EXPECT_TRUE(ascending ? page.shares[i - 1] >= page.shares[i]
                                           : page.shares[i - 1] <= page.shares[i]);
@@ -240,17 +229,18 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
         // Without a word or a direction: by name, ascending.
         const bool descending = false;
         for (const bool withWord : {true, false}) {
-            Page page{words[0].second, {}, {}};
+            Page page{text(&Data::szName), {}, {}};
             EXPECT_TRUE(screen_->queryResult(0, 99, withWord ? "size" : nullptr, withWord ? nullptr : &descending,
                                              nullptr, nullptr, addToPage, &page, &count));
             EXPECT_TRUE(page.columns.size() == 66 && std::is_sorted(page.columns.begin(), page.columns.end()));
         }
-        const std::tuple<_tag_dir_entry_type_, const char*, size_t> filters[] = {
-            {DIR_ENTRY_TYPE_ALL, nullptr, 66}, {DIR_ENTRY_TYPE_DIR, "", 6},     {DIR_ENTRY_TYPE_FILE, nullptr, 60},
-            {DIR_ENTRY_TYPE_DIR, "F1", 2},     {DIR_ENTRY_TYPE_FILE, "f1/", 0}, {DIR_ENTRY_TYPE_ALL, ".4", 12},
-        };
-        for (const auto& [type, name, expected] : filters) {
-            Page page{words[0].second, {}, {}};
+        for (const auto& [type, name, expected] :
+             Rows<_tag_dir_entry_type_, const char*, size_t>{{DIR_ENTRY_TYPE_DIR, "", 6},
+                                                             {DIR_ENTRY_TYPE_FILE, nullptr, 60},
+                                                             {DIR_ENTRY_TYPE_DIR, "F1", 2},
+                                                             {DIR_ENTRY_TYPE_FILE, "f1/", 0},
+                                                             {DIR_ENTRY_TYPE_ALL, ".4", 12}}) {
+            Page page{text(&Data::szName), {}, {}};
             EXPECT_TRUE(screen_->queryResult(1, 99, nullptr, nullptr, &type, name, addToPage, &page, &count));
             EXPECT_EQ(count, expected) << type;
             EXPECT_EQ(page.columns.size() + (expected == 0 ? 0 : 1), expected);
@@ -259,32 +249,14 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
         EXPECT_FALSE(screen_->queryResult(0, 0, nullptr, nullptr, nullptr, nullptr, addToPage, nullptr, &count));
         EXPECT_FALSE(screen_->queryResult(0, 1, nullptr, nullptr, nullptr, nullptr, addToPage, nullptr, nullptr));
         EXPECT_EQ(vexo::gate::calls("*"), 0) << "refused before the database is touched";
-    });
-}
-
-TEST_F(SearchUpdateTest, ResultFilesThatAreNone) {
-    SKIP_WITHOUT_ROOT();
-    const std::string elsewhere = shareRoot("photo") + "/f";
-    makeFile(elsewhere);
-    onScreen([&] {
-        const std::string path = screen_->getDBTaskFilePath();
-        const std::function<void()> kinds[] = {
-            [&] { fs::rename(path, path + "-valid"); },
-            [&] { fs::copy_file(path + "-valid", path), fs::resize_file(path, fs::file_size(path) / 2); },
-            [&] { fs::create_symlink(path + "-valid", path); },
-            [&] { EXPECT_EQ(mkfifo(path.c_str(), 0600), 0); },
-        };
-        for (const auto& make : kinds) {
-            make();
-            unsigned long long count = 0;
-            EXPECT_FALSE(screen_->queryResult(0, 10, nullptr, nullptr, nullptr, nullptr, addRow, nullptr, &count));
-            EXPECT_FALSE(screen_->delRecs("photo", elsewhere));
-            const auto log = takeLogTexts();
-            ASSERT_EQ(log.size(), 2U);
-            EXPECT_EQ(log[0], "orvelsearch:# Fail to Select the record from DB " + path);
-            fs::remove(path);
+        for (const auto& [call, log] : Rows<const char*, const char*>{{"FILEIDXCountGet", "Select the record from"},
+                                                                      {"FILEIDXDBSelect", "select data from"}}) {
+            vexo::gate::fail(call, VEXO_ERR_GENERAL, EIO);
+            EXPECT_FALSE(screen_->queryResult(0, 1, nullptr, nullptr, nullptr, nullptr, addToPage, nullptr, &count));
+            EXPECT_EQ(takeLogText(),
+                      std::string("orvelsearch:# Fail to ") + log + " DB " + screen_->getDBTaskFilePath());
+            vexo::gate::reset();
         }
-        fs::remove(path + "-valid");
     });
 }
 
