@@ -311,11 +311,17 @@ std::string levels(int count) {
     return path;
 }
 
-// In memory where there is a place for it, since a disk takes half a minute to remove the tree.
+// In memory where there is a place for it: a disk takes half a minute to remove a deep tree, and memory delivers the
+// newest entry first.
+std::string folderInMemory() {
+    std::string base = access("/dev/shm", W_OK) == 0 ? "/dev/shm/orveldeep-XXXXXX" : "/tmp/orveldeep-XXXXXX";
+    EXPECT_NE(mkdtemp(base.data()), nullptr);
+    return base;
+}
+
 TEST_F(DirectoryWalkerTest, FourThousandLevelsWithFewDescriptors) {
     constexpr int kDepth = 4000;
-    std::string base = access("/dev/shm", W_OK) == 0 ? "/dev/shm/orveldeep-XXXXXX" : "/tmp/orveldeep-XXXXXX";
-    ASSERT_NE(mkdtemp(base.data()), nullptr);
+    const std::string base = folderInMemory();
     ASSERT_EQ(chdir(base.c_str()), 0);
     for (int i = 0; i < kDepth; ++i) {
         close(open("f", O_CREAT | O_WRONLY | O_CLOEXEC, 0644));
@@ -353,7 +359,7 @@ TEST_F(DirectoryWalkerTest, FoldersMovedAboveADeepWalk) {
     constexpr int kDepth = 100;
     for (const auto& [alsoAbove, errors] :
          Rows<bool, int>{row(false, 2), row(true, int{ENUM_IGNORE_ALL_ERR}), row(true, 2)}) {
-        const std::string root = root_ + "/root", elsewhere = root_ + "/elsewhere";
+        const std::string base = folderInMemory(), root = base + "/root", elsewhere = base + "/elsewhere";
         makeFolder(elsewhere);
         for (int i = 0; i < kDepth; ++i) writeFile(root + levels(i) + "/f", "");
         makeFolder(root + levels(kDepth));
@@ -372,8 +378,7 @@ TEST_F(DirectoryWalkerTest, FoldersMovedAboveADeepWalk) {
         EXPECT_EQ(takeLogText(),
                   done ? "" : "orveldir:# Failed to open " + root + levels(10) + ", error No such file or directory");
         EXPECT_EQ(std::count(lines_.begin(), lines_.end(), "-show/d"), done ? 1 : 0);
-        fs::remove_all(root);
-        fs::remove_all(elsewhere);
+        fs::remove_all(base);
     }
 }
 

@@ -111,6 +111,7 @@ TEST_F(ShareListingTest, SharesOfDomainAndDirectoryUsers) {
     addUser("DOM\\dave", 30001, kUsersGid);
     addUser("erin@directory", 30002, kUsersGid);
     addShare("domain", "valid users = DOM\\dave\n");
+    addShare("veiled", "valid users = DOM\\dave\nbrowseable = no\n");
     addShare("directory", "valid users = erin@directory\n");
     ASSERT_TRUE(list("DOM\\dave"));
     EXPECT_EQ(names(), Names{"domain"});
