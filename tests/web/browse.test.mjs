@@ -196,6 +196,10 @@ test("dark, German, on a phone", async () => {
       await page.waitForFunction(() => location.hash === "#/photo/2016");
       assert.ok(await page.evaluate(() => document.documentElement.scrollWidth <= innerWidth));
       await page.tap("#menu-button");
+      assert.equal(await page.evaluate(() => document.activeElement.role), "treeitem");
+      await page.keyboard.press("Escape");
+      assert.equal(await page.evaluate(() => document.activeElement.id), "menu-button");
+      await page.tap("#menu-button");
       await page.tap("#tree >> text=music");
       await page.waitForSelector("#view >> text=Night Trains");
     },
@@ -281,6 +285,41 @@ test("a typed path, a filter, a place that is not there any more", () =>
     await page.waitForSelector(".state >> text=Nothing here matches");
     await page.keyboard.press("Escape");
     await page.waitForSelector("#view >> text=plan.pdf");
+  }));
+
+test("the keyboard alone is never lost", () =>
+  withPage(chrome, "alice", { path: "/projects/house" }, async (page) => {
+    const held = () => page.evaluate(() => document.activeElement.id || document.activeElement.dataset.sort);
+    await page.focus("[data-command=newFolder]");
+    await page.keyboard.press("Enter");
+    const box = await page.locator(".dialog .field").boundingBox();
+    await page.mouse.click(box.x - 8, box.y + 8); // beside the field, and still in the dialog
+    await page.fill(".dialog .input", "by keyboard");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector("#view .row.selected >> text=by keyboard");
+    await page.waitForFunction(() => document.activeElement.id === "view");
+    await page.focus("[data-sort=size]");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector("[aria-sort=ascending] [data-sort=size]");
+    assert.equal(await held(), "size");
+    await page.focus("#view");
+    await page.keyboard.press("Home");
+    await page.keyboard.press("Shift+F10");
+    await page.waitForSelector(".menu >> text=Rename");
+    await page.keyboard.press("Escape");
+    await page.keyboard.press("Delete");
+    await page.focus(".activity-card.good button");
+    await page.keyboard.press("Enter");
+    assert.equal(await held(), "view");
+    await page.keyboard.press("Alt+2");
+    await page.click("#sort-button");
+    await page.click(".menu >> text=Name");
+    await page.keyboard.press("Control+l");
+    await page.click("#find");
+    assert.equal(await held(), "find");
+    await page.click("#search-button");
+    await page.keyboard.press("Escape");
+    assert.equal(await held(), "search-button");
   }));
 
 test("every module is fetched at once", async () => {

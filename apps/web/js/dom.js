@@ -47,6 +47,16 @@ export function iconButton(name, label, onclick, extra = {}) {
 
 export const $ = (id) => document.getElementById(id);
 
+// What `change` takes away may have held the keyboard: it goes on with what came in its place, else with the list.
+export function keepFocus(box, change) {
+  const held = box.contains(document.activeElement) ? document.activeElement : null;
+  change();
+  if (!held || held.isConnected) return;
+  const name = ["id", "data-command", "data-sort", "aria-label"].find((one) => held.hasAttribute(one));
+  const like = name && box.querySelector(`[${name}="${CSS.escape(held.getAttribute(name))}"]`);
+  (like ?? $("view")).focus({ preventScroll: true });
+}
+
 const BIDI = {
   "\u202A": "LRE",
   "\u202B": "RLE",

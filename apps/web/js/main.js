@@ -71,7 +71,7 @@ function showPlace() {
     paintListing();
   }
   // The keyboard works from the start.
-  if (!home && document.activeElement === document.body) $("view").focus({ preventScroll: true });
+  if (document.activeElement === document.body) (homeShown ?? $("view")).focus({ preventScroll: true });
   paintVolume($("volume"), shareEntry(browser.id));
 }
 
@@ -136,13 +136,19 @@ function setupFind() {
 }
 
 function setupSidebar() {
+  const button = $("menu-button");
   const close = () => {
+    if (!$("side").classList.contains("open")) return;
+    if ($("side").contains(document.activeElement)) button.focus();
     $("side").classList.remove("open");
-    document.querySelector(".side-scrim")?.remove();
+    document.querySelector(".side-scrim").remove();
+    button.setAttribute("aria-expanded", "false");
   };
-  $("menu-button").addEventListener("click", () => {
+  button.addEventListener("click", () => {
     $("side").classList.add("open");
     document.body.append(h("div.side-scrim", { onclick: close }));
+    button.setAttribute("aria-expanded", "true");
+    $("tree").querySelector("[tabindex='0']")?.focus();
   });
   on("place", close);
   addEventListener("keydown", (event) => {

@@ -66,12 +66,12 @@ export function editPath() {
     paint(browser.id);
     // Bytes that cannot be typed stay when nothing was typed over them.
     if (accept) go(typed === text ? before : normaliseId(encodePath(typed)));
-    document.getElementById("view").focus({ preventScroll: true });
   };
   input.addEventListener("keydown", (event) => {
     event.stopPropagation();
-    if (event.key === "Enter") finish(true);
-    if (event.key === "Escape") finish(false);
+    if (event.key !== "Enter" && event.key !== "Escape") return;
+    finish(event.key === "Enter");
+    document.getElementById("view").focus({ preventScroll: true });
   });
   input.addEventListener("blur", () => finish(false));
   bar.append(input);

@@ -12,13 +12,28 @@ export function setupPointer() {
   root.addEventListener("dblclick", (event) => {
     if (indexOf(event) >= 0 && !event.target.closest("button") && !event.ctrlKey && !event.shiftKey) runCommand("open");
   });
-  root.addEventListener("contextmenu", (event) => {
+  // What stands in place of a list, when it is empty, lies beside it.
+  root.parentElement.addEventListener("contextmenu", (event) => {
+    if (root.hidden) return;
     event.preventDefault();
+    if (event.target === root && isFromKeyboard(event)) return menuAtCursor();
     const index = indexOf(event);
     if (index < 0) browser.selection.clear();
     else if (!browser.selection.has(index)) browser.selection.pick(index);
     openMenu(contextItems(), { x: event.clientX, y: event.clientY });
   });
+}
+
+function isFromKeyboard(event) {
+  return event.button !== 2 && !event.ctrlKey && event.pointerType !== "touch";
+}
+
+function menuAtCursor() {
+  const { listing, selection, view } = browser;
+  if (selection.count === 0 && listing.item(selection.cursor)) selection.pick(selection.cursor);
+  view.reveal(selection.cursor);
+  const box = (view.rowAt(selection.cursor) ?? view.root).getBoundingClientRect();
+  openMenu(contextItems(), { x: box.left + 48, y: box.top + 30 });
 }
 
 function indexOf(event) {

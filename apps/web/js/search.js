@@ -24,6 +24,9 @@ export function setupSearch() {
     if (isSearch(id)) asked = recall(id) ?? asked;
     else closePanel();
   });
+  $("panel").addEventListener("keydown", (event) => {
+    if (event.key === "Escape") closePanel();
+  });
   $("search-button").addEventListener("click", () => ($("panel").hidden ? openSearch() : closePanel()));
 }
 
@@ -55,6 +58,7 @@ export function openSearch() {
 }
 
 function closePanel() {
+  if ($("panel").contains(document.activeElement)) $("search-button").focus();
   $("panel").hidden = true;
   $("search-button").setAttribute("aria-expanded", "false");
 }

@@ -2,7 +2,7 @@
 
 import { browser, setKind } from "./browser.js";
 import { command, context, runCommand, shortcutText } from "./commands.js";
-import { $, h, icon, iconButton } from "./dom.js";
+import { $, h, icon, iconButton, keepFocus } from "./dom.js";
 import { on } from "./events.js";
 import { openMenu } from "./menu.js";
 import { searchStatus } from "./search.js";
@@ -135,8 +135,9 @@ function paintToolbar(setSort) {
         ),
       ),
     ];
-    bar.replaceChildren(...[...left, h("span.grow"), ...right].filter(Boolean));
+    keepFocus(bar, () => bar.replaceChildren(...[...left, h("span.grow"), ...right].filter(Boolean)));
     bar.classList.toggle("on-chosen", now.count > 0);
+    bar.classList.toggle("grid-mode", browser.mode === "grid");
   }
   if (now.count > 0) $("chosen-count").textContent = t("select.count", { count: now.count });
   $("view").classList.toggle("choosing", now.count > (matchMedia("(pointer: coarse)").matches ? 0 : 1));

@@ -148,7 +148,6 @@ function clicked(event) {
   else {
     go(id);
     if (nodes.get(id)?.item.getAttribute("aria-expanded") === "false") expand(id);
-    document.getElementById("app").dispatchEvent(new CustomEvent("side-close"));
   }
 }
 

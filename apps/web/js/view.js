@@ -1,6 +1,6 @@
 // The rows (or tiles) of a long list: only those in sight are in the document.
 
-import { h } from "./dom.js";
+import { h, keepFocus } from "./dom.js";
 import { makeRow, fillRow, makeHeader } from "./rows.js";
 
 // Browsers lose precision beyond some ten million pixels; longer lists scroll at a scale.
@@ -32,7 +32,7 @@ export class View {
     this.header = mode === "list" ? makeHeader(columns) : null;
     this.root.className = `view ${mode} ${columns.map((column) => `has-${column.id}`).join(" ")}`;
     this.root.setAttribute("role", mode === "list" ? "grid" : "listbox");
-    this.root.replaceChildren(...(this.header ? [this.header] : []), this.canvas);
+    keepFocus(this.root, () => this.root.replaceChildren(...(this.header ? [this.header] : []), this.canvas));
     this.root.scrollTop = 0;
     this.render();
   }
