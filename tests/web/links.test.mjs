@@ -15,6 +15,8 @@ async function makeLink(page, name, password) {
   await page.fill("[name=password]", password);
   await page.click(".dialog >> text=Create link");
   const address = await page.inputValue(".address");
+  await page.click(".dialog >> text=Copy link");
+  await page.click(".toast:has-text('Link copied') button");
   await screenshot(page, "link");
   await page.keyboard.press("Escape");
   return address;

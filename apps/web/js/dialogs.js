@@ -29,12 +29,17 @@ export function dialog({ title, className = "", fill, wide = false }) {
       resolve(answer);
     });
     node.addEventListener("mousedown", (event) => {
-      if (event.target === node) close(null);
+      if (event.target === node && isOutside(event, node.getBoundingClientRect())) close(null);
     });
     document.body.append(node);
     node.showModal();
     (node.querySelector("[autofocus]") ?? node.querySelector("footer .button:last-child"))?.focus();
   });
+}
+
+// The ground around a dialog, unlike the room between its parts.
+function isOutside({ clientX, clientY }, { left, right, top, bottom }) {
+  return clientX < left || clientX > right || clientY < top || clientY > bottom;
 }
 
 // One line of text. `check(text)` gives a complaint or "", `submit(text)` does it and throws what fails.
@@ -125,9 +130,19 @@ export function setWhy(handler) {
   onWhy = handler;
 }
 
+const rack = document.getElementById("toasts");
+
+// Below an open dialog nobody would see a message, or could reach it.
+function raise() {
+  const top = [...document.querySelectorAll("dialog[open]")].at(-1) ?? document.body;
+  if (rack.parentElement !== top) top.append(rack);
+}
+
+document.addEventListener("close", (event) => event.target.contains(rack) && raise(), true);
+
 // A short message at the foot of the page. {text, hint, kind, actions: [{label, run}]}
 export function toast({ text, hint = "", kind = "", actions = [], life = kind === "failed" ? 12000 : 5000 }) {
-  const rack = document.getElementById("toasts");
+  raise();
   const node = h("div.toast", { role: kind === "failed" ? "alert" : "status" });
   if (kind) node.classList.add(kind);
   const remove = () => node.remove();
@@ -155,7 +170,7 @@ export function toast({ text, hint = "", kind = "", actions = [], life = kind ==
 }
 
 export function dismissToasts() {
-  document.getElementById("toasts").replaceChildren();
+  rack.replaceChildren();
 }
 
 // `id` is what the failure was about, for asking why.
