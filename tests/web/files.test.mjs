@@ -62,6 +62,12 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     await page.click(".dialog >> text=Keep both");
     await page.waitForSelector("#view >> text=four (2).txt");
     assert.equal(await page.locator(".dialog").count(), 0);
+    await upload(page, "Upload files", some);
+    await page.locator(".dialog >> text=The file exists already").waitFor();
+    await page.keyboard.press("Escape");
+    await card(page, "Cancelled").waitFor();
+    await page.waitForTimeout(300);
+    assert.equal(await page.locator(".dialog").count(), 0); // though three stood in line
     for (const name of some) writeFileSync(name, "newer");
     await upload(page, "Upload files", some);
     await page.click(".dialog >> text=Replace");
@@ -85,6 +91,12 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     });
     await card(page, "1 file to trip").filter({ hasText: "1 file uploaded" }).waitFor();
     assert.equal(readFileSync(join(there, "trip/from outside.txt"), "utf8"), "dropped");
+
+    await page.evaluate(async (id) => {
+      const { startUpload } = await import("/js/uploads.js");
+      startUpload([{ parts: ["nothing in it"] }], id);
+    }, await page.evaluate(() => location.hash.slice(1)));
+    await card(page, "1 folder to").filter({ hasText: "1 done" }).waitFor();
 
     // The network is slow enough that there is something to cancel.
     const session = await page.context().newCDPSession(page);

@@ -1,6 +1,6 @@
 // What goes on at the moment: a panel with a card for each upload or task.
 
-import { $, h, icon, iconButton, plainName } from "./dom.js";
+import { $, announce, h, icon, iconButton, keepFocus, plainName } from "./dom.js";
 import { t } from "./strings.js";
 
 const MOST_ERRORS = 50;
@@ -85,12 +85,13 @@ export class Card {
     this.detail.textContent = detail;
     this.button.setAttribute("aria-label", t("activity.remove"));
     this.button.title = t("activity.remove");
+    announce([this.title.textContent, detail].join(": "));
     paint();
   }
 
   remove() {
     cards.delete(this);
-    this.node.remove();
+    keepFocus($("activity-list"), () => this.node.remove());
     this.onRemove();
     paint();
   }

@@ -32,7 +32,7 @@ export async function startUpload(found, target) {
   if (found.length === 0) return;
   const batch = new Batch(found, target);
   try {
-    await batch.makeEmptyFolders(found.filter((one) => !one.file));
+    await batch.makeEmptyFolders();
     await batch.lookForConflicts();
   } catch (failure) {
     if (failure.code !== undefined) toastFailure(failure, target);
@@ -60,22 +60,28 @@ class Batch {
     this.target = target;
     this.policy = null; // "skip", "overwrite" or "both", once somebody said so for all
     this.jobs = found.filter((one) => one.file).map((one) => new Job(this, one));
+    this.emptyFolders = found.filter((one) => !one.file);
+    this.made = 0; // of them
     this.bytes = this.jobs.reduce((sum, job) => sum + job.file.size, 0);
     this.begun = performance.now();
     this.card = new Card({
       iconName: "upload",
       onCancel: () => this.cancel(),
-      title: t("upload.title", { count: this.jobs.length, folder: labelOf(target) }),
+      title:
+        this.jobs.length > 0
+          ? t("upload.title", { count: this.jobs.length, folder: labelOf(target) })
+          : t("upload.title.folders", { count: this.emptyFolders.length, folder: labelOf(target) }),
     });
   }
 
-  async makeEmptyFolders(folders) {
-    for (const { parts } of folders) {
+  async makeEmptyFolders() {
+    for (const { parts } of this.emptyFolders) {
       await post("operation", { action: "mkdir", parents: "true", path_raw: idFor(this.target, parts) }).catch(
         (failure) => {
           if (failure.code !== EXISTS) throw failure;
         },
       );
+      ++this.made;
     }
   }
 
@@ -122,11 +128,12 @@ class Batch {
     this.changed(0);
     const done = count("done");
     const detail = [
-      t("upload.done", { count: done }),
+      this.jobs.length > 0 ? t("upload.done", { count: done }) : t("task.done", { count: this.made }),
       count("skipped") > 0 && t("upload.skipped", { count: count("skipped") }),
       failed.length > 0 && t("upload.failed", { count: failed.length }),
     ];
-    const kind = failed.length > 0 ? "failed" : count("cancelled") > 0 ? "stopped" : "good";
+    const kind =
+      failed.length > 0 || this.made < this.emptyFolders.length ? "failed" : count("cancelled") > 0 ? "stopped" : "good";
     this.card.finish(
       kind,
       count("cancelled") > 0 ? t("upload.cancelled", { count: done }) : detail.filter(Boolean).join(" · "),
@@ -174,12 +181,17 @@ class Job {
       }
     }
     // One question at a time; the answer to one may be meant for all.
-    const answer = await (asking = asking.catch(() => {}).then(() => this.batch.policy ?? ask(this)));
+    const answer = await (asking = asking.catch(() => {}).then(() => this.answer()));
     if (this.state === "cancelled") return undefined;
     if (answer === "both") return this.sendBeside();
     if (answer === "overwrite") return this.send("overwrite");
     this.state = answer === null ? "cancelled" : "skipped";
     return undefined;
+  }
+
+  answer() {
+    // Somebody who cancelled is not asked about the others that already stood in line.
+    return this.state === "cancelled" ? null : (this.batch.policy ?? ask(this));
   }
 
   async sendBeside() {
