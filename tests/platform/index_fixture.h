@@ -2,16 +2,10 @@
 #ifndef ORVEL_TESTS_PLATFORM_INDEX_FIXTURE_H
 #define ORVEL_TESTS_PLATFORM_INDEX_FIXTURE_H
 
-#include <gtest/gtest.h>
 #include <sqlite3.h>
-#include <sys/stat.h>
-
-#include <algorithm>
-#include <string>
-#include <vector>
 
 #include "index_connections.h"
-#include "support/appliance.h"
+#include "support/testing.h"
 #include "vexo/index.h"
 #include "vexo/stat.h"
 
@@ -19,16 +13,14 @@ namespace index_tests {
 
 using Cond = __tag_FI_SQL_COND;
 using Data = __tag_FI_FILE_INFO_DATA;
-using Rows = std::vector<std::string>;
+using Addresses = std::vector<std::string>;  // "share:path" of records
 
 struct Record {
     std::string path;  // within the share
     bool isDir = false;
     int64_t size = 0;
     uint32_t uid = 0;
-    uint32_t gid = 0;
     int64_t created = 0;
-    int64_t accessed = 0;
     int64_t modified = 0;
     std::string owner = "0";
     std::string share = "photo";
@@ -44,17 +36,6 @@ struct Record {
         return out;
     }
     [[nodiscard]] std::string address() const { return share + ":" + path; }
-    [[nodiscard]] _tag_VEXOSTAT_ status() const {
-        _tag_VEXOSTAT_ st{};
-        st.st_mode = isDir ? S_IFDIR : S_IFREG;
-        st.st_size = size;
-        st.st_uid = uid;
-        st.st_gid = gid;
-        st.st_create = created;
-        st.st_access = accessed;
-        st.st_modify = modified;
-        return st;
-    }
 };
 
 inline int insert(const std::string& db, const Record& record) {
@@ -74,58 +55,78 @@ inline int insert(const std::string& db, const Record& record) {
     data.isDir = record.isDir ? 1 : 0;
     data.size = record.isDir ? 0 : record.size;
     data.created = record.created;
-    data.accessed = record.accessed;
+    data.accessed = record.created / 10;
     data.modified = record.modified;
-    data.mode = 0755;
     data.uid = record.uid;
-    data.gid = record.gid;
+    data.gid = kUsersGid;
     return FILEIDXOutputDBInsert(db.c_str(), &data);
 }
 
-inline BOOL collect(Data* data, void* rows) {
-    static_cast<Rows*>(rows)->push_back(std::string(data->szShare) + ":" + data->szPath);
+inline BOOL collect(Data* data, void* addresses) {
+    static_cast<Addresses*>(addresses)->push_back(std::string(data->szShare) + ":" + data->szPath);
     return 1;
 }
 
-constexpr unsigned long kEverything = ~0UL;
-
-inline Rows select(const std::string& db, FIQUERY query) {
-    Rows rows;
-    EXPECT_EQ(FILEIDXDBSelect(db.c_str(), &query, collect, &rows), 0);
-    return rows;
+inline FIQUERY everything(const Cond* cond = nullptr) {
+    return {{}, 0, cond, 0, ~0UL};
 }
 
-inline Rows select(const std::string& db, const Cond* cond = nullptr) {
-    return select(db, {{}, 0, cond, 0, kEverything});
+inline Addresses select(const std::string& db, FIQUERY query) {
+    Addresses found;
+    EXPECT_EQ(FILEIDXDBSelect(db.c_str(), &query, collect, &found), 0);
+    return found;
 }
 
-inline Rows sorted(Rows rows) {
-    std::sort(rows.begin(), rows.end());
-    return rows;
+inline Addresses sorted(Addresses addresses) {
+    std::sort(addresses.begin(), addresses.end());
+    return addresses;
 }
 
-class IndexTest : public support::ApplianceTest {
+inline Addresses select(const std::string& db, const Cond* cond = nullptr) {
+    return sorted(select(db, everything(cond)));
+}
+
+// The error of asking for a count, 0 when that works.
+inline int countError(const std::string& db, const Cond* cond = nullptr) {
+    const FIQUERY query = everything(cond);
+    unsigned long long count = 0;
+    VLIBCErrSetEx(0, "", 0);
+    return FILEIDXCountGet(db.c_str(), &query, &count) < 0 ? VLIBCErrGet() : 0;
+}
+
+class IndexTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
         addShare("photo", "vexo:index = yes\n");
         folder_ = shareRoot("photo") + "/tasks";
-        support::makeFolder(folder_, 0777);
+        makeFolder(folder_, 0777);
         db_ = folder_ + "/results";
         ASSERT_EQ(FILEIDXDBCreate(db_.c_str()), 0);
     }
     // A share's index of these records.
     void build(const std::vector<Record>& records) {
-        char path[4096];
-        ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_BUILD, path, sizeof path), 0);
-        for (const Record& record : records) ASSERT_EQ(insert(path, record), 0);
+        ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_BUILD, path_, sizeof path_), 0);
+        for (const Record& record : records) ASSERT_EQ(insert(path_, record), 0);
         ASSERT_EQ(FILEIDXIndexEnd("photo", 1), 0);
     }
-    // One number of the database, asked behind the platform's back.
-    int64_t ask(const char* sql) {
+    // What a search of the share's index finds.
+    Addresses searched(const Cond* cond, const Cond* paths = nullptr) {
+        const std::string out = folder_ + "/out";
+        EXPECT_EQ(FILEIDXDBCreate(out.c_str()), 0);
+        EXPECT_EQ(
+            FILEIDXResultGetAndTableGen("PHOTO", paths, cond, out.c_str(), nullptr, nullptr, nullptr, nullptr, nullptr),
+            0);
+        Addresses found = select(out);
+        unlink(out.c_str());
+        return found;
+    }
+    // Runs SQL behind the platform's back; the last number that it gives.
+    int64_t ask(const char* sql) { return ask(db_, sql); }
+    static int64_t ask(const std::string& file, const char* sql) {
         sqlite3* db = nullptr;
         int64_t answer = -1;
-        EXPECT_EQ(sqlite3_open(db_.c_str(), &db), SQLITE_OK);
+        EXPECT_EQ(sqlite3_open(file.c_str(), &db), SQLITE_OK);
         const auto take = [](void* out, int, char** values, char**) {
             *static_cast<int64_t*>(out) = strtoll(values[0], nullptr, 10);
             return 0;
@@ -134,14 +135,9 @@ class IndexTest : public support::ApplianceTest {
         sqlite3_close(db);
         return answer;
     }
-    int64_t orders() { return ask("SELECT count(DISTINCT id>>32) FROM ranking"); }
-    // As if the search had ended a while ago.
-    void age() {
-        vexo::fileindex::closeDatabases();
-        ask("UPDATE state SET written=1;SELECT 0");
-    }
     std::string folder_;
     std::string db_;
+    char path_[4096] = "";  // that of the index that is written
 };
 
 // A condition; nodes are linked by hand.
