@@ -53,15 +53,14 @@ bool become(const Acting& who) {
 
 class AclTest : public ApplianceTest {
  protected:
-    unsigned byPath(const std::string& path) {
+    static unsigned byPath(const std::string& path) {
         unsigned permission = 0xFFFF;
         EXPECT_EQ(VEXOACLPermGet(path.c_str(), &permission), 0) << path << strerror(errno);
         return permission;
     }
-    // What opening, searching and renaming forth and back within the folder show; `asked` are the bits that this tells.
-    static unsigned byDoing(const std::string& path, bool isFolder, unsigned& asked) {
+    // What opening, searching and renaming forth and back within the folder show.
+    static unsigned byDoing(const std::string& path, bool isFolder) {
         unsigned permission = 0;
-        asked = VEXO_ACL_READ | VEXO_ACL_DELETE | (isFolder ? VEXO_ACL_EXECUTE : VEXO_ACL_WRITE | VEXO_ACL_APPEND);
         if (vexo::openFile(path, O_RDONLY)) permission |= VEXO_ACL_READ;
         if (isFolder && vexo::openFile(path + "/.", O_PATH)) permission |= VEXO_ACL_EXECUTE;
         if (!isFolder && vexo::openFile(path, O_WRONLY)) permission |= VEXO_ACL_WRITE | VEXO_ACL_APPEND;
@@ -72,7 +71,7 @@ class AclTest : public ApplianceTest {
         }
         return permission;
     }
-    void compare(const std::string& folder, const std::vector<std::string>& names) {
+    static void compare(const std::string& folder, const std::vector<std::string>& names) {
         const vexo::Descriptor opened = vexo::openFile(folder, O_PATH | O_DIRECTORY);
         const PVEXOACLFOLDER permissions = VEXOACLFolderOpen(opened.get());
         ASSERT_NE(permissions, nullptr);
@@ -81,16 +80,16 @@ class AclTest : public ApplianceTest {
             SCOPED_TRACE(path);
             _tag_VEXOSTAT_ status;
             if (VLIBCFileLStatAt(opened.get(), name.c_str(), 1, &status) != 0) continue;  // the folder is closed to it
+            const bool isFolder = S_ISDIR(status.st_mode);
             unsigned inFolder = 0xFFFF;
             EXPECT_EQ(VEXOACLFolderPermGet(permissions, name.c_str(), &status, &inFolder), 0);
             EXPECT_EQ(inFolder, byPath(path));
-            unsigned asked = 0;
-            const unsigned done = byDoing(path, S_ISDIR(status.st_mode), asked);
-            EXPECT_EQ(inFolder & asked, done);
+            const unsigned untold = isFolder ? VEXO_ACL_WRITE | VEXO_ACL_APPEND : unsigned{VEXO_ACL_EXECUTE};
+            EXPECT_EQ(inFolder & ~untold, byDoing(path, isFolder));
         }
         VEXOACLFolderClose(permissions);
     }
-    std::vector<std::string> fill(const std::string& folder);
+    static std::vector<std::string> fill(const std::string& folder);
     std::string root_ = shareRoot("photo");
 };
 
@@ -142,39 +141,31 @@ TEST_F(AclTest, FolderFormAgreesWithTheKernelAndWithTheDeed) {
         {"a stranger who overrides", 29999, 29999, {}, 1U << CAP_DAC_OVERRIDE},
         {"a stranger who owns all", 29999, 29999, {}, 1U << CAP_FOWNER},
     };
-    const struct {
-        const char* name;
-        mode_t mode;
-        uid_t owner;
-    } folders[] = {{"open", 0777, 0},
-                   {"sticky", 01777, 0},
-                   {"alices sticky", 01777, kAliceUid},
-                   {"unwritable", 0755, 0},
-                   {"unreadable", 0733, 0},
-                   {"unsearchable", 0766, 0},
-                   {"unsearchable sticky group", 01771, kBobUid}};
+    const Rows<const char*, mode_t, uid_t> folders = {{"open", 0777, 0},
+                                                      {"sticky", 01777, 0},
+                                                      {"alices sticky", 01777, kAliceUid},
+                                                      {"unwritable", 0755, 0},
+                                                      {"unreadable", 0733, 0},
+                                                      {"unsearchable", 0766, 0},
+                                                      {"unsearchable sticky group", 01771, kBobUid}};
     std::vector<std::string> names;
-    for (const auto& folder : folders) {
-        const std::string path = root_ + "/" + folder.name;
+    for (const auto& [folder, mode, owner] : folders) {
+        const std::string path = root_ + "/" + folder;
         makeFolder(path);
         names = fill(path);
-        ASSERT_EQ(chown(path.c_str(), folder.owner, kUsersGid), 0);
-        ASSERT_EQ(chmod(path.c_str(), folder.mode), 0);
+        ASSERT_TRUE(chown(path.c_str(), owner, kUsersGid) == 0 && chmod(path.c_str(), mode) == 0);
     }
     for (const Acting& who : identities) {
-        const int result = inChild([&] {
+        SCOPED_TRACE(who.name);
+        inChild([&] {
             if (!become(who)) return 97;
-            for (const auto& folder : folders) {
-                SCOPED_TRACE(std::string(who.name) + " in " + folder.name);
-                compare(root_ + "/" + folder.name, names);
-            }
+            for (const auto& row : folders) compare(root_ + "/" + std::get<0>(row), names);
             return 0;
         });
-        EXPECT_EQ(result, 0) << who.name;
     }
 }
 
-TEST_F(AclTest, AttributesAndMountsJudgeToo) {
+TEST_F(AclTest, MountsJudgeToo) {
     SKIP_WITHOUT_ROOT();
     EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
         std::vector<std::string> names;
@@ -209,57 +200,43 @@ TEST_F(AclTest, AttributesAndMountsJudgeToo) {
 
 TEST_F(AclTest, ImmutableAndAppendOnly) {
     SKIP_WITHOUT_ROOT();
-    const auto mark = [](const std::string& path, int flags) {
-        const vexo::Descriptor fd = vexo::openFile(path, O_RDONLY);
-        return ioctl(fd.get(), FS_IOC_SETFLAGS, &flags) == 0;
+    const auto mark = [this](const char* name, int flags) {
+        return ioctl(vexo::openFile(root_ + name, O_RDONLY).get(), FS_IOC_SETFLAGS, &flags) == 0;
     };
-    const std::vector<std::string> names = {"plain", "fixed", "growing"};
-    for (const std::string& name : names) writeFile(root_ + "/" + name, "", 0666);
-    makeFolder(root_ + "/log", 0777);
-    writeFile(root_ + "/log/plain", "", 0666);
-    if (!mark(root_ + "/fixed", FS_IMMUTABLE_FL)) GTEST_SKIP() << "no immutable files here: " << strerror(errno);
-    EXPECT_TRUE(mark(root_ + "/growing", FS_APPEND_FL));
-    EXPECT_TRUE(mark(root_ + "/log", FS_APPEND_FL));
+    for (const char* name : {"/plain", "/fixed", "/growing", "/log/plain"}) writeFile(root_ + name, "", 0666);
+    if (!mark("/fixed", FS_IMMUTABLE_FL)) GTEST_SKIP() << "no immutable files here: " << strerror(errno);
+    EXPECT_TRUE(mark("/growing", FS_APPEND_FL) && mark("/log", FS_APPEND_FL));
     EXPECT_EQ(byPath(root_ + "/fixed"), unsigned{VEXO_ACL_READ});
     EXPECT_EQ(byPath(root_ + "/growing") & VEXO_ACL_DELETE, 0U);
     compare(root_, {"plain", "fixed"});  // appending succeeds on the third where writing from the start does not
     compare(root_ + "/log", {"plain"});
-    for (const char* name : {"/fixed", "/growing", "/log"}) EXPECT_TRUE(mark(root_ + name, 0));
+    for (const char* name : {"/fixed", "/growing", "/log"}) EXPECT_TRUE(mark(name, 0));
 }
 
 // Whatever makes the status no proof leaves every bit to the kernel, even for root.
 TEST_F(AclTest, OnlyAProofSettles) {
-    struct Facts {
+    for (int spoilt = 0; spoilt <= 5; ++spoilt) {
         vexo::FolderFacts folder{};
         _tag_VEXOSTAT_ entry{};
-    } facts;
-    facts.folder.device = facts.entry.st_device = 5;
-    facts.folder.plain = true;
-    facts.entry.st_attributes = VEXO_ATTRIBUTE_KNOWN;
-    facts.entry.st_mode = S_IFREG | 0640;
-    const auto openBits = [](const Facts& f) { return vexo::settle({0, true, true, true}, f.folder, f.entry).open; };
-    EXPECT_EQ(openBits(facts), 0U);
-    const std::function<void(Facts&)> changes[] = {
-        [](Facts& f) { f.folder.plain = false; }, [](Facts& f) { f.entry.st_device = 6; },
-        [](Facts& f) { f.entry.st_attributes = 0; }, [](Facts& f) { f.entry.st_mode = S_IFLNK | 0777; },
-        [](Facts& f) { f.entry.st_gid = 65534; }};
-    for (const auto& change : changes) {
-        Facts changed = facts;
-        change(changed);
-        EXPECT_EQ(openBits(changed), 7U) << &change - changes;
+        folder.device = 5;
+        folder.plain = spoilt != 1;
+        entry.st_device = spoilt == 2 ? 6 : 5;
+        entry.st_attributes = spoilt == 3 ? 0 : VEXO_ATTRIBUTE_KNOWN;
+        entry.st_mode = spoilt == 4 ? S_IFLNK | 0777 : S_IFREG | 0640;
+        entry.st_gid = spoilt == 5 ? 65534 : 0;
+        EXPECT_EQ(vexo::settle({0, true, true, true}, folder, entry).open, spoilt == 0 ? 0U : 7U) << spoilt;
     }
 }
 
 TEST_F(AclTest, FailuresAndOddPaths) {
-    ASSERT_EQ(symlink("gone", (root_ + "/dangling").c_str()), 0);
-    ASSERT_EQ(symlink("a", (root_ + "/link").c_str()), 0);
-    ASSERT_EQ(symlink("loop", (root_ + "/loop").c_str()), 0);
+    for (const auto& [target, link] : Rows<const char*, const char*>{{"gone", "/dangling"}, {"a", "/link"}})
+        fs::create_symlink(target, root_ + link);
     writeFile(root_ + "/a", "", 0444);
     for (const auto& [path, systemCode, code] :
          Rows<std::string, int, int>{{root_ + "/missing", ENOENT, VEXO_ERR_MISSING},
                                      {root_ + "/a/below", ENOTDIR, VEXO_ERR_MISSING},
                                      {root_ + "/dangling", ENOENT, VEXO_ERR_ACL_TARGET_MISSING},
-                                     {root_ + "/loop", ELOOP, VEXO_ERR_GENERAL}}) {
+                                     {std::string(5000, 'n'), ENAMETOOLONG, VEXO_ERR_GENERAL}}) {
         unsigned permission = 0;
         EXPECT_FAILS(VEXOACLPermGet(path.c_str(), &permission), systemCode, code);
     }
@@ -270,26 +247,20 @@ TEST_F(AclTest, FailuresAndOddPaths) {
     }
     errno = 0;
     for (const char* never : {"/", "/..", "."}) EXPECT_EQ(byPath(never) & VEXO_ACL_DELETE, 0U) << never;
-    EXPECT_EQ(byPath(root_ + "//") & VEXO_ACL_DELETE, byPath(root_) & VEXO_ACL_DELETE);
+    EXPECT_NE(byPath(root_ + "//") & VEXO_ACL_DELETE, 0U);
     ASSERT_EQ(chdir(root_.c_str()), 0);
-    EXPECT_NE(byPath("a") & VEXO_ACL_DELETE, 0U);
     EXPECT_NE(byPath("link") & VEXO_ACL_DELETE, 0U);  // the link goes, not its target
     EXPECT_EQ(errno, 0);
-    EXPECT_EQ(VEXOACLFolderOpen(-1), nullptr);
 }
 
 TEST_F(AclTest, SupportIsAskedOncePerDevice) {
     writeFile(root_ + "/a", "");
-    _tag_VEXOSTAT_ status;
-    ASSERT_EQ(VLIBCFileLStat((root_ + "/a").c_str(), 1, &status), 0);
+    const struct stat status = statusOf(root_ + "/a");
     const bool kept = getxattr((root_ + "/a").c_str(), "system.posix_acl_access", nullptr, 0) >= 0 || errno == ENODATA;
-    errno = 0;
     EXPECT_EQ(VEXOACLIsSupport((root_ + "/a").c_str(), -1, 2) > 0, kept);
-    EXPECT_EQ(VEXOACLIsSupportOnDevice("/nowhere", status.st_device) > 0, kept);  // known, so the path is not needed
+    EXPECT_EQ(VEXOACLIsSupportOnDevice("/nowhere", status.st_dev) > 0, kept);  // known, so the path is not needed
     EXPECT_EQ(VEXOACLIsSupport("/proc/self/stat", -1, 2), 0);
-    EXPECT_EQ(errno, 0);
-    EXPECT_LT(VEXOACLIsSupport((root_ + "/missing").c_str(), -1, 2), 0);
-    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_MISSING);
+    EXPECT_FAILS(VEXOACLIsSupport((root_ + "/missing").c_str(), -1, 2), ENOENT, VEXO_ERR_MISSING);
 }
 
 }  // namespace
