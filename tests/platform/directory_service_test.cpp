@@ -8,20 +8,8 @@ const struct Service {
     const char* user;
     int (*privilege)(const char*, const char*, const char*, int*);
     PVLIBCSZLIST (*shares)(const char*, const char*, int, int);
-    const char *privilegeName, *sharesName;
-} kServices[] = {
-    {"DOM\\dora", VexoCgiDomGetPrivilege, VexoCgiDomValidShareGen, "VexoCgiDomGetPrivilege", "VexoCgiDomValidShareGen"},
-    {"dan@example.com", VexoCgiLDAPGetPrivilege, VexoCgiLDAPValidShareGen, "VexoCgiLDAPGetPrivilege",
-     "VexoCgiLDAPValidShareGen"},
-};
-
-std::string joined(PVLIBCSZLIST list) {
-    if (list == nullptr) return "null";
-    std::string out;
-    for (int i = 0; i < list->nItem; ++i) out += std::string(VLIBCSzListGet(list, i)) + ' ';
-    VLIBCSzListFree(list);
-    return out;
-}
+} kServices[] = {{"DOM\\dora", VexoCgiDomGetPrivilege, VexoCgiDomValidShareGen},
+                 {"dan@example.com", VexoCgiLDAPGetPrivilege, VexoCgiLDAPValidShareGen}};
 
 class DirectoryServiceTest : public ApplianceTest {
  protected:
@@ -35,52 +23,42 @@ class DirectoryServiceTest : public ApplianceTest {
         addShare("closed", "invalid users = @\"DOM\\staff\"\nread only = no\n");
         addShare("hidden", "browseable = no\nread only = no\n");
     }
+    // The answer, its errno value and what was written over a 7.
+    static std::string privilege(const Service& service, const char* share, const char* user) {
+        int privilege = 7;
+        errno = 0;
+        const int result = service.privilege(share, user, "sid", &privilege);
+        return std::to_string(result) + " " + std::to_string(errno) + " " + std::to_string(privilege);
+    }
+    static std::string shares(const Service& service, const char* user, int sort = 0, int writable = 0) {
+        PVLIBCSZLIST list = service.shares("sid", user, sort, writable);
+        std::string names = joined(list);
+        VLIBCSzListFree(list);
+        return names;
+    }
 };
 
-TEST_F(DirectoryServiceTest, PrivilegesComeFromTheLists) {
+TEST_F(DirectoryServiceTest, PrivilegesAndUsableSharesComeFromTheLists) {
     for (const Service& service : kServices) {
-        const struct {
-            const char *share, *user;
-            int result, privilege, code;
-        } cases[] = {{"zoo", service.user, 0, 2, 0},
-                     {"all", service.user, 0, 1, 0},
-                     {"closed", service.user, 0, 0, 0},
-                     {"hidden", service.user, 0, 2, 0},
-                     {"none", service.user, -1, 7, VEXO_ERR_SHARE_MISSING},
-                     {"all", "X\\y", -1, 7, VEXO_ERR_USER_MISSING},
-                     {"all", nullptr, -1, 7, VEXO_ERR_PARAMETER}};
-        for (const auto& c : cases) {
-            SCOPED_TRACE(&c - cases);
-            int privilege = 7;
-            VLIBCErrSetEx(0, "", 0);
-            EXPECT_EQ(service.privilege(c.share, c.user, "sid", &privilege), c.result);
-            EXPECT_EQ(privilege, c.privilege);
-            EXPECT_EQ(VLIBCErrGet(), c.code);
-        }
-        int privilege = 7;
-        vexo::gate::fail("DirectoryServer", VEXO_ERR_GENERAL, ETIMEDOUT, 1);
-        EXPECT_EQ(service.privilege("all", service.user, "sid", &privilege), -2);
-        EXPECT_EQ(errno, ETIMEDOUT);
-        vexo::gate::fail(service.privilegeName, VEXO_ERR_GENERAL, 0, 1);
-        EXPECT_EQ(service.privilege("all", service.user, "sid", &privilege), -1);
-    }
-}
-
-TEST_F(DirectoryServiceTest, UsableShares) {
-    for (const Service& service : kServices) {
-        EXPECT_EQ(joined(service.shares("sid", service.user, 0, 0)), "Zoo all ");
-        EXPECT_EQ(joined(service.shares("sid", service.user, 1, 0)), "all Zoo ");
-        EXPECT_EQ(joined(service.shares(nullptr, service.user, 0, 1)), "Zoo ");
-        EXPECT_EQ(joined(service.shares("sid", "X\\y", 0, 0)), "null");
+        for (const auto& [share, answer] : Rows<const char*, const char*>{
+                 {"zoo", "0 0 2"}, {"all", "0 0 1"}, {"closed", "0 0 0"}, {"hidden", "0 0 2"}})
+            EXPECT_EQ(privilege(service, share, service.user), answer) << share;
+        EXPECT_EQ(privilege(service, "none", service.user), "-1 0 7");
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_SHARE_MISSING);
+        EXPECT_EQ(privilege(service, "all", "X\\y"), "-1 0 7");
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
-        EXPECT_EQ(joined(service.shares("sid", nullptr, 0, 0)), "null");
-        for (const char* operation : {"DirectoryServer", service.sharesName, "VLIBCSzListAlloc", "VLIBCSzListPush"}) {
+        EXPECT_EQ(shares(service, service.user), "Zoo|all|");
+        EXPECT_EQ(shares(service, service.user, 1), "all|Zoo|");
+        EXPECT_EQ(shares(service, service.user, 0, 1), "Zoo|");
+        EXPECT_EQ(shares(service, "X\\y"), "null");
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
+        for (const char* operation : {"DirectoryServer", "VLIBCSzListAlloc", "VLIBCSzListPush"}) {
             vexo::gate::fail(operation, VEXO_ERR_GENERAL, ENOMEM, 1);
-            EXPECT_EQ(joined(service.shares("sid", service.user, 0, 0)), "null") << operation;
+            EXPECT_EQ(shares(service, service.user), "null") << operation;
         }
+        vexo::gate::fail("DirectoryServer", VEXO_ERR_GENERAL, ETIMEDOUT, 1);
+        EXPECT_EQ(privilege(service, "all", service.user), "-2 " + std::to_string(ETIMEDOUT) + " 7");
     }
-    writeRootFile("/etc/vexo/shares.conf", "");
-    EXPECT_EQ(joined(kServices[0].shares("sid", kServices[0].user, 0, 0)), "");
 }
 
 // A lookup that fails is a server that cannot be reached, and never an answer.
@@ -89,11 +67,8 @@ TEST_F(DirectoryServiceTest, FailingLookups) {
     chmod((systemRoot() + "/etc/group").c_str(), 0600);
     asUser(kBobUid, kUsersGid, [] {
         for (const Service& service : kServices) {
-            int privilege = 7;
-            EXPECT_EQ(service.privilege("all", service.user, "sid", &privilege), -2);
-            EXPECT_EQ(errno, EACCES);
-            EXPECT_EQ(privilege, 7);
-            EXPECT_EQ(service.shares("sid", service.user, 0, 0), nullptr);
+            EXPECT_EQ(privilege(service, "all", service.user), "-2 " + std::to_string(EACCES) + " 7");
+            EXPECT_EQ(shares(service, service.user), "null");
         }
         return 0;
     });

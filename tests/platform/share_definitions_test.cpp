@@ -1,7 +1,6 @@
 // The grammar of share definitions, also held against Samba's own reader, and what sections mean.
 #include "share_definitions.h"
 
-#include <cstdio>
 #include <map>
 #include <set>
 
@@ -18,17 +17,13 @@ const vexo::IncludeReader kNoIncludes = [](const std::string&) { return std::opt
 // What is compared with Samba, in its spelling.
 using Fields = std::map<std::string, std::string>;
 using Sections = std::map<std::string, Fields>;  // by folded name
-struct Key {
-    const char* key;
-    ShareOption option;
-};
-constexpr Key kBooleans[] = {{"read only", ShareOption::readOnly},
-                             {"browseable", ShareOption::browseable},
-                             {"available", ShareOption::available}};
-constexpr Key kLists[] = {{"valid users", ShareOption::validUsers},
-                          {"invalid users", ShareOption::invalidUsers},
-                          {"read list", ShareOption::readList},
-                          {"write list", ShareOption::writeList}};
+const Rows<const char*, ShareOption> kBooleans = {{"read only", ShareOption::readOnly},
+                                                  {"browseable", ShareOption::browseable},
+                                                  {"available", ShareOption::available}};
+const Rows<const char*, ShareOption> kLists = {{"valid users", ShareOption::validUsers},
+                                               {"invalid users", ShareOption::invalidUsers},
+                                               {"read list", ShareOption::readList},
+                                               {"write list", ShareOption::writeList}};
 
 Sections ours(const vexo::Definitions& definitions) {
     Sections out;
@@ -77,8 +72,8 @@ std::optional<Sections> samba(const std::string& file) {
     for (auto& [name, fields] : printed) {
         Fields& full = out[name];
         full["path"];
-        for (const auto& known : kBooleans) full[known.key] = "Yes";
-        for (const auto& known : kLists) full[known.key];
+        for (const auto& [key, option] : kBooleans) full[key] = "Yes";
+        for (const auto& [key, option] : kLists) full[key];
         for (auto& [key, value] : full) {
             if (global.contains(key)) value = global.at(key);
             if (fields.contains(key)) value = fields.at(key);
@@ -123,17 +118,14 @@ const char* const kAlike[] = {
     "write list = inner\n[global]\ninclude = @/users.conf\n[c]\npath = /v/c\n",
 };
 
-// Here this reader means to answer otherwise.
-struct Difference {
-    std::string text;
-    std::set<std::string> sections;
-};
-// The sections that differ. A name is known by its text; a line that can be a restriction written wrong spoils its own.
-const Difference kDifferences[] = {{"[ b ]\npath = /v/b\n[b]\nvalid users = x\n", {" b ", "b"}},
-                                   {"[a]\npath = /v/a\nvalid users alice\n[b]\npath = /v/b\n", {"a"}},
-                                   {"[a]\npath = /v/a\ninclude = @/missing.conf\n[b]\npath = /v/b\n", {"a"}}};
+// Here this reader means to answer otherwise: the sections that differ. A name is known by its text; a line that can be
+// a restriction written wrong spoils its own.
+const Rows<std::string, std::set<std::string>> kDifferences = {
+    {"[ b ]\npath = /v/b\n[b]\nvalid users = x\n", {" b ", "b"}},
+    {"[a]\npath = /v/a\nvalid users alice\n[b]\npath = /v/b\n", {"a"}},
+    {"[a]\npath = /v/a\ninclude = @/missing.conf\n[b]\npath = /v/b\n", {"a"}}};
 // Samba refuses the whole file; here the sections listed are sound.
-const Difference kRefusedBySamba[] = {
+const Rows<std::string, std::set<std::string>> kRefusedBySamba = {
     {"[a]\npath = /v/a\n[b]\npath = /v/b\nread only = maybe\n[c]\npath = /v/c\n", {"a", "c"}},
     {"[a]\npath = /v/a\n[b\npath = /v/b\nread only = no\n[]\npath = /v/x\n[c]\npath = /v/c\n", {"a", "c"}},
     {"[a]\npath = /v/a\n = x\n[c]\npath = /v/c\n", {"c"}},
@@ -194,18 +186,13 @@ TEST(ShareSection, MalformedOnesSayWhy) {
              {"path = volume1/photo\n", "is not of the form"},
              {"path = /volume1/a/b\n", "is not of the form"},
              {"path = /volume1/..\n", "is not of the form"},
-             {"path = /./photo\n", "is not of the form"},
              {"path = /volume1/" + std::string(256, 'x') + "\n", "is not of the form"},
              {std::string("path = /volume1/a\0b\n", 20), "a zero byte"},
              {"path = /v/p\nvexo:index =\n", "neither yes nor no"},
-             {"path = /v/p\nwriteable = perhaps\n", "neither yes nor no"},
              {"path = /v/p\nvexo:restriction = -1\n", "is no number"},
-             {"path = /v/p\nvexo:restriction = 4 5\n", "is no number"},
              {"path = /v/p\nvexo:restriction = 4294967296\n", "is no number or too large"},
              {"path = /v/p\nvexo:ftp = 2147483648\n", "is no number or too large"},
              {"path = /v/p\nvalid users alice\n", "line 3: neither"},
-             {"path = /v/p\ninclude = gone\n", "line 3: the included file"},
-             {"path = /v/p\ncopy = gone\n", "line 3: copies a section"},
              // What is not offered is no fault.
              {"available = no\n", ""},
              {"printable = yes\npath = /var/tmp\n", ""},
@@ -222,19 +209,15 @@ TEST(ShareSection, MalformedOnesSayWhy) {
     EXPECT_NE(read("copy = t\npath = /v/p\n", "[t]\npath = /v/t\nvalid users alice\n").fault, "");
 }
 
-TEST(ShareSection, Names) {
+TEST(ShareSection, NamesAndVariablesOfPaths) {
     const auto isSound = [](const std::string& name) {
         const auto sections = vexo::parseDefinitions("[" + name + "]\npath = /v/p\n", kNoIncludes).sections;
         return sections.size() == 1 && vexo::readShare(sections[0]).share.has_value();
     };
     const std::string longest(255, 'x');
-    for (const std::string& name : {std::string("a b.c \xFF"), std::string("homes"), longest})
-        EXPECT_TRUE(isSound(name));
+    EXPECT_TRUE(isSound("a b.c \xFF") && isSound("homes") && isSound(longest));
     EXPECT_FALSE(isSound(longest + "x"));
     for (const char* name : {".", "..", "a/b", "a\x01", "HOME", "\x7F"}) EXPECT_FALSE(isSound(name)) << name;
-}
-
-TEST(ShareSection, VariablesOfPaths) {
     const vexo::PathVariables variables{"photo", "DOM\\alice", "alice", "DOM", "users"};
     EXPECT_EQ(vexo::replaceVariables("/%S-%U/%D%g%u%%U%x%", variables), "/photo-alice/DOMusersDOM\\alice%alice%x%");
     EXPECT_EQ(vexo::replaceVariables("%U", {"", "", "%S", "", ""}), "%S") << "a name is not looked through again";
