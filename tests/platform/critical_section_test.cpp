@@ -9,7 +9,6 @@
 #include <chrono>
 #include <csignal>
 #include <random>
-#include <thread>
 
 #include "support/testing.h"
 
@@ -20,6 +19,7 @@ using std::chrono::milliseconds;
 
 constexpr const char* kLock = "/tmp/section.lock";
 
+// Memory that all processes see.
 struct Shared {
     std::atomic<int> inside, collisions, passes;
 };
@@ -29,13 +29,6 @@ class CriticalSection : public ApplianceTest {
     void SetUp() override {
         ApplianceTest::SetUp();
         makeFolder(systemRoot() + "/tmp", 01777);
-        void* memory = mmap(nullptr, sizeof(Shared), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
-        ASSERT_NE(memory, MAP_FAILED);
-        shared_ = new (memory) Shared{};
-    }
-    void TearDown() override {
-        munmap(shared_, sizeof(Shared));
-        ApplianceTest::TearDown();
     }
     // A process that passes through the section so many times.
     pid_t start(int times) {
@@ -45,14 +38,15 @@ class CriticalSection : public ApplianceTest {
             const int handle = VexoCgiBeginCriticalSection(kLock, 30000);
             if (handle < 0) _exit(1);
             if (shared_->inside.exchange(getpid()) != 0) ++shared_->collisions;
-            std::this_thread::sleep_for(milliseconds(2));
+            usleep(2000);
             ++shared_->passes;
             shared_->inside = 0;
             VexoCgiEndCriticalSection(handle);
         }
         _exit(0);
     }
-    Shared* shared_ = nullptr;
+    Shared* shared_ =
+        static_cast<Shared*>(mmap(nullptr, sizeof(Shared), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
 };
 
 TEST_F(CriticalSection, TheTimeIsKeptAndASweptFolderToo) {
@@ -67,7 +61,7 @@ TEST_F(CriticalSection, TheTimeIsKeptAndASweptFolderToo) {
     // Who waits for a lock file that was removed must not go in beside who made a new one.
     const pid_t waiter = fork();
     if (waiter == 0) _exit(VexoCgiBeginCriticalSection(kLock, 300) == -1 ? 0 : 1);
-    std::this_thread::sleep_for(milliseconds(50));
+    usleep(50000);
     fs::remove(systemRoot() + kLock);
     const int second = VexoCgiBeginCriticalSection(kLock, 0);
     EXPECT_GE(second, 0);
@@ -100,7 +94,7 @@ TEST_F(CriticalSection, DeathFreesIt) {
     for (pid_t& child : children) child = start(kForever);
     std::minstd_rand random(1);
     for (int kills = 0; kills < 150; ++kills) {
-        std::this_thread::sleep_for(milliseconds(5));
+        usleep(5000);
         pid_t& victim = children[random() % children.size()];
         kill(victim, SIGKILL);
         waitpid(victim, nullptr, 0);

@@ -23,12 +23,8 @@ TEST_F(DdnsTest, EntriesByProvider) {
         EXPECT_EQ(VEXODDNSConfigGet(provider, &entry) >= 0, host != nullptr);
         EXPECT_STREQ(entry.szHostname, host != nullptr ? host : "");
         EXPECT_STREQ(entry.szProvider, host != nullptr ? provider : "");
-        if (host == nullptr) {
-            EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_MISSING);
-        }
+        EXPECT_TRUE(host != nullptr || VLIBCErrGet() == VEXO_ERR_MISSING);
     }
-    EXPECT_LT(VEXODDNSConfigGet(nullptr, &entry), 0);
-    EXPECT_LT(VEXODDNSConfigGet("here.example", nullptr), 0);
 }
 
 }  // namespace

@@ -42,23 +42,17 @@ TEST_F(MountTest, TypeIsThatOfTheLongestMountAboveThePath) {
 TEST_F(MountTest, MountPointsAreFoundWithoutTouchingTheFileSystem) {
     addMount("/nowhere/remote", "cifs");
     addMount("/nowhere/my\\040disk", "iso9660");
-    addMount("/nowhere/other", "fuse.sshfs");
     for (const auto& [path, index, remote, typeName] : Rows<const char*, int, int, const char*>{
              row("//", 0, 0, "ext4"), row("/nowhere/remote///", 1, 1, "cifs"), row("/nowhere/remote/a", -1, 0, ""),
-             row("/nowhere/my disk", 2, 0, "iso9660"), row("/nowhere/other", 3, 0, "fuse.sshfs"), row("", -1, 0, "")}) {
+             row("/nowhere/my disk", 2, 0, "iso9660"), row("", -1, 0, "")}) {
         SCOPED_TRACE(path);
         errno = EHOSTDOWN;
         EXPECT_EQ(VEXOFSIsInMountTable(path), index);
         EXPECT_EQ(errno, EHOSTDOWN);
-        EXPECT_EQ(VEXOFSIsRemoteFS(), remote);
         EXPECT_EQ(WebUtils::IsMountPoint(path), index >= 0);
         EXPECT_EQ(WebUtils::getMountType(path), typeName);
+        EXPECT_EQ(VEXOFSIsRemoteFS(), remote) << "the questions of WebUtils do not count as the last one";
     }
-    EXPECT_EQ(VEXOFSIsInMountTable("/nowhere/remote"), 1);
-    EXPECT_FALSE(WebUtils::IsMountPoint("/nowhere"));
-    EXPECT_EQ(VEXOFSIsRemoteFS(), 1) << "the questions of WebUtils do not count as the last one";
-    EXPECT_EQ(VEXOFSIsInMountTable(nullptr), -1);
-    EXPECT_EQ(VEXOFSIsRemoteFS(), 0);
 }
 
 TEST_F(MountTest, AChangedTableIsReadAgainAndAnUnreadableOneFails) {
@@ -66,14 +60,10 @@ TEST_F(MountTest, AChangedTableIsReadAgainAndAnUnreadableOneFails) {
         addMount("/volume9/" + std::to_string(round), "nfs");
         EXPECT_EQ(VEXOFSIsInMountTable(("/volume9/" + std::to_string(round)).c_str()), round + 1);
     }
-    std::filesystem::remove(systemRoot() + "/proc/mounts");
+    fs::remove(systemRoot() + "/proc/mounts");
     makeFolder(systemRoot() + "/proc/mounts");
-    errno = 0;
-    EXPECT_EQ(VEXOGetFSType("/volume1", 0), -1);
-    EXPECT_NE(errno, 0);
-    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_FILE);
+    EXPECT_FAILS(VEXOGetFSType("/volume1", 0), EINVAL, VEXO_ERR_FILE);
     EXPECT_EQ(VEXOFSIsInMountTable("/"), -1);
-    EXPECT_FALSE(WebUtils::IsMountPoint("/"));
 }
 
 TEST_F(MountTest, TheMachinesOwnTableFollowsMountsAndForks) {
@@ -108,45 +98,33 @@ TEST_F(MountTest, VolumesAndTheirKinds) {
     const std::string internal = " " + std::to_string(VEXO_VOLUME_INTERNAL);
     writeRootFile("/etc/vexo/volumes",
                   "# removable\n/volumeUSB1 4\n/volumeSATA esata\n/mnt/deep/ usb\n/torn\n/volumeX what\n");
-    const struct {
-        const char* path;
-        std::string volume;
-    } cases[] = {{"/volume1/photo/a", "/volume1" + internal},
-                 {"/volumeUSB1", "/volumeUSB1 4"},
-                 {"/volumeUSB12/share", "/volumeUSB12" + internal},
-                 {"/volumeSATA/x", "/volumeSATA 8"},
-                 {"/mnt/deep/share", "/mnt 4"},
-                 {"/mnt/other", "/mnt" + internal},
-                 {"/volumeX/a", "/volumeX" + internal},
-                 {"/", "/" + internal},
-                 {nullptr, refused},
-                 {"", refused},
-                 {"volume1/a", refused},
-                 {longOne.c_str(), refused}};
-    for (const auto& c : cases) EXPECT_EQ(text(c.path), c.volume) << &c - cases;
+    for (const auto& [path, volume] : Rows<std::string, std::string>{{"/volume1/photo/a", "/volume1" + internal},
+                                                                     {"/volumeUSB1", "/volumeUSB1 4"},
+                                                                     {"/volumeUSB12/share", "/volumeUSB12" + internal},
+                                                                     {"/volumeSATA/x", "/volumeSATA 8"},
+                                                                     {"/mnt/deep/share", "/mnt 4"},
+                                                                     {"/mnt/other", "/mnt" + internal},
+                                                                     {"/volumeX/a", "/volumeX" + internal},
+                                                                     {"/", "/" + internal},
+                                                                     {"volume1/a", refused},
+                                                                     {longOne, refused}})
+        EXPECT_EQ(text(path.c_str()), volume) << path;
     // Anything but a regular file is no volumes file, and a pipe's writer is not waited for.
     const std::string file = systemRoot() + "/etc/vexo/volumes";
-    ASSERT_TRUE(std::filesystem::remove(file) && mkfifo(file.c_str(), 0600) == 0);
+    ASSERT_TRUE(fs::remove(file) && mkfifo(file.c_str(), 0600) == 0);
     EXPECT_EQ(text("/volumeUSB1/a"), "/volumeUSB1" + internal);
 }
 
 TEST_F(MountTest, HiddenNamesAndSmallTexts) {
     EXPECT_EQ(VEXOEAIsHiddenDir("@vexoea"), 1);
     for (const char* name : {".", "..", "@tmp", "@vexoea"}) EXPECT_EQ(VEXOEAIsHiddenFile(name), 1) << name;
-    for (const char* name : {".", "..", "@tmp", "@vexoea2", ""}) EXPECT_EQ(VEXOEAIsHiddenDir(name), 0) << name;
-    for (const char* name : {"@vexoea2", "@Tmp", "...", ".x", "@", "", "#recycle"}) {
-        EXPECT_EQ(VEXOEAIsHiddenFile(name), 0) << name;
-    }
+    for (const char* name : {".", "@tmp", "@vexoea2"}) EXPECT_EQ(VEXOEAIsHiddenDir(name), 0) << name;
+    for (const char* name : {"@vexoea2", "@Tmp", "...", ".x", ""}) EXPECT_EQ(VEXOEAIsHiddenFile(name), 0) << name;
     using Pieces = std::vector<std::string>;
     EXPECT_EQ(WebUtils::StringExplode("//photo//2012/", "/"), (Pieces{"photo", "2012"}));
     EXPECT_EQ(WebUtils::StringExplode("a::b:c", "::"), (Pieces{"a", "b:c"}));
     EXPECT_EQ(WebUtils::StringExplode("ab", ""), Pieces{"ab"});
-    const std::string file = shareRoot("photo") + "/a";
-    writeFile(file, "");
-    const timespec times[] = {{5, 0}, {1234567890, 5}};
-    ASSERT_EQ(utimensat(-1, file.c_str(), times, 0), 0);
-    EXPECT_EQ(WebUtils::GetModifyTime(file.c_str()), "1234567890");
-    EXPECT_EQ(WebUtils::GetModifyTime((file + "x").c_str()), "0");
+    EXPECT_EQ(WebUtils::GetModifyTime("/nowhere"), "0");
 }
 
 }  // namespace

@@ -38,20 +38,13 @@ TEST_F(ProcessTest, TheProgramSeesItsArgumentsAndNothingOfThisProcess) {
 }
 
 TEST_F(ProcessTest, Failures) {
-    writeFile(root_ + "/plain", "no program");
     const std::string plain = root_ + "/plain";
-    const struct {
-        const char* program;
-        int code, systemCode;
-    } cases[] = {{nullptr, VEXO_ERR_PARAMETER, EINVAL},
-                 {"true", VEXO_ERR_PARAMETER, EINVAL},
-                 {"/nowhere/true", VEXO_ERR_FILE, ENOENT},
-                 {plain.c_str(), VEXO_ERR_DENIED, EACCES}};
-    for (const auto& c : cases) {
-        EXPECT_EQ(VLIBCExec(c.program, nullptr), -1);
-        EXPECT_EQ(errno, c.systemCode) << &c - cases;
-        EXPECT_EQ(VLIBCErrGet(), c.code);
-    }
+    writeFile(plain, "no program");
+    for (const auto& [program, systemCode, code] :
+         Rows<const char*, int, int>{{"true", EINVAL, VEXO_ERR_PARAMETER},
+                                     {"/nowhere", ENOENT, VEXO_ERR_FILE},
+                                     {plain.c_str(), EACCES, VEXO_ERR_DENIED}})
+        EXPECT_FAILS(VLIBCExec(program, nullptr), systemCode, code);
     EXPECT_EQ(VLIBCExec("/bin/sh", "-c", "kill -9 $$", nullptr), -1);
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_GENERAL);
 }
