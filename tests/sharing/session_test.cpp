@@ -1,25 +1,11 @@
 // Sessions of visitors: the check that sweeps the record file, the look-up, the adding.
-#include <gtest/gtest.h>
-#include <sys/stat.h>
 #include <sys/sysinfo.h>
-#include <unistd.h>
 
-#include <cerrno>
-#include <cstdlib>
-#include <filesystem>
-#include <string>
-#include <vector>
-
-#include "fault_gate.h"
-#include "orvel/login_records.h"
 #include "platform/private_mounts.h"
-#include "sharing/clock.h"
 #include "sharing/critical_section.h"
 #include "sharing/login_add.h"
-#include "sharing/record_file.h"
-#include "support/appliance.h"
+#include "sharing/visitor_fixture.h"
 #include "support/fault_sweep.h"
-#include "vexo/error.h"
 
 extern "C" {
 int sysinfo(struct sysinfo* info) noexcept {
@@ -40,39 +26,16 @@ int usleep(useconds_t) {  // the pause after an identifier that cannot be used: 
 }
 }
 
-namespace fs = std::filesystem;
-using support::announceLog;
-using support::kUsersGid;
-using support::readFile;
-
 namespace {
 
 constexpr int kEverything = ORV_POLICY_ADMINISTRATOR | ORV_POLICY_USER;
 const std::string kOther = "10.9.9.9,bob,other,5,99500,1,0,L\n";
 
-class SessionTest : public support::ApplianceTest {
+class SessionTest : public VisitorTest {
  protected:
-    void SetUp() override {
-        ApplianceTest::SetUp();
-        setenv("REMOTE_ADDR", "10.0.0.5", 1);
-        support::makeFolder(systemRoot() + "/tmp", 01777);
-        support::uptime = 100000;
-        support::secondsSlept = 0;
-    }
-    void TearDown() override {
-        for (const char* name : {"REMOTE_ADDR", "HTTP_X_FORWARDED_FOR", "HTTP_CLIENT_IP", "USERNAME"}) unsetenv(name);
-        ApplianceTest::TearDown();
-    }
-    static std::string path(const char* name) { return systemRoot() + name; }
-    static void writeRecords(const std::string& text) { support::writeFile(path(orvel::kRecordFile), text, 0600); }
-    static std::string records() { return readFile(path(orvel::kRecordFile)); }
-    // Checks session "s1" of link "L" as a visitor of the file manager.
     int check(int flags = kEverything, int keep = 0, int position = CGI_POSITION_FILE_MANAGER) {
-        VEXO::WebCGI cgi;
-        _tag_confirm_policy policy = {.flags = flags, .keepAccessTime = keep};
         user[0] = '\0';
-        return IsAuthorizedByPath(&cgi, "s1", user, sizeof user, &policy, static_cast<_tag_cgi_position>(position),
-                                  "L");
+        return checkSession("s1", "L", user, sizeof user, flags, keep, position);
     }
     char user[64] = {};
 };
@@ -82,44 +45,38 @@ TEST_F(SessionTest, WhatACheckAnswersAndLeavesInTheFile) {
     writeRootFile("/etc/shadow", "gone:x:1:0:9:7::7:\n");
     const std::string alice = "10.0.0.5,alice,s1,5,99999,1,0,L\n", aliceNow = "10.0.0.5,alice,s1,5,100000,2,0,L\n";
     const std::string carol = "10.0.0.5,carol,s1,5,99999,1,0,L\n", carolNow = "10.0.0.5,carol,s1,5,100000,2,0,L\n";
-    const std::string stale = "10.0.0.5,alice,s1,5,99099,1,0,L\n", deleted = "10.0.0.5,zed,s1,5,99999,1,0,L\n";
-    struct Case {
-        const char* what;
-        std::string before;
-        int flags, keep, position, answer;
-        std::string after, user;
-    };
-    const std::vector<Case> cases = {
-        {"a user", alice + kOther, 3, 0, 2, 1, aliceNow + kOther, "alice"},
-        {"an administrator", carol, 3, 0, 2, 2, carolNow, "carol"},
-        {"an administrator as a user", carol, 2, 0, 2, 1, carolNow, "carol"},
-        {"a user where only administrators count", alice, 1, 0, 2, -2, aliceNow, "alice"},
-        {"the time of access kept", alice, 3, 1, 2, 1, "10.0.0.5,alice,s1,5,99999,2,0,L\n", "alice"},
-        {"just fresh", "10.0.0.5,alice,s1,5,99100,1,0,L\n", 3, 0, 2, 1, aliceNow, "alice"},
-        {"just stale", stale + kOther, 3, 0, 2, -1, kOther, "alice"},
-        {"stale, but kept", stale, 3, 1, 2, -1, "10.0.0.5,alice,s1,5,99099,2,0,L\n", "alice"},
-        {"never stale", "10.0.0.5,alice,s1,5,1,1,7,L\n", 3, 0, 2, 1, "10.0.0.5,alice,s1,5,100000,2,7,L\n", "alice"},
-        {"of others: stale, fresh, never stale", "a,u,x,5,99099,1,0,L\na,u,x,5,99100,1,0,K\na,u,x,5,0,1,1,M\n", 3, 0, 2,
-         -2, "a,u,x,5,99100,1,0,K\na,u,x,5,0,1,1,M\n", ""},
-        {"another link", "10.0.0.5,alice,s1,5,99999,1,0,K\n", 3, 0, 2, -2, "10.0.0.5,alice,s1,5,99999,1,0,K\n", ""},
-        {"another address", "10.0.0.6,alice,s1,5,99999,1,0,L\n", 3, 0, 2, -2, "10.0.0.6,alice,s1,5,99999,1,0,L\n", ""},
-        {"another address, stale", "10.0.0.6,alice,s1,5,99099,1,0,L\n" + kOther, 3, 1, 2, -2, kOther, ""},
-        {"a deleted user", deleted + kOther, 3, 0, 2, -2, kOther, "zed"},
-        {"an account that ended", "10.0.0.5,gone,s1,5,99999,1,0,L\n", 3, 0, 2, -2, "", "gone"},
-        {"the last match decides", carol + alice, 3, 0, 2, 1, carolNow + aliceNow, "alice"},
-        {"a deleted user decides nothing", alice + deleted, 3, 0, 2, 1, aliceNow, "zed"},
-        {"no records in between", "torn,li\n" + alice + std::string("\0\1\xFF\n", 4) + kOther + "10.0.0.5,al", 3, 0, 2,
-         1, aliceNow + kOther, "alice"},
-        {"an empty file", "", 3, 0, 2, -2, "", ""},
-    };
-    for (const Case& one : cases) {
-        SCOPED_TRACE(one.what);
-        writeRecords(one.before);
+    const std::string stale = "10.0.0.5,alice,s1,5,99099,1,0,L\n";
+    for (const auto& [what, before, flags, keep, answer, after, name] :
+         Rows<const char*, std::string, int, int, int, std::string, std::string>{
+             row("a user", alice + kOther, 3, 0, 1, aliceNow + kOther, "alice"),
+             row("an administrator", carol, 3, 0, 2, carolNow, "carol"),
+             row("an administrator as a user", carol, 2, 0, 1, carolNow, "carol"),
+             row("a user where only administrators count", alice, 1, 0, -2, aliceNow, "alice"),
+             row("the time of access kept", alice, 3, 1, 1, "10.0.0.5,alice,s1,5,99999,2,0,L\n", "alice"),
+             row("just fresh", "10.0.0.5,alice,s1,5,99100,1,0,L\n", 3, 0, 1, aliceNow, "alice"),
+             row("just stale", stale + kOther, 3, 0, -1, kOther, "alice"),
+             row("stale, but kept", stale, 3, 1, -1, "10.0.0.5,alice,s1,5,99099,2,0,L\n", "alice"),
+             row("never stale", "10.0.0.5,alice,s1,5,1,1,7,L\n", 3, 0, 1, "10.0.0.5,alice,s1,5,100000,2,7,L\n",
+                 "alice"),
+             row("of others: stale, fresh, never stale", "a,u,x,5,99099,1,0,L\na,u,x,5,99100,1,0,K\na,u,x,5,0,1,1,M\n",
+                 3, 0, -2, "a,u,x,5,99100,1,0,K\na,u,x,5,0,1,1,M\n", ""),
+             row("another link", "10.0.0.5,alice,s1,5,99999,1,0,K\n", 3, 0, -2, "10.0.0.5,alice,s1,5,99999,1,0,K\n",
+                 ""),
+             row("another address, stale", "10.0.0.6,alice,s1,5,99099,1,0,L\n" + kOther, 3, 1, -2, kOther, ""),
+             row("a deleted user", "10.0.0.5,zed,s1,5,99999,1,0,L\n" + kOther, 3, 0, -2, kOther, "zed"),
+             row("an account that ended", "10.0.0.5,gone,s1,5,99999,1,0,L\n", 3, 0, -2, "", "gone"),
+             row("the last match decides", carol + alice, 3, 0, 1, carolNow + aliceNow, "alice"),
+             row("a deleted user decides nothing", alice + "10.0.0.5,zed,s1,5,99999,1,0,L\n", 3, 0, 1, aliceNow, "zed"),
+             row("no records in between", "torn,li\n" + alice + std::string("\0\1\xFF\n", 4) + kOther + "10.0.0.5,al",
+                 3, 0, 1, aliceNow + kOther, "alice"),
+             row("an empty file", "", 3, 0, -2, "", "")}) {
+        SCOPED_TRACE(what);
+        writeRecords(before);
         unsetenv("USERNAME");
-        EXPECT_EQ(check(one.flags, one.keep, one.position), one.answer);
-        EXPECT_EQ(records(), one.after);
-        EXPECT_EQ(std::string(user), one.user);
-        EXPECT_EQ(getenv("USERNAME") == nullptr ? "" : getenv("USERNAME"), one.user);
+        EXPECT_EQ(check(flags, keep), answer);
+        EXPECT_EQ(records(), after);
+        EXPECT_EQ(user, name);
+        EXPECT_EQ(getenv("USERNAME") == nullptr ? "" : getenv("USERNAME"), name);
         EXPECT_FALSE(fs::exists(path(orvel::kRecordTemporary)));
     }
 }
@@ -140,17 +97,12 @@ TEST_F(SessionTest, ApplicationsOfThePositions) {
 }
 
 TEST_F(SessionTest, TheAddressOfTheClient) {
-    struct Case {
-        const char *forwarded, *client, *remote;
-        std::string recorded;
-    };
+    const char* const kNone = nullptr;
     const std::string longText(60, '7');
-    for (const auto& [forwarded, client, remote, recorded] :
-         {Case{"10.0.0.5, 192.168.1.2", "10.0.0.6", "10.0.0.7", "10.0.0.5"},
-          {"10.0.0.5", nullptr, nullptr, "10.0.0.5"},
-          {nullptr, "10.0.0.6", "10.0.0.7", "10.0.0.6"},
-          {nullptr, nullptr, "10.0.0.7", "10.0.0.7"},
-          {longText.c_str(), nullptr, nullptr, longText.substr(0, 45)}}) {
+    for (const auto& [forwarded, client, remote, recorded] : Rows<const char*, const char*, const char*, std::string>{
+             row("10.0.0.5, 192.168.1.2", "10.0.0.6", "10.0.0.7", "10.0.0.5"),
+             row(kNone, "10.0.0.6", "10.0.0.7", "10.0.0.6"), row(kNone, kNone, "10.0.0.7", "10.0.0.7"),
+             row(longText.c_str(), kNone, kNone, longText.substr(0, 45))}) {
         for (const auto& [name, value] :
              {std::pair{"HTTP_X_FORWARDED_FOR", forwarded}, {"HTTP_CLIENT_IP", client}, {"REMOTE_ADDR", remote}}) {
             value == nullptr ? unsetenv(name) : setenv(name, value, 1);
@@ -159,7 +111,7 @@ TEST_F(SessionTest, TheAddressOfTheClient) {
         EXPECT_EQ(check(), 1) << recorded;
     }
     setenv("HTTP_X_FORWARDED_FOR", "10.0.0.99", 1);
-    for (const char* skip : {"no", "yes please, whoever asks", "YES", "yes"}) {
+    for (const char* skip : {"yes please, whoever asks", "YES", "yes"}) {
         setSetting("skip_checksrcip", skip);
         EXPECT_EQ(check(), std::string(skip) == "yes" ? 1 : -2) << skip;
     }
@@ -182,7 +134,7 @@ TEST_F(SessionTest, RefusedBeforeAnyRecordIsRead) {
     vexo::gate::fail("VexoCgiBeginCriticalSection", VEXO_ERR_GENERAL, ETIMEDOUT, 1);
     EXPECT_EQ(check(), -2);
     announceLog("sysinfo Failed, reason=Operation not permitted");
-    support::uptime = -1;
+    uptime = -1;
     EXPECT_EQ(check(), -2);
     unsetenv("REMOTE_ADDR");
     EXPECT_EQ(check(), -4);
@@ -193,17 +145,17 @@ TEST_F(SessionTest, PlantedFiles) {
     const std::string record = path(orvel::kRecordFile), temporary = path(orvel::kRecordTemporary),
                       lock = path(orvel::kRecordLock);
     const std::string victim = path("/etc/victim"), good = "10.0.0.5,alice,s1,5,99999,1,0,L\n";
-    support::writeFile(victim, good);
+    writeFile(victim, good);
     const auto plants = std::vector<std::pair<const char*, std::function<void(const std::string&)>>>{
         {"link", [&](const std::string& at) { fs::create_symlink(victim, at); }},
         {"second name", [&](const std::string& at) { fs::create_hard_link(victim, at); }},
         {"pipe", [](const std::string& at) { mkfifo(at.c_str(), 0666); }},
         {"folder", [](const std::string& at) { fs::create_directory(at); }},
-        {"writable", [&](const std::string& at) { support::writeFile(at, good, 0666); }},
+        {"writable", [&](const std::string& at) { writeFile(at, good, 0666); }},
         {"another's",
          [&](const std::string& at) {
-             support::writeFile(at, good, 0600);
-             if (chown(at.c_str(), support::kBobUid, kUsersGid) != 0) chmod(at.c_str(), 0666);
+             writeFile(at, good, 0600);
+             if (chown(at.c_str(), kBobUid, kUsersGid) != 0) chmod(at.c_str(), 0666);
          }},
     };
     for (const auto& [what, plant] : plants) {
@@ -218,8 +170,7 @@ TEST_F(SessionTest, PlantedFiles) {
         plant(temporary);
         if (isFolder) announceLog("file open error, reason=Is a directory");
         EXPECT_EQ(check(), isFolder ? -4 : 1);
-        struct stat status = {};
-        EXPECT_EQ(lstat(record.c_str(), &status), 0);
+        const struct stat status = statusOf(record);
         EXPECT_TRUE(S_ISREG(status.st_mode) && (status.st_mode & 07777) == 0600 && status.st_nlink == 1);
         fs::remove(lock);
         plant(lock);
@@ -232,7 +183,7 @@ TEST_F(SessionTest, PlantedFiles) {
 
 TEST_F(SessionTest, NoFaultLosesARecord) {
     // Two records and a user's share of questions: whatever fails, the other session stays and no temporary is left.
-    support::sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
+    sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
         const std::string before = "10.0.0.5,alice,s1,5,99999,1,0,L\n" + kOther;
         writeRecords(before);
         const int answer = check();
@@ -248,13 +199,13 @@ TEST_F(SessionTest, NoFaultLosesARecord) {
 TEST_F(SessionTest, Adding) {
     std::string first, second;
     ASSERT_TRUE(orvel::addLoginRecord("alice", first, 0, "L"));
-    EXPECT_EQ(support::secondsSlept, 1U) << "also without a file";
-    const std::string drawn = std::to_string(support::uptime - 1);
+    EXPECT_EQ(secondsSlept, 1U) << "also without a file";
+    const std::string drawn = std::to_string(uptime - 1);
     EXPECT_EQ(records(), "10.0.0.5,alice," + first + "," + drawn + "," + drawn + ",1,0,L\n");
     EXPECT_STREQ(getenv("USERNAME"), "alice");
-    support::uptime = 100000;  // the same second once more gives the same identifier: another one is drawn
+    uptime = 100000;  // the same second once more gives the same identifier: another one is drawn
     ASSERT_TRUE(orvel::addLoginRecord("alice", second, 7, nullptr));
-    EXPECT_EQ(support::secondsSlept, 3U);
+    EXPECT_EQ(secondsSlept, 3U);
     EXPECT_NE(first, second);
     EXPECT_TRUE(records().ends_with(",1,7,\n"));
     EXPECT_EQ(first.size(), 13U);
@@ -262,23 +213,15 @@ TEST_F(SessionTest, Adding) {
     EXPECT_EQ(fs::status(path(orvel::kRecordFile)).permissions(), fs::perms(0600));
 
     const std::string before = records();
-    struct Case {
-        const char *user, *address, *link, *log;
-    };
     const std::string longLink(500, 'x');
-    for (const auto& [name, address, link, log] :
-         {Case{nullptr, "10.0.0.5", "L", "Bad parameter."},
-          {"", "10.0.0.5", "L", "Bad parameter."},
-          {"a,b", "10.0.0.5", "L", "Bad parameter."},
-          {"a\nb", "10.0.0.5", "L", "Bad parameter."},
-          {"carol", "", "L", "Bad parameter."},
-          {"carol", "10.0.0.5\r", "L", "Bad parameter."},
-          {"carol", "10.0.0.5", "L,0", "Bad parameter."},
-          {"carol", "10.0.0.5", "L\n", "Bad parameter."},
-          {"carol", "10.0.0.5", longLink.c_str(), "VLIBCFileAddLine Failed."}}) {
+    for (const auto& [name, address, link] : Rows<const char*, const char*, const char*>{
+             row(static_cast<const char*>(nullptr), "10.0.0.5", "L"), row("", "10.0.0.5", "L"),
+             row("a,b", "10.0.0.5", "L"), row("a\nb", "10.0.0.5", "L"), row("carol", "", "L"),
+             row("carol", "10.0.0.5\r", "L"), row("carol", "10.0.0.5", "L,0"),
+             row("carol", "10.0.0.5", longLink.c_str())}) {
         setenv("REMOTE_ADDR", address, 1);
-        announceLog(std::string(") ") + log);
-        EXPECT_FALSE(orvel::addLoginRecord(name, first, 0, link)) << log;
+        announceLog(link == longLink ? ") VLIBCFileAddLine Failed." : ") Bad parameter.");
+        EXPECT_FALSE(orvel::addLoginRecord(name, first, 0, link));
     }
     setenv("REMOTE_ADDR", "10.0.0.5", 1);
     vexo::gate::fail("VLIBCFileGetLine", VEXO_ERR_GENERAL, EIO, 1);
@@ -310,16 +253,16 @@ TEST_F(SessionTest, LookingUpASession) {
 }
 
 TEST_F(SessionTest, AFullDiskKeepsTheOldFile) {
-    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
         const std::string folder = path("/tmp");
-        if (mount("none", folder.c_str(), "tmpfs", 0, "size=64k,mode=1777") != 0) return support::kNoPrivateMounts;
+        if (mount("none", folder.c_str(), "tmpfs", 0, "size=64k,mode=1777") != 0) return kNoPrivateMounts;
         std::string before = "10.0.0.5,alice,s1,5,99999,1,0,L\n";
         while (before.size() < 4096 - 100) before += kOther;
         const std::string head = "1.2.3.4,", tail = ",x,5,99999,1,7,L\n";
         before += head + std::string(4096 - before.size() - head.size() - tail.size(), 'u') + tail;
         writeRecords(before);  // fills its page to the end
         { const orvel::CriticalSection section(orvel::kRecordLock); }
-        support::writeFile(folder + "/rest", std::string(64 << 10, 'x'));
+        writeFile(folder + "/rest", std::string(64 << 10, 'x'));
         EXPECT_EQ(check(), -4);
         EXPECT_EQ(records(), before);
         EXPECT_FALSE(fs::exists(path(orvel::kRecordTemporary)));

@@ -1,54 +1,28 @@
 // A visitor's way: the link's row, the log-in, the cookie, the page.
 #include "orvel/sharing_link.h"
 
-#include <gtest/gtest.h>
 #include <sqlite3.h>
-#include <unistd.h>
 
-#include <cerrno>
-#include <cstdlib>
-#include <ctime>
-#include <filesystem>
-#include <string>
-#include <vector>
-
-#include "fault_gate.h"
-#include "sharing/clock.h"
 #include "sharing/link_lookup.h"
-#include "sharing/record_file.h"
-#include "support/appliance.h"
+#include "sharing/visitor_fixture.h"
 #include "support/log_texts.h"
 #include "vexo/auto_block.h"
-#include "vexo/error.h"
 
-namespace fs = std::filesystem;
 using OrvelLogin::FolderSharingLoginManager;
-using support::announceLog;
 
 namespace {
 
 using Texts = std::vector<std::string>;
 
-class SharingLinkTest : public support::ApplianceTest {
+class SharingLinkTest : public VisitorTest {
  protected:
     void SetUp() override {
-        ApplianceTest::SetUp();
-        setenv("REMOTE_ADDR", "10.0.0.5", 1);
-        support::makeFolder(systemRoot() + "/tmp", 01777);
-        support::makeFolder(systemRoot() + "/var/lib/vexo");
-        support::uptime = 100000;
-        support::secondsSlept = 0;
-    }
-    void TearDown() override {
-        for (const char* name : {"REMOTE_ADDR", "HTTP_COOKIE", "QUERY_STRING", "HTTP_FOLDER_SHARING",
-                                 "HTTP_X_FORWARDED_FOR", "USERNAME"}) {
-            unsetenv(name);
-        }
-        ApplianceTest::TearDown();
+        VisitorTest::SetUp();
+        makeFolder(systemRoot() + "/var/lib/vexo");
     }
     static std::string database() { return systemRoot() + "/usr/vexo/etc/pexlander/pxsharing.db"; }
     static void sql(const std::string& text) {
-        support::makeFolder(fs::path(database()).parent_path());
+        makeFolder(fs::path(database()).parent_path());
         sqlite3* db = nullptr;
         ASSERT_EQ(sqlite3_open(database().c_str(), &db), SQLITE_OK);
         EXPECT_EQ(sqlite3_exec(db, text.c_str(), nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
@@ -70,30 +44,22 @@ class SharingLinkTest : public support::ApplianceTest {
 
 TEST_F(SharingLinkTest, TheRowOfALink) {
     const long now = time(nullptr);
-    const auto row = [](const std::string& id, const std::string& uid, const std::string& path,
-                        const std::string& available, const std::string& expires) {
-        return "INSERT INTO sharingLinks VALUES('" + id + "'," + uid + "," + path + ",'f','p'," + available + "," +
-               expires + ");";
+    const auto insert = [](const std::string& id, const std::string& values) {
+        return "INSERT INTO sharingLinks VALUES('" + id + "'," + values + ");";
     };
     sql("CREATE TABLE sharingLinks(linkID TEXT, uid TEXT, filepath TEXT, filename TEXT, password TEXT, AvailDate TEXT, "
         "ExpDate TEXT);" +
-        row("open", "'alice'", "'/photo'", "'0'", "'0'") + row("it''s \"", "'alice'", "'/quoted'", "'0'", "'0'") +
-        row("future", "'alice'", "'/photo'", "'" + std::to_string(now + 1000) + "'", "'99999999999'") +
-        row("past", "'alice'", "'/photo'", "'0'", "'" + std::to_string((now - 200000) / 10 * 10) + "'") +
-        row("noUser", "NULL", "'/photo'", "'0'", "'0'") + row("noPath", "'alice'", "NULL", "'0'", "'0'") +
-        row("noBegin", "'alice'", "'/photo'", "NULL", "'0'") + row("noEnd", "'alice'", "'/photo'", "'0'", "NULL") +
-        row("nothing", "'alice'", "'/photo'", "NULL", "'10'"));
+        insert("open", "'alice','/photo','f','p','0','0'") + insert("it''s \"", "'alice','/quoted','f','p','0','0'") +
+        insert("future", "'alice','/photo','f','p','" + std::to_string(now + 1000) + "','99999999999'") +
+        insert("noUser", "NULL,'/photo','f','p','0','0'") + insert("noPath", "'alice',NULL,'f','p','0','0'") +
+        insert("noBegin", "'alice','/photo','f','p',NULL,'0'") + insert("noEnd", "'alice','/photo','f','p','0',NULL") +
+        insert("nothing", "'alice','/photo','f','p',NULL,'10'"));
     const std::string end = "orvellogin:# Sharing download DBquery failed";
     const std::string outside = "orvellogin:# sharing link out of valid duration";
-    struct Case {
-        std::string link, path;
-        Texts log;
-    };
-    for (const auto& [link, path, log] : std::vector<Case>{
+    for (const auto& [link, path, log] : Rows<std::string, std::string, Texts>{
              {"open", "/photo", {}},
              {"it's \"", "/quoted", {}},
              {"future", "/photo", {outside, end}},  // returned all the same
-             {"past", "/photo", {outside, end}},
              {"noUser", "", {"orvellogin:# faild to fetch uid", end}},
              {"noPath", "", {}},
              {"noBegin", "/photo", {"orvellogin:# faild to fetch AvailDate", end}},  // an end of 0 does not mend it
@@ -102,7 +68,7 @@ TEST_F(SharingLinkTest, TheRowOfALink) {
              {"' OR 1 --", "", {"orvellogin:# faild to fetch query result", end}},
          }) {
         EXPECT_EQ(pathOf(link), path) << link;
-        EXPECT_EQ(support::takeLogTexts(), log) << link;
+        EXPECT_EQ(takeLogTexts(), log) << link;
     }
 
     // The header comes before the parameter; without both nothing is asked.
@@ -114,8 +80,7 @@ TEST_F(SharingLinkTest, TheRowOfALink) {
     unsetenv("QUERY_STRING");
     VEXO::WebCGI none;
     vexo::gate::reset();
-    EXPECT_EQ(manager.GetSharingFolderPath(none), "");
-    EXPECT_FALSE(manager.isAuthorized(none));
+    EXPECT_TRUE(manager.GetSharingFolderPath(none).empty() && !manager.isAuthorized(none));
     EXPECT_EQ(vexo::gate::calls("VEXODBConnect"), 0);
 }
 
@@ -123,21 +88,19 @@ TEST_F(SharingLinkTest, DatabasesThatCannotBeAsked) {
     const Texts unconnected = {"orvellogin:# Failed to connect to database", "orvellogin:# DB Query failed",
                                "orvellogin:# Sharing download DBquery failed"};
     EXPECT_EQ(pathOf("x"), "");
-    EXPECT_EQ(support::takeLogTexts(), unconnected);
+    EXPECT_EQ(takeLogTexts(), unconnected);
     EXPECT_FALSE(fs::exists(database())) << "never made";
-    support::writeFile(database(), "no database at all, but long enough to be taken for the header of one.......");
+    writeFile(database(), "no database at all, but long enough to be taken for the header of one.......");
     EXPECT_EQ(pathOf("it's"), "");
-    const Texts broken = support::takeLogTexts();
-    ASSERT_EQ(broken.size(), 3U);
-    EXPECT_EQ(broken[0],
-              "orvellogin:# Failed to exec [SELECT * FROM sharingLinks WHERE linkID = 'it''s' LIMIT 1;] (file is not a "
-              "database)");
-    EXPECT_EQ(broken[1], unconnected[1]);
-    EXPECT_EQ(broken[2], unconnected[2]);
+    EXPECT_EQ(
+        takeLogTexts(),
+        (Texts{"orvellogin:# Failed to exec [SELECT * FROM sharingLinks WHERE linkID = 'it''s' LIMIT 1;] (file is "
+               "not a database)",
+               unconnected[1], unconnected[2]}));
     fs::remove(database());
     sql("CREATE TABLE sharingLinks(linkID TEXT)");
     EXPECT_EQ(orvel::sharedPathOf(std::string(2 << 20, '\'')), "");
-    EXPECT_EQ(support::takeLogTexts(), (Texts{"orvellogin:# faild to fetch query result", unconnected[2]}));
+    EXPECT_EQ(takeLogTexts(), (Texts{"orvellogin:# faild to fetch query result", unconnected[2]}));
 }
 
 TEST_F(SharingLinkTest, LoggedInByACookieOfTheLink) {
@@ -150,12 +113,10 @@ TEST_F(SharingLinkTest, LoggedInByACookieOfTheLink) {
     ASSERT_TRUE(manager.folderSharingLogin(first, "L", "alice"));
     ASSERT_TRUE(manager.folderSharingLogin(first, "K", "carol"));
     EXPECT_EQ(manager.GetLoginUserName(), "carol");
-    EXPECT_EQ(support::secondsSlept, 2U);
+    EXPECT_EQ(secondsSlept, 2U);
 
-    const std::string header = headerOf(first), records = support::readFile(systemRoot() + orvel::kRecordFile);
-    const auto sessionOf = [&](const std::string& line) {
-        return records.substr(records.find(line) + line.size(), 13);
-    };
+    const std::string header = headerOf(first), lines = records();
+    const auto sessionOf = [&](const std::string& line) { return lines.substr(lines.find(line) + line.size(), 13); };
     const std::string alice = sessionOf("10.0.0.5,alice,"), carol = sessionOf("10.0.0.5,carol,");
     const std::string kAttributes = "; Path=/; HttpOnly; SameSite=Lax\r\n";
     EXPECT_EQ(header, "Set-Cookie: L=" + alice + kAttributes + "Set-Cookie: K=" + carol + kAttributes +
@@ -172,7 +133,7 @@ TEST_F(SharingLinkTest, LoggedInByACookieOfTheLink) {
     EXPECT_EQ(later.GetLoginUserName(), "carol");
     EXPECT_TRUE(later.folderSharingLogin(second, "L", "bob")) << "logged in already: nothing new";
     EXPECT_EQ(later.GetLoginUserName(), "alice");
-    EXPECT_EQ(support::secondsSlept, 2U);
+    EXPECT_EQ(secondsSlept, 2U);
 
     setenv("HTTP_COOKIE", ("L=\x01" + alice + "\n; K=").c_str(), 1);
     VEXO::WebCGI hostile;
@@ -230,8 +191,7 @@ TEST_F(SharingLinkTest, RefusedLogins) {
 
 TEST_F(SharingLinkTest, ThePageOnStandardOutput) {
     const std::string desktop = systemRoot() + "/usr/vexo/vexoman/webman";
-    support::makeFolder(desktop);
-    fs::last_write_time(desktop, fs::file_time_type::clock::now());
+    makeFolder(desktop);
     setenv("QUERY_STRING", "tunnel=/t&noCache=", 1);
     VEXO::WebCGI cgi;
     ASSERT_TRUE(cgi.AddCookieToHeader("/", "L", "s"));
@@ -244,9 +204,7 @@ TEST_F(SharingLinkTest, ThePageOnStandardOutput) {
     EXPECT_TRUE(plain.ends_with("<body>\n</body></html>\n"));
     EXPECT_NE(plain.find("var g_FolderPath = '/photo/a\\'b';"), std::string::npos);
     EXPECT_NE(plain.find("var g_MD5 = 'digest';"), std::string::npos);
-    struct stat status = {};
-    ASSERT_EQ(stat(desktop.c_str(), &status), 0);
-    const std::string version = std::to_string(status.st_mtime);
+    const std::string version = std::to_string(statusOf(desktop).st_mtime);
     EXPECT_NE(plain.find("src='/t/webman/vexodefs.cgi?v=" + version + "'"), std::string::npos);
     EXPECT_NE(plain.find("FolderSharingLoader.js?" + version + "'"), std::string::npos);
 

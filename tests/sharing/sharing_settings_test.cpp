@@ -1,39 +1,20 @@
 #include "orvel/sharing_settings.h"
 
-#include <fcntl.h>
-#include <gtest/gtest.h>
-#include <sys/file.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
-#include <unistd.h>
 
-#include <cerrno>
-#include <chrono>
-#include <csignal>
-#include <filesystem>
 #include <map>
-#include <string>
-#include <thread>
-#include <vector>
 
-#include "fault_gate.h"
-#include "platform/private_mounts.h"
-#include "support/appliance.h"
-#include "support/fault_sweep.h"
-#include "vexo/error.h"
+#include "support/testing.h"
 
-namespace fs = std::filesystem;
 using OrvelSharing::SharingManager;
-using support::announceLog;
-using support::kUsersGid;
 
 namespace {
 
-class SharingSettingsTest : public support::ApplianceTest {
+class SharingSettingsTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
-        support::makeFolder(systemRoot() + "/usr/vexo/etc");
+        makeFolder(systemRoot() + "/usr/vexo/etc");
     }
     static std::string file() { return systemRoot() + SharingManager::STR_VEXO_SHARING; }
     SharingManager manager;
@@ -45,39 +26,35 @@ TEST_F(SharingSettingsTest, ChoicesOfUsers) {
     EXPECT_TRUE(manager.getPrivileges().empty());
     EXPECT_TRUE(manager.setPrivileges({{"alice", "true"}}));
     EXPECT_EQ(fs::status(file()).permissions(), fs::perms(0644));
-    EXPECT_EQ(support::readFile(file()), "20001=\"true\"\n");
+    EXPECT_EQ(readFile(file()), "20001=\"true\"\n");
 
-    support::writeFile(file(), foreign);
+    writeFile(file(), foreign);
     announceLog("orvelsharing:");
     EXPECT_FALSE(manager.setPrivileges({{"", "true"}, {"alice", "true"}, {"bob", "no"}, {"nobody-here", "true"}}));
-    EXPECT_EQ(support::readFile(file()), foreign + "\n20001=\"true\"\n");
+    EXPECT_EQ(readFile(file()), foreign + "\n20001=\"true\"\n");
     EXPECT_TRUE(manager.hasPrivilege("alice"));
     EXPECT_FALSE(manager.hasPrivilege("carol"));
     EXPECT_TRUE(manager.setPrivileges({{"alice", "false"}, {"bob", "true"}}));
-    EXPECT_EQ(support::readFile(file()), foreign + "\n20002=\"true\"\n");
+    EXPECT_EQ(readFile(file()), foreign + "\n20002=\"true\"\n");
     EXPECT_TRUE(manager.removePrivilege("20002"));
     EXPECT_TRUE(manager.removePrivilege("20002"));
-    EXPECT_EQ(support::readFile(file()), foreign + "\n");
+    EXPECT_EQ(readFile(file()), foreign + "\n");
 
-    support::writeFile(file(), "7=\"true\"\n007=\"false\"\n8=\"false\"\n8=\"true\"\nx=\"true\"\n4294967297=\"true\"\n");
+    writeFile(file(), "7=\"true\"\n007=\"false\"\n8=\"false\"\n8=\"true\"\nx=\"true\"\n4294967297=\"true\"\n");
     EXPECT_EQ(manager.getPrivileges(), (std::map<unsigned, bool>{{7, true}, {8, false}, {0, true}, {1, true}}));
-    support::writeFile(file(), "20001=\"truest\"\n");
+    writeFile(file(), "20001=\"truest\"\n");
     EXPECT_FALSE(manager.hasPrivilege("alice"));
     announceLog("Failed to get GID for user=no\\x0Aone");
     EXPECT_FALSE(manager.hasPrivilege("no\none"));
 }
 
 TEST_F(SharingSettingsTest, Failures) {
-    support::writeFile(file(), "20001=\"true\"\n");
-    struct Case {
-        const char *operation, *log;
-        std::function<bool()> run;
-    };
+    writeFile(file(), "20001=\"true\"\n");
     const auto set = [&] { return manager.setPrivileges({{"bob", "true"}}); };
     const auto remove = [&] { return manager.setPrivileges({{"bob", "no"}}); };
     const auto isEmpty = [&] { return !manager.getPrivileges().empty(); };
-    for (const auto& [operation, log, run] : {
-             Case{"VLIBCFileSetKeyValue", "ApplyData: Failed to set bob", set},
+    for (const auto& [operation, log, run] : Rows<const char*, const char*, std::function<bool()>>{
+             {"VLIBCFileSetKeyValue", "ApplyData: Failed to set bob", set},
              {"VLIBCFileRemoveKey", nullptr, remove},
              {"VEXOUserGetUGID", "Failed to get GID for user=bob", set},
              {"VLIBCFileGetKeyValue", "VLIBCFileGetKeyValue failed", [&] { return manager.hasPrivilege("alice"); }},
@@ -92,7 +69,7 @@ TEST_F(SharingSettingsTest, Failures) {
         if (log != nullptr) announceLog(log);
         EXPECT_FALSE(run()) << operation;
     }
-    EXPECT_EQ(support::readFile(file()), "20001=\"true\"\n");
+    EXPECT_EQ(readFile(file()), "20001=\"true\"\n");
     vexo::gate::reset();
     fs::remove(file());
     fs::create_symlink("/etc/passwd", file());
@@ -105,14 +82,8 @@ TEST_F(SharingSettingsTest, WhoMayShare) {
     addUser("gone", 20009, kUsersGid);
     writeRootFile("/etc/shadow", "gone:x:1:0:9:7::7:\n");
     const char* const kNoSetting = nullptr;
-    struct Case {
-        const char *setting, *user;
-        std::string choices;
-        int may;
-        const char* log;
-    };
-    for (const auto& [setting, user, choices, may, log] : {
-             Case{kNoSetting, "alice", "", 1, nullptr},
+    for (const auto& [setting, user, choices, may, log] : Rows<const char*, const char*, const char*, int, const char*>{
+             {kNoSetting, "alice", "", 1, nullptr},
              {"anything", "alice", "", 1, nullptr},
              {"admin_only", "alice", "20001=\"true\"\n", 0, nullptr},
              {"admin_only", "carol", "", 1, nullptr},
@@ -125,7 +96,7 @@ TEST_F(SharingSettingsTest, WhoMayShare) {
              {kNoSetting, nullptr, "", 0, "VEXOGroupIsAdminGroupMemEx((null)) failed. [0x0D00 "},
          }) {
         if (setting != nullptr) setSetting("PX_SHARING_SETTING", setting);
-        support::writeFile(file() + ".new", choices);
+        writeFile(file() + ".new", choices);
         fs::rename(file() + ".new", file());
         if (log != nullptr) announceLog(log);
         EXPECT_EQ(OrvLibUserPrivForSharing(user), may) << (setting == nullptr ? "" : setting) << " " << choices;
@@ -145,69 +116,22 @@ TEST_F(SharingSettingsTest, WhoMayShare) {
     EXPECT_EQ(OrvLibUserPrivForSharing("carol"), 0);
 }
 
-TEST_F(SharingSettingsTest, AFullDiskKeepsTheOldChoices) {
-    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
-        const std::string folder = systemRoot() + "/usr/vexo/etc";
-        if (mount("none", folder.c_str(), "tmpfs", 0, "size=32k") != 0) return support::kNoPrivateMounts;
-        std::string before = "1=\"true\"\n";
-        before += "# " + std::string(4096 - before.size() - 3, '.') + "\n";  // fills its page to the end
-        support::writeFile(file(), before);
-        support::writeFile(folder + "/rest", std::string(32 << 10, 'x'));
-        announceLog("ApplyData: Failed to set bob");
-        EXPECT_FALSE(manager.setPrivileges({{"bob", "true"}}));
-        EXPECT_EQ(support::readFile(file()), before);
-        return 0;
-    }));
-}
-
-// Eight writers, each with its own users; one of them is killed every few milliseconds and another takes its place.
-TEST_F(SharingSettingsTest, WritersThatAreKilledLoseNoAcknowledgedChoice) {
-    constexpr unsigned kWriters = 8, kUsersEach = 50, kFirstUid = 30000;
+// Each with its own users; every change reads and writes the whole file.
+TEST_F(SharingSettingsTest, WritersAtOnceLoseNoChoice) {
+    constexpr unsigned kWriters = 8, kUsersEach = 25, kFirstUid = 30000;
     for (unsigned i = 0; i < kWriters * kUsersEach; ++i) addUser("w" + std::to_string(i), kFirstUid + i, kUsersGid);
     const std::string foreign = "# by hand\r\n17=\"true\"\nno setting, no end of line";
-    support::writeFile(file(), foreign);
-    // What each writer has been told to be applied: a byte for each choice, written after the answer.
-    const std::string acknowledged = systemRoot() + "/acknowledged";
-    support::writeFile(acknowledged, std::string(kWriters * kUsersEach, '0'));
-    const auto writer = [&](unsigned number) {
-        const std::string before = support::readFile(acknowledged);
-        const int fd = open(acknowledged.c_str(), O_WRONLY | O_CLOEXEC);
-        for (unsigned user = number * kUsersEach; user < (number + 1) * kUsersEach; ++user) {
-            const char done = '1';
-            if (before[user] == done) continue;
-            if (!manager.setPrivileges({{"w" + std::to_string(user), "true"}})) return 1;
-            if (pwrite(fd, &done, 1, user) != 1) return 1;
-        }
-        return 0;
-    };
-    pid_t running[kWriters] = {};
-    const auto start = [&](unsigned number) {
-        running[number] = fork();
-        if (running[number] == 0) _exit(writer(number));
-    };
-    for (unsigned i = 0; i < kWriters; ++i) start(i);
-    for (unsigned round = 0; round < 40; ++round) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(5));
-        const unsigned victim = round * 5 % kWriters;
-        kill(running[victim], SIGKILL);
-        waitpid(running[victim], nullptr, 0);
-        const int locked = open(file().c_str(), O_RDONLY | O_CLOEXEC);  // a reader alone may meet a change half done
-        flock(locked, LOCK_EX);
-        const std::string now = support::readFile(acknowledged);
-        const auto choices = manager.getPrivileges();
-        close(locked);
-        for (unsigned i = 0; i < now.size(); ++i) {
-            ASSERT_TRUE(now[i] == '0' || choices.count(kFirstUid + i) == 1) << i;
-        }
-        start(victim);
+    writeFile(file(), foreign);
+    for (unsigned writer = 0; writer < kWriters; ++writer) {
+        if (fork() != 0) continue;
+        bool done = true;
+        for (unsigned user = writer * kUsersEach; user < (writer + 1) * kUsersEach; ++user)
+            done = manager.setPrivileges({{"w" + std::to_string(user), "true"}}) && done;
+        _exit(done ? 0 : 1);
     }
-    for (const pid_t child : running) {
-        int status = 0;
-        waitpid(child, &status, 0);
-        EXPECT_EQ(status, 0);
-    }
+    for (int status = 0; wait(&status) > 0;) EXPECT_EQ(status, 0);
     EXPECT_EQ(manager.getPrivileges().size(), kWriters * kUsersEach + 1);
-    EXPECT_TRUE(support::readFile(file()).starts_with(foreign + "\n"));
+    EXPECT_TRUE(readFile(file()).starts_with(foreign + "\n"));
 }
 
 }  // namespace
