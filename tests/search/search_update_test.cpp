@@ -20,7 +20,8 @@ class SearchUpdateTest : public SearchFixture {
         // To another file system it is a copy, with a status of its own.
         std::error_code isFile;
         for (const auto& entry : fs::recursive_directory_iterator(to, isFile)) {
-            if (entry.is_regular_file()) chmod(entry.path().c_str(), 0640);
+            if (!entry.is_regular_file()) continue;
+            EXPECT_EQ(chown(entry.path().c_str(), kAliceUid, kUsersGid) + chmod(entry.path().c_str(), 0640), 0);
         }
         auto status = recordOf(to);
         EXPECT_TRUE(screen_->updateFile(fromShare, from, toShare, to, status));
