@@ -1,19 +1,10 @@
-#include <climits>
-
 #include "orvel/privilege.h"
 #include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {
 
-using Texts = std::vector<std::string>;
-
 class AclPrivilegeTest : public ApplianceTest {};
-
-std::string workingFolder() {
-    char path[PATH_MAX];
-    return getcwd(path, sizeof path) != nullptr ? path : "";
-}
 
 TEST_F(AclPrivilegeTest, FailuresOfThePlatform) {
     const Rows<int, int, int, bool, bool> rows = {{0x8400, -1, 411, false, true}, {0x0600, -1, 408, false, false},
@@ -29,11 +20,11 @@ TEST_F(AclPrivilegeTest, FailuresOfThePlatform) {
         EXPECT_EQ(ACLAccess("/tmp", 31), result) << reason;
         EXPECT_EQ(OrvLibGetErr(), code) << reason;
         const std::string start = "orveldir:# Failed to get the ACL Privilege: file = /tmp, ";
-        EXPECT_EQ(takeLogTexts(), accessLogs ? Texts{start + "reason=[" + reason + "]"} : Texts{});
+        EXPECT_EQ(takeLogText(), accessLogs ? start + "reason=[" + reason + "]" : "");
 
         EXPECT_EQ(GetACLPrivilege("/tmp"), 0x1FFFU);
         const std::string line = start + "euid = " + std::to_string(geteuid()) + ", reason=[" + reason + "]";
-        EXPECT_EQ(takeLogTexts(), getLogs ? Texts{line} : Texts{}) << reason;
+        EXPECT_EQ(takeLogText(), getLogs ? line : "") << reason;
     }
 }
 
@@ -82,27 +73,25 @@ TEST_F(AclPrivilegeTest, EnteringAFolder) {
         OrvLibSetErr(7);
         EXPECT_FALSE(CheckDirListPrivilege(path.c_str()));
         EXPECT_EQ(OrvLibGetErr(), code);
-        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# Failed to chdir " + path + ". [" + strerror(failure) + "]"});
+        EXPECT_EQ(takeLogText(), "orveldir:# Failed to chdir " + path + ". [" + strerror(failure) + "]");
     }
     OrvLibSetErr(7);
     EXPECT_TRUE(CheckDirListPrivilege(root.c_str()));
     EXPECT_EQ(OrvLibGetErr(), 0);
-    EXPECT_EQ(workingFolder(), root) << "callers go on from inside the folder";
-}
+    EXPECT_EQ(fs::current_path(), root) << "callers go on from inside the folder";
 
-TEST_F(AclPrivilegeTest, FoldersThatAreClosed) {
     SKIP_WITHOUT_ROOT();
-    const std::string closed = shareRoot("photo") + "/closed", unread = shareRoot("photo") + "/unread";
+    const std::string closed = root + "/closed", unread = root + "/unread";
     makeFolder(closed, 0700);
     makeFolder(unread, 0711);
     asUser(kBobUid, kUsersGid, [&] {
         EXPECT_FALSE(CheckDirListPrivilege(closed.c_str()));
         EXPECT_EQ(OrvLibGetErr(), 407);
-        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# Failed to chdir " + closed + ". [Permission denied]"});
+        EXPECT_EQ(takeLogText(), "orveldir:# Failed to chdir " + closed + ". [Permission denied]");
         EXPECT_FALSE(CheckDirListPrivilege(unread.c_str()));
         EXPECT_EQ(OrvLibGetErr(), 407);
-        EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# Failed to opendir " + unread + ". [Permission denied]"});
-        EXPECT_EQ(workingFolder(), unread);
+        EXPECT_EQ(takeLogText(), "orveldir:# Failed to opendir " + unread + ". [Permission denied]");
+        EXPECT_EQ(fs::current_path(), unread);
         return 0;
     });
 }

@@ -16,14 +16,8 @@ TEST(PrivilegeDecision, NoAccessBeatsReadWriteBeatsReadOnly) {
     }
     EXPECT_EQ(orvel::ruleOf({true, true, true}), PrivilegeRule::kNoAccess);
     EXPECT_EQ(orvel::ruleOf({false, false, false}), PrivilegeRule::kNoList);
-}
-
-TEST(PrivilegeDecision, ServiceAnswersAndMasks) {
-    for (const auto& [answer, privilege] : Rows<int, int>{{0, 0}, {1, 1}, {2, 2}, {3, 0}, {-1, 0}, {4, 0}}) {
+    for (const auto& [answer, privilege] : Rows<int, int>{row(1, 1), row(2, 2), row(3, 0), row(-1, 0)})
         EXPECT_EQ(orvel::privilegeFromService(answer), privilege) << answer;
-    }
-    EXPECT_EQ(orvel::effectiveMask(true, 7), 0U);
-    EXPECT_EQ(orvel::effectiveMask(false, 7), 7U);
 }
 
 TEST(PrivilegeDecision, WhatAMaskForbids) {
@@ -59,11 +53,9 @@ TEST(PrivilegeDecision, UserKinds) {
 }
 
 TEST(PermissionText, LettersAndDigits) {
-    const Rows<unsigned, const char*, int> rows = {
-        {0755, "rwxr-xr-x", 755}, {0640, "rw-r-----", 640}, {0750, "rwxr-x---", 750},
-        {0, "---------", 0},      {0777, "rwxrwxrwx", 777}, {0104755, "rwxr-xr-x", 755},
-        {0007, "------rwx", 7},   {0421, "r---w---x", 421}, {~0U, "rwxrwxrwx", 777}};
-    for (const auto& [mode, text, digits] : rows) {
+    for (const auto& [mode, text, digits] : Rows<unsigned, const char*, int>{
+             row(0755U, "rwxr-xr-x", 755), row(0U, "---------", 0), row(0104640U, "rw-r-----", 640),
+             row(0421U, "r---w---x", 421), row(~0U, "rwxrwxrwx", 777)}) {
         EXPECT_EQ(GetPrivilegeStr(mode), text);
         EXPECT_EQ(GetPrivilege(mode), digits) << text;
         EXPECT_EQ(GetPrivilege(text), digits) << text;

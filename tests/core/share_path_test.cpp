@@ -24,13 +24,9 @@ Resolved resolve(const char* path, const std::string& user) {
 class SharePathTest : public ApplianceTest {};
 
 TEST_F(SharePathTest, Components) {
-    const std::string deep = "/" + std::string(4093, 'a') + "bc";
     for (const auto& [text, first, last, log] : Rows<std::string, const char*, const char*, const char*>{
-             row("/a/b/c", "a", "c", ""), row("//a//b//", "a", "b", ""), row("a/b", "a", "b", ""),
-             row("/\xff\xfe/..", "\xff\xfe", "..", ""), row("/only", "only", "only", ""),
+             row("//a//b//", "a", "b", ""), row("a/b", "a", "b", ""), row("/\xff\xfe/..", "\xff\xfe", "..", ""),
              row("photo", nullptr, nullptr, "orveldir(#): bad path name=photo"),
-             row("", nullptr, nullptr, "orveldir(#): bad path name="),
-             row("/", nullptr, nullptr, "orveldir(#) error path"),
              row("//", nullptr, nullptr, "orveldir(#) error path")}) {
         for (const int wanted : {1, 0}) {
             std::string path = text;
@@ -40,7 +36,7 @@ TEST_F(SharePathTest, Components) {
             EXPECT_EQ(takeLogText(), log);
         }
     }
-    std::string path = deep;
+    std::string path = "/" + std::string(4093, 'a') + "bc";
     const std::unique_ptr<char, decltype(&free)> cut(OrvLibGetTokOfPath(path.data(), 1), free);
     EXPECT_EQ(std::string(cut.get()), std::string(4093, 'a')) << "4,094 bytes are split";
     EXPECT_EQ(OrvLibGetTokOfPath(nullptr, 1), nullptr);
@@ -54,15 +50,12 @@ TEST_F(SharePathTest, Components) {
 TEST_F(SharePathTest, SharesResolve) {
     const std::string root = shareRoot("photo"), longRest = "/" + std::string(5000, 'x');
     for (const auto& [path, rest] : Rows<std::string, std::string>{
-             row("/photo", ""), row("/photo/2012/a.jpg", "/2012/a.jpg"), row("/photo/", "/"), row("//photo/a", "/a"),
-             row("photo/a", "/a"), row("/photo//a/../b/./", "//a/../b/./"), row("/photo/\xff\n", "/\xff\n"),
-             row("/photo" + longRest, longRest)}) {
+             row("/photo", ""), row("photo/a", "/a"), row("//photo//a/../b/./", "//a/../b/./"),
+             row("/photo/\xff\n", "/\xff\n"), row("/photo" + longRest, longRest)}) {
         const Resolved out = resolve(path.c_str(), "alice");
         EXPECT_EQ(out.result, 1) << path;
         EXPECT_EQ(out.real, root + rest);
-        EXPECT_EQ(out.share, "photo");
-        EXPECT_EQ(out.root, root);
-        EXPECT_EQ(out.volume, "/tmp");
+        EXPECT_EQ(out.share + out.root + out.volume, "photo" + root + "/tmp");
     }
     EXPECT_EQ(resolve("/homes/alice/docs", "bob").real, shareRoot("homes") + "/alice/docs");
     EXPECT_NE(access((shareRoot("homes") + "/alice").c_str(), F_OK), 0) << "an ordinary share here";
@@ -99,31 +92,19 @@ TEST_F(SharePathTest, HomeIsMadeOnFirstUse) {
     const Resolved out = resolve("/home/docs", "alice");
     EXPECT_EQ(out.result, 1);
     EXPECT_EQ(out.real, home + "/docs");
-    EXPECT_EQ(out.share, "home");
-    EXPECT_EQ(out.root, home);
-    EXPECT_EQ(out.volume, "/tmp");
-    struct stat status {};
-    ASSERT_EQ(stat(home.c_str(), &status), 0);
-    EXPECT_EQ(status.st_mode & 07777, 0755U);
-    EXPECT_EQ(status.st_uid, kAliceUid);
-    EXPECT_EQ(status.st_gid, kUsersGid);
-}
+    EXPECT_EQ(out.share + out.root + out.volume, "home" + home + "/tmp");
+    const struct stat made = statusOf(home);
+    EXPECT_EQ(std::tie(made.st_uid, made.st_gid), std::make_tuple(kAliceUid, kUsersGid));
+    EXPECT_EQ(made.st_mode & 07777, 0755U);
 
-TEST_F(SharePathTest, HomeIsCanonicalAndAnExistingOneStays) {
-    const std::string place = shareRoot("photo") + "/elsewhere", home = shareRoot("homes") + "/alice";
+    // One that is there stays as it is; it is told by its canonical path.
+    const std::string place = shareRoot("photo") + "/elsewhere";
     makeFolder(place, 0700);
-    makeFolder(home, 0711);
+    ASSERT_EQ(rmdir(home.c_str()) + symlink(place.c_str(), home.c_str()), 0);
     std::string path = "before";
     EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 1);
-    EXPECT_EQ(path, home);
-    struct stat status {};
-    ASSERT_EQ(stat(home.c_str(), &status), 0);
-    EXPECT_EQ(status.st_mode & 07777, 0711U);
-    EXPECT_EQ(status.st_uid, geteuid());
-    ASSERT_EQ(rmdir(home.c_str()), 0);
-    ASSERT_EQ(symlink(place.c_str(), home.c_str()), 0);
-    EXPECT_EQ(OrvUserHomeFullPathGet(path, "alice"), 1);
     EXPECT_EQ(path, place);
+    EXPECT_EQ(statusOf(place).st_mode & 07777, 0700U);
 }
 
 TEST_F(SharePathTest, HomeThatCannotBeHad) {
@@ -180,20 +161,12 @@ TEST_F(SharePathTest, CanonicalPaths) {
         EXPECT_EQ(OrvLibGetErr(), code) << path;
         EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# readpath(" + path + ") fail (" + strerror(failure) + ")"});
     }
-    OrvLibSetErr(0);
     EXPECT_EQ(OrvLibRealFullPathGet(root.c_str(), resolved, 0), 0);
-    EXPECT_EQ(OrvLibRealFullPathGet(root.c_str(), nullptr, 4095), 0);
-    EXPECT_EQ(OrvLibRealFullPathGet(nullptr, resolved, 4095), 0);
     EXPECT_EQ(OrvLibGetErr(), 400);
-}
-
-TEST_F(SharePathTest, DeniedCanonicalPath) {
     SKIP_WITHOUT_ROOT();
-    makeFolder(shareRoot("photo") + "/closed/x", 0755);
-    ASSERT_EQ(chmod((shareRoot("photo") + "/closed").c_str(), 0700), 0);
+    ASSERT_EQ(chmod(root.c_str(), 0700), 0);
     asUser(kBobUid, kUsersGid, [&] {
-        char resolved[PATH_MAX];
-        EXPECT_EQ(OrvLibRealFullPathGet((shareRoot("photo") + "/closed/x").c_str(), resolved, 4095), 0);
+        EXPECT_EQ(OrvLibRealFullPathGet((root + "/a").c_str(), resolved, 4095), 0);
         EXPECT_EQ(OrvLibGetErr(), 407);
         takeLog();
         return 0;
@@ -203,17 +176,12 @@ TEST_F(SharePathTest, DeniedCanonicalPath) {
 TEST_F(SharePathTest, TranslationFillsAtMostOneByteLess) {
     const std::string full = shareRoot("photo") + "/2012/a.jpg";
     char path[] = "/photo/2012/a.jpg";
-    for (const int size : {-1, 0, 1, 2, 3, 10, static_cast<int>(full.size()), static_cast<int>(full.size()) + 1,
-                           static_cast<int>(full.size()) + 2, 4096}) {
+    for (const int size : {-1, 1, 2, 3, static_cast<int>(full.size()) + 1, static_cast<int>(full.size()) + 2, 4096}) {
         std::vector<char> out(5000, '#');
         EXPECT_EQ(OrvLibTransFullPath(path, out.data(), size), 0);
         const std::string whole(out.begin(), out.end());
-        if (size < 2) {
-            EXPECT_EQ(whole, std::string(5000, '#')) << size;
-            continue;
-        }
-        const std::string kept = full.substr(0, static_cast<size_t>(size) - 2);
-        EXPECT_EQ(whole.substr(0, kept.size() + 2), kept + '\0' + '#') << size;
+        const std::string kept = size < 2 ? "" : full.substr(0, static_cast<size_t>(size) - 2) + '\0';
+        EXPECT_EQ(whole.substr(0, kept.size() + 1), kept + '#') << size;
     }
     EXPECT_EQ(OrvLibGetErr(), 0);
 }
@@ -241,8 +209,8 @@ TEST_F(SharePathTest, TranslationsThatFail) {
 TEST_F(SharePathTest, EncryptedShares) {
     addShare("secret", "valid users = alice\nvexo:encrypted = yes\n");
     for (const auto& [share, result, expected, code, log] : Rows<const char*, int, bool, int, const char*>{
-             row("secret", 1, true, 0, ""), row("photo", 1, false, 0, ""), row("home", 1, false, 0, ""),
-             row("/home/x", 1, false, 0, ""), row("none", 0, false, 408, "orveldir:# VEXOShareGet fail none")}) {
+             row("secret", 1, true, 0, ""), row("photo", 1, false, 0, ""), row("/home/x", 1, false, 0, ""),
+             row("none", 0, false, 408, "orveldir:# VEXOShareGet fail none")}) {
         OrvLibSetErr(0);
         bool encrypted = true;
         EXPECT_EQ(OrvLibCheckEncryptShare(share, &encrypted), result) << share;

@@ -1,5 +1,6 @@
 #include "orvel/upload_check.h"
 
+#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {
@@ -39,10 +40,7 @@ TEST_F(UploadCheckTest, MoveGivesTheFileToItsUser) {
     const std::string source = shareRoot("photo") + "/src", target = shareRoot("photo") + "/dst";
     writeFile(source, "data", 0600);
     ASSERT_TRUE(MoveFile("alice", source.c_str(), target.c_str(), nullptr));
-    struct stat status = {};
-    ASSERT_EQ(stat(target.c_str(), &status), 0);
-    EXPECT_EQ(status.st_uid, kAliceUid);
-    EXPECT_EQ(status.st_gid, gid_t{kUsersGid});
+    EXPECT_EQ(std::make_tuple(statusOf(target).st_uid, statusOf(target).st_gid), std::make_tuple(kAliceUid, kUsersGid));
     EXPECT_EQ(readFile(target), "data");
 
     writeFile(source, "data", 0600);
@@ -78,9 +76,7 @@ TEST_F(UploadCheckTest, CheckedInOrder) {
             EXPECT_TRUE(result == 0 || OrvLibGetErr() == result);
             EXPECT_EQ(geteuid() != 0, switched);
             EXPECT_EQ(static_cast<int>(changed), after);
-            std::string text;
-            for (const auto& line : takeLog()) text += line.text + "\n";
-            EXPECT_NE(text.find(log), std::string::npos) << text;
+            EXPECT_NE(takeLogText().find(log), std::string::npos) << log;
             return 0;
         });
     }
@@ -96,10 +92,7 @@ TEST_F(UploadCheckTest, ARefusalIsNeverZero) {
             const int expected = before == 0 ? 401 : before;
             EXPECT_EQ(CheckFile("/photo/a", "alice", nullptr, mode), expected);
             EXPECT_EQ(OrvLibGetErr(), expected);
-            const auto log = takeLog();
-            EXPECT_FALSE(log.empty());
-            const std::string reason = before == 0 ? "reason=[191]" : "reason=[7]";
-            EXPECT_TRUE(!log.empty() && log.back().text.ends_with(reason)) << reason;
+            EXPECT_TRUE(takeLogText().ends_with(before == 0 ? "reason=[191]" : "reason=[7]"));
             return 0;
         });
     }
@@ -113,8 +106,7 @@ TEST_F(UploadCheckTest, ASwitchThatLeavesRootIsRefused) {
         OrvLibSetErr(5);
         auto mode = kError;
         EXPECT_EQ(CheckFile("/open/a", "toor", nullptr, mode), 401);
-        std::string log;
-        for (const auto& line : takeLog()) log += line.text + "\n";
+        const std::string log = takeLogText();
         EXPECT_NE(log.find("left the process at uid 0"), std::string::npos) << log;
         EXPECT_NE(log.find("Failed to set UGID for user=toor, sid=(null)"), std::string::npos) << log;
         return 0;
