@@ -10,6 +10,9 @@ export class ApiError extends Error {
   }
 }
 
+// The code of what is not there.
+export const MISSING = 408;
+
 export const PROGRAMS = "/cgi-bin/";
 
 function encodeParams(params) {

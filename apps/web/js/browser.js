@@ -1,6 +1,6 @@
 // Where one is: the folder on screen, its listing, what is chosen in it.
 
-import { get } from "./api.js";
+import { get, MISSING } from "./api.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { emit } from "./events.js";
@@ -8,12 +8,13 @@ import { isSearch, normalisePlace, parentOf } from "./path.js";
 import { pref, setPref } from "./prefs.js";
 import { COLUMNS } from "./rows.js";
 import { Selection } from "./selection.js";
-import { folderListing, searchResults } from "./sources.js";
+import { entryAt, folderListing, searchResults } from "./sources.js";
 import { t } from "./strings.js";
 
 const FIRST_LOOK = 60;
 // Most folders are there within this; only slower ones show that something is going on.
 const PATIENCE = 150;
+const MOST_TO_FIND = 1000;
 
 export const browser = {
   id: "/", // of the folder, or "?" and the task of a search
@@ -93,7 +94,7 @@ export async function open(id) {
   if (!isSearch(id)) browser.lastFolder = id;
   // A folder has no column of folders.
   if (!isSearch(id) && browser.sort.by === COLUMNS.folder.sort) browser.sort = { by: "name", ascending: true };
-  const choice = toChoose ?? (parentOf(from) === id ? from : null);
+  const choice = toChoose ? { id: toChoose, far: true } : parentOf(from) === id ? { id: from } : null;
   toChoose = null;
   emit("place", id);
   if (id === "/") {
@@ -103,10 +104,21 @@ export async function open(id) {
     return;
   }
   await show(id, mine, choice);
-  if (mine === turn && browser.listing?.ready) announce(t("announce.opened", { count: browser.listing.total }));
+  if (mine !== turn) return;
+  if (browser.listing?.ready) announce(t("announce.opened", { count: browser.listing.total }));
+  else if (browser.listing?.error?.code === MISSING) openFile(id, mine);
 }
 
-async function show(id, mine, cameFrom) {
+// The path of a file leads to the file in its folder.
+async function openFile(id, mine) {
+  const entry = await entryAt(id).catch(() => undefined);
+  if (mine !== turn || !entry || entry.isFolder) return;
+  toChoose = id;
+  location.replace(`#${entry.parent}`);
+}
+
+// `wanted`: {id, far} of the entry to choose; `far` when it is worth looking for in all of the folder.
+async function show(id, mine, wanted) {
   const listing = isSearch(id) ? searchResults(id.slice(1), browser, changed) : folderListing(id, browser, changed);
   const saved = remembered.get(id);
   await Promise.race([listing.need(0, FIRST_LOOK), new Promise((resolve) => setTimeout(resolve, PATIENCE))]);
@@ -117,10 +129,11 @@ async function show(id, mine, cameFrom) {
   if (!listing.ready && !listing.error) await listing.need(0, FIRST_LOOK);
   if (mine !== turn || !listing.ready) return;
   if (saved) restore(saved);
-  if (cameFrom) {
-    const index = listing.find((entry) => entry.id === cameFrom);
-    if (index >= 0) choose(index);
-  }
+  if (!wanted) return;
+  const isWanted = (entry) => entry.id === wanted.id;
+  let index = listing.find(isWanted);
+  if (index < 0 && wanted.far) index = (await listing.entries([[0, listing.total - 1]])).findIndex(isWanted);
+  if (mine === turn && index >= 0) choose(index);
 }
 
 function restore({ top, cursor }) {
@@ -166,6 +179,7 @@ async function reopen() {
   browser.listing?.cancel();
   remembered.delete(browser.id);
   await show(browser.id, mine, null);
+  if (mine === turn && browser.listing.ready) announce(t("status.items", { count: browser.listing.total }));
 }
 
 // After something was changed: what is there stays until the new state has come; what was chosen stays chosen.
@@ -173,11 +187,15 @@ export async function refresh(chooseIds = null) {
   if (browser.id === "/") return loadShares();
   const { listing, selection, view } = browser;
   if (!listing) return undefined;
-  const chosen = chooseIds ?? idsOf(selection.ranges.list.length > 0 && selection.count <= 1000 ? selection : null);
+  const chosen = chooseIds ?? idsOf(selection);
   const cursorId = chooseIds ? chooseIds[0] : listing.item(selection.cursor)?.id;
+  const before = listing.total;
   await listing.refresh(...(view.inSight ?? [0, FIRST_LOOK]));
   if (listing !== browser.listing) return undefined;
-  const wanted = new Set(chosen);
+  // Too many to look for: all that a search finds stay all, others stay in a list that is as long as before.
+  if (!chosen && isSearch(browser.id) && selection.count === before) return selection.all(listing.total);
+  if (!chosen && listing.total === before) return undefined;
+  const wanted = new Set(chosen ?? []);
   const indexes = [];
   let cursor = null;
   for (let i = 0; i < listing.total && i < 20000 && (wanted.size > indexes.length || cursor === null); ++i) {
@@ -190,13 +208,14 @@ export async function refresh(chooseIds = null) {
   return undefined;
 }
 
+// Of what is chosen; null when that is much, or has never been looked at.
 function idsOf(selection) {
-  if (!selection) return [];
+  if (selection.count > MOST_TO_FIND) return null;
   const ids = [];
   for (const [first, last] of selection.ranges.list) {
     for (let i = first; i <= last; ++i) ids.push(browser.listing.item(i)?.id);
   }
-  return ids.filter(Boolean);
+  return ids.every(Boolean) ? ids : null;
 }
 
 export function selectedEntries() {

@@ -1,23 +1,21 @@
 // Names that are taken where something is about to go: found beforehand, asked about once.
 
-import { post } from "./api.js";
+import { MISSING, post } from "./api.js";
 import { dialog } from "./dialogs.js";
 import { h, nameNode } from "./dom.js";
-import { decode, encodeName } from "./path.js";
+import { decode, encodeName, patternOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
 
 const NAMES_PER_QUESTION = 100;
-const MISSING = 408;
 
 // Which of the names (encoded) the folder has already.
 export async function takenNames(folder, names) {
   const taken = new Set();
   for (let i = 0; i < names.length; i += NAMES_PER_QUESTION) {
-    // The program takes patterns; a character that means something in one stands for any here.
     const pattern = names
       .slice(i, i + NAMES_PER_QUESTION)
-      .map((name) => decode(name).replace(/[,\\*?[\]\uFFFD]/g, "?"))
+      .map(patternOf)
       .join(",");
     const reply = await post("list", { action: "folder", path_raw: folder, pattern }).catch((failure) => {
       if (failure.code === MISSING) return { items: [] }; // is yet to be made

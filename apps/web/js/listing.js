@@ -7,6 +7,7 @@ import { isAbort } from "./api.js";
 
 const PAGE = 200;
 const AHEAD = 60;
+const AT_ONCE = 100; // pages of one request
 
 export class Listing {
   constructor(parts, fetchPart, onChange) {
@@ -52,7 +53,7 @@ export class Listing {
     for (const { one, page } of this.pagesOf(Math.max(0, first - AHEAD), last + AHEAD))
       wanted.add(this.keyOf(one, page));
     for (const [key, request] of this.requests) {
-      if (!wanted.has(key)) request.abort();
+      if (!wanted.has(key)) request.stop.abort();
     }
     return Promise.all([...wanted].map((key) => this.load(key)));
   }
@@ -75,22 +76,29 @@ export class Listing {
     return `${this.parts.indexOf(one)}:${page}`;
   }
 
-  async load(key) {
+  // What is on its way is waited for, not asked for again.
+  load(key) {
     const [part, page] = key.split(":").map(Number);
     const one = this.parts[part];
-    if (one.pages.has(page) || this.requests.has(key)) return;
-    const request = new AbortController();
-    this.requests.set(key, request);
+    if (one.pages.has(page)) return undefined;
+    if (!this.requests.has(key)) {
+      const request = { stop: new AbortController() };
+      this.requests.set(key, request);
+      request.done = this.fetchPage(one, page, request.stop.signal).finally(() => {
+        if (this.requests.get(key) === request) this.requests.delete(key);
+      });
+    }
+    return this.requests.get(key).done;
+  }
+
+  async fetchPage(one, page, signal) {
     try {
-      const reply = await this.fetchPart(one.part, page * PAGE, PAGE, request.signal);
-      if (request.signal.aborted) return;
-      this.take(one, page, reply);
+      const reply = await this.fetchPart(one.part, page * PAGE, PAGE, signal);
+      if (!signal.aborted) this.take(one, page, reply);
     } catch (failure) {
-      if (isAbort(failure) || request.signal.aborted) return;
+      if (isAbort(failure) || signal.aborted) return;
       this.error = failure;
       this.onChange(this);
-    } finally {
-      if (this.requests.get(key) === request) this.requests.delete(key);
     }
   }
 
@@ -119,7 +127,7 @@ export class Listing {
   }
 
   cancel() {
-    for (const request of this.requests.values()) request.abort();
+    for (const { stop } of this.requests.values()) stop.abort();
     this.requests.clear();
   }
 
@@ -127,16 +135,25 @@ export class Listing {
   async entries(ranges) {
     const entries = [];
     for (const [from, to] of ranges) {
-      for (const { one, page } of this.pagesOf(from, to)) {
-        if (one.pages.has(page)) continue;
-        one.pages.set(page, (await this.fetchPart(one.part, page * PAGE, PAGE)).items);
-      }
+      await this.fill(from, to);
       for (let i = from; i <= to; ++i) {
         const entry = this.item(i);
         if (entry) entries.push(entry);
       }
     }
     return entries;
+  }
+
+  // A long request costs the server hardly more than a short one: pages that lie together come together.
+  async fill(from, to) {
+    const missing = this.pagesOf(from, to).filter(({ one, page }) => !one.pages.has(page));
+    while (missing.length > 0) {
+      const [{ one, page }] = missing;
+      const next = missing.findIndex((other, i) => i === AT_ONCE || other.one !== one || other.page !== page + i);
+      const count = missing.splice(0, next < 0 ? missing.length : next).length;
+      const { items } = await this.fetchPart(one.part, page * PAGE, count * PAGE);
+      for (let i = 0; i < count; ++i) one.pages.set(page + i, items.slice(i * PAGE, (i + 1) * PAGE));
+    }
   }
 
   // The index of the first loaded entry that `test` accepts, from `start` on and round; -1.

@@ -1,14 +1,15 @@
 // What is done to files at once: new folder, rename, download, properties.
 
-import { get, post, PROGRAMS, readReply } from "./api.js";
-import { browser, refresh } from "./browser.js";
+import { post, PROGRAMS, readReply } from "./api.js";
+import { browser, refresh, shareEntry } from "./browser.js";
 import { askText, dialog, toast, toastFailure } from "./dialogs.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
-import { entryOf, extensionOf } from "./entries.js";
+import { extensionOf } from "./entries.js";
 import { emit } from "./events.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
-import { childOf, decode, encodeName, isSearch, lastOf, nameOf, parentOf, splitExtension } from "./path.js";
+import { childOf, decode, encodeName, isSearch, nameOf, parentOf, splitExtension } from "./path.js";
+import { entryAt } from "./sources.js";
 import { t } from "./strings.js";
 import { whyNode } from "./why.js";
 
@@ -118,23 +119,11 @@ export async function copyText(text, said) {
   toast({ text: said });
 }
 
-async function entryAt(id) {
-  if (parentOf(id) === "/") return browser.shares.find((share) => share.id === id);
-  const name = lastOf(id);
-  const reply = await get("list", {
-    action: "folder",
-    path_raw: parentOf(id),
-    pattern: decode(name).replace(/[,\\*?[\]]/g, "?"),
-    additional: "size,time,owner,perm,mount_point_type",
-  });
-  return reply.items.map(entryOf).find((entry) => entry.encodedName === name);
-}
-
 // Of an entry, or of the folder with an id.
 export async function showProperties(what) {
   let entry = what;
   try {
-    if (typeof what === "string") entry = await entryAt(what);
+    if (typeof what === "string") entry = parentOf(what) === "/" ? shareEntry(what) : await entryAt(what);
   } catch (failure) {
     return toastFailure(failure, what);
   }

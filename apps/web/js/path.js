@@ -83,6 +83,11 @@ export function shareOf(id) {
   return ancestry(id)[0] ?? "/";
 }
 
+// A name (encoded) as a pattern: a character that means something in one stands for any.
+export function patternOf(name) {
+  return decode(name).replace(/[,\\*?[\]\uFFFD]/g, "?");
+}
+
 // Of a reply's object, whose readable text is in `key`.
 export function idIn(object, key = "path") {
   return object[key + "_raw"] ?? encodePath(object[key]);

@@ -1,11 +1,11 @@
 // Where the rows of a list come from: a folder, or a search.
 
-import { ApiError, get } from "./api.js";
+import { ApiError, get, MISSING } from "./api.js";
 import { entryOf } from "./entries.js";
 import { Listing } from "./listing.js";
+import { lastOf, parentOf, patternOf } from "./path.js";
 
 const ADDITIONAL = "size,time,owner,perm,mount_point_type";
-const GONE = 408;
 
 function orderOf({ by, ascending }) {
   return { sort_by: by, sort_direction: ascending ? "asc" : "desc" };
@@ -28,9 +28,15 @@ export function searchResults(taskid, { sort, filter, kind }, onChange) {
   const asked = { action: "list", taskid, filter: filter || undefined, additional: ADDITIONAL, ...orderOf(sort) };
   const fetchPart = async (filetype, offset, limit, signal) => {
     const reply = await get("search", { ...asked, filetype, offset, limit }, signal).catch((failure) => {
-      throw failure.code === GONE ? new ApiError({ key: "page:search_gone" }) : failure;
+      throw failure.code === MISSING ? new ApiError({ key: "page:search_gone" }) : failure;
     });
     return { ...reply, items: reply.items.map(entryOf) };
   };
   return new Listing([kind], fetchPart, onChange);
+}
+
+// One entry of a folder; nothing when there is none.
+export async function entryAt(id) {
+  const asked = { action: "folder", path_raw: parentOf(id), pattern: patternOf(lastOf(id)), additional: ADDITIONAL };
+  return (await get("list", asked)).items.map(entryOf).find((entry) => entry.id === id);
 }
