@@ -105,33 +105,6 @@ TEST_F(IndexFilesTest, ResultsAreSeenWhileTheSearchGoesOnAndAfterItDies) {
     EXPECT_EQ(select(db_).size(), 1000U);
 }
 
-// Kills writers of an index that is searched meanwhile at any moment, in the middle of a commit too.
-TEST_F(IndexFilesTest, KilledWritersLeaveAnIndexThatReads) {
-    build({{"x"}});
-    std::mt19937 random(11);
-    size_t before = 0;
-    for (int round = 0; round < 25; ++round) {
-        const pid_t child = fork();
-        if (child == 0) {
-            FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path_, sizeof path_);
-            for (int i = 0;; ++i) {
-                insert(path_, {.path = std::to_string(round) + "/" + std::to_string(random()) + "/n"});
-                if (i % 50 == 0) FILEIDXDBFlush(path_);
-            }
-        }
-        usleep(5000 + random() % 40000);
-        kill(child, SIGKILL);
-        waitpid(child, nullptr, 0);
-        const size_t now = searched(nullptr).size();
-        EXPECT_GE(now, before);
-        before = now;
-    }
-    EXPECT_GT(before, 1U);
-    Cond name = node(FI_COL_NAME, FI_OP_WILDCARD, "n");
-    EXPECT_EQ(searched(&name).size() + 1, before);
-    EXPECT_EQ(ask(store_ + "photo.db", "SELECT count(*)=(SELECT records FROM state) FROM record"), 1);
-}
-
 // A writer that dies half-way through a large commit: its journal is played back, by readers of a share's index too.
 TEST_F(IndexFilesTest, HalfACommitIsTakenBack) {
     std::vector<Record> records(3000, {.path = "", .size = 1});

@@ -26,13 +26,10 @@ TEST(CgiText, FormsAndCookies) {
 }
 
 TEST(CgiText, ParseToArray) {
-    const Rows<const char*, const char*, std::vector<std::string>> rows = {
-        {",a,,b", ",", {"", "a", "", "b"}}, {"", ",", {""}}, {"a::b:c", "::", {"a", "b:c"}}, {"a,b", "", {"a,b"}}};
-    for (const auto& [text, separator, pieces] : rows) {
-        Json::Value expected(Json::arrayValue);
-        for (const std::string& piece : pieces) expected.append(piece);
-        EXPECT_EQ(VEXO::WebAPIUtil::ParseToArray(text, separator), expected) << text;
-    }
+    Json::Value expected(Json::arrayValue);
+    for (const char* piece : {"", "a:b", "", "c"}) expected.append(piece);
+    EXPECT_EQ(VEXO::WebAPIUtil::ParseToArray("::a:b::::c", "::"), expected);
+    EXPECT_EQ(VEXO::WebAPIUtil::ParseToArray("a,b", "")[0], "a,b");
 }
 
 class WebRequest : public ApplianceTest {
