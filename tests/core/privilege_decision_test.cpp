@@ -46,12 +46,6 @@ TEST(PrivilegeDecision, RequestedPermissions) {
     EXPECT_TRUE(orvel::aclGrants(0, 32)) << "a bit that asks for nothing";
 }
 
-TEST(PrivilegeDecision, UserKinds) {
-    EXPECT_EQ(orvel::userKindOf("eve@corp\\x"), orvel::UserKind::kDomain);
-    EXPECT_EQ(orvel::userKindOf("@"), orvel::UserKind::kDirectory);
-    EXPECT_EQ(orvel::userKindOf(""), orvel::UserKind::kLocal);
-}
-
 TEST(PermissionText, LettersAndDigits) {
     for (const auto& [mode, text, digits] : Rows<unsigned, const char*, int>{
              row(0755U, "rwxr-xr-x", 755), row(0U, "---------", 0), row(0104640U, "rw-r-----", 640),

@@ -2,7 +2,6 @@
 
 #include <climits>
 
-#include "support/fault_sweep.h"
 #include "support/log_texts.h"
 #include "support/testing.h"
 
@@ -220,28 +219,6 @@ TEST_F(SharePathTest, EncryptedShares) {
     }
     EXPECT_EQ(OrvLibCheckEncryptShare("photo", nullptr), 0);
     EXPECT_EQ(OrvLibGetErr(), 400);
-}
-
-// Whatever fails, the result is either right or a failure with a code, and nothing is kept open.
-TEST_F(SharePathTest, ResolutionUnderEveryFault) {
-    const std::string home = shareRoot("homes") + "/alice";
-    makeFolder(home);
-    for (const char* path : {"/photo/x", "/home/x"}) {
-        const std::string expected = path[1] == 'p' ? shareRoot("photo") + "/x" : home + "/x";
-        const int faults = sweepFaults(VEXO_ERR_GENERAL, [&](int nth) {
-            OrvLibSetErr(0);
-            const Resolved out = resolve(path, "alice");
-            if (out.result == 1) {
-                EXPECT_EQ(out.real, expected);
-            } else {
-                EXPECT_NE(nth, 0);
-                EXPECT_EQ(out.real, "unset");
-                const int code = OrvLibGetErr();
-                EXPECT_TRUE(code == 401 || code == 403 || code == 408) << code;
-            }
-        });
-        EXPECT_GE(faults, 3) << path;
-    }
 }
 
 }  // namespace

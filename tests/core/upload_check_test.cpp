@@ -17,9 +17,10 @@ TEST(UploadErrors, Table) {
 }
 
 TEST_F(UploadCheckTest, CopyFailuresHaveCodesOfTheirOwn) {
-    const Rows<int, int> rows = {{0x0300, 407},  {0x0600, 408}, {0x0700, 408}, {0x0800, 414}, {0x2400, 415},
-                                 {0x2900, 416},  {0x8400, 411}, {0xA000, 414}, {0xA200, 414}, {0xA300, 1805},
-                                 {0xA400, 1804}, {0xA500, 419}, {0xC300, 412}, {0x8100, 401}, {0x1234, 401}};
+    const Rows<int, int> rows = {row(0x0300, 407), row(0x0600, 408),  row(0x0700, 408),  row(0x0800, 414),
+                                 row(0x2400, 415), row(0x2900, 416),  row(0x8400, 411),  row(0xA000, 414),
+                                 row(0xA200, 414), row(0xA300, 1805), row(0xA400, 1804), row(0xA500, 419),
+                                 row(0xC300, 412), row(0x8100, 401)};
     for (const auto& [platformError, code] : rows) {
         vexo::gate::fail("VEXOFileCopy", platformError);
         announceLog("Failed to copy /a to /b, reason=[");
@@ -42,6 +43,7 @@ TEST_F(UploadCheckTest, MoveGivesTheFileToItsUser) {
     ASSERT_TRUE(MoveFile("alice", source.c_str(), target.c_str(), nullptr));
     EXPECT_EQ(std::make_tuple(statusOf(target).st_uid, statusOf(target).st_gid), std::make_tuple(kAliceUid, kUsersGid));
     EXPECT_EQ(readFile(target), "data");
+    EXPECT_FALSE(fs::exists(source)) << "taken, not copied";
 
     writeFile(source, "data", 0600);
     announceLog("reason=[A400]");

@@ -180,6 +180,16 @@ TEST_F(DirectoryWalkerTest, AbortFlagCancels) {
     }
 }
 
+TEST_F(DirectoryWalkerTest, CancelledOnceIsCancelledForGood) {
+    makeTree();
+    int flag = 0;
+    before_.action = [&](const auto&, const auto& name) { return flag = name == "a" ? 1 : 0, true; };
+    after_.action = [&](const auto&, const auto&) { return flag = 0, true; };
+    EXPECT_TRUE(walk(Order::kWalk, ENUM_IGNORE_NO_ERR, root_, &flag));
+    EXPECT_EQ(lines_.back(), "-show/a");
+    EXPECT_LT(lines_.size(), expected(Order::kWalk).size() - 6) << "nothing below it";
+}
+
 TEST_F(DirectoryWalkerTest, LeavesTheProcessInTheLastFolderEntered) {
     writeFile(root_ + "/z", "x");
     makeFolder(root_ + "/a/deep");

@@ -58,9 +58,9 @@ TEST(EnumCompareTest, Order) {
 class RandomEntries {
  public:
     std::list<Info> make(size_t count, const std::string& beginning) {
-        static const char* const names[] = {"a",         "A",         "ab",       "aB",   "",
-                                            "b",         "\xC3\xA4",  "\xC3\x84", "\xFF", "\xFF\xFE",
-                                            "abcdefghi", "ABCDEFGHJ", "abcdefgh"};
+        static const char* const names[] = {"a",         "A",         "ab",       "aB",      "",
+                                            "b",         "\xC3\xA4",  "\xC3\x84", "\xFF",    "\xFF\xFE",
+                                            "abcdefghi", "ABCDEFGHJ", "abcdefgh", "\xE2\x82"};
         static const char* const types[] = {"", "JPG", "jpg", "PNG", "J", "\xC3\x84"};
         std::list<Info> entries;
         for (size_t i = 0; i < count; ++i) {

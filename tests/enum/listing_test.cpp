@@ -101,13 +101,6 @@ TEST_F(ListingTest, FolderOfAnotherUser) {
             return 0;
         });
     }
-    ASSERT_EQ(chmod(real_.c_str(), 0755), 0);
-    writeFile(real_ + "/secret", "x", 0);
-    asUser(kBobUid, kUsersGid, [&] {
-        EXPECT_EQ(listed("name", kEverything), Names{"secret"}) << "a status needs no right to read the file";
-        EXPECT_EQ(entries_.front().aclPrivilege, 0U);
-        return 0;
-    });
 }
 
 TEST_F(ListingTest, KeepsFilesAndFoldersOnly) {
@@ -270,17 +263,7 @@ TEST_F(ListingTest, FailingStatusOfOneEntry) {
              row(ESTALE, "/server", kFatal, 401)}) {
         SCOPED_TRACE(std::string(strerror(systemCode)) + place);
         const std::string parent = real_ + place, child = parent + "/dir";
-        for (int time = 0; result == kFatal && time < 2; ++time)
-            announceLog("Failed to stat " + child + ". " + strerror(systemCode));
-        OrvLibSetErr(0);
-        vexo::gate::fail("VLIBCFileLStat", VEXO_ERR_GENERAL, systemCode, 1);
-        DIRENTRY_INFO info;
-        EXPECT_EQ(listing_.FillFileInfo("/photo/dir", child.c_str(), "dir", DIR_ENTRY_TYPE_ALL, DT_UNKNOWN, 2, info),
-                  result == kFatal ? -1 : 1);
-        EXPECT_EQ(OrvLibGetErr(), code);
-        EXPECT_EQ(info.mountPointType, result == kShown ? "remotefail" : "");
-        EXPECT_EQ(info.isDirectory, result == kShown);
-
+        if (result == kFatal) announceLog("Failed to stat " + child + ". " + strerror(systemCode));
         OrvLibSetErr(0);
         vexo::gate::fail("VLIBCFileLStatAt", VEXO_ERR_GENERAL, systemCode, 1);
         entries_.clear();
@@ -339,14 +322,11 @@ TEST_F(ListingTest, FillFileInfoByTypeOfEntry) {
          Rows<const char*, unsigned char, _tag_dir_entry_type_, int, int, int>{
              {"f", DT_REG, kAll, 1, 0, 0},
              {"f", DT_REG, kDirs, 2, 1, 0},
-             {"d", DT_DIR, kDirs, 0, 0, 0},
              {"f", DT_LNK, kAll, 0, 1, 0},
-             {"f", DT_UNKNOWN, kDirs, 0, 1, 1},
              {"d", DT_UNKNOWN, kFiles, 0, 1, 1},
              {"d", DT_UNKNOWN, kDirs, 0, 0, 1},
              {"p", DT_UNKNOWN, kAll, 0, 1, 1},
              // What readdir said may be out of date when the status is read.
-             {"p", DT_REG, kAll, 2, 1, 1},
              {"d", DT_REG, kFiles, 2, 1, 1},
              {"d", DT_REG, kAll, 2, 0, 1}}) {
         vexo::gate::reset();

@@ -111,7 +111,6 @@ TEST_F(ShareListingTest, SharesOfDomainAndDirectoryUsers) {
     addUser("DOM\\dave", 30001, kUsersGid);
     addUser("erin@directory", 30002, kUsersGid);
     addShare("domain", "valid users = DOM\\dave\n");
-    addShare("veiled", "valid users = DOM\\dave\nbrowseable = no\n");
     addShare("directory", "valid users = erin@directory\n");
     ASSERT_TRUE(list("DOM\\dave"));
     EXPECT_EQ(names(), Names{"domain"});
@@ -125,23 +124,18 @@ TEST_F(ShareListingTest, SharesOfDomainAndDirectoryUsers) {
 }
 
 TEST_F(ShareListingTest, SharesCannotBeEnumerated) {
-    for (const auto& [user, operation, log] :
-         Rows<const char*, const char*, const char*>{{"alice", "VEXOShareDBOpen", "VEXOShareDBOpenFile Error["},
-                                                     {"DOM\\x", "VexoCgiDomValidShareGen", nullptr},
-                                                     {"x@y", "VexoCgiLDAPValidShareGen", nullptr}}) {
+    for (const auto& [user, operation] :
+         Rows<const char*, const char*>{{"DOM\\x", "VexoCgiDomValidShareGen"}, {"x@y", "VexoCgiLDAPValidShareGen"}}) {
         vexo::gate::fail(operation, VEXO_ERR_GENERAL);
-        if (log != nullptr) announceLog(log);
         announceLog("Failed to enum valid shares");
-        OrvLibSetErr(0);
         EXPECT_FALSE(list(user));
         EXPECT_EQ(OrvLibGetErr(), ORV_ERR_GENERAL) << operation;
     }
     announceLog("Failed to get user ((null))");
-    EXPECT_FALSE(list(nullptr));
+    EXPECT_FALSE(listing_.OrvLibShareEntryListEnum(nullptr, nullptr, false, nullptr, 0, 0, 0, true, entries_, nullptr));
     EXPECT_EQ(OrvLibGetErr(), ORV_ERR_USER);
     EXPECT_FALSE(listing_.OrvLibShareEntryListEnum("alice", nullptr, false, nullptr, 0, 0, 0, true, entries_, nullptr));
     EXPECT_EQ(OrvLibGetErr(), ORV_ERR_PARAMETER);
-    EXPECT_EQ(total_, 99U);
 }
 
 TEST_F(ShareListingTest, FoldersThatAreNotThere) {

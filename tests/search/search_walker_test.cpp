@@ -166,6 +166,11 @@ TEST_F(SearchWalkerTest, NobodySeesMoreThanAWalkWouldShow) {
                 EXPECT_EQ(geteuid() == 0, user == std::string("carol"));
             });
         }
+        inOwnProcess([&] {
+            EXPECT_EQ(OrvLibUGIDSet(nullptr, "bob"), 0);
+            EXPECT_FALSE(search("carol", {{"/photo"}, files}).contains("photo/closed/f.txt"))
+                << "an administrator's name opens nothing";
+        });
         for (const char* share : {"photo", "homes"}) EXPECT_GE(FILEIDXIndexDrop(share), 0);
     }
 }

@@ -21,7 +21,8 @@ TEST(LinkWindowTest, BothFormsOfAnEndDateAndBothEnds) {
              {kDay, kDay, kDay + 86400, false},
              {kDay, kDay + 86399, kDay + 86399, true},  // the day's last second means the same
              {kDay, kDay + 86399, kDay + 86400, false},
-             {0, 86399, kDay, true},  // the last second of the first day of all: 0 again
+             {kDay, kDay + 10, kDay + 86409, true},  // any multiple of 10 is a first second
+             {0, 86399, kDay, true},                 // the last second of the first day of all: 0 again
              {0, kMax - 7, kDay, true},
              {0, kMin, kDay, false},
              {0, -1, kDay, false},

@@ -151,7 +151,8 @@ TEST_F(SessionTest, PlantedFiles) {
         {"second name", [&](const std::string& at) { fs::create_hard_link(victim, at); }},
         {"pipe", [](const std::string& at) { mkfifo(at.c_str(), 0666); }},
         {"folder", [](const std::string& at) { fs::create_directory(at); }},
-        {"writable", [&](const std::string& at) { writeFile(at, good, 0666); }},
+        {"writable by the group", [&](const std::string& at) { writeFile(at, good, 0620); }},
+        {"writable by others", [&](const std::string& at) { writeFile(at, good, 0602); }},
         {"another's",
          [&](const std::string& at) {
              writeFile(at, good, 0600);
@@ -204,6 +205,7 @@ TEST_F(SessionTest, Adding) {
     EXPECT_EQ(records(), "10.0.0.5,alice," + first + "," + drawn + "," + drawn + ",1,0,L\n");
     EXPECT_STREQ(getenv("USERNAME"), "alice");
     uptime = 100000;  // the same second once more gives the same identifier: another one is drawn
+    fs::permissions(path(orvel::kRecordFile), fs::perms(0644));
     ASSERT_TRUE(orvel::addLoginRecord("alice", second, 7, nullptr));
     EXPECT_EQ(secondsSlept, 3U);
     EXPECT_NE(first, second);
