@@ -1,7 +1,7 @@
 // Questions and messages above the page.
 
 import { h, icon, iconButton } from "./dom.js";
-import { describe } from "./errors.js";
+import { describe, sentenceOf } from "./errors.js";
 import { t } from "./strings.js";
 
 // Shows a dialog; resolves with what `close(value)` was given, null when it was dismissed. `fill(close)` gives its
@@ -73,8 +73,7 @@ export function askText({ title, label, value = "", selectTo = null, action, che
             try {
               close((await submit(text)) ?? text);
             } catch (failure) {
-              const { title: said, hint } = describe(failure);
-              complain([said, hint].filter(Boolean).join(" "));
+              complain(sentenceOf(failure));
               button.disabled = false;
               input.focus();
             }

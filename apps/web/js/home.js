@@ -1,7 +1,7 @@
 // The first thing one sees: the shares.
 
 import { browser } from "./browser.js";
-import { h, icon, nameNode, plainName } from "./dom.js";
+import { h, icon, nameNode } from "./dom.js";
 import { isOffline, isReadOnlyShare } from "./entries.js";
 import { formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
@@ -12,7 +12,7 @@ export function homeNode() {
   return h(
     "section.home",
     { tabindex: -1, "aria-label": t("place.shares") },
-    h("h1", {}, browser.user ? t("home.hello", { user: plainName(browser.user) }) : t("place.shares")),
+    h("h1", {}, browser.user ? t("home.hello", { user: browser.user }) : t("place.shares")),
     h("p.lead", {}, t("home.lead", { count: browser.shares.length })),
     h(
       "ul.cards",

@@ -4,7 +4,7 @@ import { get, post } from "./api.js";
 import { addCommand } from "./commands.js";
 import { confirm, dialog, toast, toastFailure } from "./dialogs.js";
 import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
-import { describe } from "./errors.js";
+import { sentenceOf } from "./errors.js";
 import { formatDay } from "./format.js";
 import { iconOf } from "./icons.js";
 import { copyText } from "./operations.js";
@@ -47,9 +47,7 @@ async function makeLink(entry) {
                 }),
               );
             } catch (failure) {
-              const said = describe(failure);
-              complaint.textContent =
-                available && !expires ? t("link.window") : [said.title, said.hint].filter(Boolean).join(". ");
+              complaint.textContent = available && !expires ? t("link.window") : sentenceOf(failure);
             }
           },
         },

@@ -50,6 +50,7 @@ export function searchTask() {
 }
 
 export async function rename(entry) {
+  const unchanged = entry.name.replace(/[\r\n]/g, ""); // as a field shows it
   const [stem] = entry.isFolder ? [entry.name] : splitExtension(entry.name);
   const renamed = await askText({
     title: t("rename.title"),
@@ -57,9 +58,9 @@ export async function rename(entry) {
     value: entry.name,
     selectTo: stem.length,
     action: t("rename.action"),
-    check: (text) => (text === entry.name ? "" : checkName(text)),
+    check: (text) => (text === unchanged ? "" : checkName(text)),
     submit: async (name) => {
-      if (name === entry.name) return entry.id;
+      if (name === unchanged) return entry.id;
       await post("operation", {
         action: "rename",
         path_raw: entry.id,

@@ -1,6 +1,6 @@
 // The path as a row of folders, and as text to type over.
 
-import { h, icon, nameNode, set } from "./dom.js";
+import { h, icon, nameNode, plainName, set } from "./dom.js";
 import { browser, go } from "./browser.js";
 import { ancestry, decode, encodePath, isSearch, nameOf, normaliseId } from "./path.js";
 import { isRecycleBin } from "./entries.js";
@@ -35,7 +35,7 @@ function paint(id) {
           href: `#${one}`,
           "data-id": one,
           "aria-current": last ? "page" : null,
-          title: last ? null : decode(one),
+          title: last ? null : plainName(decode(one)),
         });
         if (i === 0 && !last) set(crumb, { "aria-label": labelOf(one) }).append(icon("kind-share"));
         else crumb.append(nameNode(labelOf(one)));
@@ -44,7 +44,7 @@ function paint(id) {
     ),
   );
   bar.querySelector("ol").scrollLeft = 1e6;
-  document.title = `${labelOf(id)} – Orvel`;
+  document.title = `${plainName(labelOf(id))} – Orvel`;
 }
 
 export function editPath() {

@@ -2,7 +2,7 @@
 
 import { urlOf } from "./api.js";
 import { browser } from "./browser.js";
-import { h, icon, iconButton, nameNode } from "./dom.js";
+import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { formatSize, formatTime } from "./format.js";
 import { canShowImage, iconOf } from "./icons.js";
@@ -98,7 +98,7 @@ function source(entry) {
 
 function imageOf(entry) {
   return new Promise((resolve) => {
-    const image = h("img", { alt: entry.name, draggable: "false" });
+    const image = h("img", { alt: plainName(entry.name), draggable: "false" });
     image.addEventListener("load", () => resolve(image));
     image.addEventListener("error", () => resolve(message(entry, t("preview.broken"))));
     image.src = source(entry);

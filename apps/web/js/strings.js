@@ -1,5 +1,6 @@
 // Texts of the page, by language. A key that a table lacks falls back to English, then to the key itself.
 
+import { plainName } from "./dom.js";
 import { pref, setPref } from "./prefs.js";
 
 export const LANGUAGES = { en: "English", de: "Deutsch" };
@@ -29,13 +30,13 @@ export function has(key) {
   return key in table || key in fallback;
 }
 
-// Fills {name} in the text. A table entry {"one": ..., "other": ...} is chosen by the parameter `count`.
+// Fills {name} in the text; characters that would hide or turn it show as marks. A table entry {"one": ..., "other": ...} is chosen by the parameter `count`.
 export function t(key, parameters = {}) {
   let text = table[key] ?? fallback[key] ?? key;
   if (typeof text === "object") text = text[new Intl.PluralRules(language).select(parameters.count)] ?? text.other;
   return text.replace(/\{(\w+)\}/g, (whole, name) => {
     const value = parameters[name];
     if (value === undefined) return whole;
-    return typeof value === "number" ? value.toLocaleString(locale) : value;
+    return typeof value === "number" ? value.toLocaleString(locale) : plainName(value);
   });
 }

@@ -29,7 +29,7 @@ function reasonNode(reason) {
   const lines = [
     line(
       reason.rule === "home" || reason.privilege > 0,
-      t(`why.rule.${reason.rule}`, { share: plainName(reason.share) }),
+      t(`why.rule.${reason.rule}`, { share: reason.share }),
     ),
   ];
   if (reason.rule !== "home")
