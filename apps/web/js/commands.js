@@ -1,7 +1,7 @@
 // Everything that can be done, once: for the toolbar, the menus, the keyboard and the list of shortcuts.
 
 import { browser, go, goTo, goUp, refresh, selectedEntries, setMode, shareEntry } from "./browser.js";
-import { isReadOnlyShare } from "./entries.js";
+import { isInBin, isReadOnlyShare } from "./entries.js";
 import { copyPath, download, newFolder, rename, showProperties } from "./operations.js";
 import { isSearch } from "./path.js";
 import { editPath } from "./pathbar.js";
@@ -40,7 +40,7 @@ export function context() {
     canChange: count > 0 && home !== undefined && !isReadOnlyShare(home),
     single: count === 1 ? first : undefined,
     canWrite: folder && share !== undefined && !isReadOnlyShare(share),
-    inBin: /^\/[^/]+\/%23recycle(\/|$)/.test(browser.id),
+    inBin: isInBin(browser.id),
   };
 }
 

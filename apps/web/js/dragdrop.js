@@ -1,12 +1,13 @@
 // Files from outside dropped on the page, and entries dragged to another folder.
 
-import { browser } from "./browser.js";
-import { crumbId } from "./pathbar.js";
+import { browser, shareEntry } from "./browser.js";
 import { context } from "./commands.js";
+import { toastFailure } from "./dialogs.js";
 import { $, h, icon, plainName } from "./dom.js";
+import { isInBin, isReadOnlyShare } from "./entries.js";
 import { iconOf } from "./icons.js";
 import { decode, parentOf } from "./path.js";
-import { labelOf } from "./pathbar.js";
+import { crumbId, labelOf } from "./pathbar.js";
 import { transfer } from "./transfer.js";
 import { treeId } from "./tree.js";
 import { t } from "./strings.js";
@@ -51,11 +52,16 @@ function overWithin(event) {
     target &&
     target.node &&
     !dragged.includes(target.id) &&
-    (event.ctrlKey || dragged.some((id) => parentOf(id) !== target.id));
+    (copies(event) || dragged.some((id) => parentOf(id) !== target.id));
   mark(fits ? target.node : null);
   if (!fits) return;
   event.preventDefault();
-  event.dataTransfer.dropEffect = event.ctrlKey ? "copy" : "move";
+  event.dataTransfer.dropEffect = copies(event) ? "copy" : "move";
+}
+
+// Nothing can be taken away from where one may only read.
+function copies(event) {
+  return event.ctrlKey || !context().canChange;
 }
 
 export function setupDragAndDrop() {
@@ -75,14 +81,20 @@ export function setupDragAndDrop() {
   addEventListener("drop", drop);
 }
 
-// The folder under the pointer: a row, a tree item, a part of the path, else the folder on screen.
+// The folder under the pointer that takes something: a row, a tree item, a part of the path, else the folder on screen.
 function folderUnder(node) {
+  const target = pointedAt(node);
+  const share = target && shareEntry(target.id);
+  return share && !isReadOnlyShare(share) && !isInBin(target.id) ? target : null;
+}
+
+function pointedAt(node) {
   const index = browser.view.indexOf(node);
   const entry = index >= 0 ? browser.listing?.item(index) : undefined;
   if (entry?.isFolder) return { id: entry.id, node: browser.view.rowAt(index) };
   const id = treeId(node) ?? crumbId(node) ?? node.closest?.(".card")?.dataset.id;
   if (id && id !== "/") return { id, node: node.closest(".tree-line, .crumb, .card") };
-  return context().canWrite ? { id: browser.id, node: null } : null;
+  return context().folder ? { id: browser.id, node: null } : null;
 }
 
 function over(event) {
@@ -120,7 +132,7 @@ function clear() {
 async function drop(event) {
   if (dragged && marked) {
     event.preventDefault();
-    transfer(event.ctrlKey ? "copy" : "move", dragged, folderUnder(event.target).id);
+    transfer(copies(event) ? "copy" : "move", dragged, folderUnder(event.target).id);
     return;
   }
   if (!holdsFiles(event.dataTransfer)) return;
@@ -128,5 +140,9 @@ async function drop(event) {
   const target = folderUnder(event.target);
   clear();
   if (!target) return;
-  startUpload(await fromDrop(event.dataTransfer)(), target.id);
+  try {
+    startUpload(await fromDrop(event.dataTransfer)(), target.id);
+  } catch (failure) {
+    toastFailure(failure); // such as a folder that the browser may not read
+  }
 }

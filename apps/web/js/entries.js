@@ -1,6 +1,6 @@
 // An entry of a listing as the page uses it: flat, with its id.
 
-import { encodeName, idIn, lastOf, parentOf, splitExtension } from "./path.js";
+import { encodeName, idIn, parentOf, splitExtension } from "./path.js";
 import { kindOf } from "./icons.js";
 import { t } from "./strings.js";
 
@@ -13,7 +13,7 @@ export function entryOf(item) {
     encodedName: item.name_raw ?? encodeName(item.name),
     parent: parentOf(id),
     isFolder: item.isdir,
-    kind: kindOf(item.name, item.isdir, id, more.mount_point_type ?? ""),
+    kind: kindOf(item, id, more.mount_point_type ?? ""),
     size: item.isdir ? null : (more.size ?? null),
     mtime: more.time?.mtime ?? 0,
     time: more.time,
@@ -49,7 +49,11 @@ export function shownName(entry) {
   return entry.kind === "recycle" ? t("place.recycle") : entry.name;
 }
 
+// The recycle bin itself, or below it.
+export function isInBin(id) {
+  return id.split("/")[2] === "%23recycle";
+}
+
 export function isRecycleBin(id) {
-  const parts = id.split("/");
-  return parts.length === 3 && lastOf(id) === "%23recycle";
+  return isInBin(id) && id.split("/").length === 3;
 }

@@ -4,9 +4,10 @@ import { browser, selectedEntries } from "./browser.js";
 import { addCommand } from "./commands.js";
 import { askConflict, takenNames } from "./conflicts.js";
 import { askText, confirm, dismissToasts, toast, toastFailure } from "./dialogs.js";
+import { isInBin, isRecycleBin } from "./entries.js";
 import { emit } from "./events.js";
 import { checkName } from "./operations.js";
-import { childOf, encodeName, isSearch, isWithin, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
+import { childOf, encodeName, isWithin, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
 import { pickFolder } from "./picker.js";
 import { get } from "./api.js";
 import { startTask } from "./tasks.js";
@@ -82,7 +83,7 @@ async function hasBin(share) {
 async function remove(forGood) {
   const entries = await selectedEntries();
   const ids = entries.map((entry) => entry.id);
-  const inBin = ids.every((id) => id.split("/")[2] === "%23recycle");
+  const inBin = ids.every(isInBin);
   const kept = !forGood && !inBin && (await Promise.all([...new Set(ids.map(shareOf))].map(hasBin))).every(Boolean);
   const what = { count: ids.length, name: entries.length === 1 ? entries[0].name : "" };
   if (
@@ -198,7 +199,6 @@ addCommand({
   icon: "trash",
   group: "change",
   danger: true,
-  when: ({ folder, canWrite }) =>
-    folder && canWrite && !isSearch(browser.id) && /^\/[^/]+\/%23recycle$/.test(browser.id),
+  when: ({ folder, canWrite }) => folder && canWrite && isRecycleBin(browser.id),
   run: emptyBin,
 });
