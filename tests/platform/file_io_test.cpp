@@ -1,4 +1,4 @@
-// What the platform's files rely on: whole replacement, limits, and knowing a version again.
+// What the platform's files rely on: limits, the identity behind, and knowing a version again.
 #include "file_io.h"
 
 #include "raise.h"
@@ -14,19 +14,6 @@ class FileIo : public ApplianceTest {
         writeFile(path("a"), "0123456789", 0600);
     }
 };
-
-TEST_F(FileIo, ReplaceIsWholeOrNothing) {
-    writeFile(path("elsewhere"), "untouched");
-    fs::create_symlink("elsewhere", path("link"));
-    EXPECT_TRUE(vexo::replaceFile(path("link"), "new", 0640));
-    EXPECT_EQ(readFile(path("link")), "new");
-    EXPECT_EQ(statusOf(path("link")).st_mode, mode_t{S_IFREG | 0640});
-    EXPECT_EQ(readFile(path("elsewhere")), "untouched");
-    makeFolder(path("folder"));
-    EXPECT_FALSE(vexo::replaceFile(path("folder"), "new", 0600));
-    EXPECT_EQ(errno, EISDIR);
-    EXPECT_EQ(std::distance(fs::directory_iterator(path("")), {}), 4) << "no temporary stays behind";
-}
 
 TEST_F(FileIo, ReadStopsAtTheLimitAndAtAnythingButAFile) {
     ASSERT_EQ(mkfifo(path("pipe").c_str(), 0600), 0);

@@ -1,4 +1,4 @@
-// Languages, tables of texts, request records, salts.
+// Languages, tables of texts, salts.
 #include "vexo/language.h"
 
 #include <set>
@@ -6,7 +6,6 @@
 #include "language_choice.h"
 #include "support/testing.h"
 #include "vexo/user.h"
-#include "vexo/web_record.h"
 
 namespace {
 
@@ -46,13 +45,7 @@ TEST_F(LanguageTest, TablesOfTexts) {
     }
 }
 
-TEST_F(LanguageTest, RequestRecordsAndSalts) {
-    setenv("HTTP_COOKIE", "a=1; id=abc=d ;id=2;; x", 1);
-    _tag_VexoCgi request;
-    EXPECT_EQ(VexoCgiInit(&request), 0);
-    unsetenv("HTTP_COOKIE");
-    EXPECT_STREQ(VexoCgiGetInCookies(&request, "id"), "abc=d");
-    EXPECT_EQ(VexoCgiGetInCookies(&request, "x"), nullptr);
+TEST(Salts, AreOfTheAlphabet) {
     std::set<char> salts;
     for (long number = -100; number < 100; ++number) salts.insert(VEXOUserRandomNumMap2Seed(number));
     EXPECT_EQ(salts.size(), 63U);

@@ -5,6 +5,7 @@
 
 #include "cgi_text.h"
 #include "support/testing.h"
+#include "vexo/web_record.h"
 
 namespace {
 
@@ -30,6 +31,15 @@ TEST(CgiText, ParseToArray) {
     for (const char* piece : {"", "a:b", "", "c"}) expected.append(piece);
     EXPECT_EQ(VEXO::WebAPIUtil::ParseToArray("::a:b::::c", "::"), expected);
     EXPECT_EQ(VEXO::WebAPIUtil::ParseToArray("a,b", "")[0], "a,b");
+}
+
+TEST(RequestRecord, HoldsTheCookies) {
+    setenv("HTTP_COOKIE", "a=1; id=abc=d ;id=2;; x", 1);
+    _tag_VexoCgi request;
+    EXPECT_EQ(VexoCgiInit(&request), 0);
+    unsetenv("HTTP_COOKIE");
+    EXPECT_STREQ(VexoCgiGetInCookies(&request, "id"), "abc=d");
+    EXPECT_EQ(VexoCgiGetInCookies(&request, "x"), nullptr);
 }
 
 class WebRequest : public ApplianceTest {
