@@ -154,8 +154,8 @@ TEST_F(SearchUpdateTest, BadPathsAndFailingDatabases) {
                     vexo::gate::fail(call, VEXO_ERR_NO_SPACE, ENOSPC, nth);
                     EXPECT_FALSE(operation.call(good));
                     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_NO_SPACE);
-                    EXPECT_EQ(takeLogTexts(), std::vector<std::string>{std::string("orvelsearch:# Fail to ") + text +
-                                                                       " DB " + screen_->getDBTaskFilePath()});
+                    EXPECT_EQ(takeLogText(),
+                              std::string("orvelsearch:# Fail to ") + text + " DB " + screen_->getDBTaskFilePath());
                 }
             }
         }
