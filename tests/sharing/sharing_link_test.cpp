@@ -159,7 +159,9 @@ TEST_F(SharingLinkTest, RefusedLogins) {
         params.allowedKinds = kinds;
         return manager.login(&cgi, session, sizeof session, &params, "L");
     };
-    for (const auto& [user, kinds] : {std::pair{"alice", 13}, {"carol", 14}, {"DOM\\dora", 11}, {"dan@ldap", 7}}) {
+    addUser("DOM\\adam", 30001, kAdminGid);  // an administrator: needs both kinds
+    for (const auto& [user, kinds] :
+         {std::pair{"alice", 13}, {"carol", 14}, {"DOM\\dora", 11}, {"dan@ldap", 7}, {"DOM\\adam", 4}}) {
         EXPECT_EQ(login(user, kinds, "LOGIN_ERR_INVALID"), -3) << user;
     }
     for (const auto& [user, kinds] : {std::pair{"alice", 2}, {"carol", 1}, {"DOM\\dora", 4}, {"dan@ldap", 8}}) {

@@ -24,7 +24,9 @@ TEST_F(SharingSettingsTest, ChoicesOfUsers) {
     const std::string foreign = "# by hand\r\n20003=\"yes\"\nno setting";
     EXPECT_FALSE(manager.hasPrivilege("alice")) << "without a file";
     EXPECT_TRUE(manager.getPrivileges().empty());
+    const mode_t usual = umask(077);
     EXPECT_TRUE(manager.setPrivileges({{"alice", "true"}}));
+    umask(usual);
     EXPECT_EQ(fs::status(file()).permissions(), fs::perms(0644));
     EXPECT_EQ(readFile(file()), "20001=\"true\"\n");
 
