@@ -1,6 +1,7 @@
 #include <json/value.h>
 
 #include "listing.h"
+#include "orvel/file_icon.h"
 #include "orvel/file_info.h"
 #include "text.h"
 
@@ -20,8 +21,19 @@ DIRENTRY_INFO readableEntry(const DIRENTRY_INFO& entry) {
     return shown;
 }
 
+// The member "icon" at the end of the object that was appended last.
+void appendIcon(const DIRENTRY_INFO& entry, std::string& out) {
+    std::string icon;
+    GetImgFileExt(entry.name.c_str(), entry.isDirectory, icon, entry.realPath,
+                  entry.path.substr(0, entry.path.rfind('/')));
+    out.pop_back();
+    out += ",\"icon\":";
+    appendJson(readable(icon), out);
+    out += '}';
+}
+
 void dump(const DIRENTRY_INFO& entry, int additional, Json::Value& item) {
-    DumpFileInfo(additional, readableEntry(entry), item);
+    DumpFileInfo(additional & ~kAdditionalIcon, readableEntry(entry), item);
     if (isUtf8(entry.name) && isUtf8(entry.path)) return;
     item["name_raw"] = percentEncode(entry.name);
     item["path_raw"] = percentEncode(entry.path);
@@ -30,13 +42,15 @@ void dump(const DIRENTRY_INFO& entry, int additional, Json::Value& item) {
 }  // namespace
 
 void appendEntry(const DIRENTRY_INFO& entry, int additional, std::string& out) {
+    const size_t before = out.size();
     if (isClean(entry)) {
-        AppendFileInfoText(additional, entry, out);
-        return;
+        AppendFileInfoText(additional & ~kAdditionalIcon, entry, out);
+    } else {
+        Json::Value item(Json::objectValue);
+        dump(entry, additional, item);
+        appendJson(item, out);
     }
-    Json::Value item(Json::objectValue);
-    dump(entry, additional, item);
-    appendJson(item, out);
+    if ((additional & kAdditionalIcon) != 0 && out.size() > before) appendIcon(entry, out);
 }
 
 void appendShare(const DIRENTRY_INFO& entry, int additional, std::string& out) {

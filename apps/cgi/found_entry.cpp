@@ -66,6 +66,7 @@ BOOL take(__tag_FI_FILE_INFO_DATA* record, void* arg) {
 }  // namespace
 
 int readResults(const ListRequest& request, FileSearch::OrvSearchDBTask& results, Listing& listing) {
+    const ReturnToFolder back;
     Page page = {homeOf(request.user), request.additional, listing};
     const char* sortBy = request.sortBy.empty() ? "name" : request.sortBy.c_str();
     unsigned long long total = 0;

@@ -1,5 +1,8 @@
 #include "listing.h"
 
+#include <fcntl.h>
+#include <unistd.h>
+
 #include <algorithm>
 
 #include "confined.h"
@@ -26,7 +29,8 @@ constexpr AdditionalWord kWords[] = {{"real_path", ADDITIONAL_REAL_PATH},
                                      {"type", ADDITIONAL_TYPE},
                                      {"mount_point_type", ADDITIONAL_MOUNT_POINT_TYPE},
                                      {"volume_status", ADDITIONAL_VOLUME_STATUS},
-                                     {"sync_share", ADDITIONAL_SYNC_SHARE}};
+                                     {"sync_share", ADDITIONAL_SYNC_SHARE},
+                                     {"icon", kAdditionalIcon}};
 
 int bitOf(std::string_view word) {
     for (const AdditionalWord& known : kWords) {
@@ -51,7 +55,14 @@ int additionalBits(std::string_view words) {
     return bits;
 }
 
+ReturnToFolder::ReturnToFolder() : start_(open(".", O_PATH | O_DIRECTORY | O_CLOEXEC)) {}
+
+ReturnToFolder::~ReturnToFolder() {
+    [[maybe_unused]] const int ignored = start_ ? fchdir(start_.get()) : 0;
+}
+
 int listFolder(const ListRequest& request, Listing& listing) {
+    const ReturnToFolder back;
     PathInfo info;
     // The top level is the share listing's; the answer is that of the folder listing, which resolution would pre-empt.
     if (request.path == "/") return ORV_ERR_DENIED;
@@ -73,10 +84,12 @@ int listFolder(const ListRequest& request, Listing& listing) {
         if (code != ORV_ERR_NONE) return code;
     }
     OrvEnum enumeration;
+    const bool withIcon = (request.additional & kAdditionalIcon) != 0;  // that of a folder is found by its real path
+    const int additional = (request.additional & ~kAdditionalIcon) | (withIcon ? ADDITIONAL_REAL_PATH : 0);
     const bool listed = enumeration.OrvLibDirEntryListEnum(
-        info.path.c_str(), realPath.c_str(), request.sortBy.empty() ? "name" : request.sortBy.c_str(),
-        request.additional, request.offset, request.limit, request.ascending, request.type, criteria.list(),
-        listing.entries, &listing.total);
+        info.path.c_str(), realPath.c_str(), request.sortBy.empty() ? "name" : request.sortBy.c_str(), additional,
+        request.offset, request.limit, request.ascending, request.type, criteria.list(), listing.entries,
+        &listing.total);
     return listed ? ORV_ERR_NONE : lastCode();
 }
 
@@ -85,7 +98,8 @@ int listShares(const ListRequest& request, Listing& listing) {
     OrvEnum enumeration;
     const bool listed = enumeration.OrvLibShareEntryListEnum(
         request.user.c_str(), sidOf(request), false, request.sortBy.empty() ? nullptr : request.sortBy.c_str(),
-        request.additional, request.offset, request.limit, request.ascending, listing.entries, &listing.total);
+        request.additional & ~kAdditionalIcon, request.offset, request.limit, request.ascending, listing.entries,
+        &listing.total);
     return listed ? ORV_ERR_NONE : lastCode();
 }
 

@@ -6,10 +6,14 @@
 #include <string>
 #include <string_view>
 
+#include "descriptor.h"
 #include "orvel/dir_entry.h"
 #include "output.h"
 
 namespace orvel::cgi {
+
+// Beside the library's ADDITIONAL_... bits: the icon that the library chooses.
+inline constexpr int kAdditionalIcon = 1 << 30;
 
 struct ListRequest {
     std::string user;
@@ -19,7 +23,7 @@ struct ListRequest {
     bool ascending = true;
     unsigned long offset = 0;
     unsigned long limit = 0;  // 0: everything
-    int additional = 0;       // ADDITIONAL_... bits
+    int additional = 0;       // ADDITIONAL_... bits and kAdditionalIcon
     std::string pattern;      // comma-separated name patterns, "" for every name
     _tag_dir_entry_type_ type = DIR_ENTRY_TYPE_ALL;
 };
@@ -29,8 +33,21 @@ struct Listing {
     unsigned long total = 0;           // before the page was cut
 };
 
-// Words of a comma-separated list ("size,time") as ADDITIONAL_... bits; unknown words ask for nothing.
+// Words of a comma-separated list ("size,icon") as bits of `additional`; unknown words ask for nothing.
 int additionalBits(std::string_view words);
+
+// The working directory of its beginning is that of its end: listing leads elsewhere, and icons are looked for from
+// where the web server started the program.
+class ReturnToFolder {
+ public:
+    ReturnToFolder();
+    ~ReturnToFolder();
+    ReturnToFolder(const ReturnToFolder&) = delete;
+    ReturnToFolder& operator=(const ReturnToFolder&) = delete;
+
+ private:
+    Descriptor start_;
+};
 
 // List a folder, or the home folder and the shares of the user. The process has the user's identity. 0 or a library
 // code; what a failure leaves in `listing` is to be thrown away.
@@ -38,7 +55,8 @@ int listFolder(const ListRequest& request, Listing& listing);
 int listShares(const ListRequest& request, Listing& listing);
 
 // Appends the object of one entry, always valid UTF-8: a name or path that is none is shown readable, with "name_raw"
-// and "path_raw", its bytes percent-encoded, beside it. Entries of the share listing also tell the user's right
+// and "path_raw", its bytes percent-encoded, beside it. The "icon" of an entry is looked for from the working directory
+// (see GetImgFileExt). Entries of the share listing also tell the user's right
 // ("perm": "share_right", "ftp_privilege", "acl_enabled") and "sync_share".
 void appendEntry(const DIRENTRY_INFO& entry, int additional, std::string& out);
 void appendShare(const DIRENTRY_INFO& entry, int additional, std::string& out);

@@ -145,6 +145,24 @@ TEST_F(ListCgi, APageIsSortedCountedAndFiltered) {
     EXPECT_EQ(item["size"], 7.0);
 }
 
+TEST_F(ListCgi, IconsAreThoseThatThePageHas) {
+    const std::string root = shareRoot("photo");
+    makeFolder(root + "/#recycle");
+    makeFolder(root + "/deep/#recycle");
+    for (const char* name : {"Report.PDF", "plain", "x.unheard-of", "\xFF.jpg"}) writeFile(root + "/" + name, "");
+    const auto icons = [](const std::string& path) {
+        std::string all;
+        const CgiReply reply = folder("alice", path, "&additional=icon");
+        for (const Json::Value& item : reply.json["data"]["items"]) {
+            all += item["icon"].asString() + " ";
+            EXPECT_FALSE(item.isMember("additional"));
+        }
+        return all;
+    };
+    EXPECT_EQ(icons("/photo"), "recycle_bin.png folder.png misc.png pdf.png misc.png jpg.png ");
+    EXPECT_EQ(icons("/photo/deep"), "folder.png ");
+}
+
 TEST_F(ListCgi, NamesOfAnyBytesTravelAndComeBack) {
     const std::string root = shareRoot("photo");
     makeFolder(root + "/\xE9t\xE9", 0777);

@@ -10,6 +10,7 @@
 
 #include <cerrno>
 #include <cstdlib>
+#include <filesystem>
 #include <memory>
 #include <sstream>
 
@@ -93,7 +94,11 @@ std::string runCgi(const std::string& program, const std::string& user, const st
                            {"QUERY_STRING", query}};
     if (method != "GET" && method != "HEAD") variables["CONTENT_LENGTH"] = std::to_string(input.size());
     for (const auto& [name, value] : more) variables[name] = value;
+    // A web server starts a program in its folder.
+    const std::string before = std::filesystem::current_path();
+    std::filesystem::current_path(std::filesystem::path(program).parent_path());
     const Finished finished = runProgram({program}, variables, input);
+    std::filesystem::current_path(before);
     EXPECT_EQ(finished.status, 0) << query;
     return finished.output;
 }

@@ -1,7 +1,8 @@
 // Looking around: shares, folders, long lists, the keyboard, hostile names, refusals.
 import assert from "node:assert/strict";
-import { mkdirSync, readdirSync, readFileSync, writeFileSync } from "node:fs";
+import { mkdirSync, readdirSync, readFileSync, readlinkSync, writeFileSync } from "node:fs";
 import { after, before, test } from "node:test";
+import { KINDS, PICTURES } from "../../apps/web/js/icons.js";
 import { launch, row, rowsReady, screenshot, withPage } from "./browser.mjs";
 
 const LARGE = 100_000;
@@ -201,6 +202,7 @@ test("what one may not open says so, and why", () =>
       return target.classList.contains("drop");
     });
     assert.ok(!taken);
+    assert.match(await row(page, "2012").getAttribute("aria-label"), /^2012, Folder, /); // no word of its buttons
   }));
 
 test("dark, German, on a phone", async () => {
@@ -388,4 +390,15 @@ test("every message key has its words, in both languages", async () => {
       .map(async (file) => (await import(`../../apps/web/strings/${file}`, { with: { type: "json" } })).default),
   );
   assert.deepEqual(Object.keys(de).sort(), Object.keys(en).sort());
+});
+
+test("each kind of file has the icons that the programs look for", () => {
+  const images = new URL("../../apps/web/images/", import.meta.url);
+  const drawn = readdirSync(new URL("files_ext", images)).map((icon) => [icon, readlinkSync(new URL(`files_ext/${icon}`, images))]);
+  const wanted = Object.entries(KINDS).flatMap(([kind, extensions]) =>
+    extensions.split(" ").map((extension) => [`${extension}.png`, `../kinds/${kind}.png`]),
+  );
+  assert.deepEqual(drawn.sort(), wanted.sort());
+  for (const [icon, kind] of Object.entries(PICTURES))
+    assert.equal(readlinkSync(new URL(icon, images)), `kinds/${kind}.png`);
 });

@@ -36,7 +36,7 @@
 namespace orvel::cgi {
 namespace {
 
-constexpr int kShown = ADDITIONAL_SIZE | ADDITIONAL_TIME | ADDITIONAL_TYPE;
+constexpr int kShown = ADDITIONAL_SIZE | ADDITIONAL_TIME | ADDITIONAL_TYPE | kAdditionalIcon;
 
 // In front of what the library writes: nothing that the page names may come from elsewhere, nobody learns its address.
 constexpr const char* kPageHeaders =

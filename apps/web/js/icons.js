@@ -1,11 +1,12 @@
-// Which icon an entry has: names of symbols in icons.svg.
+// Which picture an entry has: names of symbols in icons.svg.
 
 import { splitExtension } from "./path.js";
 
-const KINDS = {
+// Which kind of file has which extensions; each of these has an icon in images/files_ext, too.
+export const KINDS = {
   image: "jpg jpeg png gif bmp webp heic heif tif tiff svg ico avif psd ai eps",
   raw: "raw cr2 cr3 nef arw dng orf rw2 raf",
-  video: "mp4 mkv avi mov wmv webm m4v mpg mpeg ts flv 3gp vob",
+  video: "mp4 mkv avi mov wmv webm m4v mpg mpeg flv 3gp vob",
   audio: "mp3 flac wav ogg oga opus m4a aac wma aiff alac mid",
   pdf: "pdf",
   document: "doc docx odt rtf pages tex epub",
@@ -24,22 +25,31 @@ const BY_EXTENSION = new Map(
 );
 const PREVIEW_IMAGES = new Set(["jpg", "jpeg", "png", "gif", "bmp", "webp", "ico", "avif", "svg"]);
 
-export function kindOf(name, isFolder, id, mount) {
-  if (!isFolder)
-    return (
-      BY_EXTENSION.get(
-        splitExtension(name)[1]
-          .replace(/^\.tar/i, "")
-          .slice(1)
-          .toLowerCase(),
-      ) ?? "misc"
-    );
+// Icons of what has no extension.
+export const PICTURES = {
+  "misc.png": "misc",
+  "folder.png": "folder",
+  "isomountpoint.png": "folder-iso",
+  "remotemountpoint.png": "folder-remote",
+  "recycle_bin.png": "recycle",
+};
+
+// `icon`: the one that the server chose.
+export function kindOf(item, id, mount) {
+  if (mount === "remotefail") return "folder-offline";
+  const picture = Object.hasOwn(PICTURES, item.icon ?? "") ? PICTURES[item.icon] : undefined;
+  if (!item.isdir) return picture ?? BY_EXTENSION.get(item.icon?.replace(/\.png$/, "")) ?? "misc";
+  return picture !== undefined && picture !== "folder" ? picture : folderKindOf(id, mount);
+}
+
+// The kind of a folder of which only the place is known.
+export function folderKindOf(id, mount) {
   if (mount === "remotefail") return "folder-offline";
   if (mount === "remote") return "folder-remote";
   if (mount === "iso") return "folder-iso";
   const parts = id.split("/");
   if (parts.length === 2) return parts[1] === "home" ? "home" : "share";
-  return parts.length === 3 && name === "#recycle" ? "recycle" : "folder";
+  return parts.length === 3 && parts[2] === "%23recycle" ? "recycle" : "folder";
 }
 
 export function iconOf(entry) {

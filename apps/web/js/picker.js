@@ -6,7 +6,7 @@ import { dialog } from "./dialogs.js";
 import { h, icon, iconButton, nameNode } from "./dom.js";
 import { describe } from "./errors.js";
 import { isReadOnlyShare } from "./entries.js";
-import { kindOf } from "./icons.js";
+import { folderKindOf } from "./icons.js";
 import { makeFolder } from "./operations.js";
 import { idIn, parentOf, shareOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
@@ -73,6 +73,6 @@ async function foldersOf(id) {
   if (id === "/") return browser.shares;
   const { items } = await get("operation", { action: "subfolders", path_raw: id });
   return items
-    .map((folder) => ({ id: idIn(folder), kind: kindOf(folder.name, true, idIn(folder), folder.mount_type ?? "") }))
+    .map((folder) => ({ id: idIn(folder), kind: folderKindOf(idIn(folder), folder.mount_type ?? "") }))
     .filter(({ kind }) => kind !== "recycle");
 }

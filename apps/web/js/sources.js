@@ -5,7 +5,7 @@ import { entryOf } from "./entries.js";
 import { Listing } from "./listing.js";
 import { lastOf, parentOf, patternOf } from "./path.js";
 
-const ADDITIONAL = "size,time,owner,perm,mount_point_type";
+const ADDITIONAL = "size,time,owner,perm,mount_point_type,icon";
 
 function orderOf({ by, ascending }) {
   return { sort_by: by, sort_direction: ascending ? "asc" : "desc" };

@@ -5,7 +5,7 @@ import { browser, go } from "./browser.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
 import { isOffline, isReadOnlyShare } from "./entries.js";
 import { on } from "./events.js";
-import { kindOf } from "./icons.js";
+import { folderKindOf } from "./icons.js";
 import { ancestry, idIn, parentOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
@@ -88,7 +88,7 @@ async function load(id, node) {
       const child = idIn(folder);
       return (
         kept.get(child) ??
-        makeItem(child, labelOf(child), kindOf(folder.name, true, child, folder.mount_type ?? ""), level)
+        makeItem(child, labelOf(child), folderKindOf(child, folder.mount_type ?? ""), level)
       );
     }),
     ...(items.length > MOST ? [moreItem(id, items.length - MOST, level)] : []),

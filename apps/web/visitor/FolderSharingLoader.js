@@ -85,21 +85,12 @@
     return new Date(time.mtime * 1000).toLocaleDateString(g_Lang, { day: "numeric", month: "short", year: "numeric" });
   }
 
-  const shapes = {
-    folder: "M3 7a2 2 0 0 1 2-2h4.2l2 2.2H19a2 2 0 0 1 2 2V17a2 2 0 0 1-2 2H5a2 2 0 0 1-2-2z",
-    file: "M6 3.5h7.5L18.5 8.5V20a.5.5 0 0 1-.5.5H6a.5.5 0 0 1-.5-.5V4a.5.5 0 0 1 .5-.5zM13.5 3.5V8.5H18.5"
-  };
+  // Pictures of extensions stand apart from those of what has none.
+  const general = ["misc.png", "folder.png", "recycle_bin.png", "isomountpoint.png", "remotemountpoint.png"];
 
-  function picture(kind) {
-    const space = "http://www.w3.org/2000/svg";
-    const drawing = document.createElementNS(space, "svg");
-    for (const [name, value] of Object.entries({ viewBox: "0 0 24 24", class: "picture " + kind, "aria-hidden": "true" })) {
-      drawing.setAttribute(name, value);
-    }
-    const shape = document.createElementNS(space, "path");
-    shape.setAttribute("d", shapes[kind]);
-    drawing.append(shape);
-    return drawing;
+  function picture(icon) {
+    const file = general.includes(icon) ? icon : "files_ext/" + encodeURIComponent(icon);
+    return make("img", { class: "picture", src: g_Tunnel + "/images/" + file, alt: "" });
   }
 
   function row(item) {
@@ -108,7 +99,7 @@
       ? make("a", { href: "#" + encodeURIComponent(JSON.stringify(pathField(item))), class: "folder" }, make("bdi", {}, item.name))
       : make("a", { href: address({ action: "download", ...pathField(item) }), download: "" }, make("bdi", {}, item.name));
     const size = item.isdir ? "" : sizeText(more.size || 0);
-    return make("tr", {}, make("td", { class: "name" }, picture(item.isdir ? "folder" : "file"), name),
+    return make("tr", {}, make("td", { class: "name" }, picture(item.icon), name),
       make("td", { class: "size" }, size), make("td", { class: "time" }, dayText(more.time)));
   }
 
@@ -133,13 +124,13 @@
   }
 
   function list(path, offset) {
-    return ask({ action: "list", additional: "size,time", limit: definitions.pageSize, offset, ...path });
+    return ask({ action: "list", additional: "size,time,icon", limit: definitions.pageSize, offset, ...path });
   }
 
   function showFile(place, item, button) {
     const more = (item && item.additional) || {};
     const about = [sizeText(more.size || 0), dayText(more.time)].filter((text) => text !== "").join(" · ");
-    show(make("div", { class: "single" }, picture("file"), make("h1", {}, make("bdi", {}, place.name)),
+    show(make("div", { class: "single" }, picture(item ? item.icon : "misc.png"), make("h1", {}, make("bdi", {}, place.name)),
       make("p", { class: "about" }, about), button));
   }
 
@@ -159,7 +150,7 @@
     const button = make("a", { class: "button", href: address({ action: "download", ...pathField(place) }) },
       place.file ? texts.download : texts.downloadAll);
     if (place.file) return showFile(place, data.items[0], button);
-    const head = make("header", {}, picture("folder"), make("h1", {}, make("bdi", {}, place.name)));
+    const head = make("header", {}, picture("folder.png"), make("h1", {}, make("bdi", {}, place.name)));
     if (data.items.length > 0) head.append(button);
     const parts = [head];
     if (place.path) parts.push(make("p", { class: "way" }, make("a", { href: "#" }, texts.top)));
