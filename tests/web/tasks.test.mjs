@@ -65,6 +65,9 @@ test("a search with every kind of criterion, stopped, closed", () =>
     await page.selectOption("[name=size_op]", "less");
     await page.fill("[name=size]", "4");
     await page.fill("[name=mtime_from]", "2020-01-01");
+    await page.fill("[name=mtime_to]", "2019-01-01");
+    assert.equal(await page.locator(".search-form input:invalid").count(), 1); // it would end before it begins
+    await page.fill("[name=mtime_to]", "");
     await page.fill("[name=owner]", "nobody of that name");
     await page.click(".search-form >> text=/^Search$/");
     await page.waitForSelector(".search-form .complaint >> text=Owner");
@@ -131,6 +134,7 @@ test("copy, reload, cancel; a conflict; delete and restore", () =>
     await page.waitForSelector(".activity-card.good >> text=Delete 1 item");
     await page.click("#tree >> text=projects");
     await page.dblclick("#view >> text=Recycle bin");
+    await page.waitForSelector("#toolbar >> text=Empty recycle bin");
     await row(page, "<i>odd").dblclick();
     await row(page, "four.txt").click();
     await screenshot(page, "recycle");

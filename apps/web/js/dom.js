@@ -45,6 +45,16 @@ export function iconButton(name, label, onclick, extra = {}) {
   return h("button.icon-button", { type: "button", "aria-label": label, title: label, onclick, ...extra }, icon(name));
 }
 
+// Two fields for days, of which the second is not before the first.
+export function dayRange(first, second) {
+  const from = h("input.input", { type: "date", ...first });
+  const to = h("input.input", { type: "date", ...second });
+  const follow = () => set(to, { min: from.value > (second.min ?? "") ? from.value : second.min });
+  from.addEventListener("input", follow);
+  follow();
+  return [from, to];
+}
+
 export const $ = (id) => document.getElementById(id);
 
 // What `change` takes away may have held the keyboard: it goes on with what came in its place, else with the list.
@@ -54,7 +64,7 @@ export function keepFocus(box, change) {
   if (!held || held.isConnected) return;
   const name = ["id", "data-command", "data-sort", "aria-label"].find((one) => held.hasAttribute(one));
   const like = name && box.querySelector(`[${name}="${CSS.escape(held.getAttribute(name))}"]`);
-  (like ?? $("view")).focus({ preventScroll: true });
+  (like ?? box.closest("dialog")?.querySelector("button") ?? $("view")).focus({ preventScroll: true });
 }
 
 const BIDI = {

@@ -26,6 +26,8 @@ function shortcut(event) {
   // A plain key on a button or a link is that button's.
   const onControl = event.target.closest?.("button, a, [role=treeitem]");
   if (onControl && ["Enter", " "].includes(event.key)) return;
+  // What is chosen in the list is not what the keyboard stands on in the tree.
+  if (found.group === "change" && event.target.closest?.("[role=tree]")) return;
   if (!found.when(context())) return;
   event.preventDefault();
   runCommand(found.id);

@@ -3,7 +3,7 @@
 import { get, post } from "./api.js";
 import { addCommand } from "./commands.js";
 import { confirm, dialog, toast, toastFailure } from "./dialogs.js";
-import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
+import { dayRange, h, icon, iconButton, keepFocus, nameNode, plainName } from "./dom.js";
 import { sentenceOf } from "./errors.js";
 import { formatDay } from "./format.js";
 import { iconOf } from "./icons.js";
@@ -28,6 +28,8 @@ async function makeLink(entry) {
     title: t("link.title"),
     fill: (close) => {
       const complaint = h("span.complaint", { role: "alert" });
+      const today = new Date().toLocaleDateString("sv"); // year-month-day
+      const [available, expires] = dayRange({ name: "available" }, { name: "expires", min: today });
       const field = (key, node, hint) =>
         h("label.field", {}, h("span", {}, t(`link.${key}`)), node, hint && h("span.soft", {}, hint));
       const form = h(
@@ -35,19 +37,19 @@ async function makeLink(entry) {
         {
           onsubmit: async (event) => {
             event.preventDefault();
-            const { password, available, expires } = Object.fromEntries(new FormData(form));
+            const { password } = Object.fromEntries(new FormData(form));
             try {
               close(
                 await post("link", {
                   action: "create",
                   path_raw: entry.id,
                   password: password || undefined,
-                  available: dayStart(available),
-                  expires: dayStart(expires),
+                  available: dayStart(available.value),
+                  expires: dayStart(expires.value),
                 }),
               );
             } catch (failure) {
-              complaint.textContent = available && !expires ? t("link.window") : sentenceOf(failure);
+              complaint.textContent = available.value && !expires.value ? t("link.window") : sentenceOf(failure);
             }
           },
         },
@@ -69,8 +71,8 @@ async function makeLink(entry) {
           h(
             "div.pair",
             {},
-            field("available", h("input.input", { name: "available", type: "date" })),
-            field("expires", h("input.input", { name: "expires", type: "date" })),
+            field("available", available),
+            field("expires", expires),
           ),
           h("p.soft", {}, t(entry.isFolder ? "link.about.folder" : "link.about.file")),
           complaint,
@@ -167,8 +169,10 @@ async function showLinks() {
     fill: () => {
       const list = h("ul.link-list");
       const paint = () =>
-        list.replaceChildren(
-          ...(items.length > 0 ? items.map(rowOf) : [h("li.none", {}, icon("link"), h("span", {}, t("link.none")))]),
+        keepFocus(list, () =>
+          list.replaceChildren(
+            ...(items.length > 0 ? items.map(rowOf) : [h("li.none", {}, icon("link"), h("span", {}, t("link.none")))]),
+          ),
         );
       const rowOf = (link) =>
         h(

@@ -1,7 +1,7 @@
 // The questions of a search, and what they come to as parameters of the program.
 
 import { browser } from "./browser.js";
-import { h, icon } from "./dom.js";
+import { dayRange, h, icon } from "./dom.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
 
@@ -41,13 +41,12 @@ export function searchForm(values, submit) {
       "fieldset.range",
       {},
       h("legend", {}, t(`search.${name}`)),
-      ["from", "to"].map((end) =>
-        h("input.input", {
-          type: "date",
+      dayRange(
+        ...["from", "to"].map((end) => ({
           name: `${name}_${end}`,
           value: values[`${name}_${end}`] ?? "",
           "aria-label": t(`search.${end}`),
-        }),
+        })),
       ),
     );
   const places =
