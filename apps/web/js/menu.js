@@ -1,6 +1,7 @@
 // Menus: at the pointer, or below a button.
 
 import { h, icon } from "./dom.js";
+import { t } from "./strings.js";
 
 let current = null;
 
@@ -12,7 +13,8 @@ function closeMenu() {
 export function openMenu(items, { x, y, anchor = null }) {
   closeMenu();
   const before = document.activeElement;
-  const menu = h("div.menu", { role: "menu", tabindex: -1 });
+  const label = anchor?.getAttribute("aria-label") ?? anchor?.textContent ?? t("menu.more");
+  const menu = h("div.menu", { role: "menu", tabindex: -1, "aria-label": label });
   const close = (focusBack = true) => {
     menu.remove();
     document.removeEventListener("pointerdown", outside, true);
@@ -57,7 +59,7 @@ function itemNode(item, close) {
     },
     icon(radio ? (item.checked ? "check" : "blank") : (item.icon ?? "blank")),
     h("span.grow", {}, item.label),
-    item.shortcut && h("kbd", {}, item.shortcut),
+    item.shortcut && h("kbd", { "aria-hidden": "true" }, item.shortcut),
   );
 }
 

@@ -1,6 +1,6 @@
 // One row of the list, or one tile of the grid.
 
-import { h, icon, nameNode, plainName, set } from "./dom.js";
+import { h, icon, nameNode, plainName } from "./dom.js";
 import { extensionOf, isLocked, isOffline, shownName } from "./entries.js";
 import { formatFullTime, formatSize, formatTime } from "./format.js";
 import { iconOf } from "./icons.js";
@@ -71,7 +71,20 @@ export function fillRow(row, index, entry, mode, columns) {
     return;
   }
   row.replaceChildren(...(mode === "list" ? listCells(entry, columns) : tileParts(entry)));
-  set(row, { "aria-label": mode === "grid" ? plainName(entry.name) : null });
+  row.setAttribute("aria-label", spoken(entry));
+}
+
+// A row in words: without the buttons in it, with what its pictures say.
+function spoken(entry) {
+  return [
+    plainName(shownName(entry)),
+    isLocked(entry) && t("mark.locked"),
+    isOffline(entry) && t("mark.offline"),
+    entry.size === null ? t("type.folder") : formatSize(entry.size),
+    formatTime(entry.mtime),
+  ]
+    .filter(Boolean)
+    .join(", ");
 }
 
 function check() {

@@ -1,6 +1,6 @@
 // The rows (or tiles) of a long list: only those in sight are in the document.
 
-import { h, keepFocus } from "./dom.js";
+import { h, keepFocus, set } from "./dom.js";
 import { makeRow, fillRow, makeHeader } from "./rows.js";
 
 // Browsers lose precision beyond some ten million pixels; longer lists scroll at a scale.
@@ -78,8 +78,10 @@ export class View {
       this.rows.delete(index);
     }
     for (let index = first; index <= last; ++index) this.place(index, box);
-    this.root.setAttribute("aria-rowcount", this.listing.ready ? this.listing.total + 1 : -1);
-    this.root.setAttribute("aria-busy", String(!this.listing.ready));
+    set(this.root, {
+      "aria-rowcount": this.mode === "grid" ? null : this.listing.ready ? this.listing.total + 1 : -1,
+      "aria-busy": String(!this.listing.ready),
+    });
     this.inSight = [
       Math.floor(box.top / box.height) * box.across,
       Math.ceil((box.top + box.room) / box.height) * box.across,
