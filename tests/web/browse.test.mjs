@@ -301,9 +301,20 @@ test("mounts, shares that do not answer, slow and broken servers", () =>
       await screenshot(page, "unreachable");
       await page.unroute("**/cgi-bin/list?*preview*");
       await page.click(".state button >> text=Try again");
-      await page.waitForSelector("#view >> text=readme.txt");
+      await row(page, "readme.txt").click();
+      const refuse = (pattern) => page.route(pattern, (route) => route.abort("connectionrefused"));
+      await refuse("**/cgi-bin/download*");
+      await page.focus("#view");
+      await page.keyboard.press(" ");
+      await page.waitForSelector(".preview >> text=The server does not answer");
+      await page.keyboard.press("Escape");
+      await page.keyboard.press("Control+s");
+      await page.waitForSelector(".toast.failed >> text=The server does not answer");
+      await refuse("**/strings/*");
+      await page.reload();
+      await page.waitForSelector("text=Reload the page");
     },
-    [/ERR_CONNECTION_REFUSED/],
+    [/ERR_CONNECTION_REFUSED/, /Failed to fetch/],
   ));
 
 test("a typed path, a filter, a place that is not there any more", () =>

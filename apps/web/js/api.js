@@ -38,7 +38,8 @@ export async function post(program, params, signal) {
   return unwrap(await send(PROGRAMS + program, { method: "POST", body: encodeParams(params), signal }));
 }
 
-async function send(url, options) {
+// The response, whatever its status.
+export async function send(url, options) {
   try {
     return await fetch(url, { ...options, cache: "no-store", credentials: "same-origin" });
   } catch (failure) {

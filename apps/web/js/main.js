@@ -207,4 +207,7 @@ async function start() {
   open(normalisePlace(location.hash.slice(1)));
 }
 
-start();
+start().catch((failure) => {
+  $("broken").hidden = false;
+  throw failure;
+});

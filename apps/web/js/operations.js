@@ -1,6 +1,6 @@
 // What is done to files at once: new folder, rename, download, properties.
 
-import { post, PROGRAMS, readReply } from "./api.js";
+import { ApiError, post, PROGRAMS, readReply } from "./api.js";
 import { browser, refresh, shareEntry } from "./browser.js";
 import { askText, dialog, toast, toastFailure } from "./dialogs.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
@@ -87,9 +87,11 @@ export function download(entries) {
     );
   document.body.append(frame, form);
   frame.addEventListener("load", () => {
-    const text = frame.contentDocument?.body?.textContent ?? "";
+    const text = frame.contentDocument?.body?.textContent;
     if (text === "") return;
     try {
+      // The browser's own page about a failure cannot be looked into.
+      if (text === undefined) throw new ApiError({ key: "page:unreachable" });
       readReply(200, text);
     } catch (failure) {
       toastFailure(failure, entries[0].id);

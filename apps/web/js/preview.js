@@ -1,6 +1,6 @@
 // A look at a file: pictures, text, sound and film; of everything else what it is.
 
-import { urlOf } from "./api.js";
+import { readReply, send, urlOf } from "./api.js";
 import { browser } from "./browser.js";
 import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { describe } from "./errors.js";
@@ -115,11 +115,8 @@ function mediaOf(entry) {
 }
 
 async function textOf(entry, signal) {
-  const response = await fetch(source(entry), { headers: { Range: `bytes=0-${TEXT_START - 1}` }, signal });
-  if (!response.ok) {
-    const reply = await response.json();
-    throw Object.assign(new Error(), reply.error);
-  }
+  const response = await send(source(entry), { headers: { Range: `bytes=0-${TEXT_START - 1}` }, signal });
+  if (!response.ok) readReply(response.status, await response.text());
   const bytes = new Uint8Array(await response.arrayBuffer());
   if (bytes.subarray(0, 4096).includes(0)) return message(entry, t("preview.none"));
   const text = h("pre", { tabindex: 0 }, new TextDecoder().decode(bytes));
