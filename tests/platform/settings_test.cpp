@@ -62,22 +62,6 @@ TEST_F(Settings, ValuesAndFailures) {
     });
 }
 
-TEST_F(Settings, AFileIsReadAgainOnlyWhenItChanged) {
-    const std::string file = systemRoot() + "/etc/x.conf";
-    const timespec hourAgo[] = {{time(nullptr) - 3600, 0}, {time(nullptr) - 3600, 0}};
-    for (const char* text : {"a=1\n", "a=2\n"}) {  // the same inode, size and time: the first is still believed
-        writeFile(file, text);
-        ASSERT_EQ(utimensat(-1, file.c_str(), hourAgo, 0), 0);
-        EXPECT_EQ(ask("/etc/x.conf"), "1 1");
-    }
-    for (const char* text : {"a=3\n", "a=4\n"}) {  // within one tick of the clock
-        writeFile(file, text);
-        EXPECT_EQ(ask("/etc/x.conf"), std::string("1 ") + text[2]);
-    }
-    ASSERT_EQ(unlink(file.c_str()), 0);
-    EXPECT_EQ(ask("/etc/x.conf"), failure(VEXO_ERR_FILE)) << "nothing is answered for a file that is gone";
-}
-
 TEST_F(Settings, GetKeysFillsTheCallersHashOrANewOne) {
     writeRootFile("/etc/x.conf", "20001=\"true\"\n20002=\"false\"\n20001=\"false\"\n");
     PVLIBCSZHASH hash = VLIBCSzHashAlloc(2048);
