@@ -272,7 +272,7 @@ test("mounts, shares that do not answer, slow and broken servers", () =>
       await page.reload();
       await page.waitForSelector(".card:has-text('music') >> text=Server does not answer");
       await page.waitForSelector(".card:has-text('photo') >> text=Read only");
-      assert.equal(await page.locator("#tree .tag.warn").count(), 1);
+      assert.equal(await page.locator("#tree [aria-label='music, Server does not answer'] .tag.warn").count(), 1);
       await page.click(".card >> text=projects");
       for (const kind of ["iso", "remote", "offline"])
         await page.waitForSelector(`#view use[href$="kind-folder-${kind}"]`, { state: "attached" });

@@ -135,6 +135,7 @@ test("copy, reload, cancel; a conflict; delete and restore", () =>
     await page.click("#tree >> text=projects");
     await page.dblclick("#view >> text=Recycle bin");
     await page.waitForSelector("#toolbar >> text=Empty recycle bin");
+    assert.equal(await page.locator("#toolbar >> text=Upload").count(), 0);
     await row(page, "<i>odd").dblclick();
     await row(page, "four.txt").click();
     await screenshot(page, "recycle");

@@ -118,7 +118,7 @@ addCommand({
   icon: "info",
   keys: ["Alt+Enter"],
   group: "info",
-  when: ({ single, folder, search }) => single || (folder && !search),
+  when: ({ single, count, folder, search }) => single || (count === 0 && folder && !search),
   run: ({ single }) => showProperties(single ?? browser.id),
 });
 addCommand({

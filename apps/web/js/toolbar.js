@@ -144,7 +144,8 @@ function paintToolbar(setSort) {
   paintStatus(now);
 }
 
-function uploadButton({ canWrite }) {
+function uploadButton({ canWrite, inBin }) {
+  if (inBin) return null;
   if (!canWrite)
     return h(
       "span.soft.hint-readonly",

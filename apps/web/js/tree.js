@@ -46,7 +46,13 @@ function makeItem(id, label, kind, level, share = null) {
   line.style.setProperty("--level", level);
   const item = h(
     "li",
-    { role: "treeitem", "aria-expanded": "false", "aria-level": level, "aria-label": plainName(label), tabindex: -1 },
+    {
+      role: "treeitem",
+      "aria-expanded": "false",
+      "aria-level": level,
+      "aria-label": [plainName(label), ...marksOf(share).map((mark) => mark.title)].join(", "),
+      tabindex: -1,
+    },
     line,
     group,
   );
@@ -56,10 +62,11 @@ function makeItem(id, label, kind, level, share = null) {
 }
 
 function marksOf(share) {
+  if (!share) return [];
   return [
     isOffline(share) && h("span.tag.warn", { title: t("mark.offline") }, icon("offline")),
-    isReadOnlyShare(share) && h("span.tag", { title: t("mark.readonly") }, icon("read-only")),
-  ];
+    isReadOnlyShare(share) && h("span.tag", { title: t("share.read") }, icon("read-only")),
+  ].filter(Boolean);
 }
 
 async function expand(id) {
