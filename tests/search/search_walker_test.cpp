@@ -56,6 +56,7 @@ std::vector<Query> queries() {
         all.push_back({{folder, "/docs/ab"}, {{1, "file", nullptr}}, true});
     }
     all.push_back({{"/photo", "/photo/2012", "/photo/2012"}, {names}});
+    all.push_back({{"/photo", "/docs"}, {names}, true});
     all.push_back({{"/homes"}, {names}});
     // What no index holds, beside what it does.
     for (const char* folder :
