@@ -205,7 +205,7 @@ TEST_F(IndexFilesTest, AnIndexIsReplacedAsAWholeByOneAtATime) {
 TEST_F(IndexFilesTest, AnUpdateKeepsNamesFindable) {
     build({{"a/Holiday.jpg"}, {"a/work.txt"}, {"b/holiday.png"}});
     ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path_, sizeof path_), 0);
-    ASSERT_EQ(insert(path_, {"c/HOLIDAY.gif"}), 0);
+    ASSERT_EQ(insert(path_, {"c/\"HOLIDAY\".gif"}), 0);
     Cond where = node(FI_COL_PATH, FI_OP_EQUAL, "a/work.txt");
     Cond name = node(FI_COL_NAME, FI_OP_EQUAL, "my holiday");
     Cond set = node(FI_COL_PATH, FI_OP_EQUAL, "a/my holiday", &name);
@@ -216,8 +216,10 @@ TEST_F(IndexFilesTest, AnUpdateKeepsNamesFindable) {
     ASSERT_EQ(FILEIDXDBFlush(path_), 0);
     Cond holiday = node(FI_COL_NAME, FI_OP_WILDCARD, "*oliday*");
     Cond work = node(FI_COL_NAME, FI_OP_WILDCARD, "*work*");
-    EXPECT_EQ(searched(&holiday), (Addresses{"photo:a/Holiday.jpg", "photo:a/my holiday", "photo:c/HOLIDAY.gif"}));
+    EXPECT_EQ(searched(&holiday), (Addresses{"photo:a/Holiday.jpg", "photo:a/my holiday", "photo:c/\"HOLIDAY\".gif"}));
     EXPECT_EQ(searched(&work), Addresses());
+    Cond quoted = node(FI_COL_NAME, FI_OP_WILDCARD, "*\"holiday\"*");
+    EXPECT_EQ(searched(&quoted), Addresses{"photo:c/\"HOLIDAY\".gif"});
     ASSERT_EQ(FILEIDXIndexEnd("photo", 1), 0);
 }
 
@@ -241,7 +243,7 @@ BOOL wasRead(Data* data, void* argument) {
 
 TEST_F(IndexFilesTest, ASearchAsksWithTheCallersIdentity) {
     SKIP_WITHOUT_ROOT();
-    build({{"open/a"}, {"open/b"}, {"secret/c"}, {"stop"}});
+    build({{"open/a"}, {"open/b"}, {"secret/c"}, {"stop"}, {"never asked"}});
     actingForAlice([&] {
         const std::string out = folder_ + "/alice";
         Asked asked;
