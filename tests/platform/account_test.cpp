@@ -1,5 +1,5 @@
 // Users and groups: from the system root's files and from NSS, remembered and read again, lists and applications.
-#include "application_list.h"
+#include "accounts/application_list.h"
 #include "platform/trust.h"
 #include "vexo/user.h"
 

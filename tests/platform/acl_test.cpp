@@ -9,8 +9,8 @@
 #include <sys/syscall.h>
 #include <sys/xattr.h>
 
-#include "acl_rules.h"
-#include "file_io.h"
+#include "filesystem/acl_rules.h"
+#include "io/file_io.h"
 #include "platform/private_mounts.h"
 #include "support/testing.h"
 

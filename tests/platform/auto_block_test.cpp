@@ -4,8 +4,8 @@
 #include <sqlite3.h>
 #include <sys/wait.h>
 
-#include "auto_block_rules.h"
 #include "platform/trust.h"
+#include "web/auto_block_rules.h"
 
 namespace {
 

@@ -1,5 +1,5 @@
 // What the platform's files rely on: limits, the identity behind, and knowing a version again.
-#include "file_io.h"
+#include "io/file_io.h"
 
 #include "raise.h"
 #include "support/testing.h"

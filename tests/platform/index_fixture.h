@@ -4,7 +4,7 @@
 
 #include <sqlite3.h>
 
-#include "index_connections.h"
+#include "index/index_connections.h"
 #include "support/testing.h"
 #include "vexo/index.h"
 #include "vexo/stat.h"

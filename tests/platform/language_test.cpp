@@ -3,7 +3,7 @@
 
 #include <set>
 
-#include "language_choice.h"
+#include "settings/language_choice.h"
 #include "support/testing.h"
 #include "vexo/user.h"
 

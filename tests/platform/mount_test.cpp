@@ -1,7 +1,7 @@
 // The mount table and what is told from it.
 #include <sys/mount.h>
 
-#include "mount_table.h"
+#include "filesystem/mount_table.h"
 #include "platform/private_mounts.h"
 #include "support/testing.h"
 #include "vexo/filesystem.h"

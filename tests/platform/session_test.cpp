@@ -2,8 +2,8 @@
 #include "vexo/session.h"
 
 #include "platform/trust.h"
-#include "session_record.h"
-#include "session_store.h"
+#include "web/session_record.h"
+#include "web/session_store.h"
 
 namespace {
 

@@ -10,8 +10,8 @@
 #include "platform/private_mounts.h"
 #include "platform/refuse_calls.h"
 #include "platform/trust.h"
-#include "settings_file.h"
-#include "settings_text.h"
+#include "settings/settings_file.h"
+#include "settings/settings_text.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"
 

@@ -1,7 +1,7 @@
 // Settings files: the format, and the operations that read it.
 #include "vexo/settings.h"
 
-#include "settings_text.h"
+#include "settings/settings_text.h"
 #include "support/testing.h"
 
 namespace {

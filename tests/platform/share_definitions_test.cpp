@@ -1,10 +1,10 @@
 // The grammar of share definitions, also held against Samba's own reader, and what sections mean.
-#include "share_definitions.h"
+#include "shares/share_definitions.h"
 
 #include <map>
 #include <set>
 
-#include "share_options.h"
+#include "shares/share_options.h"
 #include "support/testing.h"
 #include "vexo/share.h"
 

@@ -1,7 +1,7 @@
 // Status records: what they hold, what failures leave.
 #include "vexo/stat.h"
 
-#include "file_io.h"
+#include "io/file_io.h"
 #include "support/testing.h"
 
 namespace {

@@ -8,9 +8,9 @@
 #include <csignal>
 
 #include "platform/trust.h"
-#include "task_document.h"
-#include "task_name.h"
-#include "task_worker.h"
+#include "tasks/task_document.h"
+#include "tasks/task_name.h"
+#include "tasks/task_worker.h"
 
 namespace {
 

@@ -3,9 +3,9 @@
 
 #include <cstdio>
 
-#include "cgi_text.h"
 #include "support/testing.h"
 #include "vexo/web_record.h"
+#include "web/cgi_text.h"
 
 namespace {
 

@@ -15,7 +15,7 @@
 #include "fault_gate.h"
 #include "support/appliance.h"
 #include "support/fault_sweep.h"
-#include "task_document.h"
+#include "tasks/task_document.h"
 
 namespace {
 

@@ -20,7 +20,7 @@
 #include <sstream>
 
 #include "fault_gate.h"
-#include "index_connections.h"
+#include "index/index_connections.h"
 #include "orvel/error_state.h"
 
 namespace fs = std::filesystem;

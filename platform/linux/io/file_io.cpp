@@ -1,22 +1,9 @@
 #include "io/file_io.h"
 
-#include <cstdio>
-#include <cstdlib>
 #include <ctime>
 
 namespace vexo {
 namespace {
-
-// Makes the rename of a file in `folder` last; a file system that cannot do so is as good as it gets.
-void synchroniseFolder(const std::string& folder) {
-    const Descriptor fd = openFile(folder, O_RDONLY | O_DIRECTORY);
-    if (fd) static_cast<void>(fsync(fd.get()));
-}
-
-bool fillAndRename(int fd, const std::string& temporary, const std::string& path, std::string_view text, mode_t mode) {
-    return writeAll(fd, text) && fchmod(fd, mode) == 0 && fsync(fd) == 0 &&
-           rename(temporary.c_str(), path.c_str()) == 0;
-}
 
 bool isBefore(const timespec& a, const timespec& b) {
     return a.tv_sec != b.tv_sec ? a.tv_sec < b.tv_sec : a.tv_nsec < b.tv_nsec;
@@ -74,21 +61,6 @@ bool readRegularFile(const std::string& path, size_t limit, std::string& text, F
     version = FileVersion(status);
     text.clear();
     return readAll(fd.get(), text, limit);
-}
-
-bool replaceFile(const std::string& path, std::string_view text, mode_t mode) {
-    const std::string folder = path.substr(0, path.rfind('/') + 1);
-    std::string temporary = folder + ".new-XXXXXX";
-    const Descriptor fd(mkostemp(temporary.data(), O_CLOEXEC));
-    if (!fd) return false;
-    if (!fillAndRename(fd.get(), temporary, path, text, mode)) {
-        const int savedErrno = errno;
-        unlink(temporary.c_str());
-        errno = savedErrno;
-        return false;
-    }
-    synchroniseFolder(folder.empty() ? "." : folder);
-    return true;
 }
 
 bool isTrusted(const struct stat& status, mode_t type) {

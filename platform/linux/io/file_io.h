@@ -75,10 +75,6 @@ class FileVersion {
 // Reads a regular file (anything else: EINVAL, without waiting on a pipe) into `text`; `version` is what was read.
 [[nodiscard]] bool readRegularFile(const std::string& path, size_t limit, std::string& text, FileVersion& version);
 
-// Replaces `path` as a whole: a temporary beside it, written, synchronised and renamed. On failure the temporary is
-// gone and the old file as it was. A symbolic link at `path` is itself replaced.
-[[nodiscard]] bool replaceFile(const std::string& path, std::string_view text, mode_t mode);
-
 // True for what a central store may trust: of this type (S_IFREG, S_IFDIR), owned by root or the effective user,
 // writable by nobody else, and, for a file, under one name only.
 [[nodiscard]] bool isTrusted(const struct stat& status, mode_t type);
