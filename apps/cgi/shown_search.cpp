@@ -73,15 +73,25 @@ void ShownSearch::removed(const ChangedFile& file) {
     if (!path.empty()) task_.results->delRecs(definedShareName(file.info.shareName), path);
 }
 
-void ShownSearch::reduced(const ChangedFile& folder) {
+void ShownSearch::movedPartly(const ChangedFile& from, const ChangedFile* to) {
     if (task_.results == nullptr) return;
     GoneRows gone;
-    gone.below = rowPath(folder) + "/";
+    const std::string source = rowPath(from), target = to == nullptr ? "" : rowPath(*to);
+    if (source.empty()) return;
+    gone.below = source + "/";
     FIQUERY everyRow{};
     everyRow.limit = ULONG_MAX;
     // A database that is read is not written to: first all of them.
     if (FILEIDXDBSelect(task_.results->getDBTaskFilePath(), &everyRow, collectGone, &gone) < 0) return;
-    for (const auto& [share, path] : gone.list) task_.results->delRecs(share, path);
+    for (const auto& [share, path] : gone.list) {
+        _tag_VEXOSTAT_ status;
+        const std::string there = target + path.substr(source.size());
+        if (!target.empty() && statusOf(there, status)) {
+            task_.results->updateFile(share, path, definedShareName(to->info.shareName), there, status);
+        } else {
+            task_.results->delRecs(share, path);
+        }
+    }
 }
 
 void ShownSearch::moved(const ChangedFile& from, const ChangedFile& to) {

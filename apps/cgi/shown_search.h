@@ -29,7 +29,9 @@ class ShownSearch {
     // It is gone, with everything below it.
     void removed(const ChangedFile& file);
     // Some of what is below it may be gone.
-    void reduced(const ChangedFile& folder);
+    void reduced(const ChangedFile& folder) { movedPartly(folder, nullptr); }
+    // Some of what was below `from` lies at the same place below `to` now (null: nowhere).
+    void movedPartly(const ChangedFile& from, const ChangedFile* to);
     // What was `from` is `to` now, with everything below it.
     void moved(const ChangedFile& from, const ChangedFile& to);
 

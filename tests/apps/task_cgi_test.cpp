@@ -720,12 +720,13 @@ TEST_F(TaskCgi, WhatWasCompressedComesBackTheSame) {
 
 TEST_F(TaskCgi, TheSearchOnScreenFollows) {
     SKIP_WITHOUT_ROOT();
-    for (const char* file : {"/s/found1", "/s/found2", "/s/d/found3", "/t/found4", "/t/roots/found5"}) {
+    for (const char* file :
+         {"/s/found1", "/s/found2", "/s/d/found3", "/t/found4", "/t/roots/found5", "/m/found6", "/m/roots/found7"}) {
         writeFile(photo_ + file, "x", 0666);
     }
     support::makeFolder(photo_ + "/#recycle", 0777);
     ASSERT_EQ(chmod((photo_ + "/#recycle").c_str(), 0777), 0);
-    for (const char* folder : {"/s", "/s/d", "/t"}) give(photo_ + folder);
+    for (const char* folder : {"/s", "/s/d", "/t", "/m"}) give(photo_ + folder);
     const auto search = [](const std::string& method, const std::string& form) {
         return CgiReply(support::runCgi(PROGRAM_SEARCH, "alice", method, method == "GET" ? form : "",
                                         method == "GET" ? "" : form,
@@ -743,16 +744,27 @@ TEST_F(TaskCgi, TheSearchOnScreenFollows) {
         for (const Json::Value& item : page["items"]) all += item["path"].asString() + " ";
         return all;
     };
-    ASSERT_EQ(found(), "/photo/s/found1 /photo/s/found2 /photo/s/d/found3 /photo/t/found4 /photo/t/roots/found5 ");
+    std::string mine = "/photo/m/found6 /photo/m/roots/found7 ";
+    ASSERT_EQ(found(),
+              "/photo/s/found1 /photo/s/found2 /photo/s/d/found3 /photo/t/found4 /photo/t/roots/found5 " + mine);
     const auto with = "&taskid=" + id;
     EXPECT_EQ(errors(perform("alice", "action=delete" + with + about({"/photo/s/found1"}))), "");
+    setSetting("pexlanderxferlog", "yes");
     EXPECT_NE(errors(perform("alice", "action=delete&permanent=true" + with + about({"/photo/t"}))), "");
-    EXPECT_EQ(found(), "/photo/s/found2 /photo/s/d/found3 /photo/t/roots/found5 ") << "what could not be deleted stays";
+    EXPECT_EQ(found(), "/photo/s/found2 /photo/s/d/found3 /photo/t/roots/found5 " + mine)
+        << "what could not be deleted stays";
+    EXPECT_NE(readFile(systemRoot() + "/var/log/vexo/xfer.log").find("/photo/t"), std::string::npos);
     EXPECT_EQ(errors(perform("alice", "action=move" + with + about({"/photo/s/d"}, "/video"))), "");
-    EXPECT_EQ(found(), "/photo/s/found2 /video/d/found3 /photo/t/roots/found5 ");
+    EXPECT_EQ(found(), "/photo/s/found2 /video/d/found3 /photo/t/roots/found5 " + mine);
     EXPECT_EQ(
         errors(perform("alice", "action=copy&conflict=keep_both" + with + about({"/photo/s/found2"}, "/photo/s"))), "");
-    EXPECT_EQ(found(), "/photo/s/found2 /photo/s/found2 (2) /video/d/found3 /photo/t/roots/found5 ");
+    EXPECT_EQ(found(), "/photo/s/found2 /photo/s/found2 (2) /video/d/found3 /photo/t/roots/found5 " + mine);
+    support::makeFolder(video_ + "/m", 0777);
+    ASSERT_EQ(chmod((video_ + "/m").c_str(), 0777), 0);
+    EXPECT_NE(errors(perform("alice", "action=move&conflict=overwrite" + with + about({"/photo/m"}, "/video"))), "");
+    mine = "/video/m/found6 /photo/m/roots/found7 ";
+    EXPECT_EQ(found(), "/photo/s/found2 /photo/s/found2 (2) /video/d/found3 /photo/t/roots/found5 " + mine)
+        << "half of it moved";
 }
 
 TEST_F(TaskCgi, OnlyOnesOwnOperationsAreShown) {

@@ -26,8 +26,7 @@ void ChangeNotices::moved(const Item& from, const ChangedFile& to, long long byt
     if (whole) {
         search_.moved(from.changed(), to);
     } else {
-        search_.added(to);
-        search_.reduced(from.changed());
+        search_.movedPartly(from.changed(), &to);
     }
 }
 
