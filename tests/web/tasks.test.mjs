@@ -162,6 +162,7 @@ test("packed, extracted, refused item by item", () =>
     await row(page, "notes.md").click();
     await page.click("[aria-label='More actions']");
     await page.click(".menu >> text=Pack as zip");
+    await page.waitForSelector(".dialog input:focus"); // it opens once the chosen entries are known
     await page.keyboard.press("Enter");
     await row(page, "notes.zip").click();
     await page.click("[aria-label='More actions']");
