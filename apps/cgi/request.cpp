@@ -2,6 +2,7 @@
 
 #include <unistd.h>
 
+#include <algorithm>
 #include <charconv>
 #include <cstdlib>
 #include <memory>
@@ -55,6 +56,22 @@ bool isForeign() {
     const std::string_view from = origin;
     const size_t scheme = from.find("://");
     return scheme == std::string_view::npos || from.substr(scheme + 3) != host;
+}
+
+// Appends the paths of a list, one a line; see pathParams. False when a line cannot be one.
+bool addLines(std::string_view lines, std::vector<std::string>& paths) {
+    while (!lines.empty()) {
+        std::string_view line = lines.substr(0, lines.find('\n'));
+        lines.remove_prefix(std::min(lines.size(), line.size() + 1));
+        if (line.ends_with('\r')) line.remove_suffix(1);  // a form ends its lines so
+        if (line.empty()) continue;
+        const auto path = percentDecode(line);
+        if (!path) return false;
+        const bool whole = line.find('/') != std::string_view::npos;
+        if (!whole && paths.empty()) return false;
+        paths.push_back(whole ? *path : paths.back().substr(0, paths.back().rfind('/') + 1) + *path);
+    }
+    return true;
 }
 
 }  // namespace
@@ -125,6 +142,7 @@ std::optional<bool> ascendingParam(const VEXO::WebCGI& cgi) {
 
 std::optional<std::vector<std::string>> pathParams(const VEXO::WebCGI& cgi) {
     std::vector<std::string> paths;
+    if (!addLines(cgi.GetParam("paths_raw", ""), paths)) return std::nullopt;
     for (const std::string& raw : cgi.GetParams("path_raw")) {
         const auto path = percentDecode(raw);
         if (!path) return std::nullopt;

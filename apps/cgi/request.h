@@ -54,7 +54,9 @@ std::optional<bool> ascendingParam(const VEXO::WebCGI& cgi);
 std::optional<std::string> bytesParam(const VEXO::WebCGI& cgi, const std::string& name);
 // The share-relative path of a request, "path_raw" or "path".
 std::optional<std::string> pathParam(const VEXO::WebCGI& cgi);
-// Those of a request that takes several: every "path_raw", then every "path". Nothing when one cannot be a path.
+// Those of a request that takes several: of "paths_raw", every "path_raw", then every "path". "paths_raw" is a list for
+// thousands: percent-encoded like "path_raw", one a line, where a line without a "/" is a name in the folder of the
+// line before. Nothing when one cannot be a path.
 std::optional<std::vector<std::string>> pathParams(const VEXO::WebCGI& cgi);
 
 }  // namespace orvel::cgi

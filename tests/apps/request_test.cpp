@@ -1,5 +1,9 @@
 #include "request.h"
 
+#include <optional>
+#include <string>
+#include <vector>
+
 #include "support/testing.h"
 
 using namespace orvel::cgi;
@@ -12,6 +16,20 @@ TEST(Request, NumbersAreDigitsThatFit) {
     for (const char* text : {"", "-1", "+1", " 1", "1 ", "1x", "0x10", "1.0", "18446744073709551616"}) {
         EXPECT_EQ(parseNumber(text), std::nullopt) << text;
     }
+}
+
+TEST(Request, ListsOfPathsNameTheFolderOnce) {
+    using Paths = std::vector<std::string>;
+    for (const auto& [query, paths] : Rows<const char*, std::optional<Paths>>{
+             row("paths_raw=/a/one%0Atwo%252Fhalf%0D%0A%0D%0A/b%0Ac&path=/d",
+                 Paths{"/a/one", "/a/two/half", "/b", "/c", "/d"}),
+             row("paths_raw=one", std::nullopt), row("paths_raw=/a%0A%25zz", std::nullopt),
+             row("paths_raw=/a%0A%2500", std::nullopt), row("path_raw=/a&paths_raw=/b%0Ac", Paths{"/b", "/c", "/a"}),
+             row("path=", Paths{""}), row("", Paths{})}) {
+        setenv("QUERY_STRING", query, 1);
+        EXPECT_EQ(pathParams(VEXO::WebCGI()), paths) << query;
+    }
+    unsetenv("QUERY_STRING");
 }
 
 class ForwardedFor : public ApplianceTest {};

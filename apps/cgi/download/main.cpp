@@ -1,15 +1,14 @@
 // CGI program "download": one file with ranges, or several files and folders as one zip.
 //
 // Parameters, from the query or a form:
-//   path, path_raw     what to fetch; each may be given more than once: several paths, or a folder, come as a zip
-//   name               of the zip, without ".zip"; default is that of the only folder, else "download"
+//   paths_raw, path_raw, path   what to fetch (see pathParams): several paths, or a folder, come as a zip
+//   name                        of the zip, without ".zip"; default is that of the only folder, else "download"
 // A file answers HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since. Failures are JSON replies.
 #include <fcntl.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <csignal>
-#include <optional>
 #include <string>
 #include <vector>
 
@@ -21,7 +20,6 @@
 #include "orvel/share_path.h"
 #include "reply.h"
 #include "request.h"
-#include "text.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
@@ -54,27 +52,13 @@ int openSource(const User& user, const std::string& path, Source& source) {
     return openFound(found, info.realPath, source);
 }
 
-// Every path of the request, decoded; nothing when one cannot be a path, or there is none.
-std::optional<std::vector<std::string>> pathsOf(const VEXO::WebCGI& web) {
-    std::vector<std::string> paths = web.GetParams("path");
-    for (const std::string& text : web.GetParams("path_raw")) {
-        const auto decoded = percentDecode(text);
-        if (!decoded) return std::nullopt;
-        paths.push_back(*decoded);
-    }
-    const bool whole = std::all_of(paths.begin(), paths.end(),
-                                   [](const std::string& path) { return path.find('\0') == std::string::npos; });
-    if (paths.empty() || !whole) return std::nullopt;
-    return paths;
-}
-
 void serve(Output& out) {
     std::signal(SIGPIPE, SIG_IGN);
     User user;
     if (!begin(out, user)) return;
     const VEXO::WebCGI web;
-    const auto paths = pathsOf(web);
-    if (web.BodyRefused() || !paths) {
+    const auto paths = pathParams(web);
+    if (web.BodyRefused() || !paths || paths->empty()) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
     const bool home =

@@ -66,7 +66,7 @@ export function readReply(status, text) {
   try {
     reply = JSON.parse(text);
   } catch {
-    throw new ApiError({ key: "page:bad_reply", code: status });
+    throw new ApiError({ key: status === 413 ? "page:too_many" : "page:bad_reply", code: status });
   }
   if (!reply.success) throw new ApiError({ ...reply.error, data: reply.data });
   return reply.user === undefined ? reply.data : { ...reply.data, user: reply.user };

@@ -1,6 +1,7 @@
 // Where one is: the folder on screen, its listing, what is chosen in it.
 
 import { get, MISSING } from "./api.js";
+import { toast, toastFailure } from "./dialogs.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { emit } from "./events.js";
@@ -14,7 +15,6 @@ import { t } from "./strings.js";
 const FIRST_LOOK = 60;
 // Most folders are there within this; only slower ones show that something is going on.
 const PATIENCE = 150;
-const MOST_TO_FIND = 1000;
 
 export const browser = {
   id: "/", // of the folder, or "?" and the task of a search
@@ -22,7 +22,10 @@ export const browser = {
   shares: [],
   user: "",
   listing: null,
-  selection: new Selection(() => emit("selection")),
+  selection: new Selection({
+    onChange: () => emit("selection"),
+    onFailure: (failure) => (failure ? toastFailure(failure, browser.id) : toast({ text: t("chosen.again"), kind: "failed" })),
+  }),
   mode: pref("mode", "list"),
   sort: pref("sort", { by: "name", ascending: true }),
   filter: "",
@@ -99,7 +102,7 @@ export async function open(id) {
   emit("place", id);
   if (id === "/") {
     browser.listing = null;
-    browser.selection.reset();
+    browser.selection.reset(null);
     emit("shown");
     return;
   }
@@ -117,34 +120,57 @@ async function openFile(id, mine) {
   location.replace(`#${entry.parent}`);
 }
 
-// `wanted`: {id, far} of the entry to choose; `far` when it is worth looking for in all of the folder.
-async function show(id, mine, wanted) {
+// `wanted`: {id, far} of the entry to choose; `far` when it is worth looking for in all of the folder. `keep`: what is
+// chosen stays chosen.
+async function show(id, mine, wanted, keep = false) {
   const listing = isSearch(id) ? searchResults(id.slice(1), browser, changed) : folderListing(id, browser, changed);
   const saved = remembered.get(id);
   await Promise.race([listing.need(0, FIRST_LOOK), new Promise((resolve) => setTimeout(resolve, PATIENCE))]);
   if (mine !== turn) return listing.cancel();
   browser.listing = listing;
-  browser.selection.reset();
+  if (keep) browser.selection.follow(listing);
+  else browser.selection.reset(listing);
   emit("shown");
   if (!listing.ready && !listing.error) await listing.need(0, FIRST_LOOK);
   if (mine !== turn || !listing.ready) return;
   if (saved) restore(saved);
-  if (!wanted) return;
-  const isWanted = (entry) => entry.id === wanted.id;
-  let index = listing.find(isWanted);
-  if (index < 0 && wanted.far) index = (await listing.entries([[0, listing.total - 1]])).findIndex(isWanted);
-  if (mine === turn && index >= 0) choose(index);
+  if (keep) await checkChosen(listing, browser.filter === "" && browser.kind === "all" ? "chosen.gone" : "chosen.hidden");
+  else if (wanted) await choose(listing, wanted.id, wanted.far);
 }
 
 function restore({ top, cursor }) {
   browser.view.root.scrollTop = top;
-  browser.selection.cursor = browser.selection.anchor = Math.min(cursor, Math.max(0, browser.listing.total - 1));
+  browser.selection.stand(Math.min(cursor, Math.max(0, browser.listing.total - 1)));
   browser.view.render();
 }
 
-function choose(index) {
-  browser.selection.pick(index);
+// Chooses an entry and shows it; one that has not been loaded is looked for in all of the list when it is worth that.
+async function choose(listing, id, far) {
+  let index = listing.indexOf(id);
+  let entry = listing.item(index);
+  if (index < 0 && far) {
+    const all = await listing.names(0, Infinity).catch(() => []);
+    index = all.findIndex((one) => one.id === id);
+    entry = all[index];
+  }
+  if (index < 0 || listing !== browser.listing) return;
+  browser.selection.only(entry, index);
   browser.view.reveal(index);
+}
+
+// What is chosen but no longer in the list leaves the choice, and that is said.
+async function checkChosen(listing, words) {
+  const { selection } = browser;
+  const chosen = await selection.entries();
+  // A search that runs has not found everything again yet.
+  if (chosen.length === 0 || (isSearch(browser.id) && !listing.extra?.finished)) return;
+  const idsOf = (entries) => new Set(entries.map((entry) => entry.id));
+  let here = idsOf(listing.fresh());
+  if (!chosen.every((entry) => here.has(entry.id))) here = idsOf(await listing.names(0, Infinity).catch(() => chosen));
+  const left = chosen.filter((entry) => !here.has(entry.id) && selection.chosen.has(entry.id));
+  if (left.length === 0 || listing !== browser.listing) return;
+  selection.remove(left.map((entry) => entry.id));
+  toast({ text: t(words, { count: left.length, name: left[0].name }) });
 }
 
 export function setMode(mode) {
@@ -178,48 +204,26 @@ async function reopen() {
   const mine = ++turn;
   browser.listing?.cancel();
   remembered.delete(browser.id);
-  await show(browser.id, mine, null);
+  await show(browser.id, mine, null, true);
   if (mine === turn && browser.listing.ready) announce(t("status.items", { count: browser.listing.total }));
 }
 
 // After something was changed: what is there stays until the new state has come; what was chosen stays chosen.
-export async function refresh(chooseIds = null) {
+export async function refresh(chooseId = null) {
   if (browser.id === "/") return loadShares();
   const { listing, selection, view } = browser;
   if (!listing) return undefined;
-  const chosen = chooseIds ?? idsOf(selection);
-  const cursorId = chooseIds ? chooseIds[0] : listing.item(selection.cursor)?.id;
-  const before = listing.total;
+  const cursorId = listing.item(selection.cursor)?.id;
   await listing.refresh(...(view.inSight ?? [0, FIRST_LOOK]));
-  if (listing !== browser.listing) return undefined;
-  // Too many to look for: all that a search finds stay all, others stay in a list that is as long as before.
-  if (!chosen && isSearch(browser.id) && selection.count === before) return selection.all(listing.total);
-  if (!chosen && listing.total === before) return undefined;
-  const wanted = new Set(chosen ?? []);
-  const indexes = [];
-  let cursor = null;
-  for (let i = 0; i < listing.total && i < 20000 && (wanted.size > indexes.length || cursor === null); ++i) {
-    const id = listing.item(i)?.id;
-    if (id === cursorId) cursor = i;
-    if (id && wanted.has(id)) indexes.push(i);
-  }
-  selection.restore(indexes, cursor ?? Math.min(selection.cursor, Math.max(0, listing.total - 1)));
-  if (chooseIds && cursor !== null) view.reveal(cursor);
-  return undefined;
-}
-
-// Of what is chosen; null when that is much, or has never been looked at.
-function idsOf(selection) {
-  if (selection.count > MOST_TO_FIND) return null;
-  const ids = [];
-  for (const [first, last] of selection.ranges.list) {
-    for (let i = first; i <= last; ++i) ids.push(browser.listing.item(i)?.id);
-  }
-  return ids.every(Boolean) ? ids : null;
+  if (listing !== browser.listing || listing.error) return undefined;
+  if (chooseId) return choose(listing, chooseId, true);
+  const cursor = listing.indexOf(cursorId);
+  selection.move(cursor >= 0 ? cursor : Math.min(selection.cursor, Math.max(0, listing.total - 1)));
+  return checkChosen(listing, "chosen.gone");
 }
 
 export function selectedEntries() {
-  return browser.listing ? browser.listing.entries(browser.selection.ranges.list) : Promise.resolve([]);
+  return browser.selection.entries();
 }
 
 export { columns };

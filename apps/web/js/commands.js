@@ -2,7 +2,8 @@
 
 import { browser, go, goTo, goUp, refresh, selectedEntries, setMode, shareEntry } from "./browser.js";
 import { isInBin, isReadOnlyShare } from "./entries.js";
-import { copyPath, download, newFolder, rename, showProperties } from "./operations.js";
+import { download } from "./download.js";
+import { copyPath, newFolder, rename, showProperties } from "./operations.js";
 import { isSearch } from "./path.js";
 import { editPath } from "./pathbar.js";
 import { preview } from "./preview.js";
@@ -31,14 +32,16 @@ export function context() {
   const share = shareEntry(browser.id);
   const folder = browser.id !== "/" && Boolean(listing?.ready);
   const search = isSearch(browser.id);
-  const first = count > 0 ? listing.item(selection.ranges.list[0][0]) : undefined;
+  const { first } = selection;
+  const onRow = listing?.item(selection.cursor);
   const home = search && first ? shareEntry(first.id) : share;
   return {
     folder,
     search,
     count,
     canChange: count > 0 && home !== undefined && !isReadOnlyShare(home),
-    single: count === 1 ? first : undefined,
+    // What is chosen by name alone has its properties in its row.
+    single: selection.single && selection.single.id === onRow?.id ? onRow : selection.single,
     canWrite: folder && share !== undefined && !isReadOnlyShare(share),
     inBin: isInBin(browser.id),
   };
@@ -150,7 +153,7 @@ addCommand({
   keys: ["Mod+a"],
   group: "select",
   when: ({ folder }) => folder,
-  run: () => browser.selection.all(browser.listing.total),
+  run: () => browser.selection.all(),
 });
 addCommand({
   id: "selectNone",

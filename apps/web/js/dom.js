@@ -126,3 +126,8 @@ export function announce(text) {
     live.textContent = text;
   });
 }
+
+// Lets the browser do what waits: for work that comes in slices.
+export function breathe() {
+  return globalThis.scheduler?.yield?.() ?? new Promise((resolve) => setTimeout(resolve));
+}

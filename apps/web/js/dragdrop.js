@@ -2,7 +2,7 @@
 
 import { browser, shareEntry } from "./browser.js";
 import { context } from "./commands.js";
-import { toastFailure } from "./dialogs.js";
+import { toast, toastFailure } from "./dialogs.js";
 import { $, h, icon, plainName } from "./dom.js";
 import { isInBin, isReadOnlyShare } from "./entries.js";
 import { iconOf } from "./icons.js";
@@ -14,6 +14,8 @@ import { t } from "./strings.js";
 import { fromDrop, holdsFiles } from "./upload_files.js";
 import { startUpload } from "./uploads.js";
 
+const MOST_AS_TEXT = 1000; // paths for other programs
+
 let veil = null;
 let marked = null;
 let depth = 0;
@@ -23,15 +25,16 @@ let dragged = null; // ids
 function begin(event) {
   const index = browser.view.indexOf(event.target);
   if (index < 0) return;
-  const { selection, listing, view } = browser;
+  const { selection, view } = browser;
   if (!selection.has(index)) selection.pick(index);
-  const entries = selection.ranges.list.flatMap(([first, last]) =>
-    Array.from({ length: last - first + 1 }, (_, i) => listing.item(first + i)),
-  );
-  // Rows that were never loaded cannot be dragged: the menu moves them.
-  if (entries.some((entry) => !entry)) return event.preventDefault();
+  if (selection.pending) {
+    toast({ text: t("chosen.wait"), kind: "failed" });
+    return event.preventDefault();
+  }
+  const entries = [...selection.chosen.values()];
   dragged = entries.map((entry) => entry.id);
-  event.dataTransfer.setData("text/plain", entries.map((entry) => decode(entry.id)).join("\n"));
+  const paths = entries.slice(0, MOST_AS_TEXT).map((entry) => decode(entry.id));
+  event.dataTransfer.setData("text/plain", paths.join("\n"));
   event.dataTransfer.effectAllowed = "copyMove";
   const ghost = h(
     "div.ghost",

@@ -111,7 +111,7 @@ async function jump(text, start) {
 async function searchSorted(listing, wanted, goesOn) {
   let low = 0;
   let high = listing.total;
-  const at = async (index) => (await listing.entries([[index, index]]))[0];
+  const at = (index) => listing.at(index);
   while (low < high && goesOn()) {
     const middle = (low + high) >> 1;
     const entry = await at(middle);

@@ -1,19 +1,19 @@
-// A long list that lies on the server: pages are fetched where somebody looks, and let go again when passed by.
+// A long list that lies on the server: pages are fetched where somebody looks, and kept until the list changes.
 //
-// A list is one part or several, one after the other (folders, then files). fetchPart(part, offset, limit, signal)
-// answers {total, items}.
+// A list is one part or several, one after the other (folders, then files). fetchPart(part, {offset, limit, brief,
+// signal}) answers {total, items}; brief items have a name and no properties. `longest`: how many come at once.
 
 import { isAbort } from "./api.js";
 
 const PAGE = 200;
 const AHEAD = 60;
-const AT_ONCE = 100; // pages of one request
 
 export class Listing {
-  constructor(parts, fetchPart, onChange) {
+  constructor(parts, fetchPart, onChange, longest = Infinity) {
     this.parts = parts.map((part) => ({ part, total: null, pages: new Map(), stale: null }));
     this.fetchPart = fetchPart;
     this.onChange = onChange;
+    this.longest = longest;
     this.requests = new Map();
     this.error = null;
     this.extra = null;
@@ -32,6 +32,23 @@ export class Listing {
     if (!place) return undefined;
     const page = Math.floor(place.offset / PAGE);
     return (place.one.pages.get(page) ?? place.one.stale?.get(page))?.[place.offset % PAGE];
+  }
+
+  // The row, once it has come; nothing when it does not.
+  async at(index) {
+    await Promise.all(this.pagesOf(index, index).map(({ one, page }) => this.load(this.keyOf(one, page))));
+    return this.item(index);
+  }
+
+  // The entries of the rows first..last when all of them are there, else nothing.
+  loaded(first, last) {
+    const entries = [];
+    for (let index = first; index <= last; ++index) {
+      const entry = this.item(index);
+      if (!entry) return null;
+      entries.push(entry);
+    }
+    return entries;
   }
 
   place(index) {
@@ -93,7 +110,7 @@ export class Listing {
 
   async fetchPage(one, page, signal) {
     try {
-      const reply = await this.fetchPart(one.part, page * PAGE, PAGE, signal);
+      const reply = await this.fetchPart(one.part, { offset: page * PAGE, limit: PAGE, signal });
       if (!signal.aborted) this.take(one, page, reply);
     } catch (failure) {
       if (isAbort(failure) || signal.aborted) return;
@@ -104,25 +121,28 @@ export class Listing {
 
   take(one, page, reply) {
     this.error = null;
-    // The folder has changed meanwhile: what was fetched before may have moved.
-    if (one.total !== null && one.total !== reply.total) {
-      one.stale = one.pages;
-      one.pages = new Map();
-    }
-    one.total = reply.total;
+    this.count(one, reply.total);
     one.pages.set(page, reply.items);
     this.extra = reply;
     this.onChange(this);
+  }
+
+  // The folder has changed meanwhile: what was fetched before may have moved.
+  count(one, total) {
+    if (one.total !== null && one.total !== total) {
+      one.stale = one.pages;
+      one.pages = new Map();
+    }
+    one.total = total;
   }
 
   // Fetches again what is in sight; until it comes, what is there stays.
   refresh(first, last) {
     this.cancel();
     for (const one of this.parts) {
-      one.stale = one.pages;
+      one.stale = new Map([...(one.stale ?? []), ...one.pages]);
       one.pages = new Map();
     }
-    this.error = null;
     return this.need(first, last);
   }
 
@@ -131,29 +151,53 @@ export class Listing {
     this.requests.clear();
   }
 
-  // The entries of index ranges [from, to], whether they were loaded or not.
-  async entries(ranges) {
-    const entries = [];
-    for (const [from, to] of ranges) {
-      await this.fill(from, to);
-      for (let i = from; i <= to; ++i) {
-        const entry = this.item(i);
-        if (entry) entries.push(entry);
-      }
+  // The rows first..last as they are on the server now, by name alone, whether they were loaded or not.
+  async names(first, last, signal) {
+    const found = [];
+    let start = 0;
+    for (const one of this.parts) {
+      const total = one.total ?? 0;
+      const from = Math.max(first, start) - start;
+      // To the end is to the end as it is now.
+      const to = last === Infinity ? Infinity : Math.min(last, start + total - 1) - start;
+      if (to >= from) found.push(await this.namesOf(one, from, to, signal));
+      start += total;
     }
-    return entries;
+    return found.flat();
   }
 
-  // A long request costs the server hardly more than a short one: pages that lie together come together.
-  async fill(from, to) {
-    const missing = this.pagesOf(from, to).filter(({ one, page }) => !one.pages.has(page));
-    while (missing.length > 0) {
-      const [{ one, page }] = missing;
-      const next = missing.findIndex((other, i) => i === AT_ONCE || other.one !== one || other.page !== page + i);
-      const count = missing.splice(0, next < 0 ? missing.length : next).length;
-      const { items } = await this.fetchPart(one.part, page * PAGE, count * PAGE);
-      for (let i = 0; i < count; ++i) one.pages.set(page + i, items.slice(i * PAGE, (i + 1) * PAGE));
+  async namesOf(one, from, to, signal) {
+    let found = [];
+    for (let offset = from; offset <= to; ) {
+      const most = Math.min(this.longest, to - offset + 1);
+      const limit = Number.isFinite(most) ? most : 0; // 0: everything
+      const reply = await this.fetchPart(one.part, { offset, limit, brief: true, signal });
+      if (one.total !== reply.total) {
+        this.count(one, reply.total);
+        this.onChange(this);
+      }
+      found = found.concat(reply.items);
+      offset += reply.items.length;
+      if (reply.items.length === 0 || offset >= reply.total) break;
     }
+    return found;
+  }
+
+  // The row of an entry that has been fetched since the last refresh; -1.
+  indexOf(id) {
+    let start = 0;
+    for (const one of this.parts) {
+      for (const [page, items] of one.pages) {
+        const at = items.findIndex((entry) => entry.id === id);
+        if (at >= 0) return start + page * PAGE + at;
+      }
+      start += one.total ?? 0;
+    }
+    return -1;
+  }
+
+  fresh() {
+    return this.parts.flatMap((one) => [...one.pages.values()].flat());
   }
 
   // The index of the first loaded entry that `test` accepts, from `start` on and round; -1.

@@ -1,6 +1,6 @@
-// What is done to files at once: new folder, rename, download, properties.
+// What is done to files at once: new folder, rename, properties.
 
-import { ApiError, post, PROGRAMS, readReply } from "./api.js";
+import { post } from "./api.js";
 import { browser, refresh, shareEntry } from "./browser.js";
 import { askText, dialog, toast, toastFailure } from "./dialogs.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
@@ -41,7 +41,7 @@ export async function makeFolder(folder) {
 export async function newFolder() {
   const folder = browser.id;
   const made = await makeFolder(folder);
-  if (made && browser.id === folder) await refresh([made]);
+  if (made && browser.id === folder) await refresh(made);
 }
 
 // The search on screen, whose results follow what is done to them.
@@ -72,35 +72,7 @@ export async function rename(entry) {
   });
   if (!renamed || renamed === entry.id) return;
   if (entry.isFolder) emit("folders-changed", { ids: [entry.parent] });
-  await refresh([renamed]);
-}
-
-// A file as it is; several, or a folder, as one zip. What goes wrong comes back as a reply in the frame.
-export function download(entries) {
-  if (entries.length === 0) return;
-  const frame = h("iframe", { name: `download-${Date.now()}`, hidden: true, title: "" });
-  const form = h("form", { method: "post", action: `${PROGRAMS}download`, target: frame.name, hidden: true });
-  for (const entry of entries) form.append(h("input", { type: "hidden", name: "path_raw", value: entry.id }));
-  if (entries.length > 1)
-    form.append(
-      h("input", { type: "hidden", name: "name", value: plainName(nameOf(parentOf(entries[0].id))) || "download" }),
-    );
-  document.body.append(frame, form);
-  frame.addEventListener("load", () => {
-    const text = frame.contentDocument?.body?.textContent;
-    if (text === "") return;
-    try {
-      // The browser's own page about a failure cannot be looked into.
-      if (text === undefined) throw new ApiError({ key: "page:unreachable" });
-      readReply(200, text);
-    } catch (failure) {
-      toastFailure(failure, entries[0].id);
-    }
-  });
-  form.submit();
-  form.remove();
-  setTimeout(() => frame.remove(), 600000);
-  if (entries.length > 1 || entries[0].isFolder) toast({ text: t("download.zip", { count: entries.length }) });
+  await refresh(renamed);
 }
 
 export function copyPath(id) {

@@ -80,7 +80,30 @@ export function ancestry(id) {
 }
 
 export function shareOf(id) {
-  return ancestry(id)[0] ?? "/";
+  return `/${id.split("/", 2)[1]}`;
+}
+
+const LONGEST_LIST = 900_000; // bytes in a form, below what the web server takes
+
+// Ids as the lines of "paths_raw", a folder said once; in several lists when a form cannot hold them all.
+export function pathLists(ids) {
+  const lists = [];
+  let room = 0;
+  let folder = null;
+  for (const id of ids) {
+    const escapes = id.split("%").length + 2; // in a form a "%" takes three bytes, and so does the end of a line
+    if (room < id.length + 2 * escapes) {
+      lists.push([]);
+      room = LONGEST_LIST;
+      folder = null;
+    }
+    const mine = parentOf(id);
+    const line = mine === folder ? lastOf(id) : id;
+    folder = mine;
+    room -= line.length + 2 * escapes;
+    lists.at(-1).push(line);
+  }
+  return lists;
 }
 
 // A name (encoded) as a pattern: a character that means something in one stands for any.

@@ -46,7 +46,7 @@ function clicked(event) {
   const sort = event.target.closest("[data-sort]");
   if (sort) return setSort(sort.dataset.sort);
   if (event.target.closest("[data-all]"))
-    return selection.count === listing.total ? selection.clear() : selection.all(listing.total);
+    return selection.count === listing.total ? selection.clear() : selection.all();
   const index = indexOf(event);
   if (index < 0) return selection.clear();
   const shift = event.shiftKey;

@@ -6,7 +6,7 @@ import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { formatSize, formatTime } from "./format.js";
 import { canShowImage, iconOf } from "./icons.js";
-import { download } from "./operations.js";
+import { download } from "./download.js";
 import { t } from "./strings.js";
 
 const TEXT_START = 256 * 1024;
@@ -35,6 +35,7 @@ export function preview(entry) {
     shown.abort.abort();
     node.remove();
     shown = null;
+    if (history.state?.preview) history.back();
   });
   node.addEventListener("click", (event) => {
     if (event.target === node || event.target === stage) node.close();
@@ -42,14 +43,22 @@ export function preview(entry) {
   node.addEventListener("keydown", (event) => {
     const by = { ArrowLeft: -1, ArrowRight: 1, ArrowUp: -1, ArrowDown: 1 }[event.key];
     if (by && !event.target.closest("pre, video, audio")) step(by);
-    if (event.key === " " && !event.target.closest("button, video, audio")) node.close();
+    if (event.key !== " " || event.target.closest("button, video, audio")) return;
+    event.preventDefault(); // or the same key would open it again
+    node.close();
   });
   shown = { node, title, stage, abort: new AbortController(), entry };
   fill(entry);
   document.body.append(node);
   node.showModal();
   node.focus();
+  // The way back leads out of the preview first.
+  history.pushState({ preview: true }, "");
 }
+
+addEventListener("popstate", (event) => {
+  if (!event.state?.preview) shown?.node.close();
+});
 
 // The next file of the list; the selection goes along.
 function step(by) {

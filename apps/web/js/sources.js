@@ -1,11 +1,24 @@
 // Where the rows of a list come from: a folder, or a search.
 
 import { ApiError, get, MISSING } from "./api.js";
+import { breathe } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { Listing } from "./listing.js";
 import { lastOf, parentOf, patternOf } from "./path.js";
 
 const ADDITIONAL = "size,time,owner,perm,mount_point_type,icon";
+const BRIEF = { additional: undefined };
+const LONGEST_PAGE = 10_000; // of search results
+const SLICE = 2000; // entries that are made at once: the page stays free in between
+
+async function entriesOf(items) {
+  const entries = [];
+  for (let i = 0; i < items.length; i += SLICE) {
+    if (i > 0) await breathe();
+    for (const item of items.slice(i, i + SLICE)) entries.push(entryOf(item));
+  }
+  return entries;
+}
 
 function orderOf({ by, ascending }) {
   return { sort_by: by, sort_direction: ascending ? "asc" : "desc" };
@@ -16,9 +29,9 @@ export function folderListing(id, { sort, filter }, onChange) {
   const parts = sort.ascending ? ["all"] : ["dir", "file"];
   const pattern = filter === "" ? undefined : `*${filter.replace(/[,\\]/g, "?")}*`;
   const asked = { action: "folder", path_raw: id, pattern, additional: ADDITIONAL, ...orderOf(sort) };
-  const fetchPart = async (filetype, offset, limit, signal) => {
-    const reply = await get("list", { ...asked, filetype, offset, limit }, signal);
-    return { total: reply.total, items: reply.items.map(entryOf) };
+  const fetchPart = async (filetype, { offset, limit, brief, signal }) => {
+    const reply = await get("list", { ...asked, filetype, offset, limit, ...(brief && BRIEF) }, signal);
+    return { total: reply.total, items: await entriesOf(reply.items) };
   };
   return new Listing(parts, fetchPart, onChange);
 }
@@ -26,13 +39,14 @@ export function folderListing(id, { sort, filter }, onChange) {
 // What a search has found so far; `extra` of the listing tells whether it goes on.
 export function searchResults(taskid, { sort, filter, kind }, onChange) {
   const asked = { action: "list", taskid, filter: filter || undefined, additional: ADDITIONAL, ...orderOf(sort) };
-  const fetchPart = async (filetype, offset, limit, signal) => {
-    const reply = await get("search", { ...asked, filetype, offset, limit }, signal).catch((failure) => {
+  const fetchPart = async (filetype, { offset, limit, brief, signal }) => {
+    const page = { ...asked, filetype, offset, limit: limit || LONGEST_PAGE, ...(brief && BRIEF) };
+    const reply = await get("search", page, signal).catch((failure) => {
       throw failure.code === MISSING ? new ApiError({ key: "page:search_gone" }) : failure;
     });
-    return { ...reply, items: reply.items.map(entryOf) };
+    return { ...reply, items: await entriesOf(reply.items) };
   };
-  return new Listing([kind], fetchPart, onChange);
+  return new Listing([kind], fetchPart, onChange, LONGEST_PAGE);
 }
 
 // One entry of a folder; nothing when there is none.

@@ -9,12 +9,11 @@ import { plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { emit } from "./events.js";
 import { formatSize } from "./format.js";
-import { parentOf } from "./path.js";
+import { parentOf, pathLists } from "./path.js";
 import { searchTask } from "./operations.js";
 import { t } from "./strings.js";
 
 const POLL = 600;
-const LONGEST_FORM = 900_000; // bytes of a request, below what the web server takes
 const ICONS = {
   copy: "copy",
   move: "move",
@@ -39,33 +38,17 @@ export async function setupTasks() {
 
 // Starts `action` on the paths (ids). `affected`: folders whose content it changes.
 export async function startTask(action, ids, params, affected) {
-  for (const some of chunks(ids)) {
+  const folders = new Set([...affected, ...ids.map(parentOf)]);
+  for (const lines of pathLists(ids)) {
     try {
-      const { taskid } = await post("operation", { action, path_raw: some, ...params, taskid: searchTask() });
-      show({ taskid, action, state: "running", items_total: some.length, items_done: 0, progress: 0 }, [
-        ...affected,
-        ...new Set(some.map(parentOf)),
-      ]);
+      const { taskid } = await post("operation", { action, paths_raw: lines.join("\n"), ...params, taskid: searchTask() });
+      show({ taskid, action, state: "running", items_total: lines.length, items_done: 0, progress: 0 }, [...folders]);
     } catch (failure) {
-      toastFailure(failure, some[0]);
+      toastFailure(failure, ids[0]);
       return false;
     }
   }
   return true;
-}
-
-function chunks(ids) {
-  const lists = [[]];
-  let bytes = 0;
-  for (const id of ids) {
-    bytes += id.length * 1.6 + 10; // "%" is escaped once more
-    if (bytes > LONGEST_FORM) {
-      lists.push([]);
-      bytes = 0;
-    }
-    lists.at(-1).push(id);
-  }
-  return lists.filter((list) => list.length > 0);
 }
 
 function show(task, affected) {

@@ -1,6 +1,7 @@
 // The bar above the list: what can be done here, or with what is chosen.
 
 import { browser, setKind } from "./browser.js";
+import { heldItems } from "./clipboard.js";
 import { command, context, runCommand, shortcutText } from "./commands.js";
 import { $, h, icon, iconButton, keepFocus } from "./dom.js";
 import { on } from "./events.js";
@@ -96,6 +97,7 @@ function paintToolbar(setSort) {
     browser.sort.by,
     now.folder,
     now.canWrite,
+    heldItems() !== null,
     now.inBin,
     now.count > 0,
     now.count === 1,
@@ -210,15 +212,12 @@ function paintStatus(now) {
 }
 
 function sizeOfChosen() {
-  const { listing, selection } = browser;
-  if (selection.count > 2000) return "";
+  const { selection } = browser;
+  if (selection.pending) return "";
   let sum = 0;
-  for (const [first, last] of selection.ranges.list) {
-    for (let i = first; i <= last; ++i) {
-      const entry = listing.item(i);
-      if (!entry || entry.isFolder) return "";
-      sum += entry.size ?? 0;
-    }
+  for (const { size } of selection.chosen.values()) {
+    if (size === null) return "";
+    sum += size;
   }
   return formatSize(sum);
 }

@@ -1,11 +1,11 @@
 // Copying, moving, deleting, packing: what the user says, as tasks.
 
 import { browser, selectedEntries } from "./browser.js";
+import { heldItems, hold, letGo } from "./clipboard.js";
 import { addCommand } from "./commands.js";
 import { askConflict, takenNames } from "./conflicts.js";
 import { askText, confirm, dismissToasts, toast, toastFailure } from "./dialogs.js";
 import { isInBin, isRecycleBin } from "./entries.js";
-import { emit } from "./events.js";
 import { checkName } from "./operations.js";
 import { childOf, encodeName, isWithin, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
 import { pickFolder } from "./picker.js";
@@ -16,22 +16,26 @@ import { t } from "./strings.js";
 const ARCHIVE = /\.(zip|tar|tar\.gz|tgz|tar\.bz2|tbz2?|tar\.xz|txz)$/i;
 const EXISTS = { skip: "skip", overwrite: "overwrite", both: "keep_both" };
 
-let held = null; // {ids, cut}
-
-// Copies or moves ids into a folder; what stands in the way is asked about before anything happens.
+// Copies or moves ids into a folder; what stands in the way is asked about before anything happens. Whether it began.
 export async function transfer(action, ids, target) {
   const into = ids.find((id) => isWithin(target, id));
-  if (into) return toastFailure({ code: 1005, key: "error:error_select_conflict", path: `/${nameOf(into)}` });
+  if (into) {
+    toastFailure({ code: 1005, key: "error:error_select_conflict", path: `/${nameOf(into)}` });
+    return false;
+  }
   const moving = action === "move" ? ids.filter((id) => parentOf(id) !== target) : ids;
-  if (moving.length === 0) return undefined;
+  if (moving.length === 0) return false;
   try {
     const beside = action === "copy" && moving.every((id) => parentOf(id) === target);
     const conflict = beside ? "keep_both" : await conflictFor(target, moving);
-    if (conflict) await startTask(action, moving, { target_raw: target, conflict }, [target]);
+    if (!conflict) return false;
+    const begun = await startTask(action, moving, { target_raw: target, conflict }, [target]);
+    if (begun && action === "move") browser.selection.remove(moving); // they leave, and are known to
+    return begun;
   } catch (failure) {
     toastFailure(failure, target);
+    return false;
   }
-  return undefined;
 }
 
 async function conflictFor(target, ids) {
@@ -42,8 +46,14 @@ async function conflictFor(target, ids) {
   return said ? EXISTS[said.answer] : null;
 }
 
+// Nothing when the names of what was chosen could not be had: that has been said.
+async function chosenIds() {
+  return (await selectedEntries()).map((entry) => entry.id);
+}
+
 async function to(action) {
-  const ids = (await selectedEntries()).map((entry) => entry.id);
+  const ids = await chosenIds();
+  if (ids.length === 0) return;
   const target = await pickFolder({
     title: t(`${action}.title`, { count: ids.length }),
     action: t(`${action}.action`),
@@ -52,17 +62,18 @@ async function to(action) {
   if (target) transfer(action, ids, target);
 }
 
-async function hold(cut) {
-  held = { ids: (await selectedEntries()).map((entry) => entry.id), cut };
-  toast({ text: t(cut ? "held.cut" : "held.copy", { count: held.ids.length }) });
-  emit("selection");
+async function take(cut) {
+  const ids = await chosenIds();
+  if (ids.length === 0) return;
+  hold(ids, cut);
+  toast({ text: t(cut ? "held.cut" : "held.copy", { count: ids.length }) });
 }
 
 async function paste() {
-  const { ids, cut } = held;
-  if (cut) held = null;
+  const { ids, cut } = heldItems();
   dismissToasts();
-  await transfer(cut ? "move" : "copy", ids, browser.id);
+  const begun = await transfer(cut ? "move" : "copy", [...ids], browser.id);
+  if (begun && cut) letGo();
 }
 
 const bins = new Map(); // share -> whether it has a recycle bin
@@ -83,6 +94,7 @@ async function hasBin(share) {
 async function remove(forGood) {
   const entries = await selectedEntries();
   const ids = entries.map((entry) => entry.id);
+  if (ids.length === 0) return;
   const inBin = ids.every(isInBin);
   const kept = !forGood && !inBin && (await Promise.all([...new Set(ids.map(shareOf))].map(hasBin))).every(Boolean);
   const what = { count: ids.length, name: entries.length === 1 ? entries[0].name : "" };
@@ -106,7 +118,8 @@ async function remove(forGood) {
 }
 
 async function restore() {
-  const ids = (await selectedEntries()).map((entry) => entry.id);
+  const ids = await chosenIds();
+  if (ids.length === 0) return;
   browser.selection.clear();
   await startTask("restore", ids, { conflict: "keep_both" }, [shareOf(ids[0])]);
 }
@@ -118,7 +131,8 @@ async function emptyBin() {
 }
 
 async function compress() {
-  const ids = (await selectedEntries()).map((entry) => entry.id);
+  const ids = await chosenIds();
+  if (ids.length === 0) return;
   const folder = parentOf(ids[0]);
   const stem = ids.length === 1 ? splitExtension(nameOf(ids[0]))[0] : nameOf(folder);
   const name = await askText({
@@ -143,14 +157,14 @@ async function extract({ single }) {
 
 const chosen = ({ count }) => count > 0;
 const changeable = ({ canChange, inBin }) => canChange && !inBin;
-addCommand({ id: "cut", icon: "cut", keys: ["Mod+x"], group: "change", when: changeable, run: () => hold(true) });
-addCommand({ id: "copy", icon: "copy", keys: ["Mod+c"], group: "change", when: chosen, run: () => hold(false) });
+addCommand({ id: "cut", icon: "cut", keys: ["Mod+x"], group: "change", when: changeable, run: () => take(true) });
+addCommand({ id: "copy", icon: "copy", keys: ["Mod+c"], group: "change", when: chosen, run: () => take(false) });
 addCommand({
   id: "paste",
   icon: "paste",
   keys: ["Mod+v"],
   group: "change",
-  when: ({ canWrite, inBin }) => held !== null && canWrite && !inBin,
+  when: ({ canWrite, inBin }) => heldItems() !== null && canWrite && !inBin,
   run: paste,
 });
 addCommand({ id: "copyTo", icon: "copy", group: "change", when: chosen, run: () => to("copy") });

@@ -1,5 +1,6 @@
 // The rows (or tiles) of a long list: only those in sight are in the document.
 
+import { isCut } from "./clipboard.js";
 import { h, keepFocus, set } from "./dom.js";
 import { makeRow, fillRow, makeHeader } from "./rows.js";
 
@@ -117,6 +118,7 @@ export class View {
         row.setAttribute("aria-selected", String(chosen));
       }
       row.classList.toggle("cursor", cursor);
+      row.classList.toggle("cut", row.entry !== undefined && isCut(row.entry.id));
       row.classList.toggle("above-selected", chosen && this.selection.has(index + 1));
       row.classList.toggle("below-selected", chosen && this.selection.has(index - 1));
     }

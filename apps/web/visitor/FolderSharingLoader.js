@@ -172,6 +172,8 @@
 
   document.addEventListener("DOMContentLoaded", () => {
     document.documentElement.lang = g_Lang;
+    // The page itself does not say that its layout follows the width of a phone.
+    document.head.append(make("meta", { name: "viewport", content: "width=device-width, initial-scale=1" }));
     view = make("main", {});
     const mark = make("img", { src: g_Tunnel + "/favicon.svg", alt: "", width: "26", height: "26" });
     document.body.append(make("div", { class: "brand" }, mark, "Orvel"), view);

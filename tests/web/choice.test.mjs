@@ -1,0 +1,139 @@
+// What is chosen is what is done, whatever others do meanwhile and however many it is.
+import assert from "node:assert/strict";
+import { existsSync, mkdirSync, readdirSync, renameSync, rmSync, writeFileSync } from "node:fs";
+import { after, before, beforeEach, test } from "node:test";
+import { launch, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+
+const folder = `${process.env.ORVEL_TEST_PROJECTS}/chosen`;
+const MANY = 1500; // of which the middle is never on screen
+let chrome;
+
+before(async () => {
+  chrome = await launch();
+});
+after(() => chrome.close());
+beforeEach(() => {
+  rmSync(folder, { recursive: true, force: true });
+  mkdirSync(folder, { mode: 0o777 });
+  for (let i = 0; i < MANY; ++i) writeFileSync(`${folder}/${nameOf(i)}`, "x".repeat(i % 7), { mode: 0o666 });
+});
+
+const nameOf = (i) => `item-${String(i).padStart(5, "0")}.dat`;
+const chosenCount = (page, count) => page.waitForSelector(`#status >> text=${count.toLocaleString("en-GB")} selected`);
+
+// From one row to another, with only their surroundings ever fetched.
+async function chooseRange(page, from, to) {
+  await row(page, nameOf(from)).click();
+  await page.evaluate(
+    ([index, total]) => {
+      const view = document.getElementById("view");
+      view.scrollTop = (view.scrollHeight * index) / total - 200;
+    },
+    [to, MANY],
+  );
+  await row(page, nameOf(to)).click({ modifiers: ["Shift"] });
+  await chosenCount(page, to - from + 1);
+}
+
+async function deleteForGood(page) {
+  await page.keyboard.press("Shift+Delete");
+  await page.click(".dialog .button.danger");
+  await page.waitForSelector(".activity-card.good >> text=Delete");
+}
+
+test("deletes what was chosen, though others renamed and added", () =>
+  withPage(chrome, "admin", { path: "/projects/chosen" }, async (page) => {
+    await chooseRange(page, 2, 1299);
+    renameSync(`${folder}/${nameOf(5)}`, `${folder}/a first one.dat`); // as many as before, each row one further down
+    renameSync(`${folder}/${nameOf(900)}`, `${folder}/zz last.dat`);
+    writeFileSync(`${folder}/item-00700 new.dat`, "");
+    await page.keyboard.press("Alt+r");
+    await page.waitForSelector(".toast >> text=2 selected items are no longer here");
+    await chosenCount(page, 1296);
+    await screenshot(page, "chosen-gone");
+    await deleteForGood(page);
+    const left = [0, 1, ...Array.from({ length: 200 }, (_, i) => 1300 + i)].map(nameOf);
+    assert.deepEqual(readdirSync(folder).sort(), [...left, "a first one.dat", "item-00700 new.dat", "zz last.dat"].sort());
+  }));
+
+test("a range and everything, chosen of a list that has changed since it was shown", () =>
+  withPage(chrome, "admin", { path: "/projects/chosen" }, async (page) => {
+    await row(page, nameOf(3)).click();
+    renameSync(`${folder}/${nameOf(600)}`, `${folder}/before all.dat`); // the list on screen is older
+    await page.keyboard.press("Shift+End");
+    await chosenCount(page, MANY - 4); // all but the first three and what lies before them now
+    await page.keyboard.press("Escape");
+    await page.keyboard.press("Control+a");
+    await chosenCount(page, MANY);
+    writeFileSync(`${folder}/came later.dat`, "");
+    await deleteForGood(page);
+    assert.deepEqual(readdirSync(folder), ["came later.dat"]);
+  }));
+
+test("sorting keeps a choice, a filter says what it takes away, a failure chooses nothing", () =>
+  withPage(
+    chrome,
+    "admin",
+    { path: "/projects/chosen" },
+    async (page) => {
+      for (const i of [1, 2, 11]) await row(page, nameOf(i)).click({ modifiers: ["Control"] });
+      await page.click("[data-sort=size]");
+      await page.click("[data-sort=size]");
+      await page.waitForSelector("[aria-sort=descending] [data-sort=size]");
+      await rowsReady(page);
+      await chosenCount(page, 3);
+      await page.fill("#find", "item-0001");
+      await page.waitForSelector(".toast >> text=2 selected items are hidden by the filter");
+      await page.waitForSelector("#view .row.selected >> text=item-00011.dat");
+      await chosenCount(page, 1);
+      await page.fill("#find", "");
+      await page.waitForSelector("#status >> text=1,500 items");
+      await chosenCount(page, 1);
+      await page.route(
+        (url) => url.searchParams.get("limit") === "0" && !url.searchParams.has("additional"),
+        (route) => route.abort("connectionrefused"),
+      );
+      await page.focus("#view");
+      await page.keyboard.press("Control+a");
+      await page.waitForSelector(".toast.failed >> text=The server does not answer");
+      await page.waitForFunction(() => !document.querySelector("#status").textContent.includes("selected"));
+      assert.equal(await page.locator("#toolbar [data-command=delete]").count(), 0);
+    },
+    [/ERR_CONNECTION_REFUSED/],
+  ));
+
+test("many are downloaded as one field, and what the web server refuses says so", () =>
+  withPage(
+    chrome,
+    "alice",
+    { path: "/warehouse" },
+    async (page) => {
+      await page.evaluate(() => {
+        HTMLFormElement.prototype.submit = function () {
+          globalThis.sent = [...new FormData(this)];
+        };
+      });
+      await page.press("#view", "Control+a");
+      await chosenCount(page, 20_000);
+      await page.click("#toolbar >> text=Download");
+      const sent = await (await page.waitForFunction(() => globalThis.sent)).jsonValue();
+      assert.deepEqual(
+        sent.map(([name]) => name),
+        ["paths_raw", "name"],
+      );
+      const lines = sent[0][1].split(/\r?\n/);
+      assert.deepEqual([lines.length, lines[0], lines[19_999]], [20_000, "/warehouse/item-00000.dat", "item-19999.dat"]);
+      await page.reload();
+      for (const [status, words] of [
+        [413, "more than the server takes at once"],
+        [502, "status 502"],
+      ]) {
+        await page.route("**/cgi-bin/download", (route) => route.fulfill({ status, body: `${status}, of the web server` }));
+        await row(page, nameOf(1)).click();
+        await page.click("#toolbar >> text=Download");
+        await page.waitForSelector(`.toast >> text=${words}`);
+        await page.unroute("**/cgi-bin/download");
+      }
+    },
+    [/status of (413|502)/, /^status (413|502)/],
+  ));
