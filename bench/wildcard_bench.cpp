@@ -6,7 +6,7 @@
 #include <string>
 
 #include "../src/util/wildcard.cpp"  // the matcher itself is not exported
-#include "../tests/util/wildcard_model.h"
+#include "../tests/base/wildcard_model.h"
 #include "contest.h"
 #include "orvel/text.h"
 

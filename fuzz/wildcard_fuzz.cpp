@@ -4,8 +4,8 @@
 #include <cstdlib>
 #include <string>
 
-#include "../tests/util/wildcard_model.h"
-#include "util/wildcard.h"
+#include "../tests/base/wildcard_model.h"
+#include "base/wildcard.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     if (size < 2) return 0;

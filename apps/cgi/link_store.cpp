@@ -3,7 +3,6 @@
 #include <crypt.h>
 #include <fcntl.h>
 #include <sqlite3.h>
-#include <sys/random.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -14,7 +13,10 @@
 #include <memory>
 #include <system_error>
 
-#include "descriptor.h"
+#include "base/descriptor.h"
+#include "base/owner.h"
+#include "base/raised_identity.h"
+#include "base/random.h"
 #include "orvel/external_host.h"
 #include "vexo/system_root.h"
 #include "vexo/user.h"
@@ -27,7 +29,7 @@ namespace {
 constexpr const char* kFile = "/usr/vexo/etc/pexlander/pxsharing.db";
 constexpr const char* kProgram = "/cgi-bin/share?FOLDER_SHARING=";
 constexpr int kBusyMilliseconds = 4000;
-constexpr size_t kIdBytes = 16;
+constexpr size_t kIdBytes = 16;  // their digits are a name for a cookie and a field of a record
 
 // The library reads the first seven columns by these names.
 constexpr const char* kTable =
@@ -35,25 +37,6 @@ constexpr const char* kTable =
     "NULL, filename TEXT NOT NULL, password TEXT NOT NULL, AvailDate TEXT NOT NULL, ExpDate TEXT NOT NULL, owner TEXT "
     "NOT NULL, created TEXT NOT NULL)";
 constexpr const char* kColumns = "SELECT linkID, owner, uid, filepath, password, AvailDate, ExpDate, created";
-
-// The effective ids of root for one operation, in a process that switched to a user and can go back.
-class AsRoot {
- public:
-    AsRoot() : uid_(geteuid()), gid_(getegid()) {
-        if (uid_ != 0) raised_ = seteuid(0) == 0 && setegid(0) == 0;
-    }
-    ~AsRoot() {
-        // To go on as root with a user's request would be worse than to stop.
-        if (raised_ && (setegid(gid_) != 0 || seteuid(uid_) != 0)) abort();
-    }
-    AsRoot(const AsRoot&) = delete;
-    AsRoot& operator=(const AsRoot&) = delete;
-
- private:
-    uid_t uid_;
-    gid_t gid_;
-    bool raised_ = false;
-};
 
 struct Finalize {
     void operator()(sqlite3_stmt* statement) const { sqlite3_finalize(statement); }
@@ -91,16 +74,6 @@ Link linkOf(const Statement& row) {
             .created = number(row, 7)};
 }
 
-// 128 random bits as hexadecimal digits: a name for a cookie and a field of a record; "" when there are none.
-std::string drawId() {
-    static constexpr char digits[] = "0123456789abcdef";
-    unsigned char bytes[kIdBytes];
-    std::string id;
-    if (getrandom(bytes, sizeof bytes, 0) != static_cast<ssize_t>(sizeof bytes)) return id;
-    for (const unsigned char byte : bytes) id += {digits[byte >> 4], digits[byte & 15]};
-    return id;
-}
-
 // Makes the file, with its folder, before SQLite would make it for everybody to read.
 bool makeFile(const std::string& path) {
     std::error_code ignored;
@@ -114,7 +87,7 @@ bool makeFile(const std::string& path) {
 LinkStore::LinkStore() = default;
 
 LinkStore::~LinkStore() {
-    const AsRoot root;
+    const RaisedIdentity root;
     sqlite3_close(database_);
 }
 
@@ -136,9 +109,9 @@ bool LinkStore::open(bool make) {
 }
 
 bool LinkStore::add(Link& link) {
-    const AsRoot root;
+    const RaisedIdentity root;
     if (!open(true)) return false;
-    link.id = drawId();
+    link.id = draw<kIdBytes>();
     link.created = time(nullptr);
     if (link.id.empty()) return fail();
     const Statement insert =
@@ -152,7 +125,7 @@ bool LinkStore::add(Link& link) {
 }
 
 bool LinkStore::query(const char* condition, const std::string& value, std::vector<Link>& links) {
-    const AsRoot root;
+    const RaisedIdentity root;
     // No link was ever made.
     if (access(VEXO::SystemPath(kFile).c_str(), F_OK) != 0 && errno == ENOENT) return true;
     if (!open(false)) return false;
@@ -181,7 +154,7 @@ bool LinkStore::remove(const std::string& id, const std::string& owner, bool& re
     if (!find(id, link)) return false;
     removed = link && (owner.empty() || link->owner == owner);
     if (!removed) return true;
-    const AsRoot root;
+    const RaisedIdentity root;
     const Statement statement = prepare(database_, "DELETE FROM sharingLinks WHERE linkID = ?", {id});
     return (statement != nullptr && sqlite3_step(statement.get()) == SQLITE_DONE) || fail();
 }
@@ -203,11 +176,9 @@ bool passwordMatches(const std::string& password, const std::string& hash) {
 }
 
 bool ownerIsThere(const Link& link) {
-    VEXOUSER* found = nullptr;
-    if (VEXOUserGet(link.owner.c_str(), &found) < 0) return false;
-    const bool there = found->uid == link.uid && VEXOUserIsExpired(found->expiry) != 1;
-    VEXOUserFree(found);
-    return there;
+    std::unique_ptr<VEXOUSER, Releaser<VEXOUserFree>> found;
+    return VEXOUserGet(link.owner.c_str(), acquire(found)) >= 0 && found->uid == link.uid &&
+           VEXOUserIsExpired(found->expiry) != 1;
 }
 
 std::string linkAddress(const std::string& id) {

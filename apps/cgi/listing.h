@@ -6,7 +6,7 @@
 #include <string>
 #include <string_view>
 
-#include "descriptor.h"
+#include "base/descriptor.h"
 #include "orvel/dir_entry.h"
 #include "output.h"
 

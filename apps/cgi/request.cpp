@@ -7,6 +7,7 @@
 #include <cstdlib>
 #include <memory>
 
+#include "base/owner.h"
 #include "orvel/error_state.h"
 #include "orvel/identity.h"
 #include "orvel/share_path.h"
@@ -34,15 +35,10 @@ bool isTrustedProxy(const std::string& address) {
     return false;
 }
 
-struct FreeUser {
-    void operator()(VEXOUSER* user) const { VEXOUserFree(user); }
-};
-
 // What goes wrong here shows again, with its code, when the path is resolved.
 void makeHome(const std::string& user) {
-    VEXOUSER* found = nullptr;
-    if (VEXOUserGet(user.c_str(), &found) < 0) return;
-    const std::unique_ptr<VEXOUSER, FreeUser> record(found);
+    std::unique_ptr<VEXOUSER, Releaser<VEXOUserFree>> record;
+    if (VEXOUserGet(user.c_str(), acquire(record)) < 0) return;
     std::string home;
     if (VEXOServiceUserHomeIsEnabled(record->authType, record->uid) == 1) OrvUserHomeFullPathGet(home, user);
 }

@@ -8,7 +8,7 @@
 #include <csignal>
 #include <ctime>
 
-#include "descriptor.h"
+#include "base/descriptor.h"
 #include "orvel/error_state.h"
 
 namespace orvel::cgi {

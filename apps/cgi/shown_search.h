@@ -4,7 +4,7 @@
 
 #include <string>
 
-#include "descriptor.h"
+#include "base/descriptor.h"
 #include "orvel/file_info.h"
 #include "search_task.h"
 

@@ -5,8 +5,8 @@
 #include <string>
 #include <vector>
 
+#include "base/descriptor.h"
 #include "confined.h"
-#include "descriptor.h"
 #include "orvel/file_info.h"
 
 namespace orvel::cgi {

@@ -2,10 +2,12 @@
 #include <sys/file.h>
 
 #include <cstdio>
+#include <memory>
 
 #include "arguments.h"
+#include "base/descriptor.h"
+#include "base/owner.h"
 #include "command.h"
-#include "descriptor.h"
 #include "orvel/sharing_settings.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"
@@ -28,18 +30,17 @@ int list() {
     VLIBCFileGetKeyValue(kSettings, kChoice, choice, sizeof choice, 0);
     printf("%-12s %s\n", "setting", choice[0] == '\0' ? "everybody" : choice);
     for (const auto& [uid, chosen] : OrvelSharing::SharingManager().getPrivileges()) {
-        VEXOUSER* record = nullptr;
-        const bool known = VEXOUserGetByUID(uid, &record) >= 0;
+        std::unique_ptr<VEXOUSER, Releaser<VEXOUserFree>> record;
+        const bool known = VEXOUserGetByUID(uid, acquire(record)) >= 0;
         printf("%-12s %s\n", known ? terminalText(record->szName).c_str() : std::to_string(uid).c_str(),
                chosen ? "chosen" : "not chosen");
-        VEXOUserFree(record);
     }
     return 0;
 }
 
 // For everybody: the setting of the appliance, locked as every change of it is.
 int setForAll(const std::string& choice) {
-    const cgi::Descriptor file(open(VEXO::SystemPath(kSettings).c_str(), O_RDWR | O_CLOEXEC | O_NOFOLLOW));
+    const Descriptor file(open(VEXO::SystemPath(kSettings).c_str(), O_RDWR | O_CLOEXEC | O_NOFOLLOW));
     if (file) flock(file.get(), LOCK_EX);
     const int done = choice == "everybody" ? VLIBCFileRemoveKey(kSettings, kChoice)
                                            : VLIBCFileSetKeyValue(kSettings, kChoice, choice.c_str(), nullptr);

@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <string_view>
 
+#include "base/hex.h"
 #include "command.h"
 #include "orvel/error_state.h"
 #include "request.h"
@@ -41,7 +42,6 @@ int refused(std::string_view path, int code) {
 }
 
 std::string terminalText(std::string_view bytes) {
-    static constexpr char digits[] = "0123456789ABCDEF";
     std::string out;
     for (const char c : cgi::readable(bytes)) {
         out += c;
@@ -50,8 +50,8 @@ std::string terminalText(std::string_view bytes) {
         const std::string hidden = out.substr(out.size() - length);
         out.resize(out.size() - length);
         for (const char part : hidden) {
-            const auto byte = static_cast<unsigned char>(part);
-            out += {'\\', 'x', digits[byte >> 4], digits[byte & 15]};
+            out += "\\x";
+            appendHex(part, out, kUpperHex);
         }
     }
     return out;

@@ -5,10 +5,10 @@
 #include <exception>
 #include <string>
 
+#include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "io/file_io.h"
-#include "raise.h"
 #include "transfer_entry.h"
 #include "vexo/filesystem.h"
 #include "vexo/system_root.h"
@@ -16,7 +16,7 @@
 
 namespace {
 
-using vexo::Descriptor;
+using orvel::Descriptor;
 
 constexpr const char* kFolder = "/var/log/vexo";
 constexpr const char* kFile = "/var/log/vexo/xfer.log";
@@ -71,7 +71,7 @@ int VEXOLogKTRFMXferLog(const char* address, const char* user, const char* actio
     }
     const int before = errno;
     const std::string line = vexo::buildTransferEntry({time(nullptr), address, user, action, size, path, flag});
-    const vexo::RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     const Descriptor log = openLog();
     if (!log || !isOurs(log.get()) || !append(log.get(), line)) return vexo::fail(vexo::errorOfErrno(errno));
     errno = before;

@@ -6,12 +6,12 @@
 #include <cerrno>
 #include <cstring>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/owned.h"
 #include "core/privilege_decision.h"
 #include "orvel/error_state.h"
 #include "orvel/privilege.h"
-#include "util/printable.h"
 #include "vexo/acl.h"
 #include "vexo/error.h"
 

@@ -6,12 +6,12 @@
 #include <string>
 #include <string_view>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/owned.h"
 #include "core/user_kind.h"
 #include "orvel/error_state.h"
 #include "orvel/share_path.h"
-#include "util/printable.h"
 #include "vexo/filesystem.h"
 #include "vexo/share.h"
 #include "vexo/user.h"

@@ -8,10 +8,10 @@
 #include <cerrno>
 #include <cstring>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/identity_state.h"
 #include "orvel/error_state.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 #include "vexo/filesystem.h"
 #include "vexo/session.h"

@@ -6,10 +6,10 @@
 #include <cstring>
 #include <string_view>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/fat_name.h"
 #include "orvel/error_state.h"
-#include "util/printable.h"
 #include "vexo/filesystem.h"
 
 namespace orvel {

@@ -4,12 +4,12 @@
 
 #include <dirent.h>
 #include <sqlite3.h>
-#include <unistd.h>
 
 #include <cstdlib>
 #include <memory>
-#include <utility>
 
+#include "base/descriptor.h"
+#include "base/owner.h"
 #include "vexo/database.h"
 #include "vexo/language.h"
 #include "vexo/list.h"
@@ -17,14 +17,6 @@
 #include "vexo/user.h"
 
 namespace orvel {
-
-template <auto release>
-struct Releaser {
-    template <class Record>
-    void operator()(Record* record) const {
-        release(record);
-    }
-};
 
 using ShareRecord = std::unique_ptr<VEXOSHARE, Releaser<VEXOShareFree>>;
 using ShareDatabase = std::unique_ptr<VEXOSHAREDB, Releaser<VEXOShareDBClose>>;
@@ -41,56 +33,6 @@ using DatabaseResult = std::unique_ptr<VEXODBRESULT, Releaser<VEXODBFreeResult>>
 using SqlText = std::unique_ptr<char, Releaser<sqlite3_free>>;
 using CString = std::unique_ptr<char, Releaser<std::free>>;
 using Directory = std::unique_ptr<DIR, Releaser<closedir>>;
-
-class Descriptor {
- public:
-    explicit Descriptor(int fd = -1) : fd_(fd) {}
-    ~Descriptor() { reset(); }
-    Descriptor(Descriptor&& other) noexcept : fd_(std::exchange(other.fd_, -1)) {}
-    Descriptor& operator=(Descriptor&& other) noexcept {
-        if (this != &other) {
-            reset();
-            fd_ = std::exchange(other.fd_, -1);
-        }
-        return *this;
-    }
-    [[nodiscard]] int get() const { return fd_; }
-    [[nodiscard]] int release() { return std::exchange(fd_, -1); }
-    explicit operator bool() const { return fd_ >= 0; }
-    void reset() {
-        if (fd_ >= 0) close(fd_);
-        fd_ = -1;
-    }
-
- private:
-    int fd_;
-};
-
-// Passes an owner to an acquiring function that fills a plain pointer: `VEXOShareGet(name, acquire(share))`.
-template <class Owner>
-class Acquire {
- public:
-    explicit Acquire(Owner& owner, typename Owner::pointer record = nullptr) : owner_(owner), record_(record) {}
-    ~Acquire() { owner_.reset(record_); }
-    Acquire(const Acquire&) = delete;
-    Acquire& operator=(const Acquire&) = delete;
-    operator typename Owner::pointer *() { return &record_; }
-
- private:
-    Owner& owner_;
-    typename Owner::pointer record_;
-};
-
-template <class Owner>
-Acquire<Owner> acquire(Owner& owner) {
-    return Acquire<Owner>(owner);
-}
-
-// Passes an owner to a function that changes the record in place and may move it: `VLIBCSzListPush(lend(list), text)`.
-template <class Owner>
-Acquire<Owner> lend(Owner& owner) {
-    return Acquire<Owner>(owner, owner.release());
-}
 
 }  // namespace orvel
 

@@ -7,12 +7,12 @@
 #include <string>
 #include <string_view>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/fat_name.h"
 #include "orvel/error_state.h"
 #include "orvel/name_check.h"
 #include "orvel/privilege.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 #include "vexo/filesystem.h"
 

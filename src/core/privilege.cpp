@@ -2,10 +2,10 @@
 
 #include <syslog.h>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/privilege_facts.h"
 #include "orvel/error_state.h"
-#include "util/printable.h"
 
 namespace orvel {
 namespace {

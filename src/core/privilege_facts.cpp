@@ -2,11 +2,11 @@
 
 #include <syslog.h>
 
+#include "base/printable.h"
 #include "core/owned.h"
 #include "core/path_component.h"
 #include "core/user_kind.h"
 #include "orvel/error_state.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 #include "vexo/user.h"
 

@@ -2,13 +2,13 @@
 #include <syslog.h>
 #include <unistd.h>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/privilege_decision.h"
 #include "orvel/error_state.h"
 #include "orvel/file_info.h"
 #include "orvel/privilege.h"
 #include "orvel/share_path.h"
-#include "util/printable.h"
 
 namespace orvel {
 namespace {

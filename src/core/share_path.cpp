@@ -8,11 +8,11 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/owned.h"
 #include "core/path_component.h"
 #include "orvel/error_state.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 #include "vexo/list.h"
 #include "vexo/share.h"

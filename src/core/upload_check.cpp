@@ -2,6 +2,7 @@
 
 #include <syslog.h>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/identity_state.h"
 #include "core/owned.h"
@@ -9,7 +10,6 @@
 #include "orvel/identity.h"
 #include "orvel/name_check.h"
 #include "orvel/share_path.h"
-#include "util/printable.h"
 #include "vexo/copy.h"
 #include "vexo/error.h"
 #include "vexo/user.h"

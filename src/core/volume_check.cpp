@@ -6,9 +6,9 @@
 #include <cstring>
 #include <string>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "orvel/name_check.h"
-#include "util/printable.h"
 #include "vexo/filesystem.h"
 
 namespace orvel {

@@ -8,12 +8,12 @@
 #include <cctype>
 #include <cerrno>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "enum/entry_order.h"
 #include "orvel/listing.h"
 #include "orvel/privilege.h"
 #include "orvel/text.h"
-#include "util/printable.h"
 #include "vexo/acl.h"
 #include "vexo/filesystem.h"
 

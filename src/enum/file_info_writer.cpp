@@ -6,6 +6,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "base/hex.h"
 #include "orvel/privilege.h"
 
 namespace orvel {
@@ -81,13 +82,12 @@ class Pen {
 
  private:
     void putEscape(char c, char escape) {
-        static constexpr char digits[] = "0123456789abcdef";
         *at_++ = '\\';
         *at_++ = escape;
         if (escape != 'u') return;
         put("00");
-        *at_++ = digits[static_cast<unsigned char>(c) >> 4];
-        *at_++ = digits[c & 15];
+        *at_++ = kLowerHex[static_cast<unsigned char>(c) >> 4];
+        *at_++ = kLowerHex[c & 15];
     }
 
     char* at_;

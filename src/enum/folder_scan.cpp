@@ -8,10 +8,10 @@
 #include <cerrno>
 #include <cstring>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "enum/entry_fill.h"
 #include "enum/folder_reader.h"
-#include "util/printable.h"
 #include "vexo/filesystem.h"
 
 namespace orvel {

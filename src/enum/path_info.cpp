@@ -2,11 +2,11 @@
 
 #include <string>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "orvel/error_state.h"
 #include "orvel/file_info.h"
 #include "orvel/share_path.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 
 namespace orvel {

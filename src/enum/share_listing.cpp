@@ -5,6 +5,7 @@
 
 #include <cstring>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/owned.h"
 #include "enum/entry_fill.h"
@@ -13,7 +14,6 @@
 #include "orvel/listing.h"
 #include "orvel/privilege.h"
 #include "orvel/share_path.h"
-#include "util/printable.h"
 #include "vexo/settings.h"
 #include "vexo/share.h"
 

@@ -8,7 +8,7 @@
 #include <cstring>
 #include <utility>
 
-#include "util/printable.h"
+#include "base/printable.h"
 #include "vexo/error.h"
 #include "vexo/filesystem.h"
 #include "vexo/share.h"

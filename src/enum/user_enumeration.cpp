@@ -6,11 +6,11 @@
 #include <cstdlib>
 #include <optional>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/owned.h"
 #include "enum/group_ids.h"
 #include "orvel/listing.h"
-#include "util/printable.h"
 
 namespace {
 
@@ -88,11 +88,10 @@ bool OrvEnum::EnumAllGroups(std::map<unsigned int, _tag_GROUP_INFO_>& groups, AU
 
 bool OrvEnum::EnumUserGroups(std::list<unsigned int>& gids, std::string user) {
     return orvel::guardedQuietly(false, [&] {
-        PVLIBCSZLIST raw = VLIBCSzListAlloc(kGroupListCapacity);
-        if (raw == nullptr) return false;
+        orvel::StringList list(VLIBCSzListAlloc(kGroupListCapacity));
+        if (!list) return false;
         // The outcome is the list alone: a failed look-up leaves it empty and means no groups.
-        VEXOGroupInfoGetgroupList(user.c_str(), &raw, 0);
-        const orvel::StringList list(raw);
+        VEXOGroupInfoGetgroupList(user.c_str(), orvel::lend(list), 0);
         return orvel::appendGroupIds(list.get(), gids);
     });
 }

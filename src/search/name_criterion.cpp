@@ -5,8 +5,8 @@
 #include <string_view>
 #include <utility>
 
+#include "base/wildcard.h"
 #include "orvel/search_criteria.h"
-#include "util/wildcard.h"
 
 namespace FileSearch {
 namespace {

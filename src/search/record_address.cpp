@@ -4,10 +4,10 @@
 
 #include <string_view>
 
+#include "base/printable.h"
 #include "orvel/search_criteria.h"
 #include "orvel/share_path.h"
 #include "search/share_address.h"
-#include "util/printable.h"
 
 namespace orvel {
 namespace {

@@ -4,8 +4,8 @@
 
 #include <climits>
 
+#include "base/printable.h"
 #include "orvel/search_criteria.h"
-#include "util/printable.h"
 
 namespace orvel {
 namespace {

@@ -3,9 +3,9 @@
 
 #include <algorithm>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "orvel/search_walker.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 
 namespace FileSearch {

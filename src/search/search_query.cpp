@@ -4,10 +4,10 @@
 #include <cstring>
 #include <iterator>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "orvel/search_criteria.h"
 #include "orvel/search_task.h"
-#include "util/printable.h"
 
 namespace FileSearch {
 namespace {

@@ -7,10 +7,10 @@
 #include <cerrno>
 #include <cstring>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "orvel/search_task.h"
 #include "search/indexed_folder.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 
 namespace FileSearch {

@@ -6,12 +6,12 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdlib>
 #include <cstring>
 
+#include "base/printable.h"
+#include "base/raised_identity.h"
 #include "core/owned.h"
 #include "orvel/name_check.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 #include "vexo/process.h"
 
@@ -20,21 +20,6 @@ namespace {
 
 constexpr const char* kSource = "orvelsearch";
 constexpr mode_t kEverybody = 0777;  // each user's process keeps its databases there, mode 0600
-
-// Root for its own lifetime, where the process may become root.
-class RootIdentity {
- public:
-    RootIdentity() : before_(geteuid()) { [[maybe_unused]] const int ignored = seteuid(0); }
-    ~RootIdentity() {
-        // To go on as root with a user's request would be worse than to stop.
-        if (geteuid() != before_ && seteuid(before_) != 0) abort();
-    }
-    RootIdentity(const RootIdentity&) = delete;
-    RootIdentity& operator=(const RootIdentity&) = delete;
-
- private:
-    uid_t before_;
-};
 
 void makeTemporaryFolder(std::string volume) {
     errno = 0;
@@ -77,7 +62,7 @@ std::string searchRoot(const std::string& volume) {
 }
 
 void makeTaskFolders(const std::string& volume, const std::string& taskFolder) {
-    const RootIdentity root;
+    const RaisedIdentity root;
     makeTemporaryFolder(volume);
     const std::string top = searchRoot(volume);
     for (const std::string& above : {volume + "/@tmp", volume + "/@tmp/orvel", top}) {

@@ -5,10 +5,10 @@
 #include <cstdlib>
 #include <ctime>
 
+#include "base/printable.h"
 #include "core/owned.h"
 #include "orvel/sharing_link.h"
 #include "sharing/link_window.h"
-#include "util/printable.h"
 #include "vexo/database.h"
 
 namespace orvel {

@@ -10,13 +10,13 @@
 #include <string>
 #include <string_view>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/owned.h"
 #include "sharing/client_address.h"
 #include "sharing/critical_section.h"
 #include "sharing/login_record.h"
 #include "sharing/record_file.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 #include "vexo/settings.h"
 #include "vexo/user.h"

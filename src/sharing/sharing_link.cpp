@@ -8,12 +8,12 @@
 #include <cstdlib>
 #include <optional>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/user_kind.h"
 #include "sharing/client_address.h"
 #include "sharing/link_lookup.h"
 #include "sharing/login_add.h"
-#include "util/printable.h"
 #include "vexo/auto_block.h"
 #include "vexo/error.h"
 #include "vexo/user.h"

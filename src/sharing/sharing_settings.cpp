@@ -9,9 +9,9 @@
 #include <cerrno>
 #include <cstdlib>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/owned.h"
-#include "util/printable.h"
 #include "vexo/error.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"

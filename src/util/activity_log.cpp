@@ -5,8 +5,8 @@
 
 #include <cstdlib>
 
+#include "base/printable.h"
 #include "core/boundary.h"
-#include "util/printable.h"
 #include "vexo/settings.h"
 #include "vexo/xferlog.h"
 

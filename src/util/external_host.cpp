@@ -9,9 +9,9 @@
 #include <cstring>
 #include <string_view>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "util/host_header.h"
-#include "util/printable.h"
 #include "vexo/ddns.h"
 #include "vexo/error.h"
 #include "vexo/settings.h"

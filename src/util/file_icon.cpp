@@ -3,9 +3,9 @@
 #include <sys/stat.h>
 #include <syslog.h>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "orvel/text.h"
-#include "util/printable.h"
 #include "vexo/filesystem.h"
 
 namespace {

@@ -8,8 +8,8 @@
 #include <string_view>
 #include <utility>
 
+#include "base/wildcard.h"
 #include "core/boundary.h"
-#include "util/wildcard.h"
 
 namespace {
 

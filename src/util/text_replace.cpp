@@ -10,10 +10,10 @@
 #include <string>
 #include <string_view>
 
+#include "base/printable.h"
 #include "core/boundary.h"
 #include "core/owned.h"
 #include "orvel/text.h"
-#include "util/printable.h"
 
 namespace {
 

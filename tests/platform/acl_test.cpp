@@ -64,7 +64,7 @@ class AclTest : public ApplianceTest {
         return rename(path.c_str(), away.c_str()) == 0 && rename(away.c_str(), path.c_str()) == 0;
     }
     static void compare(const std::string& folder, const std::vector<std::string>& names) {
-        const vexo::Descriptor opened = vexo::openFile(folder, O_PATH | O_DIRECTORY);
+        const orvel::Descriptor opened = vexo::openFile(folder, O_PATH | O_DIRECTORY);
         const PVEXOACLFOLDER permissions = VEXOACLFolderOpen(opened.get());
         ASSERT_NE(permissions, nullptr);
         for (const std::string& name : names) {
@@ -173,7 +173,7 @@ TEST_F(AclTest, MountsJudgeToo) {
         EXPECT_EQ(mount(inner.c_str(), inner.c_str(), nullptr, MS_BIND, nullptr), 0);
         EXPECT_EQ(mount("none", inner.c_str(), nullptr, MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
         EXPECT_EQ(byPath(inner) & VEXO_ACL_WRITE, 0U);
-        const vexo::Descriptor around = vexo::openFile(root_ + "/bound", O_PATH | O_DIRECTORY);
+        const orvel::Descriptor around = vexo::openFile(root_ + "/bound", O_PATH | O_DIRECTORY);
         const PVEXOACLFOLDER permissions = VEXOACLFolderOpen(around.get());
         _tag_VEXOSTAT_ status;
         unsigned inFolder = 0;

@@ -8,7 +8,7 @@
 #include <random>
 #include <set>
 
-#include "platform/refuse_calls.h"
+#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 namespace {

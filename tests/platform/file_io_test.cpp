@@ -1,7 +1,6 @@
-// What the platform's files rely on: limits, the identity behind, and knowing a version again.
+// What the platform's files rely on: limits, and knowing a version again.
 #include "io/file_io.h"
 
-#include "raise.h"
 #include "support/testing.h"
 
 namespace {
@@ -44,27 +43,6 @@ TEST_F(FileIo, AVersionIsKnownAgainUntilTheFileChanges) {
     EXPECT_FALSE(version.isCurrent(statusOf(path("a")))) << "another time";
     writeFile(path("a"), "longer");
     EXPECT_FALSE(version.isCurrent(age("a"))) << "another size";
-}
-
-TEST_F(FileIo, RaisedIdentityGoesBack) {
-    SKIP_WITHOUT_ROOT();
-    inChild([] {
-        EXPECT_EQ(setresgid(kUsersGid, kUsersGid, 0), 0);
-        EXPECT_EQ(setresuid(kAliceUid, kAliceUid, 0), 0);
-        {
-            errno = EBUSY;
-            const vexo::RaisedIdentity raised;
-            EXPECT_TRUE(geteuid() == 0 && getegid() == 0);
-            const vexo::RaisedIdentity inner;
-            EXPECT_EQ(geteuid(), 0U);
-        }
-        EXPECT_EQ(errno, EBUSY);
-        EXPECT_TRUE(geteuid() == kAliceUid && getegid() == kUsersGid);
-        EXPECT_EQ(setresuid(kAliceUid, kAliceUid, kAliceUid), 0);
-        const vexo::RaisedIdentity raised;
-        EXPECT_EQ(geteuid(), uid_t{kAliceUid}) << "without the saved uid 0 there is nothing to raise to";
-        return 0;
-    });
 }
 
 }  // namespace

@@ -8,10 +8,10 @@
 #include <random>
 
 #include "platform/private_mounts.h"
-#include "platform/refuse_calls.h"
 #include "platform/trust.h"
 #include "settings/settings_file.h"
 #include "settings/settings_text.h"
+#include "support/refuse_calls.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"
 

@@ -18,7 +18,7 @@ TEST_F(StatTest, RecordsWhatLstatTells) {
     ASSERT_EQ(utimensat(AT_FDCWD, file.c_str(), times, 0), 0);
     fs::create_symlink("a", root_ + "/link");
     fs::create_hard_link(file, root_ + "/second");
-    const vexo::Descriptor folder = vexo::openFile(root_, O_RDONLY | O_DIRECTORY);
+    const orvel::Descriptor folder = vexo::openFile(root_, O_RDONLY | O_DIRECTORY);
     for (const char* name : {"a", "link", "."}) {
         const struct stat wanted = statusOf(root_ + "/" + name);
         for (const unsigned flags : {unsigned{VEXO_STAT_BASIC}, 9U}) {

@@ -6,8 +6,8 @@
 
 #include <set>
 
-#include "platform/refuse_calls.h"
 #include "support/log_texts.h"
+#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 using namespace FileSearch;

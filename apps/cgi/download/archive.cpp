@@ -11,6 +11,7 @@
 #include <ctime>
 #include <memory>
 
+#include "base/owner.h"
 #include "folder_names.h"
 #include "text.h"
 
@@ -19,10 +20,6 @@ namespace {
 
 constexpr size_t kPiece = size_t{256} * 1024;
 constexpr int kDeepest = 256;  // descriptors stay open on the way down
-
-struct FreeEntry {
-    void operator()(archive_entry* entry) const { archive_entry_free(entry); }
-};
 
 }  // namespace
 
@@ -66,7 +63,7 @@ void ZipStream::leaveOut(const std::string& name, const std::string& reason) {
 }
 
 bool ZipStream::begin(const std::string& name, const struct stat& status, long long size) {
-    const std::unique_ptr<archive_entry, FreeEntry> entry(archive_entry_new());
+    const std::unique_ptr<archive_entry, Releaser<archive_entry_free>> entry(archive_entry_new());
     if (entry == nullptr) return broken();
     archive_entry_set_pathname(entry.get(), name.c_str());
     archive_entry_set_mode(entry.get(), status.st_mode & (S_IFMT | 0777));

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "descriptor.h"
+#include "base/descriptor.h"
 
 struct archive;
 

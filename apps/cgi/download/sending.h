@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "descriptor.h"
+#include "base/descriptor.h"
 #include "output.h"
 #include "reply.h"
 #include "request.h"

@@ -1,16 +1,14 @@
 #include "operation/task_start.h"
 
-#include <sys/random.h>
 #include <sys/resource.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
-#include <cstdio>
 #include <memory>
 
 #include "background.h"
+#include "base/random.h"
 #include "orvel/error_state.h"
 #include "orvel/task_progress.h"
 #include "search_task.h"
@@ -30,11 +28,8 @@ struct Background {
 
 // "" with errno when the kernel gives no random bytes.
 std::string newTaskId(const std::string& action) {
-    unsigned long long number = 0;
-    if (getrandom(&number, sizeof number, 0) != static_cast<ssize_t>(sizeof number)) return "";
-    std::array<char, 20> text{};
-    snprintf(text.data(), text.size(), "%016llx", number);
-    return kTaskPrefix + action + "_" + text.data();
+    const std::string drawn = draw<8>();
+    return drawn.empty() ? "" : kTaskPrefix + action + "_" + drawn;
 }
 
 void allowDeepTrees() {

@@ -9,9 +9,9 @@
 #include <vector>
 
 #include "background.h"
+#include "base/descriptor.h"
 #include "chosen_folders.h"
 #include "criteria.h"
-#include "descriptor.h"
 #include "orvel/error_state.h"
 #include "orvel/search_walker.h"
 #include "search/actions.h"

@@ -4,7 +4,7 @@
 
 #include <string>
 
-#include "descriptor.h"
+#include "base/descriptor.h"
 
 namespace orvel::cgi {
 

@@ -5,7 +5,7 @@
 #include <string>
 #include <string_view>
 
-#include "descriptor.h"
+#include "base/descriptor.h"
 
 namespace orvel::cgi {
 

@@ -49,7 +49,7 @@ void make(const std::string& folder) {
     umask(022);
     const appliance::Identities ids = appliance::identitiesFor(geteuid(), getegid());
     if (ids.real) requireReachable(folder);
-    const std::string tag = appliance::randomHex(4);
+    const std::string tag = appliance::randomDigits();
     Record record = {.whole = false,
                      .folderMade = fs::create_directories(folder),
                      .roots = appliance::shareRoots(tag),

@@ -1,9 +1,10 @@
 #include "demo/identities.h"
 
 #include <crypt.h>
-#include <sys/random.h>
 
 #include <stdexcept>
+
+#include "base/random.h"
 
 namespace orvel::ctl::appliance {
 namespace {
@@ -30,9 +31,9 @@ Identities identitiesFor(uid_t maker, gid_t makerGroup) {
 }
 
 std::vector<Person> people(const Identities& ids) {
-    return {{"alice", "read-write on most shares", ids.alice, randomHex(6)},
-            {"bob", "read-only on some, shut out of projects", ids.bob, randomHex(6)},
-            {"admin", "administrator", ids.admin, randomHex(6)}};
+    return {{"alice", "read-write on most shares", ids.alice, randomDigits()},
+            {"bob", "read-only on some, shut out of projects", ids.bob, randomDigits()},
+            {"admin", "administrator", ids.admin, randomDigits()}};
 }
 
 std::string passwdText(const Identities& ids, const std::vector<Person>& people) {
@@ -63,18 +64,10 @@ std::string loginText(const std::vector<Person>& people) {
     return text;
 }
 
-std::string randomHex(size_t bytes) {
-    static constexpr char digits[] = "0123456789abcdef";
-    std::string raw(bytes, '\0');
-    if (getrandom(raw.data(), raw.size(), 0) != static_cast<ssize_t>(raw.size())) {
-        throw std::runtime_error("no random numbers");
-    }
-    std::string text;
-    for (const char c : raw) {
-        const auto byte = static_cast<unsigned char>(c);
-        text += {digits[byte >> 4], digits[byte & 15]};
-    }
-    return text;
+std::string randomDigits() {
+    std::string digits = draw<6>();
+    if (digits.empty()) throw std::runtime_error("no random numbers");
+    return digits;
 }
 
 }  // namespace orvel::ctl::appliance

@@ -34,8 +34,8 @@ std::string groupText(const Identities& ids, const std::vector<Person>& people);
 std::string shadowText(const std::vector<Person>& people);
 std::string loginText(const std::vector<Person>& people);
 
-// `bytes` random bytes in hexadecimal.
-std::string randomHex(size_t bytes);
+// Twelve random hexadecimal digits.
+std::string randomDigits();
 
 }  // namespace orvel::ctl::appliance
 

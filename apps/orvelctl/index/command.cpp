@@ -8,6 +8,7 @@
 #include <stdexcept>
 
 #include "arguments.h"
+#include "base/owner.h"
 #include "command.h"
 #include "index/indexer.h"
 #include "vexo/error.h"
@@ -27,10 +28,7 @@ void stopOnSignals() {
     for (const int signal : {SIGINT, SIGTERM, SIGHUP}) sigaction(signal, &action, nullptr);
 }
 
-struct ReleaseShare {
-    void operator()(SDK::Share* share) const { SDK::Share::Release(share); }
-};
-using Share = std::unique_ptr<SDK::Share, ReleaseShare>;
+using Share = std::unique_ptr<SDK::Share, Releaser<SDK::Share::Release>>;
 
 [[noreturn]] void refuse(const std::string& share, const char* reason) {
     throw std::runtime_error(terminalText(share) + ": " + reason);

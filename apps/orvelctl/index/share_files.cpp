@@ -45,7 +45,7 @@ ShareFiles::ShareFiles(std::string root, int* stop)
 // The indexer is root and users move their folders while it works: a link that took the place of one must not bring
 // names from elsewhere into the index.
 std::vector<Entry> ShareFiles::list(const std::string& folder) const {
-    cgi::Descriptor below;
+    Descriptor below;
     if (!folder.empty()) {
         below = cgi::openBeneath(opened_, folder, cgi::LinkPolicy::kNone, O_PATH | O_DIRECTORY);
         if (!below) return {};

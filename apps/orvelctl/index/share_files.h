@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "descriptor.h"
+#include "base/descriptor.h"
 #include "vexo/stat.h"
 
 namespace orvel::ctl {
@@ -41,7 +41,7 @@ class ShareFiles {
 
  private:
     std::string root_;
-    cgi::Descriptor opened_;  // the root
+    Descriptor opened_;  // the root
     int* stop_;
 };
 

@@ -9,16 +9,14 @@
 #include <cstdio>
 #include <memory>
 
+#include "base/owner.h"
+#include "base/raised_identity.h"
 #include "failure.h"
-#include "raise.h"
 
 namespace vexo {
 namespace {
 
-struct CloseFile {
-    void operator()(FILE* file) const { fclose(file); }
-};
-using File = std::unique_ptr<FILE, CloseFile>;
+using File = std::unique_ptr<FILE, orvel::Releaser<fclose>>;
 
 // Opens a regular file to read records from; null with errno.
 File openRecords(const std::string& path, FileVersion& version) {
@@ -125,7 +123,7 @@ long AccountFiles::expiry(const std::string& shadow, const std::string& user) {
 void AccountFiles::readExpiries(const std::string& path) {
     expiries_.clear();
     shadowVersion_ = {};
-    const RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     const File file = openRecords(path, shadowVersion_);
     if (file == nullptr) return;
     while (const spwd* record = fgetspent(file.get())) expiries_.emplace(record->sp_namp, record->sp_expire);

@@ -7,8 +7,8 @@
 #include <algorithm>
 #include <cerrno>
 
+#include "base/raised_identity.h"
 #include "failure.h"
-#include "raise.h"
 
 namespace vexo::nss {
 namespace {
@@ -100,7 +100,7 @@ std::vector<gid_t> groupsOf(const std::string& user, gid_t primary) {
 
 long expiry(const std::string& user) {
     const KeepErrno keep;
-    const RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     spwd record{};
     std::vector<char> buffer;
     const Lookup answer = ask(record, buffer, [&](spwd* out, char* bytes, size_t size, spwd** result) {

@@ -48,16 +48,10 @@ int privilegeOf(const char* share, const char* user, int* privilege) {
     return 0;
 }
 
-struct FreeList {
-    void operator()(PVLIBCSZLIST list) const { VLIBCSzListFree(list); }
-};
-using List = std::unique_ptr<VLIBCSZLIST, FreeList>;
+using List = std::unique_ptr<VLIBCSZLIST, orvel::Releaser<VLIBCSzListFree>>;
 
 bool push(List& list, const char* text) {
-    PVLIBCSZLIST grown = list.release();
-    const bool pushed = VLIBCSzListPush(&grown, text) >= 0;
-    list.reset(grown);
-    return pushed;
+    return VLIBCSzListPush(orvel::lend(list), text) >= 0;
 }
 
 // Appends the names of the shares that the user may use; false with the slot filled.

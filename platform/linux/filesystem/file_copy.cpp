@@ -21,7 +21,7 @@
 
 namespace {
 
-using vexo::Descriptor;
+using orvel::Descriptor;
 
 constexpr uid_t kKeepUser = static_cast<uid_t>(-1);
 constexpr gid_t kKeepGroup = static_cast<gid_t>(-1);

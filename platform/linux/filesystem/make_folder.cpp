@@ -12,7 +12,7 @@
 
 namespace {
 
-using vexo::Descriptor;
+using orvel::Descriptor;
 
 struct Attributes {
     uid_t uid;

@@ -193,7 +193,7 @@ void Connections::commitOld() {
 // Failures are told at the next use.
 void Connections::commitAll() {
     const KeepErrno keep;
-    const RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     const QuietFailures quiet;
     for (const auto& entry : entries_) {
         if (!entry->database->commit()) entry->failure = QuietFailures::last();
@@ -231,7 +231,7 @@ void admitDatabase(const std::string& path, OpenMode mode) {
 bool dismissDatabase(const std::string& path) {
     Connections& connections = Connections::ofThisProcess();
     const std::lock_guard<std::mutex> lock(connections.mutex);
-    const RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     connections.admitted.erase(path);
     return connections.close(path);
 }

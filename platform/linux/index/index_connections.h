@@ -6,8 +6,8 @@
 #include <mutex>
 #include <optional>
 
+#include "base/raised_identity.h"
 #include "index/index_database.h"
-#include "raise.h"
 
 namespace vexo::fileindex {
 
@@ -23,7 +23,7 @@ class Lease {
 
  private:
     std::unique_lock<std::mutex> lock_;
-    std::optional<RaisedIdentity> raised_;
+    std::optional<orvel::RaisedIdentity> raised_;
     Database* database_ = nullptr;
 };
 

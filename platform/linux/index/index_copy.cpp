@@ -5,6 +5,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "index/index_columns.h"
@@ -13,7 +14,6 @@
 #include "index/index_reading.h"
 #include "index/index_search.h"
 #include "index/index_store.h"
-#include "raise.h"
 #include "vexo/index.h"
 
 namespace vexo::fileindex {
@@ -42,7 +42,7 @@ bool copy(Database& index, const std::vector<int64_t>& ids, const char* out, con
     while (!reader.atEnd() && !isCancelled(cancel)) {
         std::vector<OwnedRecord> part;
         {
-            const RaisedIdentity raised;
+            const orvel::RaisedIdentity raised;
             if (!reader.read(index, part)) return false;
         }
         std::vector<__tag_FI_FILE_INFO_DATA> kept;
@@ -72,7 +72,7 @@ int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_COND* path
     std::unique_ptr<Database> index;
     std::vector<int64_t> ids;
     {
-        const vexo::RaisedIdentity raised;
+        const orvel::RaisedIdentity raised;
         index = openIndex(share);
         if (index == nullptr || !searchIndex(*index, both(std::move(*where), std::move(*what)), cancel, ids)) return -1;
     }

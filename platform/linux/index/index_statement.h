@@ -12,7 +12,7 @@
 #include <variant>
 #include <vector>
 
-#include "util/wildcard.h"
+#include "base/wildcard.h"
 
 namespace vexo::fileindex {
 

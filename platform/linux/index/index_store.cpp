@@ -11,11 +11,11 @@
 #include <exception>
 #include <map>
 
+#include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "index/index_connections.h"
 #include "io/file_io.h"
-#include "raise.h"
 #include "shares/share_record.h"
 #include "shares/share_store.h"
 #include "vexo/filesystem.h"
@@ -82,7 +82,7 @@ bool indexExists(std::string_view share) {
 }
 
 bool begin(const std::string& share, int mode) {
-    const RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     if (!makeStore()) return false;
     Work work{mode, lockIndex(share)};
     if (!work.lock) return false;
@@ -212,7 +212,7 @@ int FILEIDXIsIndexEnable(const char* share) try {
     const vexo::ShareDefinition* definition = shares == nullptr ? nullptr : shares->find(share);
     if (definition == nullptr || !definition->index) return 0;
     const vexo::KeepErrno keep;
-    const vexo::RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     return static_cast<int>(vexo::fileindex::indexExists(definition->name));
 } catch (const std::exception&) {
     vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
@@ -240,7 +240,7 @@ int FILEIDXIndexEnd(const char* share, int done) try {
     const std::string name = share == nullptr ? std::string() : definedName(share);
     const auto work = vexo::fileindex::works().find(name);
     if (work == vexo::fileindex::works().end()) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
-    const vexo::RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     const bool ended = work->second.mode == FI_INDEX_BUILD ? vexo::fileindex::endBuild(name, done != 0)
                                                            : vexo::fileindex::endUpdate(name, done != 0);
     vexo::fileindex::works().erase(work);
@@ -253,9 +253,9 @@ int FILEIDXIndexDrop(const char* share) try {
     VEXO_GATE("FILEIDXIndexDrop", -1);
     if (share == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     // A share that is no more may have left its index behind.
-    const vexo::RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     if (!vexo::fileindex::makeStore()) return -1;
-    const vexo::Descriptor lock = vexo::fileindex::lockIndex(share);
+    const orvel::Descriptor lock = vexo::fileindex::lockIndex(share);
     if (!lock) return -1;
     return vexo::fileindex::removeFile(vexo::fileindex::indexPath(share)) ? 0 : -1;
 } catch (const std::exception&) {
@@ -266,7 +266,7 @@ int FILEIDXIndexStatus(const char* share, FIINDEXSTATUS* status) try {
     VEXO_GATE("FILEIDXIndexStatus", -1);
     if (share == nullptr || status == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     *status = {};
-    const vexo::RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     return vexo::fileindex::readStatus(share, *status) ? 0 : -1;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);

@@ -11,11 +11,11 @@
 #include <string>
 #include <thread>
 
+#include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "io/file_io.h"
 #include "io/trusted_file.h"
-#include "raise.h"
 #include "vexo/system_root.h"
 
 namespace {
@@ -29,8 +29,8 @@ constexpr int kLongestPause = 5000;
 
 enum class Attempt { entered, busy, failed };
 
-vexo::Descriptor openLock(const std::string& path) {
-    const vexo::RaisedIdentity raised;
+orvel::Descriptor openLock(const std::string& path) {
+    const orvel::RaisedIdentity raised;
     return vexo::openTrusted(path, O_RDWR | O_CREAT, 0600);
 }
 
@@ -42,7 +42,7 @@ bool isStillThere(int lock, const std::string& path) {
            mine.st_ino == there.st_ino;
 }
 
-Attempt tryToEnter(vexo::Descriptor& lock, const std::string& path) {
+Attempt tryToEnter(orvel::Descriptor& lock, const std::string& path) {
     if (!lock) lock = openLock(path);
     if (!lock) return Attempt::failed;
     if (flock(lock.get(), LOCK_EX | LOCK_NB) != 0) {
@@ -72,7 +72,7 @@ int VexoCgiBeginCriticalSection(const char* name, int milliseconds) try {
     const auto deadline = Clock::now() + std::chrono::milliseconds(std::max(milliseconds, 0));
     std::minstd_rand random(static_cast<unsigned>(getpid()) +
                             static_cast<unsigned>(deadline.time_since_epoch().count()));
-    vexo::Descriptor lock;
+    orvel::Descriptor lock;
     while (true) {
         const Attempt attempt = tryToEnter(lock, path);
         if (attempt == Attempt::entered) {
@@ -88,7 +88,7 @@ int VexoCgiBeginCriticalSection(const char* name, int milliseconds) try {
 
 void VexoCgiEndCriticalSection(int handle) {
     if (handle < 0) return;
-    const vexo::Descriptor lock(handle);
+    const orvel::Descriptor lock(handle);
     const vexo::KeepErrno keep;
     // By name, not by closing alone: a forked child may hold the descriptor too.
     flock(lock.get(), LOCK_UN);

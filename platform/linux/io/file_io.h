@@ -12,36 +12,12 @@
 #include <ctime>
 #include <string>
 #include <string_view>
-#include <utility>
+
+#include "base/descriptor.h"
 
 namespace vexo {
 
-// Owns a file descriptor. Closing it leaves errno alone.
-class Descriptor {
- public:
-    explicit Descriptor(int fd = -1) : fd_(fd) {}
-    ~Descriptor() { reset(); }
-    Descriptor(Descriptor&& other) noexcept : fd_(std::exchange(other.fd_, -1)) {}
-    Descriptor& operator=(Descriptor&& other) noexcept {
-        if (this != &other) {
-            reset();
-            fd_ = std::exchange(other.fd_, -1);
-        }
-        return *this;
-    }
-    [[nodiscard]] int get() const { return fd_; }
-    [[nodiscard]] int release() { return std::exchange(fd_, -1); }
-    explicit operator bool() const { return fd_ >= 0; }
-    void reset() {
-        const int savedErrno = errno;
-        if (fd_ >= 0) close(fd_);
-        fd_ = -1;
-        errno = savedErrno;
-    }
-
- private:
-    int fd_;
-};
+using orvel::Descriptor;
 
 // openat, close-on-exec and repeated when interrupted. Empty with errno on failure.
 [[nodiscard]] Descriptor openFile(int folder, const char* path, int flags, mode_t mode = 0);

@@ -8,11 +8,11 @@
 #include <string>
 #include <string_view>
 
+#include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "io/file_io.h"
 #include "io/trusted_file.h"
-#include "raise.h"
 #include "vexo/system_root.h"
 
 namespace {
@@ -40,8 +40,8 @@ std::optional<std::string_view> findLine(std::string_view text, std::string_view
 }
 
 bool readRecords(const char* file, std::string& text) {
-    const vexo::RaisedIdentity raised;
-    const vexo::Descriptor fd = vexo::openTrusted(VEXO::SystemPath(file), O_RDONLY);
+    const orvel::RaisedIdentity raised;
+    const orvel::Descriptor fd = vexo::openTrusted(VEXO::SystemPath(file), O_RDONLY);
     return fd && vexo::readAll(fd.get(), text, kMaxFile);
 }
 
@@ -98,8 +98,8 @@ int VLIBCFileAddLine(const char* file, const char* line, int max) try {
         return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     }
     const int before = errno;
-    const vexo::RaisedIdentity raised;
-    const vexo::Descriptor fd = vexo::openTrusted(VEXO::SystemPath(file), O_RDWR | O_APPEND | O_CREAT, 0600);
+    const orvel::RaisedIdentity raised;
+    const orvel::Descriptor fd = vexo::openTrusted(VEXO::SystemPath(file), O_RDWR | O_APPEND | O_CREAT, 0600);
     if (!fd || !append(fd.get(), std::string(text) + '\n')) return vexo::fail(vexo::errorOfFile(errno));
     errno = before;
     return 0;

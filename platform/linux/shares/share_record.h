@@ -5,15 +5,13 @@
 #include <memory>
 #include <string>
 
+#include "base/owner.h"
 #include "shares/share_options.h"
 #include "vexo/share.h"
 
 namespace vexo {
 
-struct FreeShare {
-    void operator()(PVEXOSHARE share) const { VEXOShareFree(share); }
-};
-using ShareRecord = std::unique_ptr<VEXOSHARE, FreeShare>;
+using ShareRecord = std::unique_ptr<VEXOSHARE, orvel::Releaser<VEXOShareFree>>;
 
 // Fills `record`, whatever it held before; false with the slot filled when memory is out.
 [[nodiscard]] bool fillShare(const ShareDefinition& share, const std::string& root, VEXOSHARE& record);

@@ -11,9 +11,9 @@
 
 #include "accounts/account_name.h"
 #include "accounts/account_source.h"
+#include "base/printable.h"
 #include "failure.h"
 #include "io/file_io.h"
-#include "util/printable.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"
 

@@ -7,15 +7,15 @@
 #include <utility>
 #include <vector>
 
+#include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
-#include "raise.h"
 #include "tasks/task_name.h"
 #include "tasks/task_store.h"
 
 namespace {
 
-using vexo::Descriptor;
+using orvel::Descriptor;
 using vexo::TaskDocument;
 
 // Fills the slot for errno.
@@ -33,7 +33,7 @@ enum class Fate { kRunning, kDone, kFailed };
 template <class Result, class Body>
 Result asStore(Result failure, Body&& body) {
     try {
-        const vexo::RaisedIdentity raised;
+        const orvel::RaisedIdentity raised;
         return body();
     } catch (const std::exception&) {
         vexo::fail(VEXO_ERR_GENERAL, ENOMEM);

@@ -9,11 +9,11 @@
 #include <string_view>
 #include <utility>
 
+#include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "io/sqlite_handle.h"
 #include "io/trusted_file.h"
-#include "raise.h"
 #include "vexo/filesystem.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"
@@ -137,7 +137,7 @@ int VexoCgiIsDeniedIP(const char* address) try {
     const int before = errno;
     const vexo::AutoBlockRules rules = currentRules();
     if (!rules.enabled) return 0;
-    const vexo::RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     const vexo::Database db = openStore(false);
     if (!db && errno != ENOENT) return failStore();
     const int answer =
@@ -155,7 +155,7 @@ int VEXOAutoBlockResetByIP(const char* address) try {
     const auto normal = address == nullptr ? std::nullopt : vexo::normaliseAddress(address);
     if (!normal) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     const int before = errno;
-    const vexo::RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     const vexo::Database db = openStore(false);
     if (!db && errno != ENOENT) return failStore();
     if (db && !isDone(run(db.get(), kReset, {std::string_view(*normal)}))) return failStore();
@@ -172,7 +172,7 @@ int AutoBlockFailLoginSet(const char* address, const char* tag) try {
     const int before = errno;
     const vexo::AutoBlockRules rules = currentRules();
     if (!rules.enabled) return 0;
-    const vexo::RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     const vexo::Database db = openStore(true);
     if (!db || !count(db.get(), *normal, tag, rules)) return failStore();
     errno = before;

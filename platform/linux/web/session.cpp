@@ -5,6 +5,7 @@
 #include <new>
 #include <string>
 
+#include "base/owner.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "vexo/user.h"
@@ -47,10 +48,8 @@ bool isKnownUser(const std::string& user) {
         vexo::fail(VEXO_ERR_DENIED, EACCES);
         return false;
     }
-    PVEXOUSER record = nullptr;
-    const bool known = VEXOUserGet(user.c_str(), &record) >= 0;
-    VEXOUserFree(record);
-    return known;
+    std::unique_ptr<VEXOUSER, orvel::Releaser<VEXOUserFree>> record;
+    return VEXOUserGet(user.c_str(), orvel::acquire(record)) >= 0;
 }
 
 }  // namespace

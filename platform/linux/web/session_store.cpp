@@ -1,16 +1,15 @@
 #include "web/session_store.h"
 
 #include <dirent.h>
-#include <sys/random.h>
 #include <sys/stat.h>
 
-#include <array>
 #include <memory>
 #include <optional>
 
+#include "base/raised_identity.h"
+#include "base/random.h"
 #include "failure.h"
 #include "io/file_io.h"
-#include "raise.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"
 #include "web/session_record.h"
@@ -54,23 +53,6 @@ Descriptor openStore() {
         return Descriptor();
     }
     return store;
-}
-
-// "" with errno when the kernel gives no random bytes.
-std::string drawSessionId() {
-    static constexpr char digits[] = "0123456789abcdef";
-    std::array<unsigned char, 16> bytes{};
-    ssize_t got = 0;
-    do {
-        got = getrandom(bytes.data(), bytes.size(), 0);
-    } while (got < 0 && errno == EINTR);
-    if (got != static_cast<ssize_t>(bytes.size())) return {};
-    std::string sid;
-    for (const unsigned char byte : bytes) {
-        sid += digits[byte >> 4];
-        sid += digits[byte & 15];
-    }
-    return sid;
 }
 
 bool writeSession(int store, const std::string& sid, const std::string& record) {
@@ -143,8 +125,8 @@ std::string createSession(const std::string& user, const std::string& address) {
         fail(VEXO_ERR_PARAMETER, EINVAL);
         return {};
     }
-    std::string sid = drawSessionId();
-    const RaisedIdentity raised;
+    std::string sid = orvel::draw<16>();
+    const orvel::RaisedIdentity raised;
     const Descriptor store = !sid.empty() && makeStore() ? openStore() : Descriptor();
     if (!store || !writeSession(store.get(), sid, *record)) {
         fail(errorOfErrno(errno));
@@ -157,12 +139,12 @@ std::string createSession(const std::string& user, const std::string& address) {
 
 bool useSession(const std::string& sid, const std::string& user) {
     const long long timeout = timeoutSeconds();
-    const RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     return isSessionId(sid) && findSession(sid, user, timeout);
 }
 
 void sweepSessions() {
-    const RaisedIdentity raised;
+    const orvel::RaisedIdentity raised;
     const Descriptor store = openStore();
     if (store) sweep(store);
 }

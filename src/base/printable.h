@@ -1,15 +1,16 @@
 // Text from users on its way into a log line.
-#ifndef ORVEL_UTIL_PRINTABLE_H
-#define ORVEL_UTIL_PRINTABLE_H
+#ifndef ORVEL_BASE_PRINTABLE_H
+#define ORVEL_BASE_PRINTABLE_H
 
 #include <string>
 #include <string_view>
+
+#include "base/hex.h"
 
 namespace orvel {
 
 // `text` with control bytes (0x00 to 0x1F and 0x7F) written as "\xNN", so that one call is one line of the log.
 inline std::string printable(std::string_view text) {
-    static constexpr char digits[] = "0123456789ABCDEF";
     std::string out;
     out.reserve(text.size());
     for (const char c : text) {
@@ -18,8 +19,7 @@ inline std::string printable(std::string_view text) {
             out += c;
         } else {
             out += "\\x";
-            out += digits[byte >> 4];
-            out += digits[byte & 15];
+            appendHex(c, out, kUpperHex);
         }
     }
     return out;

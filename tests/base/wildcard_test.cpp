@@ -1,11 +1,11 @@
-#include "util/wildcard.h"
+#include "base/wildcard.h"
 
 #include <chrono>
 #include <random>
 
+#include "base/wildcard_model.h"
 #include "orvel/text.h"
 #include "support/testing.h"
-#include "util/wildcard_model.h"
 
 namespace {
 

@@ -1,6 +1,6 @@
 // A kernel that refuses single system calls: for the ways that a machine at hand would never take.
-#ifndef ORVEL_TESTS_PLATFORM_REFUSE_CALLS_H
-#define ORVEL_TESTS_PLATFORM_REFUSE_CALLS_H
+#ifndef ORVEL_TESTS_SUPPORT_REFUSE_CALLS_H
+#define ORVEL_TESTS_SUPPORT_REFUSE_CALLS_H
 
 #include <linux/filter.h>
 #include <linux/seccomp.h>

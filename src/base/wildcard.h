@@ -1,7 +1,7 @@
 // The wildcard comparison of file names: one matcher for the library and for the platform's file index. Depends on ICU
 // alone, since both sides compile it.
-#ifndef ORVEL_UTIL_WILDCARD_H
-#define ORVEL_UTIL_WILDCARD_H
+#ifndef ORVEL_BASE_WILDCARD_H
+#define ORVEL_BASE_WILDCARD_H
 
 #include <unicode/utypes.h>
 

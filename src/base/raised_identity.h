@@ -1,26 +1,27 @@
-// The identity with which the platform reaches its central stores.
-#ifndef VEXO_LINUX_RAISE_H
-#define VEXO_LINUX_RAISE_H
+// Root for a moment, in a process that works as a user.
+#ifndef ORVEL_BASE_RAISED_IDENTITY_H
+#define ORVEL_BASE_RAISED_IDENTITY_H
 
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstdlib>
 
-namespace vexo {
+namespace orvel {
 
-// Raises the effective ids to root for its own lifetime, in a process that switched to a user and kept the saved uid 0;
-// elsewhere it does nothing. One for each operation on a central store, never around anything that touches users'
-// files. errno passes through both ends.
+// Raises the effective ids to root for its own lifetime, in a process that switched to a user and kept uid 0 as its
+// real or saved uid; elsewhere it does nothing. One for each operation on what belongs to the system, never around
+// anything that touches users' files. errno passes through both ends.
 class RaisedIdentity {
  public:
     RaisedIdentity() {
         const int savedErrno = errno;
         uid_t real = 0;
         uid_t saved = 0;
-        if (getresuid(&real, &uid_, &saved) == 0 && uid_ != 0 && saved == 0 && seteuid(0) == 0) {
+        if (getresuid(&real, &uid_, &saved) == 0 && uid_ != 0 && (real == 0 || saved == 0) && seteuid(0) == 0) {
             raised_ = true;
             gid_ = getegid();
+            // Half raised: what is made next would belong to root and be open to the user's group.
             if (setegid(0) != 0) abort();
         }
         errno = savedErrno;
@@ -41,6 +42,6 @@ class RaisedIdentity {
     gid_t gid_ = 0;
 };
 
-}  // namespace vexo
+}  // namespace orvel
 
 #endif

@@ -1,7 +1,7 @@
 // The wildcard comparison in its plain recursive form, exponential but easy to judge: the oracle of the matcher's tests
 // and of its fuzzer.
-#ifndef ORVEL_TESTS_UTIL_WILDCARD_MODEL_H
-#define ORVEL_TESTS_UTIL_WILDCARD_MODEL_H
+#ifndef ORVEL_TESTS_BASE_WILDCARD_MODEL_H
+#define ORVEL_TESTS_BASE_WILDCARD_MODEL_H
 
 #include <unicode/uchar.h>
 
