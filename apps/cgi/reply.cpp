@@ -20,6 +20,8 @@ std::string_view statusLine(Status status) {
             return "Status: 403 Forbidden\r\n";
         case Status::kNotFound:
             return "Status: 404 Not Found\r\n";
+        case Status::kMethodNotAllowed:
+            return "Status: 405 Method Not Allowed\r\n";
         case Status::kTooLarge:
             return "Status: 413 Content Too Large\r\n";
         case Status::kBroken:
@@ -72,17 +74,6 @@ void reply(Output& out, Status status, const std::string& cookie, int code, std:
 
 void replyFailure(Output& out, Status status, const std::string& cookie, int code, std::string_view path) {
     reply(out, status, cookie, code, path, Json::Value());
-}
-
-int runProgram(void (*serve)(Output& out)) {
-    Output out(1);
-    try {
-        serve(out);
-    } catch (...) {
-        // Memory is out. A reply that has begun cannot become another one.
-        return 1;
-    }
-    return out.finish() ? 0 : 1;
 }
 
 }  // namespace orvel::cgi

@@ -23,6 +23,7 @@ enum class Status {
     kNotLoggedIn = 401,
     kForbidden = 403,
     kNotFound = 404,
+    kMethodNotAllowed = 405,
     kTooLarge = 413,
     kBroken = 500
 };
@@ -44,9 +45,6 @@ int platformCode();
 
 // Sets `key` to `path`, readable, and where it is no UTF-8 `key` + "_raw" to its bytes, percent-encoded.
 void putPath(Json::Value& object, const char* key, std::string_view path);
-
-// The main function of a program: what `serve` writes is its reply. Returns the exit status.
-int runProgram(void (*serve)(Output& out));
 
 }  // namespace orvel::cgi
 

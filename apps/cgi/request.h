@@ -20,6 +20,12 @@ struct User {
     std::string cookie;  // what the reply must set, "" for nothing
 };
 
+// A request on its way to its program.
+struct Request {
+    const User& user;  // nobody, with a program that anybody may call
+    VEXO::WebCGI& web;
+};
+
 // Removes the headers in which a proxy names its client from the environment, unless the request comes from an address
 // that the setting "trusted_proxies" lists (comma-separated): anybody can send them.
 void dropForwardedFor();
@@ -28,7 +34,7 @@ void dropForwardedFor();
 // `user` filled, kNotLoggedIn or kForbidden.
 Status admit(User& user);
 
-// Both of the above, with which every program for logged-in users begins; what another site's page sends is refused.
+// Both of the above; what another site's page sends is refused.
 // False once the refusal is written to `out`.
 bool begin(Output& out, User& user);
 

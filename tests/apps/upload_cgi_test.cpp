@@ -145,7 +145,7 @@ TEST_F(UploadCgi, ABodyThatIsNotWhatWasAnnouncedLeavesNothing) {
     for (const char* length : {"5", "9223372036854775807"}) {
         EXPECT_EQ(code(put("alice", "/photo/new/x", "data", "error", {{"CONTENT_LENGTH", length}})), 1802) << length;
     }
-    EXPECT_EQ(CgiReply(runCgi(PROGRAM_UPLOAD, "alice", "GET", "path=/photo/x")).status, 400);
+    EXPECT_EQ(CgiReply(runCgi(PROGRAM_UPLOAD, "alice", "GET", "path=/photo/x")).status, 405);
     EXPECT_EQ(put("alice", "/photo/x", "data", "sometimes").status, 400);
     EXPECT_EQ(put("", "/photo/x", "data").status, 401);
     EXPECT_EQ(namesIn(root), Names{});

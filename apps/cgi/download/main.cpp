@@ -8,7 +8,6 @@
 #include <sys/stat.h>
 
 #include <algorithm>
-#include <csignal>
 #include <string>
 #include <vector>
 
@@ -18,6 +17,7 @@
 #include "orvel/file_info.h"
 #include "orvel/privilege.h"
 #include "orvel/share_path.h"
+#include "program/program.h"
 #include "reply.h"
 #include "request.h"
 #include "vexo/web.h"
@@ -52,13 +52,13 @@ int openSource(const User& user, const std::string& path, Source& source) {
     return openFound(found, info.realPath, source);
 }
 
-void serve(Output& out) {
-    std::signal(SIGPIPE, SIG_IGN);
-    User user;
-    if (!begin(out, user)) return;
-    const VEXO::WebCGI web;
+}  // namespace
+
+void serveDownloadProgram(Request& request, Output& out) {
+    const User& user = request.user;
+    const VEXO::WebCGI& web = request.web;
     const auto paths = pathParams(web);
-    if (web.BodyRefused() || !paths || paths->empty()) {
+    if (!paths || paths->empty()) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
     const bool home =
@@ -76,9 +76,4 @@ void serve(Output& out) {
     serveZip(out, user, sources, web.GetParam("name", only));
 }
 
-}  // namespace
 }  // namespace orvel::cgi
-
-int main() {
-    return orvel::cgi::runProgram(orvel::cgi::serve);
-}

@@ -18,6 +18,7 @@
 #include "link_making.h"
 #include "link_store.h"
 #include "orvel/error_state.h"
+#include "program/program.h"
 #include "reply.h"
 #include "request.h"
 #include "vexo/user.h"
@@ -75,11 +76,11 @@ int revoke(const VEXO::WebCGI& web, const User& user) {
     return removed ? ORV_ERR_NONE : ORV_ERR_MISSING;
 }
 
-void serve(Output& out) {
-    User user;
-    if (!begin(out, user)) return;
-    const VEXO::WebCGI web;
-    if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
+}  // namespace
+
+void serveLinkProgram(Request& request, Output& out) {
+    const User& user = request.user;
+    const VEXO::WebCGI& web = request.web;
     const std::string action = web.GetParam("action", "");
     Json::Value data;
     std::string path;
@@ -91,9 +92,4 @@ void serve(Output& out) {
     reply(out, status, user.cookie, code, path, data);
 }
 
-}  // namespace
 }  // namespace orvel::cgi
-
-int main() {
-    return orvel::cgi::runProgram(orvel::cgi::serve);
-}

@@ -16,6 +16,7 @@
 #include "listing.h"
 #include "orvel/error_state.h"
 #include "orvel/share_path.h"
+#include "program/program.h"
 #include "reply.h"
 #include "request.h"
 #include "text.h"
@@ -44,23 +45,22 @@ std::optional<ListRequest> parse(const VEXO::WebCGI& web, const User& user) {
                        .type = *type};
 }
 
-void serve(Output& out) {
-    User user;
-    if (!begin(out, user)) return;
+}  // namespace
 
-    const VEXO::WebCGI web;
-    if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
+void serveListProgram(Request& request, Output& out) {
+    const User& user = request.user;
+    const VEXO::WebCGI& web = request.web;
     const std::string action = web.GetParam("action", "");
-    const auto request = parse(web, user);
-    if (!request || (action != "shares" && action != "folder")) {
+    const auto wanted = parse(web, user);
+    if (!wanted || (action != "shares" && action != "folder")) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
 
     const bool shares = action == "shares";
     Listing listing;
-    int code = actAs(user.sid.c_str(), user.name, shares || IsDirUserHome(request->path, nullptr));
-    if (code == ORV_ERR_NONE) code = shares ? listShares(*request, listing) : listFolder(*request, listing);
-    if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, request->path);
+    int code = actAs(user.sid.c_str(), user.name, shares || IsDirUserHome(wanted->path, nullptr));
+    if (code == ORV_ERR_NONE) code = shares ? listShares(*wanted, listing) : listFolder(*wanted, listing);
+    if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, wanted->path);
 
     beginReply(out, Status::kOk, user.cookie);
     out.text() += "{\"success\":true,";
@@ -70,13 +70,8 @@ void serve(Output& out) {
         out.text() += ',';
     }
     out.text() += "\"data\":";
-    writeListing(*request, listing, shares ? appendShare : appendEntry, out);
+    writeListing(*wanted, listing, shares ? appendShare : appendEntry, out);
     out.text() += '}';
 }
 
-}  // namespace
 }  // namespace orvel::cgi
-
-int main() {
-    return orvel::cgi::runProgram(orvel::cgi::serve);
-}

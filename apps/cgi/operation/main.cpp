@@ -5,8 +5,6 @@
 //   path, path_raw   what it is done to; may be given more than once where the action goes on in the background
 //   taskid           of an action on files: a search whose results shall show what was done; else the task meant
 // Actions that change something must be posted.
-#include <sys/stat.h>
-
 #include <algorithm>
 #include <string_view>
 
@@ -14,6 +12,7 @@
 #include "operation/operation.h"
 #include "orvel/error_state.h"
 #include "orvel/share_path.h"
+#include "program/program.h"
 #include "reply.h"
 #include "search_task.h"
 
@@ -78,13 +77,11 @@ int perform(Operation& operation, const Action& action) {
     return code == ORV_ERR_NONE ? action.run(operation) : code;
 }
 
-void serve(Output& out) {
-    umask(022);  // whatever the web server's is
-    User user;
-    if (!begin(out, user)) return;
+}  // namespace
 
-    const VEXO::WebCGI web;
-    if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
+void serveOperationProgram(Request& request, Output& out) {
+    const User& user = request.user;
+    const VEXO::WebCGI& web = request.web;
     const Action* action = actionOf(web.GetParam("action", ""));
     Operation operation = {.user = user, .web = web, .paths = {}, .info = {}, .culprit = "", .data = {}};
     if (action == nullptr || (action->changes && !isPosted()) || !readPaths(web, action->takes, operation.paths)) {
@@ -95,9 +92,4 @@ void serve(Output& out) {
     reply(out, Status::kOk, user.cookie, code, operation.culprit, operation.data);
 }
 
-}  // namespace
 }  // namespace orvel::cgi
-
-int main() {
-    return orvel::cgi::runProgram(orvel::cgi::serve);
-}

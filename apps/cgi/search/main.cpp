@@ -10,6 +10,7 @@
 #include <string>
 
 #include "orvel/error_state.h"
+#include "program/program.h"
 #include "reply.h"
 #include "request.h"
 #include "search/actions.h"
@@ -42,12 +43,11 @@ void serveTask(Output& out, const User& user, const VEXO::WebCGI& web, const std
     cleanSearch(out, user, task);
 }
 
-void serve(Output& out) {
-    User user;
-    if (!begin(out, user)) return;
+}  // namespace
 
-    const VEXO::WebCGI web;
-    if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
+void serveSearchProgram(Request& request, Output& out) {
+    const User& user = request.user;
+    const VEXO::WebCGI& web = request.web;
     const std::string action = web.GetParam("action", "");
     const bool changes = action == "start" || action == "stop" || action == "clean";
     if (action != "list" && (!changes || !isPosted())) {
@@ -57,9 +57,4 @@ void serve(Output& out) {
     serveTask(out, user, web, action);
 }
 
-}  // namespace
 }  // namespace orvel::cgi
-
-int main() {
-    return orvel::cgi::runProgram(orvel::cgi::serve);
-}

@@ -119,7 +119,6 @@ void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
         const Status status = code == ORV_ERR_PARAMETER ? Status::kBadRequest : Status::kOk;
         return reply(out, status, user.cookie, code, "", data);
     }
-    umask(022);  // whatever the web server's is
     std::vector<std::string> folders;
     code = actAs(user.sid.c_str(), user.name, anyHome(*paths));
     if (code == ORV_ERR_NONE) code = chooseFolders(user, *paths, folders, culprit);

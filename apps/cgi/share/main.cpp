@@ -17,7 +17,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <csignal>
 #include <cstdio>
 #include <string>
 #include <vector>
@@ -27,6 +26,7 @@
 #include "listing.h"
 #include "orvel/error_state.h"
 #include "orvel/share_path.h"
+#include "program/program.h"
 #include "reply.h"
 #include "request.h"
 #include "share/place.h"
@@ -192,11 +192,10 @@ void serveInside(Output& out, Visit& visit, const std::string& action) {
     serveDownload(out, visit, *paths);
 }
 
-void serve(Output& out) {
-    std::signal(SIGPIPE, SIG_IGN);
-    dropForwardedFor();
-    Visit visit;
-    if (visit.web().BodyRefused()) return replyFailure(out, Status::kTooLarge, "", ORV_ERR_PARAMETER, "");
+}  // namespace
+
+void serveShareProgram(Request& request, Output& out) {
+    Visit visit(request.web);
     const std::string action = visit.web().GetParam("action", "");
     if (action.empty()) return servePage(out, visit);
     if (action != "state" && action != "login" && action != "list" && action != "download") {
@@ -210,9 +209,4 @@ void serve(Output& out) {
     serveInside(out, visit, action);
 }
 
-}  // namespace
 }  // namespace orvel::cgi
-
-int main() {
-    return orvel::cgi::runProgram(orvel::cgi::serve);
-}

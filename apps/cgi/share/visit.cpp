@@ -47,7 +47,7 @@ std::string harmless(std::string path) {
 
 }  // namespace
 
-Visit::Visit() : availability_(find()) {}
+Visit::Visit(VEXO::WebCGI& web) : web_(web), availability_(find()) {}
 
 Availability Visit::find() {
     const int denied = VexoCgiIsDeniedIP(clientAddress().c_str());

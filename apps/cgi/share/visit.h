@@ -19,11 +19,11 @@ enum class Availability {
 
 class Visit {
  public:
-    Visit();
+    explicit Visit(VEXO::WebCGI& web);
 
     [[nodiscard]] Availability availability() const { return availability_; }
     [[nodiscard]] const Link& link() const { return link_; }
-    [[nodiscard]] VEXO::WebCGI& web() { return web_; }
+    [[nodiscard]] VEXO::WebCGI& web() const { return web_; }
 
     // Is the visitor logged in as the link's owner?
     bool isLoggedIn();
@@ -35,7 +35,7 @@ class Visit {
  private:
     Availability find();
 
-    VEXO::WebCGI web_;
+    VEXO::WebCGI& web_;
     OrvelLogin::FolderSharingLoginManager manager_;
     Link link_;
     Availability availability_;

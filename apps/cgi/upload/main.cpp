@@ -25,6 +25,7 @@
 #include "multipart.h"
 #include "orvel/error_state.h"
 #include "orvel/upload_check.h"
+#include "program/program.h"
 #include "reply.h"
 #include "request.h"
 #include "search_task.h"
@@ -211,12 +212,12 @@ void receive(const User& user, const VEXO::WebCGI& web, Outcome& outcome) {
     }
 }
 
-void serve(Output& out) {
-    static_cast<void>(isCancelled());  // from here on
-    User user;
-    if (!begin(out, user)) return;
+}  // namespace
 
-    const VEXO::WebCGI web;
+void serveUploadProgram(Request& request, Output& out) {
+    static_cast<void>(isCancelled());  // from here on
+    const User& user = request.user;
+    const VEXO::WebCGI& web = request.web;
     Outcome outcome;
     receive(user, web, outcome);
     Json::Value data;
@@ -225,9 +226,4 @@ void serve(Output& out) {
     reply(out, outcome.status, user.cookie, outcome.code, outcome.path, data);
 }
 
-}  // namespace
 }  // namespace orvel::cgi
-
-int main() {
-    return orvel::cgi::runProgram(orvel::cgi::serve);
-}

@@ -14,6 +14,7 @@
 #include "orvel/privilege.h"
 #include "orvel/privilege_reason.h"
 #include "orvel/share_path.h"
+#include "program/program.h"
 #include "reply.h"
 #include "request.h"
 #include "vexo/acl.h"
@@ -77,10 +78,11 @@ Json::Value dataOf(const PrivilegeReason& reason) {
     return data;
 }
 
-void serve(Output& out) {
-    User user;
-    if (!begin(out, user)) return;
-    const VEXO::WebCGI web;
+}  // namespace
+
+void serveWhyProgram(Request& request, Output& out) {
+    const User& user = request.user;
+    const VEXO::WebCGI& web = request.web;
     const auto path = pathParam(web);
     if (!path || path->empty()) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
@@ -95,9 +97,4 @@ void serve(Output& out) {
     reply(out, Status::kOk, user.cookie, ORV_ERR_NONE, *path, dataOf(reason));
 }
 
-}  // namespace
 }  // namespace orvel::cgi
-
-int main() {
-    return orvel::cgi::runProgram(orvel::cgi::serve);
-}

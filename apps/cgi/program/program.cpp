@@ -1,0 +1,95 @@
+#include "program/program.h"
+
+#include <sys/stat.h>
+
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <limits>
+#include <string>
+
+#include "text.h"
+#include "vexo/web.h"
+
+namespace orvel::cgi {
+namespace {
+
+constexpr std::int64_t kForm = std::int64_t{1} << 20;
+constexpr std::int64_t kAnyLength = std::numeric_limits<std::int64_t>::max();
+constexpr std::string_view kAsking = "GET, HEAD, POST";
+
+constexpr Program kPrograms[] = {{"list", kAsking, kForm, Caller::kUser, serveListProgram},
+                                 {"download", kAsking, kForm, Caller::kUser, serveDownloadProgram},
+                                 {"link", kAsking, kForm, Caller::kUser, serveLinkProgram},
+                                 {"operation", kAsking, kForm, Caller::kUser, serveOperationProgram},
+                                 {"search", kAsking, kForm, Caller::kUser, serveSearchProgram},
+                                 {"share", kAsking, kForm, Caller::kAnybody, serveShareProgram},
+                                 {"upload", "POST, PUT", kAnyLength, Caller::kUser, serveUploadProgram},
+                                 {"why", kAsking, kForm, Caller::kUser, serveWhyProgram}};
+
+std::string_view variable(const char* name) {
+    const char* value = getenv(name);
+    return value == nullptr ? std::string_view() : value;
+}
+
+bool takes(const Program& program, std::string_view method) {
+    for (std::string_view rest = program.methods; !rest.empty();) {
+        const size_t end = std::min(rest.find(", "), rest.size());
+        if (rest.substr(0, end) == method) return true;
+        rest.remove_prefix(std::min(end + 2, rest.size()));
+    }
+    return false;
+}
+
+// A length that is not a number is the program's to refuse, and so is any where there is no limit.
+bool announcesTooMuch(const Program& program) {
+    if (program.bodyLimit == kAnyLength) return false;
+    const auto length = parseNumber(variable("CONTENT_LENGTH"));
+    return length && *length > static_cast<unsigned long>(program.bodyLimit);
+}
+
+}  // namespace
+
+std::span<const Program> programs() {
+    return kPrograms;
+}
+
+const Program* findProgram(std::string_view name) {
+    for (const Program& program : kPrograms) {
+        if (program.name == name) return &program;
+    }
+    return nullptr;
+}
+
+void answer(const Program& program, Output& out) {
+    std::signal(SIGPIPE, SIG_IGN);
+    umask(022);  // whatever the web server's is
+    if (!takes(program, variable("REQUEST_METHOD"))) {
+        out.text() += "Allow: " + std::string(program.methods) + "\r\n";
+        return replyFailure(out, Status::kMethodNotAllowed, "", ORV_ERR_PARAMETER, "");
+    }
+    User user;
+    if (program.caller == Caller::kAnybody) {
+        dropForwardedFor();
+    } else if (!begin(out, user)) {
+        return;
+    }
+    if (announcesTooMuch(program)) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
+    VEXO::WebCGI web;
+    if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
+    Request request = {.user = user, .web = web};
+    program.serve(request, out);
+}
+
+int serveRequest(const Program& program) {
+    Output out(1);
+    try {
+        answer(program, out);
+    } catch (...) {
+        // Memory is out. A reply that has begun cannot become another one.
+        return 1;
+    }
+    return out.finish() && std::fflush(stdout) == 0 ? 0 : 1;
+}
+
+}  // namespace orvel::cgi

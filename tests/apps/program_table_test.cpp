@@ -1,0 +1,47 @@
+// What the table of programs decides before a program sees the request.
+#include <gtest/gtest.h>
+
+#include <string>
+
+#include "apps/program.h"
+#include "program/program.h"
+#include "support/testing.h"
+
+namespace {
+
+using orvel::cgi::Program;
+
+class ProgramTable : public ApplianceTest {
+ protected:
+    static RawReply ask(const Program& program, const std::string& method, const Variables& more = {}) {
+        const std::string folder = std::string(PROGRAM_LIST).substr(0, std::string(PROGRAM_LIST).rfind('/') + 1);
+        return RawReply(runCgi(folder + std::string(program.name), "alice", method, "", "", more));
+    }
+};
+
+TEST_F(ProgramTable, EveryProgramTakesItsMethodsAlone) {
+    for (const Program& program : orvel::cgi::programs()) {
+        for (const std::string method : {"GET", "PUT", "DELETE", "TRACE", "OPTIONS", "PATCH", "get", "GET, HEAD", ""}) {
+            const bool taken = program.name == "upload" ? method == "PUT" : method == "GET";
+            RawReply reply = ask(program, method);
+            EXPECT_EQ(reply.status == 405, !taken) << program.name << " " << method;
+            if (taken) continue;
+            EXPECT_EQ(reply.headers["Allow"], program.methods);
+            EXPECT_NE(reply.body.find("\"code\":400"), std::string::npos) << reply.body;
+        }
+    }
+}
+
+TEST_F(ProgramTable, ABodyTooLargeIsRefusedUnread) {
+    const std::string mebibyte = "1048576", more = "1048577";
+    for (const Program& program : orvel::cgi::programs()) {
+        const bool bounded = program.name != "upload";
+        EXPECT_EQ(ask(program, "POST", {{"CONTENT_LENGTH", more}}).status == 413, bounded) << program.name;
+        EXPECT_NE(ask(program, "POST", {{"CONTENT_LENGTH", mebibyte}}).status, 413) << program.name;
+        // A form that was announced, but not sent.
+        const Variables form = {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}, {"CONTENT_LENGTH", "9"}};
+        EXPECT_EQ(ask(program, "POST", form).status, 413) << program.name;
+    }
+}
+
+}  // namespace
