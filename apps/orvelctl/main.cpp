@@ -23,11 +23,10 @@ constexpr Command kCommands[] = {
     {"why", orvel::ctl::why,
      "why PATH --user U                                  which rule decides what U may do there"},
     {"search", orvel::ctl::search,
-     "search FOLDER... --user U [--flat] [--name PATTERNS] [--type dir|file] [--extension LIST] [--owner U] [--group "
-     "G]\n"
-     "       [--mtime-from SECONDS] [--mtime-to SECONDS] [--crtime-...] [--atime-...] [--size-equal|less|greater "
-     "BYTES]\n"
-     "       [--json] [--sort KEY] [--desc] [--offset N] [--limit N] [--additional WORDS]   what a search finds"},
+     "search FOLDER... --user U [--flat] [--name PATTERNS] [--type dir|file] [--extension LIST]\n"
+     "       [--owner U] [--group G] [--mtime-from SECONDS] [--mtime-to SECONDS] [--crtime-...] [--atime-...]\n"
+     "       [--size-equal|less|greater BYTES] [--json] [--sort KEY] [--desc] [--offset N] [--limit N]\n"
+     "       [--additional WORDS]                        what a search finds"},
     {"index", orvel::ctl::index,
      "index build|update|drop|status SHARE [--full]      the file index of a share; update compares the folders that\n"
      "       changed, --full all of them: what changed within a file does not show on its folder"},

@@ -3,10 +3,12 @@
 // Parameters, from the query or a form:
 //   action           "shares" or "folder"
 //   path, path_raw   the folder (folder only)
-//   sort_by          as for OrvEnum; without it folders come by name, shares with the home folder first; sort_direction
-//   "asc" (default) or "desc" offset, limit    the page; limit 0, the default, means everything additional       words
-//   as for additionalBits pattern          comma-separated name patterns; filetype "dir", "file" or "all" (default)
-//   (folder only)
+//   sort_by          as for OrvEnum; without it folders come by name, shares with the home folder first
+//   sort_direction   "asc" (default) or "desc"
+//   offset, limit    the page; limit 0, the default, means everything
+//   additional       words as for additionalBits
+//   pattern          comma-separated name patterns (folder only)
+//   filetype         "dir", "file" or "all" (default; folder only)
 // "data" of the reply is {"total","offset","items"}; beside that of the shares stands "user", who is logged in.
 #include <json/value.h>
 
