@@ -33,9 +33,10 @@ class ORVEL_API OrvDirectoryWalkerCallBack {
 };
 
 // Common to the three walks: entries come in the order in which the file system delivers them, hidden names left out; a
-// symbolic link is reported and never followed, also when it takes a folder's place during the walk (the starting
-// folder itself may be reached through links). `skipRecycle` leaves out a share's recycle bin directly in the starting
-// folder. The folder's names are read before its entries are handled.
+// symbolic link is reported and never followed, even if it takes a folder's place during the walk (the starting folder
+// itself may be reached through links, and "/proc/self/fd/N" stands for one that the caller holds open: the real path
+// is then where it lies). Another folder that takes a folder's place is walked instead of it. `skipRecycle` leaves out
+// a share's recycle bin directly in the starting folder. The folder's names are read before its entries are handled.
 //
 // True when the walk came to its end, or was cancelled by the abort flag; false when a callback returned false or a
 // failure was not to be ignored (logged), or memory ran out. No library code is set. Side effect: the current directory
@@ -80,7 +81,8 @@ struct _tag_SUBDIR_ENTRY_INFO_ {
                             // mount that does not answer (all numbers are 0 then)
 };
 
-// Appends the sub-folders of `realPath` to `subDirs`, hidden ones left out, and sorts the whole vector by name without
+// Appends the sub-folders of `realPath` ("/proc/self/fd/N": of a folder that the caller holds open, whose real path is
+// where it lies) to `subDirs`, hidden ones left out, and sorts the whole vector by name without
 // case; names that differ only in case stand in no defined order. A sub-folder whose status cannot be read is left out,
 // unless it is a network mount.
 //

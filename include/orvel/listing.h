@@ -43,7 +43,9 @@ class ORVEL_API OrvEnum {
     // Lists the folder `realPath`, shown as `path`, and appends the asked page to `entries`.
     //
     // path, realPath  share-relative and real path of the folder, bytes; children are these + "/" + name. Path "/"
-    //                 itself is the share listing's.
+    //                 itself is the share listing's. The real path is looked up once. "/proc/self/fd/N" stands for a
+    //                 folder that the caller holds open: that one is listed, whatever stands at its path by now, and
+    //                 the real path of messages, mounts and entries is where it lies.
     // sortBy          column as in EnumCompare; null keeps the reading order.
     // additional      ADDITIONAL_... bits; the bit that fills the sort column is added.
     // offset, limit   the page; limit 0 means everything, whatever the offset. An offset past the end is an empty page.

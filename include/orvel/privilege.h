@@ -64,8 +64,9 @@ ORVEL_API bool CheckShareDownloadPrivilege(const char* user, const char* sid, co
 ORVEL_API bool CheckShareUploadPrivilege(const char* user, const char* sid, const char* path,
                                          _tag__type_& overwriteMode);
 
-// Can the calling identity enter and open the real directory. Side effect: on success, and after a failed open, the
-// working directory of the process is this one; callers rely on it. Stores 0 first (not for null, which is false);
+// Can the calling identity enter and open the real directory, looked up once; "/proc/self/fd/N" stands for a folder
+// that the caller holds open, and messages name it by where it lies. Side effect: on success, and after a failed open,
+// the working directory of the process is this one; callers rely on it. Stores 0 first (not for null, which is false);
 // false with 408 missing or no folder, 407 denied, 402 else.
 ORVEL_API bool CheckDirListPrivilege(const char* realDir);
 

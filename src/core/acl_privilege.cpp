@@ -1,14 +1,15 @@
 // What the calling identity may do with real paths.
-#include <dirent.h>
+#include "core/acl_privilege.h"
+
 #include <syslog.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstring>
+#include <string>
 
 #include "base/printable.h"
 #include "core/boundary.h"
-#include "core/owned.h"
 #include "core/privilege_decision.h"
 #include "orvel/error_state.h"
 #include "orvel/privilege.h"
@@ -20,40 +21,6 @@ namespace {
 
 constexpr const char* kSource = "orveldir";
 constexpr unsigned kEveryBit = 0x1FFF;
-
-int codeOfFolderError(int err) {
-    switch (err) {
-        case ENOENT:
-        case ENOTDIR:
-            return ORV_ERR_MISSING;
-        case EPERM:
-        case EACCES:
-            return ORV_ERR_DENIED;
-        default:
-            return ORV_ERR_DIRECTORY;
-    }
-}
-
-bool mayListFolder(const char* realDir) {
-    if (realDir == nullptr) return false;
-    OrvLibSetErr(ORV_ERR_NONE);
-    if (chdir(realDir) != 0) {
-        const int failure = errno;
-        OrvLibSetErr(codeOfFolderError(failure));
-        syslog(LOG_ERR, "%s:%d Failed to chdir %s. [%s]", kSource, __LINE__, printable(realDir).c_str(),
-               strerror(failure));
-        return false;
-    }
-    const Directory folder(opendir(realDir));
-    if (folder == nullptr) {
-        const int failure = errno;
-        OrvLibSetErr(codeOfFolderError(failure));
-        syslog(LOG_ERR, "%s:%d Failed to opendir %s. [%s]", kSource, __LINE__, printable(realDir).c_str(),
-               strerror(failure));
-        return false;
-    }
-    return true;
-}
 
 int answerWithoutPermissions(const char* realPath) {
     const int reason = VLIBCErrGet();
@@ -92,22 +59,41 @@ bool isExpectedFailure(int reason) {
            reason == VEXO_ERR_NO_ACL;
 }
 
-unsigned permissionsOf(const char* realPath) {
+}  // namespace
+
+bool mayListFolder(const GivenFolder& folder) {
+    OrvLibSetErr(ORV_ERR_NONE);
+    const EnteredFolder entered = folder.enter();
+    if (!entered.folder) reportUnlistable(folder.text(), entered.failure, entered.error);
+    return static_cast<bool>(entered.folder);
+}
+
+void reportUnlistable(const std::string& text, EntryFailure failure, int error) {
+    OrvLibSetErr(folderCodeOf(error));
+    const std::string shown = printable(text);
+    if (failure == EntryFailure::kChangeDirectory) {
+        syslog(LOG_ERR, "%s:%d Failed to chdir %s. [%s]", kSource, __LINE__, shown.c_str(), strerror(error));
+    } else {
+        syslog(LOG_ERR, "%s:%d Failed to opendir %s. [%s]", kSource, __LINE__, shown.c_str(), strerror(error));
+    }
+}
+
+unsigned permissionsOf(const char* path, const char* text) {
     unsigned permission = 0;
-    if (VEXOACLPermGet(realPath, &permission) >= 0) return permission;
+    if (VEXOACLPermGet(path, &permission) >= 0) return permission;
     const int reason = VLIBCErrGet();
     if (!isExpectedFailure(reason)) {
         syslog(LOG_ERR, "%s:%d Failed to get the ACL Privilege: file = %s, euid = %u, reason=[%X]", kSource, __LINE__,
-               printable(realPath).c_str(), geteuid(), static_cast<unsigned>(reason));
+               printable(text).c_str(), geteuid(), static_cast<unsigned>(reason));
     }
     return kEveryBit;
 }
 
-}  // namespace
 }  // namespace orvel
 
 bool CheckDirListPrivilege(const char* realDir) {
-    return orvel::guarded(false, [&] { return orvel::mayListFolder(realDir); });
+    return orvel::guarded(false,
+                          [&] { return realDir != nullptr && orvel::mayListFolder(orvel::GivenFolder(realDir)); });
 }
 
 int ACLAccess(const char* realPath, int requested) {
@@ -115,5 +101,5 @@ int ACLAccess(const char* realPath, int requested) {
 }
 
 unsigned int GetACLPrivilege(const char* realPath) {
-    return orvel::guardedQuietly(orvel::kEveryBit, [&] { return orvel::permissionsOf(realPath); });
+    return orvel::guardedQuietly(orvel::kEveryBit, [&] { return orvel::permissionsOf(realPath, realPath); });
 }

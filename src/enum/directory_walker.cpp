@@ -6,7 +6,8 @@
 namespace {
 
 bool walk(const orvel::WalkRequest& request, const std::string& displayPath, const std::string& realPath) {
-    return orvel::guardedQuietly(false, [&] { return orvel::TreeWalk(request, displayPath, realPath).run(); });
+    return orvel::guardedQuietly(false,
+                                 [&] { return orvel::walkTree(request, displayPath, orvel::GivenFolder(realPath)); });
 }
 
 }  // namespace

@@ -12,20 +12,6 @@ namespace {
 
 constexpr int kNoLink = O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 
-bool isMountRoot(int fd) {
-    struct statx status;
-    return statx(fd, "", AT_EMPTY_PATH, STATX_TYPE, &status) == 0 &&
-           (status.stx_attributes & STATX_ATTR_MOUNT_ROOT) != 0;
-}
-
-// False with errno.
-bool isExpected(int fd, const FolderIdentity& expected, FolderIdentity& met) {
-    if (!identify(fd, met)) return false;
-    if (met == expected || isMountRoot(fd)) return true;
-    errno = ESTALE;
-    return false;
-}
-
 }  // namespace
 
 bool identify(int fd, FolderIdentity& identity) {
@@ -35,17 +21,15 @@ bool identify(int fd, FolderIdentity& identity) {
     return true;
 }
 
-EnteredFolder enterFolder(int parent, const char* name, const FolderIdentity& expected) {
+EnteredFolder enterFolder(int parent, const char* name) {
     Descriptor folder(openat(parent, name, O_RDONLY | O_NONBLOCK | kNoLink));
     const int openError = folder ? 0 : errno;
     // A folder that cannot be read may still be one that can be entered; a failure of entering is the one that counts.
     const Descriptor place(folder ? -1 : openat(parent, name, O_PATH | kNoLink));
     const int fd = folder ? folder.get() : place.get();
-    FolderIdentity met{};
-    if (fd < 0 || !isExpected(fd, expected, met) || fchdir(fd) != 0) {
-        return {Descriptor(), met, EntryFailure::kChangeDirectory, errno};
-    }
-    return {std::move(folder), met, EntryFailure::kOpen, openError};
+    if (fd < 0) return {Descriptor(), failedStep(errno), errno};
+    if (fchdir(fd) != 0) return {Descriptor(), EntryFailure::kChangeDirectory, errno};
+    return {std::move(folder), EntryFailure::kOpen, openError};
 }
 
 Descriptor reopenFolder(int parent, const char* name, const FolderIdentity& expected) {

@@ -1,10 +1,10 @@
-// Opening of a folder inside another one, so that what is opened is the folder that was met there.
+// Opening of a folder inside another one, no link followed.
 #ifndef ORVEL_ENUM_FOLDER_ENTRY_H
 #define ORVEL_ENUM_FOLDER_ENTRY_H
 
 #include <cstdint>
 
-#include "core/owned.h"
+#include "core/given_folder.h"
 
 namespace orvel {
 
@@ -17,21 +17,12 @@ struct FolderIdentity {
 // False with errno.
 [[nodiscard]] bool identify(int fd, FolderIdentity& identity);
 
-enum class EntryFailure { kChangeDirectory, kOpen };
-
-struct EnteredFolder {
-    Descriptor folder;  // for reading; null on failure
-    FolderIdentity identity;
-    EntryFailure failure;
-    int error;  // errno of the failure; ESTALE when another folder took the place
-};
-
-// Makes the folder `name` of `parent` the current directory and opens it. No link is followed, and the folder must be
-// the `expected` one or the root of a mount (one that is mounted when it is first entered had another status before).
-EnteredFolder enterFolder(int parent, const char* name, const FolderIdentity& expected);
+// Makes the folder `name` of `parent` the current directory and opens it. No link is followed; which folder stands
+// under the name is not asked further, since not every file system numbers a folder the same way twice.
+EnteredFolder enterFolder(int parent, const char* name);
 
 // A descriptor of the folder `name` of `parent` that serves as a place alone, without following a link. Null with
-// errno, ESTALE when it is not the `expected` folder.
+// errno, ESTALE when it is not the `expected` folder. A folder keeps its identity while one below it is open.
 Descriptor reopenFolder(int parent, const char* name, const FolderIdentity& expected);
 
 }  // namespace orvel

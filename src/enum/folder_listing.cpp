@@ -6,6 +6,7 @@
 #include <numeric>
 #include <optional>
 
+#include "core/acl_privilege.h"
 #include "core/boundary.h"
 #include "core/owned.h"
 #include "enum/entry_fill.h"
@@ -47,12 +48,14 @@ using PermissionFolder = std::unique_ptr<VEXOACLFOLDER, Releaser<VEXOACLFolderCl
 // Builds the full records of scanned entries.
 class RecordBuilder {
  public:
-    RecordBuilder(int folder, const char* path, const char* realPath, int additional, const ScannedFolder& scanned,
-                  OrvelMountStatus& mounts, OrvelUserEnum& names)
-        : permissions_((additional & ADDITIONAL_PERM) != 0 ? VEXOACLFolderOpen(folder) : nullptr),
+    RecordBuilder(const Descriptor& folder, const char* path, const std::string& realPath, int additional,
+                  const ScannedFolder& scanned, OrvelMountStatus& mounts, OrvelUserEnum& names)
+        : permissions_((additional & ADDITIONAL_PERM) != 0 ? VEXOACLFolderOpen(folder.get()) : nullptr),
           path_(std::string(path) + "/"),
-          realPath_(std::string(realPath) + "/"),
+          realPath_(realPath + "/"),
+          opened_(folder.path("")),
           realPrefix_(realPath_.size()),
+          openedPrefix_(opened_.size()),
           additional_(additional),
           scanned_(scanned),
           mounts_(mounts),
@@ -76,18 +79,21 @@ class RecordBuilder {
 
  private:
     void fillPermissions(const _tag_VEXOSTAT_& status, DIRENTRY_INFO& info) {
+        opened_.resize(openedPrefix_);
+        opened_ += info.name;
         // The folder's quick answer; where it has none, the full question decides and reports.
         if (!permissions_ ||
             VEXOACLFolderPermGet(permissions_.get(), info.name.c_str(), &status, &info.aclPrivilege) < 0) {
-            info.aclPrivilege = GetACLPrivilege(realPath_.c_str());
+            info.aclPrivilege = permissionsOf(opened_.c_str(), realPath_.c_str());
         }
-        info.isAclMode = VEXOACLIsSupportOnDevice(realPath_.c_str(), status.st_device) > 0 ? 1 : 0;
+        info.isAclMode = VEXOACLIsSupportOnDevice(opened_.c_str(), status.st_device) > 0 ? 1 : 0;
     }
 
     PermissionFolder permissions_;
     std::string path_;
     std::string realPath_;  // of the folder, then of the entry at hand
-    size_t realPrefix_;
+    std::string opened_;    // the same by the open folder: what it leads to, however long the real path is
+    size_t realPrefix_, openedPrefix_;
     int additional_;
     const ScannedFolder& scanned_;
     OrvelMountStatus& mounts_;
@@ -139,13 +145,15 @@ bool OrvEnum::OrvLibDirEntryListEnum(const char* path, const char* realPath, con
         }
         *total = 0;
         const int wanted = orvel::widened(additional, sortBy);
-        const orvel::Descriptor folder = orvel::openFolder(realPath);
+        const orvel::GivenFolder given(realPath);
+        const orvel::Descriptor folder = orvel::openFolder(given);
         if (!folder) return false;
         orvel::ScannedFolder scanned;
-        const bool complete = orvel::scanFolder(folder.get(), {realPath, type, wanted, criteria}, mounts_, scanned);
+        const orvel::ScanRequest request{given.text().c_str(), type, wanted, criteria};
+        const bool complete = orvel::scanFolder(folder.get(), request, mounts_, scanned);
         std::optional<orvel::FailureKeeper> keeper;
         if (!complete) keeper.emplace();
-        orvel::RecordBuilder builder(folder.get(), path, realPath, wanted, scanned, mounts_, names_);
+        orvel::RecordBuilder builder(folder, path, given.text(), wanted, scanned, mounts_, names_);
         if (!complete) {
             orvel::appendAll(builder, scanned.entries.size(), entries);
             return false;

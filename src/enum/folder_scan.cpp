@@ -1,12 +1,12 @@
 #include "enum/folder_scan.h"
 
-#include <fcntl.h>
 #include <sys/stat.h>
 #include <syslog.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <utility>
 
 #include "base/printable.h"
 #include "core/boundary.h"
@@ -120,15 +120,16 @@ class Scan {
 
 }  // namespace
 
-Descriptor openFolder(const char* realPath) {
+Descriptor openFolder(const GivenFolder& given) {
     // Entering proves that the folder may be entered, which opening alone does not.
-    if (chdir(realPath) != 0 || chdir("/") != 0) {
-        reportFolder(errno, realPath, false);
+    EnteredFolder entered = given.enter();
+    const bool opening = entered.failure == EntryFailure::kOpen;
+    if (opening && chdir("/") != 0) {
+        reportFolder(errno, given.text().c_str(), false);
         return Descriptor();
     }
-    Descriptor folder(open(realPath, O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC));
-    if (!folder) reportFolder(errno, realPath, true);
-    return folder;
+    if (!entered.folder) reportFolder(entered.error, given.text().c_str(), opening);
+    return std::move(entered.folder);
 }
 
 bool scanFolder(int folder, const ScanRequest& request, OrvelMountStatus& mounts, ScannedFolder& scanned) {

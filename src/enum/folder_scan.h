@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "core/owned.h"
+#include "core/given_folder.h"
 #include "orvel/dir_entry.h"
 #include "orvel/mount_status.h"
 #include "orvel/search_criteria.h"
@@ -16,7 +16,7 @@ namespace orvel {
 
 // Enters and opens the folder, and leaves the working directory at "/". Nothing with the library code set: 410 network
 // mount that does not answer, 407 denied, 408 missing, 402 else (logged).
-Descriptor openFolder(const char* realPath);
+Descriptor openFolder(const GivenFolder& given);
 
 // An entry of which only its place in the order is needed, until it turns out to be on the page.
 struct ScannedEntry {

@@ -2,16 +2,14 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <syslog.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <iterator>
 #include <string>
 #include <vector>
 
 #include "core/boundary.h"
-#include "core/owned.h"
+#include "core/given_folder.h"
 #include "enum/folder_reader.h"
 #include "orvel/directory_walker.h"
 #include "orvel/error_state.h"
@@ -23,19 +21,6 @@ namespace {
 constexpr const char* kSource = "orveldir";
 
 using SubDirs = std::vector<_tag_SUBDIR_ENTRY_INFO_>;
-
-int codeOf(int error) {
-    switch (error) {
-        case ENOENT:
-        case ENOTDIR:
-            return ORV_ERR_MISSING;
-        case EACCES:
-        case EPERM:
-            return ORV_ERR_DENIED;
-        default:
-            return ORV_ERR_DIRECTORY;
-    }
-}
 
 bool fail(int code) {
     OrvLibSetErr(code);
@@ -64,18 +49,18 @@ void appendIfFolder(SubDirs& found, int folder, const std::string& parent, const
     }
 }
 
-bool enumerate(const std::string& realPath, SubDirs& subDirs) {
-    if (chdir(realPath.c_str()) != 0) return fail(codeOf(errno));
-    const orvel::Descriptor folder(open(realPath.c_str(), O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC));
-    if (!folder) return fail(codeOf(errno));
+bool enumerate(const orvel::GivenFolder& given, SubDirs& subDirs) {
+    const orvel::EnteredFolder entered = given.enter();
+    if (!entered.folder) return fail(orvel::folderCodeOf(entered.error));
 
     SubDirs found;
-    const int error = orvel::FolderReader().forEach(folder.get(), [&](const char* name, unsigned char type) {
+    const int folder = entered.folder.get();
+    const int error = orvel::FolderReader().forEach(folder, [&](const char* name, unsigned char type) {
         const bool maybeFolder = type == DT_DIR || type == DT_UNKNOWN;
-        if (maybeFolder && VEXOEAIsHiddenFile(name) == 0) appendIfFolder(found, folder.get(), realPath, name);
+        if (maybeFolder && VEXOEAIsHiddenFile(name) == 0) appendIfFolder(found, folder, given.text(), name);
         return true;
     });
-    if (error != 0) return fail(codeOf(error));  // half a folder must not pass for the whole
+    if (error != 0) return fail(orvel::folderCodeOf(error));  // half a folder must not pass for the whole
 
     subDirs.insert(subDirs.end(), std::make_move_iterator(found.begin()), std::make_move_iterator(found.end()));
     // Kept: what the caller's vector held before is sorted with the rest.
@@ -94,6 +79,6 @@ bool OrvLibEnumSubDir(std::string realPath, std::vector<_tag_SUBDIR_ENTRY_INFO_>
             return fail(ORV_ERR_PARAMETER);
         }
         OrvLibSetErr(ORV_ERR_NONE);
-        return enumerate(realPath, subDirs);
+        return enumerate(orvel::GivenFolder(realPath), subDirs);
     });
 }

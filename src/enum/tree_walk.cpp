@@ -1,14 +1,13 @@
 #include "enum/tree_walk.h"
 
-#include <fcntl.h>
 #include <syslog.h>
-#include <unistd.h>
 
 #include <cerrno>
 #include <cstring>
 #include <utility>
 
 #include "base/printable.h"
+#include "core/boundary.h"
 #include "vexo/error.h"
 #include "vexo/filesystem.h"
 #include "vexo/share.h"
@@ -42,11 +41,9 @@ bool TreeWalk::run() {
 
 // The starting folder may be reached through links. A failure that is passed over leaves no level to walk.
 bool TreeWalk::enterStart() {
-    if (chdir(real_.c_str()) != 0) return passOver(EntryFailure::kChangeDirectory, errno);
-    Descriptor folder(open(real_.c_str(), O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC));
-    FolderIdentity identity{};
-    if (!folder || !identify(folder.get(), identity)) return passOver(EntryFailure::kOpen, errno);
-    push(std::move(folder), identity);
+    EnteredFolder entered = start_.enter();
+    if (!entered.folder) return passOver(entered.failure, entered.error);
+    push(std::move(entered.folder));
     return true;
 }
 
@@ -71,31 +68,29 @@ bool TreeWalk::handleEntry() {
     }
     // Noted ahead of the callback, which may change the record.
     const bool isFolder = (level.status.st_mode & kFileTypeBits) == kFolder;
-    const FolderIdentity identity{level.status.st_device, level.status.st_inode};
     if (!call(request_.before)) return false;
     if (!isFolder) return call(request_.after);
-    if (!inFirstFolder || request_.order == WalkOrder::kDepthFirst) return descend(identity);
-    if (request_.order == WalkOrder::kFirstFolderFirst) pending_.push_back({level.currentName, identity});
+    if (!inFirstFolder || request_.order == WalkOrder::kDepthFirst) return descend();
+    if (request_.order == WalkOrder::kFirstFolderFirst) pending_.push_back(level.currentName);
     return true;
 }
 
 bool TreeWalk::handlePending() {
-    const Pending& pending = pending_[nextPending_++];
     Level& level = levels_.back();
-    level.currentName = pending.name;
+    level.currentName = pending_[nextPending_++];
     setEntry(level);
-    return descend(pending.identity);
+    return descend();
 }
 
-bool TreeWalk::descend(const FolderIdentity& expected) {
-    EnteredFolder entered = enterFolder(levels_.back().folder.get(), name_.c_str(), expected);
+bool TreeWalk::descend() {
+    EnteredFolder entered = enterFolder(levels_.back().folder.get(), name_.c_str());
     if (!entered.folder) return passOver(entered.failure, entered.error) && call(request_.after);
-    push(std::move(entered.folder), entered.identity);
+    push(std::move(entered.folder));
     return true;
 }
 
 // Makes the folder at the current paths the deepest level and reads its names.
-void TreeWalk::push(Descriptor folder, const FolderIdentity& identity) {
+void TreeWalk::push(Descriptor folder) {
     const std::size_t begin = names_.size();
     const int readError = reader_.forEach(folder.get(), [&](const char* name, unsigned char) {
         if (aborted()) return false;
@@ -103,7 +98,7 @@ void TreeWalk::push(Descriptor folder, const FolderIdentity& identity) {
         return true;
     });
     levels_.push_back({.folder = std::move(folder),
-                       .identity = identity,
+                       .identity = {},
                        .firstName = begin,
                        .nextName = begin,
                        .endOfNames = names_.size(),
@@ -114,7 +109,12 @@ void TreeWalk::push(Descriptor folder, const FolderIdentity& identity) {
                        .status = {}});
     const std::size_t depth = levels_.size() - 1;
     // The starting folder stays open: the way back down, should a folder move during the walk, begins there.
-    if (depth > kOpenLevels) levels_[depth - kOpenLevels].folder.reset();
+    if (depth > kOpenLevels) closeFolder(levels_[depth - kOpenLevels]);
+}
+
+// One that cannot be identified could not be told from another on the way back, and stays open.
+void TreeWalk::closeFolder(Level& level) {
+    if (level.folder && identify(level.folder.get(), level.identity)) level.folder.reset();
 }
 
 bool TreeWalk::finishLevel() {
@@ -199,6 +199,10 @@ bool TreeWalk::passOverStatus(int error) const {
     syslog(LOG_ERR, "%s:%d VLIBCFileLStat: (%s), %s, vexoerr=%x.", kSource, __LINE__, printable(real_).c_str(),
            strerror(error), VLIBCErrGet());
     return false;
+}
+
+bool walkTree(const WalkRequest& request, const std::string& displayPath, const GivenFolder& start) {
+    return guardedQuietly(false, [&] { return TreeWalk(request, displayPath, start).run(); });
 }
 
 }  // namespace orvel

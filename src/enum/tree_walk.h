@@ -38,8 +38,9 @@ struct WalkRequest {
 // followed; descriptors of levels far above are closed and opened again on the way back.
 class TreeWalk {
  public:
-    TreeWalk(const WalkRequest& request, const std::string& displayPath, const std::string& realPath)
-        : request_(request), display_(displayPath), real_(realPath) {}
+    // Borrows all of them.
+    TreeWalk(const WalkRequest& request, const std::string& displayPath, const GivenFolder& start)
+        : request_(request), start_(start), display_(displayPath), real_(start.text()) {}
 
     [[nodiscard]] bool run();
 
@@ -47,26 +48,22 @@ class TreeWalk {
     // A folder between its entering and its leaving. The names of its entries stand in names_ from `firstName` to
     // `endOfNames`.
     struct Level {
-        Descriptor folder;  // closed while the walk is far below
-        FolderIdentity identity;
+        Descriptor folder;        // closed while the walk is far below
+        FolderIdentity identity;  // set when it is closed
         std::size_t firstName, nextName, endOfNames;
         std::size_t currentName;                // of the entry being handled
         std::size_t displayLength, realLength;  // of the folder's own paths
         int readError;                          // what ended the reading of the names early
         _tag_VEXOSTAT_ status;                  // of the entry being handled
     };
-    // A folder met in the first folder, entered later.
-    struct Pending {
-        std::size_t name;
-        FolderIdentity identity;
-    };
 
     bool enterStart();
     bool step();
     bool handleEntry();
     bool handlePending();
-    bool descend(const FolderIdentity& expected);
-    void push(Descriptor folder, const FolderIdentity& identity);
+    bool descend();
+    void push(Descriptor folder);
+    static void closeFolder(Level& level);
     bool finishLevel();
     bool leaveLevel();
     void reopenDeepest(int child);
@@ -79,15 +76,19 @@ class TreeWalk {
     [[nodiscard]] bool passOverStatus(int error) const;
 
     const WalkRequest& request_;
-    std::string display_, real_;  // of the entry being handled, or of the level where none is
-    std::string name_;            // of that entry
-    std::string names_;           // of every level, each ended by NUL
-    std::vector<Level> levels_;   // the deepest last
-    std::vector<Pending> pending_;
+    const GivenFolder& start_;
+    std::string display_, real_;        // of the entry being handled, or of the level where none is
+    std::string name_;                  // of that entry
+    std::string names_;                 // of every level, each ended by NUL
+    std::vector<Level> levels_;         // the deepest last
+    std::vector<std::size_t> pending_;  // names of the folders met in the first folder, entered later
     std::size_t nextPending_ = 0;
     bool cancelled_ = false;
     FolderReader reader_;
 };
+
+// One walk; false, too, when memory runs out.
+[[nodiscard]] bool walkTree(const WalkRequest& request, const std::string& displayPath, const GivenFolder& start);
 
 }  // namespace orvel
 

@@ -1,3 +1,4 @@
+#include "base/descriptor.h"
 #include "orvel/privilege.h"
 #include "support/log_texts.h"
 #include "support/testing.h"
@@ -79,6 +80,11 @@ TEST_F(AclPrivilegeTest, EnteringAFolder) {
     EXPECT_TRUE(CheckDirListPrivilege(root.c_str()));
     EXPECT_EQ(OrvLibGetErr(), 0);
     EXPECT_EQ(fs::current_path(), root) << "callers go on from inside the folder";
+    const orvel::Descriptor opened(open((root + "/file").c_str(), O_PATH | O_CLOEXEC));
+    fs::rename(root + "/file", root + "/moved");
+    makeFolder(root + "/file");
+    EXPECT_FALSE(CheckDirListPrivilege(opened.path().c_str())) << "what is open is asked about";
+    EXPECT_EQ(takeLogText(), "orveldir:# Failed to chdir " + root + "/moved. [Not a directory]");
 
     SKIP_WITHOUT_ROOT();
     const std::string closed = root + "/closed", unread = root + "/unread";

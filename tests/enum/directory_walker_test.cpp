@@ -6,6 +6,7 @@
 
 #include <stdexcept>
 
+#include "base/descriptor.h"
 #include "platform/private_mounts.h"
 #include "support/log_texts.h"
 #include "support/system_faults.h"
@@ -13,6 +14,7 @@
 
 namespace {
 
+using orvel::Descriptor;
 using Lines = std::vector<std::string>;
 
 enum class Order { kWalk, kTopDown, kFirstFolder, kFirstFolderOnly };
@@ -236,6 +238,24 @@ TEST_F(Failures, OfTheStartingFolderAndOfAStatus) {
     }
 }
 
+// Opening is what fails then, at the start as below.
+TEST_F(Failures, OfAProcessWithoutDescriptors) {
+    writeFile(root_ + "/a/b/f", "x");
+    inChild([&] {
+        const int lowest = dup(0);
+        close(lowest);
+        for (const auto& [more, failing] : Rows<int, const char*>{{0, ""}, {2, "/a/b"}}) {
+            const rlimit few{static_cast<rlim_t>(lowest + more), 1024};
+            EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &few), 0);
+            EXPECT_FALSE(walk(Order::kTopDown, ENUM_IGNORE_NO_ERR, root_));
+            const rlimit many{1024, 1024};
+            EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &many), 0);
+            EXPECT_EQ(takeLogText(), "orveldir:# Failed to open " + root_ + failing + ", error Too many open files");
+        }
+        return 0;
+    });
+}
+
 TEST_F(Failures, OfReading) {
     makeFolder(root_ + "/a/sub");
     makeFolder(root_ + "/z");
@@ -270,31 +290,55 @@ TEST_F(Failures, OfPermissionsAsAnUnprivilegedUser) {
     chmod(closed.c_str(), 0700);
 }
 
-// A callback puts something else in the place of the folder that it was just called for.
+// A callback puts something else in the place of the folder that it was just called for. A link is not followed; which
+// folder it is must not matter, since some file systems number a folder anew each time that it is looked up.
 TEST_F(DirectoryWalkerTest, FolderReplacedDuringTheWalk) {
-    const std::string outside = addShare("outside", "");
+    const std::string outside = addShare("outside", ""), victim = root_ + "/victim";
     writeFile(outside + "/secret", "x");
-    bool byLink = false;
-    before_.action = [&](const std::string& path, const std::string&) {
-        fs::rename(path, path + ".moved");
-        if (byLink) return symlink(outside.c_str(), path.c_str()) == 0;
-        writeFile(path + "/secret", "x");
-        return true;
-    };
-    for (const Order order : kDeepOrders) {
-        for (const std::string reason : {"Not a directory", "Stale file handle"}) {
-            byLink = reason[0] == 'N';
-            const std::string victim = root_ + "/victim";
+    for (const bool byLink : {true, false}) {
+        before_.action = [&](const std::string& path, const std::string& name) {
+            if (name != "victim") return true;
+            fs::rename(path, outside + "/moved");
+            if (byLink) return symlink(outside.c_str(), path.c_str()) == 0;
+            writeFile(path + "/new", "x");
+            return true;
+        };
+        for (const Order order : kDeepOrders) {
             for (const int errors : {ENUM_IGNORE_ALL_ERR, ENUM_IGNORE_NO_ERR}) {
                 writeFile(victim + "/f", "x");
-                EXPECT_EQ(walk(order, errors, root_), errors == ENUM_IGNORE_ALL_ERR);
-                EXPECT_EQ(lines_.front() + std::to_string(lines_.size()),
-                          order == Order::kWalk && errors == ENUM_IGNORE_ALL_ERR ? "show/victim2" : "show/victim1");
+                EXPECT_EQ(walk(order, errors, root_), !byLink || errors == ENUM_IGNORE_ALL_ERR);
+                std::erase_if(lines_, isClosing);
+                EXPECT_EQ(lines_, byLink ? Lines{"show/victim"} : (Lines{"show/victim", "show/victim/new"}));
                 fs::remove_all(victim);
-                fs::remove_all(victim + ".moved");
+                fs::remove_all(outside + "/moved");
             }
-            EXPECT_EQ(takeLogText(), "orveldir:# Failed to chdir " + victim + ". [" + reason + "]");
+            EXPECT_EQ(takeLogText(), byLink ? "orveldir:# Failed to chdir " + victim + ". [Not a directory]" : "");
         }
+    }
+}
+
+// What the caller holds open is walked, wherever it lies by now, and called by where it was found.
+TEST_F(DirectoryWalkerTest, AnOpenFolder) {
+    makeTree();
+    addMount(root_, "ext4");
+    writeFile(root_ + "/#recycle/thrown away", "x");
+    for (const Order order : kOrders) {
+        const Descriptor opened(open(root_.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+        Lines all = expected(order), paths;
+        std::erase_if(all, [](const auto& line) { return line.find("show/#recycle") != std::string::npos; });
+        before_.action = [&](const std::string& path, const std::string&) { return paths.push_back(path), true; };
+        EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, opened.path(), nullptr, true));
+        EXPECT_EQ(lines_, all) << "the share's bin is known by its real path";
+        for (const std::string& path : paths) EXPECT_TRUE(path.starts_with(root_ + "/")) << path;
+
+        const Descriptor inner(open((root_ + "/a").c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+        fs::rename(root_ + "/a", root_ + "/moved");
+        fs::create_symlink("b", root_ + "/a");
+        paths.clear();
+        EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, inner.path()));
+        EXPECT_TRUE(!paths.empty() && paths.front().starts_with(root_ + "/moved/"));
+        fs::remove(root_ + "/a");
+        fs::rename(root_ + "/moved", root_ + "/a");
     }
 }
 

@@ -4,8 +4,10 @@
 
 #include <climits>
 
+#include "base/descriptor.h"
 #include "orvel/privilege.h"
 #include "orvel/search_criteria.h"
+#include "support/refuse_calls.h"
 #include "support/system_faults.h"
 #include "support/testing.h"
 #include "vexo/acl.h"
@@ -89,6 +91,63 @@ TEST_F(ListingTest, FolderThatCannotBeListed) {
     EXPECT_FALSE(
         listing_.OrvLibDirEntryListEnum("/", "/tmp", "name", 0, 0, 0, true, DIR_ENTRY_TYPE_ALL, {}, entries_, nullptr));
     EXPECT_EQ(OrvLibGetErr(), 400);
+}
+
+// What the caller holds open is listed, wherever it lies by now; what goes by text gets the path where it was found.
+TEST_F(ListingTest, AnOpenFolder) {
+    const std::string listed = real_ + "/listed", moved = real_ + "/moved";
+    for (const char* name : {"/listed/disc", "/other/secret"}) makeFolder(real_ + name);
+    file("listed/f");
+    const orvel::Descriptor opened(open(listed.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    fs::rename(listed, moved);
+    fs::create_symlink("other", listed);
+    addMount(moved + "/disc", "cifs");
+    addMount(moved, "nfs");
+    const auto ask = [&] {
+        entries_.clear();
+        return OrvEnum().OrvLibDirEntryListEnum("/photo/listed", opened.path().c_str(), "name", kEverything, 0, 0, true,
+                                                DIR_ENTRY_TYPE_ALL, {}, entries_, &total_);
+    };
+    ASSERT_TRUE(ask());
+    ASSERT_EQ(namesOf(entries_), (Names{"disc", "f"}));
+    EXPECT_EQ(entries_.front().realPath + entries_.front().mountPointType, moved + "/discremote");
+    EXPECT_EQ(entries_.back().path + entries_.back().realPath, "/photo/listed/f" + moved + "/f");
+    EXPECT_EQ(entries_.back().aclPrivilege, GetACLPrivilege((moved + "/f").c_str())) << "the parent has its say";
+    {
+        const ReadingFault fault(moved, EACCES);
+        EXPECT_FALSE(ask());
+        EXPECT_EQ(OrvLibGetErr(), ORV_ERR_DENIED);
+    }
+    vexo::gate::fail("VEXOACLFolderPermGet", VEXO_ERR_GENERAL);
+    vexo::gate::fail("VEXOACLPermGet", VEXO_ERR_GENERAL);
+    announceLog("Failed to get the ACL Privilege: file = " + moved + "/disc");
+    announceLog("Failed to get the ACL Privilege: file = " + moved + "/f");
+    EXPECT_TRUE(ask());
+    inChild([&] {
+        EXPECT_TRUE(refuseCalls({{SYS_fchdir, EHOSTDOWN}, {SYS_chdir, EHOSTDOWN}}));
+        EXPECT_FALSE(ask());
+        EXPECT_EQ(OrvLibGetErr(), ORV_ERR_REMOTE) << "a mount by its real path";
+        return 0;
+    });
+}
+
+// Whether a file system keeps ACLs is known of an entry whose path is longer than the kernel takes, too.
+TEST_F(ListingTest, AnEntryDeeperThanAPath) {
+    std::string deep = real_;
+    while (deep.size() < 3900) deep += "/" + std::string(90, 'd');
+    makeFolder(deep);
+    ASSERT_EQ(chdir(deep.c_str()), 0);
+    const std::string name(200, 'f');
+    writeFile("./" + name, "x");
+    file("shallow");
+    inChild([&] {  // which knows nothing of the device yet
+        EXPECT_TRUE(listing_.OrvLibDirEntryListEnum("/photo", deep.c_str(), "name", kEverything, 0, 0, true,
+                                                    DIR_ENTRY_TYPE_ALL, {}, entries_, &total_));
+        const int known = entries_.empty() ? -1 : static_cast<int>(entries_.back().isAclMode);
+        EXPECT_EQ(known, VEXOACLIsSupport((real_ + "/shallow").c_str(), -1, 2) > 0 ? 1 : 0);
+        return 0;
+    });
+    ASSERT_EQ(unlink(name.c_str()) + chdir("/"), 0);
 }
 
 TEST_F(ListingTest, FolderOfAnotherUser) {

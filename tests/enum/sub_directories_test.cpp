@@ -1,3 +1,4 @@
+#include "base/descriptor.h"
 #include "orvel/directory_walker.h"
 #include "support/log_texts.h"
 #include "support/system_faults.h"
@@ -70,6 +71,20 @@ TEST_F(SubDirectoriesTest, ListsFoldersSortedWithoutCase) {
               std::make_tuple(root_ + "/A", status.st_size, S_IFDIR | 0750U, 1234567890, status.st_uid, status.st_gid));
     EXPECT_TRUE(!folder.isMountPoint && folder.mountType.empty());
     EXPECT_EQ(fs::current_path(), root_);
+}
+
+// What the caller holds open is listed, wherever it lies by now, and its mounts are known by where that is.
+TEST_F(SubDirectoriesTest, AnOpenFolder) {
+    const std::string chosen = root_ + "/chosen", moved = root_ + "/moved";
+    for (const char* name : {"/disk", "/plain"}) makeFolder(chosen + name);
+    const orvel::Descriptor opened(open(chosen.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    fs::rename(chosen, moved);
+    fs::create_symlink("/etc", chosen);
+    addMount(moved + "/disk", "ext4");
+    std::vector<_tag_SUBDIR_ENTRY_INFO_> found;
+    ASSERT_TRUE(OrvLibEnumSubDir(opened.path(), found));
+    ASSERT_EQ(found.size(), 2U);
+    EXPECT_EQ(found[0].path + found[0].mountType + found[1].path, moved + "/diskext4" + moved + "/plain");
 }
 
 TEST_F(SubDirectoriesTest, MountPoints) {
