@@ -8,6 +8,8 @@
 #ifndef ORVEL_SEARCH_WALKER_H
 #define ORVEL_SEARCH_WALKER_H
 
+#include <cstddef>
+#include <cstdint>
 #include <map>
 #include <memory>
 #include <optional>
@@ -24,23 +26,33 @@
 
 namespace FileSearch {
 
+// Which file or folder stood at a path.
+struct FileMark {
+    uint64_t device;
+    uint64_t inode;
+};
+
 // The chosen folders by share name, in ascending byte order; within a share in the order of their insertion.
 class ORVEL_API SearchShareDirMap {
  public:
     using Shares = std::map<std::string, std::vector<PathInfo>>;
 
-    // Adds the folder at a share-relative path. A folder that the user may not list, and a recycle bin, is passed over:
-    // true. A folder of the user's home goes under "homes": share name, path ("/homes/<user>/...") and share root are
-    // those of that share. False when the path cannot be resolved, with the platform error of PathInfoFactory::create.
-    // Side effect: the current directory may become the folder.
+    // Adds the folder at a share-relative path and notes which one it is. A folder that the user may not list, one that
+    // is reached by a link or ".." out of the share, and a recycle bin, is passed over: true. A folder of the user's
+    // home goes under "homes": share name, path ("/homes/<user>/...") and share root are those of that share. False
+    // when the path cannot be resolved, with the platform error of PathInfoFactory::create. Side effect: the current
+    // directory may become the folder.
     bool insertDir(const char* user, const char* sid, const std::string& folder);
 
     // The folders chosen in a share; null when there are none. Valid until the next insertion.
     [[nodiscard]] const std::vector<PathInfo>* findShare(const std::string& share) const;
     [[nodiscard]] const Shares& shares() const { return shares_; }
+    // What stood at the path of the folder at `position` of a share when it was inserted.
+    [[nodiscard]] const FileMark& markOf(const std::string& share, std::size_t position) const;
 
  private:
     Shares shares_;
+    std::map<std::string, std::vector<FileMark>> marks_;  // at the same positions
 };
 
 // Adds a record of each entry it is called for to a result database. Entries that are not in a share, and records that
@@ -116,12 +128,14 @@ class ORVEL_API OrvSearchWalker {
     // The first step of init: fills the folder map. True, too, when the cancel flag ended it early.
     bool BuildDirMap(const std::vector<std::string>& folders);
 
-    // Searches. `accessTimeCriteria`: those of the criteria that ask for access times, which an index cannot know. True
-    // when everything was searched or the search was cancelled; the results so far stay. Where some could not be stored
-    // it is true as well, with the platform error of the last of them. False with the platform error
-    // 0x0D00 (not initialised, or the index failed), 0x0600 or 0x0300 (a chosen folder is missing or denied; not
-    // logged), 0x8100 (another failure of its status), 0x8000 (the walk failed). A chosen path that is no folder is
-    // passed over. Side effect: the current directory.
+    // Searches. A folder is walked only if it is still the one that was chosen, opened beneath its share's root;
+    // another one in its place, or a way there that leads out of the share meanwhile, makes it missing.
+    // `accessTimeCriteria`: those of the criteria that ask for access times, which an index cannot know. True when
+    // everything was searched or the search was cancelled; the results so far stay. Where some could not be stored it
+    // is true as well, with the platform error of the last of them. False with the platform error 0x0D00 (not
+    // initialised, or the index failed), 0x0600 or 0x0300 (a chosen folder is missing or denied; not logged), 0x8100
+    // (another failure of its status), 0x8000 (the walk failed). A chosen path that is no folder is passed over. Side
+    // effect: the current directory.
     bool Walk(const std::vector<FindATimeComp*>& accessTimeCriteria);
     // Takes the matches of one indexed share from the file index; called by Walk.
     bool WalkDB(const std::string& shareName, const std::vector<PathInfo>& folders,
@@ -138,14 +152,12 @@ class ORVEL_API OrvSearchWalker {
     [[nodiscard]] bool prepare(const std::vector<std::string>& folders, const std::vector<FindComp*>& criteria);
     [[nodiscard]] bool makeTask(const std::vector<FindComp*>& criteria);
     [[nodiscard]] bool search(const std::vector<FindATimeComp*>& accessTimeCriteria);
-    [[nodiscard]] bool searchIndexed(const std::string& shareName, std::vector<PathInfo> folders,
-                                     const std::vector<FindATimeComp*>& accessTimeCriteria);
-    [[nodiscard]] bool walkShare(const std::vector<PathInfo>& folders);
-    [[nodiscard]] bool walkFolder(const PathInfo& folder);
+    [[nodiscard]] bool searchShare(const std::string& shareName, const std::vector<PathInfo>& folders,
+                                   const std::vector<FindATimeComp*>& accessTimeCriteria);
+    [[nodiscard]] bool walkFolder(const PathInfo& folder, const FileMark& mark);
     [[nodiscard]] bool askIndex(const std::string& shareName, const std::vector<PathInfo>& folders,
                                 const std::vector<FindATimeComp*>& accessTimeCriteria);
 
-    std::unique_ptr<OrvDirectoryWalker> walker_;
     std::unique_ptr<OrvSearchCompWalkerCB> callback_;
     int* cancelFlag_;
     bool currentFolderOnly_ = false;

@@ -1,8 +1,10 @@
 // A search in a share that the file index covers.
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <algorithm>
 
+#include "base/beneath.h"
 #include "core/boundary.h"
 #include "orvel/search_walker.h"
 #include "vexo/user.h"
@@ -36,7 +38,7 @@ class PathConditions {
 };
 
 struct AccessTest {
-    const std::string& shareRoot;
+    orvel::Descriptor root;  // of the share
     const std::vector<FindATimeComp*>& criteria;
 };
 
@@ -44,9 +46,11 @@ struct AccessTest {
 BOOL testAccessTime(__tag_FI_FILE_INFO_DATA* record, void* argument) {
     return orvel::guardedQuietly(0, [&] {
         const auto& test = *static_cast<const AccessTest*>(argument);
-        const std::string path = test.shareRoot + "/" + record->szPath;
+        const std::string parent = *record->szParent == '\0' ? "." : record->szParent;
+        const orvel::Descriptor folder =
+            orvel::openBeneath(test.root, parent, orvel::LinkPolicy::kNone, O_PATH | O_DIRECTORY);
         _tag_VEXOSTAT_ status{};
-        if (VLIBCFileLStat(path.c_str(), kStatusFlags, &status) < 0) return 0;
+        if (!folder || VLIBCFileLStatAt(folder.get(), record->szName, kStatusFlags, &status) < 0) return 0;
         record->accessed = status.st_access;
         return std::all_of(test.criteria.begin(), test.criteria.end(),
                            [&](FindATimeComp* one) { return (*one)(record->szName, status); })
@@ -78,7 +82,8 @@ bool OrvSearchWalker::askIndex(const std::string& shareName, const std::vector<P
     DirPrivilegeMap verdicts(folders.front().shareRoot, folders);
     const bool asksTimes = !accessTimeCriteria.empty();
     const bool asksFolders = !seesEverything(user_);
-    AccessTest times{folders.front().shareRoot, accessTimeCriteria};
+    AccessTest times{orvel::Descriptor(open(folders.front().shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC)),
+                     accessTimeCriteria};
     return FILEIDXResultGetAndTableGen(shareName.c_str(), paths.head(), root_, database_.c_str(),
                                        asksTimes ? testAccessTime : nullptr, &times, cancelFlag_,
                                        asksFolders ? testFolder : nullptr, &verdicts) >= 0;

@@ -1,5 +1,13 @@
 // The chosen folders, grouped by share.
+#include <fcntl.h>
+
+#include <cerrno>
+#include <utility>
+
+#include "base/beneath.h"
+#include "core/acl_privilege.h"
 #include "core/boundary.h"
+#include "enum/folder_entry.h"
 #include "orvel/privilege.h"
 #include "orvel/search_walker.h"
 #include "orvel/share_path.h"
@@ -19,6 +27,16 @@ void moveToHomes(PathInfo& info) {
     info.shareRoot.resize(within - 1);
 }
 
+// Opens the folder, which must lie beneath its share's root, as a place. Null when it cannot be listed, logged.
+orvel::Descriptor openChosen(const PathInfo& info) {
+    using namespace orvel;
+    const Descriptor root(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    const std::string path = pathBelow(info.shareRoot, info.realPath);
+    Descriptor place = root ? openBeneath(root, path, LinkPolicy::kInside, O_PATH | O_DIRECTORY) : Descriptor();
+    if (!place) reportUnlistable(info.realPath, failedStep(errno), errno);
+    return place;
+}
+
 }  // namespace
 
 bool SearchShareDirMap::insertDir(const char* user, const char* sid, const std::string& folder) {
@@ -27,11 +45,19 @@ bool SearchShareDirMap::insertDir(const char* user, const char* sid, const std::
         PathInfo info;
         if (!PathInfoFactory::create(user, folder, info)) return false;
         if (VEXOShareIsShareRecycle(info.realPath.c_str()) == 1) return true;
-        if (!CheckDirListPrivilege(info.realPath.c_str())) return true;
+        orvel::Descriptor place = openChosen(info);
+        orvel::FolderIdentity identity{};
+        if (!place || !orvel::identify(place.get(), identity)) return true;
+        if (!orvel::mayListFolder(orvel::GivenFolder(std::move(place), info.realPath))) return true;
         if (IsDirUserHome(info.shareName, nullptr)) moveToHomes(info);
+        marks_[info.shareName].push_back({identity.device, identity.inode});
         shares_[info.shareName].push_back(info);
         return true;
     });
+}
+
+const FileMark& SearchShareDirMap::markOf(const std::string& share, std::size_t position) const {
+    return marks_.at(share).at(position);
 }
 
 const std::vector<PathInfo>* SearchShareDirMap::findShare(const std::string& share) const {

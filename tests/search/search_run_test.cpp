@@ -60,6 +60,16 @@ TEST_F(SearchRunTest, WhatInitRefuses) {
         EXPECT_TRUE(log.size() == 1 && log[0].starts_with(only("Fail to ceate DB /tmp/@tmp/orvel/PXSearch/alice/")));
         EXPECT_FALSE(run.ready || run.walker.Walk({}));
 
+        // What lies outside the share, or is reached that way, cannot be chosen.
+        fs::create_symlink(shareRoot("docs"), shareRoot("photo") + "/out");
+        makeFolder(shareRoot("photo") + "/in");
+        SearchShareDirMap confined;
+        for (const char* folder : {"/photo/out", "/photo/in/../../", "/home/../bob", "/photo/in"})
+            EXPECT_TRUE(confined.insertDir("alice", nullptr, folder));
+        EXPECT_EQ(takeLogTexts().size(), 3U);
+        ASSERT_EQ(confined.shares().size(), 1U);
+        EXPECT_EQ(confined.findShare("photo")->size(), 1U);
+
         // What is refused silently does not hinder the others; a home is what it is on disk.
         SearchShareDirMap map;
         for (const char* folder : {"/photo/#recycle", "/photo/x/../", "/home/sub/", "/photo", "/photo/none"})
@@ -74,8 +84,13 @@ TEST_F(SearchRunTest, WhatInitRefuses) {
 
 TEST_F(SearchRunTest, WhatAWalkMeets) {
     SKIP_WITHOUT_ROOT();
-    const std::string folder = shareRoot("photo") + "/chosen";
+    const std::string up = shareRoot("photo") + "/up", folder = up + "/chosen";
+    const std::string elsewhere = fs::path(shareRoot("docs")).filename();
+    makeFolder(shareRoot("docs") + "/chosen", 0755);
     const auto replace = [](const std::string& path) { fs::remove_all(path), writeFile(path, ""); };
+    const auto lead = [](const std::string& path, const std::string& target) {
+        fs::rename(path, path + "-away"), fs::create_symlink(target, path);
+    };
     FindTypeComp files(false);
     const std::vector<FindComp*> all{&files};
     for (const auto& [error, change] : Rows<int, std::function<void()>>{
@@ -84,13 +99,18 @@ TEST_F(SearchRunTest, WhatAWalkMeets) {
              {VEXO_ERR_DENIED, [&] { chmod(shareRoot("photo").c_str(), 0700); }},
              {VEXO_ERR_GENERAL, [&] { replace(shareRoot("photo")); }},
              {0, [&] { replace(folder); }},
-             {0, [&] { fs::remove(folder), fs::create_symlink("/tmp", folder); }},
+             {0, [&] { lead(folder, "/tmp"); }},
+             // Only what was chosen is walked, and no way that leads out of the share leads there.
+             {VEXO_ERR_MISSING, [&] { fs::rename(folder, folder + "-away"), makeFolder(folder, 0755); }},
+             {VEXO_ERR_MISSING, [&] { lead(up, shareRoot("docs")); }},
+             {VEXO_ERR_MISSING, [&] { lead(up, "../" + elsewhere); }},
+             {0, [&] { lead(up, "up-away"); }},
          }) {
         SCOPED_TRACE(error);
         makeFolder(folder, 0755);
         inOwnProcess([&, expected = error, change = change] {
             EXPECT_EQ(OrvLibUGIDSet(nullptr, "bob"), 0);
-            OneSearch run("bob", {"/photo/chosen"}, all);
+            OneSearch run("bob", {"/photo/up/chosen"}, all);
             EXPECT_TRUE(run.ready && seteuid(0) == 0);
             change();
             EXPECT_EQ(seteuid(kBobUid), 0);
@@ -116,6 +136,24 @@ TEST_F(SearchRunTest, WhatAWalkMeets) {
         vexo::gate::fail("FILEIDXResultGetAndTableGen", VEXO_ERR_GENERAL, EIO);
         EXPECT_FALSE(run.walker.Walk({}));
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_PARAMETER);
+    });
+}
+
+// Chosen folders are opened when their turn comes.
+TEST_F(SearchRunTest, ManyFoldersTakeFewDescriptors) {
+    std::vector<std::string> folders;
+    for (int i = 0; i < 500; ++i) {
+        folders.push_back("/photo/" + std::to_string(i));
+        writeFile(shareRoot("photo") + "/" + std::to_string(i) + "/f", "");
+    }
+    inOwnProcess([&] {
+        const int before = openDescriptors();
+        int most = 0;
+        Probe probe([&](int) { most = std::max(most, openDescriptors()); });
+        OneSearch run("alice", folders, probe.alone);
+        EXPECT_TRUE(run.ready && run.walker.Walk({}));
+        EXPECT_EQ(probe.seen, 500);
+        EXPECT_LE(most, before + 8);
     });
 }
 
