@@ -34,7 +34,7 @@ struct PrivilegeReason {
     std::string fsType;     // name of the file system's type, "unknown" for one that the platform has no name for
     bool remote = false;    // on a network mount: the file itself is not looked at, its server may be dead
     bool readOnly = false;  // on a read-only mount
-    bool exists = false;    // as far as the calling identity can see
+    bool exists = false;    // as far as the calling identity can see, and the path leads nowhere outside the share
     unsigned aclBits = 0;   // of the calling identity, as GetACLPrivilege; 0 when the file does not exist
 };
 

@@ -233,6 +233,21 @@ TEST_F(PrivilegeTest, Explanations) {
     makeFolder(shareRoot("homes") + "/alice");
     ASSERT_TRUE(ExplainPrivilege("/home/x", "alice", nullptr, reason));
     EXPECT_EQ(reason.rule, PrivilegeRule::kHome);
+    // What lies outside the share, or is reached that way, is told to nobody; a link within it is.
+    fs::create_symlink("/etc", shareRoot("mixed") + "/out");
+    fs::create_symlink("a", shareRoot("mixed") + "/in");
+    for (const auto& [path, seen] : Rows<std::string, bool>{{"/mixed/../../etc/passwd", false},
+                                                            {"/home/../../../etc/passwd", false},
+                                                            {"/mixed/out", false},
+                                                            {"/mixed/out/passwd", false},
+                                                            {"/mixed", true},
+                                                            {"/mixed/./in", true}}) {
+        ASSERT_TRUE(ExplainPrivilege(path.c_str(), "alice", nullptr, reason)) << path;
+        EXPECT_TRUE(reason.exists == seen && (reason.aclBits != 0) == seen && !reason.readOnly) << path;
+    }
+    vexo::gate::fail("VEXOACLFolderPermGet", VEXO_ERR_GENERAL, EIO);
+    EXPECT_FALSE(ExplainPrivilege("/mixed/a", "alice", nullptr, reason)) << "rights that could not be asked";
+    vexo::gate::reset();
     for (const auto& [path, code] : Rows<const char*, int>{{"/none", 408}, {nullptr, 401}}) {
         EXPECT_FALSE(ExplainPrivilege(path, "alice", nullptr, reason));
         EXPECT_EQ(OrvLibGetErr(), code);

@@ -14,6 +14,7 @@
 
 #include "orvel/error_state.h"
 #include "orvel/upload_check.h"
+#include "temporary_folder.h"
 
 namespace orvel::cgi {
 namespace {
@@ -69,12 +70,6 @@ void removeAbandoned(const Descriptor& folder) {
     closedir(names);
 }
 
-bool isOnlyOurs(const Descriptor& folder) {
-    struct stat status {};
-    return fstat(folder.get(), &status) == 0 && S_ISDIR(status.st_mode) && status.st_uid == geteuid() &&
-           (status.st_mode & 0077) == 0;
-}
-
 }  // namespace
 
 Spool::~Spool() {
@@ -83,11 +78,11 @@ Spool::~Spool() {
 
 // "@tmp/orvel" is everybody's to write in: nothing in it is used that is not the caller's alone.
 int Spool::openFolder(const std::string& volumePath) {
-    const std::string path = volumePath + "/@tmp/orvel/upload-" + std::to_string(geteuid());
-    if (mkdir(path.c_str(), 0700) != 0 && errno != EEXIST) return codeOfWrite(errno);
-    folder_ = Descriptor(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-    if (!folder_ && errno != ENOTDIR && errno != ELOOP) return codeOfWrite(errno);
-    return folder_ && isOnlyOurs(folder_) ? ORV_ERR_NONE : ConvUploadErrnoToAPIErr(CGI_UPLOAD_DENIED);
+    const Descriptor temporary = openTemporaryFolder(volumePath);
+    if (temporary) folder_ = openOwnFolder(temporary, "upload-" + std::to_string(geteuid()));
+    if (folder_) return ORV_ERR_NONE;
+    const bool inTheWay = errno == ENOTDIR || errno == ELOOP;
+    return inTheWay ? ConvUploadErrnoToAPIErr(CGI_UPLOAD_DENIED) : codeOfWrite(errno);
 }
 
 int Spool::open(const std::string& volumePath) {

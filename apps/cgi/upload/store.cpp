@@ -14,6 +14,7 @@
 #include "orvel/upload_check.h"
 #include "reply.h"
 #include "shown_search.h"
+#include "temporary_folder.h"
 
 namespace orvel::cgi {
 namespace {
@@ -22,6 +23,7 @@ volatile std::sig_atomic_t terminated = 0;
 
 // The volume's temporary folder is made while the process still may; where it cannot be, the spool says so.
 void prepareVolume(std::string volumePath) {
+    static_cast<void>(openTemporaryFolder(volumePath));
     static_cast<void>(OrvCreateTmpDir(volumePath.data()));
     umask(022);  // that of every other file
 }
@@ -45,7 +47,9 @@ int Upload::begin() {
     if (!OrvCheckReservedName(path_.substr(path_.rfind('/') + 1).c_str())) return lastCode();
     prepareVolume(info_.volumePath);
     const char* user = user_.name.c_str();
-    if (!CheckShareUploadPrivilege(user, user_.sid.c_str(), path_.c_str(), mode_)) return lastCode();
+    // The share's rules alone, as yet: what is at the path shows once the process is the user (see inspect()).
+    _tag__type_ rules = OVERWRITE_MODE_SKIP;
+    if (!CheckShareUploadPrivilege(user, user_.sid.c_str(), path_.c_str(), rules)) return lastCode();
     const int code = actAs(user_.sid.c_str(), user_.name, IsDirUserHome(path_, nullptr));
     if (code != ORV_ERR_NONE) return code;
     return inspect();
@@ -57,6 +61,7 @@ int Upload::inspect() {
     Target target;
     std::string within;
     int code = previewTarget(info_, linkPolicyOf(info_.shareName), target, within);
+    if (code == ORV_ERR_PARAMETER && mode_ == OVERWRITE_MODE_ERROR) return ORV_ERR_EXISTS;  // a share's root
     if (code != ORV_ERR_NONE) return code;
     struct stat status {};
     const bool there =
