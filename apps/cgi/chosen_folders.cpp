@@ -18,8 +18,9 @@ int chooseFolder(const User& user, const std::string& path, std::string& folder)
     OrvLibSetErr(ORV_ERR_NONE);
     if (!PathInfoFactory::create(user.name.c_str(), path, info)) return lastCode();
     if (!CheckShareListPrivilege(user.name.c_str(), sid, info.path.c_str())) return ORV_ERR_DENIED;
+    Descriptor opened;  // the library opens it again beneath the root and notes which it is
     std::string realPath;
-    const int code = confinedFolder(info, linkPolicyOf(info.shareName), realPath);
+    const int code = confinedFolder(info, linkPolicyOf(info.shareName), opened, realPath);
     if (code != ORV_ERR_NONE) return code;
     folder = "/" + definedShareName(info.shareName) + realPath.substr(info.shareRoot.size());
     return ORV_ERR_NONE;

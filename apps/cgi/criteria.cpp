@@ -96,6 +96,11 @@ int Criteria::add(_tag_FIND_FIELD_ field, const char* op, const std::string& val
     return ORV_ERR_NONE;
 }
 
+int Criteria::addNames(const std::string& patterns) {
+    const std::string usable = usablePatterns(patterns, false);
+    return usable.empty() ? static_cast<int>(ORV_ERR_PARAMETER) : add(FIND_NAME, nullptr, usable);
+}
+
 const std::vector<std::string>& criterionNames() {
     static const std::vector<std::string> names = [] {
         std::vector<std::string> made;

@@ -29,6 +29,9 @@ class Criteria {
 
     // As FindFactory::createFindOp. 0 or its library code.
     int add(FileSearch::_tag_FIND_FIELD_ field, const char* op, const std::string& value);
+    // Adds the names that match one of the patterns, which are separated by commas. 400, too, for a pattern over 490
+    // bytes and for more than 100 of them.
+    int addNames(const std::string& patterns);
     [[nodiscard]] const std::vector<FileSearch::FindComp*>& list() const { return list_; }
     // Those that ask about access times, which an index cannot know.
     [[nodiscard]] const std::vector<FileSearch::FindATimeComp*>& accessTimes() const { return accessTimes_; }

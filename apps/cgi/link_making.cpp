@@ -17,7 +17,8 @@ namespace {
 
 constexpr std::int64_t kDay = 86400;
 
-// May the user, as whom the process acts, download the path? It must be there.
+// May the user, as whom the process acts, download the path? It must be there. Published is where it leads now: links
+// and ".." in it could lead elsewhere later, to what the user never meant to show.
 int judgePath(const LinkWish& wish, std::string& path) {
     PathInfo info;
     OrvLibSetErr(ORV_ERR_NONE);
@@ -26,8 +27,12 @@ int judgePath(const LinkWish& wish, std::string& path) {
     const char* sid = wish.sid.empty() ? nullptr : wish.sid.c_str();
     if (!CheckShareDownloadPrivilege(wish.user.c_str(), sid, info.path.c_str())) return lastCode(ORV_ERR_DENIED);
     Descriptor found;
-    path = info.path;
-    return confinedOpen(info, linkPolicyOf(info.shareName), O_RDONLY | O_NONBLOCK | O_NOCTTY, found);
+    const int code = confinedOpen(info, linkPolicyOf(info.shareName), O_RDONLY | O_NONBLOCK | O_NOCTTY, found);
+    if (code != ORV_ERR_NONE) return code;
+    const auto within = pathInShare(info, found);
+    if (!within) return ORV_ERR_MISSING;
+    path = "/" + info.shareName + *within;
+    return ORV_ERR_NONE;
 }
 
 }  // namespace

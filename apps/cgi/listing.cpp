@@ -1,9 +1,11 @@
 #include "listing.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 
 #include "confined.h"
 #include "criteria.h"
@@ -43,6 +45,13 @@ const char* sidOf(const ListRequest& request) {
     return request.sid.empty() ? nullptr : request.sid.c_str();
 }
 
+// The library calls entries by where the open folder lies, the program by the share's root, to which links may lead.
+void putRealPaths(Listing& listing, const std::string& realPath) {
+    for (DIRENTRY_INFO& entry : listing.entries) {
+        if (!entry.realPath.empty()) entry.realPath = realPath + "/" + entry.name;
+    }
+}
+
 }  // namespace
 
 int additionalBits(std::string_view words) {
@@ -62,7 +71,6 @@ ReturnToFolder::~ReturnToFolder() {
 }
 
 int listFolder(const ListRequest& request, Listing& listing) {
-    const ReturnToFolder back;
     PathInfo info;
     // The top level is the share listing's; the answer is that of the folder listing, which resolution would pre-empt.
     if (request.path == "/") return ORV_ERR_DENIED;
@@ -73,24 +81,33 @@ int listFolder(const ListRequest& request, Listing& listing) {
     if (!CheckShareListPrivilege(request.user.c_str(), sidOf(request), info.path.c_str()))
         return lastCode(ORV_ERR_DENIED);
 
+    Descriptor folder;
     std::string realPath;
-    const int refusal = confinedFolder(info, linkPolicyOf(info.shareName), realPath);
-    if (refusal != ORV_ERR_NONE) return refusal;
-    if (!CheckDirListPrivilege(realPath.c_str())) return lastCode();
+    const int refusal = confinedFolder(info, linkPolicyOf(info.shareName), folder, realPath);
+    return refusal != ORV_ERR_NONE ? refusal : listOpened(request, folder, info.path, realPath, listing);
+}
 
+int listOpened(const ListRequest& request, const Descriptor& folder, const std::string& path,
+               const std::string& realPath, Listing& listing) {
+    const ReturnToFolder back;
+    struct stat status {};
+    if (fstat(folder.get(), &status) != 0) return refusalCode(errno, realPath);
+    if (!S_ISDIR(status.st_mode)) return ORV_ERR_MISSING;
     Criteria criteria;
     if (!request.pattern.empty()) {
-        const int code = criteria.add(FileSearch::FIND_NAME, nullptr, request.pattern);
+        const int code = criteria.addNames(request.pattern);
         if (code != ORV_ERR_NONE) return code;
     }
     OrvEnum enumeration;
     const bool withIcon = (request.additional & kAdditionalIcon) != 0;  // that of a folder is found by its real path
     const int additional = (request.additional & ~kAdditionalIcon) | (withIcon ? ADDITIONAL_REAL_PATH : 0);
     const bool listed = enumeration.OrvLibDirEntryListEnum(
-        info.path.c_str(), realPath.c_str(), request.sortBy.empty() ? "name" : request.sortBy.c_str(), additional,
+        path.c_str(), folder.path().c_str(), request.sortBy.empty() ? "name" : request.sortBy.c_str(), additional,
         request.offset, request.limit, request.ascending, request.type, criteria.list(), listing.entries,
         &listing.total);
-    return listed ? ORV_ERR_NONE : lastCode();
+    if (!listed) return lastCode();
+    putRealPaths(listing, realPath);
+    return ORV_ERR_NONE;
 }
 
 int listShares(const ListRequest& request, Listing& listing) {

@@ -52,6 +52,9 @@ class ReturnToFolder {
 // List a folder, or the home folder and the shares of the user. The process has the user's identity. 0 or a library
 // code; what a failure leaves in `listing` is to be thrown away.
 int listFolder(const ListRequest& request, Listing& listing);
+// The first for a folder that is open as a place already: `path` is what it is called, `realPath` where it lies.
+int listOpened(const ListRequest& request, const Descriptor& folder, const std::string& path,
+               const std::string& realPath, Listing& listing);
 int listShares(const ListRequest& request, Listing& listing);
 
 // Appends the object of one entry, always valid UTF-8: a name or path that is none is shown readable, with "name_raw"

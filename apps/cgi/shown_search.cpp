@@ -18,31 +18,39 @@ namespace {
 
 // The path that rows have: no links below the share's root. "" when it cannot be told.
 std::string rowPath(const ChangedFile& file) {
-    const std::string& shareRoot = file.info.shareRoot;
-    const Descriptor root(open(shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    if (!root) return "";
-    const std::string top = realPathOf(root), folder = realPathOf(file.folder);
-    if (top.empty() || !folder.starts_with(top)) return "";
-    return shareRoot + folder.substr(top.size()) + "/" + file.name;
+    const auto folder = pathInShare(file.info, file.folder);
+    return folder ? file.info.shareRoot + *folder + "/" + file.name : "";
 }
 
-bool statusOf(const std::string& path, _tag_VEXOSTAT_& status) {
-    return VLIBCFileLStat(path.c_str(), VEXO_STAT_BASIC | VEXO_STAT_CREATE_TIME, &status) >= 0;
+bool statusOf(const Descriptor& folder, const std::string& name, _tag_VEXOSTAT_& status) {
+    return VLIBCFileLStatAt(folder.get(), name.c_str(), VEXO_STAT_BASIC | VEXO_STAT_CREATE_TIME, &status) >= 0;
+}
+
+// The status of what lies at `path` (a name and what follows it) below an open folder, no link followed. False with
+// errno.
+bool statusBelow(const Descriptor& folder, const std::string& path, _tag_VEXOSTAT_& status) {
+    const size_t slash = path.rfind('/');
+    if (slash == std::string::npos) return statusOf(folder, path, status);
+    const Descriptor parent =
+        openBeneath(folder, path.substr(0, slash), LinkPolicy::kNone, O_PATH | O_DIRECTORY | O_NOFOLLOW);
+    return parent && statusOf(parent, path.substr(slash + 1), status);
 }
 
 // The rows whose files are gone from a folder.
 struct GoneRows {
-    std::string below;                                      // the folder's path and "/"
+    const ChangedFile& folder;
+    std::string path;                                       // of its row
     std::vector<std::pair<std::string, std::string>> list;  // share, path
 };
 
 BOOL collectGone(__tag_FI_FILE_INFO_DATA* row, void* gone) try {
     auto& rows = *static_cast<GoneRows*>(gone);
     const std::string path = std::string(row->szShareRoot) + "/" + row->szPath;
-    struct stat status {};
-    if (path.starts_with(rows.below) && lstat(path.c_str(), &status) != 0 && (errno == ENOENT || errno == ENOTDIR)) {
-        rows.list.emplace_back(row->szShare, path);
-    }
+    if (!path.starts_with(rows.path + "/")) return 1;
+    _tag_VEXOSTAT_ status;
+    const std::string& folder = rows.folder.name;
+    if (statusBelow(rows.folder.folder, folder + path.substr(rows.path.size()), status)) return 1;
+    if (errno == ENOENT || errno == ENOTDIR || errno == ELOOP) rows.list.emplace_back(row->szShare, path);
     return 1;
 } catch (const std::exception&) {
     return 0;
@@ -58,7 +66,7 @@ void ShownSearch::added(const ChangedFile& file) {
     _tag_VEXOSTAT_ status;
     if (task_.results == nullptr) return;
     const std::string path = rowPath(file);
-    if (path.empty() || !statusOf(path, status)) return;
+    if (path.empty() || !statusOf(file.folder, file.name, status)) return;
     const std::string share = definedShareName(file.info.shareName);
     OrvelUserEnum names;
     // The first leaves a row that is there as it is, the second refreshes it.
@@ -75,19 +83,18 @@ void ShownSearch::removed(const ChangedFile& file) {
 
 void ShownSearch::movedPartly(const ChangedFile& from, const ChangedFile* to) {
     if (task_.results == nullptr) return;
-    GoneRows gone;
     const std::string source = rowPath(from), target = to == nullptr ? "" : rowPath(*to);
     if (source.empty()) return;
-    gone.below = source + "/";
+    GoneRows gone = {from, source, {}};
     FIQUERY everyRow{};
     everyRow.limit = ULONG_MAX;
     // A database that is read is not written to: first all of them.
     if (FILEIDXDBSelect(task_.results->getDBTaskFilePath(), &everyRow, collectGone, &gone) < 0) return;
     for (const auto& [share, path] : gone.list) {
         _tag_VEXOSTAT_ status;
-        const std::string there = target + path.substr(source.size());
-        if (!target.empty() && statusOf(there, status)) {
-            task_.results->updateFile(share, path, definedShareName(to->info.shareName), there, status);
+        const std::string rest = path.substr(source.size());
+        if (!target.empty() && statusBelow(to->folder, to->name + rest, status)) {
+            task_.results->updateFile(share, path, definedShareName(to->info.shareName), target + rest, status);
         } else {
             task_.results->delRecs(share, path);
         }
@@ -100,7 +107,7 @@ void ShownSearch::moved(const ChangedFile& from, const ChangedFile& to) {
     const std::string source = rowPath(from), target = rowPath(to);
     if (source.empty()) return;
     const std::string sourceShare = definedShareName(from.info.shareName);
-    if (target.empty() || !statusOf(target, status)) {  // whatever became of it, it is there no more
+    if (target.empty() || !statusOf(to.folder, to.name, status)) {  // whatever became of it, it is there no more
         task_.results->delRecs(sourceShare, source);
         return;
     }

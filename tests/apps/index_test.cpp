@@ -3,6 +3,7 @@
 #include <sys/wait.h>
 
 #include <csignal>
+#include <map>
 
 #include "apps/program.h"
 #include "index/folder_state.h"
@@ -150,6 +151,15 @@ TEST_F(Index, NoLinkIsFollowed) {
     for (const char* folder : {"", "in", "in/deep", "link", "link/deep"}) {
         const size_t expected = *folder == '\0' || *folder == 'i' ? 1 : 0;
         EXPECT_EQ(files.list(folder).size(), expected) << folder;
+    }
+    for (const auto& [path, presence] : std::map<std::string, Presence>{{"", Presence::kThere},
+                                                                        {"in", Presence::kThere},
+                                                                        {"in/deep/f", Presence::kThere},
+                                                                        {"in/none", Presence::kGone},
+                                                                        {"link", Presence::kGone},
+                                                                        {"link/deep/f", Presence::kGone}}) {
+        _tag_VEXOSTAT_ status;
+        EXPECT_EQ(files.status(path, status), presence) << path;
     }
 }
 

@@ -103,6 +103,12 @@ TEST_F(ListCgi, ParametersAreTakenStrictly) {
         EXPECT_EQ(reply.status, 400) << query;
         EXPECT_EQ(reply.json["error"]["code"], 400) << query;
     }
+    std::string patterns = "a";
+    for (int i = 1; i < 100; ++i) patterns += ",a";
+    for (const auto& [pattern, code] : Rows<std::string, int>{
+             {patterns, 0}, {patterns + ",a", 400}, {std::string(491, 'a'), 400}, {"a,,", 0}, {" ", 400}}) {
+        EXPECT_EQ(folder("alice", "/photo", "&pattern=" + pattern).json["error"]["code"].asInt(), code);
+    }
     EXPECT_EQ(ask("alice", "",
                   {{"REQUEST_METHOD", "POST"},
                    {"CONTENT_TYPE", "application/x-www-form-urlencoded"},

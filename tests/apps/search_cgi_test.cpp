@@ -4,6 +4,7 @@
 #include <json/value.h>
 
 #include <csignal>
+#include <map>
 #include <set>
 
 #include "apps/program.h"
@@ -275,6 +276,26 @@ TEST_F(SearchCgi, NobodySeesNamesOutOfHisSight) {
         EXPECT_EQ(code(ask("bob", "action=start&name=*&path=/photo/open/secret/below")), 407) << indexed;
         EXPECT_EQ(found("carol", "path=/photo&path=/closed&name=*").paths.size(), 17U) << "an administrator";
     }
+}
+
+// Rows are older than what stands at their paths by now: rights are those of a file in its folder, not of what a link
+// there leads to.
+TEST_F(SearchCgi, RightsAreAskedWithoutLinks) {
+    const std::string root = shareRoot("photo");
+    for (const char* path : {"/kept/f", "/file/f", "/above/f"}) writeFile(root + path, "x", 0666);
+    const std::string id = start("alice", "path=/photo&name=f&type=file");
+    finished("alice", id);
+    fs::remove(root + "/file/f");
+    fs::create_symlink("../kept/f", root + "/file/f");
+    fs::rename(root + "/above", root + "/was");
+    fs::create_symlink("kept", root + "/above");
+    std::map<std::string, bool> readable;
+    const CgiReply reply = list("alice", id, "additional=perm");
+    for (const Json::Value& item : reply.json["data"]["items"]) {
+        readable[item["path"].asString()] = item["additional"]["perm"]["acl"]["read"].asBool();
+    }
+    EXPECT_EQ(readable, (std::map<std::string, bool>{
+                            {"/photo/above/f", false}, {"/photo/file/f", false}, {"/photo/kept/f", true}}));
 }
 
 TEST_F(SearchCgi, RequestsAreTakenStrictly) {

@@ -59,8 +59,10 @@ Owner ownerFor(const std::string& user) {
 void measure(const Item& item, Progress& progress) {
     Sum sum;
     if (S_ISDIR(item.status.st_mode)) {
+        const Descriptor top(
+            openat(item.place.folder.get(), item.place.name.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
         OrvDirectoryWalker walker(ENUM_IGNORE_ALL_ERR, stopFlag());
-        walker.Walk_TopDown(item.info.path, "", item.realPath(), sum, nullptr, false);
+        if (top) walker.Walk_TopDown(item.info.path, "", top.path(), sum, nullptr, false);
         if (chdir("/") != 0) return;  // a walk stays in its last folder, which would keep a volume busy
     }
     progress.expect(sum.items + 1, sum.bytes + (S_ISREG(item.status.st_mode) ? item.status.st_size : 0));

@@ -10,19 +10,20 @@ namespace orvel::cgi {
 
 int subfoldersOperation(Operation& operation) {
     const PathInfo& info = operation.info;
+    Descriptor folder;
     std::string realPath;
-    const int code = confinedFolder(info, linkPolicyOf(info.shareName), realPath);
+    const int code = confinedFolder(info, linkPolicyOf(info.shareName), folder, realPath);
     if (code != ORV_ERR_NONE) return code;
     std::vector<_tag_SUBDIR_ENTRY_INFO_> folders;
-    if (!OrvLibEnumSubDir(realPath, folders)) return lastCode(ORV_ERR_GENERAL);
+    if (!OrvLibEnumSubDir(folder.path(), folders)) return lastCode(ORV_ERR_GENERAL);
 
     Json::Value& items = operation.data["items"] = Json::Value(Json::arrayValue);
-    for (const _tag_SUBDIR_ENTRY_INFO_& folder : folders) {
+    for (const _tag_SUBDIR_ENTRY_INFO_& found : folders) {
         Json::Value item;
-        putPath(item, "name", folder.name);
-        putPath(item, "path", info.path + "/" + folder.name);
-        item["mtime"] = folder.mtime;
-        if (folder.isMountPoint) item["mount_type"] = folder.mountType;
+        putPath(item, "name", found.name);
+        putPath(item, "path", info.path + "/" + found.name);
+        item["mtime"] = found.mtime;
+        if (found.isMountPoint) item["mount_type"] = found.mountType;
         items.append(item);
     }
     return ORV_ERR_NONE;

@@ -136,7 +136,10 @@ void serveList(Output& out, Visit& visit, const std::string& wanted) {
                                  .additional = additionalBits(web.GetParam("additional", "")) & kShown,
                                  .pattern = "",
                                  .type = DIR_ENTRY_TYPE_ALL};
-    if (code == ORV_ERR_NONE) code = place.isFile ? listFile(place, listing) : listFolder(request, listing);
+    if (code == ORV_ERR_NONE) {
+        code = place.isFile ? listFile(place, listing)
+                            : listOpened(request, place.found, place.path, place.realPath, listing);
+    }
     if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, "", code, wanted);
     // A visitor's paths begin at the shared folder.
     for (DIRENTRY_INFO& entry : listing.entries) entry.path = place.isFile ? "" : place.within + "/" + entry.name;

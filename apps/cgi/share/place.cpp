@@ -34,9 +34,9 @@ int findPlace(const std::string& owner, const std::string& sharedPath, const std
     OrvLibSetErr(ORV_ERR_NONE);
     if (!CheckShareDownloadPrivilege(owner.c_str(), nullptr, info.path.c_str())) return lastCode(ORV_ERR_DENIED);
 
-    const LinkPolicy policy = linkPolicyOf(info.shareName);
+    // The path was free of links when it was published; one that took a place in it since would show something else.
     Descriptor shared;
-    const int code = confinedOpen(info, policy, O_PATH, shared);
+    const int code = confinedOpen(info, LinkPolicy::kNone, O_PATH, shared);
     if (code != ORV_ERR_NONE) return code;
     struct stat status = {};
     if (fstat(shared.get(), &status) != 0) return refusalCode(errno, info.realPath);
@@ -44,13 +44,14 @@ int findPlace(const std::string& owner, const std::string& sharedPath, const std
     const std::string rest = relative(wanted), top = realPathOf(shared);
     if (place.isFile && !rest.empty()) return ORV_ERR_MISSING;
 
-    place.found = rest.empty() ? std::move(shared) : openBeneath(shared, rest, policy, O_PATH);
+    const auto below = pathInShare(info, shared);
+    place.found = rest.empty() ? std::move(shared) : openBeneath(shared, rest, linkPolicyOf(info.shareName), O_PATH);
     if (!place.found) return refusalCode(errno, info.realPath);
     place.realPath = realPathOf(place.found);
-    if (top.empty() || !place.realPath.starts_with(top)) return ORV_ERR_DENIED;
+    if (!below || top.empty() || !place.realPath.starts_with(top)) return ORV_ERR_DENIED;
     place.within = place.realPath.substr(top.size());
-    place.path = info.path + place.within;
-    place.name = lastComponent(place.within.empty() ? info.path : place.within);
+    place.path = "/" + info.shareName + *below + place.within;
+    place.name = lastComponent(place.path);
     return ORV_ERR_NONE;
 }
 

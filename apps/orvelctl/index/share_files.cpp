@@ -6,7 +6,7 @@
 #include <cerrno>
 #include <climits>
 
-#include "confined.h"
+#include "base/beneath.h"
 #include "orvel/directory_walker.h"
 #include "vexo/filesystem.h"
 
@@ -47,7 +47,7 @@ ShareFiles::ShareFiles(std::string root, int* stop)
 std::vector<Entry> ShareFiles::list(const std::string& folder) const {
     Descriptor below;
     if (!folder.empty()) {
-        below = cgi::openBeneath(opened_, folder, cgi::LinkPolicy::kNone, O_PATH | O_DIRECTORY);
+        below = openBeneath(opened_, folder, LinkPolicy::kNone, O_PATH | O_DIRECTORY);
         if (!below) return {};
     }
     Collector collector(realPath(folder).size(), folder.empty() ? "" : folder + "/");
@@ -61,8 +61,13 @@ std::vector<Entry> ShareFiles::list(const std::string& folder) const {
 }
 
 Presence ShareFiles::status(const std::string& path, _tag_VEXOSTAT_& status) const {
-    if (VLIBCFileLStat(realPath(path).c_str(), VEXO_STAT_BASIC | VEXO_STAT_CREATE_TIME, &status) < 0) {
-        return errno == ENOENT || errno == ENOTDIR ? Presence::kGone : Presence::kUnknown;
+    const size_t slash = path.rfind('/');
+    const std::string parent = slash == std::string::npos ? "." : path.substr(0, slash);
+    const std::string name = path.empty() ? "." : path.substr(slash + 1);
+    const Descriptor folder = openBeneath(opened_, parent, LinkPolicy::kNone, O_PATH | O_DIRECTORY);
+    if (!folder || VLIBCFileLStatAt(folder.get(), name.c_str(), VEXO_STAT_BASIC | VEXO_STAT_CREATE_TIME, &status) < 0) {
+        const bool gone = errno == ENOENT || errno == ENOTDIR || errno == ELOOP;
+        return gone ? Presence::kGone : Presence::kUnknown;
     }
     return S_ISREG(status.st_mode) || S_ISDIR(status.st_mode) ? Presence::kThere : Presence::kGone;
 }

@@ -34,7 +34,7 @@ class ShareFiles {
     // What a walk reports of one folder ("" is the root), without network mounts and without paths too long to be
     // asked for. Empty when it cannot be read, or is reached through a link.
     [[nodiscard]] std::vector<Entry> list(const std::string& folder) const;
-    // The status of a file or folder.
+    // The status of a file or folder; one that is reached through a link is gone.
     [[nodiscard]] Presence status(const std::string& path, _tag_VEXOSTAT_& status) const;
     // Known from the mount table alone: the server may be dead.
     [[nodiscard]] bool isRemoteMount(const std::string& path) const;

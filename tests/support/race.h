@@ -1,0 +1,49 @@
+// Races of real processes: one that changes a place without end, and the one under test beside it.
+#ifndef ORVEL_TESTS_SUPPORT_RACE_H
+#define ORVEL_TESTS_SUPPORT_RACE_H
+
+#include <gtest/gtest.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <cstdlib>
+#include <ctime>
+#include <functional>
+
+namespace support {
+
+// Does `step` again and again in a process of its own, as another user where a uid is given.
+class Rival {
+ public:
+    explicit Rival(const std::function<void()>& step, uid_t uid = 0) : process_(fork()) {
+        if (process_ != 0) return;
+        prctl(PR_SET_PDEATHSIG, SIGKILL);
+        if (uid != 0 && setuid(uid) != 0) _exit(1);
+        for (;;) step();
+    }
+    ~Rival() {
+        EXPECT_EQ(waitpid(process_, nullptr, WNOHANG), 0) << "the rival ended early";
+        kill(process_, SIGKILL);
+        waitpid(process_, nullptr, 0);
+    }
+    Rival(const Rival&) = delete;
+    Rival& operator=(const Rival&) = delete;
+
+ private:
+    pid_t process_;
+};
+
+// Runs `round` 200 times, in the long mode (ORVEL_RACE_SECONDS) for that many seconds. How often it ran.
+inline long race(const std::function<void()>& round) {
+    const char* wanted = getenv("ORVEL_RACE_SECONDS");
+    const time_t end = wanted == nullptr ? 0 : time(nullptr) + atol(wanted);
+    long rounds = 0;
+    for (; wanted == nullptr ? rounds < 200 : time(nullptr) < end; ++rounds) round();
+    return rounds;
+}
+
+}  // namespace support
+
+#endif
