@@ -243,6 +243,41 @@ TEST_F(TaskCgi, ConflictsAreSolvedAsAsked) {
     }
 }
 
+// A link that climbs far is harmless deep in a share alone.
+TEST_F(TaskCgi, ALinkThatWouldLeadOutStaysWhereItIs) {
+    SKIP_WITHOUT_ROOT();
+    writeFile(photo_ + "/a/b/f", "x", 0666);
+    for (const auto& [text, link] : std::map<std::string, std::string>{
+             {"../f", "/a/b/c/near"}, {"../../../..", "/a/b/c/d/top"}, {"/etc", "/a/b/c/d/e/absolute"}}) {
+        fs::create_directories(fs::path(photo_ + link).parent_path());
+        fs::create_symlink(text, photo_ + link);
+    }
+    fs::create_directories(photo_ + "/a/b/c/deeper");
+    for (const auto& entry : fs::recursive_directory_iterator(photo_)) give(entry.path());
+    struct {
+        const char *path, *target;
+        bool passes;
+    } const cases[] = {{"/photo/a/b/c/d", "/photo/a", false},
+                       {"/photo/a/b/c/d", "/photo", false},
+                       {"/photo/a/b/c/d/top", "/photo/a", false},
+                       {"/photo/a/b", "/photo", false},
+                       {"/photo/a/b/c/d", "/video", false},
+                       {"/photo/a/b/c/d/e", "/photo", true},
+                       {"/photo/a/b/c/near", "/photo/a", true},
+                       {"/photo/a/near", "/video", false},
+                       {"/photo/a/b/c/d", "/photo/a/b/c/deeper", true}};
+    for (const char* action : {"copy", "move"}) {
+        for (const auto& [path, target, passes] : cases) {
+            if (action[0] == 'c' && !fs::exists(fs::symlink_status(shareRoot("photo") + (path + 6)))) continue;
+            const auto task = perform("alice", std::string("action=") + action + about({path}, target));
+            EXPECT_EQ(errors(task), passes ? "" : path + std::string(" 407\n")) << action << path << target;
+            if (action[0] == 'c' && passes) {
+                fs::remove_all(shareRoot("photo") + (target + 6) + "/" + fs::path(path).filename().string());
+            }
+        }
+    }
+}
+
 TEST_F(TaskCgi, SourcesAndTargetsAreJudged) {
     SKIP_WITHOUT_ROOT();
     addShare("fixed", "read only = no\nvexo:restriction = 2\n");

@@ -1,4 +1,5 @@
 #include "operation/change_notices.h"
+#include "operation/moved_links.h"
 #include "operation/operation.h"
 #include "operation/recycle.h"
 #include "operation/task_start.h"
@@ -33,6 +34,10 @@ void restoreOne(const Operation& operation, const std::string& path, Conflict co
     PathInfo info;
     Target place;
     if (code == ORV_ERR_NONE) code = openOrigin(user, bin->originOf(item), conflict, info, place);
+    if (code == ORV_ERR_NONE && !linksStayInside(item, info, place.folder)) {
+        removeMadeFolders(place);
+        code = ORV_ERR_DENIED;
+    }
     if (code != ORV_ERR_NONE) return progress.failed(path, code);
 
     Transfer transfer(progress, {.conflict = conflict, .move = true, .owner = ownerFor(user.name), .onFat = false});

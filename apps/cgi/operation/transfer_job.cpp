@@ -1,6 +1,7 @@
 #include "operation/transfer_job.h"
 
 #include "operation/change_notices.h"
+#include "operation/moved_links.h"
 #include "operation/task_start.h"
 #include "operation/transfer.h"
 #include "orvel/error_state.h"
@@ -31,6 +32,7 @@ int checkPlace(const Job& job, const Item& item) {
     if (S_ISDIR(item.status.st_mode) && (folder + "/").starts_with(item.realPath() + "/")) {
         return ORV_ERR_SELECT_CONFLICT;  // a folder into itself
     }
+    if (!linksStayInside(item, job.info, job.folder)) return ORV_ERR_DENIED;
     OrvLibSetErr(ORV_ERR_NONE);
     const bool fits = OrvCheckFileName(folder.c_str(), item.place.name.c_str()) == 0;
     return fits ? ORV_ERR_NONE : lastCode();
