@@ -1,4 +1,10 @@
-// Faults on demand: tests ask the platform by name to fail an operation. Absent from what is installed.
+// Faults and waits on demand: tests ask the platform by name to fail an operation, or to hold a process before one.
+// Absent from what is installed.
+//
+// A process is held from outside, by its environment: VEXO_GATE_HOLD="OPERATION=FILE;..." While FILE is there, whoever
+// calls OPERATION adds a line to it and waits until it is gone or another file has its name, a minute at most; a signal
+// lets the process go, too. Whoever holds replaces the file to let one call pass and hold the next, and removes it to
+// let all pass.
 #ifndef VEXO_LINUX_FAULT_GATE_H
 #define VEXO_LINUX_FAULT_GATE_H
 

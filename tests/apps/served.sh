@@ -30,6 +30,14 @@ expect() { # what, wanted, got
     fi
 }
 
+# A program that calls OPERATION is held while the file of that name is in $gates (see platform/linux/fault_gate.h).
+gates=$work/gates
+mkdir -m 777 "$gates"
+for operation in VEXOFileCopy FILEIDXOutputDBInsert; do
+    VEXO_GATE_HOLD="${VEXO_GATE_HOLD:+$VEXO_GATE_HOLD;}$operation=$gates/$operation"
+done
+export VEXO_GATE_HOLD
+
 port=$((20000 + RANDOM % 20000))
 while (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null; do port=$((port + 1)); done
 "$server" --port "$port" --root "$demo" --build "$build" >"$log" 2>&1 &

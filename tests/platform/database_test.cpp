@@ -8,6 +8,7 @@
 #include <csignal>
 
 #include "platform/trust.h"
+#include "support/wait.h"
 
 namespace {
 
@@ -55,7 +56,7 @@ class DatabaseTest : public ApplianceTest {
             writeFile(flag, "");
             pause();
         }
-        while (!fs::exists(flag)) usleep(1000);
+        EXPECT_TRUE(waitUntil("the writer", [&] { return fs::exists(flag); }));
         fs::remove(flag);
         during();
         kill(child, SIGKILL);

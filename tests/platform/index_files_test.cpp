@@ -7,6 +7,7 @@
 #include "platform/index_fixture.h"
 #include "platform/private_mounts.h"
 #include "platform/trust.h"
+#include "support/wait.h"
 
 namespace {
 
@@ -97,9 +98,8 @@ TEST_F(IndexFilesTest, ResultsAreSeenWhileTheSearchGoesOnAndAfterItDies) {
         writeFile(ready, "");
         pause();
     }
-    while (!fs::exists(ready)) usleep(1000);
-    usleep(1000000);
-    EXPECT_EQ(select(db_).size(), 1000U);
+    EXPECT_TRUE(waitUntil("the writer", [&] { return fs::exists(ready); }));
+    EXPECT_TRUE(waitUntil("all its results", [&] { return select(db_).size() == 1000; }));
     kill(child, SIGKILL);
     waitpid(child, nullptr, 0);
     EXPECT_EQ(select(db_).size(), 1000U);

@@ -3,7 +3,7 @@ import assert from "node:assert/strict";
 import { mkdirSync, readdirSync, readFileSync, readlinkSync, writeFileSync } from "node:fs";
 import { after, before, test } from "node:test";
 import { KINDS, PICTURES } from "../../apps/web/js/icons.js";
-import { launch, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+import { drawn, launch, row, rowsReady, screenshot, withPage } from "./browser.mjs";
 
 const LARGE = 100_000;
 let chrome;
@@ -93,7 +93,8 @@ test("a folder of 100,000: first view, its end, everything chosen", () =>
     const refreshed = page.waitForResponse("**/cgi-bin/list?*");
     await page.keyboard.press("Alt+r");
     await (await refreshed).finished();
-    await page.waitForTimeout(100);
+    await rowsReady(page);
+    await drawn(page);
     await page.waitForSelector(many); // though most of them were never on screen
     await page.keyboard.press("Control+a");
     await page.waitForSelector("#status >> text=100,000 selected");

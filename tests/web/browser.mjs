@@ -106,6 +106,11 @@ export async function rowsReady(page) {
   await page.waitForFunction(() => !document.querySelector("#view .row.waiting"));
 }
 
+// What the page was about to draw is drawn.
+export function drawn(page) {
+  return page.evaluate(() => new Promise((done) => requestAnimationFrame(() => requestAnimationFrame(done))));
+}
+
 export function row(page, name) {
   return page
     .locator("#view .row:not(.header)")

@@ -6,7 +6,7 @@ import http from "node:http";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
-import { launch, PASSWORDS, picture, row, screenshot, URL_OF_PAGE, withPage } from "./browser.mjs";
+import { drawn, launch, PASSWORDS, picture, row, screenshot, URL_OF_PAGE, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const files = mkdtempSync(join(tmpdir(), "orvel-upload-"));
@@ -18,7 +18,7 @@ before(async () => {
   for (let i = 1; i <= 8; ++i) writeFileSync(join(files, `trip/day 1/view ${i}.png`), picture(480, 320, i));
   writeFileSync(join(files, "trip/list & more.md"), "# List\n\n- <b>bread</b>\n- Käse\n");
   for (const name of ["one.txt", "two, three*.txt", "four.txt"]) writeFileSync(join(files, name), `${name}, new`);
-  writeFileSync(join(files, "large.bin"), Buffer.alloc(48 << 20, 7));
+  writeFileSync(join(files, "large.bin"), Buffer.alloc(8 << 20, 7));
 });
 after(async () => {
   await chrome.close();
@@ -66,7 +66,7 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     await page.locator(".dialog >> text=The file exists already").waitFor();
     await page.keyboard.press("Escape");
     await card(page, "Cancelled").waitFor();
-    await page.waitForTimeout(300);
+    await drawn(page);
     assert.equal(await page.locator(".dialog").count(), 0); // though three stood in line
     for (const name of some) writeFileSync(name, "newer");
     await upload(page, "Upload files", some);
@@ -98,17 +98,17 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     }, await page.evaluate(() => location.hash.slice(1)));
     await card(page, "1 folder to").filter({ hasText: "1 done" }).waitFor();
 
-    // The network is slow enough that there is something to cancel.
+    // So slow a network that it takes a minute: there is something to cancel.
     const session = await page.context().newCDPSession(page);
     await session.send("Network.emulateNetworkConditions", {
       offline: false,
       latency: 0,
       downloadThroughput: -1,
-      uploadThroughput: 4 << 20,
+      uploadThroughput: 128 << 10,
     });
     await upload(page, "Upload files", join(files, "large.bin"));
     await page.waitForFunction(
-      () => Number(document.querySelector(".activity-card [role=progressbar]").getAttribute("aria-valuenow")) > 5,
+      () => Number(document.querySelector(".activity-card [role=progressbar]").getAttribute("aria-valuenow")) > 2,
     );
     await screenshot(page, "upload");
     await page.locator(".activity-card").first().locator("button").click();

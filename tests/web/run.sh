@@ -16,7 +16,7 @@ cmp -s "$here/package-lock.json" "$here/node_modules/.installed" ||
 
 export ORVEL_TEST_SCREENSHOTS=${ORVEL_TEST_SCREENSHOTS:-$work/screenshots}
 mkdir -p "$ORVEL_TEST_SCREENSHOTS"
-export ORVEL_TEST_URL=http://127.0.0.1:$port/ ORVEL_TEST_LARGE=${ORVEL_TEST_LARGE:-20000}
+export ORVEL_TEST_GATES=$gates ORVEL_TEST_URL=http://127.0.0.1:$port/ ORVEL_TEST_LARGE=${ORVEL_TEST_LARGE:-20000}
 for user in alice bob admin; do export "ORVEL_TEST_${user^^}=$(password "$user")"; done
 ORVEL_TEST_PHOTO=$(root_of photo) ORVEL_TEST_PROJECTS=$(root_of projects)
 export ORVEL_TEST_PHOTO ORVEL_TEST_PROJECTS

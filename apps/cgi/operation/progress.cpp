@@ -42,6 +42,8 @@ void Progress::expect(long long items, long long bytes) {
 
 void Progress::begin(const std::string& path) {
     current_ = path;
+    if (!begun_) publishedAt_ = 0;  // how much there is to do is known by now
+    begun_ = true;
     publishNowAndThen(0);
 }
 

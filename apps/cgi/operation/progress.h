@@ -23,7 +23,7 @@ class Progress {
 
     // More is to be done.
     void expect(long long items, long long bytes);
-    // The item at work. Everything is published at once or a little later.
+    // The item at work. Everything is published: for the first item at once, later at intervals.
     void begin(const std::string& path);
     void bytes(long long count);
     // How the item ended.
@@ -59,6 +59,7 @@ class Progress {
     size_t errorBytes_ = 0;
     long long errorsLeftOut_ = 0;
     long long publishedAt_ = 0;  // milliseconds
+    bool begun_ = false;
 };
 
 }  // namespace orvel::cgi

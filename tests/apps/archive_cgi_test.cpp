@@ -1,0 +1,203 @@
+// Archives that are extracted and made.
+#include <archive.h>
+#include <archive_entry.h>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
+#include <sys/xattr.h>
+
+#include <cstdlib>
+
+#include "apps/task_fixture.h"
+
+namespace {
+
+// One member of an archive made for a test.
+struct Packed {
+    const char* name;
+    unsigned type;     // AE_IF...
+    std::string text;  // content, or where a link leads
+    bool hard = false;
+};
+
+void pack(const std::string& path, const char* format, const char* filter, const std::vector<Packed>& members,
+          const char* password = nullptr) {
+    archive* out = archive_write_new();
+    ASSERT_EQ(archive_write_set_format_by_name(out, format), ARCHIVE_OK);
+    if (filter != nullptr) {
+        ASSERT_EQ(archive_write_add_filter_by_name(out, filter), ARCHIVE_OK);
+    }
+    if (password != nullptr) {
+        ASSERT_EQ(archive_write_set_options(out, "zip:encryption=zipcrypt"), ARCHIVE_OK);
+        ASSERT_EQ(archive_write_set_passphrase(out, password), ARCHIVE_OK);
+    }
+    ASSERT_EQ(archive_write_open_filename(out, path.c_str()), ARCHIVE_OK);
+    for (const Packed& member : members) {
+        archive_entry* entry = archive_entry_new();
+        archive_entry_copy_pathname(entry, member.name);
+        archive_entry_set_filetype(entry, member.type);
+        archive_entry_set_perm(entry, 04777);
+        archive_entry_set_mtime(entry, 1000000000, 0);
+        if (member.hard) archive_entry_copy_hardlink(entry, member.text.c_str());
+        if (member.type == AE_IFLNK) archive_entry_copy_symlink(entry, member.text.c_str());
+        if (member.type == AE_IFCHR) archive_entry_set_rdev(entry, makedev(1, 3));
+        archive_entry_set_size(
+            entry, member.type == AE_IFREG && !member.hard ? static_cast<la_int64_t>(member.text.size()) : 0);
+        EXPECT_GE(archive_write_header(out, entry), ARCHIVE_WARN) << member.name << archive_error_string(out);
+        if (member.type == AE_IFREG && !member.hard) archive_write_data(out, member.text.data(), member.text.size());
+        archive_entry_free(entry);
+    }
+    archive_write_close(out);
+    archive_write_free(out);
+}
+
+TEST_F(TaskCgi, HostileArchivesReachNothingOutside) {
+    SKIP_WITHOUT_ROOT();
+    const std::vector<Packed> members = {{"good/a", AE_IFREG, "1"},
+                                         {"/abs", AE_IFREG, "x"},
+                                         {"../up", AE_IFREG, "x"},
+                                         {"good/../../up", AE_IFREG, "x"},
+                                         {"good/out", AE_IFLNK, "/etc"},
+                                         {"good/up", AE_IFLNK, "../../x"},
+                                         {"good/in", AE_IFLNK, "../good/a"},
+                                         {"door", AE_IFLNK, "good"},
+                                         {"door/through", AE_IFREG, "x"},
+                                         {"planted/x", AE_IFREG, "x"},
+                                         {"good/a", AE_IFREG, "2"},
+                                         {"good/hard", AE_IFREG, "good/a", true},
+                                         {"good/stolen", AE_IFREG, "../../../etc/passwd", true},
+                                         {"good/stolen2", AE_IFREG, "planted/passwd", true},
+                                         {"device", AE_IFCHR, ""},
+                                         {"pipe", AE_IFIFO, ""},
+                                         {"good/\xFFraw", AE_IFREG, "3"},
+                                         {"@vexoea/x", AE_IFREG, "x"},
+                                         {"@tmp/x", AE_IFREG, "x"},
+                                         {"a:b", AE_IFREG, "x"},
+                                         {"./", AE_IFDIR, ""},
+                                         {"folder/", AE_IFDIR, ""},
+                                         {"last", AE_IFREG, "4"}};
+    pack(video_ + "/h.tar.gz", "pax", "gzip", members);
+    support::makeFolder(photo_ + "/t", 0777);
+    ASSERT_EQ(chmod((photo_ + "/t").c_str(), 0777), 0);
+    fs::create_symlink("/etc", photo_ + "/t/planted");
+    support::makeFolder(photo_ + "/t/@tmp", 0777);
+    ASSERT_EQ(chmod((photo_ + "/t/@tmp").c_str(), 0777), 0);
+    const Json::Value task =
+        perform("alice", "action=extract&conflict=keep_both" + about({"/video/h.tar.gz"}, "/photo/t"));
+    EXPECT_EQ(errors(task),
+              "/photo/t//abs 1006\n/photo/t/../up 1006\n/photo/t/good/../../up 1006\n/photo/t/good/out 407\n"
+              "/photo/t/good/up 407\n/photo/t/door/through 407\n/photo/t/planted/x 407\n/photo/t/good/stolen 1006\n"
+              "/photo/t/good/stolen2 407\n/photo/t/device 407\n/photo/t/pipe 407\n/photo/t/@vexoea/x 418\n"
+              "/photo/t/@tmp/x 418\n"
+              "/photo/t/a:b 418\n");
+    EXPECT_EQ(task["state"], "done");
+    EXPECT_EQ(readFile(photo_ + "/t/good/a") + readFile(photo_ + "/t/good/a (2)"), "12");
+    EXPECT_EQ(readFile(photo_ + "/t/good/hard"), "1");
+    EXPECT_EQ(readFile(photo_ + "/t/good/\xFFraw") + readFile(photo_ + "/t/last"), "34") << "names are bytes";
+    EXPECT_EQ(fs::read_symlink(photo_ + "/t/good/in"), "../good/a");
+    EXPECT_FALSE(fs::exists(photo_ + "/up") || fs::exists(photo_ + "/t/abs") || fs::exists("/etc/x"));
+    struct stat status {};
+    ASSERT_EQ(stat((photo_ + "/t/last").c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777, 0755U) << "no set-id bit, nothing that others could write";
+    EXPECT_EQ(status.st_mtime, 1000000000);
+    EXPECT_EQ(status.st_uid, support::kAliceUid);
+}
+
+TEST_F(TaskCgi, FurtherNamesAreOfWhatWasUnpacked) {
+    SKIP_WITHOUT_ROOT();
+    pack(video_ + "/h.tar", "ustar", nullptr,
+         {{"a", AE_IFREG, "new"},
+          {"a", AE_IFREG, "a", true},
+          {"b", AE_IFREG, "a", true},
+          {"c", AE_IFREG, "a", true},
+          {"d", AE_IFREG, "mine", true}});
+    struct {
+        const char *policy, *errors, *tree;
+    } const cases[] = {{"error", "/photo/t/a 414\n/photo/t/a 408\n/photo/t/b 408\n/photo/t/c 408\n/photo/t/d 408\n",
+                        "a=old b=old mine=mine"},
+                       {"skip", "/photo/t/c 408\n/photo/t/d 408\n", "a=old b=old mine=mine"},
+                       {"overwrite", "/photo/t/d 408\n", "a=new b=new c=new mine=mine"},
+                       {"keep_both", "/photo/t/d 408\n", "a (2)=new a (3)=new a=old b (2)=new b=old c=new mine=mine"}};
+    for (const auto& [policy, refused, tree] : cases) {
+        SCOPED_TRACE(policy);
+        fs::remove_all(photo_ + "/t");
+        for (const char* file : {"/t/a", "/t/b"}) writeFile(photo_ + file, "old", 0666);
+        writeFile(photo_ + "/t/mine", "mine", 0666);
+        for (const char* name : {"/t", "/t/a", "/t/b", "/t/mine"}) give(photo_ + name);
+        const Json::Value task =
+            perform("alice", "action=extract&conflict=" + std::string(policy) + about({"/video/h.tar"}, "/photo/t"));
+        EXPECT_EQ(errors(task), refused);
+        std::vector<std::string> found;
+        for (const auto& entry : fs::directory_iterator(photo_ + "/t")) {
+            found.push_back(entry.path().filename().string() + "=" + readFile(entry.path()));
+        }
+        std::sort(found.begin(), found.end());
+        std::string all;
+        for (const std::string& line : found) all += (all.empty() ? "" : " ") + line;
+        EXPECT_EQ(all, tree);
+    }
+}
+
+TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
+    SKIP_WITHOUT_ROOT();
+    setSetting("extract_max_ratio", "20");
+    setSetting("extract_max_members", "20");
+    support::makeFolder(video_ + "/t", 0777);
+    ASSERT_EQ(chmod((video_ + "/t").c_str(), 0777), 0);
+    const std::string zeros(70 << 20, '\0');
+    pack(video_ + "/bomb.zip", "zip", nullptr,
+         {{"small", AE_IFREG, "1"}, {"zeros", AE_IFREG, zeros}, {"more", AE_IFREG, "1"}});
+    pack(video_ + "/bomb.tar.zst", "ustar", "zstd", {{"small2", AE_IFREG, "1"}, {"zeros", AE_IFREG, zeros}});
+    pack(video_ + "/good.zip", "zip", nullptr, {{"\xFFz", AE_IFREG, "5"}, {"\xC3\xA9", AE_IFREG, "6"}});
+    pack(video_ + "/torn.tar.xz", "ustar", "xz",
+         {{"whole", AE_IFREG, "1"}, {"half", AE_IFREG, std::string(1 << 20, 'h')}});
+    const std::string random = readFile(PROGRAM_OPERATION).substr(0, 300000);
+    pack(video_ + "/cut.zip", "zip", nullptr, {{"first", AE_IFREG, "1"}, {"cut", AE_IFREG, random}});
+    for (const char* name : {"/torn.tar.xz", "/cut.zip"}) {
+        ASSERT_EQ(truncate((video_ + name).c_str(), static_cast<off_t>(fs::file_size(video_ + name) * 3 / 4)), 0);
+    }
+    pack(video_ + "/secret.zip", "zip", nullptr, {{"hidden", AE_IFREG, "1"}}, "password");
+    writeFile(video_ + "/none.zip", "no archive at all");
+    writeFile(video_ + "/empty.zip", "");
+    const auto extract = [](const std::string& name) {
+        return errors(perform("alice", "action=extract" + about({"/video/" + name}, "/video/t")));
+    };
+    EXPECT_EQ(extract("bomb.zip"), "/video/t/zeros 1007\n/video/bomb.zip 1007\n");
+    EXPECT_EQ(extract("bomb.tar.zst"), "/video/t/zeros 1007\n/video/bomb.tar.zst 1007\n");
+    if (const char* huge = getenv("ORVEL_TEST_BOMB")) {  // a zip with gigabytes in "zeros", by hand
+        fs::copy(huge, video_ + "/huge.zip");
+        EXPECT_EQ(extract("huge.zip"), "/video/t/zeros 1007\n/video/huge.zip 1007\n");
+    }
+    std::string deep = "deep";
+    while (deep.size() < 60) deep += "/d";
+    pack(video_ + "/deep.tar", "ustar", nullptr, {{(deep + "/x").c_str(), AE_IFREG, "1"}});
+    EXPECT_EQ(extract("deep.tar"), "/video/t/" + deep + "/x 1007\n/video/deep.tar 1007\n");
+    EXPECT_EQ(extract("good.zip"), "");
+    EXPECT_EQ(extract("secret.zip"), "/video/t/hidden 1403\n");
+    EXPECT_EQ(extract("none.zip"), "/video/none.zip 1401\n");
+    EXPECT_EQ(extract("empty.zip"), "/video/empty.zip 1401\n");
+    EXPECT_NE(extract("torn.tar.xz").find("/video/torn.tar.xz 1402"), std::string::npos);
+    EXPECT_NE(extract("cut.zip"), "");
+    for (const char* name : {"/zeros", "/more", "/half", "/cut"})
+        EXPECT_FALSE(fs::exists(video_ + "/t" + name)) << name;
+    EXPECT_EQ(readFile(video_ + "/t/\xFFz") + readFile(video_ + "/t/\xC3\xA9") + readFile(video_ + "/t/small"), "561");
+    EXPECT_FALSE(hasParts(video_));
+}
+
+TEST_F(TaskCgi, WhatWasCompressedComesBackTheSame) {
+    SKIP_WITHOUT_ROOT();
+    for (const char* file : {"/c/a", "/c/d/\xC3\xA9", "/c/d/b"}) writeFile(photo_ + file, file, 0640);
+    for (const char* path : {"/c/a", "/c/d/\xC3\xA9", "/c/d/b", "/c/d", "/c"}) give(photo_ + path);
+    support::makeFolder(photo_ + "/c/closed", 0700);
+    const Json::Value task =
+        perform("alice", "action=compress" + about({"/photo/c", "/photo/c/a", "/photo/c/d"}, "/video/c.zip"));
+    EXPECT_EQ(errors(task), "/photo/c/closed 407\n");
+    EXPECT_EQ(task["state"], "done");
+    EXPECT_EQ(code(ask("alice", "action=compress" + about({"/photo/c"}, "/video/c.zip"))), 414);
+    fs::remove(photo_ + "/c/closed");
+    EXPECT_EQ(errors(perform("alice", "action=compress&conflict=keep_both" + about({"/photo/c"}, "/video/c.zip"))), "");
+    EXPECT_EQ(errors(perform("alice", "action=extract" + about({"/video/c (2).zip"}, "/video"))), "");
+    EXPECT_EQ(treeOf(photo_ + "/c"), treeOf(video_ + "/c"));
+    EXPECT_FALSE(hasParts(video_));
+}
+
+}  // namespace

@@ -1,0 +1,61 @@
+// Names that operations choose, and names that they refuse.
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "operation/conflict.h"
+#include "operation/member_path.h"
+#include "operation/recycle.h"
+#include "text.h"
+
+namespace {
+
+TEST(OperationNames, AreNumberedBeforeTheirEnding) {
+    struct {
+        std::string name, numbered;
+        bool isFolder;
+    } const cases[] = {{"a.txt", "a (2).txt", false},
+                       {"a.b", "a.b (2)", true},
+                       {".profile", ".profile (2)", false},
+                       {"a", "a (2)", false},
+                       {std::string(255, 'x') + ".txt", std::string(247, 'x') + " (2).txt", false},
+                       {"a." + std::string(40, 'x'), "a." + std::string(40, 'x') + " (2)", false}};
+    for (const auto& [name, numbered, isFolder] : cases) {
+        EXPECT_EQ(orvel::cgi::numberedName(name, 2, isFolder), numbered);
+    }
+    std::string wide;
+    while (wide.size() < 255) wide += "\xE2\x82\xAC";
+    EXPECT_TRUE(orvel::cgi::isUtf8(orvel::cgi::numberedName(wide, 10, true))) << "no character is cut";
+}
+
+TEST(OperationNames, OfTheBinLeadBack) {
+    EXPECT_EQ(orvel::cgi::binName("a.txt", 1), "a.txt");
+    EXPECT_EQ(orvel::cgi::binName("a.txt", 2), "a (#2).txt");
+    for (const char* name : {"a", "a.txt", ".a", "a (#2).txt", "a (#2)", "a.b (#7)", "a (#3) (#1).b", "a (#).b", "(#1)",
+                             " (#1)", "a (2).txt", "a.(#2)", "a (#2).b (#3)"}) {
+        for (const int number : {1, 2, 77}) {
+            const std::string inBin = orvel::cgi::binName(name, number);
+            EXPECT_EQ(orvel::cgi::originalName(inBin), name) << inBin;
+            EXPECT_EQ(orvel::cgi::originalName(orvel::cgi::nextBinName(inBin, 5, false)), name);
+        }
+    }
+}
+
+TEST(OperationNames, OfArchivesLeadDownOnly) {
+    for (const char* name : {"", "/", "/etc/passwd", "..", "a/../b", "./..", "a/..", ".", "./"}) {
+        EXPECT_FALSE(orvel::cgi::memberComponents(name)) << name;
+    }
+    EXPECT_EQ(*orvel::cgi::memberComponents("./a//b/."), (std::vector<std::string>{"a", "b"}));
+    EXPECT_EQ(*orvel::cgi::memberComponents("...\\..\\x"), (std::vector<std::string>{"...\\..\\x"}));
+    struct {
+        const char* text;
+        size_t depth;
+        bool inside;
+    } const links[] = {{"a", 0, true},        {"../a", 1, true},       {"../a", 0, false},
+                       {"../../a", 1, false}, {"", 1, false},          {"/etc", 3, false},
+                       {"a/..", 1, false},    {"../a/../b", 2, false}, {"./../b", 1, true}};
+    for (const auto& [text, depth, inside] : links) EXPECT_EQ(orvel::cgi::staysInside(text, depth), inside) << text;
+}
+
+}  // namespace

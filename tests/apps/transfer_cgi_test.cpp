@@ -1,0 +1,242 @@
+// Copies and moves.
+#include <fcntl.h>
+#include <sys/mount.h>
+#include <sys/stat.h>
+
+#include <map>
+
+#include "apps/task_fixture.h"
+#include "platform/private_mounts.h"
+
+namespace {
+
+TEST_F(TaskCgi, CopiesKeepWhatFilesAre) {
+    SKIP_WITHOUT_ROOT();
+    support::makeFolder(photo_ + "/a/b", 0777);
+    writeFile(photo_ + "/a/private", "secret", 0600);
+    writeFile(photo_ + "/a/b/tool", "#!", 0755);
+    writeFile(photo_ + "/a/b/\xFFraw\n", "bytes");
+    writeFile(photo_ + "/a/@vexoea/x", "hidden");
+    for (const char* name : {"/a/private", "/a/b/tool", "/a/b", "/a"}) give(photo_ + name);
+    ASSERT_EQ(chmod((photo_ + "/a/b").c_str(), 0750), 0);
+    fs::create_symlink("/etc/passwd", photo_ + "/a/link");
+    const timespec old[] = {{1000000000, 0}, {1000000000, 5}};
+    ASSERT_EQ(utimensat(AT_FDCWD, (photo_ + "/a/b").c_str(), old, 0), 0);
+    writeFile(photo_ + "/a/holes", "x");
+    ASSERT_EQ(truncate((photo_ + "/a/holes").c_str(), 8 << 20), 0);
+
+    const Json::Value task =
+        perform("alice", "action=copy" + about({"/photo/a", "/photo/none", "/nowhere/x"}, "/video"));
+    EXPECT_EQ(task["state"], "done");
+    EXPECT_EQ(errors(task), "/photo/none 408\n/nowhere/x 408\n");
+    EXPECT_EQ(task["items_done"], 7);
+    EXPECT_EQ(task["items_failed"], 2);
+    EXPECT_EQ(task["items_total"], 9);
+    EXPECT_EQ(task["bytes_done"], task["bytes_total"]);
+    EXPECT_EQ(task["progress"], 1.0);
+    EXPECT_FALSE(fs::exists(video_ + "/a/@vexoea"));
+    fs::remove_all(photo_ + "/a/@vexoea");
+    EXPECT_TRUE(treeOf(photo_ + "/a") == treeOf(video_ + "/a"));
+    struct stat copied {};
+    ASSERT_EQ(stat((video_ + "/a/holes").c_str(), &copied), 0);
+    EXPECT_LT(copied.st_blocks, 100) << "holes stay holes";
+    EXPECT_EQ(copied.st_uid, support::kAliceUid);
+    ASSERT_EQ(stat((video_ + "/a/b").c_str(), &copied), 0);
+    EXPECT_EQ(copied.st_mtime, 1000000000);
+}
+
+TEST_F(TaskCgi, ConflictsAreSolvedAsAsked) {
+    SKIP_WITHOUT_ROOT();
+    struct {
+        const char *policy, *errors, *tree;  // names and contents in the target
+        int done, skipped;
+    } const cases[] = {
+        {"error", "/photo/a.txt 414\n/photo/d 414\n/photo/m 414\n", "a.txt=old d/x=old m/f=old", 0, 0},
+        {"skip", "", "a.txt=old d/x=old d/y=new m/f=old", 2, 3},
+        {"overwrite", "/photo/m 414\n", "a.txt=new d/x=new d/y=new m/f=old", 4, 0},
+        {"keep_both", "", "a (2).txt=new a.txt=old d (2)/x=new d (2)/y=new d/x=old m (2)=new m/f=old", 5, 0}};
+    for (const char* action : {"copy", "move"}) {
+        for (const auto& [policy, refused, tree, done, skipped] : cases) {
+            SCOPED_TRACE(std::string(action) + " " + policy);
+            for (const std::string& root : {photo_, video_}) fs::remove_all(root), support::makeFolder(root, 0777);
+            ASSERT_EQ(chmod(photo_.c_str(), 0777) + chmod(video_.c_str(), 0777), 0);
+            for (const char* file : {"/a.txt", "/d/x", "/d/y", "/m"}) writeFile(photo_ + file, "new", 0666);
+            for (const char* file : {"/a.txt", "/d/x", "/m/f"}) writeFile(video_ + file, "old", 0666);
+            for (const std::string& folder : {photo_ + "/d", video_ + "/d", video_ + "/m"}) give(folder);
+            const Json::Value task = perform("alice", "action=" + std::string(action) + "&conflict=" + policy +
+                                                          about({"/photo/a.txt", "/photo/d", "/photo/m"}, "/video"));
+            EXPECT_EQ(errors(task), refused);
+            EXPECT_EQ(task["state"], "done");
+            std::string found;
+            std::vector<std::string> paths;
+            for (const auto& entry : fs::recursive_directory_iterator(video_)) {
+                if (entry.is_regular_file()) paths.push_back(entry.path());
+            }
+            std::sort(paths.begin(), paths.end());
+            for (const std::string& path : paths) {
+                found += (found.empty() ? "" : " ") + path.substr(video_.size() + 1) + "=" + readFile(path);
+            }
+            EXPECT_EQ(found, tree);
+            if (std::string(action) == "copy") {
+                EXPECT_EQ(task["items_done"], done);
+                EXPECT_EQ(task["items_skipped"], skipped);
+                EXPECT_EQ(readFile(photo_ + "/d/x"), "new") << "the source stays";
+            } else {
+                const bool moved = std::string(policy) == "overwrite" || std::string(policy) == "keep_both";
+                EXPECT_EQ(fs::exists(photo_ + "/a.txt"), !moved);
+                EXPECT_EQ(fs::exists(photo_ + "/d"), !moved) << "with what stayed in it";
+            }
+        }
+    }
+}
+
+// A link that climbs far is harmless deep in a share alone.
+TEST_F(TaskCgi, ALinkThatWouldLeadOutStaysWhereItIs) {
+    SKIP_WITHOUT_ROOT();
+    writeFile(photo_ + "/a/b/f", "x", 0666);
+    for (const auto& [text, link] : std::map<std::string, std::string>{
+             {"../f", "/a/b/c/near"}, {"../../../..", "/a/b/c/d/top"}, {"/etc", "/a/b/c/d/e/absolute"}}) {
+        fs::create_directories(fs::path(photo_ + link).parent_path());
+        fs::create_symlink(text, photo_ + link);
+    }
+    fs::create_directories(photo_ + "/a/b/c/deeper");
+    for (const auto& entry : fs::recursive_directory_iterator(photo_)) give(entry.path());
+    struct {
+        const char *path, *target;
+        bool passes;
+    } const cases[] = {{"/photo/a/b/c/d", "/photo/a", false},
+                       {"/photo/a/b/c/d", "/photo", false},
+                       {"/photo/a/b/c/d/top", "/photo/a", false},
+                       {"/photo/a/b", "/photo", false},
+                       {"/photo/a/b/c/d", "/video", false},
+                       {"/photo/a/b/c/d/e", "/photo", true},
+                       {"/photo/a/b/c/near", "/photo/a", true},
+                       {"/photo/a/near", "/video", false},
+                       {"/photo/a/b/c/d", "/photo/a/b/c/deeper", true}};
+    for (const char* action : {"copy", "move"}) {
+        for (const auto& [path, target, passes] : cases) {
+            if (action[0] == 'c' && !fs::exists(fs::symlink_status(shareRoot("photo") + (path + 6)))) continue;
+            const auto task = perform("alice", std::string("action=") + action + about({path}, target));
+            EXPECT_EQ(errors(task), passes ? "" : path + std::string(" 407\n")) << action << path << target;
+            if (action[0] == 'c' && passes) {
+                fs::remove_all(shareRoot("photo") + (target + 6) + "/" + fs::path(path).filename().string());
+            }
+        }
+    }
+}
+
+TEST_F(TaskCgi, SourcesAndTargetsAreJudged) {
+    SKIP_WITHOUT_ROOT();
+    addShare("fixed", "read only = no\nvexo:restriction = 2\n");
+    addShare("locked", "read only = no\nvexo:restriction = 4\n");
+    const std::string fat = addShare("usb", "read only = no\n");
+    addMount(fat, "vfat");
+    for (const char* share : {"fixed", "locked"}) writeFile(shareRoot(share) + "/f", "x", 0666);
+    writeFile(photo_ + "/a/b/f", "1", 0666);
+    for (const char* name : {"/case/Name", "/case/name", "/case/q?"}) writeFile(photo_ + name, name, 0666);
+    give(photo_ + "/a");
+    give(photo_ + "/case");
+    fs::create_symlink("/etc", photo_ + "/out");
+    struct {
+        const char *user, *form;
+        int code;            // of the request
+        const char* errors;  // of the task
+    } const cases[] = {
+        {"bob", "action=copy&path=/video/x&target=/photo", 407, ""},
+        {"alice", "action=copy&path=/photo/a&target=/photo/out", 407, ""},
+        {"alice", "action=copy&path=/photo/a&target=/photo/none", 408, ""},
+        {"alice", "action=copy&path=/photo/a&target=/photo/a/b/f", 408, ""},
+        {"alice", "action=copy&path=/photo/a&target=/video&conflict=maybe", 400, ""},
+        {"alice", "action=copy&path=/photo/a&target=/photo/a/b", 0, "/photo/a 1005\n"},
+        {"alice", "action=move&path=/photo/a&target=/photo/a", 0, "/photo/a 1005\n"},
+        {"alice", "action=copy&path=/photo/a&target=/photo", 0, "/photo/a 414\n"},
+        {"alice", "action=copy&path=/photo/a&target=/photo&conflict=overwrite", 0, "/photo/a 1005\n"},
+        {"alice", "action=copy&path=/photo/a&target=/photo&conflict=keep_both", 0, ""},
+        {"alice", "action=copy&path=/photo/out/passwd&target=/video", 0, "/photo/out/passwd 407\n"},
+        {"alice", "action=copy&path=/photo&target=/video", 0, "/photo 400\n"},
+        {"alice", "action=copy&path=/locked/f&target=/video", 0, "/locked/f 407\n"},
+        {"alice", "action=copy&path=/fixed/f&target=/video", 0, ""},
+        {"alice", "action=copy&path=/photo/a/&target=/home", 0, ""},
+        {"carol", "action=copy&path=/photo/case/&path=/photo/out&target=/home", 0, ""},
+        {"alice", "action=move&path=/fixed/f&target=/video", 0, "/fixed/f 407\n"},
+        {"alice", "action=delete&path=/fixed/f", 0, "/fixed/f 407\n"},
+        {"bob", "action=delete&path=/photo/a/b/f", 0, "/photo/a/b/f 407\n"},
+        {"bob", "action=move&path=/photo/a&target=/video", 0, "/photo/a 407\n"},
+        {"alice", "action=copy&path=/photo/case&target=/usb&conflict=overwrite", 0, "/photo/case/name 414\n"},
+        {"alice", "action=copy&path=/photo/case/q?&target=/usb", 0, "/photo/case/q? 419\n"},
+    };
+    for (const auto& [user, form, refusal, expected] : cases) {
+        SCOPED_TRACE(form);
+        const CgiReply reply = ask(user, form);
+        EXPECT_EQ(code(reply), refusal);
+        if (refusal == 0) {
+            EXPECT_EQ(errors(ended(user, reply.json["data"]["taskid"].asString())), expected);
+        }
+    }
+    EXPECT_EQ(readFile(photo_ + "/a (2)/b/f"), "1");
+    EXPECT_EQ(readFile(shareRoot("homes") + "/alice/a/b/f"), "1");
+    for (const char* made : {"/case", "/case/name", "/out"}) {
+        struct stat status {};
+        EXPECT_EQ(lstat((shareRoot("homes") + "/carol" + made).c_str(), &status), 0);
+        EXPECT_EQ(status.st_uid, support::kCarolUid) << made << ": not root's";
+    }
+    EXPECT_EQ(readFile(fat + "/case/Name"), "/case/Name");
+    for (const char* form : {"action=copy&target=/video", "action=copy&path=/photo/a&target=/video&taskid=../x",
+                             "action=copy&path_raw=%25zz&target=/video"}) {
+        EXPECT_EQ(ask("alice", form).status, 400) << form;
+    }
+}
+
+TEST_F(TaskCgi, AFullDiskFailsItsItemAndTheRestGoesOn) {
+    SKIP_WITHOUT_ROOT();
+    const std::string small = addShare("small", "read only = no\n");
+    writeFile(photo_ + "/t/1", "one", 0666);
+    writeFile(photo_ + "/t/2big", std::string(3 << 20, 'x'), 0666);
+    writeFile(photo_ + "/t/3", "three", 0666);
+    give(photo_ + "/t");
+    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+        if (mount("none", small.c_str(), "tmpfs", 0, "size=1m,mode=0777") != 0) return support::kNoPrivateMounts;
+        const Json::Value task = perform("alice", "action=copy" + about({"/photo/t"}, "/small"));
+        EXPECT_EQ(errors(task), "/photo/t/2big 416\n");
+        EXPECT_EQ(task["state"], "done");
+        EXPECT_EQ(readFile(small + "/t/3"), "three");
+        EXPECT_FALSE(fs::exists(small + "/t/2big"));
+        EXPECT_FALSE(hasParts(small));
+        const Json::Value zip = perform("alice", "action=compress" + about({"/video"}, "/small/t.zip"));
+        EXPECT_EQ(errors(zip), "/video 400\n");
+        return 0;
+    }));
+}
+
+TEST_F(TaskCgi, MovesAreRenamesOrCopiesThatGo) {
+    SKIP_WITHOUT_ROOT();
+    const std::string other = addShare("other", "read only = no\n");
+    for (const char* file : {"/d/x", "/e/sub/y", "/stuck/z"}) writeFile(photo_ + file, file, 0666);
+    writeFile(photo_ + "/e/@vexoea/meta", "", 0666);
+    for (const char* folder : {"/d", "/e", "/e/sub", "/e/@vexoea"}) give(photo_ + folder);
+    struct stat before {
+    }, after{};
+    ASSERT_EQ(stat((photo_ + "/d/x").c_str(), &before), 0);
+    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+        if (mount("none", other.c_str(), "tmpfs", 0, "mode=0777") != 0) return support::kNoPrivateMounts;
+        Json::Value task = perform("alice", "action=move" + about({"/photo/d"}, "/video"));
+        EXPECT_EQ(task["items_done"], 1);
+        EXPECT_EQ(task["bytes_total"], 0);
+        EXPECT_EQ(stat((video_ + "/d/x").c_str(), &after), 0);
+        EXPECT_EQ(before.st_ino, after.st_ino);
+        task = perform("alice", "action=move" + about({"/photo/e", "/photo/stuck/z"}, "/other"));
+        EXPECT_EQ(errors(task), "/photo/stuck/z 407\n");
+        EXPECT_EQ(task["items_done"], 3);
+        EXPECT_EQ(task["items_total"], 4);
+        EXPECT_EQ(readFile(other + "/e/sub/y"), "/e/sub/y");
+        EXPECT_FALSE(fs::exists(photo_ + "/e")) << "with what is never shown";
+        EXPECT_EQ(readFile(other + "/z") + readFile(photo_ + "/stuck/z"), "/stuck/z/stuck/z") << "lost nowhere";
+        if (mount("none", (video_ + "/d").c_str(), "tmpfs", 0, "mode=0777") != 0) return support::kNoPrivateMounts;
+        writeFile(video_ + "/d/theirs", "x", 0666);
+        EXPECT_EQ(errors(perform("alice", "action=delete" + about({"/video/d"}))), "/video/d 421\n");
+        EXPECT_EQ(readFile(video_ + "/d/theirs"), "x") << "mounted ones stay";
+        return 0;
+    }));
+}
+
+}  // namespace
