@@ -8,6 +8,7 @@
 #include "apps/program.h"
 #include "index/folder_state.h"
 #include "index/share_files.h"
+#include "support/gate.h"
 #include "support/testing.h"
 
 using namespace orvel::ctl;
@@ -72,19 +73,20 @@ class Index : public ApplianceTest {
     }
     void file(const std::string& path) { writeFile(root_ + path, path); }
     void move(const std::string& from, const std::string& to) { fs::rename(root_ + from, root_ + to); }
-    // Starts the command and ends it with a signal.
-    static int broken(const std::vector<std::string>& words, int signal, useconds_t after) {
-        std::vector<std::string> texts = {ORVELCTL};
+    // Starts the command and ends it with a signal when it is about to call `operation` for the `nth` time.
+    static void broken(const std::vector<std::string>& words, int signal, const std::string& operation, int nth) {
+        Gate gate(operation, systemRoot() + "/gate");
+        const auto [name, order] = gate.order();
+        std::vector<std::string> texts = {"/usr/bin/env", name + "=" + order, ORVELCTL};
         texts.insert(texts.end(), words.begin(), words.end());
         std::vector<char*> list(texts.size() + 1);
         std::transform(texts.begin(), texts.end(), list.begin(), [](std::string& text) { return text.data(); });
         pid_t child = 0;
-        EXPECT_EQ(posix_spawn(&child, ORVELCTL, nullptr, nullptr, list.data(), environ), 0);
-        usleep(after);
+        ASSERT_EQ(posix_spawn(&child, list[0], nullptr, nullptr, list.data(), environ), 0);
+        while (--nth > 0 && gate.holds()) gate.next();
+        EXPECT_TRUE(gate.holds());
         kill(child, signal);
-        int status = 0;
-        waitpid(child, &status, 0);
-        return status;
+        waitpid(child, nullptr, 0);
     }
     std::string root_;
 };
@@ -168,15 +170,27 @@ TEST_F(Index, WorkThatIsBrokenOffLosesNothing) {
     file("/before");
     EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
     const std::string before = search();
-    for (int i = 0; i < 3000; ++i)
-        file("/" + std::to_string(i % 60) + "/" + std::to_string(i % 7) + "/f" + std::to_string(i));
+    for (const char* folder : {"/1", "/2", "/3", "/4"}) {
+        for (const char* name : {"/a/f", "/a/g", "/b/f"}) file(std::string(folder) + name);
+    }
     for (const int signal : {SIGTERM, SIGINT, SIGKILL}) {
-        broken({"index", "build", "photo"}, signal, 40000);
+        broken({"index", "build", "photo"}, signal, "FILEIDXDBInsert", 5);
         EXPECT_EQ(search(), before) << "the old index stays: " << signal;
     }
-    for (const useconds_t after : {3000U, 10000U, 25000U, 60000U}) {
-        broken({"index", "update", "photo"}, after > 20000 ? SIGTERM : SIGKILL, after);
-        fs::remove_all(root_ + "/" + std::to_string(after / 1000));
+    broken({"index", "build", "photo"}, SIGKILL, "FILEIDXIndexEnd", 1);
+    EXPECT_EQ(search(), before);
+    struct {
+        int signal;
+        const char* operation;
+        int nth;
+        const char* gone;  // before the next update
+    } const updates[] = {{SIGKILL, "FILEIDXDBInsert", 1, "/1"},
+                         {SIGKILL, "FILEIDXDBInsert", 4, "/2"},
+                         {SIGTERM, "FILEIDXDBInsert", 2, "/3"},
+                         {SIGKILL, "FILEIDXIndexEnd", 1, "/4/a"}};
+    for (const auto& [signal, operation, nth, gone] : updates) {
+        broken({"index", "update", "photo"}, signal, operation, nth);
+        fs::remove_all(root_ + gone);
     }
     update();
     expectTruth("after updates that were killed");

@@ -49,6 +49,11 @@ void Indexer::add(const Entry& entry) {
 // The new folder with its files added, its folders not yet.
 Indexer::NewFolder Indexer::read(Entry folder) {
     NewFolder made = {std::move(folder), kernelClock(), {}};
+    if (updating_) {
+        Entry begun = made.own;
+        --begun.status.st_change;
+        rows_.insert(begun);
+    }
     for (Entry& entry : list(made.own.path)) {
         if (entry.isFolder()) {
             made.inside.push_back(std::move(entry));
@@ -59,7 +64,9 @@ Indexer::NewFolder Indexer::read(Entry folder) {
     return made;
 }
 
-// Each folder behind what lies in it.
+// Each folder before what lies in it, as one that changed: where the work is broken off the next update finds the
+// folder, compares it or, when it is gone by then, takes what was added out again. A build that is broken off is thrown
+// away.
 void Indexer::addTree(Entry top) {
     std::vector<NewFolder> way;
     way.push_back(read(std::move(top)));
@@ -190,6 +197,7 @@ bool Indexer::build() {
 }
 
 bool Indexer::update(bool everything) {
+    updating_ = true;
     known_ = rows_.folders();
     // The root has no row that could tell whether it changed.
     changed_.insert("");

@@ -60,6 +60,7 @@ class Indexer {
     const ShareFiles& files_;
     IndexRows& rows_;
     const int* stop_;
+    bool updating_ = false;
     Progress progress_;
     IndexCounts counts_;
     std::map<std::string, Row> known_;                 // the folders of the index
