@@ -1,19 +1,20 @@
 #include "chosen_folders.h"
 
 #include <algorithm>
+#include <set>
 
 #include "confined.h"
 #include "orvel/error_state.h"
 #include "orvel/file_info.h"
 #include "orvel/privilege.h"
 #include "orvel/share_path.h"
+#include "temporary_folder.h"
 #include "vexo/index.h"
 
 namespace orvel::cgi {
 namespace {
 
-int chooseFolder(const User& user, const std::string& path, std::string& folder) {
-    PathInfo info;
+int chooseFolder(const User& user, const std::string& path, PathInfo& info, std::string& folder) {
     const char* sid = user.sid.empty() ? nullptr : user.sid.c_str();
     OrvLibSetErr(ORV_ERR_NONE);
     if (!PathInfoFactory::create(user.name.c_str(), path, info)) return lastCode();
@@ -30,16 +31,21 @@ int chooseFolder(const User& user, const std::string& path, std::string& folder)
 
 int chooseFolders(const User& user, const std::vector<std::string>& paths, std::vector<std::string>& folders,
                   std::string& culprit) {
+    std::set<std::string> volumes;
     for (const std::string& path : paths) {
+        PathInfo info;
         std::string folder;
-        const int code = chooseFolder(user, path, folder);
+        const int code = chooseFolder(user, path, info, folder);
         if (code == ORV_ERR_NONE) {
             folders.push_back(folder);
+            volumes.insert(info.volumePath);
         } else if (code != ORV_ERR_DENIED) {
             culprit = path;
             return code;
         }
     }
+    // The results go to one of them; where that does not work the search itself says so.
+    for (const std::string& volume : volumes) static_cast<void>(openTemporaryFolder(volume));
     if (!folders.empty()) return ORV_ERR_NONE;
     culprit = paths.empty() ? "" : paths.front();
     return ORV_ERR_DENIED;

@@ -12,8 +12,9 @@ namespace orvel::cgi {
 
 // Puts the share-relative paths of the folders at `paths` into `folders`, with the share's name as it is defined and
 // without links, "." and "..": results of a walk then have the paths that an index has. Folders that the user may not
-// list, or that lie outside their share, are left out. The process has the user's identity. 0; 407 when none is left,
-// else the code of the path that cannot be resolved, then in `culprit`.
+// list, or that lie outside their share, are left out. The temporary folders of their volumes, where results go, are
+// made safe on the way. The process has the user's identity. 0; 407 when none is left, else the code of the path that
+// cannot be resolved, then in `culprit`.
 int chooseFolders(const User& user, const std::vector<std::string>& paths, std::vector<std::string>& folders,
                   std::string& culprit);
 

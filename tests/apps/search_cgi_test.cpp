@@ -286,8 +286,11 @@ TEST_F(SearchCgi, NobodySeesNamesOutOfHisSight) {
 TEST_F(SearchCgi, RightsAreAskedWithoutLinks) {
     const std::string root = shareRoot("photo");
     for (const char* path : {"/kept/f", "/file/f", "/above/f"}) writeFile(root + path, "x", 0666);
+    const std::string temporary = "/tmp/@tmp/orvel";
+    makeFolder(temporary, 0777);
     const std::string id = start("alice", "path=/photo&name=f&type=file");
     finished("alice", id);
+    EXPECT_TRUE(geteuid() != 0 || (statusOf(temporary).st_mode & S_ISVTX) != 0) << "nobody takes results away";
     fs::remove(root + "/file/f");
     fs::create_symlink("../kept/f", root + "/file/f");
     fs::rename(root + "/above", root + "/was");
