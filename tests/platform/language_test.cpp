@@ -45,11 +45,18 @@ TEST_F(LanguageTest, TablesOfTexts) {
     }
 }
 
-TEST(Salts, AreOfTheAlphabet) {
-    std::set<char> salts;
-    for (long number = -100; number < 100; ++number) salts.insert(VEXOUserRandomNumMap2Seed(number));
-    EXPECT_EQ(salts.size(), 63U);
-    for (const char salt : salts) EXPECT_TRUE(isalnum(salt) != 0 || salt == '.') << salt;
+std::string saltsOf(long count) {
+    std::string salts;
+    for (long number = -count; number < count; ++number) salts += VEXOUserRandomNumMap2Seed(number);
+    return salts;
+}
+
+TEST(Salts, AreOfTheAlphabetAndInNoOrder) {
+    const std::string salts = saltsOf(5000);
+    EXPECT_EQ(std::set<char>(salts.begin(), salts.end()).size(), 63U);
+    for (const char salt : salts) ASSERT_TRUE(isalnum(salt) != 0 || salt == '.') << salt;
+    EXPECT_EQ(saltsOf(5000), salts);
+    EXPECT_NE(salts.substr(0, 63), salts.substr(63, 63)) << "one known salt tells nothing of others";
 }
 
 }  // namespace

@@ -77,7 +77,7 @@ VEXO_API int VLIBUserPrivilegeHas(const char* user, const char* appId);
 // source of users. 0, or -1 with errno (EPERM without the right to).
 VEXO_API int VEXOUserInitGroups(const char* user, gid_t gid);
 
-// A character for the salt of crypt(3), from any number: letters, digits and ".", each as often as the other. Never
+// A character for the salt of crypt(3), by a secret of the process, for any number: a letter, a digit or ".", never
 // "/", which some readers of the result take for a path.
 VEXO_API char VEXOUserRandomNumMap2Seed(long number);
 
