@@ -4,7 +4,7 @@
 
 #include <string>
 
-#include "link_store.h"
+#include "public_link.h"
 
 namespace orvel::cgi {
 
@@ -19,9 +19,9 @@ struct LinkWish {
 };
 
 // Makes the link when the user may create links and may download the path, taking on his identity for the rest of the
-// process. 0, or a library code: 407 he may not; 400 a begin without an end or behind it, a password that is too long,
-// an owner whose sessions could not be recorded (a comma in his name); 401 a database that failed; else as for opening
-// the path.
+// process. 0, or a library code: 407 he may not, or the path is neither a file nor a folder; 400 a begin without an end
+// or behind it, a date out of range, a password that is too long, an owner whose sessions could not be recorded (a
+// comma in his name); 401 a database that failed; else as for opening the path.
 int makeLink(const LinkWish& wish, Link& link);
 
 }  // namespace orvel::cgi

@@ -10,16 +10,16 @@
 #include "orvel/sharing_link.h"
 #include "sharing/link_window.h"
 #include "vexo/database.h"
+#include "vexo/link_store.h"
 
 namespace orvel {
 namespace {
 
 constexpr const char* kSource = "orvellogin";
-constexpr const char* kDatabase = "/usr/vexo/etc/pexlander/pxsharing.db";
 
 // The rows of the statement, null when it could not be run. The connection is closed before any row is fetched.
 DatabaseResult execute(const char* statement) {
-    const DatabaseConnection database(VEXODBConnect(kDatabase));
+    const DatabaseConnection database(VEXODBConnect(VEXO::kLinkDatabase));
     if (database == nullptr) {
         syslog(LOG_ERR, "%s:%d Failed to connect to database", kSource, __LINE__);
         return nullptr;

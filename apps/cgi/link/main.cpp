@@ -16,7 +16,7 @@
 #include <vector>
 
 #include "link_making.h"
-#include "link_store.h"
+#include "public_link.h"
 #include "orvel/error_state.h"
 #include "program/program.h"
 #include "reply.h"

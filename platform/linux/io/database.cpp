@@ -1,7 +1,5 @@
 #include "vexo/database.h"
 
-#include <sys/stat.h>
-
 #include <chrono>
 #include <cstring>
 #include <exception>
@@ -46,15 +44,6 @@ struct VEXODBRESULT {
 };
 
 namespace {
-
-// By name and without opening it: to close a database's file by another descriptor drops the locks of its connections.
-bool isDatabaseTrusted(const std::string& path) {
-    struct stat status {};
-    if (lstat(path.c_str(), &status) != 0) return false;
-    if (vexo::isTrusted(status, S_IFREG)) return true;
-    errno = EACCES;
-    return false;
-}
 
 int waitWhileBusy(void* connection, int) {
     if (Clock::now() >= static_cast<VEXODB*>(connection)->deadline) return 0;
@@ -148,7 +137,7 @@ PVEXODB VEXODBConnect(const char* file) try {
     const int before = errno;
     auto connection = std::make_unique<VEXODB>();
     connection->path = VEXO::SystemPath(file);
-    if (isDatabaseTrusted(connection->path)) connection->db = connect(*connection, SQLITE_OPEN_READONLY);
+    if (vexo::isTrustedFile(connection->path)) connection->db = connect(*connection, SQLITE_OPEN_READONLY);
     if (!connection->db) {
         vexo::fail(vexo::errorOfFile(errno));
         return nullptr;

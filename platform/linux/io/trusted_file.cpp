@@ -26,6 +26,14 @@ Descriptor openTrusted(const std::string& path, int flags, mode_t mode) {
     return Descriptor();
 }
 
+bool isTrustedFile(const std::string& path) {
+    struct stat status {};
+    if (lstat(path.c_str(), &status) != 0) return false;
+    if (isTrusted(status, S_IFREG)) return true;
+    errno = EACCES;
+    return false;
+}
+
 int errorOfFile(int systemCode) {
     switch (systemCode) {
         case ENOENT:

@@ -14,6 +14,10 @@ namespace vexo {
 // empty with EACCES. A file that is replaced meanwhile is not met: what has the name then is opened.
 [[nodiscard]] Descriptor openTrusted(const std::string& path, int flags, mode_t mode = 0);
 
+// Whether what is at `path` may be trusted, by name and without opening it: to close a database's file by another
+// descriptor drops the locks of its connections. False with errno.
+[[nodiscard]] bool isTrustedFile(const std::string& path);
+
 // The platform error number for an errno value of such a file.
 int errorOfFile(int systemCode);
 

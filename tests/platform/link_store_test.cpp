@@ -1,0 +1,100 @@
+// The link database: whole before it has its name, trusted or not used.
+#include "vexo/link_store.h"
+
+#include <sys/wait.h>
+
+#include "platform/trust.h"
+#include "support/refuse_calls.h"
+
+namespace {
+
+class LinkStoreTest : public ApplianceTest {
+ protected:
+    // Adds a link with a store of its own; its identifier, "" on failure.
+    static std::string add(const std::string& path) {
+        VEXO::Link link = {.id = "",
+                           .owner = "alice",
+                           .uid = kAliceUid,
+                           .path = path,
+                           .passwordHash = "hash",
+                           .available = 0,
+                           .expires = 7,
+                           .created = 0};
+        VEXO::LinkStore store;
+        return store.add(link) ? link.id : "";
+    }
+    // The paths of all links, each with a bar behind it; "failed" when they could not be read.
+    static std::string paths() {
+        std::vector<VEXO::Link> links;
+        VEXO::LinkStore store;
+        std::string text;
+        if (!store.list("", links)) return "failed";
+        for (const VEXO::Link& link : links) text += link.path + "|";
+        return text;
+    }
+    std::string file_ = systemRoot() + VEXO::kLinkDatabase;
+};
+
+TEST_F(LinkStoreTest, RowsAreAddedFoundAndRemoved) {
+    EXPECT_EQ(paths(), "") << "before any link";
+    const std::string id = add("/photo/a'b"), other = add("/photo");
+    EXPECT_EQ(id.size(), 32U);
+    std::optional<VEXO::Link> link;
+    VEXO::LinkStore store;
+    ASSERT_TRUE(store.find(id, link) && link);
+    EXPECT_TRUE(link->owner == "alice" && link->uid == kAliceUid && link->passwordHash == "hash" && link->expires == 7);
+    EXPECT_TRUE(store.find("' OR 1", link) && !link);
+    bool removed = true;
+    EXPECT_TRUE(store.remove(id, "bob", removed) && !removed);
+    EXPECT_TRUE(store.remove(id, "alice", removed) && removed);
+    EXPECT_TRUE(store.remove(other, "", removed) && removed);
+    EXPECT_EQ(paths(), "");
+    EXPECT_EQ(statusOf(file_).st_mode & 07777, 0600U);
+}
+
+TEST_F(LinkStoreTest, AFirstLinkThatFailsLeavesNothingBroken) {
+    // Whatever the making of the file asks of the kernel is refused in turn.
+    for (const auto& [name, call] : Rows<const char*, long>{
+             row("write", long{SYS_pwrite64}), row("sync", long{SYS_fdatasync}), row("name", long{SYS_rename})}) {
+        SCOPED_TRACE(name);
+        EXPECT_EQ(inChild([call = call] { return !refuseCalls({{call, EIO}}) || add("/photo") == "" ? 0 : 1; }), 0);
+        EXPECT_EQ(paths(), "");
+        EXPECT_FALSE(fs::exists(file_));
+    }
+    // What a killed process left behind is not taken for anything.
+    for (const char* rest : {".new", ".new-journal"}) writeFile(file_ + rest, "half", 0600);
+    EXPECT_NE(add("/photo"), "");
+    EXPECT_EQ(paths(), "/photo|");
+    EXPECT_FALSE(fs::exists(file_ + ".new") || fs::exists(file_ + ".new-journal"));
+}
+
+TEST_F(LinkStoreTest, ManyMakeItAtOnce) {
+    std::vector<pid_t> children;
+    for (int i = 0; i < 8; ++i) {
+        children.push_back(fork());
+        if (children.back() == 0) _exit(add("/photo") == "" ? 1 : 0);
+    }
+    for (const pid_t child : children) {
+        int status = 0;
+        EXPECT_EQ(waitpid(child, &status, 0), child);
+        EXPECT_EQ(status, 0);
+    }
+    EXPECT_EQ(paths().size(), 8 * sizeof "/photo");
+}
+
+TEST_F(LinkStoreTest, BelowASymbolicLinkAndNeverPlanted) {
+    const std::string folder = fs::path(file_).parent_path(), elsewhere = systemRoot() + "/elsewhere";
+    makeFolder(elsewhere);
+    makeFolder(fs::path(folder).parent_path());
+    fs::remove_all(folder);
+    fs::create_directory_symlink(elsewhere, folder);
+    EXPECT_NE(add("/photo"), "");
+    EXPECT_EQ(paths(), "/photo|");
+    plantEach(file_, [] {
+        EXPECT_EQ(paths(), "failed");
+        EXPECT_EQ(add("/photo"), "");
+    });
+    fs::remove(folder);
+}
+
+}  // namespace
