@@ -130,23 +130,22 @@ void appendJudged(LoginRecord record, const Check& check, std::string& out) {
     appendLoginRecord(record, out);
 }
 
-// What the file shall hold after the check of `text`.
-std::string sweep(std::string_view text, const Check& check, int& answer) {
-    std::string out;
-    out.reserve(text.size() + 64);
-    for (LoginRecord record; nextLoginRecord(text, kLongestCheckedLine, record);) {
+// What the file shall hold of these lines after the check.
+void sweep(std::string_view lines, const Check& check, int& answer, std::string& out) {
+    out.clear();
+    out.reserve(lines.size() + 64);
+    for (LoginRecord record; nextLoginRecord(lines, kLongestCheckedLine, record);) {
         if (matches(record, check)) {
             if (judge(record, check, answer)) appendJudged(record, check, out);
         } else if (!isStale(record, check)) {
             appendLoginRecord(record, out);
         }
     }
-    return out;
 }
 
 int checkLocked(const Check& check) {
-    std::string text;
-    if (!readRecordFile(kRecordFile, text)) {
+    RecordReader records(kRecordFile);
+    if (!records) {
         VLIBCErrSetEx(VEXO_ERR_FILE, __FILE__, __LINE__);
         return kRefused;
     }
@@ -157,12 +156,20 @@ int checkLocked(const Check& check) {
         return kFailed;
     }
     int answer = kRefused;
-    const std::string swept = sweep(text, check, answer);
+    std::string swept;
+    for (std::string_view lines; records.next(lines);) {
+        sweep(lines, check, answer, swept);
+        if (!rewrite.write(swept)) return kFailed;
+    }
+    if (records.failed()) {
+        VLIBCErrSetEx(VEXO_ERR_FILE, __FILE__, __LINE__);
+        return kRefused;
+    }
     if (!rewrite.protect()) {
         syslog(LOG_ERR, "%s:%d current.users chmod failed. errno=[0x%04X]", kSource, __LINE__,
                static_cast<unsigned>(errno));
     }
-    return rewrite.commit(swept) ? answer : kFailed;
+    return rewrite.commit() ? answer : kFailed;
 }
 
 int checkSession(Check& check) {
@@ -187,20 +194,19 @@ int lookUp(_tag_VexoCgi* request, char* user, int size, std::string_view link) {
     const char* cookie = VexoCgiGetInCookies(request, "id");
     if (cookie == nullptr) return 0;
     const std::string_view session = cookie;
-    std::string text;
-    {
-        const CriticalSection section(request->szLockFile.c_str());
-        if (!section) {
-            syslog(LOG_ERR, "%s (%d) VexoCgiBeginCriticalSection Failed.", kSource, __LINE__);
-            return 0;
-        }
-        if (!readRecordFile(request->szRecordFile.c_str(), text)) return 0;
+    const CriticalSection section(request->szLockFile.c_str());
+    if (!section) {
+        syslog(LOG_ERR, "%s (%d) VexoCgiBeginCriticalSection Failed.", kSource, __LINE__);
+        return 0;
     }
-    std::string_view rest = text;
-    for (LoginRecord record; nextLoginRecord(rest, kLongestLookedUpLine, record);) {
-        if (record.session != session || record.link != link) continue;
-        snprintf(user, static_cast<std::size_t>(size), "%s", std::string(record.user).c_str());
-        return 1;
+    RecordReader records(request->szRecordFile.c_str());
+    if (!records) return 0;
+    for (std::string_view lines; records.next(lines);) {
+        for (LoginRecord record; nextLoginRecord(lines, kLongestLookedUpLine, record);) {
+            if (record.session != session || record.link != link) continue;
+            snprintf(user, static_cast<std::size_t>(size), "%s", std::string(record.user).c_str());
+            return 1;
+        }
     }
     return 0;
 }

@@ -13,8 +13,6 @@
 namespace orvel {
 namespace {
 
-constexpr std::size_t kLargest = std::size_t{16} << 20;  // what the platform's line functions read
-
 bool isOurs(const struct stat& status) {
     return S_ISREG(status.st_mode) && status.st_nlink == 1 && (status.st_uid == 0 || status.st_uid == geteuid()) &&
            (status.st_mode & (S_IWGRP | S_IWOTH)) == 0;
@@ -41,7 +39,7 @@ Descriptor openRecord(const char* name, struct stat& status) {
 
 bool writeAll(int fd, std::string_view text) {
     while (!text.empty()) {
-        const ssize_t written = write(fd, text.data(), text.size());
+        const ssize_t written = ::write(fd, text.data(), text.size());
         if (written >= 0) {
             text.remove_prefix(static_cast<std::size_t>(written));
         } else if (errno != EINTR) {
@@ -53,25 +51,10 @@ bool writeAll(int fd, std::string_view text) {
 
 }  // namespace
 
-bool readRecordFile(const char* name, std::string& text) {
+RecordReader::RecordReader(const char* name) {
     struct stat status = {};
-    const Descriptor file = openRecord(name, status);
-    if (!file) return false;
-    if (static_cast<std::size_t>(status.st_size) > kLargest) {
-        errno = EFBIG;
-        return false;
-    }
-    text.resize(static_cast<std::size_t>(status.st_size));
-    std::size_t have = 0;
-    while (have < text.size()) {
-        const ssize_t got = read(file.get(), text.data() + have, text.size() - have);
-        if (got < 0 && errno == EINTR) continue;
-        if (got < 0) return false;
-        if (got == 0) break;
-        have += static_cast<std::size_t>(got);
-    }
-    text.resize(have);
-    return true;
+    file_ = openRecord(name, status);
+    if (file_) blocks_.emplace(file_.get(), static_cast<std::size_t>(status.st_size));
 }
 
 bool protectRecordFile() {
@@ -95,8 +78,12 @@ bool RecordRewrite::protect() {
     return fchmod(file_.get(), 0600) == 0;
 }
 
-bool RecordRewrite::commit(std::string_view text) {
-    if (!writeAll(file_.get(), text) || close(file_.release()) != 0) return false;
+bool RecordRewrite::write(std::string_view text) {
+    return writeAll(file_.get(), text);
+}
+
+bool RecordRewrite::commit() {
+    if (close(file_.release()) != 0) return false;
     if (VLIBCSysRename(kRecordTemporary, kRecordFile) != 0) return false;
     left_ = false;
     return true;

@@ -1,11 +1,13 @@
-// The login-record file: read whole, replaced whole. It lies where anybody may put a file of any kind, so nothing is
-// followed, waited for or trusted before it is known to be ours.
+// The login-record file: read in blocks, replaced whole. It lies where anybody may put a file of any kind, so nothing
+// is followed, waited for or trusted before it is known to be ours.
 #ifndef ORVEL_SHARING_RECORD_FILE_H
 #define ORVEL_SHARING_RECORD_FILE_H
 
+#include <optional>
 #include <string>
 #include <string_view>
 
+#include "base/line_blocks.h"
 #include "core/owned.h"
 
 namespace orvel {
@@ -15,9 +17,22 @@ inline constexpr const char* kRecordFile = "/tmp/foldersharing.current.users";
 inline constexpr const char* kRecordLock = "/tmp/foldersharing.current.users.lock";
 inline constexpr const char* kRecordTemporary = "/tmp/foldersharing.current.users.tmp";
 
-// Reads the record file `name` with the caller's identity. False, with errno, when it cannot be read or is not trusted:
-// no regular file, a link, a second name, of neither root nor the effective user, writable by others, beyond 16 MiB.
-[[nodiscard]] bool readRecordFile(const char* name, std::string& text);
+// Reads a record file with the caller's identity, whatever its size: the records of others must not shut anybody out.
+class RecordReader {
+ public:
+    // Empty, with errno, when the file cannot be opened or is not trusted: not a regular file, a link, a second name,
+    // of neither root nor the effective user, writable by others.
+    explicit RecordReader(const char* name);
+    explicit operator bool() const { return static_cast<bool>(file_); }
+
+    // The next whole lines. False at the end, and with failed() and errno when the file cannot be read.
+    [[nodiscard]] bool next(std::string_view& lines) { return blocks_->next(lines); }
+    [[nodiscard]] bool failed() const { return blocks_->failed(); }
+
+ private:
+    Descriptor file_;
+    std::optional<LineBlocks> blocks_;
+};
 
 // Gives the record file mode 0600. False with errno.
 [[nodiscard]] bool protectRecordFile();
@@ -34,9 +49,11 @@ class RecordRewrite {
 
     // Sees to mode 0600 whatever the process masks. False with errno.
     [[nodiscard]] bool protect();
-    // Writes the whole text, closes the temporary and renames it onto the record file. Not synchronised to the disk:
-    // times count from the start of the machine, so no record outlives it. False when any of that failed.
-    [[nodiscard]] bool commit(std::string_view text);
+    // Adds text. False when that failed.
+    [[nodiscard]] bool write(std::string_view text);
+    // Closes the temporary and renames it onto the record file. Not synchronised to the disk: times count from the
+    // start of the machine, so no record outlives it. False when any of that failed.
+    [[nodiscard]] bool commit();
 
  private:
     std::string path_;

@@ -12,8 +12,8 @@
 VEXO_BEGIN_C
 // The first line of which a whole field is `key`, into `line`: without its end (LF or CR LF), cut to size - 1 bytes.
 // Fields are parted by any byte of `separators`; with "" the line is one field. 1 found; 0 none (`line` becomes "");
-// -1 with the slot: 0x0900 no file, 0x0300 not trusted or denied, 0x0D00 a null or an empty key, 0x8100 else, a file
-// beyond 16 MiB among it. Lines with a NUL byte are not found. Reads as root in a process that may become root.
+// -1 with the slot: 0x0900 no file, 0x0300 not trusted or denied, 0x0D00 a null or an empty key, 0x8100 else. Lines
+// with a NUL byte, or of more than 1 MiB, are not found. Reads as root in a process that may become root.
 VEXO_API int VLIBCFileGetLine(const char* file, const char* key, char* line, int size, const char* separators);
 // Appends `line` and a newline by one write; a missing file is made, mode 0600. A last line that has no end gets one
 // first. 0, or -1 with errno and the slot, the file as it was: 0x0D00 a null, a line that holds CR or LF, or one of

@@ -8,6 +8,7 @@
 #include <string>
 #include <string_view>
 
+#include "base/line_blocks.h"
 #include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
@@ -16,8 +17,6 @@
 #include "vexo/system_root.h"
 
 namespace {
-
-constexpr size_t kMaxFile = size_t{16} << 20;
 
 bool hasField(std::string_view line, std::string_view key, std::string_view separators) {
     while (true) {
@@ -39,10 +38,9 @@ std::optional<std::string_view> findLine(std::string_view text, std::string_view
     return {};
 }
 
-bool readRecords(const char* file, std::string& text) {
+vexo::Descriptor openRecords(const char* file) {
     const orvel::RaisedIdentity raised;
-    const orvel::Descriptor fd = vexo::openTrusted(VEXO::SystemPath(file), O_RDONLY);
-    return fd && vexo::readAll(fd.get(), text, kMaxFile);
+    return vexo::openTrusted(VEXO::SystemPath(file), O_RDONLY);
 }
 
 // Whether the file ends within a line; false with errno when that cannot be told.
@@ -79,13 +77,20 @@ int VLIBCFileGetLine(const char* file, const char* key, char* line, int size, co
     }
     const int before = errno;
     line[0] = '\0';
-    std::string text;
-    if (!readRecords(file, text)) return vexo::fail(vexo::errorOfFile(errno));
+    const vexo::Descriptor fd = openRecords(file);
+    struct stat status {};
+    if (!fd || fstat(fd.get(), &status) != 0) return vexo::fail(vexo::errorOfFile(errno));
+    orvel::LineBlocks blocks(fd.get(), static_cast<size_t>(status.st_size));
+    for (std::string_view lines; blocks.next(lines);) {
+        const auto found = findLine(lines, key, separators);
+        if (!found) continue;
+        line[found->copy(line, static_cast<size_t>(size) - 1)] = '\0';
+        errno = before;
+        return 1;
+    }
+    if (blocks.failed()) return vexo::fail(vexo::errorOfFile(errno));
     errno = before;
-    const auto found = findLine(text, key, separators);
-    if (!found) return 0;
-    line[found->copy(line, static_cast<size_t>(size) - 1)] = '\0';
-    return 1;
+    return 0;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }
