@@ -1,6 +1,7 @@
 // Users and groups: from the system root's files and from NSS, remembered and read again, lists and applications.
 #include "accounts/application_list.h"
 #include "platform/trust.h"
+#include "support/system_faults.h"
 #include "vexo/user.h"
 
 namespace {
@@ -229,6 +230,22 @@ TEST_F(AccountTest, Applications) {
     fs::remove(systemRoot() + "/etc/vexo/applications");
     makeFolder(systemRoot() + "/etc/vexo/applications");
     EXPECT_EQ(VLIBUserPrivilegeHas("bob", "files"), 0) << "what cannot be read allows nothing";
+}
+
+// "No" and "could not be determined" are one answer, which ends a visitor's session: what may pass is asked again.
+TEST_F(AccountTest, ReadErrorsThatPassAreNoAnswer) {
+    const std::string applications = "/etc/vexo/applications";
+    writeRootFile(applications, "files: alice @administrators\n");
+    for (const auto& [error, times, passes] :
+         Rows<int, int, bool>{{EIO, 1, true}, {EIO, 2, true}, {ENOMEM, 2, true}, {EIO, 3, false}, {EACCES, 1, false}}) {
+        SCOPED_TRACE(std::to_string(error) + " " + std::to_string(times));
+        for (const char* file : {"/etc/passwd", "/etc/group", "/etc/vexo/applications"}) {
+            fs::last_write_time(systemRoot() + file, fs::file_time_type::clock::now() - std::chrono::hours(times));
+            const OpeningFault fault(systemRoot() + file, error, times);
+            const bool isList = file == applications;
+            EXPECT_EQ(isList ? VLIBUserPrivilegeHas("alice", "files") == 1 : !userOf("alice").empty(), passes) << file;
+        }
+    }
 }
 
 }  // namespace

@@ -1,11 +1,13 @@
 #include "support/system_faults.h"
 
 #include <dirent.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdarg>
 #include <filesystem>
 
 namespace support {
@@ -17,7 +19,7 @@ struct Order {
     int nth = 0;
 };
 
-Order reading, status;
+Order reading, status, opening;
 
 std::string folderOf(int fd) {
     std::error_code ignored;
@@ -48,9 +50,31 @@ StatusFault::~StatusFault() {
     status = {};
 }
 
+OpeningFault::OpeningFault(const std::string& path, int error, int times) {
+    opening = {path, error, times};
+}
+
+OpeningFault::~OpeningFault() {
+    opening = {};
+}
+
 }  // namespace support
 
 extern "C" {
+int openat(int folder, const char* name, int flags, ...) {
+    using namespace support;
+    if (opening.nth > 0 && opening.path == name) {
+        --opening.nth;
+        errno = opening.error;
+        return -1;
+    }
+    va_list rest;
+    va_start(rest, flags);
+    const mode_t mode = (flags & (O_CREAT | O_TMPFILE)) != 0 ? va_arg(rest, mode_t) : 0;
+    va_end(rest);
+    return static_cast<int>(syscall(SYS_openat, folder, name, flags, mode));
+}
+
 ssize_t getdents64(int fd, void* buffer, size_t size) {
     using namespace support;
     if (!reading.path.empty() && refuses(reading, folderOf(fd))) return -1;

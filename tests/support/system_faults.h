@@ -25,6 +25,15 @@ class StatusFault {
     StatusFault& operator=(const StatusFault&) = delete;
 };
 
+// While it lives, the next `times` openings of the absolute path `path` fail.
+class OpeningFault {
+ public:
+    OpeningFault(const std::string& path, int error, int times);
+    ~OpeningFault();
+    OpeningFault(const OpeningFault&) = delete;
+    OpeningFault& operator=(const OpeningFault&) = delete;
+};
+
 }  // namespace support
 
 #endif

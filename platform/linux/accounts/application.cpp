@@ -5,11 +5,13 @@
 #include <algorithm>
 #include <cerrno>
 #include <exception>
+#include <optional>
 #include <string>
 #include <utility>
 
 #include "accounts/application_list.h"
 #include "accounts/user_list.h"
+#include "ask_again.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "io/file_io.h"
@@ -63,17 +65,16 @@ const vexo::ApplicationList* load() {
     return &file.list;
 }
 
-bool isAllowed(const char* user, const char* appId) {
+// Nothing, with errno, when it could not be determined.
+std::optional<bool> isAllowed(const char* user, const char* appId) {
     const vexo::ApplicationList* list = load();
-    if (list == nullptr) {
-        vexo::fail(vexo::errorOfErrno(errno));
-        return false;
-    }
+    if (list == nullptr) return std::nullopt;
     const auto found = list->users.find(appId);
     if (found == list->users.end()) return true;
     vexo::ListedUser listed(user);
-    return std::any_of(found->second.begin(), found->second.end(),
-                       [&](const std::string& entry) { return listed.matches(entry); });
+    const bool allowed = std::any_of(found->second.begin(), found->second.end(),
+                                     [&](const std::string& entry) { return listed.matches(entry); });
+    return allowed || !listed.failed() ? std::optional(allowed) : std::nullopt;
 }
 
 }  // namespace
@@ -84,7 +85,15 @@ int VLIBUserPrivilegeHas(const char* user, const char* appId) try {
         vexo::fail(VEXO_ERR_PARAMETER);
         return 0;
     }
-    return static_cast<int>(isAllowed(user, appId));
+    const int before = errno;
+    const auto allowed = vexo::askAgain([&] { return isAllowed(user, appId); },
+                                        [](const std::optional<bool>& answer) { return !answer.has_value(); });
+    if (allowed) {
+        errno = before;
+    } else {
+        vexo::fail(vexo::errorOfErrno(errno));
+    }
+    return static_cast<int>(allowed.value_or(false));
 } catch (const std::exception&) {
     vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
     return 0;

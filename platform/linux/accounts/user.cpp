@@ -9,6 +9,7 @@
 #include "accounts/account_name.h"
 #include "accounts/account_source.h"
 #include "accounts/user_home.h"
+#include "ask_again.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "field.h"
@@ -57,8 +58,12 @@ int VEXOUserGet(const char* name, PVEXOUSER* out) try {
     if (out != nullptr) *out = nullptr;
     VEXO_GATE("VEXOUserGet", -1);
     if (name == nullptr || out == nullptr) return vexo::fail(VEXO_ERR_PARAMETER);
+    const int before = errno;
     vexo::Account account;
-    return deliver(findUser(name, account), account, out);
+    const vexo::Lookup answer = vexo::askAgain([&] { return findUser(name, account); },
+                                               [](vexo::Lookup found) { return found == vexo::Lookup::failed; });
+    if (answer != vexo::Lookup::failed) errno = before;
+    return deliver(answer, account, out);
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }
