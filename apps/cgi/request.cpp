@@ -8,6 +8,7 @@
 #include <memory>
 
 #include "base/owner.h"
+#include "client_address.h"
 #include "orvel/error_state.h"
 #include "orvel/identity.h"
 #include "orvel/share_path.h"
@@ -24,15 +25,15 @@ namespace {
 
 constexpr const char* kApplication = "VEXO.QDS.App.Quorvane3.Instance";
 
-bool isTrustedProxy(const std::string& address) {
-    const std::string proxies = VexoConf::Info().Get("trusted_proxies", "");
-    for (const std::string& proxy : WebUtils::StringExplode(proxies, ",")) {
-        const size_t first = proxy.find_first_not_of(' ');
-        if (first == std::string::npos) continue;
-        const size_t last = proxy.find_last_not_of(' ');
-        if (proxy.compare(first, last - first + 1, address) == 0) return true;
+std::vector<std::string> trustedProxies() {
+    const std::string setting = VexoConf::Info().Get("trusted_proxies", "");
+    std::vector<std::string> proxies;
+    for (const std::string& proxy : WebUtils::StringExplode(setting, ",")) {
+        const size_t first = std::min(proxy.find_first_not_of(' '), proxy.size());
+        const std::string address = canonicalAddress(proxy.substr(first, proxy.find_last_not_of(' ') + 1 - first));
+        if (!address.empty()) proxies.push_back(address);
     }
-    return false;
+    return proxies;
 }
 
 // What goes wrong here shows again, with its code, when the path is resolved.
@@ -72,11 +73,19 @@ bool addLines(std::string_view lines, std::vector<std::string>& paths) {
 
 }  // namespace
 
-void dropForwardedFor() {
-    const char* peer = getenv("REMOTE_ADDR");
-    if (peer != nullptr && isTrustedProxy(peer)) return;
-    unsetenv("HTTP_X_FORWARDED_FOR");
+void settleClientAddress() {
+    const char* asked = getenv("REMOTE_ADDR");
+    const std::string peer = asked == nullptr ? "" : canonicalAddress(asked);
+    const std::vector<std::string> proxies = trustedProxies();
+    const bool trusted = std::find(proxies.begin(), proxies.end(), peer) != proxies.end();
+    const char* forwarded = getenv("HTTP_X_FORWARDED_FOR");
+    const char* client = getenv("HTTP_CLIENT_IP");
+    std::string address;
+    if (trusted && forwarded != nullptr) address = clientBehind(forwarded, peer, proxies);
+    if (trusted && forwarded == nullptr && client != nullptr) address = canonicalAddress(client);
     unsetenv("HTTP_CLIENT_IP");
+    unsetenv("HTTP_X_FORWARDED_FOR");
+    if (!address.empty()) setenv("HTTP_X_FORWARDED_FOR", address.c_str(), 1);
 }
 
 Status admit(User& user) {
@@ -90,7 +99,7 @@ Status admit(User& user) {
 }
 
 bool begin(Output& out, User& user) {
-    dropForwardedFor();
+    settleClientAddress();
     const Status admitted = isForeign() ? Status::kForbidden : admit(user);
     if (admitted != Status::kOk) replyFailure(out, admitted, "", ORV_ERR_DENIED, "");
     return admitted == Status::kOk;

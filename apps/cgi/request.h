@@ -26,9 +26,10 @@ struct Request {
     VEXO::WebCGI& web;
 };
 
-// Removes the headers in which a proxy names its client from the environment, unless the request comes from an address
-// that the setting "trusted_proxies" lists (comma-separated): anybody can send them.
-void dropForwardedFor();
+// Leaves the client's address, where trusted proxies handed the request on, as the only text of the environment
+// variable HTTP_X_FORWARDED_FOR, and removes it, and HTTP_CLIENT_IP, elsewhere: anybody can send such headers. The
+// setting "trusted_proxies" lists the addresses of proxies whose word counts, comma-separated.
+void settleClientAddress();
 
 // Logs the request in through the platform's session and asks for the file manager's application privilege. kOk with
 // `user` filled, kNotLoggedIn or kForbidden.

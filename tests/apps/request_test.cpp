@@ -4,6 +4,7 @@
 #include <string>
 #include <vector>
 
+#include "client_address.h"
 #include "support/testing.h"
 
 using namespace orvel::cgi;
@@ -32,23 +33,44 @@ TEST(Request, ListsOfPathsNameTheFolderOnce) {
     unsetenv("QUERY_STRING");
 }
 
+TEST(ClientAddress, IsWhatTheLastTrustedProxySaw) {
+    const std::vector<std::string> proxies = {"10.0.0.1", "2001:db8::1"};
+    for (const auto& [forwarded, client] :
+         Rows<const char*, const char*>{{"192.0.2.1", "192.0.2.1"},
+                                        {"198.51.100.7, 192.0.2.1", "192.0.2.1"},
+                                        {"198.51.100.7,192.0.2.1 , ::ffff:10.0.0.1,2001:DB8:0::1", "192.0.2.1"},
+                                        {"10.0.0.1", "10.0.0.1"},
+                                        {"192.0.2.1, unknown", "10.0.0.9"},
+                                        {"192.0.2.1, , 10.0.0.1", "10.0.0.1"},
+                                        {"2001:db8::7", "2001:db8::7"},
+                                        {"", "10.0.0.9"}}) {
+        EXPECT_EQ(clientBehind(forwarded, "10.0.0.9", proxies), client) << forwarded;
+    }
+}
+
 class ForwardedFor : public ApplianceTest {};
 
 TEST_F(ForwardedFor, CountsOnlyFromConfiguredProxies) {
-    for (const auto& [proxies, peer, kept] : Rows<const char*, const char*, bool>{
-             row("", "127.0.0.1", false), row("10.0.0.1, 10.0.0.2", "10.0.0.2", true),
-             row("10.0.0.1, 10.0.0.2", "10.0.0.20", false), row("10.0.0.1,,", "", false)}) {
+    const char* const kNone = nullptr;
+    for (const auto& [proxies, peer, forwarded, client, settled] :
+         Rows<const char*, const char*, const char*, const char*, const char*>{
+             row("", "127.0.0.1", "192.0.2.1", "192.0.2.2", ""),
+             row("10.0.0.1, 10.0.0.2", "10.0.0.2", "192.0.2.7, 192.0.2.1", "192.0.2.2", "192.0.2.1"),
+             row("10.0.0.1, 10.0.0.2", "::ffff:10.0.0.2", kNone, "192.0.2.2", "192.0.2.2"),
+             row("10.0.0.2", "10.0.0.2", kNone, "nobody", ""), row("10.0.0.2", "10.0.0.20", "192.0.2.1", kNone, ""),
+             row("10.0.0.1,,", "", "192.0.2.1", kNone, "")}) {
         writeRootFile("/etc/vexoinfo.conf", std::string("trusted_proxies=\"") + proxies + "\"\n");
         setenv("REMOTE_ADDR", peer, 1);
-        setenv("HTTP_X_FORWARDED_FOR", "192.0.2.1", 1);
-        setenv("HTTP_CLIENT_IP", "192.0.2.2", 1);
-        dropForwardedFor();
-        EXPECT_EQ(getenv("HTTP_X_FORWARDED_FOR") != nullptr, kept) << proxies << " " << peer;
-        EXPECT_EQ(getenv("HTTP_CLIENT_IP") != nullptr, kept) << proxies << " " << peer;
+        unsetenv("HTTP_X_FORWARDED_FOR");
+        if (forwarded != nullptr) setenv("HTTP_X_FORWARDED_FOR", forwarded, 1);
+        if (client != nullptr) setenv("HTTP_CLIENT_IP", client, 1);
+        settleClientAddress();
+        const char* address = getenv("HTTP_X_FORWARDED_FOR");
+        EXPECT_STREQ(address == nullptr ? "" : address, settled) << proxies << " " << peer;
+        EXPECT_EQ(getenv("HTTP_CLIENT_IP"), nullptr);
     }
     unsetenv("REMOTE_ADDR");
     unsetenv("HTTP_X_FORWARDED_FOR");
-    unsetenv("HTTP_CLIENT_IP");
 }
 
 }  // namespace

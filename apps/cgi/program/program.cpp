@@ -70,7 +70,7 @@ void answer(const Program& program, Output& out) {
     }
     User user;
     if (program.caller == Caller::kAnybody) {
-        dropForwardedFor();
+        settleClientAddress();
     } else if (!begin(out, user)) {
         return;
     }
