@@ -1,6 +1,8 @@
 #include "vexo/system_root.h"
 
 #include <cstdlib>
+#include <filesystem>
+#include <system_error>
 
 namespace VEXO {
 namespace {
@@ -8,8 +10,11 @@ namespace {
 std::string readSystemRoot() {
     // Not plain getenv: a program that gained privileges by exec must not read its settings where the caller says.
     const char* value = secure_getenv("VEXO_ROOT");
-    if (value == nullptr || value[0] != '/') return {};
-    std::string root = value;
+    if (value == nullptr || *value == '\0') return {};
+    std::error_code failure;
+    std::string root = std::filesystem::absolute(value, failure);
+    // Rather a root that is not found than the machine's own in its place.
+    if (failure) root = value;
     while (root.ends_with('/')) root.pop_back();
     return root;
 }

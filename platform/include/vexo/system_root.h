@@ -10,7 +10,7 @@
 namespace VEXO {
 
 // The folder that stands for "/" of the appliance: the environment variable VEXO_ROOT, read once (never in a program
-// that gained privileges by exec); "" when unset, relative or "/". Without a trailing slash.
+// that gained privileges by exec) and made absolute then; "" when unset or "/". Without a trailing slash.
 VEXO_API const std::string& SystemRoot();
 
 // `path`, an absolute path of the appliance ("/etc/vexoinfo.conf"), below the system root. Roots of shares are real
