@@ -88,7 +88,7 @@ HostAndPort splitHostHeader(const char* text) {
     std::size_t end = all.find_first_of(":/");
     if (all.starts_with('[')) {
         const std::size_t bracket = all.find(']');
-        if (bracket != std::string_view::npos) end = bracket + 1;
+        end = bracket == std::string_view::npos ? bracket : bracket + 1;
     }
     HostAndPort result{std::string(all.substr(0, std::min(end, kLongest))), ""};
     if (end < all.size() && all[end] == ':') {

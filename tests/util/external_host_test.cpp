@@ -27,7 +27,7 @@ TEST(HostHeader, Table) {
              row("box", "box", ""), row("box:5000/x:1", "box", "5000"), row("box/x:1", "box", ""),
              row("box:", "box", ""), row("box:1:2", "box", "1:2"), row(":80", "", "80"),
              row("[fe80::1]:5000", "[fe80::1]", "5000"), row("[fe80::1]x:80", "[fe80::1]", ""),
-             row("[a/b]:80/", "[a/b]", "80"), row("[fe80", "[fe80", ""),
+             row("[a/b]:80/", "[a/b]", "80"), row("[fe80::1", "[fe80::1", ""),
              row(longest + "xx:" + longest + "yy", longest, longest)}) {
         const auto split = orvel::splitHostHeader(text.c_str());
         EXPECT_EQ(split.host, host) << text;
