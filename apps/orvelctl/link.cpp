@@ -2,13 +2,16 @@
 #include <ctime>
 
 #include "arguments.h"
+#include "base/random.h"
 #include "command.h"
 #include "link_making.h"
-#include "link_store.h"
 #include "orvel/sharing_link.h"
+#include "public_link.h"
 
 namespace orvel::ctl {
 namespace {
+
+constexpr size_t kProposedBytes = 10;  // 80 bits
 
 // A date as seconds: a number of them, or a day (2024-12-31) as its first second here. 0 for "".
 std::int64_t dateOf(const std::string& text) {
@@ -35,7 +38,8 @@ std::string dayText(std::int64_t seconds) {
 }
 
 const char* stateOf(const cgi::Link& link) {
-    if (!cgi::ownerIsThere(link)) return "owner gone";
+    const cgi::Owner owner = cgi::ownerOf(link);
+    if (owner != cgi::Owner::kThere) return owner == cgi::Owner::kGone ? "owner gone" : "owner?";
     if (OrvelLogin::IsLinkOpen(link.available, link.expires, time(nullptr))) return "open";
     return link.available > time(nullptr) ? "not yet" : "expired";
 }
@@ -46,17 +50,22 @@ int broken(const cgi::LinkStore& store) {
 }
 
 int create(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {"--user", "--password", "--from", "--until"}, {}, 1);
+    const Arguments arguments(words, {"--user", "--password", "--from", "--until"}, {"--propose"}, 1);
+    const std::string proposed = arguments.has("--propose") ? orvel::draw<kProposedBytes>() : "";
+    if (arguments.has("--propose") && (proposed.empty() || arguments.has("--password"))) {
+        throw UsageError("--propose draws a password, and --password gives one");
+    }
     const cgi::LinkWish wish = {.user = arguments.required("--user"),
                                 .sid = "",
                                 .path = arguments.position(0),
-                                .password = arguments.value("--password", ""),
+                                .password = arguments.value("--password", proposed),
                                 .available = dateOf(arguments.value("--from", "")),
                                 .expires = dateOf(arguments.value("--until", ""))};
     cgi::Link link;
     const int code = cgi::makeLink(wish, link);
     if (code != 0) return refused(wish.path, code);
     printf("%s\n%s\n", link.id.c_str(), cgi::linkAddress(link.id).c_str());
+    if (!proposed.empty()) printf("%s\n", proposed.c_str());
     return 0;
 }
 

@@ -23,7 +23,15 @@ addCommand({ id: "links", icon: "link", group: "info", run: showLinks });
 
 const dayStart = (day) => (day ? Math.floor(new Date(`${day}T00:00:00`).getTime() / 1000) : undefined);
 
+// 80 random bits in characters that are not mistaken for one another.
+function proposedPassword() {
+  const symbols = "abcdefghijkmnpqrstuvwxyz23456789";
+  const drawn = crypto.getRandomValues(new Uint8Array(16));
+  return [...drawn].map((byte, at) => (at > 0 && at % 4 === 0 ? "-" : "") + symbols[byte % symbols.length]).join("");
+}
+
 async function makeLink(entry) {
+  let password = "";
   const link = await dialog({
     title: t("link.title"),
     fill: (close) => {
@@ -37,7 +45,7 @@ async function makeLink(entry) {
         {
           onsubmit: async (event) => {
             event.preventDefault();
-            const { password } = Object.fromEntries(new FormData(form));
+            ({ password } = Object.fromEntries(new FormData(form)));
             try {
               close(
                 await post("link", {
@@ -65,8 +73,10 @@ async function makeLink(entry) {
               autocomplete: "off",
               spellcheck: "false",
               autofocus: true,
+              value: proposedPassword(),
               placeholder: t("link.password.none"),
             }),
+            t("link.password.proposed"),
           ),
           h(
             "div.pair",
@@ -87,10 +97,11 @@ async function makeLink(entry) {
       return [form];
     },
   });
-  if (link) showLink(link);
+  if (link) showLink(link, password);
 }
 
-function showLink(link) {
+// The password is shown this once: the appliance keeps no more than its hash.
+function showLink(link, password) {
   const input = h("input.input.address", {
     type: "text",
     readonly: true,
@@ -114,6 +125,18 @@ function showLink(link) {
             t("link.copy"),
           ),
         ),
+        link.has_password &&
+          h(
+            "div.address-line",
+            {},
+            h("input.input.password", { type: "text", readonly: true, value: password, "aria-label": t("link.password") }),
+            h(
+              "button.button.outlined",
+              { type: "button", onclick: () => copyText(password, t("link.password.copied")) },
+              icon("copy"),
+              t("link.password.copy"),
+            ),
+          ),
         h(
           "p.soft",
           {},
