@@ -13,7 +13,15 @@ jar() { echo "$work/jar"; }
 status() { curl -s -o "$work/body" -w '%{http_code}' -b "$(jar)" -c "$(jar)" "$@"; } # of a request, its body in $work/body
 visit() { status "$share?FOLDER_SHARING=$1&action=list&${2:-}" "${@:3}"; }             # link, more of the query, options
 names() { grep -o '"name":"[^"]*"' "$work/body" | cut -d'"' -f4 | tr '\n' ' '; }
-enter() { status -d action=login --data-urlencode "password=$2" "$share?FOLDER_SHARING=$1" "${@:3}"; } # link, password
+enter() { # link, password, options: comes again for as long as it is not its turn
+    local code=429 turn=
+    while [ "$code" = 429 ]; do
+        code=$(status -d action=login --data-urlencode "password=$2" -d "turn=$turn" "$share?FOLDER_SHARING=$1" "${@:3}")
+        turn=$(sed -n 's/.*"turn":"\([0-9a-f]*\)".*/\1/p' "$work/body")
+        [ "$code" != 429 ] || sleep "$(awk -v ms="$(sed -n 's/.*"wait":\([0-9]*\).*/\1/p' "$work/body")" 'BEGIN { print ms / 1000 }')"
+    done
+    echo "$code"
+}
 
 mkdir -p "$photo/shared/inner" "$photo/secret"
 echo one >"$photo/shared/one.txt"
@@ -24,9 +32,9 @@ ln -s ../secret "$photo/shared/out"
 mkdir "$photo/shared/<script>evil('&"
 [ "$(id -u)" -ne 0 ] || chown -R 30001:30100 "$photo/shared" "$photo/secret"
 
-# A folder without a password: the page lets in, the rest follows the cookie.
+# A folder without a password: nobody logs in, and no cookie is set.
 free=$(link /photo/shared)
-expect "listing before the page" 401 "$(visit "$free")"
+expect "listing before the page" 200 "$(visit "$free")"
 expect "the page" 200 "$(status "$share?FOLDER_SHARING=$free")"
 expect "its lines" 29 "$(wc -l <"$work/body")"
 expect "its path" 1 "$(grep -c "var g_FolderPath = '/photo/shared';" "$work/body")"
@@ -65,7 +73,12 @@ expect "its name" "one.txt one.txt " "$(names)"
 expect "the file itself" one "$(curl -s -b "$(jar)" "$share?FOLDER_SHARING=$file&action=download")"
 expect "nothing beside it" 404 "$(status "$share?FOLDER_SHARING=$file&action=download&path=../one.txt")"
 expect "the folder still" 200 "$(visit "$free")"
-expect "cookies" 2 "$(grep -cE "$free|$file" "$(jar)")"
+expect "cookies" 2 "$(grep -cE "$free|$file|$file-seal" "$(jar)")"
+
+# A password that the tool proposes: 80 bits.
+{ read -r proposed; read -r _; read -r word; } < <(ctl link create /photo/shared --propose --user alice)
+expect "its length" 20 "${#word}"
+expect "it opens" 200 "$(enter "$proposed" "$word" --interface 127.0.0.4)"
 
 # A session belongs to its address.
 expect "from another address" 401 "$(visit "$file" "" --interface 127.0.0.3)"
@@ -81,20 +94,20 @@ last=$(link /photo/shared --until "$day")
 begins=$(link /photo/shared --from "$until" --until "$((until + 100000))")
 at() { while [ "$(date +%s)" -lt "$1" ]; do sleep 0.05; done; }
 page() { status "$share?FOLDER_SHARING=$1&action=list"; }
-expect "before the end" 401 "$(page "$ends")"
+expect "before the end" 200 "$(page "$ends")"
 expect "before the begin" 404 "$(page "$begins")"
 at "$until"
-expect "in the last second" 401 "$(page "$ends")"
-expect "in the first second" 401 "$(page "$begins")"
+expect "in the last second" 200 "$(page "$ends")"
+expect "in the first second" 200 "$(page "$begins")"
 at "$((until + 1))"
 expect "after the end" 404 "$(page "$ends")"
 at "$((day + 86399))"
-expect "in the last second of a day" 401 "$(page "$last")"
+expect "in the last second of a day" 200 "$(page "$last")"
 at "$((day + 86400))"
 expect "after the day" 404 "$(page "$last")"
 
 # Ends of links: revoked, the account ended, the owner another one.
-expect "one's own links" 6 "$(curl -s -u "alice:$(password alice)" "$site/cgi-bin/link?action=list" | grep -o '"id"' | wc -l)"
+expect "one's own links" 7 "$(curl -s -u "alice:$(password alice)" "$site/cgi-bin/link?action=list" | grep -o '"id"' | wc -l)"
 revoke() { curl -s -u "$1:$(password "$1")" -d action=revoke -d "id=$2" "$site/cgi-bin/link"; }
 expect "another's link" 1 "$(revoke bob "$file" | grep -c '"success":false')"
 expect "revoking it" 1 "$(revoke alice "$file" | grep -c '"success":true')"
@@ -131,7 +144,8 @@ ctl sharing set everybody
 
 # Too many wrong passwords: the address is out, others are not.
 guarded=$(link /photo/shared --password x)
-for _ in $(seq 10); do enter "$guarded" wrong --interface 127.0.0.2 >/dev/null; done
+echo 'autoblock_attempts="2"' >>"$demo/etc/vexoinfo.conf"
+for _ in 1 2; do enter "$guarded" wrong --interface 127.0.0.2 >/dev/null; done
 expect "the right password, too late" 403 "$(enter "$guarded" x --interface 127.0.0.2)"
 expect "any page" 403 "$(status "$share?FOLDER_SHARING=$free" --interface 127.0.0.2)"
 expect "from another address" 200 "$(enter "$guarded" x)"

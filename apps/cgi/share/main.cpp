@@ -4,21 +4,24 @@
 //   FOLDER_SHARING   the link; the header Folder-Sharing comes before it
 //   action           none: the page, which asks for the rest
 //                    "state": {"logged_in", "password"}, the latter whether the link takes one
-//                    "login" (posted): with `password`; sets the cookie of the link
+//                    "login" (posted): with `password`; sets the cookies of the link. 429 when it is not the visitor's
+//                    turn, with {"wait", "turn"}: `turn` goes with the next attempt, after `wait` milliseconds
 //                    "list": what the shared folder holds, or the shared file alone
 //                    "download": a file with ranges, a folder or several paths as a zip
 //   path, path_raw   below the shared folder (list, download)
 //   sort_by, sort_direction, offset, limit, additional   as for the program "list"; of the additional properties only
 //                    size, time and type
 // A link that is not open for whatever reason, and any path outside it, is missing. What needs a log-in answers 401
-// without one.
+// without one; a link without a password needs none, and nothing is recorded of its visitors.
 #include <json/value.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <cstdio>
+#include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "confined.h"
@@ -36,6 +39,8 @@
 namespace orvel::cgi {
 namespace {
 
+// Each is open while the zip is made.
+constexpr size_t kMostPaths = 500;
 constexpr int kShown = ADDITIONAL_SIZE | ADDITIONAL_TIME | ADDITIONAL_TYPE | kAdditionalIcon;
 
 // In front of what the library writes: nothing that the page names may come from elsewhere, nobody learns its address.
@@ -61,7 +66,6 @@ void writeNotice(Output& out, const char* status, const char* text) {
                   "\r\n<!DOCTYPE html><meta charset=\"utf-8\"><title>" + text + "</title><p>" + text + "</p>\n";
 }
 
-// A link without a password lets the visitor in at once.
 void servePage(Output& out, Visit& visit) {
     if (!isTunnel(visit.web().GetParam("tunnel", ""))) return writeNotice(out, "400 Bad Request", "Bad address.");
     switch (visit.availability()) {
@@ -74,18 +78,30 @@ void servePage(Output& out, Visit& visit) {
         case Availability::kOpen:
             break;
     }
-    if (visit.link().passwordHash.empty() && !visit.logIn("")) {
-        return writeNotice(out, "500 Internal Server Error", "This link cannot be opened now.");
-    }
     printf("Status: 200 OK\r\n%s", kPageHeaders);
     visit.writePage();
 }
 
-// The cookie of the log-in goes out with the request's own header, so the reply takes that way.
+void replyWait(Output& out, const VEXOGUESS& waiting) {
+    Json::Value data;
+    data["wait"] = waiting.wait;
+    data["turn"] = waiting.turn;
+    out.text() += "Retry-After: " + std::to_string((waiting.wait + 999) / 1000) + "\r\n";
+    reply(out, Status::kTooMany, "", ORV_ERR_BUSY, "", data);
+}
+
+// The cookies of the log-in go out with the request's own header, so the reply takes that way.
 void serveLogin(Output& out, Visit& visit) {
     if (!isPosted()) return replyFailure(out, Status::kBadRequest, "", ORV_ERR_PARAMETER, "");
-    if (!visit.logIn(visit.web().GetParam("password", ""))) {
-        return replyFailure(out, Status::kForbidden, "", ORV_ERR_DENIED, "");
+    switch (visit.logIn(visit.web().GetParam("password", ""), visit.web().GetParam("turn", ""))) {
+        case LogIn::kWait:
+            return replyWait(out, visit.waiting());
+        case LogIn::kWrong:
+            return replyFailure(out, Status::kForbidden, visit.dropCookie(), ORV_ERR_DENIED, "");
+        case LogIn::kBroken:
+            return replyFailure(out, Status::kBroken, "", ORV_ERR_GENERAL, "");
+        case LogIn::kDone:
+            break;
     }
     printf("Status: 200 OK\r\nCache-Control: no-store\r\nX-Content-Type-Options: nosniff\r\n");
     visit.web().WriteHeader("application/json; charset=UTF-8");
@@ -93,11 +109,20 @@ void serveLogin(Output& out, Visit& visit) {
     fflush(stdout);
 }
 
+// False, with the reply written, when it could not be determined.
+bool findSession(Output& out, Visit& visit, Session& session) {
+    session = visit.session();
+    if (session == Session::kUnknown) replyFailure(out, Status::kBroken, "", ORV_ERR_GENERAL, "");
+    return session != Session::kUnknown;
+}
+
 void serveState(Output& out, Visit& visit) {
+    Session session = Session::kUnknown;
+    if (!findSession(out, visit, session)) return;
     Json::Value state;
-    state["logged_in"] = visit.isLoggedIn();
+    state["logged_in"] = session == Session::kIn;
     state["password"] = !visit.link().passwordHash.empty();
-    reply(out, Status::kOk, "", ORV_ERR_NONE, "", state);
+    reply(out, Status::kOk, visit.dropCookie(), ORV_ERR_NONE, "", state);
 }
 
 // The shared file as the only item of a list.
@@ -156,16 +181,21 @@ void serveList(Output& out, Visit& visit, const std::string& wanted) {
     out.text() += '}';
 }
 
+// Each place once, however often it is named: a visitor could have the same folder packed again and again.
 void serveDownload(Output& out, Visit& visit, std::vector<std::string> wanted) {
     if (wanted.empty()) wanted.emplace_back();
-    std::vector<Source> sources(wanted.size());
-    for (size_t i = 0; i < wanted.size(); ++i) {
+    std::vector<Source> sources;
+    std::set<std::string> seen;
+    for (const std::string& path : wanted) {
         Place place;
-        int code = findPlace(visit.link().owner, visit.link().path, wanted[i], place);
-        if (code == ORV_ERR_NONE) code = openFound(place.found, place.realPath, sources[i]);
-        if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), "", code, wanted[i]);
-        sources[i].path = place.path;
-        sources[i].name = place.name;
+        Source source;
+        int code = findPlace(visit.link().owner, visit.link().path, path, place);
+        if (code == ORV_ERR_NONE && !seen.insert(place.within).second) continue;
+        if (code == ORV_ERR_NONE) code = openFound(place.found, place.realPath, source);
+        if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), "", code, path);
+        source.path = place.path;
+        source.name = place.name;
+        sources.push_back(std::move(source));
     }
     const User owner = {.name = visit.link().owner, .sid = "", .cookie = ""};
     if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, owner, sources[0]);
@@ -184,9 +214,12 @@ int codeOf(Availability availability) {
 
 // What only a visitor who is logged in sees; from here on the process is the link's owner.
 void serveInside(Output& out, Visit& visit, const std::string& action) {
-    if (!visit.isLoggedIn()) return replyFailure(out, Status::kNotLoggedIn, "", ORV_ERR_DENIED, "");
+    Session session = Session::kUnknown;
+    if (!findSession(out, visit, session)) return;
+    if (session == Session::kOut)
+        return replyFailure(out, Status::kNotLoggedIn, visit.dropCookie(), ORV_ERR_DENIED, "");
     const auto paths = pathParams(visit.web());
-    if (!paths || (action == "list" && paths->size() > 1)) {
+    if (!paths || paths->size() > (action == "list" ? 1 : kMostPaths)) {
         return replyFailure(out, Status::kBadRequest, "", ORV_ERR_PARAMETER, "");
     }
     const int code = actAs(nullptr, visit.link().owner, IsDirUserHome(visit.link().path, nullptr));

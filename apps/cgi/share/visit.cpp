@@ -1,5 +1,7 @@
 #include "share/visit.h"
 
+#include <sys/stat.h>
+
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
@@ -9,9 +11,14 @@
 
 #include "vexo/auto_block.h"
 #include "vexo/error.h"
+#include "vexo/system_root.h"
+#include "vexo/web_record.h"
 
 namespace orvel::cgi {
 namespace {
+
+constexpr off_t kRecordsToSweep = off_t{256} * 1024;
+constexpr size_t kLongestUser = 63;
 
 // The places where the library looks for them.
 std::string linkIdOf(const VEXO::WebCGI& web) {
@@ -45,6 +52,17 @@ std::string harmless(std::string path) {
     return path;
 }
 
+// A check of any session drops the records that have ended; log-ins alone would only add to them.
+void sweepRecords(VEXO::WebCGI& web, const std::string& link) {
+    _tag_VexoCgi request;
+    struct stat status = {};
+    if (VexoCgiInit(&request) != 0 || stat(VEXO::SystemPath(request.szRecordFile).c_str(), &status) != 0) return;
+    if (status.st_size <= kRecordsToSweep) return;
+    char user[kLongestUser + 1] = {};
+    _tag_confirm_policy policy = {.flags = 0, .keepAccessTime = 0};
+    IsAuthorizedByPath(&web, "", user, sizeof user, &policy, CGI_POSITION_FILE_MANAGER, link.c_str());
+}
+
 }  // namespace
 
 Visit::Visit(VEXO::WebCGI& web) : web_(web), availability_(find()) {}
@@ -59,24 +77,62 @@ Availability Visit::find() {
     std::optional<Link> found;
     LinkStore store;
     if (!store.find(id, found)) return Availability::kBroken;
-    if (!found || !OrvelLogin::IsLinkOpen(found->available, found->expires, time(nullptr)) || !ownerIsThere(*found)) {
-        return Availability::kNone;
-    }
+    if (!found || !OrvelLogin::IsLinkOpen(found->available, found->expires, time(nullptr))) return Availability::kNone;
+    const Owner owner = ownerOf(*found);
+    if (owner != Owner::kThere) return owner == Owner::kGone ? Availability::kNone : Availability::kBroken;
     link_ = *found;
     link_.path = manager_.GetSharingFolderPath(web_);
     return link_.path.empty() ? Availability::kNone : Availability::kOpen;
 }
 
-bool Visit::isLoggedIn() {
-    return manager_.isAuthorized(web_, link_.id) && manager_.GetLoginUserName() == link_.owner;
+// Whether the visitor shows what only a log-in with the right password gave: the session's own cookie has no more than
+// a few thousand possible values.
+Session Visit::sealed() {
+    const std::string shown = web_.GetCookie(sealName(), "");
+    char seal[33];
+    if (shown.empty()) return Session::kOut;
+    if (VEXOGuessSeal((link_.id + '\n' + link_.passwordHash).c_str(), seal) != 0) return Session::kUnknown;
+    if (shown == seal) return Session::kIn;
+    dropCookie_ = sealName() + "=; Path=/; Max-Age=0; HttpOnly; SameSite=Lax";
+    return Session::kOut;
 }
 
-bool Visit::logIn(const std::string& password) {
-    if (!link_.passwordHash.empty() && !passwordMatches(password, link_.passwordHash)) {
-        manager_.folderSharingFailLoginSet();
-        return false;
-    }
-    return manager_.folderSharingLogin(web_, link_.id, link_.owner);
+bool Visit::isAuthorized() {
+    // The library gives the name cut to its buffer.
+    return manager_.isAuthorized(web_, link_.id) && manager_.GetLoginUserName() == link_.owner.substr(0, kLongestUser);
+}
+
+Session Visit::session() {
+    if (link_.passwordHash.empty()) return Session::kIn;
+    const Session seal = sealed();
+    if (!dropCookie_.empty() && VEXOGuessWrong(link_.id.c_str(), clientAddress().c_str()) != 0)
+        return Session::kUnknown;
+    if (seal != Session::kIn) return seal;
+    return isAuthorized() ? Session::kIn : Session::kOut;
+}
+
+LogIn Visit::logIn(const std::string& password, const std::string& turn) {
+    if (link_.passwordHash.empty()) return LogIn::kDone;
+    const Session seal = sealed();
+    if (seal == Session::kUnknown) return LogIn::kBroken;
+    if (seal == Session::kIn && isAuthorized()) return LogIn::kDone;
+    const std::string address = clientAddress();
+    const int mayJudge =
+        VEXOGuessBegin(link_.id.c_str(), address.c_str(), turn.c_str(), seal == Session::kIn ? 1 : 0, &guess_);
+    if (mayJudge != 1) return mayJudge == 0 ? LogIn::kWait : LogIn::kBroken;
+    const bool right = passwordMatches(password, link_.passwordHash);
+    const int counted = VEXOGuessEnd(link_.id.c_str(), address.c_str(), right ? 1 : 0, &guess_);
+    if (!right) manager_.folderSharingFailLoginSet();
+    if (counted != 1) return counted == 0 ? LogIn::kWait : LogIn::kBroken;
+    if (!right) return LogIn::kWrong;
+    return recordSession() ? LogIn::kDone : LogIn::kBroken;
+}
+
+bool Visit::recordSession() {
+    char seal[33];
+    sweepRecords(web_, link_.id);
+    return VEXOGuessSeal((link_.id + '\n' + link_.passwordHash).c_str(), seal) == 0 &&
+           manager_.folderSharingLogin(web_, link_.id, link_.owner) && web_.AddCookieToHeader("/", sealName(), seal);
 }
 
 void Visit::writePage() {

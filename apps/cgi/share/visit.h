@@ -4,8 +4,9 @@
 
 #include <string>
 
-#include "link_store.h"
 #include "orvel/sharing_link.h"
+#include "public_link.h"
+#include "vexo/guess.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
@@ -17,6 +18,19 @@ enum class Availability {
     kBroken    // the database could not be used
 };
 
+enum class Session {
+    kIn,
+    kOut,
+    kUnknown  // could not be determined
+};
+
+enum class LogIn {
+    kDone,   // a cookie may wait for the reply's header
+    kWrong,  // a wrong password, which counts as a failed attempt
+    kWait,   // it is not this visitor's turn to have a password judged: waiting() says when
+    kBroken  // no session could be made
+};
+
 class Visit {
  public:
     explicit Visit(VEXO::WebCGI& web);
@@ -25,20 +39,29 @@ class Visit {
     [[nodiscard]] const Link& link() const { return link_; }
     [[nodiscard]] VEXO::WebCGI& web() const { return web_; }
 
-    // Is the visitor logged in as the link's owner?
-    bool isLoggedIn();
-    // Logs the visitor in; false for a wrong password, which counts as a failed attempt, and when no session could be
-    // made. A cookie then waits for the reply's header.
-    bool logIn(const std::string& password);
+    // Is the visitor logged in as the link's owner? A link without a password asks for no log-in, and has no sessions.
+    Session session();
+    // Logs the visitor in. Nothing here waits for a turn: a visitor who is not next is told when to come again, and
+    // `turn` is what such an answer gave. One who has shown the right password before need not queue.
+    LogIn logIn(const std::string& password, const std::string& turn);
+    [[nodiscard]] const VEXOGUESS& waiting() const { return guess_; }
+    // The Set-Cookie line that takes a cookie away which a log-in never gave; "" for none.
+    [[nodiscard]] const std::string& dropCookie() const { return dropCookie_; }
     void writePage();
 
  private:
     Availability find();
+    [[nodiscard]] std::string sealName() const { return link_.id + "-seal"; }
+    Session sealed();
+    bool isAuthorized();
+    bool recordSession();
 
     VEXO::WebCGI& web_;
     OrvelLogin::FolderSharingLoginManager manager_;
     Link link_;
     Availability availability_;
+    VEXOGUESS guess_ = {.wait = 0, .turn = "", .seat = -1};
+    std::string dropCookie_;
 };
 
 }  // namespace orvel::cgi

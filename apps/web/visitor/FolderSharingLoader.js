@@ -48,9 +48,24 @@
     notice(status === 403 ? texts.blocked : status === 404 ? texts.gone : texts.failed);
   }
 
-  async function logIn(password) {
-    const body = new URLSearchParams({ action: "login", password });
-    return ask({}, { method: "POST", body });
+  // Passwords are judged in turn: whoever is not next is told when to come again, and with which turn.
+  async function logIn(password, tellWait) {
+    let turn = "";
+    for (;;) {
+      const body = new URLSearchParams({ action: "login", password, turn });
+      const answer = await ask({}, { method: "POST", body });
+      if (answer.status !== 429) return answer;
+      turn = answer.json.data.turn;
+      await wait(answer.json.data.wait, tellWait);
+    }
+  }
+
+  async function wait(milliseconds, tell) {
+    const end = Date.now() + milliseconds;
+    for (let left = milliseconds; left > 0; left = end - Date.now()) {
+      if (milliseconds > 1500) tell(Math.ceil(left / 1000));
+      await new Promise((done) => setTimeout(done, Math.min(left, 1000)));
+    }
   }
 
   function askPassword(path) {
@@ -61,7 +76,8 @@
       submit: async (event) => {
         event.preventDefault();
         button.disabled = true;
-        const { status } = await logIn(input.value).catch(() => ({ status: 500 }));
+        const tellWait = (seconds) => { wrong.textContent = texts.wait.replace("{seconds}", seconds); };
+        const { status } = await logIn(input.value, tellWait).catch(() => ({ status: 500 }));
         if (status === 200) return open(path);
         button.disabled = false;
         wrong.textContent = status === 403 ? texts.wrong : status === 404 ? texts.gone : texts.failed;
@@ -134,15 +150,10 @@
       make("p", { class: "about" }, about), button));
   }
 
-  // The page logs in by itself where no password is asked, unless its session has ended since.
   async function open(path) {
     const state = await ask({ action: "state" }).catch(() => ({ status: 500 }));
     if (state.status !== 200) return noticeOf(state.status);
-    if (!state.json.data.logged_in) {
-      if (state.json.data.password) return askPassword(path);
-      const again = await logIn("").catch(() => ({ status: 500 }));
-      if (again.status !== 200) return noticeOf(again.status);
-    }
+    if (!state.json.data.logged_in) return askPassword(path);
     const { status, json } = await list(path, 0).catch(() => ({ status: 500 }));
     if (status !== 200) return noticeOf(status);
     if (!json.success) return noticeOf(404);

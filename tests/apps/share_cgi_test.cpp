@@ -1,0 +1,204 @@
+// The program share as a web server runs it: who is let in, whose password is judged when. The time of guesses stands
+// where a test puts it.
+#include <sys/stat.h>
+
+#include <sstream>
+
+#include "apps/program.h"
+#include "public_link.h"
+#include "support/testing.h"
+#include "text.h"
+#include "vexo/guess.h"
+
+namespace {
+
+using orvel::cgi::Link;
+using orvel::cgi::LinkStore;
+
+constexpr const char* kPassword = "pass word";
+
+class ShareCgi : public ApplianceTest {
+ protected:
+    void SetUp() override {
+        ApplianceTest::SetUp();
+        SKIP_WITHOUT_ROOT();
+        makeFolder(systemRoot() + "/tmp", 01777);
+        makeFolder(shareRoot("photo") + "/shared/inner", 0777);
+        writeFile(shareRoot("photo") + "/shared/inner/two.txt", "two");
+        setSetting("trusted_proxies", "127.0.0.1, 10.0.0.1");
+        free_ = addLink("alice", kAliceUid, "");
+        guarded_ = addLink("alice", kAliceUid, kPassword);
+    }
+    static std::string addLink(const std::string& owner, uid_t uid, const std::string& password) {
+        Link link = {.id = "",
+                     .owner = owner,
+                     .uid = uid,
+                     .path = "/photo/shared",
+                     .passwordHash = password.empty() ? "" : orvel::cgi::hashPassword(password),
+                     .available = 0,
+                     .expires = 0,
+                     .created = 0};
+        LinkStore store;
+        EXPECT_TRUE(store.add(link)) << store.error();
+        return link.id;
+    }
+    std::string ask(const std::string& link, const std::string& query, const std::string& method = "GET",
+                    const std::string& form = "") {
+        const Variables more = {{"HTTP_X_FORWARDED_FOR", visitor_},
+                                {"HTTP_COOKIE", cookies_},
+                                {"HTTP_FOLDER_SHARING", link},
+                                {"CONTENT_TYPE", form.empty() ? "" : "application/x-www-form-urlencoded"},
+                                {"VEXO_GATE_MILLISECONDS", std::to_string(now_)}};
+        return runCgi(PROGRAM_SHARE, "", method, query, form, more);
+    }
+    int status(const std::string& link, const std::string& action) {
+        return CgiReply(ask(link, "action=" + action)).status;
+    }
+    CgiReply enter(const std::string& password, const std::string& turn = "") {
+        const std::string form = "action=login&password=" + orvel::cgi::percentEncode(password) + "&turn=" + turn;
+        last_ = ask(guarded_, "", "POST", form);
+        return CgiReply(last_);
+    }
+    // The cookies that the last log-in set, as the visitor sends them.
+    [[nodiscard]] std::string given() const {
+        std::string cookies;
+        std::istringstream lines(last_);
+        for (std::string line; std::getline(lines, line);) {
+            if (line.starts_with("Set-Cookie: ")) cookies += line.substr(12, line.find(';') - 11) + " ";
+        }
+        return cookies;
+    }
+    [[nodiscard]] std::string records() const { return systemRoot() + "/tmp/foldersharing.current.users"; }
+
+    std::string free_, guarded_, cookies_, visitor_ = "192.0.2.1", last_;
+    long long now_ = 1000000;
+};
+
+TEST_F(ShareCgi, NothingIsRecordedOfVisitorsWhoNeedNoPassword) {
+    cookies_ = free_ + "=made-up; " + free_ + "-seal=made-up";
+    for (const char* method : {"GET", "HEAD"}) EXPECT_EQ(RawReply(ask(free_, "", method)).status, 200);
+    EXPECT_TRUE(CgiReply(ask(free_, "action=state")).json["data"]["logged_in"].asBool());
+    EXPECT_EQ(status(free_, "list"), 200);
+    const std::string reply = ask(free_, "action=login", "POST");
+    EXPECT_EQ(CgiReply(reply).status, 200);
+    EXPECT_EQ(reply.find("Set-Cookie"), std::string::npos);
+    EXPECT_EQ(RawReply(ask(guarded_, "", "HEAD")).status, 200);
+    EXPECT_FALSE(fs::exists(records()));
+    EXPECT_FALSE(fs::exists(systemRoot() + "/run/vexo/guesses"));
+}
+
+TEST_F(ShareCgi, PasswordsAreJudgedInTurn) {
+    EXPECT_EQ(enter("wrong").status, 403);
+    visitor_ = "192.0.2.99, 192.0.2.1";  // what the visitor wrote, then what the proxy saw
+    const CgiReply again = enter(kPassword);
+    EXPECT_EQ(again.status, 429);
+    EXPECT_EQ(again.headers.at("Retry-After"), "2");
+    EXPECT_EQ(again.json["error"]["code"], ORV_ERR_BUSY);
+    EXPECT_EQ(again.json["data"]["wait"], 2000);
+    EXPECT_EQ(again.json["data"]["turn"], "") << "its own pace, not a place in the order";
+    visitor_ = "192.0.2.2";
+    const CgiReply turn = enter(kPassword);
+    EXPECT_EQ(turn.status, 429);
+    EXPECT_EQ(turn.headers.at("Retry-After"), "1");
+    EXPECT_EQ(turn.json["data"]["wait"], 200);
+    EXPECT_EQ(status(free_, "list"), 200) << "other links are not concerned";
+    now_ += 200;
+    EXPECT_EQ(enter(kPassword).status, 429) << "somebody else at this address";
+    EXPECT_EQ(enter(kPassword, turn.json["data"]["turn"].asString()).status, 200);
+    EXPECT_EQ(status(guarded_, "list"), 401);
+    cookies_ = given();
+    EXPECT_EQ(status(guarded_, "list"), 200);
+    EXPECT_EQ(enter("anything").status, 200) << "is in";
+    visitor_ = "192.0.2.3";
+    EXPECT_EQ(status(guarded_, "list"), 401) << "a session belongs to its address";
+    EXPECT_EQ(enter(kPassword).status, 200) << "but whoever has known the password passes by the order";
+}
+
+TEST_F(ShareCgi, ACookieThatNoLogInGaveIsAFailedGuess) {
+    EXPECT_EQ(enter(kPassword).status, 200);
+    const std::string whole = given();
+    const size_t seal = whole.find(guarded_ + "-seal=") + guarded_.size() + 6;
+    cookies_ = whole;
+    EXPECT_EQ(status(guarded_, "list"), 200);
+    cookies_ = whole.substr(0, whole.find(' '));
+    EXPECT_EQ(status(guarded_, "list"), 401) << "the session's identifier alone, which could be guessed";
+    cookies_ = whole;
+    cookies_[seal] = cookies_[seal] == '0' ? '1' : '0';
+    const CgiReply refused(ask(guarded_, "action=list"));
+    EXPECT_EQ(refused.status, 401);
+    EXPECT_TRUE(refused.headers.at("Set-Cookie").starts_with(guarded_ + "-seal=; ")) << "it goes, or would count again";
+    cookies_ = "";
+    EXPECT_EQ(enter(kPassword).json["data"]["wait"], 2000);
+    writeFile(systemRoot() + "/run/vexo/guesses", "", 0622);
+    cookies_ = whole;
+    EXPECT_EQ(status(guarded_, "list"), 500) << "neither in nor out";
+    EXPECT_EQ(enter(kPassword).status, 500);
+}
+
+TEST_F(ShareCgi, RecordsOfAnySizeAreSweptAndShutNobodyOut) {
+    std::string stale;
+    while (stale.size() < (17U << 20))
+        stale += "10.0.0.5,alice,stale" + std::to_string(stale.size()) + ",1,0,1,0,link\n";
+    writeFile(records(), stale, 0600);
+    EXPECT_EQ(enter(kPassword).status, 200);
+    EXPECT_LT(fs::file_size(records()), 200U);
+    writeFile(records(), readFile(records()) + stale, 0600);
+    cookies_ = given();
+    EXPECT_EQ(status(guarded_, "list"), 200);
+    EXPECT_LT(fs::file_size(records()), 200U);
+}
+
+TEST_F(ShareCgi, LinksOfOwnersWhoCannotShowThemAreMissing) {
+    const std::string longName(64, 'n');
+    addUser(longName, 20064, kUsersGid);
+    guarded_ = addLink(longName, 20064, kPassword);
+    EXPECT_EQ(enter(kPassword).status, 200);
+    cookies_ = given();
+    EXPECT_EQ(status(guarded_, "list"), 200) << "the library keeps 63 bytes of a name";
+    const std::string applications = "/etc/vexo/applications";
+    writeRootFile(applications, "VEXO.QDS.App.Quorvane3.Instance: bob\n");
+    EXPECT_EQ(status(free_, "state"), 404) << "its owner may no longer use the file manager";
+    fs::remove(systemRoot() + applications);
+    makeFolder(systemRoot() + applications);
+    EXPECT_EQ(status(free_, "state"), 500) << "could not be determined";
+    fs::remove(systemRoot() + applications);
+    EXPECT_EQ(status(free_, "state"), 200);
+}
+
+TEST_F(ShareCgi, APathNamedAgainAndAgainIsPackedOnce) {
+    std::string query = "action=download&path=inner/two.txt";
+    for (const char* spelling : {"inner", "inner", "/inner", "inner/", "./inner", "inner/."}) {
+        query += std::string("&path=") + spelling;
+    }
+    const std::string zip = RawReply(ask(free_, query)).body;
+    size_t packed = 0;
+    for (size_t at = zip.find("PK\3\4"); at != std::string::npos; at = zip.find("PK\3\4", at + 1)) ++packed;
+    EXPECT_EQ(packed, 3U) << "the file, the folder and the file in it";
+    for (int i = 0; i < 500; ++i) query += "&path=inner";
+    EXPECT_EQ(CgiReply(ask(free_, query)).status, 400);
+}
+
+TEST_F(ShareCgi, WhatCannotBePublished) {
+    ASSERT_EQ(mkfifo((shareRoot("photo") + "/pipe").c_str(), 0666), 0);
+    for (const auto& [path, dates, code] : Rows<const char*, const char*, int>{
+             row("/photo/pipe", "", ORV_ERR_DENIED),
+             row("/photo/shared", "&available=5&expires=9223372036854775807", ORV_ERR_PARAMETER),
+             row("/photo/shared", "&expires=9223372036854775808", ORV_ERR_PARAMETER),
+             row("/photo/shared", "&available=9223372036854775808&expires=5", ORV_ERR_PARAMETER),
+             row("/photo/shared", "&available=5&expires=9223372036854689407", 0)}) {
+        const std::string form = std::string("action=create&path=") + path + dates;
+        const CgiReply reply(
+            runCgi(PROGRAM_LINK, "alice", "POST", "", form, {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
+        EXPECT_EQ(reply.json["error"]["code"].asInt(), code) << form;
+    }
+}
+
+TEST_F(ShareCgi, AToolWithARelativeRoot) {
+    const std::string before = fs::current_path(), root = systemRoot();
+    fs::current_path(fs::path(root).parent_path());
+    const Finished found = runProgram({ORVELCTL, "--root", fs::path(root).filename(), "link", "list"});
+    fs::current_path(before);
+    EXPECT_NE(found.output.find(free_), std::string::npos) << found.output;
+}
+
+}  // namespace
