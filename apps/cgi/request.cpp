@@ -2,7 +2,6 @@
 
 #include <unistd.h>
 
-#include <algorithm>
 #include <charconv>
 #include <cstdlib>
 #include <memory>
@@ -55,17 +54,12 @@ bool isForeign() {
     return scheme == std::string_view::npos || from.substr(scheme + 3) != host;
 }
 
-// Appends the paths of a list, one a line; see pathParams. False when a line cannot be one.
-bool addLines(std::string_view lines, std::vector<std::string>& paths) {
-    while (!lines.empty()) {
-        std::string_view line = lines.substr(0, lines.find('\n'));
-        lines.remove_prefix(std::min(lines.size(), line.size() + 1));
-        if (line.ends_with('\r')) line.remove_suffix(1);  // a form ends its lines so
-        if (line.empty()) continue;
+// Appends the paths of a list; see pathParams. False when a line cannot be one.
+bool addList(const std::vector<std::string>& lines, std::vector<std::string>& paths) {
+    for (const std::string& line : lines) {
         const auto path = percentDecode(line);
-        if (!path) return false;
-        const bool whole = line.find('/') != std::string_view::npos;
-        if (!whole && paths.empty()) return false;
+        const bool whole = line.find('/') != std::string::npos;
+        if (!path || (!whole && paths.empty())) return false;
         paths.push_back(whole ? *path : paths.back().substr(0, paths.back().rfind('/') + 1) + *path);
     }
     return true;
@@ -145,9 +139,18 @@ std::optional<bool> ascendingParam(const VEXO::WebCGI& cgi) {
     return std::nullopt;
 }
 
+std::vector<std::string> linesParam(const VEXO::WebCGI& cgi, const char* name) {
+    std::vector<std::string> lines = WebUtils::StringExplode(cgi.GetParam(name, ""), "\n");
+    for (std::string& line : lines) {
+        if (line.ends_with('\r')) line.pop_back();
+    }
+    std::erase(lines, "");
+    return lines;
+}
+
 std::optional<std::vector<std::string>> pathParams(const VEXO::WebCGI& cgi) {
     std::vector<std::string> paths;
-    if (!addLines(cgi.GetParam("paths_raw", ""), paths)) return std::nullopt;
+    if (!addList(linesParam(cgi, "paths_raw"), paths)) return std::nullopt;
     for (const std::string& raw : cgi.GetParams("path_raw")) {
         const auto path = percentDecode(raw);
         if (!path) return std::nullopt;

@@ -61,6 +61,8 @@ std::optional<bool> ascendingParam(const VEXO::WebCGI& cgi);
 std::optional<std::string> bytesParam(const VEXO::WebCGI& cgi, const std::string& name);
 // The share-relative path of a request, "path_raw" or "path".
 std::optional<std::string> pathParam(const VEXO::WebCGI& cgi);
+// The lines of a parameter, however they end; without the empty ones.
+std::vector<std::string> linesParam(const VEXO::WebCGI& cgi, const char* name);
 // Those of a request that takes several: of "paths_raw", every "path_raw", then every "path". "paths_raw" is a list for
 // thousands: percent-encoded like "path_raw", one a line, where a line without a "/" is a name in the folder of the
 // line before. Nothing when one cannot be a path.

@@ -136,4 +136,30 @@ TEST_F(OperationCgi, TheTransferLogTellsWhatChanged) {
     EXPECT_LT(text.find("\"mkdir\""), text.find("\"rename\"")) << text;
 }
 
+TEST_F(OperationCgi, NamesThatAreTakenAreToldInOneQuestion) {
+    SKIP_WITHOUT_ROOT();
+    const std::string root = shareRoot("photo");
+    makeFolder(root + "/in", 0755);
+    makeFolder(root + "/in/folder", 0755);
+    writeFile(root + "/in/f\xFF", "four");
+    fs::create_symlink("/etc/passwd", root + "/in/link");
+    makeFolder(root + "/shut", 0700);
+    const auto present = [](const std::string& path, const std::string& names) {
+        return ask("alice", "action=present&path=" + path + "&names_raw=" + percentEncode(names));
+    };
+    const Json::Value items =
+        present("/photo/in", "nothing\nf%FF\nfolder\r\nlink\n" + std::string(300, 'n')).json["data"]["items"];
+    ASSERT_EQ(items.size(), 3U) << items;
+    EXPECT_EQ(items[0]["name_raw"], "f%FF");
+    EXPECT_EQ(items[0]["size"], 4);
+    EXPECT_TRUE(items[1]["isdir"].asBool());
+    EXPECT_EQ(items[2]["size"], 11) << "of the link itself";
+    EXPECT_EQ(present("/photo/in", "").json["data"]["items"].size(), 0U);
+    for (const auto& [path, names, refused] : Rows<std::string, std::string, int>{
+             row("/photo/in", "..", 400), row("/photo/in", "folder%2Fx", 400), row("/photo/in", "a\n%zz", 400),
+             row("/photo/none", "a", 408), row("/photo/in/link", "a", 407), row("/photo/shut", "a", 407)}) {
+        EXPECT_EQ(code(present(path, names)), refused) << path << " " << names;
+    }
+}
+
 }  // namespace

@@ -365,7 +365,7 @@ test("the keyboard alone is never lost", () =>
     await page.waitForSelector(".menu >> text=Rename");
     await page.keyboard.press("Escape");
     await page.keyboard.press("Delete");
-    await page.focus(".activity-card.good button");
+    await page.focus(".activity-card.good > .icon-button");
     await page.keyboard.press("Enter");
     assert.equal(await held(), "view");
     await page.keyboard.press("Alt+2");

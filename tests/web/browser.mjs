@@ -118,6 +118,15 @@ export function row(page, name) {
     .first();
 }
 
+// Waits for the card of what went well, and takes it away.
+export async function wentWell(page, text) {
+  await page.waitForFunction((wanted) => {
+    const card = [...document.querySelectorAll(".activity-card.good")].find((one) => one.textContent.includes(wanted));
+    card?.querySelector(":scope > .icon-button").click();
+    return card !== undefined;
+  }, text);
+}
+
 // A PNG of hills under a sky, different for each number.
 export function picture(width, height, number) {
   const rows = Buffer.alloc(height * (width * 3 + 1));

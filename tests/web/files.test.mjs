@@ -6,7 +6,7 @@ import http from "node:http";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
-import { drawn, launch, PASSWORDS, picture, row, screenshot, URL_OF_PAGE, withPage } from "./browser.mjs";
+import { drawn, launch, PASSWORDS, picture, row, screenshot, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const files = mkdtempSync(join(tmpdir(), "orvel-upload-"));
@@ -54,13 +54,14 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     const there = join(projects, "incoming “1”");
     const some = ["one.txt", "two, three*.txt", "four.txt"].map((name) => join(files, name));
     await upload(page, "Upload files", some);
-    await card(page, "3 files uploaded").waitFor();
+    await wentWell(page, "3 files uploaded");
     assert.equal(readFileSync(join(there, "two, three*.txt"), "utf8"), "two, three*.txt, new");
     await upload(page, "Upload files", some);
     await page.waitForSelector(".dialog >> text=The file exists already");
     await screenshot(page, "conflict");
     await page.click(".dialog >> text=Keep both");
     await page.waitForSelector("#view >> text=four (2).txt");
+    await wentWell(page, "3 files uploaded");
     assert.equal(await page.locator(".dialog").count(), 0);
     await upload(page, "Upload files", some);
     await page.locator(".dialog >> text=The file exists already").waitFor();
@@ -71,7 +72,7 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     for (const name of some) writeFileSync(name, "newer");
     await upload(page, "Upload files", some);
     await page.click(".dialog >> text=Replace");
-    await page.waitForFunction(() => document.querySelectorAll(".activity-card.good").length === 3);
+    await wentWell(page, "3 files uploaded");
     assert.equal(readFileSync(join(there, "one.txt"), "utf8"), "newer");
 
     await upload(page, "Upload a folder", join(files, "trip"));
@@ -89,7 +90,7 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
       for (const type of ["dragenter", "dragover", "drop"])
         target.dispatchEvent(new DragEvent(type, { bubbles: true, cancelable: true, dataTransfer: data }));
     });
-    await card(page, "1 file to trip").filter({ hasText: "1 file uploaded" }).waitFor();
+    await card(page, "“from outside.txt” to trip").filter({ hasText: "1 file uploaded" }).waitFor();
     assert.equal(readFileSync(join(there, "trip/from outside.txt"), "utf8"), "dropped");
 
     await page.evaluate(async (id) => {
@@ -133,7 +134,13 @@ test("previews, thumbnails, rename, downloads", () =>
     await screenshot(page, "preview-image");
     await page.keyboard.press("ArrowRight");
     await page.waitForSelector(".preview-title >> text=view 4.png");
-    await page.keyboard.press("Escape");
+    await page.keyboard.press(" ");
+    assert.equal(await page.locator(".preview").count(), 0); // and not open again
+    await page.keyboard.press(" ");
+    await page.waitForSelector(".preview img");
+    await page.goBack();
+    await page.waitForSelector(".preview", { state: "detached" });
+    await page.waitForSelector("#view .row.selected >> text=view 4.png"); // still here
     await page.keyboard.press("F2");
     await page.fill(".dialog .input", "seen <b>here.png");
     await page.keyboard.press("Enter");

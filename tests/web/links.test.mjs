@@ -24,8 +24,12 @@ async function makeLink(page, name, password) {
   return address;
 }
 
-async function visit(address, run) {
-  const context = await chrome.browser.newContext({ viewport: { width: 1280, height: 800 }, locale: "en-GB" });
+async function visit(address, run, options = {}) {
+  const context = await chrome.browser.newContext({
+    viewport: { width: 1280, height: 800 },
+    locale: "en-GB",
+    ...options,
+  });
   const page = await context.newPage();
   const wrong = [];
   page.on("pageerror", (error) => wrong.push(error.stack));
@@ -88,4 +92,14 @@ test("names of markup reach a visitor as text", () =>
       await screenshot(visitor, "visitor-file");
       assert.deepEqual(wrong, []);
     });
+    const phone = { viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true };
+    await visit(
+      address,
+      async (visitor) => {
+        await visitor.waitForSelector("h1");
+        await screenshot(visitor, "visitor-phone");
+        assert.equal(await visitor.evaluate(() => innerWidth), 390); // not a shrunk page of a desktop
+      },
+      phone,
+    );
   }));

@@ -2,7 +2,7 @@
 import assert from "node:assert/strict";
 import { existsSync, mkdirSync, readdirSync, writeFileSync } from "node:fs";
 import { after, before, test } from "node:test";
-import { launch, row, rowsReady, screenshot, URL_OF_PAGE, withPage } from "./browser.mjs";
+import { launch, row, rowsReady, screenshot, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
 import { Gate } from "./gate.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
@@ -118,7 +118,7 @@ test("copy, reload, cancel; a conflict; delete and restore", () =>
     await page.reload();
     await page.waitForFunction(() => document.querySelector(".activity-card .detail")?.textContent.includes(" of "));
     await screenshot(page, "copy");
-    await card(page, "Copy").locator("button").click();
+    await card(page, "Copy “many” to house").locator("> .icon-button").click();
     await card(page, "Cancelled").waitFor();
     gate.open();
     assert.ok(readdirSync(`${projects}/house/many`).length < MANY);
@@ -134,12 +134,12 @@ test("copy, reload, cancel; a conflict; delete and restore", () =>
       await page.click(".picker >> text=house");
       await page.click(".picker >> text=Copy here");
       if (i === 1) await page.click(".dialog >> text=Keep both");
-      await page.waitForFunction((count) => document.querySelectorAll(".activity-card.good").length === count, i + 1);
+      await wentWell(page, "Copy “needle & four.txt” to house");
     }
     assert.ok(existsSync(`${projects}/house/needle & four (2).txt`));
 
     await page.keyboard.press("Delete");
-    await page.waitForSelector(".activity-card.good >> text=Delete 1 item");
+    await page.waitForSelector(".activity-card.good >> text=Delete “needle & four.txt”");
     await page.click("#tree >> text=projects");
     await page.dblclick("#view >> text=Recycle bin");
     await page.waitForSelector("#toolbar >> text=Empty recycle bin");
@@ -148,7 +148,7 @@ test("copy, reload, cancel; a conflict; delete and restore", () =>
     await row(page, "four.txt").click();
     await screenshot(page, "recycle");
     await page.click("#toolbar >> text=Restore");
-    await page.waitForSelector(".activity-card.good >> text=Restore 1 item");
+    await page.waitForSelector(".activity-card.good >> text=Restore “needle & four.txt”");
     assert.ok(existsSync(`${projects}/<i>odd/needle & four.txt`));
   }));
 
@@ -157,11 +157,11 @@ test("dragged to another folder", () =>
     await row(page, "left by bob.txt").click({ modifiers: ["Control"] });
     await row(page, "notes.md").click({ modifiers: ["Control"] });
     await row(page, "notes.md").dragTo(row(page, "house"));
-    await page.waitForSelector(".activity-card >> text=Move 2 items");
+    await wentWell(page, "Move 2 items to house");
     await page.waitForFunction(() => !document.querySelector("#view")?.textContent.includes("notes.md"));
     await page.goto(`${URL_OF_PAGE}#/projects/house`);
     await row(page, "notes.md").dragTo(page.locator("#tree >> text=projects"));
-    await page.waitForFunction(() => document.querySelectorAll(".activity-card.finished").length === 2);
+    await wentWell(page, "Move “notes.md” to projects");
     assert.ok(existsSync(`${projects}/notes.md`));
   }));
 

@@ -32,6 +32,7 @@ struct Action {
 constexpr Action kActions[] = {{"mkdir", Takes::kPath, true, Need::kCreate, makeFolderOperation},
                                {"rename", Takes::kPath, true, Need::kModify, renameOperation},
                                {"subfolders", Takes::kPath, false, Need::kList, subfoldersOperation},
+                               {"present", Takes::kPath, false, Need::kList, presentOperation},
                                {"copy", Takes::kPaths, true, Need::kRead, copyOperation},
                                {"move", Takes::kPaths, true, Need::kModify, moveOperation},
                                {"delete", Takes::kPaths, true, Need::kModify, deleteOperation},

@@ -28,6 +28,9 @@ int makeFolderOperation(Operation& operation);
 int renameOperation(Operation& operation);
 // data: {"items":[{"name","path","mtime","mount_type"}]}, the sub-folders by name, "mount_type" only for mount points.
 int subfoldersOperation(Operation& operation);
+// "names_raw": names, percent-encoded, one a line. data: {"items":[{"name","isdir","size","mtime"}]}, those of them
+// that the folder has, each of a link itself.
+int presentOperation(Operation& operation);
 
 // These go on in the background; data: {"taskid"}. They take several paths, and what goes wrong with one of them shows
 // in the task (see Progress) while the others are worked on.

@@ -2,10 +2,10 @@
 
 import { emit } from "./events.js";
 
-let held = null; // {ids: Set, cut}
+let held = null; // {entries: Map by id, cut}
 
-export function hold(ids, cut) {
-  held = { ids: new Set(ids), cut };
+export function hold(entries, cut) {
+  held = { entries: new Map(entries.map((entry) => [entry.id, entry])), cut };
   emit("selection");
 }
 
@@ -19,5 +19,5 @@ export function heldItems() {
 }
 
 export function isCut(id) {
-  return held !== null && held.cut && held.ids.has(id);
+  return held !== null && held.cut && held.entries.has(id);
 }

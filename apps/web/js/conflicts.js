@@ -3,52 +3,76 @@
 import { MISSING, post } from "./api.js";
 import { dialog } from "./dialogs.js";
 import { h, nameNode } from "./dom.js";
-import { decode, encodeName, patternOf } from "./path.js";
+import { formatSize, formatTime } from "./format.js";
+import { decode, encodeName, inForms } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
 
-const NAMES_PER_QUESTION = 100;
-
-// Which of the names (encoded) the folder has already.
+// Which of the names (encoded) the folder has already: name -> {isFolder, size, mtime}.
 export async function takenNames(folder, names) {
-  const taken = new Set();
-  for (let i = 0; i < names.length; i += NAMES_PER_QUESTION) {
-    const pattern = names
-      .slice(i, i + NAMES_PER_QUESTION)
-      .map(patternOf)
-      .join(",");
-    const reply = await post("list", { action: "folder", path_raw: folder, pattern }).catch((failure) => {
+  const taken = new Map();
+  for (const lines of inForms(names)) {
+    const asked = { action: "present", path_raw: folder, names_raw: lines.join("\n") };
+    const { items } = await post("operation", asked).catch((failure) => {
       if (failure.code === MISSING) return { items: [] }; // is yet to be made
       throw failure;
     });
-    for (const item of reply.items) taken.add(item.name_raw ?? encodeName(item.name));
+    for (const { name, name_raw, isdir, size, mtime } of items)
+      taken.set(name_raw ?? encodeName(name), { isFolder: isdir, size, mtime });
   }
-  return new Set(names.filter((name) => taken.has(name)));
+  return taken;
 }
 
-// {answer: "skip", "overwrite" or "both", all}; null when it shall not go on. `more`: there are others to decide about.
-export function askConflict({ name, folder, more, count = 1 }) {
+// Pairs of what comes and what is there, of which one is a folder and the other is not: nothing can replace those.
+export function cannotReplace({ comes, there }) {
+  return comes.isFolder !== there.isFolder;
+}
+
+// Asks about one pair of {name, comes, there}, or about many at once. {answer: "skip", "overwrite" or "both", all}; null
+// when it shall not go on. `more`: there are others to decide about.
+export function askConflict({ folder, pairs, more = false }) {
+  const [first] = pairs;
+  const stuck = pairs.filter(cannotReplace).length;
+  const kind = pairs.length > 1 ? "many" : stuck > 0 ? "clash" : first.comes.isFolder ? "folder" : "file";
+  const texts = [t(`conflict.text.${kind}`, { folder: labelOf(folder), count: pairs.length })];
+  if (kind === "many" && stuck > 0) texts.push(t("conflict.stuck", { count: stuck }));
   return dialog({
-    title: count > 1 ? t("conflict.title.many", { count }) : t("conflict.title"),
+    title: t(`conflict.title.${kind}`, { count: pairs.length }),
     fill: (close) => {
       const all = h("input", { type: "checkbox", checked: more });
-      const answer = (value) => () => close({ answer: value, all: more && all.checked });
+      const button = (style, value, key) =>
+        h(
+          `button.button${style}`,
+          { type: "button", onclick: () => close({ answer: value, all: more && all.checked }) },
+          t(key),
+        );
+      const merges = kind === "folder";
       return [
         h(
           "div.body",
           {},
-          count > 1 ? null : h("p", {}, h("b", {}, nameNode(decode(name)))),
-          h("p.soft", {}, t(count > 1 ? "conflict.text.many" : "conflict.text", { folder: labelOf(folder) })),
+          pairs.length === 1 && h("p", {}, h("b", {}, nameNode(decode(first.name)))),
+          texts.map((text) => h("p.soft", {}, text)),
+          kind === "file" && comparison(first),
           more && h("label.check-line", {}, all, t("conflict.all")),
         ),
         h(
           "footer",
           {},
-          h("button.button", { type: "button", onclick: answer("skip") }, t("conflict.skip")),
-          h("button.button.outlined", { type: "button", onclick: answer("overwrite") }, t("conflict.overwrite")),
-          h("button.button.primary", { type: "button", onclick: answer("both") }, t("conflict.both")),
+          button("", "skip", "conflict.skip"),
+          stuck < pairs.length && button(".outlined", "overwrite", merges ? "conflict.merge" : "conflict.overwrite"),
+          button(".primary", "both", "conflict.both"),
         ),
       ];
     },
   });
+}
+
+function comparison({ comes, there }) {
+  const line = (key, { size, mtime }) => [
+    h("dt", {}, t(key)),
+    h("dd", {}, [size !== null && formatSize(size), formatTime(mtime)].filter(Boolean).join(" · ")),
+  ];
+  if (comes.size === undefined || comes.size === null) return null; // chosen by name alone
+  return h("dl.compared", {}, line("conflict.there", there), line("conflict.comes", comes));
 }

@@ -129,6 +129,10 @@ export function setWhy(handler) {
   onWhy = handler;
 }
 
+export function showWhyOf(id) {
+  onWhy(id);
+}
+
 const rack = document.getElementById("toasts");
 
 // Below an open dialog nobody would see a message, or could reach it.
@@ -141,6 +145,7 @@ document.addEventListener("close", (event) => event.target.contains(rack) && rai
 
 // A short message at the foot of the page. {text, hint, kind, actions: [{label, run}]}
 export function toast({ text, hint = "", kind = "", actions = [], life = kind === "failed" ? 12000 : 5000 }) {
+  let timer;
   raise();
   const node = h("div.toast", { role: kind === "failed" ? "alert" : "status" });
   if (kind) node.classList.add(kind);
@@ -165,7 +170,12 @@ export function toast({ text, hint = "", kind = "", actions = [], life = kind ==
   );
   rack.append(node);
   while (rack.children.length > 3) rack.firstChild.remove();
-  setTimeout(remove, life);
+  // It stays as long as somebody is at it.
+  const leave = () => {
+    clearTimeout(timer);
+    timer = setTimeout(() => (node.matches(":hover, :focus-within") ? leave() : remove()), life);
+  };
+  leave();
 }
 
 export function dismissToasts() {

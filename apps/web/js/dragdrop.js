@@ -19,7 +19,7 @@ const MOST_AS_TEXT = 1000; // paths for other programs
 let veil = null;
 let marked = null;
 let depth = 0;
-let dragged = null; // ids
+let dragged = null; // entries
 
 // What is chosen goes along when a chosen row is dragged.
 function begin(event) {
@@ -32,7 +32,7 @@ function begin(event) {
     return event.preventDefault();
   }
   const entries = [...selection.chosen.values()];
-  dragged = entries.map((entry) => entry.id);
+  dragged = entries;
   const paths = entries.slice(0, MOST_AS_TEXT).map((entry) => decode(entry.id));
   event.dataTransfer.setData("text/plain", paths.join("\n"));
   event.dataTransfer.effectAllowed = "copyMove";
@@ -54,8 +54,8 @@ function overWithin(event) {
   const fits =
     target &&
     target.node &&
-    !dragged.includes(target.id) &&
-    (copies(event) || dragged.some((id) => parentOf(id) !== target.id));
+    !dragged.some(({ id }) => id === target.id) &&
+    (copies(event) || dragged.some(({ id }) => parentOf(id) !== target.id));
   mark(fits ? target.node : null);
   if (!fits) return;
   event.preventDefault();

@@ -15,12 +15,13 @@ import {
 } from "./browser.js";
 import { context, runCommand } from "./commands.js";
 import { setWhy } from "./dialogs.js";
-import { $, h, loadIcons } from "./dom.js";
+import { $, h, keepFocus, loadIcons } from "./dom.js";
 import { setupDragAndDrop } from "./dragdrop.js";
 import { on } from "./events.js";
 import { homeNode, paintVolume } from "./home.js";
 import { setupKeys } from "./keys.js";
 import "./links.js";
+import { isUnreachable, untilReachable } from "./network.js";
 import { newFolder } from "./operations.js";
 import { isSearch, normalisePlace, parentOf } from "./path.js";
 import { setupPathbar } from "./pathbar.js";
@@ -34,6 +35,7 @@ import {
   nothingMatches,
   noShares,
   nothingFound,
+  staleNotice,
   stillSearching,
 } from "./states.js";
 import { loadStrings, t } from "./strings.js";
@@ -44,10 +46,14 @@ import { chooseFiles, uploadsRunning } from "./uploads.js";
 import { View } from "./view.js";
 import { showWhy } from "./why.js";
 
-const SCROLL_PAUSE = 60;
+const ASK_EACH = 100;
+const LOOK_AHEAD = 400; // milliseconds of movement
+const FARTHEST = 400; // rows
+const TOO_FAST = 2; // rows in a millisecond
 let stateNode = null;
 let homeShown = null;
 let scrollTimer = null;
+let lastAsk = { at: 0, first: 0 };
 
 function setState(node) {
   stateNode?.remove();
@@ -61,6 +67,7 @@ function showPlace() {
   homeShown = null;
   setState(null);
   const home = browser.id === "/";
+  paintNotice(browser.listing);
   $("view").hidden = home;
   if (home) {
     homeShown = homeNode();
@@ -80,11 +87,27 @@ function paintListing() {
   if (!listing) return;
   view.render();
   setState(stateOf(listing));
-  if (listing.ready) listing.need(...view.inSight);
+  paintNotice(listing);
+  if (listing.ready && !listing.error) listing.need(...view.inSight);
+}
+
+// A list whose server is away for a while stays; it is asked for again once the server is back.
+function isStale({ error, ready }) {
+  return error !== null && ready && (isUnreachable(error) || error.key === "page:logged_out");
+}
+
+function paintNotice(listing) {
+  const stale = listing !== null && isStale(listing);
+  if (stale && $("notice").hidden) $("notice").replaceChildren(...staleNotice(listing.error, () => refresh()));
+  if (stale && isUnreachable(listing.error))
+    untilReachable().then(() => listing === browser.listing && listing.error && refresh());
+  keepFocus($("notice"), () => {
+    $("notice").hidden = !stale;
+  });
 }
 
 function stateOf(listing) {
-  if (listing.error) {
+  if (listing.error && !isStale(listing)) {
     const { id } = browser;
     if (isSearch(id)) return failedState(listing.error, "", { retry: openSearch, back: goUp });
     const back = parentOf(id) === "/" ? null : goUp;
@@ -104,10 +127,23 @@ function clearFilter() {
   setFilter("");
 }
 
-// Pages are asked for once the scrolling slows down: what flies by is never fetched.
+// While the list moves, pages are asked for from time to time, with those that come into sight next at this speed.
+// What flies by faster than it could come is never fetched.
 function scrolled() {
-  clearTimeout(scrollTimer);
-  scrollTimer = setTimeout(() => browser.listing?.need(...browser.view.inSight), SCROLL_PAUSE);
+  scrollTimer ??= setTimeout(askAhead, Math.max(0, lastAsk.at + ASK_EACH - performance.now()));
+}
+
+function askAhead() {
+  scrollTimer = null;
+  if (!browser.listing) return undefined;
+  const now = performance.now();
+  const [first, last] = browser.view.inSight;
+  const speed = (first - lastAsk.first) / Math.max(1, now - lastAsk.at);
+  const ahead = Math.max(-FARTHEST, Math.min(FARTHEST, Math.round(speed * LOOK_AHEAD)));
+  lastAsk = { at: now, first };
+  if (Math.abs(speed) > TOO_FAST) return scrolled();
+  browser.listing.need(first + Math.min(0, ahead), last + Math.max(0, ahead));
+  return undefined;
 }
 
 function setupFind() {

@@ -85,25 +85,31 @@ export function shareOf(id) {
 
 const LONGEST_LIST = 900_000; // bytes in a form, below what the web server takes
 
-// Ids as the lines of "paths_raw", a folder said once; in several lists when a form cannot hold them all.
-export function pathLists(ids) {
+// Lines of text for a field of a form; in several lists when one form cannot hold them all. lineOf(item, before): `before`
+// is the item of the line above, if any.
+export function inForms(items, lineOf = (item) => item) {
   const lists = [];
   let room = 0;
-  let folder = null;
-  for (const id of ids) {
-    const escapes = id.split("%").length + 2; // in a form a "%" takes three bytes, and so does the end of a line
-    if (room < id.length + 2 * escapes) {
+  let before = null;
+  for (const item of items) {
+    let line = lineOf(item, before);
+    // In a form a "%" and a "/" take three bytes, and so does the end of a line.
+    const bytes = (text) => text.length + 2 * text.split(/[%/~]/).length + 2;
+    if (room < bytes(line)) {
       lists.push([]);
       room = LONGEST_LIST;
-      folder = null;
+      line = lineOf(item, null);
     }
-    const mine = parentOf(id);
-    const line = mine === folder ? lastOf(id) : id;
-    folder = mine;
-    room -= line.length + 2 * escapes;
+    room -= bytes(line);
+    before = item;
     lists.at(-1).push(line);
   }
   return lists;
+}
+
+// Ids as the lines of "paths_raw", a folder said once.
+export function pathLists(ids) {
+  return inForms(ids, (id, before) => (before !== null && parentOf(before) === parentOf(id) ? lastOf(id) : id));
 }
 
 // A name (encoded) as a pattern: a character that means something in one stands for any.

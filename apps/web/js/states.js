@@ -70,3 +70,12 @@ export function failedState(failure, path, { retry, back, why }) {
   if (said.why && why) actions.push({ label: t("why.ask"), run: why });
   return state(icons[failure.code] ?? "warning", said.title, said.hint, actions, true);
 }
+
+// Above a list that could not be asked for again: what it shows is as it was.
+export function staleNotice(failure, retry) {
+  return [
+    icon("offline", "icon small"),
+    h("span.grow", {}, t("stale.text", { what: describe(failure).title })),
+    h("button.button", { type: "button", onclick: retry }, t("state.retry")),
+  ];
+}

@@ -1,16 +1,18 @@
 // Work that goes on in the background of the server: copy, move, delete, restore, compress, extract. It outlives the
-// page; what runs is shown again after a reload.
+// page; what runs is shown again after a reload, and in every tab.
 
 import { get, post } from "./api.js";
 import { Card } from "./activity.js";
-import { browser, refresh } from "./browser.js";
+import { browser, go, refresh } from "./browser.js";
 import { toastFailure } from "./dialogs.js";
 import { plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { emit } from "./events.js";
 import { formatSize } from "./format.js";
-import { parentOf, pathLists } from "./path.js";
+import { idIn, isWithin, nameOf, parentOf, pathLists } from "./path.js";
+import { labelOf } from "./pathbar.js";
 import { searchTask } from "./operations.js";
+import { forget, note, noteOf } from "./task_notes.js";
 import { t } from "./strings.js";
 
 const POLL = 600;
@@ -24,101 +26,156 @@ const ICONS = {
   extract: "extract",
 };
 
-const cards = new Map(); // task -> {card, affected: [folder]}
+const cards = new Map(); // task -> {card, order}
+const tabs = new BroadcastChannel("orvel.tasks");
 let timer = null;
 
 export async function setupTasks() {
+  tabs.addEventListener("message", look);
+  addEventListener("focus", look);
   const { tasks } = await get("operation", { action: "status" }).catch(() => ({ tasks: [] }));
   for (const task of tasks) {
-    // What ended well while nobody looked needs no word any more.
-    if (task.finished && task.state === "done" && task.items_failed === 0) clear(task.taskid);
-    else show(task, []);
+    // What ended well while nobody looked needs no word any more, nor what somebody has seen already.
+    if (task.finished && (isGood(task) || noteOf(task.taskid).seen)) clear(task.taskid);
+    else show(task);
   }
 }
 
-// Starts `action` on the paths (ids). `affected`: folders whose content it changes.
-export async function startTask(action, ids, params, affected) {
-  const folders = new Set([...affected, ...ids.map(parentOf)]);
+// Starts `action` on the paths (ids). `params` go with it. `affected`: folders whose content it changes; `target`: where
+// what comes of it can be seen. Whether it began.
+export async function startTask(action, ids, { params = {}, affected = [], target = null, bin = false } = {}) {
+  const folders = [...new Set([...affected, ...ids.map(parentOf)])];
+  let rest = ids;
   for (const lines of pathLists(ids)) {
+    const some = rest.slice(0, lines.length);
+    rest = rest.slice(lines.length);
     try {
-      const { taskid } = await post("operation", { action, paths_raw: lines.join("\n"), ...params, taskid: searchTask() });
-      show({ taskid, action, state: "running", items_total: lines.length, items_done: 0, progress: 0 }, [...folders]);
+      const asked = { action, paths_raw: lines.join("\n"), ...params, taskid: searchTask() };
+      const { taskid } = await post("operation", asked);
+      note(taskid, { count: some.length, name: some.length === 1 ? nameOf(some[0]) : undefined, target, bin });
+      show({ taskid, action, state: "running", items_done: 0, progress: 0 }, { ids: some, params, folders });
+      tabs.postMessage(taskid);
     } catch (failure) {
-      toastFailure(failure, ids[0]);
+      toastFailure(failure, some[0]);
       return false;
     }
   }
   return true;
 }
 
-function show(task, affected) {
+// order: {ids, params, folders} of what this page started.
+function show(task, order = { folders: [] }) {
+  const { taskid } = task;
   const card = new Card({
     iconName: ICONS[task.action] ?? "activity",
     title: titleOf(task),
     onRemove: () => {
-      cards.delete(task.taskid);
-      clear(task.taskid);
+      cards.delete(taskid);
+      clear(taskid);
     },
-    onCancel: () =>
-      post("operation", { action: "cancel", taskid: task.taskid }).then((now) => update({ ...now }), toastFailure),
+    onCancel: () => post("operation", { action: "cancel", taskid }).then((now) => update({ ...now }), toastFailure),
   });
-  cards.set(task.taskid, { card, affected });
+  cards.set(taskid, { card, order });
   update(task);
   watch();
 }
 
 function titleOf(task) {
-  return t(`task.${task.action}`, { count: task.items_total ?? 0 });
+  const { count = task.items_total ?? 0, name, target } = noteOf(task.taskid);
+  const what = name === undefined ? t("task.items.some", { count }) : t("task.item", { name });
+  const key = target && ["copy", "move", "extract"].includes(task.action) ? "to" : "of";
+  return t(`task.${key}.${task.action}`, { what, folder: target ? labelOf(target) : "" });
 }
 
 function clear(taskid) {
+  forget(taskid);
   post("operation", { action: "clear", taskid }).catch(() => {});
 }
 
 function watch() {
   clearTimeout(timer);
   if ([...cards.values()].every(({ card }) => card.finished)) return;
-  timer = setTimeout(async () => {
-    const { tasks } = await get("operation", { action: "status" }).catch(() => ({ tasks: null }));
-    if (tasks) {
-      for (const task of tasks) update(task);
-      // A record that is gone has nothing more to tell.
-      const known = new Set(tasks.map((task) => task.taskid));
-      for (const [taskid, { card }] of cards) {
-        if (!known.has(taskid) && !card.finished) card.finish("good", "");
-      }
+  timer = setTimeout(look, POLL);
+}
+
+// Also what other tabs have started.
+async function look() {
+  const { tasks } = await get("operation", { action: "status" }).catch(() => ({ tasks: null }));
+  if (tasks) {
+    for (const task of tasks) {
+      if (cards.has(task.taskid)) update(task);
+      else if (!task.finished) show(task);
     }
-    watch();
-  }, POLL);
+    // A record that is gone has nothing more to tell.
+    const known = new Set(tasks.map((task) => task.taskid));
+    for (const [taskid, { card }] of cards) {
+      if (!known.has(taskid) && !card.finished) card.finish("good", "");
+    }
+  }
+  watch();
+}
+
+function isGood(task) {
+  return task.state === "done" && !(task.items_failed > 0);
 }
 
 function update(task) {
-  const { card, affected } = cards.get(task.taskid) ?? {};
+  const { card, order } = cards.get(task.taskid) ?? {};
   if (!card || card.finished) return;
-  card.title.textContent = titleOf(task);
-  const errors = (task.errors ?? []).map((one) => ({ path: one.path, text: describe(one, one.path).title }));
+  card.retitle(titleOf(task));
+  const errors = (task.errors ?? []).map((one) => ({ id: idIn(one), path: one.path, ...describe(one, one.path) }));
   card.showErrors(errors, task.errors_left_out ?? 0);
-  if (!task.finished) {
-    const detail = [
-      task.items_total > 1 && t("task.items", { done: task.items_done ?? 0, count: task.items_total }),
-      task.bytes_total > 0 && t("size.of", { done: formatSize(task.bytes_done), total: formatSize(task.bytes_total) }),
-    ];
-    const current = task.current ? plainName(task.current.slice(task.current.lastIndexOf("/") + 1)) : "";
-    card.progress(
-      task.progress > 0 || task.items_done > 0 ? task.progress : null,
-      detail.filter(Boolean).join(" · "),
-      current,
-    );
-    return;
-  }
+  if (task.finished) return finish(task, card, order);
+  const detail = [
+    task.items_total > 1 && t("task.items", { done: task.items_done ?? 0, count: task.items_total }),
+    task.bytes_total > 0 && t("size.of", { done: formatSize(task.bytes_done), total: formatSize(task.bytes_total) }),
+  ];
+  const current = task.current ? plainName(task.current.slice(task.current.lastIndexOf("/") + 1)) : "";
+  card.progress(
+    task.progress > 0 || task.items_done > 0 ? task.progress : null,
+    detail.filter(Boolean).join(" · "),
+    current,
+  );
+  return undefined;
+}
+
+function finish(task, card, order) {
+  const { target, bin } = noteOf(task.taskid);
   const parts = [
+    task.state === "cancelled" && t("task.cancelled"),
     t("task.done", { count: task.items_done ?? 0 }),
     task.items_skipped > 0 && t("upload.skipped", { count: task.items_skipped }),
     task.items_failed > 0 && t("upload.failed", { count: task.items_failed }),
+    bin && task.items_done > 0 && t("task.binned"),
   ];
-  const kind =
-    task.state === "cancelled" ? "stopped" : task.state === "failed" || task.items_failed > 0 ? "failed" : "good";
-  card.finish(kind, [task.state === "cancelled" && t("task.cancelled"), ...parts].filter(Boolean).join(" · "));
-  emit("folders-changed", { ids: [...new Set([...affected, browser.id])] });
+  const kind = task.state === "cancelled" ? "stopped" : isGood(task) ? "good" : "failed";
+  const again = retryOf(task, order);
+  const actions = [
+    target && task.items_done > 0 && { label: t("activity.show"), run: () => go(target) },
+    again && {
+      label: t("state.retry"),
+      run: () => {
+        card.remove();
+        startTask(task.action, again.ids, { ...again, target, bin });
+      },
+    },
+  ];
+  card.finish(kind, parts.filter(Boolean).join(" · "), actions.filter(Boolean));
+  if (!document.hidden) note(task.taskid, { seen: true });
+  emit("folders-changed", { ids: [...new Set([...order.folders, browser.id])] });
   refresh();
+}
+
+// What of a task that did not end well can be tried again, and how: nothing that is done already is done twice. Folders
+// that were copied beside others would come a second time, so only what failed as a whole is tried then.
+function retryOf(task, { ids = [], params, folders }) {
+  if (isGood(task) || ids.length === 0) return null;
+  const failed = (task.errors ?? []).map((one) => idIn(one));
+  const beside = params.conflict === "keep_both" && task.action !== "restore";
+  const all = !beside && (task.state === "cancelled" || task.errors_left_out > 0);
+  const some = all ? ids : ids.filter((id) => failed.some((one) => (beside ? one === id : isWithin(one, id))));
+  if (some.length === 0 || task.action === "compress") return null;
+  const goesOn = { error: "skip", keep_both: beside ? "keep_both" : "skip" };
+  const conflict = params.conflict && (goesOn[params.conflict] ?? params.conflict);
+  return { ids: some, params: { ...params, conflict }, affected: folders };
 }

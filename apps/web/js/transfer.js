@@ -7,7 +7,7 @@ import { askConflict, takenNames } from "./conflicts.js";
 import { askText, confirm, dismissToasts, toast, toastFailure } from "./dialogs.js";
 import { isInBin, isRecycleBin } from "./entries.js";
 import { checkName } from "./operations.js";
-import { childOf, encodeName, isWithin, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
+import { childOf, encodeName, isWithin, lastOf, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
 import { pickFolder } from "./picker.js";
 import { get } from "./api.js";
 import { startTask } from "./tasks.js";
@@ -16,21 +16,26 @@ import { t } from "./strings.js";
 const ARCHIVE = /\.(zip|tar|tar\.gz|tgz|tar\.bz2|tbz2?|tar\.xz|txz)$/i;
 const EXISTS = { skip: "skip", overwrite: "overwrite", both: "keep_both" };
 
-// Copies or moves ids into a folder; what stands in the way is asked about before anything happens. Whether it began.
-export async function transfer(action, ids, target) {
-  const into = ids.find((id) => isWithin(target, id));
+// Copies or moves entries into a folder; what stands in the way is asked about before anything happens. Whether it began.
+export async function transfer(action, entries, target) {
+  const into = entries.find(({ id }) => isWithin(target, id));
   if (into) {
-    toastFailure({ code: 1005, key: "error:error_select_conflict", path: `/${nameOf(into)}` });
+    toastFailure({ code: 1005, key: "error:error_select_conflict", path: `/${nameOf(into.id)}` });
     return false;
   }
-  const moving = action === "move" ? ids.filter((id) => parentOf(id) !== target) : ids;
+  const moving = action === "move" ? entries.filter(({ id }) => parentOf(id) !== target) : entries;
   if (moving.length === 0) return false;
   try {
-    const beside = action === "copy" && moving.every((id) => parentOf(id) === target);
+    const beside = action === "copy" && moving.every(({ id }) => parentOf(id) === target);
     const conflict = beside ? "keep_both" : await conflictFor(target, moving);
     if (!conflict) return false;
-    const begun = await startTask(action, moving, { target_raw: target, conflict }, [target]);
-    if (begun && action === "move") browser.selection.remove(moving); // they leave, and are known to
+    const ids = moving.map(({ id }) => id);
+    const begun = await startTask(action, ids, {
+      params: { target_raw: target, conflict },
+      affected: [target],
+      target,
+    });
+    if (begun && action === "move") browser.selection.remove(ids); // they leave, and are known to
     return begun;
   } catch (failure) {
     toastFailure(failure, target);
@@ -38,42 +43,44 @@ export async function transfer(action, ids, target) {
   }
 }
 
-async function conflictFor(target, ids) {
-  const names = ids.map((id) => id.slice(id.lastIndexOf("/") + 1));
-  const taken = [...(await takenNames(target, names))];
-  if (taken.length === 0) return "error";
-  const said = await askConflict({ name: taken[0], folder: target, more: false, count: taken.length });
+// entries: {id, isFolder, size, mtime}
+async function conflictFor(target, entries) {
+  const byName = new Map(entries.map((entry) => [lastOf(entry.id), entry]));
+  const taken = await takenNames(target, [...byName.keys()]);
+  if (taken.size === 0) return "error";
+  const pairs = [...taken].map(([name, there]) => ({ name, there, comes: byName.get(name) }));
+  const said = await askConflict({ folder: target, pairs });
   return said ? EXISTS[said.answer] : null;
+}
+
+async function to(action) {
+  const entries = await selectedEntries();
+  if (entries.length === 0) return;
+  const target = await pickFolder({
+    title: t(`${action}.title`, { count: entries.length }),
+    action: t(`${action}.action`),
+    start: parentOf(entries[0].id),
+  });
+  if (target) transfer(action, entries, target);
+}
+
+async function take(cut) {
+  const entries = await selectedEntries();
+  if (entries.length === 0) return;
+  hold(entries, cut);
+  toast({ text: t(cut ? "held.cut" : "held.copy", { count: entries.length }) });
+}
+
+async function paste() {
+  const { entries, cut } = heldItems();
+  dismissToasts();
+  const begun = await transfer(cut ? "move" : "copy", [...entries.values()], browser.id);
+  if (begun && cut) letGo();
 }
 
 // Nothing when the names of what was chosen could not be had: that has been said.
 async function chosenIds() {
   return (await selectedEntries()).map((entry) => entry.id);
-}
-
-async function to(action) {
-  const ids = await chosenIds();
-  if (ids.length === 0) return;
-  const target = await pickFolder({
-    title: t(`${action}.title`, { count: ids.length }),
-    action: t(`${action}.action`),
-    start: parentOf(ids[0]),
-  });
-  if (target) transfer(action, ids, target);
-}
-
-async function take(cut) {
-  const ids = await chosenIds();
-  if (ids.length === 0) return;
-  hold(ids, cut);
-  toast({ text: t(cut ? "held.cut" : "held.copy", { count: ids.length }) });
-}
-
-async function paste() {
-  const { ids, cut } = heldItems();
-  dismissToasts();
-  const begun = await transfer(cut ? "move" : "copy", [...ids], browser.id);
-  if (begun && cut) letGo();
 }
 
 const bins = new Map(); // share -> whether it has a recycle bin
@@ -109,24 +116,29 @@ async function remove(forGood) {
   )
     return;
   browser.selection.clear();
-  await startTask(
-    "delete",
-    ids,
-    { permanent: kept ? undefined : "true" },
-    kept ? ids.map((id) => `${shareOf(id)}/%23recycle`) : [],
-  );
+  const binsOf = [...new Set(ids.map((id) => `${shareOf(id)}/%23recycle`))];
+  await startTask("delete", ids, {
+    params: { permanent: kept ? undefined : "true" },
+    affected: kept ? binsOf : [],
+    target: kept ? binsOf[0] : null,
+    bin: kept,
+  });
 }
 
 async function restore() {
   const ids = await chosenIds();
   if (ids.length === 0) return;
   browser.selection.clear();
-  await startTask("restore", ids, { conflict: "keep_both" }, [shareOf(ids[0])]);
+  await startTask("restore", ids, {
+    params: { conflict: "keep_both" },
+    affected: [shareOf(ids[0])],
+    target: ids.length === 1 ? parentOf(ids[0]).replace("/%23recycle", "") : shareOf(ids[0]),
+  });
 }
 
 async function emptyBin() {
   if (await confirm({ title: t("bin.title"), text: t("bin.text"), action: t("command.emptyBin"), kind: "danger" })) {
-    await startTask("empty", [`${shareOf(browser.id)}/%23recycle`], {}, [browser.id]);
+    await startTask("empty", [`${shareOf(browser.id)}/%23recycle`], { affected: [browser.id] });
   }
 }
 
@@ -146,13 +158,15 @@ async function compress() {
   });
   if (!name) return;
   const target = childOf(folder, encodeName(name));
-  const conflict = await conflictFor(folder, [target]);
-  if (conflict) await startTask("compress", ids, { target_raw: target, conflict }, [folder]);
+  const conflict = await conflictFor(folder, [{ id: target, isFolder: false }]);
+  if (conflict) await startTask("compress", ids, { params: { target_raw: target, conflict }, affected: [folder] });
 }
 
 async function extract({ single }) {
   const target = await pickFolder({ title: t("extract.title"), action: t("extract.action"), start: single.parent });
-  if (target) await startTask("extract", [single.id], { target_raw: target, conflict: "keep_both" }, [target]);
+  if (!target) return;
+  const params = { target_raw: target, conflict: "keep_both" };
+  await startTask("extract", [single.id], { params, affected: [target], target });
 }
 
 const chosen = ({ count }) => count > 0;

@@ -1,25 +1,26 @@
 // Uploads: a few at once, the rest in a queue. What stands in the way of a file is asked about once.
 
-import { ApiError, post, readReply, urlOf } from "./api.js";
+import { post } from "./api.js";
 import { Card } from "./activity.js";
-import { browser, refresh } from "./browser.js";
-import { askConflict, takenNames } from "./conflicts.js";
+import { browser, go, refresh } from "./browser.js";
+import { takenNames } from "./conflicts.js";
 import { toastFailure } from "./dialogs.js";
 import { h } from "./dom.js";
 import { describe } from "./errors.js";
 import { emit } from "./events.js";
 import { formatDuration, formatSize } from "./format.js";
-import { childOf, decode, encodeName, nameOf, parentOf, splitExtension } from "./path.js";
+import { childOf, decode, encodeName } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
 import { fromInput } from "./upload_files.js";
+import { Job } from "./upload_job.js";
 
 const AT_ONCE = 3;
 const EXISTS = 414;
+const REPAINT = 100; // milliseconds between two looks at all files of an upload
 
 const queue = [];
 let running = 0;
-let asking = Promise.resolve();
 
 export function chooseFiles(folders) {
   const input = h("input", { type: "file", multiple: true, webkitdirectory: folders });
@@ -33,13 +34,11 @@ export async function startUpload(found, target) {
   const batch = new Batch(found, target);
   try {
     await batch.makeEmptyFolders();
-    await batch.lookForConflicts();
+    await batch.lookForConflicts(target, batch.jobs, 0);
   } catch (failure) {
     if (failure.code !== undefined) toastFailure(failure, target);
   }
-  queue.push(...batch.jobs);
-  batch.paint();
-  pump();
+  batch.enqueue(batch.jobs);
 }
 
 function pump() {
@@ -49,7 +48,7 @@ function pump() {
     ++running;
     job.run().finally(() => {
       --running;
-      job.batch.paint();
+      job.batch.paintSoon();
       pump();
     });
   }
@@ -58,43 +57,65 @@ function pump() {
 class Batch {
   constructor(found, target) {
     this.target = target;
-    this.policy = null; // "skip", "overwrite" or "both", once somebody said so for all
+    this.answers = {}; // by kind of conflict, once somebody said so for all
     this.jobs = found.filter((one) => one.file).map((one) => new Job(this, one));
     this.emptyFolders = found.filter((one) => !one.file);
     this.made = 0; // of them
+    this.paused = 0; // files that wait for the connection
     this.bytes = this.jobs.reduce((sum, job) => sum + job.file.size, 0);
     this.begun = performance.now();
-    this.card = new Card({
-      iconName: "upload",
-      onCancel: () => this.cancel(),
-      title:
-        this.jobs.length > 0
-          ? t("upload.title", { count: this.jobs.length, folder: labelOf(target) })
-          : t("upload.title.folders", { count: this.emptyFolders.length, folder: labelOf(target) }),
-    });
+    this.card = new Card({ iconName: "upload", onCancel: () => this.cancel(), title: this.title() });
+  }
+
+  title() {
+    const folder = labelOf(this.target);
+    if (this.jobs.length === 1) return t("upload.title.one", { name: decode(this.jobs[0].name), folder });
+    if (this.jobs.length > 0) return t("upload.title", { count: this.jobs.length, folder });
+    return t("upload.title.folders", { count: this.emptyFolders.length, folder });
   }
 
   async makeEmptyFolders() {
     for (const { parts } of this.emptyFolders) {
-      await post("operation", { action: "mkdir", parents: "true", path_raw: idFor(this.target, parts) }).catch(
-        (failure) => {
-          if (failure.code !== EXISTS) throw failure;
-        },
-      );
+      const id = parts.reduce((folder, part) => childOf(folder, encodeName(part)), this.target);
+      await post("operation", { action: "mkdir", parents: "true", path_raw: id }).catch((failure) => {
+        if (failure.code !== EXISTS) throw failure;
+      });
       ++this.made;
     }
   }
 
-  // Files that would meet others are found before their bytes go anywhere.
-  async lookForConflicts() {
-    const folders = Map.groupBy(this.jobs, (job) => parentOf(job.id));
-    for (const [folder, jobs] of folders) {
-      const taken = await takenNames(
-        folder,
-        jobs.map((job) => job.name),
-      );
-      for (const job of jobs) job.meets = taken.has(job.name);
+  // Files that would meet others are found before their bytes go anywhere. In a folder that is not there yet nothing is
+  // taken, however much goes into it.
+  async lookForConflicts(folder, jobs, depth) {
+    const inside = Map.groupBy(jobs, (job) => encodeName(job.parts[depth]));
+    const taken = await takenNames(folder, [...inside.keys()]);
+    for (const [name, there] of taken) {
+      const deeper = inside.get(name).filter((job) => job.parts.length > depth + 1);
+      for (const job of inside.get(name)) if (!deeper.includes(job)) job.meets = there;
+      if (deeper.length > 0 && there.isFolder) await this.lookForConflicts(childOf(folder, name), deeper, depth + 1);
     }
+  }
+
+  enqueue(jobs) {
+    queue.push(...jobs);
+    this.paint();
+    pump();
+  }
+
+  // What failed, once more.
+  retry() {
+    const failed = this.jobs.filter((job) => job.state === "failed");
+    for (const job of failed) job.reset();
+    this.card.begin();
+    this.enqueue(failed);
+  }
+
+  async pauseFor(waiting) {
+    ++this.paused;
+    this.paintSoon();
+    await waiting;
+    --this.paused;
+    this.paintSoon();
   }
 
   cancel() {
@@ -102,42 +123,53 @@ class Batch {
     this.paint();
   }
 
+  paintSoon() {
+    this.painting ??= setTimeout(() => this.paint(), REPAINT);
+  }
+
   paint() {
+    clearTimeout(this.painting);
+    this.painting = undefined;
     if (this.card.finished) return;
-    const count = (...states) => this.jobs.filter((job) => states.includes(job.state)).length;
-    const failed = this.jobs.filter((job) => job.state === "failed");
-    const left = count("waiting", "running");
-    const loaded = this.jobs.reduce(
-      (sum, job) => sum + (job.state === "running" || job.state === "waiting" ? job.loaded : job.file.size),
-      0,
-    );
-    this.card.showErrors(
-      failed.map((job) => ({ path: decode(job.id), text: describe(job.failure, decode(job.id)).title })),
-    );
-    if (left > 0) {
-      const seconds = ((performance.now() - this.begun) / 1000) * ((this.bytes - loaded) / Math.max(1, loaded));
-      const detail = [
-        t("upload.progress", { done: this.jobs.length - left, count: this.jobs.length }),
-        t("size.of", { done: formatSize(loaded), total: formatSize(this.bytes) }),
-        loaded > 0 && formatDuration(seconds),
-      ];
-      this.card.progress(this.bytes > 0 ? loaded / this.bytes : null, detail.filter(Boolean).join(" · "));
-      this.changed(2000);
-      return;
+    const states = { waiting: 0, running: 0, done: 0, skipped: 0, failed: 0, cancelled: 0 };
+    let loaded = 0;
+    for (const job of this.jobs) {
+      ++states[job.state];
+      loaded += ["running", "waiting"].includes(job.state) ? job.loaded : job.file.size;
     }
+    const failed = this.jobs.filter((job) => job.state === "failed");
+    this.card.showErrors(failed.map((job) => failureOf(job)));
+    if (states.waiting + states.running > 0) this.paintRunning(states, loaded);
+    else this.finish(states);
+  }
+
+  paintRunning(states, loaded) {
+    const seconds = ((performance.now() - this.begun) / 1000) * ((this.bytes - loaded) / Math.max(1, loaded));
+    const left = states.waiting + states.running;
+    const detail = [
+      t("upload.progress", { done: this.jobs.length - left, count: this.jobs.length }),
+      t("size.of", { done: formatSize(loaded), total: formatSize(this.bytes) }),
+      loaded > 0 && this.paused === 0 && formatDuration(seconds),
+    ];
+    const note = this.paused > 0 ? t("upload.paused") : "";
+    this.card.progress(this.bytes > 0 ? loaded / this.bytes : null, detail.filter(Boolean).join(" · "), note);
+    this.changed(2000);
+  }
+
+  finish({ done, skipped, failed, cancelled }) {
     this.changed(0);
-    const done = count("done");
     const detail = [
       this.jobs.length > 0 ? t("upload.done", { count: done }) : t("task.done", { count: this.made }),
-      count("skipped") > 0 && t("upload.skipped", { count: count("skipped") }),
-      failed.length > 0 && t("upload.failed", { count: failed.length }),
+      skipped > 0 && t("upload.skipped", { count: skipped }),
+      failed > 0 && t("upload.failed", { count: failed }),
     ];
-    const kind =
-      failed.length > 0 || this.made < this.emptyFolders.length ? "failed" : count("cancelled") > 0 ? "stopped" : "good";
-    this.card.finish(
-      kind,
-      count("cancelled") > 0 ? t("upload.cancelled", { count: done }) : detail.filter(Boolean).join(" · "),
-    );
+    const kind = failed > 0 || this.made < this.emptyFolders.length ? "failed" : cancelled > 0 ? "stopped" : "good";
+    const actions = [
+      done > 0 && { label: t("activity.show"), run: () => go(this.target) },
+      failed > 0 && { label: t("state.retry"), run: () => this.retry() },
+    ];
+    const text = cancelled > 0 ? t("upload.cancelled", { count: done }) : detail.filter(Boolean).join(" · ");
+    this.card.finish(kind, text, actions.filter(Boolean));
   }
 
   // The list follows, though not at every file.
@@ -152,100 +184,9 @@ class Batch {
   }
 }
 
-function idFor(target, parts) {
-  return parts.reduce((id, part) => childOf(id, encodeName(part)), target);
-}
-
-class Job {
-  constructor(batch, { file, parts }) {
-    Object.assign(this, { batch, file, id: idFor(batch.target, parts), state: "waiting", loaded: 0, meets: false });
-    this.name = this.id.slice(this.id.lastIndexOf("/") + 1);
-  }
-
-  async run() {
-    this.state = "running";
-    try {
-      await this.place();
-    } catch (failure) {
-      if (this.state === "running") this.state = "failed";
-      this.failure = failure;
-    }
-  }
-
-  async place() {
-    if (!this.meets) {
-      try {
-        return await this.send("error");
-      } catch (failure) {
-        if (failure.code !== EXISTS) throw failure;
-      }
-    }
-    // One question at a time; the answer to one may be meant for all.
-    const answer = await (asking = asking.catch(() => {}).then(() => this.answer()));
-    if (this.state === "cancelled") return undefined;
-    if (answer === "both") return this.sendBeside();
-    if (answer === "overwrite") return this.send("overwrite");
-    this.state = answer === null ? "cancelled" : "skipped";
-    return undefined;
-  }
-
-  answer() {
-    // Somebody who cancelled is not asked about the others that already stood in line.
-    return this.state === "cancelled" ? null : (this.batch.policy ?? ask(this));
-  }
-
-  async sendBeside() {
-    const [stem, extension] = splitExtension(nameOf(this.id));
-    const folder = parentOf(this.id);
-    for (let n = 2; ; ++n) {
-      this.id = childOf(folder, encodeName(`${stem} (${n})${extension}`));
-      try {
-        return await this.send("error");
-      } catch (failure) {
-        if (failure.code !== EXISTS || n > 999) throw failure;
-      }
-    }
-  }
-
-  // What fetch() cannot: tell how far the body is.
-  send(overwrite) {
-    return new Promise((resolve, reject) => {
-      const request = new XMLHttpRequest();
-      this.request = request;
-      request.open("PUT", urlOf("upload", { path_raw: this.id, overwrite }));
-      request.setRequestHeader("Content-Type", "application/octet-stream");
-      request.upload.addEventListener("progress", (event) => {
-        this.loaded = event.loaded;
-        this.batch.paint();
-      });
-      request.addEventListener("load", () => {
-        try {
-          readReply(request.status, request.responseText);
-          this.state = "done";
-          resolve();
-        } catch (failure) {
-          reject(failure);
-        }
-      });
-      request.addEventListener("error", () => reject(new ApiError({ key: "page:upload_broken" })));
-      request.addEventListener("abort", () => resolve());
-      request.send(this.file);
-    });
-  }
-
-  cancel() {
-    if (this.state !== "waiting" && this.state !== "running") return;
-    this.state = "cancelled";
-    this.request?.abort();
-  }
-}
-
-async function ask(job) {
-  const more = job.batch.jobs.some((one) => one !== job && ["waiting", "running"].includes(one.state));
-  const said = await askConflict({ name: job.name, folder: parentOf(job.id), more });
-  if (said?.all) job.batch.policy = said.answer;
-  if (!said) job.batch.cancel();
-  return said?.answer ?? null;
+function failureOf(job) {
+  const path = decode(job.id);
+  return { id: job.id, path, ...describe(job.failure, path) };
 }
 
 export function uploadsRunning() {

@@ -1,0 +1,49 @@
+// Whether the server can be reached, for what waits until it can.
+
+import { send, urlOf } from "./api.js";
+
+const PAUSES = [1000, 2000, 4000, 8000, 15000];
+const AWAY = new Set(["page:unreachable", "page:upload_broken"]);
+const GATEWAY = new Set([502, 503, 504]); // the web server is there, what answers behind it is not
+let waiting = null;
+
+// A failure that passes: nothing is wrong with what was asked.
+export function isUnreachable(failure) {
+  return AWAY.has(failure.key) || (failure.key === "page:bad_reply" && GATEWAY.has(failure.code));
+}
+
+// Asks from time to time, and at once when the browser has a network again. Everybody waits for the same answer.
+export function untilReachable() {
+  waiting ??= ask().finally(() => {
+    waiting = null;
+  });
+  return waiting;
+}
+
+async function ask() {
+  for (let i = 0; ; ++i) {
+    await pause(PAUSES[Math.min(i, PAUSES.length - 1)]);
+    if (await answers()) return;
+  }
+}
+
+function pause(length) {
+  return new Promise((resolve) => {
+    const timer = setTimeout(end, length);
+    addEventListener("online", end);
+    function end() {
+      clearTimeout(timer);
+      removeEventListener("online", end);
+      resolve();
+    }
+  });
+}
+
+async function answers() {
+  try {
+    const { status } = await send(urlOf("list", { action: "shares", limit: 1 }));
+    return !GATEWAY.has(status);
+  } catch {
+    return false;
+  }
+}

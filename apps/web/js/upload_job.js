@@ -1,0 +1,144 @@
+// One file on its way to the server. A connection that breaks is waited for; nothing is stored twice.
+
+import { ApiError, readReply, urlOf } from "./api.js";
+import { askConflict, cannotReplace } from "./conflicts.js";
+import { isUnreachable, untilReachable } from "./network.js";
+import { childOf, encodeName, lastOf, nameOf, parentOf, splitExtension } from "./path.js";
+import { entryAt } from "./sources.js";
+
+const EXISTS = 414;
+const MOST_TRIES = 20;
+const MOST_IN_VAIN = 4; // tries that brought no byte across although the server answers: the file cannot be read
+let asking = Promise.resolve();
+
+export class Job {
+  constructor(batch, { file, parts }) {
+    const id = parts.reduce((folder, part) => childOf(folder, encodeName(part)), batch.target);
+    Object.assign(this, { batch, file, parts, id, name: lastOf(id) });
+    this.meets = null; // what has its name already
+    this.reset();
+  }
+
+  reset() {
+    Object.assign(this, { state: "waiting", loaded: 0, failure: null });
+  }
+
+  get pair() {
+    const { size, lastModified } = this.file;
+    return { name: this.name, comes: { isFolder: false, size, mtime: lastModified / 1000 }, there: this.meets };
+  }
+
+  async run() {
+    this.state = "running";
+    try {
+      await this.place();
+    } catch (failure) {
+      if (this.state === "running") this.state = "failed";
+      this.failure = failure;
+    }
+  }
+
+  async place() {
+    if (!this.meets) {
+      try {
+        return await this.send("error");
+      } catch (failure) {
+        if (failure.code !== EXISTS) throw failure;
+        this.meets = await this.found();
+      }
+    }
+    // One question at a time; the answer to one may be meant for all.
+    const answer = await (asking = asking.catch(() => {}).then(() => this.answer()));
+    if (this.state === "cancelled") return undefined;
+    if (answer === "both") return this.sendBeside();
+    if (answer === "overwrite") return this.send("overwrite");
+    this.state = answer === null ? "cancelled" : "skipped";
+    return undefined;
+  }
+
+  async found() {
+    const entry = await entryAt(this.id);
+    return { isFolder: entry?.isFolder ?? false, size: entry?.size ?? null, mtime: entry?.mtime ?? 0 };
+  }
+
+  async answer() {
+    const { batch } = this;
+    // Somebody who cancelled is not asked about the others that already stood in line.
+    if (this.state === "cancelled") return null;
+    const kind = cannotReplace(this.pair) ? "clash" : "file";
+    if (batch.answers[kind]) return batch.answers[kind];
+    const more = batch.jobs.some((one) => one !== this && ["waiting", "running"].includes(one.state));
+    const said = await askConflict({ folder: parentOf(this.id), pairs: [this.pair], more });
+    if (said?.all) batch.answers[kind] = said.answer;
+    if (!said) batch.cancel();
+    return said?.answer ?? null;
+  }
+
+  async sendBeside() {
+    const [stem, extension] = splitExtension(nameOf(this.id));
+    const folder = parentOf(this.id);
+    for (let n = 2; ; ++n) {
+      this.id = childOf(folder, encodeName(`${stem} (${n})${extension}`));
+      try {
+        return await this.send("error");
+      } catch (failure) {
+        if (failure.code !== EXISTS || n > 999) throw failure;
+      }
+    }
+  }
+
+  // Tries again when the connection broke, as often as something came across.
+  async send(overwrite) {
+    let inVain = 0;
+    for (let tries = 1; ; ++tries) {
+      try {
+        return await this.put(overwrite);
+      } catch (failure) {
+        // The try before may have arrived whole, and only its answer got lost.
+        if (failure.code === EXISTS && tries > 1 && (await this.found()).size === this.file.size) return this.stored();
+        inVain = this.loaded > 0 ? 0 : inVain + 1;
+        if (!isUnreachable(failure) || tries === MOST_TRIES || inVain === MOST_IN_VAIN) throw failure;
+        this.loaded = 0;
+        await this.batch.pauseFor(untilReachable());
+        if (this.state === "cancelled") return undefined;
+      }
+    }
+  }
+
+  stored() {
+    this.loaded = this.file.size;
+    this.state = "done";
+  }
+
+  // What fetch() cannot: tell how far the body is.
+  put(overwrite) {
+    return new Promise((resolve, reject) => {
+      const request = new XMLHttpRequest();
+      this.request = request;
+      request.open("PUT", urlOf("upload", { path_raw: this.id, overwrite }));
+      request.setRequestHeader("Content-Type", "application/octet-stream");
+      request.upload.addEventListener("progress", (event) => {
+        this.loaded = event.loaded;
+        this.batch.paintSoon();
+      });
+      request.addEventListener("load", () => {
+        try {
+          readReply(request.status, request.responseText);
+          this.stored();
+          resolve();
+        } catch (failure) {
+          reject(failure);
+        }
+      });
+      request.addEventListener("error", () => reject(new ApiError({ key: "page:upload_broken" })));
+      request.addEventListener("abort", () => resolve());
+      request.send(this.file);
+    });
+  }
+
+  cancel() {
+    if (this.state !== "waiting" && this.state !== "running") return;
+    this.state = "cancelled";
+    this.request?.abort();
+  }
+}

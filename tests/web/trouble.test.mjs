@@ -1,0 +1,173 @@
+// What goes wrong is said with its name, waited for or tried again; what went well leaves.
+import assert from "node:assert/strict";
+import { chmodSync, existsSync, mkdirSync, mkdtempSync, readdirSync, rmSync, writeFileSync } from "node:fs";
+import { tmpdir } from "node:os";
+import { join } from "node:path";
+import { after, before, test } from "node:test";
+import { launch, row, screenshot, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
+
+const projects = process.env.ORVEL_TEST_PROJECTS;
+const files = mkdtempSync(join(tmpdir(), "orvel-trouble-"));
+const FILES = 30;
+let chrome;
+
+before(async () => {
+  chrome = await launch();
+  mkdirSync(join(files, "trip/a/b"), { recursive: true });
+  for (let i = 0; i < FILES; ++i) writeFileSync(join(files, "trip", i % 2 ? "a/b" : "a", `photo ${i}.jpg`), `photo ${i}`);
+  writeFileSync(join(files, "thing"), "a file");
+  for (const folder of ["trouble/in", "trouble/taken/thing", "trouble/source", "trouble/to"])
+    mkdirSync(`${projects}/${folder}`, { recursive: true });
+  for (const folder of ["", "/in", "/taken", "/taken/thing", "/source", "/to"]) chmodSync(`${projects}/trouble${folder}`, 0o777);
+  for (const name of ["one.txt", "two.txt"]) {
+    writeFileSync(`${projects}/trouble/in/${name}`, "");
+    writeFileSync(`${projects}/trouble/source/${name}`, `${name} of the source`, { mode: 0o666 });
+    writeFileSync(`${projects}/trouble/to/${name}`, `${name}, there before`, { mode: 0o666 });
+  }
+});
+after(async () => {
+  await chrome.close();
+  rmSync(files, { recursive: true });
+});
+
+async function upload(page, command, paths) {
+  const chooser = page.waitForEvent("filechooser");
+  await page.click("#toolbar >> text=Upload");
+  await page.click(`.menu >> text=${command}`);
+  await (await chooser).setFiles(paths);
+}
+
+const go = (page, place) =>
+  page.evaluate((id) => {
+    location.hash = id;
+  }, place);
+
+test("a connection that breaks: the queue waits and goes on, the list stays", () =>
+  withPage(
+    chrome,
+    "alice",
+    { path: "/projects/trouble/in" },
+    async (page) => {
+      let sent = 0;
+      let away = false;
+      let questions = 0;
+      page.on("request", (request) => {
+        if (request.postData()?.includes("action=present")) ++questions;
+      });
+      await page.route("**/cgi-bin/**", async (route) => {
+        const isFile = route.request().method() === "PUT";
+        if (isFile && ++sent === 4) {
+          // It arrives, and only its answer is lost. What the page sends of a file cannot be seen here.
+          await route.fetch({ postData: /photo \d+/.exec(decodeURIComponent(decodeURIComponent(route.request().url())))[0] });
+          away = true;
+        }
+        return away ? route.abort("connectionreset") : route.continue();
+      });
+      await upload(page, "Upload a folder", join(files, "trip"));
+      await page.waitForSelector(".activity-card >> text=Waiting for the connection");
+      await page.keyboard.press("Alt+r");
+      await page.waitForSelector("#notice >> text=may be out of date");
+      await page.waitForSelector("#view >> text=two.txt");
+      await screenshot(page, "connection-away");
+      away = false;
+      await wentWell(page, `${FILES} files uploaded`);
+      await page.waitForSelector("#notice", { state: "hidden" });
+      const there = ["a", "a/b"].flatMap((folder) => readdirSync(`${projects}/trouble/in/trip/${folder}`));
+      assert.equal(there.filter((name) => name !== "b").length, FILES); // nothing twice
+      assert.equal(questions, 1); // what goes into a new folder meets nothing
+      await page.waitForSelector("#activity", { state: "hidden" });
+    },
+    [/ERR_CONNECTION_RESET/],
+  ));
+
+test("a file that is refused: its name, the advice, once more", () =>
+  withPage(chrome, "alice", { path: "/projects/trouble/in" }, async (page) => {
+    await page.route("**/cgi-bin/upload?*", (route) =>
+      route.fulfill({ json: { success: false, error: { code: 416, key: "error:error_space_not_enough", path: "" } } }),
+    );
+    await upload(page, "Upload files", join(files, "thing"));
+    const failed = page.locator(".activity-card.failed");
+    await failed.locator("text=no room left for “thing”").waitFor();
+    await failed.locator("text=Free some space on the volume").waitFor();
+    assert.match(await page.textContent("#activity-title"), /activit.* failed/);
+    await screenshot(page, "upload-failed");
+    await page.unroute("**/cgi-bin/upload?*");
+    await failed.locator("text=Try again").click();
+    await wentWell(page, "1 file uploaded");
+    assert.ok(existsSync(`${projects}/trouble/in/thing`));
+  }));
+
+test("a file and a folder of one name: neither replaces the other", () =>
+  withPage(chrome, "alice", { path: "/projects/trouble/taken" }, async (page) => {
+    await upload(page, "Upload files", join(files, "thing"));
+    await page.waitForSelector(".dialog >> text=Neither can replace the other");
+    assert.equal(await page.locator(".dialog button >> text=Replace").count(), 0);
+    await page.click(".dialog >> text=Keep both");
+    await page.waitForSelector("#view >> text=thing (2)");
+    await row(page, "thing").click();
+    await page.keyboard.press("Control+c");
+    await go(page, "/projects/trouble/in");
+    await page.waitForSelector("#view >> text=trip");
+    await page.keyboard.press("Control+v");
+    await page.waitForSelector(".dialog >> text=Neither can replace the other"); // "thing" is a file here
+    await page.keyboard.press("Escape");
+    await go(page, "/projects/trouble");
+    await page.waitForSelector("#view >> text=taken");
+    mkdirSync(`${projects}/trouble/to/taken`);
+    await row(page, "taken").click();
+    await page.keyboard.press("Control+c");
+    await go(page, "/projects/trouble/to");
+    await page.waitForSelector("#view >> text=one.txt");
+    await page.keyboard.press("Control+v");
+    await page.waitForSelector(".dialog >> text=files of the same name are replaced");
+    await screenshot(page, "conflict-folder");
+    await page.keyboard.press("Escape");
+  }));
+
+test("cut, a question dismissed, pasted after all; every tab follows, and what failed says why", () =>
+  withPage(chrome, "alice", { path: "/projects/trouble/source" }, async (page) => {
+    const other = await page.context().newPage();
+    await other.goto(`${URL_OF_PAGE}#/projects/trouble/to`);
+    await other.waitForSelector("#view >> text=two.txt");
+    // As if it took long.
+    const running = { taskid: "OrvelFilemove_1", action: "move", state: "running", items_total: 7, items_done: 1, progress: 0.1 };
+    await other.route("**/cgi-bin/operation?action=status", (route) =>
+      route.fulfill({ json: { success: true, data: { tasks: [running] } } }),
+    );
+    await page.bringToFront();
+    await page.focus("#view");
+    await page.keyboard.press("Control+a");
+    await page.keyboard.press("Control+x");
+    await page.waitForFunction(() => document.querySelectorAll("#view .row.cut").length === 2);
+    await go(page, "/projects/trouble/to");
+    await page.waitForSelector("#view >> text=/there|two.txt/");
+    await page.waitForFunction(() => !document.querySelector("#view .row.cut"));
+    await page.keyboard.press("Control+v");
+    await page.waitForSelector(".dialog >> text=2 names are taken");
+    await screenshot(page, "conflict-many");
+    await page.keyboard.press("Escape");
+    await page.click("#toolbar >> text=Paste");
+    await page.waitForSelector(".dialog >> text=2 names are taken");
+    await page.click(".dialog >> text=Keep both");
+    await other.waitForSelector(".activity-card >> text=Move 7 items");
+    await wentWell(page, "Move 2 items to to");
+    assert.equal(await page.locator("#toolbar >> text=Paste").count(), 0);
+    assert.equal(readdirSync(`${projects}/trouble/source`).length, 0);
+    await go(page, "/projects");
+    await row(page, "board").click();
+    await page.keyboard.press("Control+c");
+    await go(page, "/projects/trouble/in");
+    await page.waitForSelector("#view >> text=trip");
+    await page.keyboard.press("Control+v");
+    const failed = page.locator(".activity-card.failed", { hasText: "Copy “board” to in" });
+    await failed.locator("text=Ask the owner or an administrator").waitFor();
+    await screenshot(page, "task-failed");
+    await failed.locator("text=Why?").first().click();
+    await page.waitForSelector(".dialog .why li");
+    await page.keyboard.press("Escape");
+    await failed.locator("text=Try again").click();
+    await failed.waitFor();
+    await page.reload();
+    await page.waitForSelector("#view >> text=trip");
+    assert.equal(await page.locator(".activity-card").count(), 0); // it has been seen
+  }));
