@@ -159,7 +159,7 @@ TEST_F(DownloadCgi, FoldersAndSeveralPathsComeAsZip) {
     EXPECT_EQ(zip("path=/photo/sub"), sub);
     EXPECT_EQ(zip("path=/photo/sub/empty/.."), sub) << "no member leads out";
     EXPECT_EQ(zip("path=/photo/sub/"), sub);
-    const Members two = zip("path=/photo/sub/empty&path=/photo/other/sub&path_raw=/photo/sub&name=both");
+    const Members two = zip("path=/photo/sub/empty&path_raw=/photo/other/sub&path_raw=/photo/sub&name=both");
     EXPECT_EQ(two.count("sub (2)/%E9"), 1U);
     EXPECT_EQ(two.count("_not_included.txt"), 0U);
     EXPECT_EQ(two.at("sub/big"), std::string(300000, 'z'));

@@ -183,6 +183,11 @@ test("a refused download says so in words", () =>
     "alice",
     { path: "/preview" },
     async (page) => {
+      // As if the share had been closed to downloads a moment ago.
+      await page.route("**/cgi-bin/why?path_raw=%2Fpreview", (route) =>
+        route.fulfill({ json: { success: false, error: { code: 401, key: "error:error_error_system", path: "" } } }),
+      );
+      await page.reload();
       await row(page, "readme.txt").click();
       await page.click("#toolbar >> text=Download");
       await page.waitForSelector(".toast.failed >> text=no permission for “readme.txt”");

@@ -70,12 +70,13 @@ test("a connection that breaks: the queue waits and goes on, the list stays", ()
       await page.waitForSelector("#view >> text=two.txt");
       await screenshot(page, "connection-away");
       away = false;
-      await wentWell(page, `${FILES} files uploaded`);
+      const well = page.locator(".activity-card.good", { hasText: `${FILES} files uploaded` });
+      await well.waitFor();
       await page.waitForSelector("#notice", { state: "hidden" });
       const there = ["a", "a/b"].flatMap((folder) => readdirSync(`${projects}/trouble/in/trip/${folder}`));
       assert.equal(there.filter((name) => name !== "b").length, FILES); // nothing twice
       assert.equal(questions, 1); // what goes into a new folder meets nothing
-      await page.waitForSelector("#activity", { state: "hidden" });
+      await well.waitFor({ state: "detached" }); // by itself
     },
     [/ERR_CONNECTION_RESET/],
   ));

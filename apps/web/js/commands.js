@@ -1,5 +1,6 @@
 // Everything that can be done, once: for the toolbar, the menus, the keyboard and the list of shortcuts.
 
+import { mayDownload, mayModify, mayWriteIn } from "./access.js";
 import { browser, go, goTo, goUp, refresh, selectedEntries, setMode, shareEntry } from "./browser.js";
 import { isInBin, isReadOnlyShare } from "./entries.js";
 import { download } from "./download.js";
@@ -35,14 +36,17 @@ export function context() {
   const { first } = selection;
   const onRow = listing?.item(selection.cursor);
   const home = search && first ? shareEntry(first.id) : share;
+  const lies = search && first ? first.id : browser.id;
+  const writable = search || mayWriteIn(browser.id);
   return {
     folder,
     search,
     count,
-    canChange: count > 0 && home !== undefined && !isReadOnlyShare(home),
+    canChange: count > 0 && home !== undefined && !isReadOnlyShare(home) && writable && mayModify(lies),
+    canDownload: count > 0 && mayDownload(lies),
     // What is chosen by name alone has its properties in its row.
     single: selection.single && selection.single.id === onRow?.id ? onRow : selection.single,
-    canWrite: folder && share !== undefined && !isReadOnlyShare(share),
+    canWrite: folder && share !== undefined && !isReadOnlyShare(share) && writable,
     inBin: isInBin(browser.id),
   };
 }
@@ -97,7 +101,7 @@ addCommand({
   icon: "download",
   keys: ["Mod+s"],
   group: "open",
-  when: some,
+  when: ({ canDownload }) => canDownload,
   run: async () => download(await selectedEntries()),
 });
 addCommand({

@@ -3,6 +3,7 @@
 import { browser } from "./browser.js";
 import { allCommands, context, runCommand } from "./commands.js";
 import { $ } from "./dom.js";
+import { t } from "./strings.js";
 
 const TYPING_PAUSE = 900; // after which a letter begins a new word
 const TYPING_GAP = 200; // in which the next letter mostly comes
@@ -75,19 +76,29 @@ function moved(event) {
   return true;
 }
 
-// Letters jump to the next name that begins with them.
+// Letters jump to the next name that begins with them; what is looked for shows as long as it is being typed.
 function typeAhead(event) {
   const { listing, selection } = browser;
-  if (!listing?.ready || event.key.length !== 1 || event.ctrlKey || event.metaKey || event.altKey) return false;
+  if (!listing?.ready || event.ctrlKey || event.metaKey || event.altKey) return false;
   const now = performance.now();
-  const continued = now - typedAt < TYPING_PAUSE;
-  if (event.key === " " && !(continued && typed !== "")) return false;
-  if (event.key === "/" || event.key === "?") return false;
-  typed = continued ? typed + event.key : event.key;
+  const continued = now - typedAt < TYPING_PAUSE && typed !== "";
+  const back = event.key === "Backspace" && continued;
+  if (!back && (event.key.length !== 1 || "/?".includes(event.key) || (event.key === " " && !continued))) return false;
+  typed = back ? typed.slice(0, -1) : continued ? typed + event.key : event.key;
   typedAt = now;
+  showTyped(typed);
   const repeated = [...typed].every((letter) => letter === typed[0]);
-  jump(repeated ? typed[0] : typed, selection.cursor + (repeated || typed.length === 1 ? 1 : 0));
+  if (typed !== "") jump(repeated ? typed[0] : typed, selection.cursor + (repeated || typed.length === 1 ? 1 : 0));
   return true;
+}
+
+let shownTimer = null;
+
+function showTyped(text, words = "jump.to") {
+  clearTimeout(shownTimer);
+  $("typed").hidden = text === "";
+  $("typed").textContent = text === "" ? "" : t(words, { text });
+  shownTimer = setTimeout(showTyped, 2 * TYPING_PAUSE, "");
 }
 
 let jumps = 0;
@@ -98,27 +109,20 @@ async function jump(text, start) {
   const wanted = text.toLowerCase();
   const begins = (entry) => entry.name.toLowerCase().startsWith(wanted);
   let index = listing.find(begins, start % Math.max(1, listing.total));
-  if (index < 0 && browser.sort.by === "name" && browser.sort.ascending) {
+  let entry = listing.item(index);
+  if (index < 0 && !listing.loaded(0, listing.total - 1)) {
+    // Most of a long list has never been fetched; while somebody types on, nobody asks.
     await new Promise((resolve) => setTimeout(resolve, TYPING_GAP));
-    if (mine === jumps) index = await searchSorted(listing, wanted, () => mine === jumps);
+    if (mine !== jumps) return;
+    showTyped(text, "jump.looking");
+    clearTimeout(shownTimer);
+    const all = await listing.allNames().catch(() => []);
+    index = all.findIndex(begins);
+    entry = all[index];
   }
-  if (index < 0 || mine !== jumps || listing !== browser.listing) return;
-  selection.pick(index);
+  if (mine !== jumps || listing !== browser.listing) return;
+  showTyped(text, index < 0 ? "jump.none" : "jump.to");
+  if (index < 0) return;
+  selection.only(entry, index);
   view.reveal(index, "center");
-}
-
-// Rows that were never loaded are found by halving, as they lie in the order of their names; the folders first.
-async function searchSorted(listing, wanted, goesOn) {
-  let low = 0;
-  let high = listing.total;
-  const at = (index) => listing.at(index);
-  while (low < high && goesOn()) {
-    const middle = (low + high) >> 1;
-    const entry = await at(middle);
-    if (!entry) return -1;
-    if (entry.isFolder || entry.name.toLowerCase() < wanted) low = middle + 1;
-    else high = middle;
-  }
-  const entry = low < listing.total ? await at(low) : undefined;
-  return entry?.name.toLowerCase().startsWith(wanted) ? low : -1;
 }

@@ -16,7 +16,7 @@ addCommand({
   icon: "link",
   keys: ["Mod+k"],
   group: "info",
-  when: ({ single, inBin }) => single && !inBin,
+  when: ({ single, inBin, canDownload }) => single && !inBin && canDownload,
   run: ({ single }) => makeLink(single),
 });
 addCommand({ id: "links", icon: "link", group: "info", run: showLinks });

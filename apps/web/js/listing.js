@@ -17,6 +17,7 @@ export class Listing {
     this.requests = new Map();
     this.error = null;
     this.extra = null;
+    this.all = null;
   }
 
   get ready() {
@@ -132,6 +133,7 @@ export class Listing {
     if (one.total !== null && one.total !== total) {
       one.stale = one.pages;
       one.pages = new Map();
+      this.all = null;
     }
     one.total = total;
   }
@@ -139,6 +141,7 @@ export class Listing {
   // Fetches again what is in sight; until it comes, what is there stays.
   refresh(first, last) {
     this.cancel();
+    this.all = null;
     for (const one of this.parts) {
       one.stale = new Map([...(one.stale ?? []), ...one.pages]);
       one.pages = new Map();
@@ -164,6 +167,15 @@ export class Listing {
       start += total;
     }
     return found.flat();
+  }
+
+  // All of them, asked for once while the list stays as it is.
+  allNames() {
+    this.all ??= this.names(0, Infinity).catch((failure) => {
+      this.all = null;
+      throw failure;
+    });
+    return this.all;
   }
 
   async namesOf(one, from, to, signal) {

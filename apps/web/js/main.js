@@ -1,5 +1,6 @@
 // Starts the page.
 
+import { setupAccess } from "./access.js";
 import { setupActivity } from "./activity.js";
 import {
   browser,
@@ -123,6 +124,7 @@ function stateOf(listing) {
 
 function clearFilter() {
   $("find").value = "";
+  if (document.activeElement !== $("find")) document.querySelector(".top").classList.remove("finding");
   if (browser.kind !== "all") setKind("all");
   setFilter("");
 }
@@ -165,9 +167,16 @@ function setupFind() {
       searchFor(input.value.trim());
     }
   });
+  $("find-clear").addEventListener("click", () => {
+    clearTimeout(timer);
+    clearFilter();
+    input.focus();
+  });
+  on("clear-filter", clearFilter);
   on("place", () => {
     clearTimeout(timer);
     input.value = "";
+    document.querySelector(".top").classList.remove("finding");
   });
 }
 
@@ -211,9 +220,13 @@ async function start() {
   on("shown", showPlace);
   on("listing", paintListing);
   on("selection", () => browser.listing && browser.view.listing === browser.listing && browser.view.paintSelection());
+  on("access", () => {
+    if (browser.id !== "/") paintListing();
+  });
   on("shares", () => {
     if (browser.id === "/" && homeShown) showPlace();
   });
+  setupAccess();
   setupToolbar(setSort);
   setupPathbar();
   setupTree();

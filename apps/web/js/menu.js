@@ -16,7 +16,7 @@ export function openMenu(items, { x, y, anchor = null }) {
   const label = anchor?.getAttribute("aria-label") ?? anchor?.textContent ?? t("menu.more");
   const menu = h("div.menu", { role: "menu", tabindex: -1, "aria-label": label });
   const close = (focusBack = true) => {
-    menu.remove();
+    host.remove();
     document.removeEventListener("pointerdown", outside, true);
     window.removeEventListener("blur", close);
     anchor?.setAttribute("aria-expanded", "false");
@@ -31,7 +31,9 @@ export function openMenu(items, { x, y, anchor = null }) {
   }
   menu.addEventListener("keydown", (event) => keydown(event, menu, close));
   menu.addEventListener("contextmenu", (event) => event.preventDefault());
-  document.body.append(menu);
+  // Outside of everything that could cut it off, and still a part of the page with a name.
+  const host = h("aside", { "aria-label": label }, menu);
+  document.body.append(host);
   place(menu, x, y, anchor);
   anchor?.setAttribute("aria-expanded", "true");
   document.addEventListener("pointerdown", outside, true);

@@ -117,6 +117,11 @@ export function patternOf(name) {
   return decode(name).replace(/[,\\*?[\]\uFFFD]/g, "?");
 }
 
+// Patterns of names with accents, in both forms in which systems write these.
+export function inBothForms(patterns) {
+  return [...new Set([patterns, patterns.normalize("NFC"), patterns.normalize("NFD")])].join(",");
+}
+
 // Of a reply's object, whose readable text is in `key`.
 export function idIn(object, key = "path") {
   return object[key + "_raw"] ?? encodePath(object[key]);

@@ -1,10 +1,11 @@
 // The path as a row of folders, and as text to type over.
 
-import { h, icon, nameNode, plainName, set } from "./dom.js";
+import { $, h, icon, iconButton, nameNode, plainName, set } from "./dom.js";
 import { browser, go } from "./browser.js";
 import { ancestry, decode, encodePath, isSearch, nameOf, normaliseId } from "./path.js";
 import { isRecycleBin } from "./entries.js";
 import { on } from "./events.js";
+import { openMenu } from "./menu.js";
 import { t } from "./strings.js";
 
 const bar = document.getElementById("pathbar");
@@ -18,8 +19,9 @@ export function labelOf(id) {
 
 export function setupPathbar() {
   on("place", paint);
+  new ResizeObserver(fold).observe(bar);
   bar.addEventListener("click", (event) => {
-    if (!event.target.closest("a")) editPath();
+    if (!event.target.closest("a, button")) editPath();
   });
 }
 
@@ -43,8 +45,36 @@ function paint(id) {
       }),
     ),
   );
-  bar.querySelector("ol").scrollLeft = 1e6;
+  fold();
+  // The first screen has a heading of its own.
+  $("place").hidden = id === "/";
+  $("place").textContent = plainName(labelOf(id));
   document.title = `${plainName(labelOf(id))} – Orvel`;
+}
+
+// What the bar has no room for goes into a menu, from the top on; the shares and the folder on screen stay.
+function fold() {
+  const list = bar.querySelector("ol");
+  if (!list) return;
+  list.querySelector(".more-crumbs")?.remove();
+  const middle = [...list.children].slice(1, -1);
+  for (const item of middle) item.hidden = false;
+  const hidden = [];
+  if (list.scrollWidth <= list.clientWidth) return;
+  const items = () =>
+    hidden.map((item) => {
+      const { id } = item.firstChild.dataset;
+      return { label: plainName(labelOf(id)), icon: "folder-open", run: () => go(id) };
+    });
+  const button = iconButton("dots", t("path.more"), () => openMenu(items(), { anchor: button }), {
+    "aria-haspopup": "menu",
+  });
+  list.firstChild.after(h("li.more-crumbs", {}, button));
+  while (middle.length > 0 && list.scrollWidth > list.clientWidth) {
+    const item = middle.shift();
+    item.hidden = true;
+    hidden.push(item);
+  }
 }
 
 export function editPath() {

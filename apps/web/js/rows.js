@@ -46,15 +46,13 @@ export function makeHeader(columns) {
             ),
       ),
     ),
-    h("span.more-cell", { role: "columnheader" }),
+    h("span.more-cell", { role: "columnheader" }, h("span.visually-hidden", {}, t("menu.more"))),
   );
 }
 
 export function makeRow(index, mode) {
-  const row = h("div.row", { id: `row-${index}`, role: mode === "list" ? "row" : "option" });
+  const row = h("div.row", { id: `row-${index}`, role: "row", "aria-rowindex": index + (mode === "list" ? 2 : 1) });
   row.index = index;
-  if (mode === "list") row.setAttribute("aria-rowindex", index + 2);
-  else row.setAttribute("aria-posinset", index + 1);
   return row;
 }
 
@@ -66,7 +64,8 @@ export function fillRow(row, index, entry, mode, columns) {
   row.draggable = Boolean(entry);
   if (!entry) {
     row.removeAttribute("aria-label");
-    row.replaceChildren(h("span.bone.bone-icon"), h("span.bone.bone-name"), h("span.bone.bone-more"));
+    const bones = ["icon", "name", "more"].map((part) => h(`span.bone.bone-${part}`));
+    row.replaceChildren(h("span.cell-box", { role: "gridcell" }, bones));
     row.querySelector(".bone-name").style.width = `${18 + ((index * 37) % 24)}%`;
     return;
   }
@@ -116,7 +115,9 @@ function listCells(entry, columns) {
           column.id === "folder" ? nameNode(column.text(entry)) : column.text(entry),
         ),
   );
-  const sub = [formatTime(entry.mtime), entry.size === null ? null : formatSize(entry.size)]
+  // What a narrow screen shows in place of the columns.
+  const folder = columns.find((column) => column.id === "folder");
+  const sub = [folder?.text(entry), formatTime(entry.mtime), entry.size === null ? null : formatSize(entry.size)]
     .filter(Boolean)
     .join(" · ");
   return [
@@ -134,7 +135,7 @@ function listCells(entry, columns) {
 }
 
 function tileParts(entry) {
-  return [
+  const parts = [
     check(),
     more(),
     h("span.tile-picture", {}, picture(entry, "file-icon large"), badges(entry)),
@@ -145,6 +146,7 @@ function tileParts(entry) {
       h("span.sub", {}, entry.size === null ? t("type.folder") : formatSize(entry.size)),
     ),
   ];
+  return [h("span.cell-box", { role: "gridcell" }, parts)];
 }
 
 function picture(entry, className) {

@@ -2,6 +2,7 @@
 
 import { browser } from "./browser.js";
 import { dayRange, h, icon } from "./dom.js";
+import { inBothForms } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
 
@@ -127,7 +128,7 @@ export function paramsOf(values) {
   const params = {
     path_raw: values.where === "all" ? browser.shares.map((share) => share.id) : [folder],
     recursive: String(values.where !== "here"),
-    name: values.name.trim(),
+    name: inBothForms(values.name.trim()),
     type: values.type,
     extension: values.extension.replace(/[.*\s]/g, ""),
     owner: values.owner.trim(),

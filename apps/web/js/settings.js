@@ -59,7 +59,10 @@ export function setupSettings() {
       { anchor: button },
     ),
   );
-  $("find").addEventListener("blur", () => document.querySelector(".top").classList.remove("finding"));
+  // A filter that holds stays in sight, with what clears it.
+  $("find").addEventListener("blur", () => {
+    if ($("find").value === "") document.querySelector(".top").classList.remove("finding");
+  });
 }
 
 function showHelp() {

@@ -4,7 +4,7 @@ import { ApiError, get, MISSING } from "./api.js";
 import { breathe } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { Listing } from "./listing.js";
-import { lastOf, parentOf, patternOf } from "./path.js";
+import { inBothForms, lastOf, parentOf, patternOf } from "./path.js";
 
 const ADDITIONAL = "size,time,owner,perm,mount_point_type,icon";
 const BRIEF = { additional: undefined };
@@ -27,7 +27,7 @@ function orderOf({ by, ascending }) {
 // Folders come first whichever way the rest is sorted: descending, they are a list of their own.
 export function folderListing(id, { sort, filter }, onChange) {
   const parts = sort.ascending ? ["all"] : ["dir", "file"];
-  const pattern = filter === "" ? undefined : `*${filter.replace(/[,\\]/g, "?")}*`;
+  const pattern = filter === "" ? undefined : inBothForms(`*${filter.replace(/[,\\]/g, "?")}*`);
   const asked = { action: "folder", path_raw: id, pattern, additional: ADDITIONAL, ...orderOf(sort) };
   const fetchPart = async (filetype, { offset, limit, brief, signal }) => {
     const reply = await get("list", { ...asked, filetype, offset, limit, ...(brief && BRIEF) }, signal);

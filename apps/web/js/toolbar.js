@@ -4,7 +4,7 @@ import { browser, setKind } from "./browser.js";
 import { heldItems } from "./clipboard.js";
 import { command, context, runCommand, shortcutText } from "./commands.js";
 import { $, h, icon, iconButton, keepFocus } from "./dom.js";
-import { on } from "./events.js";
+import { emit, on } from "./events.js";
 import { openMenu } from "./menu.js";
 import { searchStatus } from "./search.js";
 import { formatSize } from "./format.js";
@@ -34,7 +34,7 @@ let painted = "";
 
 export function setupToolbar(setSort) {
   const paint = () => paintToolbar(setSort);
-  for (const name of ["shown", "selection", "listing", "shares"]) on(name, paint);
+  for (const name of ["shown", "selection", "listing", "shares", "access"]) on(name, paint);
 }
 
 function menuItem(id) {
@@ -97,6 +97,8 @@ function paintToolbar(setSort) {
     browser.sort.by,
     now.folder,
     now.canWrite,
+    now.canChange,
+    now.canDownload,
     heldItems() !== null,
     now.inBin,
     now.count > 0,
@@ -206,9 +208,14 @@ function paintStatus(now) {
   if (folder) {
     parts.push(now.search ? searchStatus(listing) : h("span", {}, t("status.items", { count: listing.total })));
     if (count > 0) parts.push(h("span", {}, [t("select.count", { count }), sizeOfChosen()].filter(Boolean).join(", ")));
-    if (browser.filter) parts.push(h("span", {}, t("status.filtered", { text: browser.filter })));
+    if (browser.filter) parts.push(filterChip());
   }
-  $("status").replaceChildren(...parts);
+  keepFocus($("status"), () => $("status").replaceChildren(...parts));
+}
+
+function filterChip() {
+  const clear = iconButton("close", t("filter.clear"), () => emit("clear-filter"));
+  return h("span.filter-chip", {}, t("status.filtered", { text: browser.filter }), clear);
 }
 
 function sizeOfChosen() {

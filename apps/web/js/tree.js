@@ -14,7 +14,7 @@ import { t } from "./strings.js";
 const MOST = 400;
 
 const root = document.getElementById("tree");
-const nodes = new Map(); // id -> {item, group, loaded}
+const nodes = new Map(); // id -> {item, group, loaded}; `item` is the line that has the role
 let current = "/";
 
 export function setupTree() {
@@ -35,17 +35,8 @@ function paintShares() {
 
 function makeItem(id, label, kind, level, share = null) {
   const group = h("ul", { role: "group", hidden: true });
-  const line = h(
-    "div.tree-line",
-    {},
-    h("button.twist", { type: "button", tabindex: -1, "aria-hidden": "true" }, icon("chevron-right", "icon small")),
-    icon(`kind-${kind}`, "file-icon"),
-    nameNode(label),
-    share && h("span.marks", {}, marksOf(share)),
-  );
-  line.style.setProperty("--level", level);
   const item = h(
-    "li",
+    "div.tree-line",
     {
       role: "treeitem",
       "aria-expanded": "false",
@@ -53,12 +44,15 @@ function makeItem(id, label, kind, level, share = null) {
       "aria-label": [plainName(label), ...marksOf(share).map((mark) => mark.title)].join(", "),
       tabindex: -1,
     },
-    line,
-    group,
+    h("button.twist", { type: "button", tabindex: -1, "aria-hidden": "true" }, icon("chevron-right", "icon small")),
+    icon(`kind-${kind}`, "file-icon"),
+    nameNode(label),
+    share && h("span.marks", {}, marksOf(share)),
   );
+  item.style.setProperty("--level", level);
   item.dataset.id = id;
   nodes.set(id, { item, group, loaded: false });
-  return item;
+  return h("li", { role: "none" }, item, group);
 }
 
 function marksOf(share) {
@@ -89,7 +83,7 @@ async function load(id, node) {
     return;
   }
   const level = Number(node.item.getAttribute("aria-level")) + 1;
-  const kept = new Map([...node.group.children].map((item) => [item.dataset.id, item]));
+  const kept = new Map([...node.group.children].map((child) => [child.firstChild.dataset.id, child]));
   node.group.replaceChildren(
     ...items.slice(0, MOST).map((folder) => {
       const child = idIn(folder);
@@ -105,11 +99,10 @@ async function load(id, node) {
 }
 
 function moreItem(id, count, level) {
-  const line = h("div.tree-line.soft", {}, t("tree.more", { count }));
+  const line = h("div.tree-line.soft", { role: "treeitem", tabindex: -1 }, t("tree.more", { count }));
   line.style.setProperty("--level", level + 1);
-  const item = h("li", { role: "treeitem", tabindex: -1 }, line);
-  item.dataset.id = id;
-  return item;
+  line.dataset.id = id;
+  return h("li", { role: "none" }, line);
 }
 
 function reload(id) {
@@ -142,7 +135,7 @@ function paintCurrent(reveal = false) {
     item.classList.toggle("current", here);
     item.setAttribute("aria-selected", String(here));
     item.tabIndex = here ? 0 : -1;
-    if (here && reveal) item.firstChild.scrollIntoView({ block: "nearest" });
+    if (here && reveal) item.scrollIntoView({ block: "nearest" });
   }
   if (!nodes.has(current)) root.querySelector("[role=treeitem]")?.setAttribute("tabindex", "0");
 }

@@ -32,7 +32,6 @@ export class View {
     this.canvas.replaceChildren();
     this.header = mode === "list" ? makeHeader(columns) : null;
     this.root.className = `view ${mode} ${columns.map((column) => `has-${column.id}`).join(" ")}`;
-    this.root.setAttribute("role", mode === "list" ? "grid" : "listbox");
     keepFocus(this.root, () => this.root.replaceChildren(...(this.header ? [this.header] : []), this.canvas));
     this.root.scrollTop = 0;
     this.render();
@@ -80,7 +79,7 @@ export class View {
     }
     for (let index = first; index <= last; ++index) this.place(index, box);
     set(this.root, {
-      "aria-rowcount": this.mode === "grid" ? null : this.listing.ready ? this.listing.total + 1 : -1,
+      "aria-rowcount": this.listing.ready ? this.listing.total + (this.mode === "list" ? 1 : 0) : -1,
       "aria-busy": String(!this.listing.ready),
     });
     this.inSight = [
@@ -99,10 +98,6 @@ export class View {
     }
     const entry = this.listing.ready ? this.listing.item(index) : undefined;
     if (row.entry !== entry || !row.filled) fillRow(row, index, entry, this.mode, this.columns);
-    if (row.total !== this.listing.total) {
-      row.total = this.listing.total;
-      if (this.mode === "grid") row.setAttribute("aria-setsize", row.total);
-    }
     const y = Math.floor(index / box.across) * box.height - box.top + box.top / box.scale;
     const x = (index % box.across) * box.width;
     row.style.transform = `translate(${x}px, ${y}px)`;

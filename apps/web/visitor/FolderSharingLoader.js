@@ -187,7 +187,7 @@
     document.head.append(make("meta", { name: "viewport", content: "width=device-width, initial-scale=1" }));
     view = make("main", {});
     const mark = make("img", { src: g_Tunnel + "/favicon.svg", alt: "", width: "26", height: "26" });
-    document.body.append(make("div", { class: "brand" }, mark, "Orvel"), view);
+    document.body.append(make("div", { class: "brand", role: "banner" }, mark, "Orvel"), view);
     window.addEventListener("hashchange", openCurrent);
     openCurrent();
   });
