@@ -100,6 +100,26 @@ test("a folder of 100,000: first view, its end, everything chosen", () =>
     await page.waitForSelector("#status >> text=100,000 selected");
   }));
 
+test("pages come while the list moves", () =>
+  withPage(chrome, "alice", { path: "/warehouse" }, async (page) => {
+    await page.waitForSelector("#view >> text=item-00000.dat");
+    // A key held down, faster than any standstill, until rows beyond the first page are there.
+    const held = await page.evaluate(async () => {
+      const view = document.getElementById("view");
+      view.focus();
+      const isThere = () => [...view.querySelectorAll(".row:not(.waiting)")].some((row) => row.index > 700);
+      for (let i = 0; i < 2000; ++i) {
+        if (isThere()) return i;
+        if (view.querySelector(".cursor")?.index < 800 || i < 2)
+          view.dispatchEvent(new KeyboardEvent("keydown", { key: "PageDown", bubbles: true, cancelable: true }));
+        view.dispatchEvent(new Event("scroll"));
+        await new Promise(requestAnimationFrame);
+      }
+      return -1;
+    });
+    assert.ok(held >= 0, "nothing was asked for while it moved");
+  }));
+
 test("a list of a million rows reaches its end", () =>
   withPage(chrome, "alice", { path: "/" }, async (page) => {
     const total = 1_000_000;

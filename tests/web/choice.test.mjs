@@ -2,7 +2,7 @@
 import assert from "node:assert/strict";
 import { existsSync, mkdirSync, readdirSync, renameSync, rmSync, writeFileSync } from "node:fs";
 import { after, before, beforeEach, test } from "node:test";
-import { launch, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+import { launch, row, rowsReady, screenshot, wentWell, withPage } from "./browser.mjs";
 
 const folder = `${process.env.ORVEL_TEST_PROJECTS}/chosen`;
 const MANY = 1500; // of which the middle is never on screen
@@ -68,6 +68,29 @@ test("a range and everything, chosen of a list that has changed since it was sho
     writeFileSync(`${folder}/came later.dat`, "");
     await deleteForGood(page);
     assert.deepEqual(readdirSync(folder), ["came later.dat"]);
+  }));
+
+test("many at once: dragged as one task after one question, renamed far away", () =>
+  withPage(chrome, "admin", { path: "/projects/chosen" }, async (page) => {
+    await row(page, nameOf(0)).click();
+    await page.keyboard.press("F2");
+    await page.fill(".dialog .input", "zz far away.dat");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector("#view .row.selected.cursor >> text=zz far away.dat");
+    const asked = [];
+    page.on("request", (request) => {
+      if (request.method() === "POST") asked.push(new URLSearchParams(request.postData()).get("action"));
+    });
+    await page.press("#view", "Control+a");
+    await page.waitForFunction(() => !document.querySelector("#view .row:not(.header, .selected)"));
+    await row(page, "zz far away.dat").dragTo(page.locator("#tree >> text=/^house$/"));
+    await wentWell(page, `Move ${MANY.toLocaleString("en-GB")} items to house`);
+    assert.deepEqual(
+      asked.filter((action) => ["present", "move"].includes(action)),
+      ["present", "move"],
+    );
+    assert.deepEqual(readdirSync(folder), []);
+    assert.ok(existsSync(`${process.env.ORVEL_TEST_PROJECTS}/house/zz far away.dat`));
   }));
 
 test("sorting keeps a choice, a filter says what it takes away, a failure chooses nothing", () =>

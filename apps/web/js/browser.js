@@ -162,8 +162,7 @@ async function choose(listing, id, far) {
 async function checkChosen(listing, words) {
   const { selection } = browser;
   const chosen = await selection.entries();
-  // A search that runs has not found everything again yet.
-  if (chosen.length === 0 || (isSearch(browser.id) && !listing.extra?.finished)) return;
+  if (chosen.length === 0) return;
   const idsOf = (entries) => new Set(entries.map((entry) => entry.id));
   let here = idsOf(listing.fresh());
   if (!chosen.every((entry) => here.has(entry.id))) here = idsOf(await listing.names(0, Infinity).catch(() => chosen));
@@ -219,6 +218,8 @@ export async function refresh(chooseId = null) {
   if (chooseId) return choose(listing, chooseId, true);
   const cursor = listing.indexOf(cursorId);
   selection.move(cursor >= 0 ? cursor : Math.min(selection.cursor, Math.max(0, listing.total - 1)));
+  // A search that runs takes nothing away, and is asked again and again.
+  if (isSearch(browser.id) && !listing.extra?.finished) return undefined;
   return checkChosen(listing, "chosen.gone");
 }
 

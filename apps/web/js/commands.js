@@ -13,9 +13,16 @@ import { chooseFiles } from "./uploads.js";
 
 const commands = new Map();
 
-// {id, icon, keys: ["Delete"], group, when(context), run(context)}; the label is the text "command.ID".
+const MAC = navigator.platform.startsWith("Mac");
+
+// {id, icon, keys: ["Delete"], macKeys, group, when(context), run(context)}; the label is the text "command.ID".
 export function addCommand(command) {
   commands.set(command.id, { when: () => true, keys: [], ...command });
+}
+
+// Those of this machine; a Mac has more of its own.
+export function keysOf({ keys, macKeys = [] }) {
+  return MAC ? [...macKeys, ...keys] : keys;
 }
 
 export function command(id) {
@@ -58,9 +65,8 @@ export function runCommand(id) {
 }
 
 export function shortcutText(keys) {
-  const mac = navigator.platform.startsWith("Mac");
   const names = {
-    Mod: mac ? "⌘" : t("key.ctrl"),
+    Mod: MAC ? "⌘" : t("key.ctrl"),
     Shift: t("key.shift"),
     ArrowUp: "↑",
     ArrowLeft: "←",
@@ -74,7 +80,7 @@ export function shortcutText(keys) {
   return keys
     .split("+")
     .map((key) => names[key] ?? (key.length === 1 ? key.toUpperCase() : key))
-    .join(mac ? "" : "+");
+    .join(MAC ? "" : "+");
 }
 
 const some = ({ count }) => count > 0;
@@ -188,6 +194,7 @@ addCommand({
   id: "up",
   icon: "up",
   keys: ["Backspace", "Alt+ArrowUp"],
+  macKeys: ["Mod+ArrowUp"],
   group: "go",
   when: () => browser.id !== "/",
   run: goUp,

@@ -1,7 +1,7 @@
 // The keyboard: moving in the list, shortcuts, finding by typing.
 
 import { browser } from "./browser.js";
-import { allCommands, context, runCommand } from "./commands.js";
+import { allCommands, context, keysOf, runCommand } from "./commands.js";
 import { $ } from "./dom.js";
 import { t } from "./strings.js";
 
@@ -16,12 +16,15 @@ export function setupKeys() {
     if (moved(event) || typeAhead(event)) event.preventDefault();
   });
   addEventListener("keydown", shortcut);
+  // Where the keyboard stands shows to who uses it.
+  addEventListener("keydown", () => document.body.classList.add("keyed"), true);
+  addEventListener("pointerdown", () => document.body.classList.remove("keyed"), true);
 }
 
 function shortcut(event) {
   if (event.defaultPrevented || document.querySelector("dialog[open], .menu")) return;
   const writing = event.target.closest?.("input:not([type=checkbox]), textarea, select, [contenteditable]");
-  const found = allCommands().find((command) => command.keys.some((keys) => matches(event, keys)));
+  const found = allCommands().find((command) => keysOf(command).some((keys) => matches(event, keys)));
   if (!found || (writing && !event.ctrlKey && !event.metaKey && !event.altKey)) return;
   if (writing && ["selectAll", "copy", "cut", "paste"].includes(found.id)) return;
   // A plain key on a button or a link is that button's.
@@ -38,11 +41,13 @@ function matches(event, keys) {
   const wanted = new Set(keys.split("+"));
   const mod = event.ctrlKey || event.metaKey;
   const key = [...wanted].at(-1);
+  // With Alt the key itself counts: some systems make another character of it.
+  const pressed = event.altKey ? event.code.replace(/^(Key|Digit)/, "").toLowerCase() : event.key.toLowerCase();
   return (
     mod === wanted.has("Mod") &&
     event.altKey === wanted.has("Alt") &&
     event.shiftKey === (wanted.has("Shift") || (event.shiftKey && key === "?")) &&
-    (event.key === key || event.key.toLowerCase() === key)
+    (event.key === key || pressed === key)
   );
 }
 

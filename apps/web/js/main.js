@@ -117,7 +117,10 @@ function stateOf(listing) {
   if (!listing.ready || listing.total > 0) return null;
   if (isSearch(browser.id) && browser.filter === "" && browser.kind === "all")
     return listing.extra.finished ? nothingMatches(openSearch) : stillSearching();
-  if (browser.filter !== "" || browser.kind !== "all") return nothingFound(browser.filter, clearFilter);
+  if (browser.filter !== "" || browser.kind !== "all") {
+    const text = browser.filter;
+    return nothingFound(text, clearFilter, text !== "" && !isSearch(browser.id) && (() => searchFor(text)));
+  }
   const { canWrite, inBin } = context();
   return inBin ? emptyBin() : emptyFolder({ canWrite, upload: () => chooseFiles(false), newFolder });
 }
@@ -243,7 +246,7 @@ async function start() {
     if (uploadsRunning()) event.preventDefault();
   });
   addEventListener("focus", () => {
-    if (context().folder && browser.selection.count === 0) refresh();
+    if (context().folder) refresh();
   });
   try {
     await loadShares();

@@ -1,6 +1,6 @@
 // Choices: light or dark, language; and the list of shortcuts.
 
-import { addCommand, allCommands, runCommand, shortcutText } from "./commands.js";
+import { addCommand, allCommands, keysOf, runCommand, shortcutText } from "./commands.js";
 import { dialog } from "./dialogs.js";
 import { $, h } from "./dom.js";
 import { openMenu } from "./menu.js";
@@ -66,7 +66,7 @@ export function setupSettings() {
 }
 
 function showHelp() {
-  const keysOf = (command) => command.keys.map((keys) => h("kbd", {}, shortcutText(keys)));
+  const marksOf = (command) => keysOf(command).map((keys) => h("kbd", {}, shortcutText(keys)));
   const sections = GROUPS.map((group) => {
     const rows = allCommands().filter((command) => command.group === group && command.keys.length > 0);
     return (
@@ -78,7 +78,7 @@ function showHelp() {
         h(
           "dl",
           {},
-          rows.map((command) => [h("dt", {}, t(`command.${command.id}`)), h("dd", {}, keysOf(command))]),
+          rows.map((command) => [h("dt", {}, t(`command.${command.id}`)), h("dd", {}, marksOf(command))]),
         ),
       )
     );

@@ -42,10 +42,10 @@ export function emptyBin() {
   return state("trash", t("empty.bin"), t("empty.bin.hint"));
 }
 
-export function nothingFound(text, clear) {
-  return state("search", text === "" ? t("empty.kind") : t("empty.filter", { text }), t("empty.filter.hint"), [
-    { label: t("filter.clear"), run: clear },
-  ]);
+export function nothingFound(text, clear, searchBelow) {
+  const actions = [{ label: t("filter.clear"), run: clear }];
+  if (searchBelow) actions.push({ label: t("filter.below"), run: searchBelow });
+  return state("search", text === "" ? t("empty.kind") : t("empty.filter", { text }), t("empty.filter.hint"), actions);
 }
 
 export function nothingMatches(refine) {
@@ -65,7 +65,8 @@ export function noShares() {
 export function failedState(failure, path, { retry, back, why }) {
   const said = describe(failure, path);
   const icons = { 407: "lock", 408: "search", 410: "offline" };
-  const actions = [{ label: t("state.retry"), run: retry }];
+  const out = failure.key === "page:logged_out";
+  const actions = [out ? { label: t("state.login"), run: () => location.reload() } : { label: t("state.retry"), run: retry }];
   if (back) actions.unshift({ label: t("state.back"), run: back });
   if (said.why && why) actions.push({ label: t("why.ask"), run: why });
   return state(icons[failure.code] ?? "warning", said.title, said.hint, actions, true);
@@ -76,6 +77,8 @@ export function staleNotice(failure, retry) {
   return [
     icon("offline", "icon small"),
     h("span.grow", {}, t("stale.text", { what: describe(failure).title })),
-    h("button.button", { type: "button", onclick: retry }, t("state.retry")),
+    failure.key === "page:logged_out"
+      ? h("button.button", { type: "button", onclick: () => location.reload() }, t("state.login"))
+      : h("button.button", { type: "button", onclick: retry }, t("state.retry")),
   ];
 }

@@ -2,7 +2,7 @@
 
 import { browser, setKind } from "./browser.js";
 import { heldItems } from "./clipboard.js";
-import { command, context, runCommand, shortcutText } from "./commands.js";
+import { command, context, keysOf, runCommand, shortcutText } from "./commands.js";
 import { $, h, icon, iconButton, keepFocus } from "./dom.js";
 import { emit, on } from "./events.js";
 import { openMenu } from "./menu.js";
@@ -37,6 +37,11 @@ export function setupToolbar(setSort) {
   for (const name of ["shown", "selection", "listing", "shares", "access"]) on(name, paint);
 }
 
+function shortcutOf(found) {
+  const [keys] = keysOf(found);
+  return keys && shortcutText(keys);
+}
+
 function menuItem(id) {
   const found = command(id);
   if (!found?.when(context())) return null;
@@ -45,7 +50,7 @@ function menuItem(id) {
     icon: found.icon,
     danger: found.danger,
     run: () => runCommand(id),
-    shortcut: found.keys[0] && shortcutText(found.keys[0]),
+    shortcut: shortcutOf(found),
   };
 }
 
@@ -76,10 +81,10 @@ export function contextItems() {
 function button(id, className = "") {
   const found = command(id);
   if (!found?.when(context())) return null;
-  const keys = found.keys[0] ? ` (${shortcutText(found.keys[0])})` : "";
+  const keys = shortcutOf(found);
   return h(
     `button.button${className}`,
-    { type: "button", "data-command": id, title: t(`command.${id}`) + keys, onclick: () => runCommand(id) },
+    { type: "button", "data-command": id, title: t(`command.${id}`) + (keys ? ` (${keys})` : ""), onclick: () => runCommand(id) },
     icon(found.icon),
     h("span", {}, t(`command.${id}`)),
   );

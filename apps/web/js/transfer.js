@@ -208,6 +208,7 @@ addCommand({
   id: "delete",
   icon: "trash",
   keys: ["Delete"],
+  macKeys: ["Mod+Backspace"],
   group: "change",
   danger: true,
   when: ({ canChange }) => canChange,
