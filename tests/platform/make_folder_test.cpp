@@ -1,6 +1,13 @@
 // Folders made with their parents.
+//   ORVEL_TEST_STORM_SECONDS: how long homes are made by many at once; without it a hundred are.
+#include <sys/wait.h>
+
+#include <chrono>
+
+#include "support/refuse_calls.h"
 #include "support/testing.h"
 #include "vexo/filesystem.h"
+#include "vexo/user.h"
 
 namespace {
 
@@ -65,6 +72,107 @@ TEST_F(MakeFolderTest, RefusalsTellWhereTheyStopped) {
     EXPECT_TRUE(fs::is_empty(root_ + "/elsewhere"));
     EXPECT_EQ(make("/link/new", kKeepUser, 0755, 0), 0) << "an existing link to a folder counts as that folder";
     EXPECT_TRUE(fs::is_directory(root_ + "/elsewhere/new"));
+}
+
+// What the file manager shows of a folder.
+std::vector<std::string> shownIn(const std::string& folder) {
+    std::vector<std::string> names;
+    for (const auto& entry : fs::directory_iterator(folder)) {
+        const std::string name = entry.path().filename();
+        if (VEXOEAIsHiddenFile(name.c_str()) == 0) names.push_back(name);
+    }
+    return names;
+}
+
+// What a first request does: the home as root, then everything else as its user. 0, or at which step it was refused.
+int useHome(const std::string& home) {
+    if (VEXOFSMkdirP(home.c_str(), nullptr, 1, kAliceUid, kUsersGid, 0755) != 0) return 1;
+    if (setegid(kUsersGid) != 0 || seteuid(kAliceUid) != 0) return 2;
+    const std::string file = home + "/" + std::to_string(getpid());
+    return close(open(file.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600)) == 0 ? 0 : 3;
+}
+
+TEST_F(MakeFolderTest, FirstRequestsAtOnceAllFindTheirHome) {
+    SKIP_WITHOUT_ROOT();
+    const std::string homes = shareRoot("homes");
+    const char* wanted = getenv("ORVEL_TEST_STORM_SECONDS");
+    const auto end = std::chrono::steady_clock::now() + std::chrono::seconds(wanted == nullptr ? 0 : atoi(wanted));
+    int made = 0, refused = 0;
+    for (; made < 100 || std::chrono::steady_clock::now() < end; ++made) {
+        const std::string home = homes + "/home" + std::to_string(made);
+        int gate[2];
+        ASSERT_EQ(pipe2(gate, O_CLOEXEC), 0);
+        for (int i = 0; i < 8; ++i) {
+            if (fork() != 0) continue;
+            char nothing = 0;
+            close(gate[1]);
+            _exit(read(gate[0], &nothing, 1) == 0 ? useHome(home) : 4);
+        }
+        close(gate[0]);
+        close(gate[1]);
+        for (int i = 0, status = 0; i < 8; ++i) refused += wait(&status) > 0 && status == 0 ? 0 : 1;
+        if (made % 100 != 99) continue;
+        EXPECT_EQ(shownIn(homes).size(), 100U);
+        for (const auto& entry : fs::directory_iterator(homes)) fs::remove_all(entry.path());
+    }
+    EXPECT_EQ(refused, 0);
+    printf("%d homes, %d requests, %d refused\n", made, made * 8, refused);
+}
+
+// Whenever a process is killed: nobody sees what it left, and the next one ends its work.
+TEST_F(MakeFolderTest, WhatAKilledProcessLeftIsEndedByTheNext) {
+    SKIP_WITHOUT_ROOT();
+    const std::string homes = shareRoot("homes"), home = homes + "/@CORP/eve";
+    for (const long call : {SYS_flock, SYS_newfstatat, SYS_getdents64, SYS_fchown, SYS_fchmod, SYS_renameat2}) {
+        SCOPED_TRACE(call);
+        fs::remove_all(homes + "/@CORP");
+        makeFolder(homes + "/@CORP");
+        const pid_t child = fork();
+        if (child == 0) _exit(refuseCalls({{call, kKilled}}) ? useHome(home) : 5);
+        int status = 0;
+        ASSERT_EQ(waitpid(child, &status, 0), child);
+        EXPECT_TRUE(WIFSIGNALED(status)) << "went on with " << status;
+        EXPECT_TRUE(shownIn(homes + "/@CORP").empty());
+        EXPECT_EQ(inChild([&] { return useHome(home); }), 0);
+        EXPECT_EQ(std::distance(fs::directory_iterator(homes + "/@CORP"), {}), 1) << "and nothing else is left";
+    }
+    // An old kernel or a foreign file system.
+    EXPECT_EQ(inChild([&] { return refuseCalls({{SYS_renameat2, EINVAL}}) ? useHome(homes + "/@CORP/old") : 5; }), 0);
+}
+
+// Whoever owns the folder of a domain owns every home in it.
+TEST_F(MakeFolderTest, FoldersAboveHomesAreTheSystems) {
+    SKIP_WITHOUT_ROOT();
+    const std::string homes = shareRoot("homes"), domain = homes + "/@CORP";
+    fs::remove_all(homes);
+    const auto makeHome = [](const std::string& home, uid_t uid) {
+        EXPECT_EQ(VEXOFSMkdirP(home.c_str(), nullptr, 1, uid, kUsersGid, 0755), 0);
+        EXPECT_EQ(statusOf(home).st_uid, uid);
+    };
+    makeHome(domain + "/eve", kAliceUid);
+    makeHome(homes + "/@", kBobUid);  // a home, whatever its name
+    makeHome(domain + "/eve/sub/deeper", kAliceUid);
+    EXPECT_EQ(statusOf(domain + "/eve/sub").st_uid, uid_t{kAliceUid});
+    for (const std::string& folder : {homes, domain}) {
+        EXPECT_EQ(statusOf(folder).st_uid, 0U) << folder;
+        EXPECT_EQ(statusOf(folder).st_mode & 07777, 0755U) << folder;
+    }
+    // One that was its first user's is taken back from that user, not from anybody else; a link leads to no domain.
+    for (const auto& [asks, owner] : Rows<uid_t, uid_t>{{kBobUid, kAliceUid}, {kAliceUid, 0}}) {
+        ASSERT_EQ(chown(domain.c_str(), kAliceUid, kUsersGid), 0);
+        makeHome(domain + "/" + std::to_string(asks), asks);
+        EXPECT_EQ(statusOf(domain).st_uid, owner);
+    }
+    makeFolder(root_ + "/elsewhere");
+    ASSERT_EQ(chown((root_ + "/elsewhere").c_str(), kAliceUid, kUsersGid), 0);
+    fs::create_symlink(root_ + "/elsewhere", homes + "/@LINK");
+    makeHome(homes + "/@LINK/eve", kAliceUid);
+    EXPECT_EQ(statusOf(root_ + "/elsewhere").st_uid, uid_t{kAliceUid});
+    // What root keeps closed is nobody's home, under whatever name somebody moved it.
+    const std::string part = homes + "/" VEXO_PART_PREFIX + std::to_string(kAliceUid) + "-closed";
+    writeFile(part + "/secret", "");
+    VEXOFSMkdirP((homes + "/closed").c_str(), nullptr, 1, kAliceUid, kUsersGid, 0755);
+    EXPECT_EQ(statusOf(homes + "/closed").st_uid, 0U);
 }
 
 }  // namespace

@@ -1,4 +1,5 @@
-// A kernel that refuses single system calls: for the ways that a machine at hand would never take.
+// A kernel that refuses single system calls, for the ways that a machine at hand would never take, or that kills the
+// process before one.
 #ifndef ORVEL_TESTS_SUPPORT_REFUSE_CALLS_H
 #define ORVEL_TESTS_SUPPORT_REFUSE_CALLS_H
 
@@ -13,9 +14,11 @@
 
 namespace support {
 
+constexpr int kKilled = 0xFFFF;
+
 struct Refusal {
     long call;              // SYS_...
-    int systemCode;         // errno that it answers
+    int systemCode;         // errno that it answers, or kKilled
     unsigned argument = 0;  // which argument is looked at, and
     uint32_t anyOf = 0;     // which of its bits make the call refused; 0: every call is
 };
@@ -34,8 +37,9 @@ inline bool refuseCalls(const std::vector<Refusal>& refusals) {
             program.push_back(load(offsetof(seccomp_data, args) + refusal.argument * sizeof(uint64_t)));
             program.push_back(BPF_JUMP(BPF_JMP | BPF_JSET | BPF_K, refusal.anyOf, 0, 1));
         }
-        program.push_back(
-            BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ERRNO | (static_cast<uint32_t>(refusal.systemCode) & 0xFFFF)));
+        const uint32_t answer = SECCOMP_RET_ERRNO | (static_cast<uint32_t>(refusal.systemCode) & 0xFFFF);
+        const bool isKilled = refusal.systemCode == kKilled;
+        program.push_back(BPF_STMT(BPF_RET | BPF_K, isKilled ? uint32_t{SECCOMP_RET_KILL_PROCESS} : answer));
     }
     program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW));
     const sock_fprog filter{static_cast<unsigned short>(program.size()), program.data()};

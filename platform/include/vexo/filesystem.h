@@ -38,9 +38,14 @@ VEXO_API int VEXOGetFSType(const char* path, int flags);
 // when there is none. Reads the table alone, never the file system: the server behind a mount may be dead.
 VEXO_API int VEXOFSIsInMountTable(const char* path);
 VEXO_API int VEXOFSIsImageFS(int type);  // 1 for types 4 and 5, else 0
+// 1 when a network mount lies somewhere below the folder, else 0. By the mount table alone, too.
+VEXO_API int VEXOFSHasRemoteBelow(const char* path);
 
-// Names that the file manager never shows. Dir: "@vexoea", the folder of extended attributes. File: that, ".", ".." and
-// "@tmp". Exactly 1 or 0.
+// What a file or folder is called until it is whole: this and anything behind it.
+#define VEXO_PART_PREFIX ".vexo-part-"
+
+// Names that the file manager never shows. Dir: "@vexoea", the folder of extended attributes. File: that, ".", "..",
+// "@tmp" and what begins with VEXO_PART_PREFIX. Exactly 1 or 0.
 VEXO_API int VEXOEAIsHiddenDir(const char* name);
 VEXO_API int VEXOEAIsHiddenFile(const char* name);
 
@@ -48,8 +53,10 @@ VEXO_API int VEXOEAIsHiddenFile(const char* name);
 VEXO_API int VolumePathParse(const char* path, VOLUMEPATHINFO* info);
 
 // Creates `path` and, when `recursive`, its missing parents, mode and owner set on the folders that it made alone (an
-// owner of -1 keeps the caller). No symbolic link is followed on the part that it makes. 0 (also when the folder
-// exists); <0 with errno and the slot, and in `*stopAt` (may be null) the component where it stopped, inside `path`.
+// owner of -1 keeps the caller), each before it bears its name. Folders above the users' homes, the root of the share
+// "homes" and "@DOMAIN" in it, stay the caller's instead, 0755; an "@DOMAIN" that belongs to `uid` is given back to
+// root. No symbolic link is followed on the part that it makes. 0 (even if the folder exists); <0 with errno and the
+// slot, and in `*stopAt` (may be null) the component where it stopped, inside `path`.
 VEXO_API int VEXOFSMkdirP(const char* path, const char** stopAt, int recursive, uid_t uid, gid_t gid, mode_t mode);
 
 VEXO_END_C

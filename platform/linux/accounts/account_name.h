@@ -20,13 +20,14 @@ inline AccountName splitAccountName(const std::string& name) {
     return {name.find('@') != std::string::npos ? AUTH_DIRECTORY : AUTH_LOCAL, {}, name};
 }
 
-// False for what can be no account here: names become components of paths (the home folder).
+// False for what can be no account here: names become components of paths (the home folder), and "@DOMAIN" is the
+// folder of a domain.
 inline bool isAccountName(const std::string& name) {
     const AccountName parts = splitAccountName(name);
     const auto isComponent = [](const std::string& part) {
         return !part.empty() && part != "." && part != ".." && part.find('/') == std::string::npos;
     };
-    return isComponent(parts.name) && (parts.type != AUTH_DOMAIN || isComponent(parts.domain));
+    return isComponent(parts.name) && (parts.type == AUTH_DOMAIN ? isComponent(parts.domain) : !name.starts_with('@'));
 }
 
 }  // namespace vexo

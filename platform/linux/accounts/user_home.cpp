@@ -49,6 +49,15 @@ std::string homeOf(const std::string& user) {
     return root + (name.type == AUTH_DOMAIN ? "/@" + name.domain : "") + '/' + name.name;
 }
 
+bool isAboveHomes(std::string_view folder) {
+    const KeepErrno keep;
+    const std::string root = rootOfHomes();
+    if (root.empty()) return false;
+    const bool isDomain =
+        folder.starts_with(root + "/@") && folder.find('/', root.size() + 1) == std::string_view::npos;
+    return isDomain || (root + '/').starts_with(std::string(folder) + '/');
+}
+
 }  // namespace vexo
 
 int VEXOServiceUserHomeIsEnabled(int authType, uid_t uid) try {

@@ -1,6 +1,8 @@
 // File-system types by number, and what the mount table says about a path.
+#include <algorithm>
 #include <cerrno>
 #include <exception>
+#include <string>
 
 #include "failure.h"
 #include "fault_gate.h"
@@ -40,6 +42,23 @@ int VEXOFSIsInMountTable(const char* path) try {
     return static_cast<int>(mount - table->data());
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL);
+}
+
+int VEXOFSHasRemoteBelow(const char* path) try {
+    VEXO_GATE("VEXOFSHasRemoteBelow", 0);
+    if (path == nullptr || *path != '/') return 0;
+    const vexo::KeepErrno keep;
+    const vexo::MountTable* table = vexo::mountTable();
+    if (table == nullptr) return 0;
+    std::string below = path;
+    while (below.ends_with('/')) below.pop_back();
+    below += '/';
+    return std::any_of(table->begin(), table->end(), [&](const vexo::Mount& mount) {
+        return VEXOFSIsRemoteFS(mount.type) == 1 && mount.folder.starts_with(below);
+    });
+} catch (const std::exception&) {
+    vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+    return 0;
 }
 
 int VEXOFSIsRemoteFS() {

@@ -9,7 +9,7 @@ int VEXOEAIsHiddenDir(const char* name) {
 
 int VEXOEAIsHiddenFile(const char* name) {
     if (name == nullptr) return 0;
-    if (name[0] == '.') return name[1] == '\0' || (name[1] == '.' && name[2] == '\0') ? 1 : 0;
-    if (name[0] != '@') return 0;
+    if (strcmp(name, ".") == 0 || strcmp(name, "..") == 0) return 1;
+    if (strncmp(name, VEXO_PART_PREFIX, strlen(VEXO_PART_PREFIX)) == 0) return 1;
     return VEXOEAIsHiddenDir(name) == 1 || strcmp(name, "@tmp") == 0 ? 1 : 0;
 }
