@@ -103,8 +103,8 @@ int actAs(const char* sid, const std::string& user, bool needsHome) {
     if (needsHome) makeHome(user);
     OrvLibSetErr(ORV_ERR_NONE);
     if (OrvLibUGIDSet(sid, user.c_str()) != 0) return lastCode();
-    // A switch that the kernel refused reports success, too. Root's rights are an administrator's alone.
-    return geteuid() != 0 || VEXOGroupIsAdminGroupMem(user.c_str()) == 1 ? ORV_ERR_NONE : ORV_ERR_GENERAL;
+    // A switch that the kernel refused, or refused in part, reports success, too.
+    return VEXOUserOwnsProcess(user.c_str()) == 1 ? ORV_ERR_NONE : ORV_ERR_GENERAL;
 }
 
 std::optional<unsigned long> parseNumber(std::string_view text) {

@@ -41,7 +41,7 @@ bool begin(Output& out, User& user);
 
 // Takes on the user's identity for the rest of the process; `sid` may be null. His home folder is made first when
 // `needsHome`, as the folder that holds all homes is not his to write in. 0, or the library code of the failure; a
-// process that is still root's although the user is no administrator is one, 401.
+// process that is still root's, or kept a group of root's, although the user is no administrator is one, 401.
 int actAs(const char* sid, const std::string& user, bool needsHome);
 
 // A parameter that is a number: `fallback` when absent, nothing when it is anything but decimal digits that fit.

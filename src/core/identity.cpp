@@ -81,9 +81,9 @@ int setUserAndGroups(const char* sid, const char* user) {
                printable(sid).c_str());
         return -1;
     }
-    if (stillRoot(user)) {
-        syslog(LOG_ERR, "%s:%d The switch to user=%s left the process at uid 0", kSource, __LINE__,
-               printable(user).c_str());
+    if (!actsAs(user)) {
+        syslog(LOG_ERR, "%s:%d The switch to user=%s left the process at uid %u, gid %u", kSource, __LINE__,
+               printable(user).c_str(), static_cast<unsigned>(geteuid()), static_cast<unsigned>(getegid()));
     }
     return 0;
 }
@@ -160,8 +160,8 @@ int handOver(const char* file, const char* user) {
 
 }  // namespace
 
-bool stillRoot(const char* user) {
-    return geteuid() == 0 && VEXOGroupIsAdminGroupMem(user) != 1;
+bool actsAs(const char* user) {
+    return VEXOUserOwnsProcess(user) == 1;
 }
 
 }  // namespace orvel

@@ -4,9 +4,9 @@
 
 namespace orvel {
 
-// True when the process acts as root for a user who is no administrator: a switch that reported success, since it does
-// not check, but changed nothing.
-[[nodiscard]] bool stillRoot(const char* user);
+// False when a switch that reported success, since it does not check, left the process something of root's although the
+// user is no administrator.
+[[nodiscard]] bool actsAs(const char* user);
 
 }  // namespace orvel
 

@@ -36,8 +36,9 @@ int checkFile(const std::string& path, const char* user, const char* sid, _tag__
         syslog(LOG_ERR, "%s:%d No upload privilege to path %s", kSource, __LINE__, printable(path).c_str());
         return OrvLibGetErr();
     }
-    // A switch that the kernel refused counts as failed as well. Kept: 401 is answered here, not stored.
-    if (OrvLibUGIDSet(sid, user) != 0 || stillRoot(user)) {
+    // A switch that the kernel refused, or refused in part, counts as failed as well. Kept: 401 is answered here, not
+    // stored.
+    if (OrvLibUGIDSet(sid, user) != 0 || !actsAs(user)) {
         syslog(LOG_ERR, "%s:%d Failed to set UGID for user=%s, sid=%s", kSource, __LINE__, printable(user).c_str(),
                printable(sid).c_str());
         return ORV_ERR_GENERAL;

@@ -1,10 +1,14 @@
 #include "request.h"
 
+#include <grp.h>
+#include <sys/syscall.h>
+
 #include <optional>
 #include <string>
 #include <vector>
 
 #include "client_address.h"
+#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 using namespace orvel::cgi;
@@ -46,6 +50,32 @@ TEST(ClientAddress, IsWhatTheLastTrustedProxySaw) {
                                         {"", "10.0.0.9"}}) {
         EXPECT_EQ(clientBehind(forwarded, "10.0.0.9", proxies), client) << forwarded;
     }
+}
+
+class ActAs : public ApplianceTest {};
+
+TEST_F(ActAs, NothingOfRootsIsLeft) {
+    SKIP_WITHOUT_ROOT();
+    constexpr int kAsUser = 0, kRefused = 1;
+    for (const auto& [user, refused, outcome] : Rows<const char*, std::vector<Refusal>, int>{
+             {"alice", {}, kAsUser},
+             {"carol", {}, kAsUser},  // an administrator stays root
+             {"alice", {{SYS_setresuid, EPERM}}, kRefused},
+             {"alice", {{SYS_setresgid, EPERM}}, kRefused},
+             {"alice", {{SYS_setgroups, EPERM}}, kRefused},
+             {"alice", {{SYS_setgroups, EPERM}, {SYS_setresgid, EPERM}}, kRefused}}) {
+        SCOPED_TRACE(user);
+        EXPECT_EQ(inChild([&, user = user, refused = refused] {
+                      const gid_t roots[] = {0, 4};
+                      if (setgroups(2, roots) != 0 || (!refused.empty() && !refuseCalls(refused))) return 9;
+                      const int code = actAs(nullptr, user, false);
+                      EXPECT_EQ(takeLog().empty(), code == 0);
+                      return code == 0 ? kAsUser : kRefused;
+                  }),
+                  outcome);
+    }
+    const auto asBob = [] { return actAs(nullptr, "alice", false) == 0 ? 0 : 1; };
+    EXPECT_EQ(asUser(kBobUid, kUsersGid, asBob), 0) << "a process that never was root goes on as itself";
 }
 
 class ForwardedFor : public ApplianceTest {};

@@ -77,6 +77,10 @@ VEXO_API int VLIBUserPrivilegeHas(const char* user, const char* appId);
 // source of users. 0, or -1 with errno (EPERM without the right to).
 VEXO_API int VEXOUserInitGroups(const char* user, gid_t gid);
 
+// Whether this process acts as `user` and as nobody else: its effective ids and all of its groups are that user's, or
+// it is an administrator's and root's. One that never was root is taken as it is. 1, 0, or -1 when that cannot be told.
+VEXO_API int VEXOUserOwnsProcess(const char* user);
+
 // A character for the salt of crypt(3), by a secret of the process, for any number: a letter, a digit or ".", never
 // "/", which some readers of the result take for a path.
 VEXO_API char VEXOUserRandomNumMap2Seed(long number);

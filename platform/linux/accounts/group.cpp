@@ -1,5 +1,6 @@
 // Records of groups, and the groups of users.
 #include <grp.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -39,6 +40,30 @@ int findGroups(const char* user, std::vector<gid_t>& gids) {
     const vexo::Lookup answer = accounts.user(user, account);
     if (answer != vexo::Lookup::found) return failLookup(answer);
     return accounts.groupsOf(user, account.gid, gids) ? 0 : vexo::fail(VEXO_ERR_GENERAL);
+}
+
+// Whether the process has groups that are not among these. False with errno when the kernel does not say.
+bool hasOtherGroups(const std::vector<gid_t>& own, bool& others) {
+    std::vector<gid_t> held(static_cast<size_t>(std::max(getgroups(0, nullptr), 0)));
+    const int count = getgroups(static_cast<int>(held.size()), held.data());
+    if (count < 0) return false;
+    held.resize(static_cast<size_t>(count));
+    held.push_back(getegid());
+    others = std::any_of(held.begin(), held.end(),
+                         [&](gid_t gid) { return std::find(own.begin(), own.end(), gid) == own.end(); });
+    return true;
+}
+
+int ownsProcess(const char* user, uid_t effective) {
+    vexo::Account account;
+    const vexo::Lookup answer = vexo::AccountSource::instance().user(user, account);
+    if (answer != vexo::Lookup::found) return failLookup(answer);
+    if (account.uid != effective || account.gid != getegid()) return 0;
+    std::vector<gid_t> own;
+    bool others = true;
+    if (!vexo::AccountSource::instance().groupsOf(user, account.gid, own)) return vexo::fail(VEXO_ERR_GENERAL);
+    if (!hasOtherGroups(own, others)) return vexo::fail(VEXO_ERR_GENERAL);
+    return others ? 0 : 1;
 }
 
 int isAdministrator(const char* user) {
@@ -142,6 +167,19 @@ int VEXOGroupIsAdminGroupMemEx(const char* user, int flags) try {
     VEXO_GATE("VEXOGroupIsAdminGroupMemEx", -1);
     static_cast<void>(flags);
     return isAdministrator(user);
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int VEXOUserOwnsProcess(const char* user) try {
+    VEXO_GATE("VEXOUserOwnsProcess", -1);
+    if (user == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    uid_t real = 0;
+    uid_t effective = 0;
+    uid_t saved = 0;
+    if (getresuid(&real, &effective, &saved) != 0) return vexo::fail(VEXO_ERR_GENERAL);
+    if (effective == 0) return isAdministrator(user);
+    return saved != 0 ? 1 : ownsProcess(user, effective);
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

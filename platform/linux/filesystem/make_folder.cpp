@@ -12,6 +12,7 @@
 #include <string_view>
 
 #include "accounts/user_home.h"
+#include "base/owner.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "filesystem/owner.h"
@@ -33,12 +34,8 @@ constexpr mode_t kSystemMode = 0755;
 constexpr uid_t kKeep = static_cast<uid_t>(-1);
 constexpr int kAttempts = 100;
 
-struct CloseFolder {
-    void operator()(DIR* folder) const { closedir(folder); }
-};
-
 bool isEmpty(int fd) {
-    const std::unique_ptr<DIR, CloseFolder> folder(
+    const std::unique_ptr<DIR, orvel::Releaser<closedir>> folder(
         fdopendir(vexo::openFile(fd, ".", O_RDONLY | O_DIRECTORY).release()));
     if (folder == nullptr) return false;
     int entries = 0;
