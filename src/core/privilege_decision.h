@@ -11,6 +11,7 @@ struct ListMembership {
     bool noAccess = false;
     bool readWrite = false;
     bool readOnly = false;
+    bool failed = false;  // a list could not be asked: it counts as naming the user where that denies, else as not
 };
 
 // No access wins over read-write, read-write over read-only.

@@ -29,10 +29,19 @@ constexpr int kServerNotReached = -2;
     return true;
 }
 
-// Membership that could not be looked up (the platform's slot tells) counts in the list that denies, and in no other.
-[[nodiscard]] bool isDenied(const char* user, PVLIBCSZLIST list) {
+// Whether the list names the user. The platform's slot alone says when that could not be looked up; what it held
+// before stays unless that happens.
+[[nodiscard]] bool isListed(const char* user, PVLIBCSZLIST list, bool& failed) {
+    const int code = VLIBCErrGet(), line = VLIBCErrorGetLine();
+    const char* const file = VLIBCErrorGetFile();
     VLIBCErrSetEx(0, kSource, __LINE__);
-    return BlSDKUserIsInList(user, list) != 0 || VLIBCErrGet() != 0;
+    const bool listed = BlSDKUserIsInList(user, list) != 0;
+    if (VLIBCErrGet() != 0) {
+        failed = true;
+    } else {
+        VLIBCErrSetEx(code, file, line);
+    }
+    return listed;
 }
 
 }  // namespace
@@ -40,9 +49,9 @@ constexpr int kServerNotReached = -2;
 ListMembership listsOf(const char* user, const VEXOSHARE& share, AskLists extent) {
     const bool all = extent == AskLists::kAll;
     ListMembership lists;
-    lists.noAccess = isDenied(user, share.naList);
-    if (all || !lists.noAccess) lists.readWrite = BlSDKUserIsInList(user, share.rwList) != 0;
-    if (all || !(lists.noAccess || lists.readWrite)) lists.readOnly = BlSDKUserIsInList(user, share.roList) != 0;
+    lists.noAccess = isListed(user, share.naList, lists.failed) || lists.failed;
+    if (all || !lists.noAccess) lists.readWrite = isListed(user, share.rwList, lists.failed);
+    if (all || !(lists.noAccess || lists.readWrite)) lists.readOnly = isListed(user, share.roList, lists.failed);
     return lists;
 }
 

@@ -17,20 +17,22 @@ constexpr const char* kSource = "orveldir";
 constexpr int kListSize = 1024;
 constexpr int kSortAscending = 16;
 
-bool offers(const VEXOSHARE& share, const char* user, bool writableOnly) {
-    if ((share.fStatus & VEXO_SHARE_HIDDEN) != 0) return false;
-    const PrivilegeRule rule = ruleOf(listsOf(user, share, AskLists::kUntilDecided));
+bool offers(PrivilegeRule rule, bool writableOnly) {
     return rule == PrivilegeRule::kReadWrite || (rule == PrivilegeRule::kReadOnly && !writableOnly);
 }
 
-// False when memory is out.
+// False when not every share could be asked about: a shorter list would look like the whole one.
 [[nodiscard]] bool collect(PVEXOSHAREDB database, const char* user, bool writableOnly, StringList& names) {
     ShareRecord share;
-    while (VEXOShareDBCursorGet(database, lend(share)) == 0) {
-        if (!offers(*share, user, writableOnly)) continue;
+    int delivered = 0;
+    while ((delivered = VEXOShareDBCursorGet(database, lend(share))) == 0) {
+        if ((share->fStatus & VEXO_SHARE_HIDDEN) != 0) continue;
+        const ListMembership lists = listsOf(user, *share, AskLists::kUntilDecided);
+        if (lists.failed) return false;
+        if (!offers(ruleOf(lists), writableOnly)) continue;
         if (VLIBCSzListPush(lend(names), share->szName) < 0) return false;
     }
-    return true;
+    return delivered > 0;
 }
 
 // Null on failure.

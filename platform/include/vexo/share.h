@@ -33,7 +33,8 @@ VEXO_API int VEXOShareGet(const char* name, PVEXOSHARE* out);
 VEXO_API void VEXOShareFree(PVEXOSHARE share);  // null is accepted
 
 // Every share in the order of the definitions. Open: null with the slot set on failure. CursorGet: 0 while it delivers
-// a record into `*share` (allocated at the first call and reused; the caller frees the last), nonzero at the end.
+// a record into `*share` (allocated at the first call and reused; the caller frees the last), >0 at the end, <0 with
+// the slot set on failure.
 VEXO_API PVEXOSHAREDB VEXOShareDBOpen(void);
 VEXO_API int VEXOShareDBCursorGet(PVEXOSHAREDB db, PVEXOSHARE* share);
 VEXO_API void VEXOShareDBClose(PVEXOSHAREDB db);
