@@ -24,13 +24,12 @@ void pause() {
 }
 
 bool save(KTR::Task& task, const Json::Value& data, float progress) {
-    // Outside an update each property would be written by itself.
-    const bool open = task.beginUpdate();
-    if (open) {
-        task.setProperty("progress", Json::Value(static_cast<double>(progress)));
-        task.setProperty("data", data);
+    // Where no update can begin there may be one of the caller's, which is not to be ended here.
+    if (task.beginUpdate()) {
+        const bool set = task.setProperty("progress", Json::Value(static_cast<double>(progress))) &&
+                         task.setProperty("data", data);
+        if (task.endUpdate() && set) return true;
     }
-    if (task.endUpdate()) return true;
     syslog(LOG_ERR, "Failed to write progress.");
     return false;
 }

@@ -139,10 +139,15 @@ TEST_F(TaskProgress, PublishingIsOneUpdate) {
         EXPECT_EQ(task->getProperty("data"), data);
     };
     failing(INFINITY);
-    for (const char* operation : {"KTR::Task::beginUpdate", "KTR::Task::endUpdate"}) {
+    for (const char* operation : {"KTR::Task::beginUpdate", "KTR::Task::setProperty", "KTR::Task::endUpdate"}) {
         vexo::gate::fail(operation, VEXO_ERR_GENERAL, EIO, 1);
         failing(1);
     }
+    EXPECT_TRUE(task->beginUpdate());
+    failing(1);
+    EXPECT_TRUE(task->setProperty("more", 2));
+    EXPECT_TRUE(get("x")->getProperty("more").isNull()) << "the caller's own update goes on";
+    EXPECT_TRUE(task->endUpdate());
     EXPECT_TRUE(task->remove());
     support::announceLog("Failed to write progress.");
     EXPECT_FALSE(SaveTaskData(task.get(), data, 1));
