@@ -34,6 +34,8 @@ class LockedFile {
         do {
             file_ = openOnce();
         } while (file_ && !lock());
+        // First of all: the platform changes no file that others than its owner may write.
+        if (file_) static_cast<void>(makeReadable());
     }
     // By name, not by closing alone: a forked child may hold the descriptor too.
     ~LockedFile() {

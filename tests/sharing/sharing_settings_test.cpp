@@ -48,6 +48,15 @@ TEST_F(SharingSettingsTest, ChoicesOfUsers) {
     EXPECT_TRUE(manager.removePrivilege("20002"));
     EXPECT_EQ(readFile(file()), foreign + "\n");
 
+    for (const char* choice : {"true", "false", "true"}) {
+        ASSERT_EQ(chmod(file().c_str(), 0664), 0) << "its group may write it";
+        EXPECT_TRUE(manager.setPrivileges({{"bob", choice}}));
+        EXPECT_EQ(manager.hasPrivilege("bob"), *choice == 't');
+    }
+    ASSERT_EQ(chmod(file().c_str(), 0664), 0);
+    EXPECT_TRUE(manager.removePrivilege("20002"));
+    EXPECT_FALSE(manager.hasPrivilege("bob"));
+
     writeFile(file(), "7=\"true\"\n007=\"false\"\n8=\"false\"\n8=\"true\"\nx=\"true\"\n4294967297=\"true\"\n");
     EXPECT_EQ(manager.getPrivileges(), (std::map<unsigned, bool>{{7, true}, {8, false}, {0, true}, {1, true}}));
     writeFile(file(), "20001=\"truest\"\n");
