@@ -66,11 +66,13 @@ class ORVEL_API OrvSearchCallBack : public OrvDirectoryWalkerCallBack {
                     const std::string& name, _tag_VEXOSTAT_& status, const std::string* extra) override;
     // The platform error of the last record that could not be stored; 0: none was lost.
     [[nodiscard]] int lossReason() const { return lossReason_; }
+    [[nodiscard]] bool hasStored() const { return stored_; }  // a record at least
 
  private:
     FileRecord record_;
     std::string database_;
     int lossReason_ = 0;
+    bool stored_ = false;
 };
 
 // Tests each entry against the criteria and hands what matches on to the result callback. `criteria` must outlive it;
@@ -82,7 +84,9 @@ class ORVEL_API OrvSearchCompWalkerCB : public OrvDirectoryWalkerCallBack {
     ~OrvSearchCompWalkerCB() override;
     bool operator()(const std::string& displayPath, const std::string& context, const std::string& realPath,
                     const std::string& name, _tag_VEXOSTAT_& status, const std::string* extra) override;
-    [[nodiscard]] int lossReason() const { return results_->lossReason(); }  // as of the result callback
+    // As of the result callback.
+    [[nodiscard]] int lossReason() const { return results_->lossReason(); }
+    [[nodiscard]] bool hasStored() const { return results_->hasStored(); }
 
  private:
     std::unique_ptr<OrvSearchCallBack> results_;
@@ -131,11 +135,11 @@ class ORVEL_API OrvSearchWalker {
     // Searches. A folder is walked only if it is still the one that was chosen, opened beneath its share's root;
     // another one in its place, or a way there that leads out of the share meanwhile, makes it missing.
     // `accessTimeCriteria`: those of the criteria that ask for access times, which an index cannot know. True when
-    // everything was searched or the search was cancelled; the results so far stay. Where some could not be stored it
-    // is true as well, with the platform error of the last of them. False with the platform error 0x0D00 (not
-    // initialised, or the index failed), 0x0600 or 0x0300 (a chosen folder is missing or denied; not logged), 0x8100
-    // (another failure of its status), 0x8000 (the walk failed). A chosen path that is no folder is passed over. Side
-    // effect: the current directory.
+    // everything was searched or the search was cancelled; the results so far stay. The platform error is then 0, or
+    // where records could not be stored, for whatever reason, that of the last of them. False with the platform error
+    // 0x0D00 (not initialised, or the index failed), 0x0600 or 0x0300 (a chosen folder is missing or denied; not
+    // logged), 0x8100 (another failure of its status), 0x8000 (the walk failed). A chosen path that is no folder is
+    // passed over. Side effect: the current directory.
     bool Walk(const std::vector<FindATimeComp*>& accessTimeCriteria);
     // Takes the matches of one indexed share from the file index; called by Walk.
     bool WalkDB(const std::string& shareName, const std::vector<PathInfo>& folders,

@@ -7,6 +7,7 @@
 #include "core/owned.h"
 #include "search/share_address.h"
 #include "vexo/filesystem.h"
+#include "vexo/index.h"
 #include "vexo/share.h"
 
 namespace orvel {
@@ -45,6 +46,7 @@ bool isLeftOut(const std::string& shareRoot, std::string_view within) {
 }  // namespace
 
 bool indexHolds(const PathInfo& folder) {
+    if (folder.path.size() >= sizeof __tag_FI_SQL_COND::szValue) return false;  // a condition would cut it
     const std::string_view within = pathWithinShare(folder.path);
     return folder.realPath == below(folder.shareRoot, within) && !isLeftOut(folder.shareRoot, within) &&
            !leadsThroughLinks(folder, within);

@@ -2,6 +2,7 @@
 
 #include <syslog.h>
 
+#include <algorithm>
 #include <string_view>
 
 #include "base/printable.h"
@@ -32,9 +33,10 @@ bool deriveAddress(const std::string& share, const std::string& realPath, Record
         syslog(LOG_ERR, "%s:%d Fail to find the path name %s", kSource, __LINE__, printable(realPath).c_str());
         return false;
     }
-    out.realPath = realPath;
+    const std::size_t end = std::max(realPath.find_last_not_of('/') + 1, begin);
+    out.realPath = realPath.substr(0, end);
     out.shareRoot = realPath.substr(0, begin - 1);
-    out.within = realPath.substr(begin);
+    out.within = out.realPath.substr(begin);
     return true;
 }
 

@@ -16,7 +16,8 @@ struct RecordAddress {
     std::string within;
 };
 
-// False, logged, when the path does not reach into a share, or is longer than a condition can hold.
+// Slashes at its end do not count. False, logged, when the path does not reach into a share, or is longer than a
+// condition can hold.
 [[nodiscard]] bool deriveAddress(const std::string& share, const std::string& realPath, RecordAddress& out);
 
 // The condition "this share and this path", or "... and any path below it". Names are compared as they stand: neither

@@ -52,8 +52,10 @@ bool OrvSearchCallBack::operator()(const std::string& /*displayPath*/, const std
         static const std::string none;
         const PathFault fault = record_.fill(realPath, context, extra == nullptr ? none : *extra, name, status);
         if (!reportFault(fault, realPath)) return true;
-        if (FILEIDXOutputDBInsert(database_.c_str(), &record_.data()) < 0) {
-            lossReason_ = VLIBCErrGet();
+        if (FILEIDXOutputDBInsert(database_.c_str(), &record_.data()) >= 0) {
+            stored_ = true;
+        } else {
+            lossReason_ = VLIBCErrGet() != 0 ? VLIBCErrGet() : static_cast<int>(VEXO_ERR_GENERAL);
             syslog(LOG_ERR, "%s:%d Fail to insert data into DB %s", kSource, __LINE__,
                    orvel::printable(database_).c_str());
         }

@@ -74,7 +74,7 @@ bool OrvSearchDBTask::updatePermRecs(std::string shareName, std::string path, co
     return orvel::guardedQuietly(false, [&] {
         RecordAddress address;
         if (!deriveAddress(shareName, path, address)) return false;
-        const std::string name = lastComponent(path);
+        const std::string name = lastComponent(address.realPath);
         FileRecord record;
         static_cast<void>(record.fill(address.realPath, address.shareRoot, address.share, name, status,
                                       userName == nullptr ? "" : userName, groupName == nullptr ? "" : groupName));
@@ -94,7 +94,7 @@ bool OrvSearchDBTask::insertFile(std::string shareName, std::string path, std::s
         const ResultDatabase database(filePath_);
         bool present = false;
         if (!database.find(address, present)) return false;
-        const std::string name = lastComponent(path);
+        const std::string name = lastComponent(address.realPath);
         FileRecord record;
         static_cast<void>(record.fill(address.realPath, address.shareRoot, address.share, name, status, owner, group));
         return present || database.insert(record.data());
@@ -106,7 +106,7 @@ bool OrvSearchDBTask::updateFile(std::string shareName, std::string path, std::s
     return orvel::guardedQuietly(false, [&] {
         RecordAddress from, to;
         if (!deriveAddress(shareName, path, from) || !deriveAddress(newShareName, newPath, to)) return false;
-        const std::string name = lastComponent(newPath);
+        const std::string name = lastComponent(to.realPath);
         FileRecord record;
         static_cast<void>(record.fill(to.realPath, to.shareRoot, to.share, name, status));
         ColumnValues columns;

@@ -148,10 +148,12 @@ bool OrvSearchWalker::search(const std::vector<FindATimeComp*>& accessTimeCriter
         if (!searchShare(shareName, folders, accessTimeCriteria)) return false;
     }
     // Whoever waits for the end reads them in another process.
-    if (FILEIDXDBFlush(database_.c_str()) < 0) {
+    if (callback_->hasStored() && FILEIDXDBFlush(database_.c_str()) < 0) {
+        const int reason = VLIBCErrGet();
         syslog(LOG_ERR, "%s:%d Fail to insert data into DB %s", kSource, __LINE__, orvel::printable(database_).c_str());
-    } else if (callback_->lossReason() != 0) {
-        // What was met since may have left another error.
+        VLIBCErrSetEx(reason, kSource, __LINE__);
+    } else {
+        // What a walk passed over may have left another error.
         VLIBCErrSetEx(callback_->lossReason(), kSource, __LINE__);
     }
     return true;

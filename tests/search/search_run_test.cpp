@@ -186,11 +186,24 @@ TEST_F(SearchRunTest, LostRecordsAreToldAtTheEnd) {
     inOwnProcess([&] {
         Probe probe([](int) { VLIBCErrSetEx(VEXO_ERR_MISSING, "", 0); });  // as what vanishes during a walk
         OneSearch run("alice", {"/photo"}, probe.alone);
-        vexo::gate::fail("FILEIDXOutputDBInsert", VEXO_ERR_NO_SPACE, ENOSPC, 1);
-        EXPECT_TRUE(run.walker.Walk({}));
-        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_NO_SPACE);
-        EXPECT_EQ(takeLogTexts().size(), 1U);
-        EXPECT_EQ(rowsOf(run.task).size(), 2U);
+        for (const auto& [call, code, left] :
+             Rows<const char*, int, size_t>{{"FILEIDXOutputDBInsert", VEXO_ERR_NO_SPACE, 2},
+                                            {"FILEIDXDBFlush", VEXO_ERR_GENERAL, 3},
+                                            {"", 0, 3}}) {
+            vexo::gate::reset();
+            if (code != 0) vexo::gate::fail(call, code, EIO, 1);
+            EXPECT_TRUE(run.walker.Walk({}));
+            EXPECT_EQ(VLIBCErrGet(), code) << call;
+            EXPECT_EQ(takeLogTexts().size(), code == 0 ? 0U : 1U);
+            EXPECT_EQ(rowsOf(run.task).size(), left);
+        }
+        // Where nothing is found nothing can be lost.
+        FindTypeComp folders(true);
+        OneSearch nothing("alice", {"/photo"}, {&folders});
+        EXPECT_TRUE(nothing.task.remove());
+        EXPECT_TRUE(nothing.walker.Walk({}));
+        EXPECT_EQ(VLIBCErrGet(), 0);
+        EXPECT_TRUE(takeLog().empty());
     });
 }
 

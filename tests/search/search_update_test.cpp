@@ -25,7 +25,7 @@ class SearchUpdateTest : public SearchFixture {
         }
         auto status = recordOf(to);
         EXPECT_TRUE(screen_->updateFile(fromShare, from, toShare, to, status));
-        EXPECT_TRUE(screen_->updateFileInFolder(fromShare, from, toShare, to));
+        EXPECT_TRUE(screen_->updateFileInFolder(fromShare, from + "//", toShare, to + "/"));
         refresh(fromShare, fs::path(from).parent_path());
         refresh(toShare, fs::path(to).parent_path());
     }

@@ -1,4 +1,5 @@
 // Searches by walking and from the index: the same rows.
+#include "search/indexed_folder.h"
 #include "search/search_fixture.h"
 
 using namespace FileSearch;
@@ -98,6 +99,13 @@ TEST_F(SearchWalkerTest, WalkAndIndexAgree) {
         addMount(shareRoot("photo") + "/2012", "nfs");
         EXPECT_EQ(keysOf(search("alice", far)), std::vector<std::string>{"photo/2012/far/later"});
     });
+    PathInfo folder;
+    folder.shareRoot = shareRoot("photo");
+    for (const size_t length : {1000, 4100}) {
+        folder.path = "/photo/" + std::string(length, 'n');
+        folder.realPath = folder.shareRoot + folder.path.substr(6);
+        EXPECT_EQ(orvel::indexHolds(folder), length == 1000) << "a path that a condition would cut is walked";
+    }
 }
 
 TEST_F(SearchWalkerTest, RowsSayWhatTheFilesAre) {

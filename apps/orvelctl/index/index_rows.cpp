@@ -76,7 +76,8 @@ void IndexRows::select(const __tag_FI_SQL_COND& where, const Take& take) {
 
 std::map<std::string, Row> IndexRows::in(const std::string& folder) {
     std::map<std::string, Row> rows;
-    select(condition(FI_COL_PATH, FI_OP_PATH, folder),
+    // The slash: behind a folder named "*" its end would mean "at any depth".
+    select(condition(FI_COL_PATH, FI_OP_PATH, folder + "/"),
            [&](const __tag_FI_FILE_INFO_DATA& record) { rows.emplace(record.szName, rowFrom(record)); });
     return rows;
 }
