@@ -207,6 +207,45 @@ TEST_F(IndexTest, TreesThatSayNothingAreRefused) {
     EXPECT_EQ(countError(db_, wide.data()), 0);
 }
 
+// A pattern is cut as the criterion cuts it where it is one; what filters a page of results is not.
+TEST_F(IndexTest, LongPatternsForNames) {
+    build({{"ab"}, {"x"}});
+    for (const char* name : {"ab", "x"}) ASSERT_EQ(insert(db_, {name}), 0);
+    const Cond ends = node(FI_COL_NAME, FI_OP_WILDCARD, std::string(600, '*') + "x");
+    EXPECT_EQ(searched(&ends), (Addresses{"photo:ab", "photo:x"}));
+    EXPECT_EQ(select(db_, &ends), Addresses{"photo:x"});
+}
+
+// Rows may be older than a move of the share's folder, and change between finding and copying.
+TEST_F(IndexTest, WhatIsCopiedIsTrueNow) {
+    std::vector<Record> records;
+    for (int i = 0; i < 300; ++i) records.push_back({.path = std::to_string(i), .size = 5});
+    build(records);
+    const Cond five = node(FI_COL_SIZE, FI_OP_EQUAL, "5");
+    const std::string index = systemRoot() + "/var/lib/vexo/index/photo.db";
+    int asked = 0;
+    struct Change {
+        const std::string& index;
+        int& asked;
+    } change{index, asked};
+    const auto changeAtFirst = [](const char*, void* arg) -> BOOL {
+        const auto& [file, count] = *static_cast<Change*>(arg);
+        if (count++ == 0) ask(file, "UPDATE record SET size=6 WHERE path='299' OR path='0'");
+        return 1;
+    };
+    ASSERT_EQ(FILEIDXResultGetAndTableGen("photo", nullptr, &five, db_.c_str(), nullptr, nullptr, nullptr,
+                                          changeAtFirst, &change),
+              0);
+    EXPECT_EQ(asked, 299);
+    const Addresses found = select(db_);
+    EXPECT_EQ(found.size(), 299U) << "the first part was read before";
+    EXPECT_EQ(std::count(found.begin(), found.end(), "photo:299"), 0);
+    std::string line;
+    const FIQUERY one = {{}, 0, nullptr, 0, 1};
+    ASSERT_EQ(FILEIDXDBSelect(db_.c_str(), &one, keepLine, &line), 0);
+    EXPECT_EQ(line.substr(0, line.find('|')), shareRoot("photo"));
+}
+
 // What the order of pages is compared with.
 bool comesBefore(const Record& a, const Record& b, int column, bool descending) {
     int difference = a.size < b.size ? -1 : static_cast<int>(a.size > b.size);

@@ -58,8 +58,8 @@ enum __tag_FI_SQL_COND_OP : int {
 // with op 9 on the same V it is widened to any depth below V. Op 8 with a value that ends in "/*" holds at any depth
 // below what stands before it; no other character is a wildcard. In the condition of a path that a search gives (the
 // `paths` of FILEIDXResultGetAndTableGen) the first component is the share's name and is dropped, and a final "/*" is a
-// folder of that name. Op 6, on any text, is the wildcard comparison of names, without case, backslash escapes; of a
-// pattern for names the first 493 bytes count, as in the criterion. Numbers beyond 64 bits count as the largest; the
+// folder of that name. Op 6, on any text, is the wildcard comparison of names, without case, backslash escapes; in the
+// `cond` of a search the first 493 bytes of a pattern for names count, as in the criterion. Numbers beyond 64 bits count as the largest; the
 // id 4294967295 (columns 15 and 16) equals nothing.
 //
 // Evaluation: an or-chain holds when one of its members does; a member holds when its own test does and, where it has
@@ -144,7 +144,8 @@ VEXO_API int FILEIDXCountGet(const char* db, const FIQUERY* query, unsigned long
 VEXO_API int FILEIDXDBSelect(const char* db, const FIQUERY* query, BOOL (*callback)(__tag_FI_FILE_INFO_DATA*, void*),
                              void* arg);
 
-// Copies the records of a share's index that satisfy `paths` and `cond` (null: all) into the result database `out`.
+// Copies the records of a share's index that satisfy `paths` and `cond` (null: all) into the result database `out`,
+// with the root that the share has now.
 // `accessTest` (may be null) tells whether a record's file still satisfies what was asked about its access time, which
 // an index cannot know, and may fill in the record's access time; with it, conditions on column 11 are taken to hold.
 // `folderTest` (may be null) tells whether a record in this folder (path within the share) may be seen. Both are called

@@ -197,10 +197,11 @@ class Reader {
 
     [[nodiscard]] std::optional<Condition> patternTest(const Node& node, const Column& column) const {
         const bool isName = node.type == FI_COL_NAME;
-        const std::string_view text = textOf(node).substr(0, isName ? kNamePatternLimit : std::string_view::npos);
+        const bool isCut = isName && reading_.ofCriteria;
+        const std::string_view text = textOf(node).substr(0, isCut ? kNamePatternLimit : std::string_view::npos);
         const auto pattern = std::make_shared<const orvel::Wildcard>(text, kEscape);
         Condition out{std::string("vexo_match(?,") + column.name + ")", {Value(Pattern(pattern))}, {}, {}};
-        if (isName && reading_.forTrigrams) out.trigrams = trigramsOf(*pattern);
+        if (isName && reading_.ofCriteria) out.trigrams = trigramsOf(*pattern);
         return out;
     }
 

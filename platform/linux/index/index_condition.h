@@ -16,7 +16,7 @@ namespace vexo::fileindex {
 struct Reading {
     bool ofSearch = false;     // paths begin with the share's name, and no "*" in them is a wildcard
     bool accessHolds = false;  // conditions on the access time hold
-    bool forTrigrams = false;  // also find what Condition::trigrams says
+    bool ofCriteria = false;   // patterns for names are cut as the criterion's; Condition::trigrams is wanted
 };
 
 // Records directly in a folder, or at any depth below it.

@@ -14,6 +14,7 @@
 #include "index/index_reading.h"
 #include "index/index_search.h"
 #include "index/index_store.h"
+#include "shares/share_record.h"
 #include "vexo/index.h"
 
 namespace vexo::fileindex {
@@ -37,8 +38,9 @@ bool insertInto(const char* out, const std::vector<__tag_FI_FILE_INFO_DATA>& rec
     return lease && std::all_of(records.begin(), records.end(), [&](const auto& r) { return lease->insert(r); });
 }
 
-bool copy(Database& index, const std::vector<int64_t>& ids, const char* out, const Tests& tests, const int* cancel) {
-    PartReader reader(ids);
+// The share's root is what it is now: the rows may be older than a move of the share's folder.
+bool copy(Database& index, PartReader reader, const char* root, const char* out, const Tests& tests,
+          const int* cancel) {
     while (!reader.atEnd() && !isCancelled(cancel)) {
         std::vector<OwnedRecord> part;
         {
@@ -49,12 +51,18 @@ bool copy(Database& index, const std::vector<int64_t>& ids, const char* out, con
         for (const OwnedRecord& record : part) {
             if (isCancelled(cancel)) break;
             __tag_FI_FILE_INFO_DATA view = record.view();
+            view.szShareRoot = root;
             if (holds(tests, view)) kept.push_back(view);
         }
         if (!kept.empty() && !insertInto(out, kept)) return false;
     }
     const Lease lease(out);
     return lease && lease->commit();
+}
+
+// Both conditions, the shorter one asked first: it spares most records the longer one.
+Condition shorterFirst(Condition a, Condition b) {
+    return a.values.size() <= b.values.size() ? both(std::move(a), std::move(b)) : both(std::move(b), std::move(a));
 }
 
 }  // namespace
@@ -67,16 +75,21 @@ int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_COND* path
     VEXO_GATE("FILEIDXResultGetAndTableGen", -1);
     if (share == nullptr || out == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     auto where = readCondition(paths, {.ofSearch = true});
-    auto what = readCondition(cond, {.accessHolds = accessTest != nullptr, .forTrigrams = true});
+    auto what = readCondition(cond, {.accessHolds = accessTest != nullptr, .ofCriteria = true});
     if (!where || !what) return -1;
+    const vexo::ShareRecord record = vexo::loadShare(share);
+    if (record == nullptr) return -1;
+    const Condition asked = shorterFirst(std::move(*where), std::move(*what));
     std::unique_ptr<Database> index;
     std::vector<int64_t> ids;
+    int64_t version = 0;
     {
         const orvel::RaisedIdentity raised;
         index = openIndex(share);
-        if (index == nullptr || !searchIndex(*index, both(std::move(*where), std::move(*what)), cancel, ids)) return -1;
+        if (index == nullptr || !searchIndex(*index, asked, cancel, ids, version)) return -1;
     }
-    return copy(*index, ids, out, {accessTest, accessArg, folderTest, folderArg}, cancel) ? 0 : -1;
+    const Tests tests = {accessTest, accessArg, folderTest, folderArg};
+    return copy(*index, PartReader(ids, asked, version), record->szPath, out, tests, cancel) ? 0 : -1;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

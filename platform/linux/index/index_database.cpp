@@ -218,4 +218,11 @@ bool Database::readState(State& state) {
     return true;
 }
 
+bool Database::readVersion(int64_t& version) {
+    Statement statement;
+    if (!statement.prepare(db_, "PRAGMA data_version") || statement.step() != Statement::kRow) return false;
+    version = statement.number(0);
+    return true;
+}
+
 }  // namespace vexo::fileindex

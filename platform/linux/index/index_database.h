@@ -65,6 +65,8 @@ class Database {
     [[nodiscard]] bool select(const Condition& condition, std::vector<int64_t>& ids);
     [[nodiscard]] bool count(const Condition& condition, int64_t& count);
     [[nodiscard]] bool readState(State& state);
+    // A number that is another one as soon as somebody else has changed the database.
+    [[nodiscard]] bool readVersion(int64_t& version);
 
  private:
     Database(std::string path, sqlite3* db) : path_(std::move(path)), db_(db) {}

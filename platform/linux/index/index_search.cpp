@@ -104,11 +104,12 @@ bool isCancelled(const int* cancel) {
     return cancel != nullptr && __atomic_load_n(cancel, __ATOMIC_RELAXED) != 0;
 }
 
-bool searchIndex(Database& index, const Condition& condition, const int* cancel, std::vector<int64_t>& ids) {
+bool searchIndex(Database& index, const Condition& condition, const int* cancel, std::vector<int64_t>& ids,
+                 int64_t& version) {
     constexpr int steps = 100000;  // of SQLite's machine, a few milliseconds
     if (!execute(index.handle(), "BEGIN")) return false;
     sqlite3_progress_handler(index.handle(), steps, cancel == nullptr ? nullptr : progress, const_cast<int*>(cancel));
-    const bool found = search(index, condition, cancel, ids);
+    const bool found = search(index, condition, cancel, ids) && index.readVersion(version);
     const KeepErrno keep;
     sqlite3_progress_handler(index.handle(), 0, nullptr, nullptr);
     index.rollBack();
