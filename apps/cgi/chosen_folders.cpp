@@ -9,6 +9,7 @@
 #include "orvel/privilege.h"
 #include "orvel/share_path.h"
 #include "temporary_folder.h"
+#include "vexo/filesystem.h"
 #include "vexo/index.h"
 
 namespace orvel::cgi {
@@ -59,6 +60,20 @@ std::map<std::string, bool> searchedShares(const std::vector<std::string>& folde
         shares[share] = FILEIDXIsIndexEnable(share.c_str()) == 1;
     }
     return shares;
+}
+
+std::vector<std::string> foldersWithoutMounts(const std::string& user, const std::vector<std::string>& folders) {
+    std::vector<std::string> found;
+    const std::map<std::string, bool> shares = searchedShares(folders);
+    for (const std::string& folder : folders) {
+        PathInfo info;
+        if (!PathInfoFactory::create(user.c_str(), folder, info)) continue;
+        const auto share = shares.find(IsDirUserHome(folder, nullptr) ? "homes" : info.shareName);
+        if (share == shares.end() || !share->second) continue;
+        const bool isWalked = VEXOFSIsRemoteFS(VEXOGetFSType(info.realPath.c_str(), 0)) == 1;
+        if (!isWalked && VEXOFSHasRemoteBelow(info.realPath.c_str()) == 1) found.push_back(folder);
+    }
+    return found;
 }
 
 bool anyHome(const std::vector<std::string>& paths) {

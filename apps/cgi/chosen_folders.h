@@ -21,6 +21,10 @@ int chooseFolders(const User& user, const std::vector<std::string>& paths, std::
 // The shares that the folders lie in ("homes" for home folders), and whether the file index answers for them.
 std::map<std::string, bool> searchedShares(const std::vector<std::string>& folders);
 
+// Those of the folders which are answered from an index although network mounts lie below them: no index holds what
+// lies on these.
+std::vector<std::string> foldersWithoutMounts(const std::string& user, const std::vector<std::string>& folders);
+
 // Whether one of the paths lies in the user's home.
 bool anyHome(const std::vector<std::string>& paths);
 

@@ -5,8 +5,11 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <csignal>
 #include <ctime>
+#include <utility>
+#include <vector>
 
 #include "base/descriptor.h"
 #include "orvel/error_state.h"
@@ -14,8 +17,11 @@
 namespace orvel::cgi {
 namespace {
 
+constexpr const char* kAnyTask = "Quorvane_";
 constexpr const char* kPrefix = "Quorvane_Search_";
-constexpr size_t kLongestId = 16;  // two numbers of 32 bits
+constexpr size_t kMostRunning = 32;   // of one user
+constexpr size_t kMostRecords = 200;  // each start reads all of them
+constexpr size_t kLongestId = 16;     // two numbers of 32 bits
 // A minute less than CleanTimeOutTasks keeps their records: without those nobody would find the results any more.
 constexpr unsigned long long kKept = 2ULL * 24 * 60 * 60 - 60;
 constexpr int kPatience = 2000;  // milliseconds
@@ -39,6 +45,18 @@ bool isOld(long long created) {
     const long long now = time(nullptr);
     const auto a = static_cast<unsigned long long>(now), b = static_cast<unsigned long long>(created);
     return (now > created ? a - b : b - a) >= kKept;
+}
+
+// Removes the record and, of a search, its results.
+void removeEnded(const std::string& user, const std::string& name) {
+    const std::string prefix = kPrefix;
+    SearchTask task;
+    if (name.starts_with(prefix) && isTaskId(name.substr(prefix.size()))) {
+        if (findTask(user, name.substr(prefix.size()), task) == ORV_ERR_NONE) removeTask(task);
+        return;
+    }
+    const std::unique_ptr<KTR::Task> record(KTR::TaskMgr(user.c_str()).getTask(name.c_str()));
+    if (record != nullptr) record->remove();
 }
 
 }  // namespace
@@ -83,15 +101,28 @@ bool removeTask(const SearchTask& task) {
     return task.record->remove();
 }
 
-void sweepTasks(const std::string& user) {
+int makeRoomForTask(const std::string& user) {
+    KTR::TaskMgr manager(user.c_str());
     Json::Value names(Json::arrayValue);
-    if (!KTR::TaskMgr(user.c_str()).getAllTaskId(kPrefix, names)) return;
+    if (!manager.getAllTaskId(kAnyTask, names)) return ORV_ERR_NONE;
+    size_t running = 0;
+    std::vector<std::pair<long long, std::string>> ended;  // by the time of their beginning
     for (const Json::Value& name : names) {
-        const std::string id = name.asString().substr(std::string(kPrefix).size());
-        SearchTask task;
-        if (!isTaskId(id) || findTask(user, id, task) != ORV_ERR_NONE) continue;
-        if (task.record->isFinished() && isOld(task.record->getCreateTime())) removeTask(task);
+        const std::unique_ptr<KTR::Task> task(manager.getTask(name.asCString()));
+        if (task == nullptr) continue;
+        if (!task->isFinished()) {
+            ++running;
+        } else if (isOld(task->getCreateTime())) {
+            removeEnded(user, name.asString());
+        } else {
+            ended.emplace_back(task->getCreateTime(), name.asString());
+        }
     }
+    std::sort(ended.begin(), ended.end());
+    const size_t all = ended.size() + running;
+    const size_t tooMany = all < kMostRecords ? 0 : std::min(all - kMostRecords + 1, ended.size());
+    for (size_t i = 0; i < tooMany; ++i) removeEnded(user, ended[i].second);
+    return running < kMostRunning ? ORV_ERR_NONE : ORV_ERR_BUSY;
 }
 
 }  // namespace orvel::cgi

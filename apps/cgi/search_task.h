@@ -12,9 +12,10 @@ namespace orvel::cgi {
 
 // Properties of the record.
 inline constexpr const char* kVolumeProperty = "volume";
-inline constexpr const char* kSharesProperty = "shares";    // {name: "index" or "walk"}
-inline constexpr const char* kStoppedProperty = "stopped";  // true when it was ended before it had seen everything
-inline constexpr const char* kCodeProperty = "code";        // library code of a failure
+inline constexpr const char* kSharesProperty = "shares";     // {name: "index" or "walk"}
+inline constexpr const char* kLeftOutProperty = "left_out";  // [folder]: without what network mounts below it hold
+inline constexpr const char* kStoppedProperty = "stopped";   // true when it was ended before it had seen everything
+inline constexpr const char* kCodeProperty = "code";         // library code of a failure
 
 // An id as the library makes them: it can name nothing but a task.
 bool isTaskId(const std::string& text);
@@ -35,8 +36,9 @@ bool endWork(KTR::Task& record, bool forGood);
 // Removes database and record. False when the record stays.
 bool removeTask(const SearchTask& task);
 
-// Removes the searches of the user that ended and whose beginning lies nearly two days away.
-void sweepTasks(const std::string& user);
+// Before another one is begun: removes what ended and whose beginning lies nearly two days away, of searches and of
+// operations, and of what ended later the oldest, where the user has too many. 0, or 420 when too many are at work.
+int makeRoomForTask(const std::string& user);
 
 }  // namespace orvel::cgi
 

@@ -11,6 +11,7 @@
 #include "found_entry.h"
 #include "orvel/search_walker.h"
 #include "reply.h"
+#include "vexo/error.h"
 
 namespace orvel::ctl {
 namespace {
@@ -86,9 +87,12 @@ void print(const cgi::ListRequest& request, const cgi::Listing& listing, bool js
     if (!out.finish()) throw std::runtime_error("the results cannot be written");
 }
 
-void printWays(const std::vector<std::string>& folders) {
+void printWays(const std::string& user, const std::vector<std::string>& folders) {
     for (const auto& [share, indexed] : cgi::searchedShares(folders)) {
         fprintf(stderr, "%s: %s\n", terminalText(share).c_str(), indexed ? "found in its index" : "walked");
+    }
+    for (const std::string& folder : cgi::foldersWithoutMounts(user, folders)) {
+        fprintf(stderr, "%s: without what lies on network mounts\n", terminalText(folder).c_str());
     }
     if (stopRequested != 0) fprintf(stderr, "stopped early\n");
 }
@@ -99,7 +103,7 @@ int find(const cgi::ListRequest& request, const std::vector<std::string>& folder
     walker.setSearchCurrentDir(flat);
     if (!walker.init(folders, criteria.list())) return cgi::platformCode();
     Results results(walker, request.user);
-    if (!walker.Walk(criteria.accessTimes())) return cgi::platformCode();
+    if (!walker.Walk(criteria.accessTimes()) || VLIBCErrGet() != 0) return cgi::platformCode();  // or some were lost
     cgi::Listing listing;
     const int code = readResults(request, results.task(), listing);
     if (code == 0) print(request, listing, json);
@@ -126,7 +130,7 @@ int search(const std::vector<std::string>& words) {
     if (code == 0) code = cgi::chooseFolders({user, "", ""}, arguments.positions(), folders, culprit);
     if (code == 0) code = find(request, folders, arguments.has("--flat"), arguments.has("--json"), criteria);
     if (code != 0) return refused(culprit, code);
-    printWays(folders);
+    printWays(user, folders);
     return 0;
 }
 

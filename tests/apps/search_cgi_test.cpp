@@ -2,6 +2,7 @@
 //
 // ORVEL_SEARCH_ENTRIES: how many entries the generated tree has, 2,000 without it.
 #include <json/value.h>
+#include <sys/resource.h>
 
 #include <csignal>
 #include <map>
@@ -432,6 +433,57 @@ TEST_F(SearchCgi, SearchesOfTheDayBeforeYesterdayAreSweptAway) {
     EXPECT_EQ(code(list("alice", old)), 408);
     EXPECT_FALSE(fs::exists(database("alice", old)));
     EXPECT_EQ(code(list("alice", recent)), 0);
+
+    // Nor does one user keep any number of them, at work or ended.
+    std::vector<std::unique_ptr<KTR::Task>> others;
+    for (int i = 0; i < 210; ++i) {
+        if (i == 32) {
+            EXPECT_EQ(code(ask("alice", "action=start&path=/photo&name=a")), 420);
+            for (const auto& task : others) EXPECT_TRUE(task->finish());
+        }
+        others.emplace_back(KTR::TaskMgr("alice").createTask(("Quorvane_copy_" + std::to_string(i)).c_str()));
+        EXPECT_TRUE(i < 32 || others.back()->finish());
+    }
+    finished("alice", start("alice", "path=/photo&name=a"));
+    Json::Value names(Json::arrayValue);
+    EXPECT_TRUE(KTR::TaskMgr("alice").getAllTaskId("Quorvane_", names));
+    EXPECT_EQ(names.size(), 200U);
+    EXPECT_EQ(code(list("alice", recent)), 408) << "the oldest";
+    EXPECT_FALSE(fs::exists(database("alice", recent)));
+}
+
+TEST_F(SearchCgi, ASearchThatCouldNotStoreAllHasFailed) {
+    SKIP_WITHOUT_ROOT();
+    generate(shareRoot("photo"), 3000);
+    for (const bool indexed : {false, true}) {
+        if (indexed) addShare("photo", kIndexed);
+        if (indexed) index("build", "photo");
+        inChild([&] {
+            const rlimit small = {500000, 500000};
+            EXPECT_TRUE(signal(SIGXFSZ, SIG_IGN) != SIG_ERR && setrlimit(RLIMIT_FSIZE, &small) == 0);
+            const std::string id = start("carol", "path=/photo&size_greater=-1");
+            const Json::Value data = finished("carol", id).json["data"];
+            EXPECT_TRUE(data["failed"].asBool()) << data.toStyledString().substr(0, 500);
+            EXPECT_LT(data["total"].asInt(), 3000);
+            EXPECT_TRUE(ask("carol", "action=clean&taskid=" + id).json["success"].asBool());
+            return 0;
+        });
+    }
+}
+
+TEST_F(SearchCgi, WhatAnIndexCannotHoldIsSaid) {
+    SKIP_WITHOUT_ROOT();
+    const std::string root = addShare("photo", kIndexed);
+    for (const char* folder : {"/a/nas", "/b"}) makeFolder(root + folder);
+    addMount(root + "/a/nas", "nfs4");
+    index("build", "photo");
+    for (const auto& [folder, said] :
+         Rows<const char*, bool>{{"/photo", true}, {"/photo/a", true}, {"/photo/b", false}, {"/photo/a/nas", false}}) {
+        const Json::Value data =
+            finished("carol", start("carol", std::string("path=") + folder + "&name=x")).json["data"];
+        EXPECT_EQ(data.isMember("left_out"), said) << folder;
+        EXPECT_TRUE(!said || (data["left_out"].size() == 1 && data["left_out"][0] == folder));
+    }
 }
 
 TEST_F(SearchCgi, ADatabaseThatIsNoneIsRefused) {

@@ -1,7 +1,6 @@
 #include "operation/operation.h"
 #include "operation/task_reply.h"
 #include "orvel/error_state.h"
-#include "orvel/task_progress.h"
 #include "search_task.h"
 
 namespace orvel::cgi {
@@ -20,8 +19,7 @@ int clearOne(Operation& operation) {
 
 int clearOperation(Operation& operation) {
     const char* user = operation.user.name.c_str();
-    sweepTasks(user);  // searches, with their results
-    CleanTimeOutTasks(user);
+    static_cast<void>(makeRoomForTask(user));  // old ones go, whatever is asked for
     if (operation.web.HasParam("taskid")) return clearOne(operation);
     std::vector<std::unique_ptr<KTR::Task>> tasks;
     if (!tasksOf(operation, tasks)) return ORV_ERR_GENERAL;

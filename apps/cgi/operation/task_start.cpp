@@ -54,17 +54,17 @@ int runInBackground(void* arg) {
 
 int startTask(Operation& operation, const std::string& action, const std::function<void(Progress&)>& work) {
     const char* user = operation.user.name.c_str();
-    sweepTasks(user);  // searches, with their results
-    CleanTimeOutTasks(user);
+    const int code = makeRoomForTask(user);
+    if (code != ORV_ERR_NONE) return code;
     const std::string id = newTaskId(action);
     KTR::TaskMgr manager(user);
     const std::unique_ptr<KTR::Task> task(id.empty() ? nullptr : manager.createTask(id.c_str()));
     if (task == nullptr) return OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
     Background background = {.task = *task, .action = action, .work = work};
     if (startBackground(runInBackground, &background) < 0) {
-        const int code = OrvParseErrnoToError(errno, nullptr, nullptr);
+        const int reason = OrvParseErrnoToError(errno, nullptr, nullptr);
         task->remove();
-        return code;
+        return reason;
     }
     operation.data["taskid"] = id;
     return WaitForMgrTaskDataReady(&manager, id.c_str(), "data", kPatience) ? ORV_ERR_NONE : ORV_ERR_GENERAL;

@@ -52,6 +52,8 @@ Json::Value stateOf(const KTR::Task& record) {
     }
     const Json::Value shares = record.getProperty(kSharesProperty);
     state["shares"] = shares.isObject() ? shares : Json::Value(Json::objectValue);
+    const Json::Value leftOut = record.getProperty(kLeftOutProperty);
+    if (leftOut.isArray() && !leftOut.empty()) state["left_out"] = leftOut;
     return state;
 }
 

@@ -43,11 +43,9 @@ int run(void* arg) {
     if (!search.record->attach()) return 1;
     search.ready = Descriptor();
     VLIBCErrSetEx(0, __FILE__, __LINE__);
-    int code = search.walker.Walk(search.criteria.accessTimes()) ? ORV_ERR_NONE : platformCode();
-    // Records that could not be stored do not end a walk; only the platform's last error tells of them.
-    const int last = VLIBCErrGet();
-    const bool lost = last == VEXO_ERR_NO_SPACE || last == VEXO_ERR_QUOTA || last == VEXO_ERR_READ_ONLY;
-    if (code == ORV_ERR_NONE && lost) code = platformCode();
+    // Records that could not be stored do not end a walk, but the platform's error says that some are missing.
+    const bool walked = search.walker.Walk(search.criteria.accessTimes());
+    const int code = walked && VLIBCErrGet() == 0 ? ORV_ERR_NONE : platformCode();
 
     KTR::Task& record = *search.record;
     if (!record.beginUpdate()) return 1;
@@ -63,6 +61,12 @@ Json::Value waysOf(const std::vector<std::string>& folders) {
     return ways;
 }
 
+Json::Value leftOut(const std::string& user, const std::vector<std::string>& folders) {
+    Json::Value list(Json::arrayValue);
+    for (const std::string& folder : foldersWithoutMounts(user, folders)) list.append(readable(folder));
+    return list;
+}
+
 bool note(Search& search, const std::vector<std::string>& folders, const User& user) {
     search.record = makeRecord(user.name, search.walker.getDBTaskId());
     if (search.record == nullptr) return false;
@@ -70,6 +74,7 @@ bool note(Search& search, const std::vector<std::string>& folders, const User& u
     if (!record.beginUpdate()) return false;
     record.setProperty(kVolumeProperty, search.walker.getDBVol());
     record.setProperty(kSharesProperty, waysOf(folders));
+    record.setProperty(kLeftOutProperty, leftOut(user.name, folders));
     return record.endUpdate();
 }
 
@@ -122,8 +127,8 @@ void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
     std::vector<std::string> folders;
     code = actAs(user.sid.c_str(), user.name, anyHome(*paths));
     if (code == ORV_ERR_NONE) code = chooseFolders(user, *paths, folders, culprit);
+    if (code == ORV_ERR_NONE) code = makeRoomForTask(user.name);
     if (code == ORV_ERR_NONE) {
-        sweepTasks(user.name);
         std::string id;
         code = beginSearch(user, folders, recursive == "true", criteria, id);
         if (code == ORV_ERR_NONE) data["taskid"] = id;
