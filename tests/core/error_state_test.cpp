@@ -5,35 +5,10 @@ namespace {
 
 class ErrorStateTest : public ApplianceTest {};
 
-TEST_F(ErrorStateTest, EveryCodeHasItsKey) {
-    using Codes = std::vector<int>;
-    for (const auto& [codes, key] : Rows<Codes, std::string>{
-             {{400, 401, 402, 420, 1400, 1404, 1405}, "error_error_system"},
-             {{403, 404, 405}, "error_invalid_user_group"},
-             {{406}, "error_testjoin"},
-             {{407, 409}, "error_privilege_not_enough"},
-             {{408}, "error_no_path"},
-             {{410}, "conn_rv_fail"},
-             {{411}, "error_fs_ro"},
-             {{412}, "error_long_path"},
-             {{413}, "error_encryption_long_path"},
-             {{414}, "error_file_exist"},
-             {{415}, "error_quota_not_enough"},
-             {{416}, "error_space_not_enough"},
-             {{417}, "error_io"},
-             {{418}, "error_reserved_name"},
-             {{419}, "error_fat_reserved_name"},
-             {{421}, "error_folder_busy"},
-             {{1004}, "error_overwrite_fail"},
-             {{1005}, "error_select_conflict"},
-             {{1006}, "mvcp_filename_illegal"},
-             {{1007}, "mvcp_file_too_big"},
-             {{1401}, "error_invalid_archive"},
-             {{1402}, "error_invalid_archive_data"},
-             {{1403}, "extract_passwd_missing"},
-         }) {
-        for (const int code : codes) EXPECT_EQ(OrvParseErrorToKTRString(code, "other:key"), "error:" + key) << code;
-    }
+TEST_F(ErrorStateTest, CodesWithoutAKeyTakeTheCallers) {
+    for (const auto& [code, key] : Rows<int, const char*>{
+             {420, "error_error_system"}, {419, "error_fat_reserved_name"}, {1402, "error_invalid_archive_data"}})
+        EXPECT_EQ(OrvParseErrorToKTRString(code, "other:key"), std::string("error:") + key) << code;
     for (const int code : {0, 399, 422, 1003, 1008, 1406, 1800}) {
         EXPECT_STREQ(OrvParseErrorToKTRString(code, "other:key"), "other:key") << code;
         EXPECT_STREQ(OrvParseErrorToKTRString(code, nullptr), "error:error_error_system") << code;

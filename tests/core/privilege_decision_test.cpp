@@ -6,34 +6,6 @@
 
 namespace {
 
-using orvel::UploadVerdict;
-
-TEST(PrivilegeDecision, NoAccessBeatsReadWriteBeatsReadOnly) {
-    for (unsigned lists = 0; lists < 8; ++lists) {
-        const bool no = (lists & 1) != 0, write = (lists & 2) != 0, read = (lists & 4) != 0;
-        const int expected = no ? 0 : write ? 2 : read ? 1 : 0;
-        EXPECT_EQ(orvel::privilegeOf(orvel::ruleOf({no, write, read})), expected) << lists;
-    }
-    EXPECT_EQ(orvel::ruleOf({true, true, true}), PrivilegeRule::kNoAccess);
-    EXPECT_EQ(orvel::ruleOf({false, false, false}), PrivilegeRule::kNoList);
-    for (const auto& [answer, privilege] : Rows<int, int>{row(1, 1), row(2, 2), row(3, 0), row(-1, 0)})
-        EXPECT_EQ(orvel::privilegeFromService(answer), privilege) << answer;
-}
-
-TEST(PrivilegeDecision, WhatAMaskForbids) {
-    for (unsigned mask = 0; mask < 8; ++mask) {
-        const bool one = (mask & 1) != 0, two = (mask & 2) != 0, four = (mask & 4) != 0;
-        for (const int privilege : {0, 1, 2}) {
-            EXPECT_EQ(orvel::mayList(privilege, mask), privilege != 0 && !one);
-            EXPECT_EQ(orvel::mayDownload(privilege, mask), privilege != 0 && !one && !four);
-            const UploadVerdict expected = privilege != 2 ? UploadVerdict::kRefused
-                                           : one || two   ? UploadVerdict::kGranted
-                                                          : UploadVerdict::kAskTarget;
-            EXPECT_EQ(orvel::judgeUpload(privilege, mask), expected) << privilege << " " << mask;
-        }
-    }
-}
-
 TEST(PrivilegeDecision, RequestedPermissions) {
     for (const auto& [requested, bit] :
          Rows<int, unsigned>{row(ORV_ACCESS_READ, 0x4), row(ORV_ACCESS_WRITE, 0x2), row(ORV_ACCESS_EXECUTE, 0x1),

@@ -56,6 +56,9 @@ TEST_F(SharePathTest, SharesResolve) {
         EXPECT_EQ(out.real, root + rest);
         EXPECT_EQ(out.share + out.root + out.volume, "photo" + root + "/tmp");
     }
+    std::string both = "/photo/x", real, volume, top;  // the path may lie in an output
+    EXPECT_EQ(OrvFullPathGet(both.c_str(), real, both, volume, top, "alice"), 1);
+    EXPECT_EQ(real + both, root + "/xphoto");
     EXPECT_EQ(resolve("/homes/alice/docs", "bob").real, shareRoot("homes") + "/alice/docs");
     EXPECT_NE(access((shareRoot("homes") + "/alice").c_str(), F_OK), 0) << "an ordinary share here";
 }

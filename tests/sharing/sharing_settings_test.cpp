@@ -1,15 +1,7 @@
 #include "orvel/sharing_settings.h"
 
-#include <fcntl.h>
-#include <sys/file.h>
-#include <sys/wait.h>
-
-#include <chrono>
-#include <csignal>
 #include <map>
-#include <thread>
 
-#include "platform/private_mounts.h"
 #include "support/testing.h"
 
 using OrvelSharing::SharingManager;
@@ -131,73 +123,6 @@ TEST_F(SharingSettingsTest, WhoMayShare) {
     announceLog("VEXOUserGet failed");
     vexo::gate::fail("VEXOUserGet", VEXO_ERR_GENERAL, EIO, 1);
     EXPECT_EQ(OrvLibUserPrivForSharing("carol"), 0);
-}
-
-// Each with its own users; every change reads and writes the whole file.
-
-TEST_F(SharingSettingsTest, AFullDiskKeepsTheOldChoices) {
-    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
-        const std::string folder = systemRoot() + "/usr/vexo/etc";
-        if (mount("none", folder.c_str(), "tmpfs", 0, "size=32k") != 0) return support::kNoPrivateMounts;
-        std::string before = "1=\"true\"\n";
-        before += "# " + std::string(4096 - before.size() - 3, '.') + "\n";  // fills its page to the end
-        writeFile(file(), before);
-        writeFile(folder + "/rest", std::string(32 << 10, 'x'));
-        announceLog("ApplyData: Failed to set bob");
-        EXPECT_FALSE(manager.setPrivileges({{"bob", "true"}}));
-        EXPECT_EQ(readFile(file()), before);
-        return 0;
-    }));
-}
-
-// Eight writers, each with its own users; one of them is killed every few milliseconds and another takes its place.
-TEST_F(SharingSettingsTest, WritersThatAreKilledLoseNoAcknowledgedChoice) {
-    constexpr unsigned kWriters = 8, kUsersEach = 50, kFirstUid = 30000;
-    for (unsigned i = 0; i < kWriters * kUsersEach; ++i) addUser("w" + std::to_string(i), kFirstUid + i, kUsersGid);
-    const std::string foreign = "# by hand\r\n17=\"true\"\nno setting, no end of line";
-    writeFile(file(), foreign);
-    // What each writer has been told to be applied: a byte for each choice, written after the answer.
-    const std::string acknowledged = systemRoot() + "/acknowledged";
-    writeFile(acknowledged, std::string(kWriters * kUsersEach, '0'));
-    const auto writer = [&](unsigned number) {
-        const std::string before = readFile(acknowledged);
-        const int fd = open(acknowledged.c_str(), O_WRONLY | O_CLOEXEC);
-        for (unsigned user = number * kUsersEach; user < (number + 1) * kUsersEach; ++user) {
-            const char done = '1';
-            if (before[user] == done) continue;
-            if (!manager.setPrivileges({{"w" + std::to_string(user), "true"}})) return 1;
-            if (pwrite(fd, &done, 1, user) != 1) return 1;
-        }
-        return 0;
-    };
-    pid_t running[kWriters] = {};
-    const auto start = [&](unsigned number) {
-        running[number] = fork();
-        if (running[number] == 0) _exit(writer(number));
-    };
-    for (unsigned i = 0; i < kWriters; ++i) start(i);
-    for (unsigned round = 0; round < 40; ++round) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(5));
-        const unsigned victim = round * 5 % kWriters;
-        kill(running[victim], SIGKILL);
-        waitpid(running[victim], nullptr, 0);
-        const int locked = open(file().c_str(), O_RDONLY | O_CLOEXEC);  // a reader alone may meet a change half done
-        flock(locked, LOCK_EX);
-        const std::string now = readFile(acknowledged);
-        const auto choices = manager.getPrivileges();
-        close(locked);
-        for (unsigned i = 0; i < now.size(); ++i) {
-            ASSERT_TRUE(now[i] == '0' || choices.count(kFirstUid + i) == 1) << i;
-        }
-        start(victim);
-    }
-    for (const pid_t child : running) {
-        int status = 0;
-        waitpid(child, &status, 0);
-        EXPECT_EQ(status, 0);
-    }
-    EXPECT_EQ(manager.getPrivileges().size(), kWriters * kUsersEach + 1);
-    EXPECT_TRUE(readFile(file()).starts_with(foreign + "\n"));
 }
 
 }  // namespace
