@@ -19,7 +19,7 @@ enum {
 };
 
 // Which entries a listing keeps. Any other value means all.
-enum _tag_dir_entry_type_ { DIR_ENTRY_TYPE_DIR = 0, DIR_ENTRY_TYPE_FILE = 1, DIR_ENTRY_TYPE_ALL = 2 };
+enum _tag_dir_entry_type_ : int { DIR_ENTRY_TYPE_DIR = 0, DIR_ENTRY_TYPE_FILE = 1, DIR_ENTRY_TYPE_ALL = 2 };
 
 // Strings are bytes as the file system has them; what was not asked for stays empty or 0. Times are seconds since the
 // epoch, unsigned, cut to 32 bits.

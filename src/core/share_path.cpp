@@ -55,11 +55,12 @@ int resolve(const char* path, std::string& realPath, std::string& shareName, std
         OrvLibSetErr(ORV_ERR_GENERAL);
         return 0;
     }
+    const std::string rest = restOfPath(path, component.get());  // before an output that `path` may lie in
     shareName = component.get();
     const bool found =
         IsDirUserHome(shareName, nullptr) ? findHomeRoot(userName, shareRoot) : findShareRoot(shareName, shareRoot);
     if (!found) return 0;
-    realPath = shareRoot + restOfPath(path, shareName);
+    realPath = shareRoot + rest;
     volumePath = shareRoot.substr(0, shareRoot.find('/', 1));
     return 1;
 }
