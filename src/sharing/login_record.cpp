@@ -1,5 +1,9 @@
 #include "sharing/login_record.h"
 
+#ifdef __SSE2__
+#include <emmintrin.h>
+#endif
+
 #include <algorithm>
 #include <charconv>
 #include <climits>
@@ -8,6 +12,8 @@
 
 namespace orvel {
 namespace {
+
+constexpr std::size_t kSeparators = 8;  // of a line as it is written: commas, and its end
 
 // What ends a field: the comma, and for the sixth and the eighth also the end of a line.
 enum class Ends { kComma, kCommaOrLineEnd };
@@ -47,23 +53,83 @@ bool isAsWritten(std::string_view bytes, const LoginRecord& record) {
     const std::size_t fields = record.address.size() + record.user.size() + record.session.size() +
                                record.loginTime.size() + record.accessTime.size() + record.position.size() +
                                record.neverExpires.size() + record.link.size();
-    constexpr std::size_t kSeparators = 8;  // the end of the line among them
     return bytes.size() == fields + kSeparators && bytes.ends_with('\n') && record.position.end()[0] == ',' &&
            record.link.end() == bytes.end() - 1;
 }
+
+// Takes the first line off `text`, whatever its form. False when it is no record.
+bool takeLine(std::string_view& text, std::size_t longest, LoginRecord& record) {
+    const std::size_t end = std::min(text.find('\n'), text.size());
+    const std::string_view line = text.substr(0, end);
+    const std::string_view bytes = text.substr(0, end + 1);
+    text.remove_prefix(bytes.size());
+    // A NUL ends what is read of a line.
+    if (line.size() > longest || !parseLine(line.substr(0, line.find('\0')), record)) return false;
+    record.line = isAsWritten(bytes, record) ? bytes : std::string_view();
+    return true;
+}
+
+#ifdef __SSE2__
+constexpr std::size_t kBlock = 16;
+
+// Whether the bytes at `at`, one bit for each, are what ends a field, a line, or what is read of one.
+unsigned separatorsAt(const char* at) {
+    const __m128i block = _mm_loadu_si128(reinterpret_cast<const __m128i*>(at));
+    const auto are = [&block](char c) { return _mm_cmpeq_epi8(block, _mm_set1_epi8(c)); };
+    const __m128i found = _mm_or_si128(_mm_or_si128(are(','), are('\n')), _mm_or_si128(are('\r'), are('\0')));
+    return static_cast<unsigned>(_mm_movemask_epi8(found));
+}
+
+// Where the separators of the first line stand; false for a line that is not as it is written.
+bool findSeparators(std::string_view text, const char* (&ends)[kSeparators]) {
+    std::size_t count = 0;
+    const char* begin = text.data();  // of the field
+    for (std::size_t at = 0; text.size() - at >= kBlock; at += kBlock) {
+        for (unsigned found = separatorsAt(text.data() + at); found != 0; found &= found - 1) {
+            const char* const end = text.data() + at + __builtin_ctz(found);
+            const bool last = count == kSeparators - 1;
+            if (*end != (last ? '\n' : ',') || end == begin) return false;
+            ends[count++] = end;
+            if (last) return true;
+            begin = end + 1;
+        }
+    }
+    return false;
+}
+
+// Takes the first line off `text` when it is as it is written, as nearly all are; else nothing.
+bool takeWrittenLine(std::string_view& text, std::size_t longest, LoginRecord& record) {
+    const char* ends[kSeparators];
+    if (!findSeparators(text, ends)) return false;
+    const std::size_t length = static_cast<std::size_t>(ends[kSeparators - 1] - text.data());
+    if (length > longest) return false;
+    const auto field = [&](std::size_t number) {
+        const char* const begin = number == 0 ? text.data() : ends[number - 1] + 1;
+        return std::string_view(begin, static_cast<std::size_t>(ends[number] - begin));
+    };
+    record = {field(0), field(1), field(2), field(3), field(4), field(5), field(6), field(7), {}};
+    record.line = text.substr(0, length + 1);
+    text.remove_prefix(length + 1);
+    return true;
+}
+#else
+bool takeWrittenLine(std::string_view&, std::size_t, LoginRecord&) {
+    return false;
+}
+#endif
 
 }  // namespace
 
 bool nextLoginRecord(std::string_view& text, std::size_t longest, LoginRecord& record) {
     while (!text.empty()) {
-        const std::size_t end = std::min(text.find('\n'), text.size());
-        const std::string_view line = text.substr(0, end);
-        const std::string_view bytes = text.substr(0, end + 1);
-        text.remove_prefix(bytes.size());
-        // A NUL ends what is read of a line.
-        if (line.size() > longest || !parseLine(line.substr(0, line.find('\0')), record)) continue;
-        record.line = isAsWritten(bytes, record) ? bytes : std::string_view();
-        return true;
+        if (takeWrittenLine(text, longest, record) || takeLine(text, longest, record)) return true;
+    }
+    return false;
+}
+
+bool nextLoginRecordOfAnyForm(std::string_view& text, std::size_t longest, LoginRecord& record) {
+    while (!text.empty()) {
+        if (takeLine(text, longest, record)) return true;
     }
     return false;
 }

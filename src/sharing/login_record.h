@@ -29,6 +29,8 @@ constexpr std::size_t kLongestLookedUpLine = 1023;
 // Takes the next line of at most `longest` bytes that is a record off `text`; the ones before it are passed over.
 // False when there is none.
 bool nextLoginRecord(std::string_view& text, std::size_t longest, LoginRecord& record);
+// The same without the short cut for lines that are as they are written.
+bool nextLoginRecordOfAnyForm(std::string_view& text, std::size_t longest, LoginRecord& record);
 
 // Appends the line of a record, its end included.
 void appendLoginRecord(const LoginRecord& record, std::string& out);
