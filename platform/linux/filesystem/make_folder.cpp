@@ -123,7 +123,6 @@ Descriptor makeOne(int parent, const std::string& name, const Attributes& attrib
 
 // A domain's folder was handed to the domain's first user once, and with it everybody's homes there.
 void takeBack(int fd, int parent, const std::string& name, uid_t user) {
-    const vexo::KeepErrno keep;
     struct stat status;
     if (user == 0 || geteuid() != 0 || fstat(fd, &status) != 0 || status.st_uid != user) return;
     if (!isNamed(fd, parent, name.c_str())) return;  // a link
@@ -131,11 +130,15 @@ void takeBack(int fd, int parent, const std::string& name, uid_t user) {
     if (folder) static_cast<void>(handOver(folder.get(), status, {0, 0, kSystemMode}));
 }
 
-// Opens `name` inside `parent`, made when it is missing and may be made.
-Descriptor enter(int parent, const std::string& name, bool mayMake, const Attributes& attributes) {
+// Opens the folder `name` inside `parent`, the one at `at` of a longer path when `above` something else; made when it
+// is missing and may be made.
+Descriptor enter(int parent, const std::string& name, std::string_view at, bool above, bool mayMake,
+                 const Attributes& attributes) {
+    constexpr Attributes system = {kKeep, kKeep, kSystemMode};
     Descriptor fd = vexo::openFile(parent, name.c_str(), O_PATH | O_DIRECTORY);
+    if (fd && above && name.front() == '@' && vexo::isAboveHomes(at)) takeBack(fd.get(), parent, name, attributes.uid);
     if (fd || errno != ENOENT || !mayMake) return fd;
-    return makeOne(parent, name, attributes);
+    return makeOne(parent, name, above && vexo::isAboveHomes(at) ? system : attributes);
 }
 
 // The next component of `rest`, which moves behind it; empty at the end.
@@ -161,11 +164,8 @@ int VEXOFSMkdirP(const char* path, const char** stopAt, int recursive, uid_t uid
             return 0;
         }
         const bool last = rest[strspn(rest, "/")] == '\0';
-        const bool ofSystem = !last && vexo::isAboveHomes({path, rest});
-        Descriptor next = enter(folder.get(), component, recursive != 0 || last,
-                                ofSystem ? Attributes{kKeep, kKeep, kSystemMode} : Attributes{uid, gid, mode});
+        Descriptor next = enter(folder.get(), component, {path, rest}, !last, recursive != 0 || last, {uid, gid, mode});
         if (!next && stopAt != nullptr) *stopAt = rest - component.size();
-        if (next && ofSystem && component.front() == '@') takeBack(next.get(), folder.get(), component, uid);
         folder = std::move(next);
     }
     return vexo::fail(vexo::errorOfErrno(errno));
