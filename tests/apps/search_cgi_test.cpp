@@ -329,7 +329,7 @@ TEST_F(SearchCgi, ASearchThatCouldNotStoreAllHasFailed) {
         inChild([&] {
             const rlimit small = {500000, 500000};
             EXPECT_TRUE(signal(SIGXFSZ, SIG_IGN) != SIG_ERR && setrlimit(RLIMIT_FSIZE, &small) == 0);
-            const std::string id = start("carol", "path=/photo&size_greater=-1");
+            const std::string id = start("carol", "path=/photo&type=file");
             const Json::Value data = finished("carol", id).json["data"];
             EXPECT_TRUE(data["failed"].asBool()) << data.toStyledString().substr(0, 500);
             EXPECT_LT(data["total"].asInt(), 3000);

@@ -72,8 +72,8 @@ TEST_F(ShareListTest, EnumerationUnderEveryFault) {
             },
             call);
         EXPECT_GE(faults, 4);
+        EXPECT_EQ(pushes, *call == 'V' ? faults : 0) << "whatever cannot be added ends it";
     }
-    EXPECT_EQ(pushes, 4) << "one for each share in the list; the platform's own come before them";
 }
 
 }  // namespace

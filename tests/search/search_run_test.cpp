@@ -185,12 +185,12 @@ TEST_F(SearchRunTest, LostRecordsAreToldAtTheEnd) {
     for (const char* name : {"/a", "/b", "/c"}) writeFile(shareRoot("photo") + name, "");
     inOwnProcess([&] {
         Probe probe([](int) { VLIBCErrSetEx(VEXO_ERR_MISSING, "", 0); });  // as what vanishes during a walk
-        OneSearch run("alice", {"/photo"}, probe.alone);
         for (const auto& [call, code, left] :
              Rows<const char*, int, size_t>{{"FILEIDXOutputDBInsert", VEXO_ERR_NO_SPACE, 2},
                                             {"FILEIDXDBFlush", VEXO_ERR_GENERAL, 3},
                                             {"", 0, 3}}) {
             vexo::gate::reset();
+            OneSearch run("alice", {"/photo"}, probe.alone);
             if (code != 0) vexo::gate::fail(call, code, EIO, 1);
             EXPECT_TRUE(run.walker.Walk({}));
             EXPECT_EQ(VLIBCErrGet(), code) << call;
@@ -199,7 +199,8 @@ TEST_F(SearchRunTest, LostRecordsAreToldAtTheEnd) {
         }
         // Where nothing is found nothing can be lost.
         FindTypeComp folders(true);
-        OneSearch nothing("alice", {"/photo"}, {&folders});
+        const std::vector<FindComp*> alone{&folders};
+        OneSearch nothing("alice", {"/photo"}, alone);
         EXPECT_TRUE(nothing.task.remove());
         EXPECT_TRUE(nothing.walker.Walk({}));
         EXPECT_EQ(VLIBCErrGet(), 0);
