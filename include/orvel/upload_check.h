@@ -25,8 +25,8 @@ ORVEL_API int ConvUploadErrnoToAPIErr(_tag_cgi_upload_errno_ err);
 ORVEL_API int CheckFile(std::string path, const char* user, const char* sid, _tag__type_& overwriteMode);
 
 // Copies the uploaded data from `source` to `target` (real paths) with `user` as the owner, replacing an existing file;
-// `isCancelled` (may be null) is asked meanwhile. The target appears whole or not at all. On one file system the source
-// itself becomes the target, and is gone.
+// `isCancelled` (may be null) is asked meanwhile. The target appears whole, its data on the disk, or not at all. On one
+// file system the source itself becomes the target, and is gone.
 // False with the library code: 401, 407, 408, 411, 412 (a long name, also on an encrypted share), 414, 415, 416, 419,
 // 1804 cancelled, 1805 too large for the file system; without a code for a null path (not logged) or an unknown user.
 ORVEL_API bool MoveFile(const char* user, const char* source, const char* target, int (*isCancelled)());

@@ -4,6 +4,7 @@
 
 #include <cerrno>
 
+#include "base/keep_errno.h"
 #include "vexo/error.h"
 
 namespace vexo {
@@ -50,17 +51,7 @@ inline int errorOfErrno(int systemCode) {
     }
 }
 
-// Keeps errno over calls of which a failure is no failure of the operation.
-class KeepErrno {
- public:
-    KeepErrno() : saved_(errno) {}
-    ~KeepErrno() { errno = saved_; }
-    KeepErrno(const KeepErrno&) = delete;
-    KeepErrno& operator=(const KeepErrno&) = delete;
-
- private:
-    int saved_;
-};
+using orvel::KeepErrno;
 
 }  // namespace vexo
 

@@ -95,7 +95,7 @@ bool moveFile(const char* user, const char* source, const char* target, int (*is
     const VEXOCOPYOPT options = {.uid = record->uid,
                                  .gid = record->gid,
                                  .isCancelled = isCancelled,
-                                 .switches = VEXO_COPY_OVERWRITE | VEXO_COPY_TAKE};
+                                 .switches = VEXO_COPY_OVERWRITE | VEXO_COPY_TAKE | VEXO_COPY_SYNC};
     if (VEXOFileCopy(source, target, &options) == 0) return true;
     const int platformError = VLIBCErrGet();
     syslog(LOG_ERR, "%s:%d Failed to copy %s to %s, reason=[%X]", kSource, __LINE__, printable(source).c_str(),

@@ -11,6 +11,7 @@ enum {
     VEXO_COPY_KEEP_TIMES = 0x2,  // the copy takes over the times of access and modification
     VEXO_COPY_TAKE = 0x4,        // the source is the caller's to give: on one file system it becomes the target itself
     VEXO_COPY_KEEP_MODE = 0x8,   // a new file has the source's permission bits, without set-id and sticky bits
+    VEXO_COPY_SYNC = 0x10,       // the data is on the disk before the target has its name
 };
 
 struct VEXOCOPYOPT {
@@ -24,12 +25,14 @@ VEXO_BEGIN_C
 // Copies the regular file `source` to `target`, both paths of at most 4,095 bytes, with the caller's effective
 // identity. `options` may be null: the caller's own file, never cancelled, no switches.
 //
-// The target appears whole or not at all: the data goes to a file beside it, which takes its place in one step. A new
-// file has the mode 0644, or what the folder's default ACL says (see KEEP_MODE, which does not bear on TAKE); one that
-// replaces another takes over that one's permissions (its ACL too), not its owner. Holes of the source stay holes; data
-// is shared with the source where the file system can. With TAKE, a source that the caller owns, that has one name and
-// lies on the target's file system is not copied but becomes the target, and its old name is gone; any other source is
-// copied and stays. A failure may leave a source that was to be taken with the target's owner and permissions.
+// The target appears whole or not at all: the data goes to a file beside it, nameless or hidden (VEXOEAIsHiddenFile),
+// which takes its place in one step. What replaces a file is on the disk before that; whether the name is, the caller
+// sees to. A new file has the mode 0644, or what the folder's default ACL says (see KEEP_MODE, which does not bear on
+// TAKE); one that replaces another takes over that one's permissions (its ACL too), not its owner. Holes of the source
+// stay holes; data is shared with the source where the file system can. With TAKE, a source that the caller owns, that
+// has one name and lies on the target's file system is not copied but becomes the target, and its old name is gone; any
+// other source is copied and stays. A failure may leave a source that was to be taken with the target's owner and
+// permissions.
 //
 // 0, or -1 with errno and the slot, the target as it was and nothing beside it: 0x0600 the source or the target's
 // folder is missing, 0x0700 a path is no path of a file (the source is a folder, link, pipe...; the target has no

@@ -17,6 +17,8 @@ class VEXO_API WebCGI {
     // application/x-www-form-urlencoded: as many bytes as CONTENT_LENGTH says, at most 1 MiB. A longer one is not read;
     // then, and for one that is cut short or holds a NUL byte, BodyRefused() is true and no field of it counts.
     WebCGI();
+    // The same for a body of at most `longestForm` bytes.
+    explicit WebCGI(unsigned long longestForm);
     ~WebCGI();
     WebCGI(const WebCGI&) = delete;
     WebCGI& operator=(const WebCGI&) = delete;

@@ -8,6 +8,7 @@
 #include <string>
 #include <string_view>
 
+#include "base/new_file.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "filesystem/copy_data.h"
@@ -15,7 +16,6 @@
 #include "filesystem/mount_table.h"
 #include "filesystem/owner.h"
 #include "io/file_io.h"
-#include "io/part_file.h"
 #include "vexo/copy.h"
 #include "vexo/filesystem.h"
 
@@ -90,10 +90,10 @@ bool keepsMode(const Copy& copy) {
     return (copy.options.switches & VEXO_COPY_KEEP_MODE) != 0 && !copy.exists;
 }
 
-bool create(const Copy& copy, vexo::PartFile& part) {
+bool create(const Copy& copy, orvel::NewFile& part) {
     // A part is closed to others until it has the permissions of another file.
     const vexo::Umask mask(kUmask);
-    return part.create(copy.exists || keepsMode(copy) ? 0600 : kNewFile) &&
+    return part.create(copy.name, copy.exists || keepsMode(copy) ? 0600 : kNewFile) &&
            vexo::setOwner(part.get(), copy.options.uid, copy.options.gid);
 }
 
@@ -101,6 +101,11 @@ bool create(const Copy& copy, vexo::PartFile& part) {
 bool reportDelayedFailure(int fd) {
     const int second = fcntl(fd, F_DUPFD_CLOEXEC, 0);
     return second >= 0 && close(second) == 0;
+}
+
+// Whether the file is on the disk, where that is asked for. What replaces a file is waited for in any case.
+bool isSynced(const Copy& copy, int file) {
+    return (copy.options.switches & VEXO_COPY_SYNC) == 0 || fsync(file) == 0;
 }
 
 bool fill(const Copy& copy, int part) {
@@ -113,20 +118,18 @@ bool fill(const Copy& copy, int part) {
         const std::array<timespec, 2> times = {from.st_atim, from.st_mtim};
         if (futimens(part, times.data()) != 0) return false;
     }
-    // A power cut must leave the old content or the new one, not an empty file.
-    if (copy.exists && fdatasync(part) != 0) return false;
+    if (!isSynced(copy, part)) return false;
     if (!reportDelayedFailure(part)) return false;
     if (options.isCancelled == nullptr || options.isCancelled() == 0) return true;
     errno = ECANCELED;
     return false;
 }
 
-bool publish(const Copy& copy, vexo::PartFile& part) {
-    const char* name = copy.name.c_str();
-    if (part.publish(name, copy.exists)) return true;
+bool publish(const Copy& copy, orvel::NewFile& part) {
+    if (part.publish(copy.name, copy.exists)) return true;
     // Put there since the target was looked at.
     const bool mayReplace = (copy.options.switches & VEXO_COPY_OVERWRITE) != 0;
-    return errno == EEXIST && mayReplace && !copy.exists && part.publish(name, true);
+    return errno == EEXIST && mayReplace && !copy.exists && part.publish(copy.name, true);
 }
 
 int errorOfPublishing(int systemCode) {
@@ -165,12 +168,12 @@ bool take(const char* source, const Copy& copy) {
     const int file = copy.source.get();
     const bool permitted = copy.exists ? takeOverPermissions(copy, file) : vexo::setMode(file, kNewFile & ~kUmask);
     if (!permitted || !vexo::setOwner(file, copy.options.uid, copy.options.gid)) return false;
-    if (copy.exists && fdatasync(file) != 0) return false;
+    if (!isSynced(copy, file)) return false;
     if (copy.options.isCancelled != nullptr && copy.options.isCancelled() != 0) {
         errno = ECANCELED;
         return false;
     }
-    vexo::PartFile part(copy.folder.get());
+    orvel::NewFile part(copy.folder.get());
     if (!part.adopt(file) || !publish(copy, part)) return false;
     dropName(source, copy);
     return true;
@@ -193,9 +196,11 @@ int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* opti
             return 0;
         }
         if (errno == ECANCELED) return vexo::fail(VEXO_ERR_CANCELLED);
-        // A file system that cannot, or a target that came into being meanwhile: copied like any other.
+        // Put there meanwhile: a copy would not get the name either.
+        if (errno == EEXIST || errno == EISDIR) return vexo::fail(errorOfPublishing(errno));
+        // A file system that cannot: copied like any other.
     }
-    vexo::PartFile part(copy.folder.get());
+    orvel::NewFile part(copy.folder.get());
     if (!create(copy, part) || !fill(copy, part.get())) return vexo::fail(vexo::errorOfErrno(errno));
     if (!publish(copy, part)) return vexo::fail(errorOfPublishing(errno));
     errno = before;

@@ -6,8 +6,9 @@
 
 #include <memory>
 
+#include "base/new_file.h"
 #include "failure.h"
-#include "io/part_file.h"
+#include "io/file_io.h"
 #include "vexo/filesystem.h"
 #include "vexo/system_root.h"
 
@@ -132,9 +133,8 @@ Descriptor lockTask(int folder, const std::string& file) {
 
 bool createTask(int folder, const std::string& file, const TaskDocument& document) {
     std::string text;
-    PartFile part(folder);
-    return build(document, text) && part.create(0600) && writeAll(part.get(), text) &&
-           part.publish(file.c_str(), false);
+    orvel::NewFile part(folder);
+    return build(document, text) && part.create(file, 0600) && writeAll(part.get(), text) && part.publish(file, false);
 }
 
 bool replaceTask(int folder, const std::string& file, const TaskDocument& document) {

@@ -48,12 +48,12 @@ bool readBody(size_t length, std::string& body) {
 }
 
 // False for a body that is not taken: too long, cut short, or with a NUL byte, which no form holds.
-bool readForm(vexo::FormFields& fields) {
+bool readForm(size_t longest, vexo::FormFields& fields) {
     const std::string announced = environment("CONTENT_LENGTH");
     if (announced.empty()) return true;
     size_t length = 0;
     const auto [end, error] = std::from_chars(announced.data(), announced.data() + announced.size(), length);
-    if (error != std::errc() || end != announced.data() + announced.size() || length > kMaxBody) return false;
+    if (error != std::errc() || end != announced.data() + announced.size() || length > longest) return false;
     std::string body;
     if (!readBody(length, body) || body.find('\0') != std::string::npos) return false;
     vexo::parseForm(body, fields);
@@ -75,11 +75,13 @@ struct WebCGI::Impl {
     }
 };
 
-WebCGI::WebCGI() {
+WebCGI::WebCGI() : WebCGI(kMaxBody) {}
+
+WebCGI::WebCGI(unsigned long longestForm) {
     auto impl = std::make_unique<Impl>();
     vexo::parseForm(environment("QUERY_STRING"), impl->fields);
     impl->cookies = environment("HTTP_COOKIE");
-    if (isFormPost()) impl->bodyRefused = !readForm(impl->fields);
+    if (isFormPost()) impl->bodyRefused = !readForm(longestForm, impl->fields);
     impl_ = impl.release();
 }
 
