@@ -2,7 +2,6 @@
 
 #include <unistd.h>
 
-#include <algorithm>
 #include <charconv>
 #include <cstdlib>
 #include <memory>
@@ -106,6 +105,10 @@ int actAs(const char* sid, const std::string& user, bool needsHome) {
     if (OrvLibUGIDSet(sid, user.c_str()) != 0) return lastCode();
     // A switch that the kernel refused, or refused in part, reports success, too.
     return VEXOUserOwnsProcess(user.c_str()) == 1 ? ORV_ERR_NONE : ORV_ERR_GENERAL;
+}
+
+Status statusOf(int code) {
+    return code == ORV_ERR_PARAMETER ? Status::kBadRequest : Status::kOk;
 }
 
 std::optional<unsigned long> parseNumber(std::string_view text) {

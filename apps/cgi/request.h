@@ -44,6 +44,9 @@ bool begin(Output& out, User& user);
 // process that is still root's, or kept a group of root's, although the user is no administrator is one, 401.
 int actAs(const char* sid, const std::string& user, bool needsHome);
 
+// The status of a request that was refused with the library code: 400 for a parameter, however late it showed.
+Status statusOf(int code);
+
 // A parameter that is a number: `fallback` when absent, nothing when it is anything but decimal digits that fit.
 std::optional<unsigned long> numberParam(const VEXO::WebCGI& cgi, const char* name, unsigned long fallback);
 std::optional<unsigned long> parseNumber(std::string_view text);

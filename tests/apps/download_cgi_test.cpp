@@ -1,6 +1,7 @@
 // The program download, run as a web server runs it. Archives are read back by libarchive's own reader.
 #include <archive.h>
 #include <archive_entry.h>
+#include <sys/resource.h>
 #include <sys/sysmacros.h>
 
 #include <clocale>
@@ -116,6 +117,7 @@ TEST_F(DownloadCgi, RefusalsShowInTheStatus) {
     addShare("preview", "read only = no\nvalid users = alice\nvexo:restriction = 4\n");
     writeFile(shareRoot("preview") + "/f", "secret", 0644);
     writeFile(root + "/folder/f", "x", 0644);
+    writeFile(root + "/folder/@tmp/f", "x", 0644);
     ASSERT_EQ(mkfifo((root + "/pipe").c_str(), 0666), 0);
     fs::create_symlink("folder/f", root + "/inside");
     fs::create_symlink("/etc/passwd", root + "/outside");
@@ -124,9 +126,10 @@ TEST_F(DownloadCgi, RefusalsShowInTheStatus) {
     for (const auto& [user, query, status, code] : Rows<std::string, std::string, int, int>{
              row("", "path=/photo/folder/f", 401, 407), row("alice", "", 400, 400),
              row("alice", "path_raw=/photo/%25zz", 400, 400), row("alice", "path=/photo/x", 404, 408),
-             row("alice", "path=/preview/f", 403, 407), row("alice", "path=/preview", 403, 407),
-             row("alice", "path=/photo/pipe", 403, 407), row("alice", "path=/photo/outside", 403, 407),
-             row("alice", "path=/photo/next/f", 403, 407), row("alice", "path=/photo/folder/f&path=/photo/x", 404, 408),
+             row("alice", "path=/photo/folder/@tmp/f", 404, 408), row("alice", "path=/preview/f", 403, 407),
+             row("alice", "path=/preview", 403, 407), row("alice", "path=/photo/pipe", 403, 407),
+             row("alice", "path=/photo/outside", 403, 407), row("alice", "path=/photo/next/f", 403, 407),
+             row("alice", "path=/photo/folder/f&path=/photo/x", 404, 408),
              row("alice", "path=/photo/folder/f&path=/photo/outside", 403, 407)}) {
         SCOPED_TRACE(query);
         const CgiReply reply(ask(user, query));
@@ -183,6 +186,37 @@ TEST_F(DownloadCgi, AZipTellsWhatItLacks) {
               "These could not be included:\nsub/closed: Permission denied\nsub/closed.txt: Permission denied\n");
     EXPECT_EQ(fetch("/photo/sub/closed.txt").status, 403);
     EXPECT_EQ(RawReply(ask("carol", "path=/photo/sub/closed.txt")).status, 403) << "not in the share's list";
+}
+
+TEST_F(DownloadCgi, ManyPathsNeedFewDescriptorsAndEachComesOnce) {
+    const std::string root = shareRoot("photo");
+    std::string list;
+    Members all;
+    for (int i = 0; i < 200; ++i) {
+        const std::string path = "/" + std::to_string(i) + "/a.txt";
+        writeFile(root + path, path, 0644);
+        list += "&path=/photo" + path;
+        all[i == 0 ? "a.txt" : "a (" + std::to_string(i + 1) + ").txt"] = path;
+    }
+    std::string again = "path=/photo/0/a.txt";
+    for (int i = 0; i < 300; ++i) again += i % 2 == 0 ? "&path=/photo/0/a.txt" : "&path_raw=/photo/0/a.txt";
+    EXPECT_EQ(fetch("/photo/0/a.txt").body, RawReply(ask("alice", again)).body);
+    EXPECT_EQ(inChild([&] {
+                  const rlimit few = {40, 40};
+                  if (setrlimit(RLIMIT_NOFILE, &few) != 0) return 1;
+                  EXPECT_EQ(zip(list.substr(1)), all);
+                  return 0;
+              }),
+              0);
+    // A list is long; what is too long is said to be.
+    for (const auto& [length, status] : Rows<size_t, int>{row(size_t{2} << 20, 200), row(size_t{17} << 20, 413)}) {
+        std::string form = "path=/photo/0/a.txt&filler=";
+        form.resize(length, 'x');
+        EXPECT_EQ(RawReply(runCgi(PROGRAM_DOWNLOAD, "alice", "POST", "", form,
+                                  {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}))
+                      .status,
+                  status);
+    }
 }
 
 TEST_F(DownloadCgi, TheTransferLogTellsWhatWasSent) {

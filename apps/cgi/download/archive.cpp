@@ -13,19 +13,26 @@
 
 #include "base/owner.h"
 #include "folder_names.h"
+#include "orvel/error_state.h"
 #include "text.h"
 
 namespace orvel::cgi {
 namespace {
 
 constexpr size_t kPiece = size_t{256} * 1024;
-constexpr int kDeepest = 256;  // descriptors stay open on the way down
+constexpr int kDeepest = 256;           // descriptors stay open on the way down
+constexpr size_t kMostLeftOut = 10000;  // that are said by name
 
 }  // namespace
 
 // What is readable of a name that is no UTF-8 would not tell it apart from others.
 std::string memberName(const std::string& component) {
     return isUtf8(component) ? component : percentEncode(component);
+}
+
+const char* reasonOf(int code) {
+    if (code == ORV_ERR_DENIED) return "not allowed";
+    return code == ORV_ERR_MISSING ? "missing" : "could not be opened";
 }
 
 ZipStream::ZipStream(int fd, ZipObserver* observer) : archive_(archive_write_new()), observer_(observer) {
@@ -43,33 +50,38 @@ ZipStream::~ZipStream() {
     archive_write_free(archive_);
 }
 
-bool ZipStream::broken() {
+bool ZipStream::recordFailure() {
     error_ = archive_errno(archive_);
-    return stopped();
+    return recordStop();
 }
 
-bool ZipStream::stopped() {
+bool ZipStream::recordStop() {
     broken_ = true;
     return false;
 }
 
 void ZipStream::miss(const std::string& name, int error, const char* reason) {
-    if (observer_ != nullptr) return observer_->leftOut(name, error);
+    if (observer_ != nullptr) observer_->leftOut(name, error);
     leaveOut(name, reason != nullptr ? reason : strerror(error));
 }
 
 void ZipStream::leaveOut(const std::string& name, const std::string& reason) {
-    leftOut_.push_back(name + ": " + reason);
+    if (leftOut_.size() < kMostLeftOut) {
+        leftOut_.push_back(name + ": " + reason);
+    } else {
+        ++leftOutUnsaid_;
+    }
 }
 
 bool ZipStream::begin(const std::string& name, const struct stat& status, long long size) {
     const std::unique_ptr<archive_entry, Releaser<archive_entry_free>> entry(archive_entry_new());
-    if (entry == nullptr) return broken();
+    if (entry == nullptr) return recordFailure();
     archive_entry_set_pathname(entry.get(), name.c_str());
     archive_entry_set_mode(entry.get(), status.st_mode & (S_IFMT | 0777));
     archive_entry_set_mtime(entry.get(), status.st_mtim.tv_sec, status.st_mtim.tv_nsec);
     if (size >= 0) archive_entry_set_size(entry.get(), size);
-    return archive_write_header(archive_, entry.get()) >= ARCHIVE_WARN || broken();
+    begun_ = true;
+    return archive_write_header(archive_, entry.get()) >= ARCHIVE_WARN || recordFailure();
 }
 
 bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
@@ -85,12 +97,12 @@ bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
             miss(name, got < 0 ? errno : EIO, got < 0 ? nullptr : "became shorter while it was read");
             break;
         }
-        if (archive_write_data(archive_, piece.data(), static_cast<size_t>(got)) < 0) return broken();
+        if (archive_write_data(archive_, piece.data(), static_cast<size_t>(got)) < 0) return recordFailure();
         left -= got;
         bytes_ += got;
-        if (observer_ != nullptr && !observer_->wrote(got)) return stopped();
+        if (observer_ != nullptr && !observer_->wrote(got)) return recordStop();
     }
-    return archive_write_finish_entry(archive_) >= ARCHIVE_WARN || broken();
+    return archive_write_finish_entry(archive_) >= ARCHIVE_WARN || recordFailure();
 }
 
 bool ZipStream::addChild(const Descriptor& folder, const std::string& child, const std::string& name) {
@@ -110,7 +122,8 @@ bool ZipStream::addChild(const Descriptor& folder, const std::string& child, con
 bool ZipStream::addFolder(const Descriptor& folder, const std::string& name) {
     struct stat status {};
     std::vector<std::string> names;
-    if (fstat(folder.get(), &status) != 0 || !begin(name + "/", status, -1)) return !broken_;
+    if (fstat(folder.get(), &status) != 0) return miss(name, errno), true;
+    if (!begin(name + "/", status, -1)) return false;
     if (depth_ == kDeepest) return miss(name, ENAMETOOLONG, "too deep"), true;
     if (!namesIn(folder.get(), Hidden::kLeaveOut, names)) miss(name, errno);
     ++depth_;
@@ -123,7 +136,7 @@ bool ZipStream::addFolder(const Descriptor& folder, const std::string& name) {
 
 bool ZipStream::add(const Descriptor& opened, const std::string& name) {
     if (broken_) return false;
-    if (observer_ != nullptr && !observer_->begins(name)) return stopped();
+    if (observer_ != nullptr && !observer_->begins(name)) return recordStop();
     struct stat status {};
     if (fstat(opened.get(), &status) != 0) return miss(name, errno), true;
     if (S_ISDIR(status.st_mode)) return addFolder(opened, name);
@@ -131,18 +144,20 @@ bool ZipStream::add(const Descriptor& opened, const std::string& name) {
     return miss(name, EINVAL, "neither a file nor a folder"), true;
 }
 
+bool ZipStream::writeLeftOut() {
+    std::string text = "These could not be included:\n";
+    for (const std::string& line : leftOut_) text += line + "\n";
+    if (leftOutUnsaid_ > 0) text += "and " + std::to_string(leftOutUnsaid_) + " more\n";
+    struct stat status {};
+    status.st_mode = S_IFREG | 0644;
+    status.st_mtim.tv_sec = time(nullptr);
+    if (!begin("_not_included.txt", status, static_cast<long long>(text.size()))) return false;
+    return archive_write_data(archive_, text.data(), text.size()) >= 0 || recordFailure();
+}
+
 bool ZipStream::finish() {
-    if (!leftOut_.empty() && !broken_) {
-        std::string text = "These could not be included:\n";
-        for (const std::string& line : leftOut_) text += line + "\n";
-        struct stat status {};
-        status.st_mode = S_IFREG | 0644;
-        status.st_mtim.tv_sec = time(nullptr);
-        if (begin("_not_included.txt", status, static_cast<long long>(text.size()))) {
-            broken_ = archive_write_data(archive_, text.data(), text.size()) < 0;
-        }
-    }
-    return !broken_ && (archive_write_close(archive_) == ARCHIVE_OK || broken());
+    if (!leftOut_.empty() && !broken_) static_cast<void>(writeLeftOut());
+    return !broken_ && (archive_write_close(archive_) == ARCHIVE_OK || recordFailure());
 }
 
 }  // namespace orvel::cgi

@@ -27,9 +27,12 @@ class ZipObserver {
     virtual void leftOut(const std::string& name, int error) = 0;
 };
 
-// A stream to a descriptor. What cannot be read is left out and told to the observer, or without one in a last member,
-// "_not_included.txt". Members are deflated, times and permissions kept; symbolic links and anything else but files and
-// folders stay out.
+// What a zip says of a source that was refused with the library code.
+const char* reasonOf(int code);
+
+// A stream to a descriptor. What cannot be read is left out, reported to the observer, if there is one, and said in a
+// last member, "_not_included.txt". Members are deflated, times and permissions kept; symbolic links and anything else
+// but files and folders stay out.
 class ZipStream {
  public:
     explicit ZipStream(int fd, ZipObserver* observer = nullptr);
@@ -44,24 +47,28 @@ class ZipStream {
     void leaveOut(const std::string& name, const std::string& reason);
     // Writes the end. False when not everything arrived.
     bool finish();
-    [[nodiscard]] long long bytes() const { return bytes_; }  // of the members, as they were
-    [[nodiscard]] int error() const { return error_; }        // errno of what broke it, 0 when it was stopped
+    [[nodiscard]] bool isWhole() const { return leftOut_.empty(); }  // nothing was left out so far
+    [[nodiscard]] bool isEmpty() const { return !begun_; }           // no member was written so far
+    [[nodiscard]] long long bytes() const { return bytes_; }         // of the members, as they were
+    [[nodiscard]] int error() const { return error_; }               // errno of what broke it, 0 when it was stopped
 
  private:
     bool addFile(const Descriptor& file, const std::string& name);
     bool addFolder(const Descriptor& folder, const std::string& name);
     bool addChild(const Descriptor& folder, const std::string& child, const std::string& name);
     bool begin(const std::string& name, const struct stat& status, long long size);
-    bool broken();
-    bool stopped();
+    bool recordFailure();
+    bool recordStop();
+    bool writeLeftOut();
     void miss(const std::string& name, int error, const char* reason = nullptr);
 
     struct archive* archive_;
     ZipObserver* observer_;
     int error_ = 0;
     std::vector<std::string> leftOut_;
+    long long leftOutUnsaid_ = 0;  // beyond those
     long long bytes_ = 0;
-    bool broken_ = false;
+    bool broken_ = false, begun_ = false;
     int depth_ = 0;
 };
 

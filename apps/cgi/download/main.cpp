@@ -35,11 +35,11 @@ std::string nameOf(const PathInfo& info, const Descriptor& found) {
     return name != "." && name != ".." ? name : lastComponent(realPathOf(found));
 }
 
-// Resolves, asks and opens one path as the user. 0 or a library code.
-int openSource(const User& user, const std::string& path, Source& source) {
+// Resolves, asks and opens a source as the user. 0 or a library code.
+int openSource(const User& user, Source& source) {
     PathInfo info;
     OrvLibSetErr(ORV_ERR_NONE);
-    if (!PathInfoFactory::create(user.name.c_str(), path, info)) return lastCode();
+    if (!PathInfoFactory::create(user.name.c_str(), source.asked, info)) return lastCode();
     OrvLibSetErr(ORV_ERR_NONE);
     if (!CheckShareDownloadPrivilege(user.name.c_str(), user.sid.c_str(), info.path.c_str())) {
         return lastCode(ORV_ERR_DENIED);
@@ -63,17 +63,15 @@ void serveDownloadProgram(Request& request, Output& out) {
     }
     const bool home =
         std::any_of(paths->begin(), paths->end(), [](const std::string& path) { return IsDirUserHome(path, nullptr); });
+    std::string culprit = paths->front();
+    std::vector<Source> sources;
+    const OpenSource open = [&user](Source& source) { return openSource(user, source); };
     int code = actAs(user.sid.c_str(), user.name, home);
-    if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), user.cookie, code, paths->front());
-
-    std::vector<Source> sources(paths->size());
-    for (size_t i = 0; i < sources.size(); ++i) {
-        code = openSource(user, (*paths)[i], sources[i]);
-        if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), user.cookie, code, (*paths)[i]);
-    }
+    if (code == ORV_ERR_NONE) code = findSources(*paths, open, sources, culprit);
+    if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), user.cookie, code, culprit);
     if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, user, sources[0]);
     const std::string only = sources.size() == 1 ? sources[0].name : "download";
-    serveZip(out, user, sources, web.GetParam("name", only));
+    serveZip(out, user, sources, web.GetParam("name", only), open);
 }
 
 }  // namespace orvel::cgi

@@ -8,10 +8,13 @@
 #include <cerrno>
 #include <cstdint>
 #include <cstdlib>
+#include <unordered_set>
+#include <utility>
 
 #include "confined.h"
 #include "download/archive.h"
 #include "download/range.h"
+#include "free_names.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 #include "text.h"
@@ -50,14 +53,15 @@ std::int64_t sendBytes(int file, ByteRange range) {
     return at - range.first;
 }
 
-// A name that no other member has: "a", "a (2)", "a (3)"...
-std::string freeName(std::vector<std::string>& used, const std::string& wanted) {
-    std::string name = wanted;
-    for (int count = 2; std::find(used.begin(), used.end(), name) != used.end(); ++count) {
-        name = wanted + " (" + std::to_string(count) + ")";
-    }
-    used.push_back(name);
-    return name;
+// Opens what was looked at when the request came. False, and said in the zip, when it is not that any more.
+bool openAgain(Source& source, const std::string& name, const OpenSource& open, ZipStream& zip) {
+    const struct stat before = source.status;
+    const int code = open(source);
+    const bool same = code == ORV_ERR_NONE && source.status.st_dev == before.st_dev &&
+                      source.status.st_ino == before.st_ino &&
+                      (source.status.st_mode & S_IFMT) == (before.st_mode & S_IFMT);
+    if (!same) zip.leaveOut(name, code != ORV_ERR_NONE ? reasonOf(code) : "replaced by something else meanwhile");
+    return same;
 }
 
 }  // namespace
@@ -67,6 +71,23 @@ int openFound(const Descriptor& found, const std::string& realPath, Source& sour
     if (!S_ISREG(source.status.st_mode) && !S_ISDIR(source.status.st_mode)) return ORV_ERR_DENIED;
     source.opened = Descriptor(open(found.path().c_str(), O_RDONLY | O_CLOEXEC));
     return source.opened ? ORV_ERR_NONE : refusalCode(errno, realPath);
+}
+
+int findSources(const std::vector<std::string>& paths, const OpenSource& open, std::vector<Source>& sources,
+                std::string& culprit) {
+    std::unordered_set<std::string> known;
+    for (const std::string& asked : paths) {
+        if (!known.insert(asked).second) continue;
+        Source source;
+        source.asked = culprit = asked;
+        const int code = open(source);
+        if (code != ORV_ERR_NONE) return code;
+        if (source.path != asked && !known.insert(source.path).second) continue;  // by another spelling
+        if (!sources.empty()) sources.front().opened.reset();
+        if (!sources.empty()) source.opened.reset();
+        sources.push_back(std::move(source));
+    }
+    return ORV_ERR_NONE;
 }
 
 Status httpStatusOf(int code) {
@@ -117,18 +138,23 @@ void serveFile(Output& out, const User& user, const Source& source) {
     OrvLibDoLog(user.name, source.path, sent, ORVEL_ACTION_DOWNLOAD, false);
 }
 
-void serveZip(Output& out, const User& user, std::vector<Source>& sources, const std::string& name) {
+void serveZip(Output& out, const User& user, std::vector<Source>& sources, const std::string& name,
+              const OpenSource& open) {
     putHeader(out, "Status: 200 OK");
     putCommon(out, user.cookie, name + ".zip", "application/zip");
     out.text() += "\r\n";
     if (variable("REQUEST_METHOD") == "HEAD" || !out.finish()) return;
     ZipStream zip(STDOUT_FILENO);
-    std::vector<std::string> used;
+    FreeNames names;
     for (Source& source : sources) {
         const long long before = zip.bytes();
-        if (!zip.add(source.opened, freeName(used, memberName(source.name)))) return;
-        OrvLibDoLog(user.name, source.path, zip.bytes() - before, ORVEL_ACTION_DOWNLOAD,
-                    S_ISDIR(source.status.st_mode));
+        const bool isFolder = S_ISDIR(source.status.st_mode);
+        const std::string member = names.take(memberName(source.name), isFolder);
+        if (!source.opened && !openAgain(source, member, open, zip)) continue;
+        const bool going = zip.add(source.opened, member);
+        source.opened.reset();
+        if (!going) return;
+        OrvLibDoLog(user.name, source.path, zip.bytes() - before, ORVEL_ACTION_DOWNLOAD, isFolder);
     }
     zip.finish();
 }

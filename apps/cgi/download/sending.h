@@ -4,6 +4,7 @@
 
 #include <sys/stat.h>
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -14,13 +15,22 @@
 
 namespace orvel::cgi {
 
-// A file or folder, open for reading.
+// A file or folder to be sent.
 struct Source {
-    std::string path;  // share-relative, for the log
-    std::string name;  // for the client to save it under
-    Descriptor opened;
+    std::string asked;  // the path as the request has it
+    std::string path;   // share-relative
+    std::string name;   // for the client to save it under
+    Descriptor opened;  // for reading; one of many is opened when its turn comes
     struct stat status {};
 };
+
+// Finds what `asked` says and opens it as the calling identity. 0 or a library code.
+using OpenSource = std::function<int(Source& source)>;
+
+// Looks at every path, once each, as what cannot be had must show in the status: `culprit` then. One source alone stays
+// open. 0 or a library code.
+int findSources(const std::vector<std::string>& paths, const OpenSource& open, std::vector<Source>& sources,
+                std::string& culprit);
 
 // Opens for reading what was found (opened O_PATH) when it is a file or folder: opening a device can already do
 // something. 0 or a library code; `realPath` is where it lies.
@@ -30,9 +40,11 @@ int openFound(const Descriptor& found, const std::string& realPath, Source& sour
 Status httpStatusOf(int code);
 
 // Answer a request for one file (HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since), and for
-// anything else as a zip named `name` + ".zip"; both write the log entry of `user`.
+// anything else as a zip named `name` + ".zip"; both write the log entry of `user`. A source that is not open is opened
+// when its turn comes, and has to be what it was.
 void serveFile(Output& out, const User& user, const Source& source);
-void serveZip(Output& out, const User& user, std::vector<Source>& sources, const std::string& name);
+void serveZip(Output& out, const User& user, std::vector<Source>& sources, const std::string& name,
+              const OpenSource& open);
 
 }  // namespace orvel::cgi
 

@@ -16,9 +16,9 @@
 #include <vector>
 
 #include "link_making.h"
+#include "public_link.h"
 #include "orvel/error_state.h"
 #include "program/program.h"
-#include "public_link.h"
 #include "reply.h"
 #include "request.h"
 #include "vexo/user.h"
@@ -88,8 +88,7 @@ void serveLinkProgram(Request& request, Output& out) {
     if (action == "create") code = create(web, user, data, path);
     if (action == "list") code = list(user, data);
     if (action == "revoke") code = revoke(web, user);
-    const Status status = code == ORV_ERR_PARAMETER ? Status::kBadRequest : Status::kOk;
-    reply(out, status, user.cookie, code, path, data);
+    reply(out, statusOf(code), user.cookie, code, path, data);
 }
 
 }  // namespace orvel::cgi

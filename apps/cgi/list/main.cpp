@@ -62,7 +62,7 @@ void serveListProgram(Request& request, Output& out) {
     Listing listing;
     int code = actAs(user.sid.c_str(), user.name, shares || IsDirUserHome(wanted->path, nullptr));
     if (code == ORV_ERR_NONE) code = shares ? listShares(*wanted, listing) : listFolder(*wanted, listing);
-    if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, wanted->path);
+    if (code != ORV_ERR_NONE) return replyFailure(out, statusOf(code), user.cookie, code, wanted->path);
 
     beginReply(out, Status::kOk, user.cookie);
     out.text() += "{\"success\":true,";

@@ -15,11 +15,12 @@ namespace orvel::cgi {
 namespace {
 
 constexpr std::int64_t kForm = std::int64_t{1} << 20;
+constexpr std::int64_t kLongForm = std::int64_t{16} << 20;  // a hundred thousand paths
 constexpr std::int64_t kAnyLength = std::numeric_limits<std::int64_t>::max();
 constexpr std::string_view kAsking = "GET, HEAD, POST";
 
 constexpr Program kPrograms[] = {{"list", kAsking, kForm, Caller::kUser, serveListProgram},
-                                 {"download", kAsking, kForm, Caller::kUser, serveDownloadProgram},
+                                 {"download", kAsking, kLongForm, Caller::kUser, serveDownloadProgram},
                                  {"link", kAsking, kForm, Caller::kUser, serveLinkProgram},
                                  {"operation", kAsking, kForm, Caller::kUser, serveOperationProgram},
                                  {"search", kAsking, kForm, Caller::kUser, serveSearchProgram},
@@ -75,7 +76,7 @@ void answer(const Program& program, Output& out) {
         return;
     }
     if (announcesTooMuch(program)) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
-    VEXO::WebCGI web;
+    VEXO::WebCGI web(static_cast<unsigned long>(program.bodyLimit == kAnyLength ? kForm : program.bodyLimit));
     if (web.BodyRefused()) return replyFailure(out, Status::kTooLarge, user.cookie, ORV_ERR_PARAMETER, "");
     Request request = {.user = user, .web = web};
     program.serve(request, out);

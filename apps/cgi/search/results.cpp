@@ -66,7 +66,7 @@ void listResults(Output& out, const User& user, const VEXO::WebCGI& web, const S
     const Json::Value state = stateOf(*task.record);
     Listing listing;
     const int code = task.results == nullptr ? ORV_ERR_MISSING : readResults(*request, *task.results, listing);
-    if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, "");
+    if (code != ORV_ERR_NONE) return replyFailure(out, statusOf(code), user.cookie, code, "");
 
     beginReply(out, Status::kOk, user.cookie);
     out.text() += "{\"success\":true,\"data\":";

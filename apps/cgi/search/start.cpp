@@ -121,8 +121,7 @@ void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
     int code = parseCriteria([&web](const std::string& name) { return web.GetParam(name, ""); }, criteria, culprit);
     if (code != ORV_ERR_NONE) {
         if (!culprit.empty()) data["parameter"] = culprit;
-        const Status status = code == ORV_ERR_PARAMETER ? Status::kBadRequest : Status::kOk;
-        return reply(out, status, user.cookie, code, "", data);
+        return reply(out, statusOf(code), user.cookie, code, "", data);
     }
     std::vector<std::string> folders;
     code = actAs(user.sid.c_str(), user.name, anyHome(*paths));
@@ -133,7 +132,7 @@ void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
         code = beginSearch(user, folders, recursive == "true", criteria, id);
         if (code == ORV_ERR_NONE) data["taskid"] = id;
     }
-    reply(out, Status::kOk, user.cookie, code, culprit, data);
+    reply(out, statusOf(code), user.cookie, code, culprit, data);
 }
 
 }  // namespace orvel::cgi

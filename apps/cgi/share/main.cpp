@@ -184,22 +184,21 @@ void serveList(Output& out, Visit& visit, const std::string& wanted) {
 // Each place once, however often it is named: a visitor could have the same folder packed again and again.
 void serveDownload(Output& out, Visit& visit, std::vector<std::string> wanted) {
     if (wanted.empty()) wanted.emplace_back();
-    std::vector<Source> sources;
-    std::set<std::string> seen;
-    for (const std::string& path : wanted) {
+    const OpenSource open = [&visit](Source& source) {
         Place place;
-        Source source;
-        int code = findPlace(visit.link().owner, visit.link().path, path, place);
-        if (code == ORV_ERR_NONE && !seen.insert(place.within).second) continue;
-        if (code == ORV_ERR_NONE) code = openFound(place.found, place.realPath, source);
-        if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), "", code, path);
+        const int code = findPlace(visit.link().owner, visit.link().path, source.asked, place);
+        if (code != ORV_ERR_NONE) return code;
         source.path = place.path;
         source.name = place.name;
-        sources.push_back(std::move(source));
-    }
+        return openFound(place.found, place.realPath, source);
+    };
+    std::vector<Source> sources;
+    std::string culprit;
+    const int code = findSources(wanted, open, sources, culprit);
+    if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), "", code, culprit);
     const User owner = {.name = visit.link().owner, .sid = "", .cookie = ""};
     if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, owner, sources[0]);
-    serveZip(out, owner, sources, sources.size() == 1 ? sources[0].name : "download");
+    serveZip(out, owner, sources, sources.size() == 1 ? sources[0].name : "download", open);
 }
 
 Status statusOf(Availability availability) {

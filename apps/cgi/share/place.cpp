@@ -47,6 +47,10 @@ int findPlace(const std::string& owner, const std::string& sharedPath, const std
     const auto below = pathInShare(info, shared);
     place.found = rest.empty() ? std::move(shared) : openBeneath(shared, rest, linkPolicyOf(info.shareName), O_PATH);
     if (!place.found) return refusalCode(errno, info.realPath);
+    if (!rest.empty()) {
+        const Descriptor root(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+        if (!root || isHiddenPlace(root, place.found)) return ORV_ERR_MISSING;
+    }
     place.realPath = realPathOf(place.found);
     if (!below || top.empty() || !place.realPath.starts_with(top)) return ORV_ERR_DENIED;
     place.within = place.realPath.substr(top.size());

@@ -88,7 +88,7 @@ void serveWhyProgram(Request& request, Output& out) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
     int code = actAs(user.sid.c_str(), user.name, IsDirUserHome(*path, nullptr));
-    if (code != ORV_ERR_NONE) return replyFailure(out, Status::kOk, user.cookie, code, *path);
+    if (code != ORV_ERR_NONE) return replyFailure(out, statusOf(code), user.cookie, code, *path);
     PrivilegeReason reason;
     OrvLibSetErr(ORV_ERR_NONE);
     if (!ExplainPrivilege(path->c_str(), user.name.c_str(), user.sid.c_str(), reason)) {
