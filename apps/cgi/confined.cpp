@@ -2,8 +2,10 @@
 
 #include <fcntl.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <memory>
+#include <string_view>
 
 #include "orvel/error_state.h"
 #include "orvel/privilege.h"
@@ -47,6 +49,18 @@ LinkPolicy linkPolicyOf(const std::string& shareName) {
     return VexoConf::Info().Get("link_policy_" + name, "inside") == "inside" ? LinkPolicy::kInside : LinkPolicy::kNone;
 }
 
+bool isHiddenPlace(const Descriptor& root, const Descriptor& opened) {
+    const auto within = pathBetween(root, opened);
+    if (!within) return false;  // moved away since
+    std::string_view rest = *within;
+    while (!rest.empty()) {
+        const size_t end = std::min(rest.find('/'), rest.size());
+        if (VEXOEAIsHiddenFile(std::string(rest.substr(0, end)).c_str()) != 0) return true;
+        rest.remove_prefix(std::min(end + 1, rest.size()));
+    }
+    return false;
+}
+
 int refusalCode(int error, const std::string& realPath) {
     if (error == EXDEV || error == ELOOP) return ORV_ERR_DENIED;
     if (isServerDown(error) && VEXOFSIsInMountTable(realPath.c_str()) != -1 && VEXOFSIsRemoteFS() == 1) {
@@ -68,6 +82,7 @@ int confinedFolder(const PathInfo& info, LinkPolicy policy, Descriptor& folder, 
     if (!root) return folderRefusalCode(errno, info.shareRoot);
     folder = openBeneath(root, pathBelow(info.shareRoot, info.realPath), policy, O_PATH | O_DIRECTORY);
     if (!folder) return folderRefusalCode(errno, info.realPath);
+    if (isHiddenPlace(root, folder)) return ORV_ERR_MISSING;
     const auto within = pathBetween(root, folder);
     if (!within) return ORV_ERR_DIRECTORY;
     realPath = info.shareRoot + *within;
@@ -78,7 +93,8 @@ int confinedOpen(const PathInfo& info, LinkPolicy policy, int flags, Descriptor&
     const Descriptor root = openRoot(info);
     if (!root) return refusalCode(errno, info.shareRoot);
     opened = openBeneath(root, pathBelow(info.shareRoot, info.realPath), policy, flags);
-    return opened ? ORV_ERR_NONE : refusalCode(errno, info.realPath);
+    if (!opened) return refusalCode(errno, info.realPath);
+    return isHiddenPlace(root, opened) ? ORV_ERR_MISSING : ORV_ERR_NONE;
 }
 
 std::optional<std::string> pathInShare(const PathInfo& info, const Descriptor& opened) {

@@ -32,6 +32,10 @@ int confinedOpen(const PathInfo& info, LinkPolicy policy, int flags, Descriptor&
 // Nothing when it lies elsewhere by now, or deeper than a path can tell.
 std::optional<std::string> pathInShare(const PathInfo& info, const Descriptor& opened);
 
+// Whether what was opened beneath the share's root is, or lies in, something that the file manager never shows: then it
+// is not there for anybody.
+bool isHiddenPlace(const Descriptor& root, const Descriptor& opened);
+
 // The library code for a confined opening that failed with `error`.
 int refusalCode(int error, const std::string& realPath);
 

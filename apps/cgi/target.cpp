@@ -9,9 +9,11 @@
 #include <string_view>
 #include <vector>
 
+#include "base/new_file.h"
 #include "orvel/error_state.h"
 #include "orvel/name_check.h"
 #include "reply.h"
+#include "vexo/filesystem.h"
 #include "vexo/user.h"
 
 namespace orvel::cgi {
@@ -40,7 +42,7 @@ std::string joined(const std::vector<std::string>& components, size_t count) {
 void handOver(const Descriptor& made, const std::string& user) {
     uid_t uid = 0;
     gid_t gid = 0;
-    if (geteuid() != 0 || VEXOUserGetUGID(user.c_str(), &uid, &gid) != 0) return;
+    if (VEXOUserGetUGID(user.c_str(), &uid, &gid) != 0) return;
     [[maybe_unused]] const int ignored = fchownat(made.get(), "", uid, gid, AT_EMPTY_PATH);  // FAT keeps no owners
 }
 
@@ -65,21 +67,34 @@ int enter(const PathInfo& info, LinkPolicy policy, Way& way, Target& target) {
     if (!way.root) return refusalCode(errno, info.shareRoot);
     for (way.existing = way.folders.size();; --way.existing) {
         target.folder = openBeneath(way.root, joined(way.folders, way.existing), policy, O_PATH | O_DIRECTORY);
-        if (target.folder) return ORV_ERR_NONE;
+        if (target.folder) return isHiddenPlace(way.root, target.folder) ? ORV_ERR_RESERVED_NAME : ORV_ERR_NONE;
         if (errno != ENOENT || way.existing == 0) return refusalCode(errno, info.realPath);
     }
 }
 
 }  // namespace
 
-int makeFolder(const Descriptor& folder, const std::string& name, const std::string& user, Descriptor& made) {
+int checkNewName(const Descriptor& folder, const std::string& name) {
+    if (VEXOEAIsHiddenFile(name.c_str()) != 0) return ORV_ERR_RESERVED_NAME;
     OrvLibSetErr(ORV_ERR_NONE);
-    if (OrvCheckFileName(realPathOf(folder).c_str(), name.c_str()) != 0) return lastCode();
-    if (mkdirat(folder.get(), name.c_str(), kFolderMode) != 0) return OrvParseErrnoToError(errno, nullptr, nullptr);
-    made = Descriptor(openat(folder.get(), name.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-    if (!made) return OrvParseErrnoToError(errno, nullptr, nullptr);
-    handOver(made, user);
-    return ORV_ERR_NONE;
+    return OrvCheckFileName(realPathOf(folder).c_str(), name.c_str()) == 0 ? ORV_ERR_NONE : lastCode();
+}
+
+int makeFolder(const Descriptor& folder, const std::string& name, const std::string& user, Descriptor& made) {
+    const int code = checkNewName(folder, name);
+    if (code != ORV_ERR_NONE) return code;
+    const bool handed = geteuid() == 0;  // then it has its owner before it has its name
+    const std::string first = handed ? drawPartName() : name;
+    if (first.empty() || mkdirat(folder.get(), first.c_str(), kFolderMode) != 0) {
+        return OrvParseErrnoToError(errno, nullptr, nullptr);
+    }
+    made = Descriptor(openat(folder.get(), first.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    if (made && handed) handOver(made, user);
+    if (made && (!handed || renameNew(folder.get(), first, folder.get(), name))) return ORV_ERR_NONE;
+    const int error = errno;
+    made.reset();
+    unlinkat(folder.get(), first.c_str(), AT_REMOVEDIR);
+    return OrvParseErrnoToError(error, nullptr, nullptr);
 }
 
 int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target) {
@@ -106,22 +121,28 @@ int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user,
     return ORV_ERR_NONE;
 }
 
+int openPresent(const PathInfo& info, const std::string& user, Target& target) {
+    const int code = openTarget(info, linkPolicyOf(info.shareName), user, Missing::kRefuse, target);
+    if (code == ORV_ERR_NONE) return VEXOEAIsHiddenFile(target.name.c_str()) == 0 ? ORV_ERR_NONE : ORV_ERR_MISSING;
+    return code == ORV_ERR_RESERVED_NAME && target.folder ? static_cast<int>(ORV_ERR_MISSING) : code;
+}
+
 int previewTarget(const PathInfo& info, LinkPolicy policy, Target& target, std::string& within) {
     Way way;
-    const int code = enter(info, policy, way, target);
+    int code = enter(info, policy, way, target);
     if (code != ORV_ERR_NONE) return code;
     const std::string top = realPathOf(way.root), deepest = realPathOf(target.folder);
     if (!deepest.starts_with(top) || top.empty()) return refusalCode(ENAMETOOLONG, info.realPath);
     within = deepest.substr(top.size());
-    if (way.existing < way.folders.size()) target.folder = Descriptor();
     way.folders.push_back(target.name);
     for (size_t i = way.existing; i < way.folders.size(); ++i) {
         const std::string& name = way.folders[i];
-        OrvLibSetErr(ORV_ERR_NONE);
-        if (OrvCheckFileName(deepest.c_str(), name.c_str()) != 0) return lastCode();
+        code = checkNewName(target.folder, name);
+        if (code != ORV_ERR_NONE) return code;
         if (name.size() > NAME_MAX) return OrvParseErrnoToError(ENAMETOOLONG, info.shareName.c_str(), nullptr);
         within += "/" + name;
     }
+    if (way.existing + 1 < way.folders.size()) target.folder = Descriptor();
     return ORV_ERR_NONE;
 }
 

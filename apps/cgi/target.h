@@ -32,12 +32,19 @@ enum class Missing { kRefuse, kMake };
 // making; after a failure no folder made here is left.
 int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target);
 
+// Opens the folder of something that must be there. As above; 408 for what the file manager never shows.
+int openPresent(const PathInfo& info, const std::string& user, Target& target);
+
 // Asks what openTarget would ask without making anything. The same codes; on 0, `target.folder` is open only when it
 // exists already, and `within` is the target's path below the share root with no link in front of its name.
 int previewTarget(const PathInfo& info, LinkPolicy policy, Target& target, std::string& within);
 
 // Removes the folders made on the way, as far as they are empty: for when the target was not made after all.
 void removeMadeFolders(Target& target);
+
+// Whether something of this name may be made in the folder: 0, 418 for what the file manager never shows, or a code of
+// OrvCheckFileName.
+int checkNewName(const Descriptor& folder, const std::string& name);
 
 // Makes the folder `name` in `folder`, owned as above, and opens it O_PATH. EEXIST gives 414.
 int makeFolder(const Descriptor& folder, const std::string& name, const std::string& user, Descriptor& made);

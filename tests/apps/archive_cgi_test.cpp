@@ -155,7 +155,7 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
     for (const char* name : {"/torn.tar.xz", "/cut.zip"}) {
         ASSERT_EQ(truncate((video_ + name).c_str(), static_cast<off_t>(fs::file_size(video_ + name) * 3 / 4)), 0);
     }
-    pack(video_ + "/secret.zip", "zip", nullptr, {{"hidden", AE_IFREG, "1"}}, "password");
+    pack(video_ + "/secret.zip", "zip", nullptr, {{"hidden", AE_IFREG, "1"}, {"too", AE_IFREG, "1"}}, "password");
     writeFile(video_ + "/none.zip", "no archive at all");
     writeFile(video_ + "/empty.zip", "");
     const auto extract = [](const std::string& name) {
@@ -172,7 +172,7 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
     pack(video_ + "/deep.tar", "ustar", nullptr, {{(deep + "/x").c_str(), AE_IFREG, "1"}});
     EXPECT_EQ(extract("deep.tar"), "/video/t/" + deep + "/x 1007\n/video/deep.tar 1007\n");
     EXPECT_EQ(extract("good.zip"), "");
-    EXPECT_EQ(extract("secret.zip"), "/video/t/hidden 1403\n");
+    EXPECT_EQ(extract("secret.zip"), "/video/secret.zip 1403\n") << "not a member";
     EXPECT_EQ(extract("none.zip"), "/video/none.zip 1401\n");
     EXPECT_EQ(extract("empty.zip"), "/video/empty.zip 1401\n");
     EXPECT_NE(extract("torn.tar.xz").find("/video/torn.tar.xz 1402"), std::string::npos);
@@ -191,8 +191,13 @@ TEST_F(TaskCgi, WhatWasCompressedComesBackTheSame) {
     const Json::Value task =
         perform("alice", "action=compress" + about({"/photo/c", "/photo/c/a", "/photo/c/d"}, "/video/c.zip"));
     EXPECT_EQ(errors(task), "/photo/c/closed 407\n");
-    EXPECT_EQ(task["state"], "done");
+    EXPECT_EQ(task["state"], "failed") << "whoever reads that it is done removes what was packed";
     EXPECT_EQ(code(ask("alice", "action=compress" + about({"/photo/c"}, "/video/c.zip"))), 414);
+    EXPECT_EQ(errors(perform("alice", "action=extract" + about({"/video/c.zip"}, "/video"))), "");
+    EXPECT_NE(readFile(video_ + "/_not_included.txt").find("c/closed: Permission denied\n"), std::string::npos);
+    for (const char* unpacked : {"/c", "/a", "/d", "/_not_included.txt"}) fs::remove_all(video_ + unpacked);
+    EXPECT_EQ(perform("alice", "action=compress" + about({"/photo/none"}, "/video/none.zip"))["state"], "failed");
+    EXPECT_FALSE(fs::exists(video_ + "/none.zip")) << "nothing is packed";
     fs::remove(photo_ + "/c/closed");
     EXPECT_EQ(errors(perform("alice", "action=compress&conflict=keep_both" + about({"/photo/c"}, "/video/c.zip"))), "");
     EXPECT_EQ(errors(perform("alice", "action=extract" + about({"/video/c (2).zip"}, "/video"))), "");

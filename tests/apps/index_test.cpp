@@ -93,7 +93,8 @@ class Index : public ApplianceTest {
 
 TEST_F(Index, AnUpdateMakesWhatABuildWouldMake) {
     SKIP_WITHOUT_ROOT();
-    for (const std::string folder : {"/same", "/a", "/b", "/swap1", "/swap2", "/gone", "/kind", "/moved/from", "/in/*"}) {
+    for (const std::string folder :
+         {"/same", "/a", "/b", "/swap1", "/swap2", "/gone", "/kind", "/moved/from", "/in/*"}) {
         for (const std::string path : {"/sub/deep/f", "/sub/g", "/h"}) file(folder + path + folder.substr(1, 1));
     }
     EXPECT_EQ(run({"index", "update", "photo"}).status, 1) << "no index yet";

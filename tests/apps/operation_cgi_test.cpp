@@ -30,7 +30,12 @@ TEST_F(OperationCgi, RequestsAreTakenStrictly) {
     }
     EXPECT_EQ(ask("alice", "action=mkdir&path=/photo/x", "GET").status, 400) << "a link must change nothing";
     EXPECT_FALSE(fs::exists(shareRoot("photo") + "/x"));
-    EXPECT_EQ(code(ask("alice", "action=mkdir&path=")), 400);
+    // However late a parameter shows to be wrong.
+    for (const char* form :
+         {"action=mkdir&path=", "action=rename&path=/photo", "action=copy&path=/photo/x&target=/photo&conflict=x"}) {
+        const CgiReply reply = ask("alice", form);
+        EXPECT_TRUE(reply.status == 400 && code(reply) == 400) << form;
+    }
 }
 
 TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
@@ -39,15 +44,29 @@ TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
     const std::string fat = addShare("usb", "read only = no\n");
     addMount(fat, "vfat");
     makeFolder(root + "/root's", 0755);
+    makeFolder(root + "/old/@tmp", 0777);
     fs::create_symlink("/tmp", root + "/outside");
-    for (const auto& [user, path, more, code] : Rows<std::string, std::string, std::string, int>{
-             row("alice", "/photo/a", "", 0), row("alice", "/photo/a/", "", 414), row("alice", "/photo/p/q/r", "", 408),
-             row("alice", "/photo/p/q/._r", "&parents=true", 418), row("alice", "/photo/p/q/r", "&parents=true", 0),
-             row("carol", "/photo/c", "", 0), row("bob", "/photo/b", "", 407), row("bob", "/home/b", "", 0),
-             row("alice", "/photo/root's/x", "", 407), row("alice", "/photo/outside/x", "", 407),
-             row("alice", "/photo", "", 400), row("alice", "/photo/a/..", "", 418), row("alice", "/photo/a:b", "", 418),
-             row("alice", "/nowhere/x", "", 408), row("alice", "/usb/a|b", "", 419),
-             row("alice", "/photo/" + std::string(256, 'n'), "", 412)}) {
+    for (const auto& [user, path, more, code] :
+         Rows<std::string, std::string, std::string, int>{row("alice", "/photo/a", "", 0),
+                                                          row("alice", "/photo/a/", "", 414),
+                                                          row("alice", "/photo/p/q/r", "", 408),
+                                                          row("alice", "/photo/p/q/._r", "&parents=true", 418),
+                                                          row("alice", "/photo/p/q/r", "&parents=true", 0),
+                                                          row("carol", "/photo/c", "", 0),
+                                                          row("bob", "/photo/b", "", 407),
+                                                          row("bob", "/home/b", "", 0),
+                                                          row("alice", "/photo/root's/x", "", 407),
+                                                          row("alice", "/photo/outside/x", "", 407),
+                                                          row("alice", "/photo/@tmp", "", 418),
+                                                          row("alice", "/photo/p/@tmp/x", "&parents=true", 418),
+                                                          row("alice", "/photo/old/@tmp/x", "", 418),
+                                                          row("alice", "/photo/.vexo-part-x", "", 418),
+                                                          row("alice", "/photo", "", 400),
+                                                          row("alice", "/photo/a/..", "", 418),
+                                                          row("alice", "/photo/a:b", "", 418),
+                                                          row("alice", "/nowhere/x", "", 408),
+                                                          row("alice", "/usb/a|b", "", 419),
+                                                          row("alice", "/photo/" + std::string(256, 'n'), "", 412)}) {
         EXPECT_EQ(mkdir(user, path, more), code) << path << more;
     }
     const std::pair<std::string, unsigned> made[] = {{root + "/a", kAliceUid},
@@ -71,25 +90,41 @@ TEST_F(OperationCgi, RenamingReplacesNothing) {
     makeFolder(root + "/folder", 0777);
     makeFolder(root + "/folder/empty", 0777);
     makeFolder(root + "/root's", 0755);
-    for (const std::string file : {"/one", "/two", "/root's/f", "/folder/f"}) writeFile(root + file, file);
+    for (const std::string file : {"/one", "/two", "/root's/f", "/folder/f", "/hidden/@tmp/x"})
+        writeFile(root + file, file);
     writeFile(fat + "/f", "x");
     writeFile(shareRoot("archive") + "/f", "x");
     fs::create_symlink("folder", root + "/inside");
     fs::create_symlink("/etc", root + "/outside");
-    for (const auto& [user, path, name, code] : Rows<std::string, std::string, std::string, int>{
-             row("alice", "/photo/one", "two", 414), row("alice", "/photo/folder", "one", 414),
-             row("alice", "/photo/one", "one", 0), row("alice", "/photo/folder", "folder", 0),
-             row("alice", "/photo/one", "", 400), row("alice", "/photo/one", "folder/one", 418),
-             row("alice", "/photo/one", "a:b", 418), row("alice", "/photo/one", std::string(256, 'n'), 412),
-             row("alice", "/photo/missing", "x", 408), row("alice", "/photo", "x", 400),
-             row("alice", "/photo/folder/..", "x", 418), row("alice", "/photo/root's/f", "x", 407),
-             row("alice", "/photo/outside/passwd", "x", 407), row("bob", "/photo/one", "x", 407),
-             row("alice", "/archive/f", "x", 407), row("alice", "/usb/f", "a?", 419),
-             row("alice", "/photo/inside/f", "g\nh", 0), row("alice", "/photo/outside", "link", 0),
-             row("alice", "/photo/one", "ONE", 0)}) {
+    for (const auto& [user, path, name, code] :
+         Rows<std::string, std::string, std::string, int>{row("alice", "/photo/one", "two", 414),
+                                                          row("alice", "/photo/folder", "one", 414),
+                                                          row("alice", "/photo/one", "one", 0),
+                                                          row("alice", "/photo/folder", "folder", 0),
+                                                          row("alice", "/photo/one", "", 400),
+                                                          row("alice", "/photo/one", "folder/one", 418),
+                                                          row("alice", "/photo/one", "@tmp", 418),
+                                                          row("alice", "/photo/hidden/@tmp/x", "y", 408),
+                                                          row("alice", "/photo/hidden/@tmp", "y", 408),
+                                                          row("alice", "/photo/one", ".vexo-part-x", 418),
+                                                          row("alice", "/photo/one", "a:b", 418),
+                                                          row("alice", "/photo/one", std::string(256, 'n'), 412),
+                                                          row("alice", "/photo/missing", "x", 408),
+                                                          row("alice", "/photo", "x", 400),
+                                                          row("alice", "/photo/folder/..", "x", 418),
+                                                          row("alice", "/photo/root's/f", "x", 407),
+                                                          row("alice", "/photo/outside/passwd", "x", 407),
+                                                          row("bob", "/photo/one", "x", 407),
+                                                          row("alice", "/archive/f", "x", 407),
+                                                          row("alice", "/usb/f", "a?", 419),
+                                                          row("alice", "/photo/inside/f", "g\nh", 0),
+                                                          row("alice", "/photo/outside", "link", 0),
+                                                          row("alice", "/photo/one", "ONE", 0)}) {
         EXPECT_EQ(rename(user, path, name), code) << path << " to " << name;
     }
     EXPECT_EQ(readFile(root + "/ONE"), "/one");
+    EXPECT_EQ(ask("alice", "action=rename&path=/photo/ONE&name=two").json["error"]["path"], "/photo/two");
+    EXPECT_EQ(code(ask("alice", "action=subfolders&path=/photo/hidden/@tmp", "GET")), 408);
     EXPECT_EQ(readFile(root + "/two"), "/two");
     EXPECT_EQ(readFile(root + "/folder/g\nh"), "/folder/f");
     EXPECT_EQ(fs::read_symlink(root + "/link"), "/etc");
@@ -134,6 +169,7 @@ TEST_F(OperationCgi, TheTransferLogTellsWhatChanged) {
     const std::string text = readFile(log);
     EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 2) << text;
     EXPECT_LT(text.find("\"mkdir\""), text.find("\"rename\"")) << text;
+    EXPECT_EQ(text.find("\"flag\":false"), std::string::npos) << "both are folders" << text;
 }
 
 TEST_F(OperationCgi, NamesThatAreTakenAreToldInOneQuestion) {

@@ -58,6 +58,9 @@ TEST_F(TaskCgi, WhatIsDeletedCanBePutBack) {
     EXPECT_EQ(remove({"/photo/kept"}), "/photo/kept 407\n") << "a bin that is closed is a bin";
     EXPECT_EQ(readFile(photo_ + "/kept"), "x");
     ASSERT_EQ(chmod(bin.c_str(), 0777), 0);
+    writeFile(photo_ + "/fixed/f", "x", 0666);
+    EXPECT_EQ(remove({"/photo/fixed/f"}), "/photo/fixed/f 407\n");
+    EXPECT_FALSE(fs::exists(bin + "/fixed")) << "what failed leaves no folder in the bin";
     writeFile(bin + "/@tmp (#2)", "x", 0666);
     EXPECT_EQ(restore({"/photo/#recycle/@tmp (#2)"}), "/photo/#recycle/@tmp (#2) 418\n");
     fs::remove(bin + "/@tmp (#2)");
@@ -70,7 +73,8 @@ TEST_F(TaskCgi, WhatIsDeletedCanBePutBack) {
     EXPECT_EQ(code(ask("alice", "action=empty&path=/video")), 408) << "no bin";
     const std::string log = readFile(systemRoot() + "/var/log/vexo/xfer.log");
     EXPECT_EQ(std::count(log.begin(), log.end(), '\n'), 14) << log;
-    EXPECT_NE(log.find(R"("action":"delete","size":0,"path":"/photo/a/b/f.txt")"), std::string::npos);
+    EXPECT_NE(log.find(R"("action":"delete","size":0,"path":"/photo/a/b/f.txt","flag":false)"), std::string::npos);
+    EXPECT_NE(log.find(R"("action":"delete","size":0,"path":"/photo/a","flag":true)"), std::string::npos);
 }
 
 }  // namespace

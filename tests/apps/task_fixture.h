@@ -95,7 +95,7 @@ class TaskCgi : public support::ApplianceTest {
     static std::string recordOf(const std::string& id) { return systemRoot() + "/var/lib/vexo/tasks/alice/" + id; }
     static bool hasParts(const std::string& root) {
         for (const auto& entry : fs::recursive_directory_iterator(root)) {
-            if (entry.path().filename().string().starts_with(".part-")) return true;
+            if (entry.path().filename().string().starts_with(".vexo-part-")) return true;
         }
         return false;
     }

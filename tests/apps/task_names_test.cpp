@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "operation/conflict.h"
+#include "free_names.h"
 #include "operation/member_path.h"
 #include "operation/recycle.h"
 #include "text.h"
@@ -24,6 +24,11 @@ TEST(OperationNames, AreNumberedBeforeTheirEnding) {
     for (const auto& [name, numbered, isFolder] : cases) {
         EXPECT_EQ(orvel::cgi::numberedName(name, 2, isFolder), numbered);
     }
+    orvel::cgi::FreeNames names;
+    for (const char* free : {"a.txt", "a (2).txt", "a (3).txt"}) EXPECT_EQ(names.take("a.txt", false), free);
+    EXPECT_EQ(names.take("a (2).txt", false), "a (2) (2).txt");
+    EXPECT_EQ(names.take("a (4).txt", false), "a (4).txt");
+    EXPECT_EQ(names.take("a.txt", false), "a (5).txt");
     std::string wide;
     while (wide.size() < 255) wide += "\xE2\x82\xAC";
     EXPECT_TRUE(orvel::cgi::isUtf8(orvel::cgi::numberedName(wide, 10, true))) << "no character is cut";

@@ -7,6 +7,7 @@
 
 #include "apps/task_fixture.h"
 #include "platform/private_mounts.h"
+#include "support/refuse_calls.h"
 
 namespace {
 
@@ -213,7 +214,9 @@ TEST_F(TaskCgi, MovesAreRenamesOrCopiesThatGo) {
     const std::string other = addShare("other", "read only = no\n");
     for (const char* file : {"/d/x", "/e/sub/y", "/stuck/z"}) writeFile(photo_ + file, file, 0666);
     writeFile(photo_ + "/e/@vexoea/meta", "", 0666);
-    for (const char* folder : {"/d", "/e", "/e/sub", "/e/@vexoea"}) give(photo_ + folder);
+    writeFile(photo_ + "/e/@tmp/f", "theirs", 0666);
+    writeFile(photo_ + "/e/.vexo-part-x", "of a killed process", 0666);
+    for (const char* folder : {"/d", "/e", "/e/sub", "/e/@vexoea", "/e/@tmp"}) give(photo_ + folder);
     struct stat before {
     }, after{};
     ASSERT_EQ(stat((photo_ + "/d/x").c_str(), &before), 0);
@@ -226,10 +229,11 @@ TEST_F(TaskCgi, MovesAreRenamesOrCopiesThatGo) {
         EXPECT_EQ(before.st_ino, after.st_ino);
         task = perform("alice", "action=move" + about({"/photo/e", "/photo/stuck/z"}, "/other"));
         EXPECT_EQ(errors(task), "/photo/stuck/z 407\n");
-        EXPECT_EQ(task["items_done"], 3);
+        EXPECT_EQ(task["items_done"], 3) << "what is never shown is not counted";
         EXPECT_EQ(task["items_total"], 4);
-        EXPECT_EQ(readFile(other + "/e/sub/y"), "/e/sub/y");
-        EXPECT_FALSE(fs::exists(photo_ + "/e")) << "with what is never shown";
+        EXPECT_EQ(readFile(other + "/e/sub/y") + readFile(other + "/e/@tmp/f"), "/e/sub/ytheirs");
+        EXPECT_TRUE(fs::exists(other + "/e/@vexoea/meta"));
+        EXPECT_FALSE(fs::exists(photo_ + "/e"));
         EXPECT_EQ(readFile(other + "/z") + readFile(photo_ + "/stuck/z"), "/stuck/z/stuck/z") << "lost nowhere";
         if (mount("none", (video_ + "/d").c_str(), "tmpfs", 0, "mode=0777") != 0) return support::kNoPrivateMounts;
         writeFile(video_ + "/d/theirs", "x", 0666);
@@ -237,6 +241,37 @@ TEST_F(TaskCgi, MovesAreRenamesOrCopiesThatGo) {
         EXPECT_EQ(readFile(video_ + "/d/theirs"), "x") << "mounted ones stay";
         return 0;
     }));
+}
+
+// A move to another file system whose copy does not come to the disk, or not to its end, leaves the source.
+TEST_F(TaskCgi, NothingIsRemovedBeforeItsCopyIsOnTheDisk) {
+    SKIP_WITHOUT_ROOT();
+    const std::string other = addShare("other", "read only = no\n");
+    struct {
+        support::Refusal refusal;
+        bool single;  // what was chosen by itself stays, too
+    } const cases[] = {{{SYS_fsync, EIO}, true},
+                       {{SYS_syncfs, EIO}, false},
+                       {{SYS_fsync, support::kKilled}, true},
+                       {{SYS_syncfs, support::kKilled}, true},
+                       {{SYS_unlinkat, EACCES}, true},
+                       {{SYS_unlinkat, support::kKilled}, true},
+                       {{SYS_ftruncate, EIO}, true}};
+    for (const auto& [refusal, single] : cases) {
+        SCOPED_TRACE(std::to_string(refusal.call) + " " + std::to_string(refusal.systemCode));
+        for (const char* file : {"/t/a", "/t/sub/b", "/t/sub/c", "/single"}) writeFile(photo_ + file, file, 0666);
+        for (const char* folder : {"/t", "/t/sub"}) give(photo_ + folder);
+        EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&, wanted = refusal, stays = single] {
+            if (mount("none", other.c_str(), "tmpfs", 0, "mode=0777") != 0) return support::kNoPrivateMounts;
+            if (!support::refuseCalls({wanted})) return 97;
+            const std::string id = start("alice", "action=move" + about({"/photo/t", "/photo/single"}, "/other"));
+            const Json::Value task = ended("alice", id);
+            EXPECT_TRUE(wanted.systemCode == support::kKilled || task["items_failed"].asInt() > 0) << errors(task);
+            for (const char* file : {"/t/a", "/t/sub/b", "/t/sub/c"}) EXPECT_EQ(readFile(photo_ + file), file);
+            EXPECT_TRUE(!stays || readFile(photo_ + "/single") == "/single");
+            return 0;
+        }));
+    }
 }
 
 }  // namespace

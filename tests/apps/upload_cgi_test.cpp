@@ -3,9 +3,14 @@
 #include <sys/mount.h>
 #include <sys/sysmacros.h>
 
+#include <fstream>
+#include <thread>
+
 #include "apps/program.h"
+#include "support/refuse_calls.h"
 #include "support/testing.h"
 #include "text.h"
+#include "vexo/filesystem.h"
 
 namespace {
 
@@ -19,6 +24,32 @@ class UploadCgi : public ApplianceTest {
                         const std::string& mode = "error", const Variables& more = {}) {
         const std::string query = "path=" + orvel::cgi::percentEncode(path) + "&overwrite=" + mode;
         return CgiReply(runCgi(PROGRAM_UPLOAD, user, "PUT", query, body, more));
+    }
+    // The same where the kernel refuses these calls, or kills the process before them; "" then.
+    static std::string putRefused(const std::vector<Refusal>& refusals, const std::string& path,
+                                  const std::string& body, const std::string& mode) {
+        const std::string kept = systemRoot() + "/reply";
+        fs::remove(kept);
+        inChild([&] {
+            if (!refuseCalls(refusals)) return 97;
+            const Finished finished = runProgram({PROGRAM_UPLOAD}, variables(path, body, mode), body);
+            std::ofstream(kept) << finished.output;
+            return 0;
+        });
+        return readFile(kept);
+    }
+    static Variables variables(const std::string& path, const std::string& body, const std::string& mode) {
+        return {{"REQUEST_METHOD", "PUT"},
+                {"REMOTE_ADDR", "127.0.0.1"},
+                {"REMOTE_USER", "alice"},
+                {"CONTENT_LENGTH", std::to_string(body.size())},
+                {"QUERY_STRING", "path=" + orvel::cgi::percentEncode(path) + "&overwrite=" + mode}};
+    }
+    // What a user sees in a folder.
+    static std::vector<std::string> shownIn(const std::string& folder) {
+        std::vector<std::string> names = namesIn(folder);
+        std::erase_if(names, [](const std::string& name) { return VEXOEAIsHiddenFile(name.c_str()) == 1; });
+        return names;
     }
     static std::string part(const std::string& disposition, const std::string& data) {
         return "--XX\r\nContent-Disposition: form-data; " + disposition + "\r\n\r\n" + data + "\r\n";
@@ -101,6 +132,8 @@ TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
     ASSERT_EQ(mkfifo((root + "/pipe").c_str(), 0666), 0);
     ASSERT_EQ(mknod((root + "/device").c_str(), S_IFCHR | 0666, makedev(1, 3)), 0);
     makeFolder(root + "/inner", 0777);
+    makeFolder(root + "/folder/@tmp", 0777);
+    fs::create_symlink("folder/@tmp", root + "/hidden");
     fs::create_symlink("folder", root + "/inside");
     fs::create_symlink("/tmp", root + "/outside");
     fs::create_symlink("nowhere", root + "/dangling");
@@ -110,8 +143,11 @@ TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
              row("alice", "/photo", 414), row("alice", "/photo/pipe", 414), row("alice", "/photo/device", 414),
              row("alice", "/photo/file/x", 408), row("alice", "/photo/outside/orveltest-x", 407),
              row("alice", "/photo/../orveltest-x", 407), row("alice", "/photo/new/@vexoea/x", 418),
-             row("alice", "/photo/folder/.", 418), row("alice", "/usb/new*/b", 419),
-             row("alice", "/photo/new/" + std::string(256, 'n') + "/x", 412), row("alice", "", 400)}) {
+             row("alice", "/photo/folder/.", 418), row("alice", "/photo/@tmp", 418),
+             row("alice", "/photo/new/@tmp/x", 418), row("alice", "/photo/folder/@tmp/x", 418),
+             row("alice", "/photo/hidden/x", 418), row("alice", "/photo/.vexo-part-x", 418),
+             row("alice", "/usb/new*/b", 419), row("alice", "/photo/new/" + std::string(256, 'n') + "/x", 412),
+             row("alice", "", 400)}) {
         for (const char* mode : {"error", "overwrite"}) {
             SCOPED_TRACE(path + " " + mode);
             const bool shareRoot = path == "/photo" && std::string(mode) == "overwrite";
@@ -281,6 +317,71 @@ TEST_F(UploadCgi, WhatAKilledUploadLeftIsRemovedByALaterOne) {
     EXPECT_EQ(namesIn(shareRoot("photo")), (Names{"first", "fourth", "second", "third"}));
     for (const std::string& name : namesIn("/tmp/@tmp/orvel")) {
         if (name.starts_with("upload-" + std::to_string(kAliceUid))) fs::remove_all("/tmp/@tmp/orvel/" + name);
+    }
+}
+
+// What happens at each call that puts an upload in its place: the file is there whole or not at all, and the next one
+// ends as its mode says.
+TEST_F(UploadCgi, KilledOrFailingItLeavesTheNameToTheNext) {
+    const std::string file = shareRoot("photo") + "/f";
+    put("alice", "/photo/first", "makes the temporary folders");
+    ASSERT_TRUE(fs::remove(shareRoot("photo") + "/first"));
+    const Refusal noNameless{SYS_openat, EOPNOTSUPP, 2, O_TMPFILE & ~O_DIRECTORY};
+    const Refusal noExclusiveRename{SYS_renameat2, EINVAL, 4, 1};
+    const std::vector<Refusal> ways[] = {{}, {noNameless}, {noNameless, noExclusiveRename}};
+    for (const int what : {kKilled, EIO, ENOSPC}) {
+        for (const long call : {SYS_fchmod, SYS_fchown, SYS_fsync, SYS_fdatasync, SYS_linkat, SYS_renameat,
+                                SYS_renameat2, SYS_unlink, SYS_unlinkat}) {
+            for (const std::string mode : {"error", "skip", "overwrite"}) {
+                const auto& way = ways[(call + mode.size()) % 3];
+                SCOPED_TRACE(mode + " " + std::to_string(call) + (what == kKilled ? " killed" : " refused"));
+                for (const bool there : {false, true}) {
+                    if (there) writeFile(file, "old", 0666);
+                    std::vector<Refusal> refusals = way;
+                    refusals.insert(refusals.begin(), Refusal{call, what});
+                    const std::string reply = putRefused(refusals, "/photo/f", "new", mode);
+                    const bool acknowledged = reply.find("\"success\":true") != std::string::npos;
+                    const std::string found = fs::exists(file) ? readFile(file) : "";
+                    const std::string stored = mode == "overwrite" || !there ? "new" : "old";
+                    EXPECT_TRUE(found == stored || (!acknowledged && found == (there ? "old" : ""))) << found;
+                    EXPECT_EQ(shownIn(shareRoot("photo")), found.empty() ? Names{} : Names{"f"});
+                    const int next = code(put("alice", "/photo/f", "next", mode));
+                    EXPECT_EQ(next, mode == "error" && !found.empty() ? 414 : 0);
+                    EXPECT_EQ(readFile(file), mode == "overwrite" || found.empty() ? "next" : found);
+                    EXPECT_EQ(namesIn(shareRoot("photo")), Names{"f"}) << "nor is anything hidden left";
+                    fs::remove(file);
+                }
+            }
+        }
+    }
+}
+
+TEST_F(UploadCgi, TwoAtOnceEndAsTheirModesSay) {
+    const std::string file = shareRoot("photo") + "/f";
+    const std::string bodies[] = {std::string(300000, 'a'), std::string(300000, 'b')};
+    const auto stored = [](const std::string& reply) {
+        return reply.find("\"success\":true") != std::string::npos &&
+               reply.find("\"skipped\":false") != std::string::npos;
+    };
+    for (const auto& [first, second] : Rows<std::string, std::string>{
+             row("error", "error"), row("skip", "skip"), row("overwrite", "overwrite"), row("error", "overwrite")}) {
+        for (int round = 0; round < 5; ++round) {
+            SCOPED_TRACE(first + " " + second);
+            const std::string modes[] = {first, second};
+            std::string replies[2];
+            std::thread other([&] {
+                replies[1] = runProgram({PROGRAM_UPLOAD}, variables("/photo/f", bodies[1], modes[1]), bodies[1]).output;
+            });
+            replies[0] = runProgram({PROGRAM_UPLOAD}, variables("/photo/f", bodies[0], modes[0]), bodies[0]).output;
+            other.join();
+            const std::string found = readFile(file);
+            EXPECT_TRUE(found == bodies[0] || found == bodies[1]) << found.size();
+            EXPECT_TRUE(stored(replies[found == bodies[0] ? 0 : 1]));
+            const int both = stored(replies[0]) + stored(replies[1]);
+            EXPECT_TRUE(first != second ? found == bodies[1] : both == (first == "overwrite" ? 2 : 1)) << both;
+            EXPECT_EQ(namesIn(shareRoot("photo")), Names{"f"});
+            fs::remove(file);
+        }
     }
 }
 

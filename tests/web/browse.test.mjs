@@ -430,10 +430,7 @@ test("every message key has its words, in both languages", async () => {
 
 test("each kind of file has the icons that the programs look for", () => {
   const images = new URL("../../apps/web/images/", import.meta.url);
-  const drawn = readdirSync(new URL("files_ext", images)).map((icon) => [
-    icon,
-    readlinkSync(new URL(`files_ext/${icon}`, images)),
-  ]);
+  const drawn = readdirSync(new URL("files_ext", images)).map((icon) => [icon, readlinkSync(new URL(`files_ext/${icon}`, images))]);
   const wanted = Object.entries(KINDS).flatMap(([kind, extensions]) =>
     extensions.split(" ").map((extension) => [`${extension}.png`, `../kinds/${kind}.png`]),
   );

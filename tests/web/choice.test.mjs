@@ -53,10 +53,7 @@ test("deletes what was chosen, though others renamed and added", () =>
     await screenshot(page, "chosen-gone");
     await deleteForGood(page);
     const left = [0, 1, ...Array.from({ length: 200 }, (_, i) => 1300 + i)].map(nameOf);
-    assert.deepEqual(
-      readdirSync(folder).sort(),
-      [...left, "a first one.dat", "item-00700 new.dat", "zz last.dat"].sort(),
-    );
+    assert.deepEqual(readdirSync(folder).sort(), [...left, "a first one.dat", "item-00700 new.dat", "zz last.dat"].sort());
   }));
 
 test("a range and everything, chosen of a list that has changed since it was shown", () =>
@@ -148,18 +145,13 @@ test("many are downloaded as one field, and what the web server refuses says so"
         ["paths_raw", "name"],
       );
       const lines = sent[0][1].split(/\r?\n/);
-      assert.deepEqual(
-        [lines.length, lines[0], lines[19_999]],
-        [20_000, "/warehouse/item-00000.dat", "item-19999.dat"],
-      );
+      assert.deepEqual([lines.length, lines[0], lines[19_999]], [20_000, "/warehouse/item-00000.dat", "item-19999.dat"]);
       await page.reload();
       for (const [status, words] of [
         [413, "more than the server takes at once"],
         [502, "status 502"],
       ]) {
-        await page.route("**/cgi-bin/download", (route) =>
-          route.fulfill({ status, body: `${status}, of the web server` }),
-        );
+        await page.route("**/cgi-bin/download", (route) => route.fulfill({ status, body: `${status}, of the web server` }));
         await row(page, nameOf(1)).click();
         await page.click("#toolbar >> text=Download");
         await page.waitForSelector(`.toast >> text=${words}`);

@@ -93,13 +93,10 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     await card(page, "“from outside.txt” to trip").filter({ hasText: "1 file uploaded" }).waitFor();
     assert.equal(readFileSync(join(there, "trip/from outside.txt"), "utf8"), "dropped");
 
-    await page.evaluate(
-      async (id) => {
-        const { startUpload } = await import("/js/uploads.js");
-        startUpload([{ parts: ["nothing in it"] }], id);
-      },
-      await page.evaluate(() => location.hash.slice(1)),
-    );
+    await page.evaluate(async (id) => {
+      const { startUpload } = await import("/js/uploads.js");
+      startUpload([{ parts: ["nothing in it"] }], id);
+    }, await page.evaluate(() => location.hash.slice(1)));
     await card(page, "1 folder to").filter({ hasText: "1 done" }).waitFor();
 
     // So slow a network that it takes a minute: there is something to cancel.

@@ -6,8 +6,7 @@ import { launch, row, rowsReady, screenshot, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const axe = readFileSync(new URL(import.meta.resolve("axe-core/axe.min.js")), "utf8");
-const DEEP =
-  "a drawer/with a rather long name/and another rather long name/in which there lies/one more/and the last one";
+const DEEP = "a drawer/with a rather long name/and another rather long name/in which there lies/one more/and the last one";
 const phone = { viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true };
 let chrome;
 
@@ -112,10 +111,11 @@ test("colours that the system forces show what is chosen", () =>
     await row(page, "2013").click();
     await screenshot(page, "forced-colours");
     const look = (selector, part, property) =>
-      page.evaluate(
-        ([one, two, three]) => getComputedStyle(document.querySelector(one), two)[three],
-        [selector, part, property],
-      );
+      page.evaluate(([one, two, three]) => getComputedStyle(document.querySelector(one), two)[three], [
+        selector,
+        part,
+        property,
+      ]);
     const ground = (selector) => look(selector, null, "backgroundColor");
     assert.notEqual(await ground("#view .row.selected"), await ground("#view .row:not(.selected, .header)"));
     assert.equal(await look("#view .row.selected .check", "::before", "content"), '"✓"');

@@ -14,13 +14,11 @@ let chrome;
 before(async () => {
   chrome = await launch();
   mkdirSync(join(files, "trip/a/b"), { recursive: true });
-  for (let i = 0; i < FILES; ++i)
-    writeFileSync(join(files, "trip", i % 2 ? "a/b" : "a", `photo ${i}.jpg`), `photo ${i}`);
+  for (let i = 0; i < FILES; ++i) writeFileSync(join(files, "trip", i % 2 ? "a/b" : "a", `photo ${i}.jpg`), `photo ${i}`);
   writeFileSync(join(files, "thing"), "a file");
   for (const folder of ["trouble/in", "trouble/taken/thing", "trouble/source", "trouble/to"])
     mkdirSync(`${projects}/${folder}`, { recursive: true });
-  for (const folder of ["", "/in", "/taken", "/taken/thing", "/source", "/to"])
-    chmodSync(`${projects}/trouble${folder}`, 0o777);
+  for (const folder of ["", "/in", "/taken", "/taken/thing", "/source", "/to"]) chmodSync(`${projects}/trouble${folder}`, 0o777);
   for (const name of ["one.txt", "two.txt"]) {
     writeFileSync(`${projects}/trouble/in/${name}`, "");
     writeFileSync(`${projects}/trouble/source/${name}`, `${name} of the source`, { mode: 0o666 });
@@ -60,9 +58,7 @@ test("a connection that breaks: the queue waits and goes on, the list stays", ()
         const isFile = route.request().method() === "PUT";
         if (isFile && ++sent === 4) {
           // It arrives, and only its answer is lost. What the page sends of a file cannot be seen here.
-          await route.fetch({
-            postData: /photo \d+/.exec(decodeURIComponent(decodeURIComponent(route.request().url())))[0],
-          });
+          await route.fetch({ postData: /photo \d+/.exec(decodeURIComponent(decodeURIComponent(route.request().url())))[0] });
           away = true;
         }
         return away ? route.abort("connectionreset") : route.continue();
@@ -135,14 +131,7 @@ test("cut, a question dismissed, pasted after all; every tab follows, and what f
     await other.goto(`${URL_OF_PAGE}#/projects/trouble/to`);
     await other.waitForSelector("#view >> text=two.txt");
     // As if it took long.
-    const running = {
-      taskid: "OrvelFilemove_1",
-      action: "move",
-      state: "running",
-      items_total: 7,
-      items_done: 1,
-      progress: 0.1,
-    };
+    const running = { taskid: "OrvelFilemove_1", action: "move", state: "running", items_total: 7, items_done: 1, progress: 0.1 };
     await other.route("**/cgi-bin/operation?action=status", (route) =>
       route.fulfill({ json: { success: true, data: { tasks: [running] } } }),
     );

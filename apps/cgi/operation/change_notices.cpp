@@ -7,8 +7,8 @@ namespace orvel::cgi {
 ChangeNotices::ChangeNotices(const Operation& operation)
     : user_(operation.user.name), search_(user_, operation.web.GetParam("taskid", "")) {}
 
-void ChangeNotices::deleted(const std::string& path, const ChangedFile& file, bool whole) {
-    OrvLibDoLog(user_, path, 0, ORVEL_ACTION_DELETE, false);
+void ChangeNotices::deleted(const std::string& path, const ChangedFile& file, bool isFolder, bool whole) {
+    OrvLibDoLog(user_, path, 0, ORVEL_ACTION_DELETE, isFolder);
     if (whole) {
         search_.removed(file);
     } else {
@@ -17,12 +17,12 @@ void ChangeNotices::deleted(const std::string& path, const ChangedFile& file, bo
 }
 
 void ChangeNotices::copied(const Item& from, const ChangedFile& to, long long bytes) {
-    OrvLibDoLog(user_, from.info.path, bytes, ORVEL_ACTION_COPY, false);
+    OrvLibDoLog(user_, from.info.path, bytes, ORVEL_ACTION_COPY, S_ISDIR(from.status.st_mode));
     search_.added(to);
 }
 
 void ChangeNotices::moved(const Item& from, const ChangedFile& to, long long bytes, bool whole) {
-    OrvLibDoLog(user_, from.info.path, bytes, ORVEL_ACTION_MOVE, false);
+    OrvLibDoLog(user_, from.info.path, bytes, ORVEL_ACTION_MOVE, S_ISDIR(from.status.st_mode));
     if (whole) {
         search_.moved(from.changed(), to);
     } else {

@@ -15,8 +15,8 @@ class ChangeNotices {
  public:
     explicit ChangeNotices(const Operation& operation);
 
-    // `path`: the share-relative path of `file`.
-    void deleted(const std::string& path, const ChangedFile& file, bool whole);
+    // `path`: the share-relative path of `file`; `isFolder`: what it was.
+    void deleted(const std::string& path, const ChangedFile& file, bool isFolder, bool whole);
     void copied(const Item& from, const ChangedFile& to, long long bytes);
     void moved(const Item& from, const ChangedFile& to, long long bytes, bool whole);
 

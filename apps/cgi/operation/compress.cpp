@@ -1,17 +1,17 @@
 #include <fcntl.h>
 
 #include <cerrno>
-#include <set>
 
+#include "base/new_file.h"
 #include "download/archive.h"
+#include "free_names.h"
 #include "operation/item.h"
-#include "operation/new_file.h"
 #include "operation/operation.h"
 #include "operation/task_start.h"
 #include "operation/transfer_job.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
-#include "orvel/name_check.h"
+#include "text.h"
 
 namespace orvel::cgi {
 namespace {
@@ -54,18 +54,8 @@ class Watch : public ZipObserver {
     bool open_ = false;
 };
 
-// A name that no other source has in the archive.
-std::string freeName(const Item& item, std::set<std::string>& taken) {
-    const std::string name = memberName(item.place.name);
-    std::string free = name;
-    for (int number = 2; !taken.insert(free).second; ++number) {
-        free = numberedName(name, number, S_ISDIR(item.status.st_mode));
-    }
-    return free;
-}
-
 void addAll(const Job& job, ZipStream& zip, Watch& watch, Progress& progress) {
-    std::set<std::string> taken;
+    FreeNames names;
     for (const std::string& path : job.operation.paths) {
         Item item;
         int code = openItem(job.operation.user, path, {Need::kRead}, item);
@@ -76,12 +66,14 @@ void addAll(const Job& job, ZipStream& zip, Watch& watch, Progress& progress) {
         const Descriptor opened(code != ORV_ERR_NONE ? -1
                                                      : openat(item.place.folder.get(), item.place.name.c_str(), flags));
         if (code == ORV_ERR_NONE && !opened) code = OrvParseErrnoToError(errno, nullptr, nullptr);
+        const bool isFolder = S_ISDIR(item.status.st_mode);
+        watch.enter(item.info.path.substr(0, item.info.path.rfind('/')));
         if (code != ORV_ERR_NONE) {
             progress.failed(path, code);
-            continue;
+            zip.leaveOut(readable(path), reasonOf(code));
+        } else if (!zip.add(opened, names.take(memberName(item.place.name), isFolder))) {
+            return;
         }
-        watch.enter(item.info.path.substr(0, item.info.path.rfind('/')));
-        if (!zip.add(opened, freeName(item, taken))) return;
     }
 }
 
@@ -116,12 +108,16 @@ void run(const Job& job, Progress& progress) {
         }
     }
     NewFile file(job.place.folder.get());
-    if (!file.create()) return progress.broken(job.info.path, OrvParseErrnoToError(errno, nullptr, nullptr));
+    if (!file.create(job.place.name, 0600))
+        return progress.broken(job.info.path, OrvParseErrnoToError(errno, nullptr, nullptr));
     Watch watch(progress);
     ZipStream zip(file.get(), &watch);
     addAll(job, zip, watch, progress);
     if (progress.stopped()) return;
     watch.ended();
+    // Whoever sees "done" may remove what was packed.
+    if (!zip.isWhole()) progress.markFailed();
+    if (zip.isEmpty()) return;
     if (!zip.finish()) return progress.broken(job.info.path, codeOf(zip));
     std::string name;
     const int code = publish(job, file, name);
@@ -141,8 +137,8 @@ int openArchive(Operation& operation, const std::string& path, Job& job) {
     if (code != ORV_ERR_NONE) return code;
     code = openTarget(job.info, linkPolicyOf(job.info.shareName), user.name, Missing::kRefuse, job.place);
     if (code != ORV_ERR_NONE) return code;
-    OrvLibSetErr(ORV_ERR_NONE);
-    if (OrvCheckFileName(realPathOf(job.place.folder).c_str(), job.place.name.c_str()) != 0) return lastCode();
+    code = checkNewName(job.place.folder, job.place.name);
+    if (code != ORV_ERR_NONE) return code;
     struct stat there {};
     const bool taken = fstatat(job.place.folder.get(), job.place.name.c_str(), &there, AT_SYMLINK_NOFOLLOW) == 0 &&
                        (job.conflict == Conflict::kError || job.conflict == Conflict::kSkip || !S_ISREG(there.st_mode));

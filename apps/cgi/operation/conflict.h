@@ -3,7 +3,6 @@
 #define ORVEL_CGI_OPERATION_CONFLICT_H
 
 #include <optional>
-#include <string>
 #include <string_view>
 
 namespace orvel::cgi {
@@ -12,10 +11,6 @@ namespace orvel::cgi {
 // and overwrite; a file is replaced by a file, a link by a link, and nothing else by anything.
 enum class Conflict { kError, kSkip, kOverwrite, kKeepBoth };
 std::optional<Conflict> conflictOf(std::string_view word);
-
-// "name (2).ext" for the number 2; a folder's name has no ending. What does not fit into 255 bytes is cut off before
-// the number, never within a character.
-std::string numberedName(const std::string& name, int number, bool isFolder);
 
 }  // namespace orvel::cgi
 

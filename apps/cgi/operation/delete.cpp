@@ -36,7 +36,7 @@ void expectAll(const Operation& operation, bool permanent, Progress& progress) {
 }
 
 bool recycle(const RecycleBin& bin, const Item& item, const Owner& owner, Progress& progress) {
-    Descriptor folder;
+    Target folder;
     Entry place{};
     const int code = bin.placeFor(item, owner, folder, place);
     if (code != ORV_ERR_NONE) {
@@ -46,7 +46,9 @@ bool recycle(const RecycleBin& bin, const Item& item, const Owner& owner, Progre
     Transfer transfer(
         progress,
         {.conflict = Conflict::kKeepBoth, .move = true, .owner = owner, .onFat = false, .nextName = nextBinName});
-    return transfer.run(item, place);
+    const bool gone = transfer.run(item, place);
+    if (!gone) removeMadeFolders(folder);  // as far as nothing arrived
+    return gone;
 }
 
 void run(const Operation& operation, bool permanent, Progress& progress) {
@@ -66,7 +68,7 @@ void run(const Operation& operation, bool permanent, Progress& progress) {
         const long long before = progress.itemsDone();
         const bool gone = bin ? recycle(*bin, item, owner, progress) : removeTree(item.entry(), progress);
         if (gone || progress.itemsDone() != before) {
-            notices.deleted(item.info.path, item.changed(), gone);
+            notices.deleted(item.info.path, item.changed(), S_ISDIR(item.status.st_mode), gone);
         }
     }
 }

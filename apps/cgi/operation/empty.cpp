@@ -47,7 +47,7 @@ void run(const Operation& operation, const RecycleBin& bin, const PathInfo& info
         const long long before = progress.itemsDone();
         const bool gone = removeTree({bin.folder().get(), item.place.name, item.info.path}, progress);
         if (gone || progress.itemsDone() != before) {
-            notices.deleted(item.info.path, {info, bin.folder(), item.place.name}, gone);
+            notices.deleted(item.info.path, {info, bin.folder(), item.place.name}, S_ISDIR(item.status.st_mode), gone);
         }
     }
 }

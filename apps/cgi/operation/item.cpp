@@ -34,9 +34,8 @@ int openItem(const User& user, const std::string& path, std::initializer_list<Ne
         code = judge(user, item.info.path, need);
         if (code != ORV_ERR_NONE) return code;
     }
-    code = openTarget(item.info, linkPolicyOf(item.info.shareName), user.name, Missing::kRefuse, item.place);
+    code = openPresent(item.info, user.name, item.place);
     if (code != ORV_ERR_NONE) return code;
-    if (VEXOEAIsHiddenFile(item.place.name.c_str()) != 0) return ORV_ERR_MISSING;
     const bool there =
         fstatat(item.place.folder.get(), item.place.name.c_str(), &item.status, AT_SYMLINK_NOFOLLOW) == 0;
     return there ? ORV_ERR_NONE : refusalCode(errno, item.info.realPath);

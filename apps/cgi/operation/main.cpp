@@ -90,7 +90,7 @@ void serveOperationProgram(Request& request, Output& out) {
     }
     if (!operation.paths.empty()) operation.culprit = operation.paths.front();
     const int code = perform(operation, *action);
-    reply(out, Status::kOk, user.cookie, code, operation.culprit, operation.data);
+    reply(out, statusOf(code), user.cookie, code, operation.culprit, operation.data);
 }
 
 }  // namespace orvel::cgi

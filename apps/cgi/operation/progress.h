@@ -32,6 +32,8 @@ class Progress {
     void failed(const std::string& path, int code);
     // The whole operation failed.
     void broken(const std::string& path, int code);
+    // What the operation was to make lacks something, although it was made.
+    void markFailed() { state_ = "failed"; }
     // How many items were done so far.
     [[nodiscard]] long long itemsDone() const { return itemsDone_; }
     // Whether the user wants the operation to end. To be asked often.

@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <string_view>
 
+#include "base/keep_errno.h"
 #include "orvel/error_state.h"
 
 namespace orvel::cgi {
@@ -43,18 +44,27 @@ Descriptor makeLike(const Descriptor& folder, const std::string& name, const Des
     struct stat status {};
     if (fstat(original.get(), &status) != 0 || mkdirat(folder.get(), name.c_str(), 0700) != 0) return Descriptor();
     Descriptor made(openat(folder.get(), name.c_str(), kOpenFolder));
-    if (!made) return made;
+    if (!made) {
+        const KeepErrno keep;
+        unlinkat(folder.get(), name.c_str(), AT_REMOVEDIR);
+        return made;
+    }
     [[maybe_unused]] int ignored = fchownat(made.get(), "", owner.uid, owner.gid, AT_EMPTY_PATH);  // not kept by FAT
     ignored = fchmodat(AT_FDCWD, made.path().c_str(), status.st_mode & 0777, 0);
     return made;
 }
 
-// Enters the folder of the bin that stands for `name`, made when there is none.
-Descriptor enter(const Descriptor& folder, const std::string& name, const Descriptor& original, const Owner& owner) {
+// Enters the folder of the bin that stands for `name`, made when there is none: `made` says so then.
+Descriptor enter(const Descriptor& folder, const std::string& name, const Descriptor& original, const Owner& owner,
+                 std::vector<MadeFolder>& made) {
     for (int number = 1; number <= kMostNumbers; ++number) {
         const std::string inBin = binName(name, number);
         Descriptor found(openat(folder.get(), inBin.c_str(), kOpenFolder));
-        if (!found && errno == ENOENT) found = makeLike(folder, inBin, original, owner);
+        if (!found && errno == ENOENT) {
+            Descriptor parent(openat(folder.get(), ".", kOpenFolder));
+            if (parent) found = makeLike(folder, inBin, original, owner);
+            if (found) made.push_back({std::move(parent), inBin});
+        }
         if (found && isWritable(found)) return found;
         const bool taken = found || errno == EEXIST || errno == ENOTDIR || errno == ELOOP;
         if (!taken) return Descriptor();
@@ -108,19 +118,23 @@ int RecycleBin::open(const PathInfo& info, std::optional<RecycleBin>& bin) {
     return ORV_ERR_NONE;
 }
 
-int RecycleBin::placeFor(const Item& item, const Owner& owner, Descriptor& folder, Entry& place) const {
+int RecycleBin::placeFor(const Item& item, const Owner& owner, Target& target, Entry& place) const {
     Descriptor original(openat(root_.get(), ".", kOpenFolder));
-    folder = Descriptor(openat(folder_.get(), ".", kOpenFolder));
-    if (!original || !folder) return OrvParseErrnoToError(errno, nullptr, nullptr);
+    target.folder = Descriptor(openat(folder_.get(), ".", kOpenFolder));
+    if (!original || !target.folder) return OrvParseErrnoToError(errno, nullptr, nullptr);
     std::string path = sharePath();
     for (const std::string& name : foldersOf(item, rootPath_)) {
         original = Descriptor(openat(original.get(), name.c_str(), kOpenFolder));
-        if (original) folder = enter(folder, name, original, owner);
-        if (!original || !folder) return OrvParseErrnoToError(errno, nullptr, nullptr);
+        if (original) target.folder = enter(target.folder, name, original, owner, target.made);
+        if (!original || !target.folder) {
+            const int code = OrvParseErrnoToError(errno, nullptr, nullptr);
+            removeMadeFolders(target);
+            return code;
+        }
         path += "/" + name;
     }
-    const std::string name = binName(item.place.name, 1);
-    place = {folder.get(), name, path + "/" + name};
+    target.name = binName(item.place.name, 1);
+    place = {target.folder.get(), target.name, path + "/" + target.name};
     return ORV_ERR_NONE;
 }
 

@@ -29,9 +29,9 @@ class RecycleBin {
     [[nodiscard]] bool is(const Item& item) const { return item.realPath() == path_; }
     [[nodiscard]] bool holds(const Item& item) const { return item.realPath().starts_with(path_ + "/"); }
 
-    // Opens the place for the item, in `folder`; the folders above it are made like those that it lies in. 0 or a
-    // library code.
-    int placeFor(const Item& item, const Owner& owner, Descriptor& folder, Entry& place) const;
+    // Opens the place for the item, in `target`, which keeps the folder open; the folders above it are made like those
+    // that it lies in. 0, or a library code, after which none made here is left.
+    int placeFor(const Item& item, const Owner& owner, Target& target, Entry& place) const;
     // Where the item, which the bin holds, once was: a share-relative path.
     [[nodiscard]] std::string originOf(const Item& item) const;
     // Removes the folders above the item as far as they are empty.

@@ -3,18 +3,18 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <climits>
-#include <cstdio>
+#include <utility>
 
+#include "base/new_file.h"
 #include "folder_names.h"
-#include "operation/new_file.h"
-#include "operation/rename_new.h"
-#include "operation/tree_remove.h"
 #include "orvel/error_state.h"
 #include "vexo/copy.h"
 #include "vexo/error.h"
+#include "vexo/filesystem.h"
 #include "vexo/text.h"
 
 namespace orvel::cgi {
@@ -23,6 +23,7 @@ namespace {
 constexpr int kMostNumbers = 9999;
 constexpr int kDeepest = 1000;
 constexpr mode_t kUntilFilled = 0700;
+constexpr size_t kMostCopied = 1000;  // waited for at once
 
 int codeOfCopy() {
     switch (VLIBCErrGet()) {
@@ -35,6 +36,10 @@ int codeOfCopy() {
         default:
             return OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
     }
+}
+
+bool isShown(const std::string& name) {
+    return VEXOEAIsHiddenFile(name.c_str()) == 0;
 }
 
 bool isSame(const struct stat& a, const struct stat& b) {
@@ -64,6 +69,11 @@ Transfer::Result Transfer::failedWith(const Entry& entry, int error) {
     return failed(entry, OrvParseErrnoToError(error, nullptr, nullptr));
 }
 
+Transfer::Result Transfer::done() {
+    if (!hidden_) progress_.done();
+    return Result::kDone;
+}
+
 bool Transfer::run(const Item& from, Entry& to) {
     top_ = &from;
     topTarget_.reset();
@@ -75,7 +85,7 @@ bool Transfer::run(const Item& from, Entry& to) {
 // `taken`: the names that were already given in the target's folder.
 Transfer::Result Transfer::place(const Entry& from, const struct stat& status, Entry& to, Names& taken) {
     if (progress_.stopped()) return Result::kFailed;
-    progress_.begin(from.path);
+    if (!hidden_) progress_.begin(from.path);
     // Nothing could be asked for by a longer path; each level costs two descriptors and some of the stack.
     if (to.path.size() >= PATH_MAX || depth_ == kDeepest) return failed(from, ORV_ERR_LONG_PATH);
     // One of two names that are one there would replace the other, or mix with it.
@@ -123,10 +133,7 @@ Transfer::Result Transfer::rename(const Entry& from, const struct stat& status, 
     if (replace && S_ISDIR(status.st_mode)) return fill(from, status, to, false);
     const bool renamed = replace ? renameat(from.folder, from.name.c_str(), to.folder, to.name.c_str()) == 0
                                  : renameNew(from.folder, from.name, to.folder, to.name);
-    if (renamed) {
-        progress_.done();
-        return Result::kDone;
-    }
+    if (renamed) return done();
     if (errno == EXDEV) {
         renaming_ = false;
         // It is now that there are bytes to be moved; the item itself was expected.
@@ -147,19 +154,30 @@ Transfer::Result Transfer::copy(const Entry& from, const struct stat& status, co
     } else {
         return failed(from, ORV_ERR_GENERAL);
     }
-    if (result == Result::kDone && rules_.move) result = removeSource(from, status);
-    if (result == Result::kDone) progress_.done();
-    return result;
+    return result == Result::kDone ? arrived(from, status, to) : result;
+}
+
+// A file or link is copied. Of a move it is still to be removed: those in a folder together, as waiting for the disk
+// takes long.
+Transfer::Result Transfer::arrived(const Entry& from, const struct stat& status, const Entry& to) {
+    if (!rules_.move) return done();
+    if (depth_ > 0) {
+        copied_.push_back({from.name, to.name, status});
+        return Result::kDone;
+    }
+    if (!syncName(to.folder, to.name)) return failedWith(from, errno);
+    return removeSource(from, status) == Result::kDone ? done() : Result::kFailed;
 }
 
 Transfer::Result Transfer::copyFile(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
     unsigned switches = VEXO_COPY_KEEP_TIMES | VEXO_COPY_KEEP_MODE;
     if (replace) switches |= VEXO_COPY_OVERWRITE;
+    if (rules_.move && depth_ == 0) switches |= VEXO_COPY_SYNC;  // see arrived()
     const VEXOCOPYOPT options = {
         .uid = rules_.owner.uid, .gid = rules_.owner.gid, .isCancelled = Progress::askDuringCopy, .switches = switches};
     if (VEXOFileCopy(from.handle().c_str(), to.handle().c_str(), &options) == 0) {
         bytes_ += status.st_size;
-        progress_.bytes(status.st_size);
+        if (!hidden_) progress_.bytes(status.st_size);
         return Result::kDone;
     }
     if (VLIBCErrGet() == VEXO_ERR_CANCELLED) return Result::kFailed;
@@ -181,17 +199,22 @@ Transfer::Result Transfer::copyLink(const Entry& from, const struct stat& status
 }
 
 Transfer::Result Transfer::makeFolder(const Entry& from, const struct stat& status, const Entry& to) {
-    if (mkdirat(to.folder, to.name.c_str(), kUntilFilled) == 0) return fill(from, status, to, true);
-    return errno == EEXIST ? Result::kExists : failedWith(from, errno);
+    if (mkdirat(to.folder, to.name.c_str(), kUntilFilled) != 0) {
+        return errno == EEXIST ? Result::kExists : failedWith(from, errno);
+    }
+    // What is removed for the sake of a copy in it must not be lost with it.
+    if (!rules_.move || syncName(to.folder, to.name)) return fill(from, status, to, true);
+    const int error = errno;
+    unlinkat(to.folder, to.name.c_str(), AT_REMOVEDIR);
+    return failedWith(from, error);
 }
 
-// What a new folder takes over from its source.
-void Transfer::makeAlike(const Descriptor& folder, const struct stat& status) const {
+// What a new folder takes over from its source once it is filled.
+void Transfer::makeAlike(const Descriptor& folder, const struct stat& status) {
     struct stat now {};
     const mode_t group = fstat(folder.get(), &now) == 0 ? now.st_mode & S_ISGID : 0;
     const std::array<timespec, 2> times = {status.st_atim, status.st_mtim};
-    [[maybe_unused]] int ignored = fchown(folder.get(), rules_.owner.uid, rules_.owner.gid);  // FAT keeps neither
-    ignored = fchmod(folder.get(), (status.st_mode & 0777) | group);
+    [[maybe_unused]] const int ignored = fchmod(folder.get(), (status.st_mode & 0777) | group);  // FAT keeps none
     futimens(folder.get(), times.data());
 }
 
@@ -199,20 +222,20 @@ void Transfer::makeAlike(const Descriptor& folder, const struct stat& status) co
 Transfer::Result Transfer::fill(const Entry& from, const struct stat& status, const Entry& to, bool made) {
     constexpr int flags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
     const Descriptor source(openat(from.folder, from.name.c_str(), flags));
-    if (!source) {
+    const Descriptor target(source ? openat(to.folder, to.name.c_str(), flags) : -1);
+    struct stat inside {};
+    if (!target || fstat(target.get(), &inside) != 0) {
         const int error = errno;
         if (made) unlinkat(to.folder, to.name.c_str(), AT_REMOVEDIR);
         return failedWith(from, error);
     }
-    const Descriptor target(openat(to.folder, to.name.c_str(), flags));
-    struct stat inside {};
-    if (!target || fstat(target.get(), &inside) != 0) return failedWith(from, errno);
     if (!topTarget_) topTarget_ = inside;
     // The tree may lie in itself by way of a mount.
     if (isSame(status, *topTarget_)) return failed(from, ORV_ERR_SELECT_CONFLICT);
-    ++depth_;
-    const bool all = fillFrom(from, source, to, target);
-    --depth_;
+    if (made) {
+        [[maybe_unused]] const int ignored = fchown(target.get(), rules_.owner.uid, rules_.owner.gid);
+    }
+    const bool all = fillWhole(from, source, to, target);
     if (made) makeAlike(target, status);
     if (progress_.stopped()) return Result::kFailed;
     if (!all && rules_.move) {
@@ -220,28 +243,85 @@ Transfer::Result Transfer::fill(const Entry& from, const struct stat& status, co
         return Result::kFailed;
     }
     if (rules_.move && removeSource(from, status) != Result::kDone) return Result::kFailed;
-    progress_.done();
+    static_cast<void>(done());
     return all ? Result::kDone : Result::kFailed;
+}
+
+// One level down: with everything that waits to be removed there.
+bool Transfer::fillWhole(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target) {
+    std::vector<Copied> above = std::exchange(copied_, {});
+    ++depth_;
+    bool all = fillFrom(from, source, to, target);
+    all = removeCopied(from, source, target) && all;
+    --depth_;
+    copied_ = std::move(above);
+    return all;
 }
 
 bool Transfer::fillFrom(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target) {
     std::vector<std::string> names;
-    bool all = namesIn(source.get(), Hidden::kLeaveOut, names);
+    bool all = namesIn(source.get(), rules_.move ? Hidden::kInclude : Hidden::kLeaveOut, names);
     if (!all) failedWith(from, errno);
-    if (renaming_) progress_.expect(static_cast<long long>(names.size()), 0);
+    if (renaming_ && !hidden_) progress_.expect(std::count_if(names.begin(), names.end(), isShown), 0);
     Names taken;
+    const bool hidden = hidden_;
     for (const std::string& name : names) {
         if (progress_.stopped()) return false;
+        if (isPartName(name)) {  // not to be moved: somebody's at work, or nobody's
+            all = (!rules_.move || removeAbandonedPart(source.get(), name)) && all;
+            continue;
+        }
         const Entry child = from.child(source.get(), name);
         Entry childTo = to.child(target.get(), name);
         struct stat status {};
+        hidden_ = hidden || !isShown(name);
         if (fstatat(child.folder, child.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
             failedWith(child, errno);
             all = false;
         } else {
             all = place(child, status, childTo, taken) == Result::kDone && all;
         }
+        hidden_ = hidden;
+        if (copied_.size() >= kMostCopied) all = removeCopied(from, source, target) && all;
     }
+    return all;
+}
+
+bool Transfer::isOnDisk(const Copied& copied, const Descriptor& target) {
+    if (S_ISLNK(copied.status.st_mode)) return true;  // with its folder
+    const Descriptor file(
+        openat(target.get(), copied.copy.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+    // One that may not be read was waited for with the file system.
+    return file ? fsync(file.get()) == 0 : errno == EACCES;
+}
+
+// Removes from the folder `from` what was copied out of it, once that is on the disk. True when all of it is gone.
+bool Transfer::removeCopied(const Entry& from, const Descriptor& source, const Descriptor& target) {
+    const std::vector<Copied> copied = std::exchange(copied_, {});
+    if (copied.empty()) return true;
+    // All at once: each file's own waiting, which alone some file systems know, is short then.
+    const int failure = syncfs(target.get()) == 0 ? 0 : errno;
+    std::vector<const Copied*> safe;
+    for (const Copied& one : copied) {
+        if (failure == 0 && isOnDisk(one, target)) {
+            safe.push_back(&one);
+        } else {
+            failedWith(from.child(source.get(), one.name), failure != 0 ? failure : errno);
+        }
+    }
+    if (!safe.empty() && !syncName(target.get(), safe.front()->copy)) {
+        failedWith(from, errno);
+        return false;
+    }
+    const bool hidden = hidden_;
+    bool all = safe.size() == copied.size();
+    for (const Copied* one : safe) {
+        hidden_ = hidden || !isShown(one->name);
+        const bool removed = removeSource(from.child(source.get(), one->name), one->status) == Result::kDone;
+        if (removed) static_cast<void>(done());
+        all = removed && all;
+    }
+    hidden_ = hidden;
     return all;
 }
 
@@ -249,7 +329,6 @@ bool Transfer::fillFrom(const Entry& from, const Descriptor& source, const Entry
 Transfer::Result Transfer::removeSource(const Entry& from, const struct stat& status) {
     const char* name = from.name.c_str();
     if (S_ISDIR(status.st_mode)) {
-        removeHidden(from);  // what was passed over is nobody's any more
         return unlinkat(from.folder, name, AT_REMOVEDIR) == 0 ? Result::kDone : failedWith(from, errno);
     }
     struct stat now {};

@@ -5,7 +5,9 @@
 #include <optional>
 #include <set>
 #include <string>
+#include <vector>
 
+#include "free_names.h"
 #include "operation/conflict.h"
 #include "operation/item.h"
 #include "operation/progress.h"
@@ -14,10 +16,10 @@ namespace orvel::cgi {
 
 // Files appear under their names whole or not at all, with the permissions and times of the source; a new folder gets
 // them once it is filled. Links are copied as they are. What fails is reported, each item for itself, and the rest goes
-// on; so does what is neither a file, a folder nor a link. Hidden names are passed over.
+// on; so does what is neither a file, a folder nor a link. A copy passes hidden names over.
 //
-// A move is a rename; where that is not possible, on another file system, it is a copy after which the source is
-// removed.
+// A move is a rename; where that is not possible, on another file system, it is a copy, hidden names included, after
+// which the source is removed: once the copy is on the disk, and nothing but what was copied.
 class Transfer {
  public:
     struct Rules {
@@ -42,6 +44,12 @@ class Transfer {
     };
     using Names = std::set<std::string, FoldedOrder>;
 
+    // A file or link of the folder at work that was copied, and is to be removed.
+    struct Copied {
+        std::string name, copy;
+        struct stat status;
+    };
+
     Result place(const Entry& from, const struct stat& status, Entry& to, Names& taken);
     Result resolve(const Entry& from, const struct stat& status, Entry& to);
     Result keepBoth(const Entry& from, const struct stat& status, Entry& to);
@@ -52,11 +60,16 @@ class Transfer {
     Result copyLink(const Entry& from, const struct stat& status, const Entry& to, bool replace);
     Result makeFolder(const Entry& from, const struct stat& status, const Entry& to);
     Result fill(const Entry& from, const struct stat& status, const Entry& to, bool made);
+    bool fillWhole(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target);
     bool fillFrom(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target);
-    void makeAlike(const Descriptor& folder, const struct stat& status) const;
+    Result arrived(const Entry& from, const struct stat& status, const Entry& to);
+    bool removeCopied(const Entry& from, const Descriptor& source, const Descriptor& target);
+    static bool isOnDisk(const Copied& copied, const Descriptor& target);
+    static void makeAlike(const Descriptor& folder, const struct stat& status);
     Result removeSource(const Entry& from, const struct stat& status);
     Result failed(const Entry& entry, int code);
     Result failedWith(const Entry& entry, int error);
+    Result done();
 
     Progress& progress_;
     Rules rules_;
@@ -64,6 +77,8 @@ class Transfer {
     const Item* top_ = nullptr;             // of the run
     std::optional<struct stat> topTarget_;  // the folder that it becomes
     bool renaming_ = false;                 // no rename of this run met another file system yet
+    bool hidden_ = false;                   // what is at work is never shown, nor counted
+    std::vector<Copied> copied_;            // in the folder at work
     int depth_ = 0;
     long long bytes_ = 0;
 };

@@ -5,7 +5,6 @@
 #include "operation/task_start.h"
 #include "operation/transfer.h"
 #include "orvel/error_state.h"
-#include "orvel/name_check.h"
 #include "orvel/privilege.h"
 #include "vexo/filesystem.h"
 
@@ -33,9 +32,7 @@ int checkPlace(const Job& job, const Item& item) {
         return ORV_ERR_SELECT_CONFLICT;  // a folder into itself
     }
     if (!linksStayInside(item, job.info, job.folder)) return ORV_ERR_DENIED;
-    OrvLibSetErr(ORV_ERR_NONE);
-    const bool fits = OrvCheckFileName(folder.c_str(), item.place.name.c_str()) == 0;
-    return fits ? ORV_ERR_NONE : lastCode();
+    return checkNewName(job.folder, item.place.name);
 }
 
 void expectAll(const Job& job, Progress& progress) {

@@ -81,14 +81,4 @@ bool removeTree(const Entry& entry, Progress& progress) {
     return removeIn(entry, status.st_dev, 0, progress);
 }
 
-void removeHidden(const Entry& entry) {
-    const Descriptor folder(openat(entry.folder, entry.name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-    struct stat status {};
-    std::vector<std::string> names;
-    if (!folder || fstat(folder.get(), &status) != 0 || !namesIn(folder.get(), Hidden::kInclude, names)) return;
-    for (const std::string& name : names) {
-        if (VEXOEAIsHiddenFile(name.c_str()) != 0) removeQuietly(folder.get(), name, status.st_dev, 0);
-    }
-}
-
 }  // namespace orvel::cgi

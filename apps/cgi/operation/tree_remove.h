@@ -12,9 +12,6 @@ namespace orvel::cgi {
 // when all of it is gone.
 bool removeTree(const Entry& entry, Progress& progress);
 
-// Removes what the file manager never shows from the folder `entry`, without a report, as far as it goes.
-void removeHidden(const Entry& entry);
-
 }  // namespace orvel::cgi
 
 #endif

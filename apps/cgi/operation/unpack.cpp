@@ -13,10 +13,10 @@
 #include <clocale>
 #include <memory>
 
+#include "base/new_file.h"
+#include "free_names.h"
 #include "operation/member_path.h"
-#include "operation/new_file.h"
 #include "orvel/error_state.h"
-#include "orvel/name_check.h"
 #include "vexo/filesystem.h"
 #include "vexo/settings.h"
 
@@ -55,13 +55,6 @@ std::string joined(const std::vector<std::string>& components) {
     std::string path = ".";
     for (const std::string& component : components) path += "/" + component;
     return path;
-}
-
-// Whether a file or folder of this name may be made in the folder.
-int checkName(const Descriptor& folder, const std::string& name) {
-    if (VEXOEAIsHiddenFile(name.c_str()) != 0) return ORV_ERR_RESERVED_NAME;
-    OrvLibSetErr(ORV_ERR_NONE);
-    return OrvCheckFileName(realPathOf(folder).c_str(), name.c_str()) == 0 ? ORV_ERR_NONE : lastCode();
 }
 
 std::unique_ptr<archive, CloseArchive> openArchive(int file) {
@@ -111,7 +104,7 @@ UnpackLimits UnpackLimits::of(long long archiveSize) {
 int Unpacker::run(int file, const UnpackLimits& limits) {
     limits_ = limits;
     bytes_ = members_ = folders_ = consumed_ = 0;
-    exceeded_ = torn_ = false;
+    exceeded_ = torn_ = locked_ = false;
     const auto source = openArchive(file);
     const int code = source == nullptr ? static_cast<int>(ORV_ERR_ARCHIVE) : readAll(source.get());
     finishFolders();
@@ -123,7 +116,7 @@ int Unpacker::readAll(archive* source) {
         if (progress_.stopped()) return ORV_ERR_NONE;
         archive_entry* entry = nullptr;
         const int result = archive_read_next_header(source, &entry);
-        if (result == ARCHIVE_EOF) return ORV_ERR_NONE;
+        if (result == ARCHIVE_EOF) return locked_ ? ORV_ERR_ARCHIVE_PASSWORD : ORV_ERR_NONE;
         if (result == ARCHIVE_RETRY) continue;
         if (result < ARCHIVE_WARN) return members_ == 0 ? ORV_ERR_ARCHIVE : ORV_ERR_ARCHIVE_DATA;
         if (++members_ > limits_.members) return ORV_ERR_FILE_TOO_BIG;
@@ -164,6 +157,9 @@ void Unpacker::take(archive* source, archive_entry* entry) {
         progress_.done();
     } else if (code == kSkipped) {
         progress_.skipped();
+    } else if (code == ORV_ERR_ARCHIVE_PASSWORD) {
+        locked_ = true;  // it is the archive that wants one
+        progress_.skipped();
     } else if (code != kStopped) {
         progress_.failed(shown, code);
     }
@@ -172,7 +168,7 @@ void Unpacker::take(archive* source, archive_entry* entry) {
 int Unpacker::place(archive* source, Member& member) {
     if (member.path.size() >= PATH_MAX) return ORV_ERR_LONG_PATH;
     int code = enter(member.folders, member.folder);
-    if (code == ORV_ERR_NONE) code = checkName(member.folder, member.name);
+    if (code == ORV_ERR_NONE) code = checkNewName(member.folder, member.name);
     if (code != ORV_ERR_NONE) return code;
     if (archive_entry_hardlink(member.entry) != nullptr) return makeHardLink(member);
     if (archive_entry_is_encrypted(member.entry) != 0) return ORV_ERR_ARCHIVE_PASSWORD;
@@ -201,7 +197,7 @@ int Unpacker::enter(const std::vector<std::string>& folders, Descriptor& folder)
     for (const std::string& name : folders) {
         Descriptor next = openBeneath(folder, name, LinkPolicy::kNone, flags);
         if (!next && errno == ENOENT) {
-            const int code = checkName(folder, name);
+            const int code = checkNewName(folder, name);
             if (code != ORV_ERR_NONE) return code;
             exceeded_ = ++folders_ > limits_.members;  // one member may lie in thousands
             if (exceeded_) return ORV_ERR_FILE_TOO_BIG;
@@ -227,10 +223,12 @@ int Unpacker::makeFolder(const Member& member) {
     return code;
 }
 
-// Gives what was made its name, by the policy. 0, kSkipped or a library code.
-int Unpacker::nameIt(Member& member, bool (*give)(void* what, const std::string& name, bool replace), void* what) {
+// Gives what was made its name, by the policy: `give` takes the name and whether to replace what has it. 0, kSkipped or
+// a library code.
+template <class Give>
+int Unpacker::nameIt(Member& member, Give give) {
     const std::string wanted = member.name;
-    bool given = give(what, wanted, false);
+    bool given = give(wanted, false);
     if (given || errno != EEXIST) return given ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
     switch (target_.conflict) {
         case Conflict::kError:
@@ -241,13 +239,13 @@ int Unpacker::nameIt(Member& member, bool (*give)(void* what, const std::string&
             if (struct stat there{}; member.isThere(there) && (there.st_mode & S_IFMT) != member.type()) {
                 return ORV_ERR_EXISTS;
             }
-            return give(what, wanted, true) ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
+            return give(wanted, true) ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
         case Conflict::kKeepBoth:
             break;
     }
     for (int number = 2; !given && number <= kMostNumbers; ++number) {
         member.name = numberedName(wanted, number, false);
-        given = give(what, member.name, false);
+        given = give(member.name, false);
         if (!given && errno != EEXIST) break;
     }
     if (given) numbered_[joined(member.folders) + "/" + wanted] = member.name;
@@ -262,7 +260,7 @@ int Unpacker::makeFile(archive* source, Member& member) {
         return ORV_ERR_FILE_TOO_BIG;
     }
     NewFile file(member.folder.get());
-    if (!file.create()) return codeOf(errno);
+    if (!file.create(member.name, 0600)) return codeOf(errno);
     const int code = fill(source, member, file.get());
     if (code != ORV_ERR_NONE) return code;
     // A file that its owner could not read or write would be of no use to him.
@@ -272,12 +270,8 @@ int Unpacker::makeFile(archive* source, Member& member) {
     futimens(file.get(), when.data());
     struct stat made {};
     if (fstat(file.get(), &made) != 0) return codeOf(errno);
-    const int named = nameIt(
-        member,
-        [](void* what, const std::string& name, bool replace) {
-            return static_cast<NewFile*>(what)->publish(name, replace);
-        },
-        &file);
+    const int named =
+        nameIt(member, [&file](const std::string& name, bool replace) { return file.publish(name, replace); });
     if (named == ORV_ERR_NONE) unpacked_.insert({made.st_dev, made.st_ino});
     return named;
 }
@@ -321,17 +315,9 @@ int Unpacker::fill(archive* source, const Member& member, int file) {
 int Unpacker::makeLink(Member& member) {
     const char* text = archive_entry_symlink(member.entry);
     if (text == nullptr || !staysInside(text, member.folders.size())) return ORV_ERR_DENIED;
-    struct Link {
-        const Descriptor& folder;
-        const char* text;
-    } link = {member.folder, text};
-    return nameIt(
-        member,
-        [](void* what, const std::string& name, bool replace) {
-            const auto& made = *static_cast<Link*>(what);
-            return putLink(made.folder.get(), name, made.text, replace);
-        },
-        &link);
+    return nameIt(member, [&](const std::string& name, bool replace) {
+        return putLink(member.folder.get(), name, text, replace);
+    });
 }
 
 // Opens the folder of the file that this unpacking made for the member of that path, and tells the name that it got.
@@ -359,20 +345,13 @@ int Unpacker::makeHardLink(Member& member) {
     if (!other) return ORV_ERR_ILLEGAL_NAME;
     struct stat there {};
     if (member.isThere(there) && target_.conflict == Conflict::kSkip) return kSkipped;
-    struct Names {
-        Descriptor from;
-        std::string name;
-        const Descriptor& to;
-    } names = {Descriptor(), "", member.folder};
+    Descriptor from;
+    std::string unpacked;
     int code = ORV_ERR_NONE;
-    if (!findUnpacked(*other, names.from, names.name, code)) return code;
-    return nameIt(
-        member,
-        [](void* what, const std::string& asName, bool replace) {
-            const auto& pair = *static_cast<Names*>(what);
-            return putHardLink(pair.from.get(), pair.name, pair.to.get(), asName, replace);
-        },
-        &names);
+    if (!findUnpacked(*other, from, unpacked, code)) return code;
+    return nameIt(member, [&](const std::string& name, bool replace) {
+        return putHardLink(from.get(), unpacked, member.folder.get(), name, replace);
+    });
 }
 
 // Folders get their permissions and times last: they were to be written in.

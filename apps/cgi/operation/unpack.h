@@ -41,8 +41,8 @@ class Unpacker {
     };
     Unpacker(Progress& progress, const Target& target) : progress_(progress), target_(target) {}
 
-    // Unpacks the open file. 0, or the library code of why not all could be read: 1401 no archive, 1402 broken, 1007
-    // beyond the limits.
+    // Unpacks the open file. 0, or the library code of why not all could be read: 1401 no archive, 1402 broken, 1403
+    // encrypted members, which are left out, 1007 beyond the limits.
     int run(int file, const UnpackLimits& limits);
     // The names that were given in the folder.
     [[nodiscard]] const std::set<std::string>& names() const { return names_; }
@@ -65,7 +65,8 @@ class Unpacker {
     int makeLink(Member& member);
     int makeHardLink(Member& member);
     int fill(archive* source, const Member& member, int file);
-    int nameIt(Member& member, bool (*give)(void* what, const std::string& name, bool replace), void* what);
+    template <class Give>
+    int nameIt(Member& member, Give give);
     bool findUnpacked(std::vector<std::string> components, Descriptor& folder, std::string& name, int& code) const;
     void tellConsumed(archive* source);
     void finishFolders();
@@ -79,6 +80,7 @@ class Unpacker {
     std::vector<MadeFolder> madeFolders_;
     long long bytes_ = 0, members_ = 0, folders_ = 0, consumed_ = 0;
     bool exceeded_ = false, torn_ = false;
+    bool locked_ = false;  // a member is encrypted
 };
 
 }  // namespace orvel::cgi

@@ -3,15 +3,12 @@
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/file.h>
-#include <sys/random.h>
 #include <sys/stat.h>
 
-#include <array>
 #include <cerrno>
-#include <cstdint>
-#include <cstring>
 #include <ctime>
 
+#include "base/random.h"
 #include "orvel/error_state.h"
 #include "orvel/upload_check.h"
 #include "temporary_folder.h"
@@ -19,40 +16,8 @@
 namespace orvel::cgi {
 namespace {
 
-constexpr const char* kPrefix = "part-";
+constexpr std::string_view kPrefix = "part-";
 constexpr time_t kAbandonedAfter = 3600;  // seconds
-
-int codeOfWrite(int error) {
-    switch (error) {
-        case EDQUOT:
-            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_QUOTA);
-        case ENOSPC:
-            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_NO_SPACE);
-        case EROFS:
-            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_READ_ONLY);
-        case ENOENT:
-            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_MISSING);
-        case EACCES:
-        case EPERM:
-            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_DENIED);
-        case EFBIG:
-            return ORV_ERR_UPLOAD_TOO_LARGE;
-        default:
-            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_WRITE);
-    }
-}
-
-std::string randomName() {
-    static constexpr char digits[] = "0123456789abcdef";
-    std::array<std::uint8_t, 16> bytes{};
-    if (getrandom(bytes.data(), bytes.size(), 0) != static_cast<ssize_t>(bytes.size())) return "";
-    std::string name = kPrefix;
-    for (const std::uint8_t byte : bytes) {
-        name += digits[byte >> 4];
-        name += digits[byte & 15];
-    }
-    return name;
-}
 
 // Removes what a killed process left under a name: nobody holds its lock, and it has not been written to for a while
 // (a file is unlocked for a moment after it was made).
@@ -61,7 +26,8 @@ void removeAbandoned(const Descriptor& folder) {
     DIR* names = fd < 0 ? nullptr : fdopendir(fd);
     if (names == nullptr) return;
     while (const dirent* entry = readdir(names)) {
-        if (strncmp(entry->d_name, kPrefix, strlen(kPrefix)) != 0) continue;
+        const std::string_view name = entry->d_name;
+        if (!name.starts_with(kPrefix) && !isPartName(name)) continue;
         const Descriptor file(openat(folder.get(), entry->d_name, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
         struct stat status {};
         const bool old = file && fstat(file.get(), &status) == 0 && status.st_mtime < time(nullptr) - kAbandonedAfter;
@@ -72,8 +38,38 @@ void removeAbandoned(const Descriptor& folder) {
 
 }  // namespace
 
+int uploadCodeOf(int error) {
+    switch (error) {
+        case EDQUOT:
+            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_QUOTA);
+        case ENOSPC:
+            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_NO_SPACE);
+        case EROFS:
+            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_READ_ONLY);
+        case ENOENT:
+        case ENOTDIR:
+            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_MISSING);
+        case EACCES:
+        case EPERM:
+            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_DENIED);
+        case EFBIG:
+            return ORV_ERR_UPLOAD_TOO_LARGE;
+        case ECANCELED:
+            return ORV_ERR_UPLOAD_CANCELLED;
+        case EEXIST:
+        case EISDIR:
+            return ORV_ERR_EXISTS;
+        case ENAMETOOLONG:
+            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_NAME_TOO_LONG);
+        case EINVAL:  // of a name that was accepted before: the file system cannot hold it
+            return ORV_ERR_FAT_NAME;
+        default:
+            return ConvUploadErrnoToAPIErr(CGI_UPLOAD_WRITE);
+    }
+}
+
 Spool::~Spool() {
-    if (!name_.empty()) unlinkat(folder_.get(), name_.c_str(), 0);
+    if (named_) unlinkat(folder_.get(), name_.c_str(), 0);
 }
 
 // "@tmp/orvel" is everybody's to write in: nothing in it is used that is not the caller's alone.
@@ -82,31 +78,27 @@ int Spool::openFolder(const std::string& volumePath) {
     if (temporary) folder_ = openOwnFolder(temporary, "upload-" + std::to_string(geteuid()));
     if (folder_) return ORV_ERR_NONE;
     const bool inTheWay = errno == ENOTDIR || errno == ELOOP;
-    return inTheWay ? ConvUploadErrnoToAPIErr(CGI_UPLOAD_DENIED) : codeOfWrite(errno);
+    return inTheWay ? ConvUploadErrnoToAPIErr(CGI_UPLOAD_DENIED) : uploadCodeOf(errno);
 }
 
 int Spool::open(const std::string& volumePath) {
     const int code = openFolder(volumePath);
     if (code != ORV_ERR_NONE) return code;
     removeAbandoned(folder_);
-    file_ = Descriptor(openat(folder_.get(), ".", O_TMPFILE | O_RDWR | O_CLOEXEC, 0600));
-    if (!file_) {
-        if (errno != EOPNOTSUPP && errno != EISDIR && errno != EINVAL) return codeOfWrite(errno);
-        std::string name = randomName();
-        file_ =
-            Descriptor(openat(folder_.get(), name.c_str(), O_CREAT | O_EXCL | O_RDWR | O_NOFOLLOW | O_CLOEXEC, 0600));
-        if (!file_) return codeOfWrite(errno);
-        name_ = std::move(name);
-    }
-    flock(file_.get(), LOCK_EX | LOCK_NB);  // see removeAbandoned; where locks are unknown, age alone decides
+    const std::string drawn = draw<16>();
+    if (drawn.empty()) return uploadCodeOf(errno);
+    name_ = std::string(kPrefix) + drawn;
+    file_.emplace(folder_.get());
+    if (!file_->create(name_, 0600)) return uploadCodeOf(errno);
+    flock(file_->get(), LOCK_EX | LOCK_NB);  // see removeAbandoned; where locks are unknown, age alone decides
     return ORV_ERR_NONE;
 }
 
 int Spool::write(std::string_view data) {
     while (!data.empty()) {
-        const ssize_t written = ::write(file_.get(), data.data(), data.size());
+        const ssize_t written = ::write(file_->get(), data.data(), data.size());
         if (written < 0 && errno == EINTR) continue;
-        if (written <= 0) return codeOfWrite(written < 0 ? errno : ENOSPC);
+        if (written <= 0) return uploadCodeOf(written < 0 ? errno : ENOSPC);
         data.remove_prefix(static_cast<size_t>(written));
         size_ += written;
     }
@@ -114,15 +106,8 @@ int Spool::write(std::string_view data) {
 }
 
 std::string Spool::publish() {
-    if (name_.empty()) {
-        const std::string name = randomName();
-        if (name.empty() ||
-            linkat(AT_FDCWD, file_.path().c_str(), folder_.get(), name.c_str(), AT_SYMLINK_FOLLOW) != 0) {
-            return "";
-        }
-        name_ = name;
-    }
-    return folder_.path(name_);
+    if (!named_) named_ = file_->publish(name_, false);
+    return named_ ? folder_.path(name_) : "";
 }
 
 }  // namespace orvel::cgi

@@ -2,12 +2,17 @@
 #ifndef ORVEL_CGI_UPLOAD_SPOOL_H
 #define ORVEL_CGI_UPLOAD_SPOOL_H
 
+#include <optional>
 #include <string>
 #include <string_view>
 
 #include "base/descriptor.h"
+#include "base/new_file.h"
 
 namespace orvel::cgi {
+
+// The library code for a failure to store what was uploaded, an errno value.
+int uploadCodeOf(int error);
 
 // A file without a name where the file system can make one, so that it goes away with the process, however that ends;
 // else one with a name of its own in a folder that only the user can enter.
@@ -22,15 +27,17 @@ class Spool {
     int open(const std::string& volumePath);
     // Appends. 0 or a library code.
     int write(std::string_view data);
-    // A path under which the finished file can be read; "" on failure. It is gone with this object.
+    // A path under which the finished file can be read; "" with errno on failure. It is gone with this object.
     std::string publish();
     [[nodiscard]] long long size() const { return size_; }
 
  private:
     int openFolder(const std::string& volumePath);
 
-    Descriptor folder_, file_;
-    std::string name_;  // "" while the file has none
+    Descriptor folder_;
+    std::optional<NewFile> file_;
+    std::string name_;
+    bool named_ = false;
     long long size_ = 0;
 };
 

@@ -3,9 +3,11 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <csignal>
 
+#include "base/new_file.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 #include "orvel/file_info.h"
@@ -15,6 +17,8 @@
 #include "reply.h"
 #include "shown_search.h"
 #include "temporary_folder.h"
+#include "vexo/copy.h"
+#include "vexo/user.h"
 
 namespace orvel::cgi {
 namespace {
@@ -26,6 +30,13 @@ void prepareVolume(std::string volumePath) {
     static_cast<void>(openTemporaryFolder(volumePath));
     static_cast<void>(OrvCreateTmpDir(volumePath.data()));
     umask(022);  // that of every other file
+}
+
+// Waits for the target's name, and those of the folders that were made for it.
+bool isOnDisk(const Target& target) {
+    return syncName(target.folder.get(), target.name) &&
+           std::all_of(target.made.begin(), target.made.end(),
+                       [](const MadeFolder& made) { return syncName(made.parent.get(), made.name); });
 }
 
 }  // namespace
@@ -79,15 +90,20 @@ int Upload::write(std::string_view data) {
     return skipped_ ? ORV_ERR_NONE : spool_.write(data);
 }
 
-// Unless an existing file may be replaced, the name is taken first, by an empty file that nobody else can have made:
-// what came into being since begin() is not replaced either.
-int Upload::reserve(const Target& target, bool& reserved) {
-    if (mode_ == OVERWRITE_MODE_OVERWRITE) return ORV_ERR_NONE;
-    const Descriptor mark(
-        openat(target.folder.get(), target.name.c_str(), O_CREAT | O_EXCL | O_WRONLY | O_NOFOLLOW | O_CLOEXEC, 0666));
-    reserved = static_cast<bool>(mark);
-    skipped_ = !mark && errno == EEXIST && mode_ == OVERWRITE_MODE_SKIP;
-    return mark || skipped_ ? ORV_ERR_NONE : OrvParseErrnoToError(errno, info_.shareName.c_str(), nullptr);
+// Gives the data its place, as the mode says. Unless an existing file may be replaced, what came into being since
+// begin() is not replaced either.
+int Upload::put(const Target& target) {
+    const std::string source = spool_.publish(), place = target.folder.path(target.name);
+    if (source.empty()) return uploadCodeOf(errno);
+    if (mode_ == OVERWRITE_MODE_OVERWRITE) {
+        OrvLibSetErr(ORV_ERR_NONE);
+        return MoveFile(user_.name.c_str(), source.c_str(), place.c_str(), isCancelled) ? ORV_ERR_NONE : lastCode();
+    }
+    VEXOCOPYOPT options = {.uid = 0, .gid = 0, .isCancelled = isCancelled, .switches = VEXO_COPY_TAKE | VEXO_COPY_SYNC};
+    if (VEXOUserGetUGID(user_.name.c_str(), &options.uid, &options.gid) != 0) return ORV_ERR_GENERAL;
+    if (VEXOFileCopy(source.c_str(), place.c_str(), &options) == 0) return ORV_ERR_NONE;
+    skipped_ = errno == EEXIST && mode_ == OVERWRITE_MODE_SKIP;
+    return skipped_ ? ORV_ERR_NONE : uploadCodeOf(errno);
 }
 
 int Upload::finish() {
@@ -95,19 +111,14 @@ int Upload::finish() {
     Target target;
     int code = openTarget(info_, linkPolicyOf(info_.shareName), user_.name, Missing::kMake, target);
     if (code != ORV_ERR_NONE) return code;
-    bool reserved = false;
-    code = reserve(target, reserved);
+    code = put(target);
     if (skipped_) return ORV_ERR_NONE;
-    OrvLibSetErr(ORV_ERR_NONE);
-    if (code == ORV_ERR_NONE &&
-        !MoveFile(user_.name.c_str(), spool_.publish().c_str(), target.folder.path(target.name).c_str(), isCancelled)) {
-        code = lastCode();
-        if (reserved) unlinkat(target.folder.get(), target.name.c_str(), 0);
-    }
     if (code != ORV_ERR_NONE) {
         removeMadeFolders(target);
         return code;
     }
+    // From here on it is somebody's file, and stays: another upload may have replaced it already.
+    if (!isOnDisk(target)) return OrvParseErrnoToError(errno, nullptr, nullptr);
     OrvLibDoLog(user_.name, path_, size(), ORVEL_ACTION_UPLOAD, false);
     ShownSearch(user_.name, search_).added({info_, target.folder, target.name});
     return ORV_ERR_NONE;

@@ -27,7 +27,7 @@ class Upload {
     // Asks every rule and takes on the user's identity.
     int begin();
     int write(std::string_view data);
-    // Puts the file in place and logs it.
+    // Puts the file in place and logs it. On 0 it is on the disk, under its name.
     int finish();
 
     // An existing file was left as it is, as asked for; what is written is not kept. Known after begin().
@@ -37,7 +37,7 @@ class Upload {
 
  private:
     int inspect();
-    int reserve(const Target& target, bool& reserved);
+    int put(const Target& target);
 
     const User& user_;
     std::string path_;

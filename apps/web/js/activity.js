@@ -103,12 +103,7 @@ export class Card {
     this.errors.hidden = list.length === 0;
     const shown = list.slice(0, MOST_ERRORS);
     const lines = shown.map(({ id, path, title, why }) =>
-      h(
-        "li",
-        { title: plainName(path) },
-        title,
-        why && h("button.link", { type: "button", onclick: () => showWhyOf(id) }, t("why.ask")),
-      ),
+      h("li", { title: plainName(path) }, title, why && h("button.link", { type: "button", onclick: () => showWhyOf(id) }, t("why.ask"))),
     );
     const more = leftOut + list.length - shown.length;
     if (more > 0) lines.push(h("li", {}, t("activity.more_errors", { count: more })));

@@ -24,8 +24,7 @@ export const browser = {
   listing: null,
   selection: new Selection({
     onChange: () => emit("selection"),
-    onFailure: (failure) =>
-      failure ? toastFailure(failure, browser.id) : toast({ text: t("chosen.again"), kind: "failed" }),
+    onFailure: (failure) => (failure ? toastFailure(failure, browser.id) : toast({ text: t("chosen.again"), kind: "failed" })),
   }),
   mode: pref("mode", "list"),
   sort: pref("sort", { by: "name", ascending: true }),
@@ -135,8 +134,7 @@ async function show(id, mine, wanted, keep = false) {
   if (!listing.ready && !listing.error) await listing.need(0, FIRST_LOOK);
   if (mine !== turn || !listing.ready) return;
   if (saved) restore(saved);
-  if (keep)
-    await checkChosen(listing, browser.filter === "" && browser.kind === "all" ? "chosen.gone" : "chosen.hidden");
+  if (keep) await checkChosen(listing, browser.filter === "" && browser.kind === "all" ? "chosen.gone" : "chosen.hidden");
   else if (wanted) await choose(listing, wanted.id, wanted.far);
 }
 

@@ -78,7 +78,12 @@ async function makeLink(entry) {
             }),
             t("link.password.proposed"),
           ),
-          h("div.pair", {}, field("available", available), field("expires", expires)),
+          h(
+            "div.pair",
+            {},
+            field("available", available),
+            field("expires", expires),
+          ),
           h("p.soft", {}, t(entry.isFolder ? "link.about.folder" : "link.about.file")),
           complaint,
         ),
@@ -124,12 +129,7 @@ function showLink(link, password) {
           h(
             "div.address-line",
             {},
-            h("input.input.password", {
-              type: "text",
-              readonly: true,
-              value: password,
-              "aria-label": t("link.password"),
-            }),
+            h("input.input.password", { type: "text", readonly: true, value: password, "aria-label": t("link.password") }),
             h(
               "button.button.outlined",
               { type: "button", onclick: () => copyText(password, t("link.password.copied")) },

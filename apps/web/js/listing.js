@@ -180,7 +180,7 @@ export class Listing {
 
   async namesOf(one, from, to, signal) {
     let found = [];
-    for (let offset = from; offset <= to;) {
+    for (let offset = from; offset <= to; ) {
       const most = Math.min(this.longest, to - offset + 1);
       const limit = Number.isFinite(most) ? most : 0; // 0: everything
       const reply = await this.fetchPart(one.part, { offset, limit, brief: true, signal });

@@ -2,16 +2,25 @@
 
 import { setupAccess } from "./access.js";
 import { setupActivity } from "./activity.js";
-import { browser, columns, goUp, loadShares, open, refresh, setSort, shareEntry } from "./browser.js";
+import {
+  browser,
+  columns,
+  goUp,
+  loadShares,
+  open,
+  refresh,
+  setFilter,
+  setKind,
+  setSort,
+  shareEntry,
+} from "./browser.js";
 import { context, runCommand } from "./commands.js";
 import { setWhy } from "./dialogs.js";
 import { $, h, keepFocus, loadIcons } from "./dom.js";
 import { setupDragAndDrop } from "./dragdrop.js";
 import { on } from "./events.js";
 import { homeNode, paintVolume } from "./home.js";
-import { clearFilter, setupFind } from "./find.js";
 import { setupKeys } from "./keys.js";
-import { lookAhead } from "./look_ahead.js";
 import "./links.js";
 import { isUnreachable, untilReachable } from "./network.js";
 import { newFolder } from "./operations.js";
@@ -38,8 +47,14 @@ import { chooseFiles, uploadsRunning } from "./uploads.js";
 import { View } from "./view.js";
 import { showWhy } from "./why.js";
 
+const ASK_EACH = 100;
+const LOOK_AHEAD = 400; // milliseconds of movement
+const FARTHEST = 400; // rows
+const TOO_FAST = 2; // rows in a millisecond
 let stateNode = null;
 let homeShown = null;
+let scrollTimer = null;
+let lastAsk = { at: 0, first: 0 };
 
 function setState(node) {
   stateNode?.remove();
@@ -110,6 +125,64 @@ function stateOf(listing) {
   return inBin ? emptyBin() : emptyFolder({ canWrite, upload: () => chooseFiles(false), newFolder });
 }
 
+function clearFilter() {
+  $("find").value = "";
+  if (document.activeElement !== $("find")) document.querySelector(".top").classList.remove("finding");
+  if (browser.kind !== "all") setKind("all");
+  setFilter("");
+}
+
+// While the list moves, pages are asked for from time to time, with those that come into sight next at this speed.
+// What flies by faster than it could come is never fetched.
+function scrolled() {
+  scrollTimer ??= setTimeout(askAhead, Math.max(0, lastAsk.at + ASK_EACH - performance.now()));
+}
+
+function askAhead() {
+  scrollTimer = null;
+  if (!browser.listing) return undefined;
+  const now = performance.now();
+  const [first, last] = browser.view.inSight;
+  const speed = (first - lastAsk.first) / Math.max(1, now - lastAsk.at);
+  const ahead = Math.max(-FARTHEST, Math.min(FARTHEST, Math.round(speed * LOOK_AHEAD)));
+  lastAsk = { at: now, first };
+  if (Math.abs(speed) > TOO_FAST) return scrolled();
+  browser.listing.need(first + Math.min(0, ahead), last + Math.max(0, ahead));
+  return undefined;
+}
+
+function setupFind() {
+  const input = $("find");
+  let timer = null;
+  input.addEventListener("input", () => {
+    clearTimeout(timer);
+    if (browser.id !== "/") timer = setTimeout(() => setFilter(input.value.trim()), 180);
+  });
+  input.addEventListener("keydown", (event) => {
+    if (event.key === "Escape") {
+      clearFilter();
+      $("view").focus();
+    }
+    if (event.key === "ArrowDown") $("view").focus();
+    // Here is only what lies in this folder: Enter looks below it, and from the start in all shares.
+    if (event.key === "Enter" && input.value.trim() !== "") {
+      clearTimeout(timer);
+      searchFor(input.value.trim());
+    }
+  });
+  $("find-clear").addEventListener("click", () => {
+    clearTimeout(timer);
+    clearFilter();
+    input.focus();
+  });
+  on("clear-filter", clearFilter);
+  on("place", () => {
+    clearTimeout(timer);
+    input.value = "";
+    document.querySelector(".top").classList.remove("finding");
+  });
+}
+
 function setupSidebar() {
   const button = $("menu-button");
   const close = () => {
@@ -145,7 +218,7 @@ function fillTexts() {
 async function start() {
   await Promise.all([loadStrings(), loadIcons()]);
   fillTexts();
-  browser.view = new View($("view"), { onScrolled: lookAhead });
+  browser.view = new View($("view"), { onScrolled: scrolled });
   setWhy(showWhy);
   on("shown", showPlace);
   on("listing", paintListing);

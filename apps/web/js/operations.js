@@ -8,7 +8,7 @@ import { extensionOf } from "./entries.js";
 import { emit } from "./events.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
-import { childOf, decode, encodeName, isSearch, parentOf, splitExtension } from "./path.js";
+import { childOf, decode, encodeName, isSearch, nameOf, parentOf, splitExtension } from "./path.js";
 import { entryAt } from "./sources.js";
 import { t } from "./strings.js";
 import { whyNode } from "./why.js";

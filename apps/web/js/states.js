@@ -66,9 +66,7 @@ export function failedState(failure, path, { retry, back, why }) {
   const said = describe(failure, path);
   const icons = { 407: "lock", 408: "search", 410: "offline" };
   const out = failure.key === "page:logged_out";
-  const actions = [
-    out ? { label: t("state.login"), run: () => location.reload() } : { label: t("state.retry"), run: retry },
-  ];
+  const actions = [out ? { label: t("state.login"), run: () => location.reload() } : { label: t("state.retry"), run: retry }];
   if (back) actions.unshift({ label: t("state.back"), run: back });
   if (said.why && why) actions.push({ label: t("why.ask"), run: why });
   return state(icons[failure.code] ?? "warning", said.title, said.hint, actions, true);

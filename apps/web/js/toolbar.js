@@ -84,12 +84,7 @@ function button(id, className = "") {
   const keys = shortcutOf(found);
   return h(
     `button.button${className}`,
-    {
-      type: "button",
-      "data-command": id,
-      title: t(`command.${id}`) + (keys ? ` (${keys})` : ""),
-      onclick: () => runCommand(id),
-    },
+    { type: "button", "data-command": id, title: t(`command.${id}`) + (keys ? ` (${keys})` : ""), onclick: () => runCommand(id) },
     icon(found.icon),
     h("span", {}, t(`command.${id}`)),
   );

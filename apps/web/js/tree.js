@@ -87,7 +87,10 @@ async function load(id, node) {
   node.group.replaceChildren(
     ...items.slice(0, MOST).map((folder) => {
       const child = idIn(folder);
-      return kept.get(child) ?? makeItem(child, labelOf(child), folderKindOf(child, folder.mount_type ?? ""), level);
+      return (
+        kept.get(child) ??
+        makeItem(child, labelOf(child), folderKindOf(child, folder.mount_type ?? ""), level)
+      );
     }),
     ...(items.length > MOST ? [moreItem(id, items.length - MOST, level)] : []),
   );
