@@ -162,7 +162,8 @@ bool MultipartReader::afterDelimiter() {
         const bool mayCome = padding >= buffer_.size() - 1 && buffer_.size() <= kLongestPadding;
         return mayCome ? false : end(Status::kMalformed);
     }
-    if (padding != lineEnd || ++parts_ > kMostParts) return end(Status::kMalformed);
+    // The limit is the same whether the line came at once or in pieces; so is the one of headers.
+    if (padding != lineEnd || lineEnd >= kLongestPadding || ++parts_ > kMostParts) return end(Status::kMalformed);
     buffer_.erase(0, lineEnd);  // the line end stays: headers that are empty end at once
     state_ = State::kHeaders;
     return true;
@@ -174,7 +175,8 @@ bool MultipartReader::readHeaders() {
         return buffer_.size() > kLongestHeaders ? end(Status::kMalformed) : false;
     }
     PartHeader header;
-    if (headersEnd < 2 || !parsePartHeader(std::string_view(buffer_).substr(2, headersEnd - 2), header)) {
+    if (headersEnd < 2 || headersEnd + 3 > kLongestHeaders ||
+        !parsePartHeader(std::string_view(buffer_).substr(2, headersEnd - 2), header)) {
         return end(Status::kMalformed);
     }
     buffer_.erase(0, headersEnd + 2);  // again the line end stays: an empty body is followed by its delimiter at once

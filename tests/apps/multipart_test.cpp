@@ -89,6 +89,25 @@ TEST(Multipart, Malformed) {
     }
 }
 
+TEST(Multipart, LimitsAreTheSameInPiecesOfAnySize) {
+    const auto headers = [](std::size_t length) {
+        const std::string line = "Content-Disposition: form-data; name=a\r\nX: ";
+        return line + std::string(length - line.size(), 'x');
+    };
+    struct {
+        std::size_t blanks, headers;
+        Status expected;
+    } const cases[] = {{63, 100, Status::kDone},  {64, 100, Status::kMalformed},  {5000, 100, Status::kMalformed},
+                       {0, 16379, Status::kDone}, {0, 16380, Status::kMalformed}, {0, 50000, Status::kMalformed}};
+    for (const auto& [blanks, length, expected] : cases) {
+        const std::string body = "--XX" + std::string(blanks, ' ') + "\r\n" + headers(length) + "\r\n\r\nb\r\n--XX--";
+        for (const std::size_t piece : {body.size(), std::size_t{1}, std::size_t{7}}) {
+            Collector all;
+            EXPECT_EQ(readWhole(body, all, piece), expected) << blanks << " " << length << " in pieces of " << piece;
+        }
+    }
+}
+
 TEST(Multipart, MemoryStaysFlat) {
     Collector all;
     orvel::cgi::MultipartReader reader("XX", all);
