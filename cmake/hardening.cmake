@@ -1,6 +1,11 @@
-# Warnings and hardening for every target of the project.
+# Warnings and hardening for every target of the project. Warnings are errors in the presets alone: elsewhere the compiler
+# may be one that warns of something new.
+set(warnings_as_errors)
+if(ORVEL_WERROR)
+  set(warnings_as_errors -Werror)
+endif()
 add_compile_options(
-  -Wall -Wextra -Werror -Wshadow -Wformat=2 -Wundef -Wvla -Wcast-align -Wpointer-arith
+  -Wall -Wextra ${warnings_as_errors} -Wshadow -Wformat=2 -Wundef -Wvla -Wcast-align -Wpointer-arith
   $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor> $<$<COMPILE_LANGUAGE:CXX>:-Woverloaded-virtual>
   -fstack-protector-strong -fno-plt -fno-semantic-interposition)
 add_link_options(-Wl,-z,relro -Wl,-z,now -Wl,-z,noexecstack -Wl,--as-needed)

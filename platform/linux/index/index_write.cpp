@@ -128,7 +128,9 @@ bool Database::update(const Node* set, const Node* where) {
     std::string sql = "UPDATE record SET ";
     std::vector<Value> values;
     for (const Node* node : nodes) {
-        sql += (values.empty() ? "" : ",") + std::string(columnOf(node->type)->name) + "=?";
+        if (!values.empty()) sql += ',';
+        sql += columnOf(node->type)->name;
+        sql += "=?";
         values.push_back(valueOf(*node));
     }
     append(values, condition->values);
