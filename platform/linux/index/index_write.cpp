@@ -102,7 +102,9 @@ bool Database::clearTarget(const std::vector<const Node*>& set, const Condition&
     std::vector<Value> values;
     for (const Node* node : set) {
         if (node->type != FI_COL_SHARE && node->type != FI_COL_PATH) continue;
-        (node->type == FI_COL_SHARE ? share : path) = "?" + std::to_string(values.size() + 1);
+        std::string& parameter = node->type == FI_COL_SHARE ? share : path;
+        parameter = '?';
+        parameter += std::to_string(values.size() + 1);
         values.push_back(valueOf(*node));
     }
     if (values.empty()) return true;
