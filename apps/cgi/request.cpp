@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <algorithm>
 #include <charconv>
 #include <cstdlib>
 #include <memory>
