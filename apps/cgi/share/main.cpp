@@ -39,7 +39,7 @@
 namespace orvel::cgi {
 namespace {
 
-// Each is open while the zip is made.
+// Each is looked at before the zip begins.
 constexpr size_t kMostPaths = 500;
 constexpr int kShown = ADDITIONAL_SIZE | ADDITIONAL_TIME | ADDITIONAL_TYPE | kAdditionalIcon;
 
