@@ -6,6 +6,7 @@ import { $ } from "./dom.js";
 import { t } from "./strings.js";
 
 const TYPING_PAUSE = 900; // after which a letter begins a new word
+const TYPED_SHOWS = 4000;
 const TYPING_GAP = 200; // in which the next letter mostly comes
 let typed = "";
 let typedAt = 0;
@@ -87,7 +88,8 @@ function typeAhead(event) {
   if (!listing?.ready || event.ctrlKey || event.metaKey || event.altKey) return false;
   const now = performance.now();
   const continued = now - typedAt < TYPING_PAUSE && typed !== "";
-  const back = event.key === "Backspace" && continued;
+  // As long as one sees what was typed, the last letter can be taken back.
+  const back = event.key === "Backspace" && typed !== "" && !$("typed").hidden;
   if (!back && (event.key.length !== 1 || "/?".includes(event.key) || (event.key === " " && !continued))) return false;
   typed = back ? typed.slice(0, -1) : continued ? typed + event.key : event.key;
   typedAt = now;
@@ -103,7 +105,7 @@ function showTyped(text, words = "jump.to") {
   clearTimeout(shownTimer);
   $("typed").hidden = text === "";
   $("typed").textContent = text === "" ? "" : t(words, { text });
-  shownTimer = setTimeout(showTyped, 2 * TYPING_PAUSE, "");
+  shownTimer = setTimeout(showTyped, TYPED_SHOWS, "");
 }
 
 let jumps = 0;

@@ -35,7 +35,10 @@ export function preview(entry) {
     shown.abort.abort();
     node.remove();
     shown = null;
-    if (history.state?.preview) history.back();
+    if (history.state?.preview) {
+      leaving = true;
+      history.back();
+    }
   });
   node.addEventListener("click", (event) => {
     if (event.target === node || event.target === stage) node.close();
@@ -52,12 +55,24 @@ export function preview(entry) {
   document.body.append(node);
   node.showModal();
   node.focus();
-  // The way back leads out of the preview first.
+  if (!leaving) enter();
+}
+
+// The way back leads out of the preview first. A step back takes a while: who opens the next preview meanwhile gets in
+// once it is done.
+let leaving = false;
+
+function enter() {
   history.pushState({ preview: true }, "");
 }
 
 addEventListener("popstate", (event) => {
-  if (!event.state?.preview) shown?.node.close();
+  if (leaving) {
+    leaving = false;
+    if (shown) enter();
+  } else if (!event.state?.preview) {
+    shown?.node.close();
+  }
 });
 
 // The next file of the list; the selection goes along.
