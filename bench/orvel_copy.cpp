@@ -12,6 +12,7 @@
 
 namespace fs = std::filesystem;
 using namespace orvel::cgi;
+using orvel::Descriptor;
 
 int main(int argc, char** argv) {
     std::string root = fs::temp_directory_path() / "orvel-copy-XXXXXX";

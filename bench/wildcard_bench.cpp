@@ -5,7 +5,7 @@
 #include <functional>
 #include <string>
 
-#include "../src/util/wildcard.cpp"  // the matcher itself is not exported
+#include "../src/base/wildcard.cpp"  // the matcher itself is not exported
 #include "../tests/base/wildcard_model.h"
 #include "contest.h"
 #include "orvel/text.h"

@@ -12,13 +12,15 @@ fi
 
 photo=$(root_of photo)
 spool=/tmp/@tmp/orvel/upload-30001
+rm -rf "$spool" # the machine's temporary place outlives a run that was killed
 url=http://127.0.0.1:$port/cgi-bin
 as_alice=(-s -u "alice:$(password alice)")
 code() { sed -n 's/.*"code":\([0-9]*\).*/\1/p' <<<"$1"; }
 programs() { # process ids of the uploads that run
-    local link
-    for link in /proc/[0-9]*/exe; do
-        [ "$(readlink "$link")" != "$build/cgi/upload" ] || { link=${link#/proc/}; echo "${link%/exe}"; }
+    local process name
+    for process in /proc/[0-9]*; do
+        IFS= read -r -d '' name 2>/dev/null <"$process/cmdline" || continue
+        [ "$name" != "$build/cgi/upload" ] || echo "${process#/proc/}"
     done
 }
 await() { # what, command...: up to 20 seconds
@@ -49,7 +51,8 @@ nothing_left() { # after what
 mib=${ORVEL_TEST_UPLOAD_MIB:-256}
 truncate -s "${mib}M" "$work/large"
 printf end >>"$work/large"
-curl "${as_alice[@]}" -T "$work/large" "$url/upload?path=/photo/large" >"$work/reply" &
+# As slow as it takes to look at its memory many times.
+curl "${as_alice[@]}" --limit-rate 128M -T "$work/large" "$url/upload?path=/photo/large" >"$work/reply" &
 client=$!
 peak=0
 while kill -0 "$client" 2>/dev/null; do

@@ -207,7 +207,7 @@ TEST_F(SearchCgi, RequestsAreTakenStrictly) {
         {"action=start&path=/photo&atime_to=1e9", 400, 400, "atime_to"},
         {"action=start&path=/photo&size_less=10%20MB", 400, 400, "size_less"},
         {"action=start&path=/photo&size_equal=99999999999999999999", 400, 400, "size_equal"},
-        {"action=start&name=a&path=", 200, 400, ""},
+        {"action=start&name=a&path=", 400, 400, ""},
         {"action=start&name=a&path=/", 200, 401, ""},
         {"action=start&name=a&path=/nowhere", 200, 408, ""},
         {"action=start&name=a&path=/photo&path=/photo/missing", 200, 408, ""},
@@ -324,10 +324,10 @@ TEST_F(SearchCgi, ASearchThatCouldNotStoreAllHasFailed) {
     SKIP_WITHOUT_ROOT();
     for (int i = 0; i < 3000; ++i) writeFile(shareRoot("photo") + "/" + std::to_string(i), "");
     for (const bool indexed : {false, true}) {
-        if (indexed) addShare("photo", kIndexed);
+        addShare("photo", indexed ? kIndexed : "read only = no\n");
         if (indexed) index("build", "photo");
         inChild([&] {
-            const rlimit small = {500000, 500000};
+            const rlimit small = {100000, 100000};
             EXPECT_TRUE(signal(SIGXFSZ, SIG_IGN) != SIG_ERR && setrlimit(RLIMIT_FSIZE, &small) == 0);
             const std::string id = start("carol", "path=/photo&type=file");
             const Json::Value data = finished("carol", id).json["data"];
