@@ -44,7 +44,7 @@ class Criteria {
 // The names above, in their order.
 const std::vector<std::string>& criterionNames();
 
-// Makes the criteria from what `valueOf` gives for each name. 0; 400 for a value that is none (no number, another kind,
+// Makes the criteria from what `valueOf` gives for each name. 0; 400 for an invalid value (not a number, unknown kind,
 // a pattern over 490 bytes, more than 100 of them) and for none at all, 403 unknown user, 404 unknown group, with the
 // name in `culprit` ("" for none at all).
 int parseCriteria(const std::function<std::string(const std::string& name)>& valueOf, Criteria& criteria,

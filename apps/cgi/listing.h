@@ -57,9 +57,9 @@ int listOpened(const ListRequest& request, const Descriptor& folder, const std::
                const std::string& realPath, Listing& listing);
 int listShares(const ListRequest& request, Listing& listing);
 
-// Appends the object of one entry, always valid UTF-8: a name or path that is none is shown readable, with "name_raw"
+// Appends the object of one entry, always valid UTF-8: a name or path that is not is shown readable, with "name_raw"
 // and "path_raw", its bytes percent-encoded, beside it. The "icon" of an entry is looked for from the working directory
-// (see GetImgFileExt). Entries of the share listing also tell the user's right
+// (see GetImgFileExt). Entries of the share listing also have the user's right
 // ("perm": "share_right", "ftp_privilege", "acl_enabled") and "sync_share".
 void appendEntry(const DIRENTRY_INFO& entry, int additional, std::string& out);
 void appendShare(const DIRENTRY_INFO& entry, int additional, std::string& out);

@@ -53,8 +53,8 @@ class MultipartReader {
     std::size_t skip_ = 0;  // bytes of the line end before a body that are still in the buffer
 };
 
-// The boundary of a content type "multipart/form-data; boundary=..."; "" when it is none, or no boundary of 1 to 70
-// bytes is given.
+// The boundary of a content type "multipart/form-data; boundary=..."; empty if the type is different, or no boundary of
+// 1 to 70 bytes is given.
 std::string boundaryOf(std::string_view contentType);
 
 // Reads the header lines of one part (without the empty line that ends them). False when they name no form field.

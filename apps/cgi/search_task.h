@@ -30,7 +30,7 @@ int findTask(const std::string& user, const std::string& id, SearchTask& task);
 // Makes the record of a new one, with the calling process as the one at work. Null on failure.
 std::unique_ptr<KTR::Task> makeRecord(const std::string& user, const std::string& id);
 
-// Tells the process at work to end with what it has, waits for it as long as a request may take, and tells whether it
+// Asks the process at work to end with what it has, waits for it as long as a request may take, and reports whether it
 // has ended. With `forGood` one that does not listen is killed.
 bool endWork(KTR::Task& record, bool forGood);
 // Removes database and record. False when the record stays.

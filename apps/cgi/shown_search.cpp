@@ -16,7 +16,7 @@
 namespace orvel::cgi {
 namespace {
 
-// The path that rows have: no links below the share's root. "" when it cannot be told.
+// The path that rows have: no links below the share's root. "" when it cannot be determined.
 std::string rowPath(const ChangedFile& file) {
     const auto folder = pathInShare(file.info, file.folder);
     return folder ? file.info.shareRoot + *folder + "/" + file.name : "";
@@ -107,7 +107,7 @@ void ShownSearch::moved(const ChangedFile& from, const ChangedFile& to) {
     const std::string source = rowPath(from), target = rowPath(to);
     if (source.empty()) return;
     const std::string sourceShare = definedShareName(from.info.shareName);
-    if (target.empty() || !statusOf(to.folder, to.name, status)) {  // whatever became of it, it is there no more
+    if (target.empty() || !statusOf(to.folder, to.name, status)) {  // whatever became of it, it is no longer there
         task_.results->delRecs(sourceShare, source);
         return;
     }

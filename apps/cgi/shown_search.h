@@ -21,7 +21,7 @@ struct ChangedFile {
 // done all the same.
 class ShownSearch {
  public:
-    // `taskId`: parameter "taskid", "" for none. One that the user does not have, or no more, is none.
+    // `taskId`: parameter "taskid", "" for none. An unknown or expired id counts as none.
     ShownSearch(const std::string& user, const std::string& taskId);
 
     // A file or folder came into being, or a file got a new content.

@@ -27,7 +27,7 @@ struct Target {
 enum class Missing { kRefuse, kMake };
 
 // Opens the folder that holds what `info` resolved to, as the calling identity. Missing ones are made on the way when
-// asked for, each with a name that may be used, owned by `user` also when the process acts as root. 0; 400 for a share
+// asked for, each with a name that may be used, owned by `user` even if the process acts as root. 0; 400 for a share
 // root, 418 for a path that ends in "." or "..", else a code as for confinedFolder, of OrvCheckFileName or of the
 // making; after a failure no folder made here is left.
 int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target);

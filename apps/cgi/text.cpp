@@ -12,7 +12,7 @@
 namespace orvel::cgi {
 namespace {
 
-// The first trail byte is what tells overlong forms, surrogates and numbers above U+10FFFF apart.
+// The first trail byte is what distinguishes overlong forms, surrogates and numbers above U+10FFFF.
 struct Lead {
     size_t length;
     unsigned char low, high;  // of the first trail byte

@@ -32,7 +32,8 @@ constexpr Command kCommands[] = {
      "       changed, --full all of them: what changed within a file does not show on its folder"},
     {"link", orvel::ctl::link,
      "link create PATH --user U [--propose | --password P] [--from DAY] [--until DAY]\n"
-     "                                                   publishes a path; a day is 2024-12-31; --propose prints a password\n"
+     "                                                   publishes a path; a day is 2024-12-31;\n"
+     "                                                   --propose draws a password and prints it\n"
      "       link list [--user U], link revoke ID [--user U]"},
     {"sharing", orvel::ctl::sharing,
      "sharing set everybody|admin_only|per_user           who may create links; list shows it\n"

@@ -87,8 +87,8 @@ struct _tag_SUBDIR_ENTRY_INFO_ {
 // unless it is a network mount.
 //
 // True with the library code 0; false with 400 (empty path, logged), 408 (missing or no folder), 407 (denied) or 402
-// (anything else, also when reading the folder fails half-way); `subDirs` is unchanged then. Side effect: the current
-// directory becomes the folder.
+// (anything else, including a folder that fails half-way through); `subDirs` is unchanged then. Side effect: the
+// current directory becomes the folder.
 ORVEL_API bool OrvLibEnumSubDir(std::string realPath, std::vector<_tag_SUBDIR_ENTRY_INFO_>& subDirs);
 
 #endif

@@ -12,7 +12,7 @@
 
 // Switches to `user`: group list, effective gid, then effective uid. An administrator keeps the effective uid 0, with
 // the groups of his own. `sid` (may be null) is the login session; with it the ids come from the session, and from the
-// user source only when the session does not tell the gid. Returns 0; -1 with 400 null user, 401 lookup failed, 403
+// user source only when the session does not give the gid. Returns 0; -1 with 400 null user, 401 lookup failed, 403
 // unknown user. After a failure the process may hold a part of the new identity: end the request.
 //
 // 0 does not prove that the kernel allowed the change (kept: started by an ordinary user a process goes on as itself).
@@ -21,12 +21,12 @@
 ORVEL_API int OrvLibUGIDSet(const char* sid, const char* user);
 
 // Sets the effective gid. `gid` may be (gid_t)-1, not known, when a `sid` is given; the session is then asked.
-// Returns 0 (also when the kernel refuses the change: kept, OrvLibUGIDSet looks at the outcome); -1 with 400 for a null
+// Returns 0 (even if the kernel refuses the change: kept, OrvLibUGIDSet looks at the outcome); -1 with 400 for a null
 // user or nothing to go by, 401 (not logged) when the session does not know the user.
 ORVEL_API int OrvLibEGIDSet(const char* sid, const char* user, gid_t gid);
 
 // Sets the effective uid: 0 for an administrator, else `uid`, or the session's answer when `uid` is (uid_t)-1.
-// Returns 0 (also when the kernel refuses); -1 with 400 as above, 401 when it cannot be told whether the user is an
+// Returns 0 (even if the kernel refuses); -1 with 400 as above, 401 when it cannot be determined whether the user is an
 // administrator, or (not logged) when the uid stays unknown.
 ORVEL_API int OrvLibEUIDSet(const char* sid, const char* user, uid_t uid);
 

@@ -17,7 +17,7 @@ ORVEL_API bool OrvCheckReservedName(const char* name);
 
 // May `name` be created inside the real directory `dirRealPath`? 0; -1 with 400 (null or empty), 418 (reserved), 419 (a
 // character that the FAT file system there cannot store), or the code of errno when the type of the file system cannot
-// be told (logged). The directory itself need not exist.
+// be determined (logged). The directory itself need not exist.
 ORVEL_API int OrvCheckFileName(const char* dirRealPath, const char* name);
 
 // Validates a real target path: its existing part must be a file or a folder that the caller may use, what lies beyond
@@ -25,15 +25,15 @@ ORVEL_API int OrvCheckFileName(const char* dirRealPath, const char* name);
 // `aclBits` are the request bits of ACLAccess, or ORV_NO_ACL_TEST; 0 always fails, with the code that was there before.
 // `existingPart` (may be null) receives the existing part once it is known to be usable; it is left alone before that.
 // Returns 0; -1 with 400 (null, empty, not absolute, or beginning with "//"), 401, 407, 408 (missing, or only "/"), 410
-// (a network mount that does not answer), 411, 419, the code of errno when the type of the file system cannot be told,
-// or the code that was there before when the permissions cannot be read (see ACLAccess). The platform error is set as
-// well: 0x0D00 for a relative path, 0x0300 with 407, 0x0600 with 408, 0x1100 with 410, 0x8100 with 401. Logged: what is
-// no file or folder, refused permissions, and failures of unknown cause. Names are not tested for being reserved: that
-// is OrvCheckFileName's.
+// (a network mount that does not answer), 411, 419, the code of errno when the type of the file system cannot be
+// determined, or the code that was there before when the permissions cannot be read (see ACLAccess). The platform error
+// is set as well: 0x0D00 for a relative path, 0x0300 with 407, 0x0600 with 408, 0x1100 with 410, 0x8100 with 401.
+// Logged: what is no file or folder, refused permissions, and failures of unknown cause. Names are not tested for being
+// reserved: that is OrvCheckFileName's.
 ORVEL_API int OrvCheckPath(const char* realPath, bool walkUp, int aclBits, std::string* existingPart);
 
 // May the file manager work on the volume of this path? Only external volumes can be refused: those whose file system
-// is none of the types 0 to 6, or unknown. A path without a volume is not refused (logged). Sets no code.
+// is not one of the types 0 to 6, or unknown. A path without a volume is not refused (logged). Sets no code.
 ORVEL_API bool OrvLibFileSystemSupported(const char* realPath);
 
 // Is the text well-formed UTF-8 as a pattern of lead and continuation bytes, sequences of up to six bytes included?

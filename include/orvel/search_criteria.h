@@ -185,7 +185,7 @@ class ORVEL_API FindFactory {
  public:
     // Appends the criteria of one search field to `out`, whose owner deletes them: none or one (for FIND_EXTENSION the
     // files-only criterion and the names). `op`, `value`: as the browser sent them; required only where the field uses
-    // them, except that every field but FIND_TYPE requires `value`. A number that is none counts as 0. A field above
+    // them, except that every field but FIND_TYPE requires `value`. Invalid numbers count as 0. A field above
     // FIND_SIZE adds nothing and succeeds.
     // False with the library code 400 (a required argument is null), 403 (unknown user), 404 (unknown group), 401 (no
     // memory); what stood in `out` is left. Success stores no code.

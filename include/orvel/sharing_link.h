@@ -52,7 +52,7 @@ class ORVEL_API FolderSharingLoginManager {
     bool folderSharingLogin(VEXO::WebCGI& cgi, const std::string& link, const std::string& owner);
 
     // Makes a session: its identifier into `session` (may be null), cut to size - 1 bytes, and as a cookie named `link`
-    // (null counts as "") into the reply's header. 1 done, also when only the cookie could not be added; -3 the
+    // (null counts as "") into the reply's header. 1 done, even if the cookie alone could not be added; -3 the
     // client's address is denied or the kind of account not allowed; -4 a null argument, no client address, or no
     // record could be made. Takes a second at least. Success clears the failures of the address. A null `session`, or a
     // `size` below 1, gets nothing.

@@ -28,7 +28,7 @@ class ORVEL_API SharingManager {
     // and, logged, when the file cannot be read or memory is out.
     std::map<unsigned int, bool> getPrivileges();
 
-    // Removes the line of a user id, given as text; true also when there is none.
+    // Removes the line of a user id, given as text; true even if there is none.
     bool removePrivilege(const std::string& key);
 };
 

@@ -111,7 +111,7 @@ Verdict ask(const char* operation) {
     ++now.calls[operation];
     ++now.calls["*"];
     Verdict verdict{false, 0, 0};
-    // Every order counts the call, also when an earlier one has decided it.
+    // Every order counts the call, even if an earlier one has decided it.
     for (auto order = now.orders.begin(); order != now.orders.end();) {
         if (order->operation != "*" && order->operation != operation) {
             ++order;

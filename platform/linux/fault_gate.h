@@ -23,7 +23,7 @@ struct Verdict {
     int systemCode;  // errno to leave
 };
 
-// Counts one call of `operation` and tells whether it must fail.
+// Counts one call of `operation` and says whether it must fail.
 VEXO_API Verdict ask(const char* operation);
 
 // The n-th call from now (1 is the next; 0 every call) of `operation` fails with `code` and `systemCode`. The name "*"

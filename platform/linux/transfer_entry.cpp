@@ -10,7 +10,7 @@ namespace {
 
 constexpr char kDigits[] = "0123456789ABCDEF";
 
-// Appends `text` as a JSON string and tells whether it is UTF-8: bytes that are none become U+FFFD.
+// Appends `text` as a JSON string and reports whether it is UTF-8: bytes that are not become U+FFFD.
 bool appendText(std::string& out, std::string_view text) {
     bool valid = true;
     const auto length = static_cast<int32_t>(text.size());

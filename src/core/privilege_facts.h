@@ -14,7 +14,7 @@ namespace orvel {
 enum class AskLists { kUntilDecided, kAll };
 [[nodiscard]] ListMembership listsOf(const char* user, const VEXOSHARE& share, AskLists extent);
 
-// Whether `user` (null is legal) is an administrator. False with 401, logged, when that cannot be told.
+// Whether `user` (null is legal) is an administrator. False with 401, logged, when that cannot be determined.
 [[nodiscard]] bool askAdministrator(const char* user, bool& administrator);
 
 struct ShareFacts {

@@ -65,7 +65,7 @@ int resolve(const char* path, std::string& realPath, std::string& shareName, std
     return 1;
 }
 
-// `out` holds nothing yet, so no more of it is read than it has room for.
+// `out` holds nothing yet, so only as much is read as it has room for.
 int reportNullArgument(const char* path, const char* out, int outSize) {
     const size_t room = out == nullptr ? 0 : strnlen(out, static_cast<size_t>(std::max(outSize, 0)));
     VLIBCErrSetEx(VEXO_ERR_PARAMETER, kSource, __LINE__);

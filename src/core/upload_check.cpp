@@ -53,8 +53,8 @@ int checkFile(const std::string& path, const char* user, const char* sid, _tag__
     return 0;
 }
 
-// Another mapping than OrvParseVexoErrToError's, and meant to be: an upload tells more kinds of failure apart, and does
-// not ask whether the share is encrypted.
+// Another mapping than OrvParseVexoErrToError's, and meant to be: an upload distinguishes more kinds of failure, and
+// does not ask whether the share is encrypted.
 int codeOfCopyError(int platformError) {
     switch (platformError) {
         case VEXO_ERR_DENIED:

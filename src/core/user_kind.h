@@ -1,4 +1,4 @@
-// Which source an account comes from, told by the spelling of its name.
+// Which source an account comes from, recognised by the spelling of its name.
 #ifndef ORVEL_CORE_USER_KIND_H
 #define ORVEL_CORE_USER_KIND_H
 

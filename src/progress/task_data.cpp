@@ -26,8 +26,8 @@ void pause() {
 bool save(KTR::Task& task, const Json::Value& data, float progress) {
     // Where no update can begin there may be one of the caller's, which is not to be ended here.
     if (task.beginUpdate()) {
-        const bool set = task.setProperty("progress", Json::Value(static_cast<double>(progress))) &&
-                         task.setProperty("data", data);
+        const bool set =
+            task.setProperty("progress", Json::Value(static_cast<double>(progress))) && task.setProperty("data", data);
         if (task.endUpdate() && set) return true;
     }
     syslog(LOG_ERR, "Failed to write progress.");

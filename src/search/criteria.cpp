@@ -82,7 +82,7 @@ bool FindGroupComp::operator()(const char*, const _tag_VEXOSTAT_& st) {
     return gid_ != kNoId && st.st_gid == gid_;
 }
 
-// "equal" and "less" are told in exact case, unlike "before": kept, callers rely on it.
+// "equal" and "less" are recognised in exact case, unlike "before": kept, callers rely on it.
 FindSizeComp::FindSizeComp(const char* op, unsigned long long size)
     : kind_(kGreater), upper_(0), value_(capped<int64_t>(size)) {
     const std::string word = text(op);

@@ -19,7 +19,7 @@ char upper(char c) {
     return c >= 'a' && c <= 'z' ? static_cast<char>(c - ('a' - 'A')) : c;
 }
 
-// What stands behind the last dot, also when that is the first character, and also of a folder (kept: results are
+// What stands behind the last dot, even if that is the first character, and also of a folder (kept: results are
 // sorted by it).
 void putExtension(const std::string& name, std::string& out) {
     const std::size_t dot = name.rfind('.');

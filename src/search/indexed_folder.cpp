@@ -24,7 +24,7 @@ bool leadsThroughLinks(const PathInfo& folder, std::string_view within) {
     return root != nullptr && resolved != nullptr && below(root.get(), within) != resolved.get();
 }
 
-// An indexer does not enter these; the mount table tells without asking the server.
+// An indexer does not enter these; the mount table knows without asking the server.
 bool isNetworkMount(const std::string& realPath) {
     return VEXOFSIsInMountTable(realPath.c_str()) >= 0 && VEXOFSIsRemoteFS() == 1;
 }

@@ -37,7 +37,7 @@ class ResultDatabase {
     [[nodiscard]] bool update(ColumnValues& columns, const RecordCondition& where) const;
     [[nodiscard]] bool insert(const __tag_FI_FILE_INFO_DATA& record) const;
     [[nodiscard]] bool select(const RecordCondition& where, Callback callback, void* data) const;
-    // Whether there is a record at `address`; false when that cannot be told.
+    // Whether there is a record at `address`; false when that cannot be determined.
     [[nodiscard]] bool find(const RecordAddress& address, bool& found) const;
 
  private:

@@ -1,4 +1,4 @@
-// Who asks, as the web server tells it.
+// The client's address as given by the web server.
 #ifndef ORVEL_SHARING_CLIENT_ADDRESS_H
 #define ORVEL_SHARING_CLIENT_ADDRESS_H
 

@@ -33,8 +33,8 @@ DatabaseResult execute(const char* statement) {
     return result;
 }
 
-// Reads the window of the row and tells whether it is open. A date that is missing closes it for good; the other steps
-// then take it for 0.
+// Reads the window of the row and reports whether it is open. A date that is missing closes it for good; the other
+// steps then take it for 0.
 bool isOpen(PVEXODBRESULT result, int row, time_t now) {
     bool valid = true;
     LinkWindow window;

@@ -6,7 +6,7 @@
 
 namespace orvel {
 
-// The shared path of a link, "" when there is none; whatever is wrong with the link is logged and no more than that.
+// The shared path of a link, "" when there is none; whatever is wrong with the link is only logged.
 std::string sharedPathOf(const std::string& link);
 
 }  // namespace orvel

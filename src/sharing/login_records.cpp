@@ -102,7 +102,7 @@ bool isAdministrator(const char* user) {
     return member > 0;
 }
 
-// Judges a matching record and tells whether it stays in the file. `answer` stays as it is for a user who is gone.
+// Judges a matching record and reports whether it stays in the file. `answer` stays as it is for a user who is gone.
 bool judge(const LoginRecord& record, const Check& check, int& answer) {
     const std::string user(record.user);
     setenv("USERNAME", user.c_str(), 1);

@@ -126,7 +126,7 @@ bool removePrivilege(const std::string& key) {
     return VLIBCFileRemoveKey(kFile, key.c_str()) != -1;
 }
 
-// Reads every pair of the file and lists its keys; false, logged unless there is just nothing, when there is none.
+// Reads every pair of the file and lists its keys; false when there are no pairs; logged, except for a missing file.
 bool readChoices(StringHash& choices, StringList& keys) {
     const int count = VLIBCFileGetKeys(kFile, lend(choices), "=");
     if (count < 0 && VLIBCErrGet() != VEXO_ERR_FILE) {

@@ -82,7 +82,7 @@ int replaceOne(const char* source, std::string_view search, std::string_view rep
     char* text = buffer.get();
     std::size_t length = append(text, 0, capacity, source);
     // The text is never cut at the occurrence (kept: the search relies on it), so it only grows at its end, and a full
-    // buffer changes no more.
+    // buffer no longer changes.
     std::size_t resume = 0;
     while (length < capacity) {
         const std::string_view all(text, length);

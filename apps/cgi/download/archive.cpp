@@ -25,7 +25,7 @@ constexpr size_t kMostLeftOut = 10000;  // that are said by name
 
 }  // namespace
 
-// What is readable of a name that is no UTF-8 would not tell it apart from others.
+// What is readable of a name that is no UTF-8 would not distinguish it from others.
 std::string memberName(const std::string& component) {
     return isUtf8(component) ? component : percentEncode(component);
 }

@@ -29,7 +29,7 @@ std::string lastComponent(const std::string& path) {
     return path.substr(path.rfind('/') + 1);
 }
 
-// That of the path, unless it is none to save something under: ".." would lead out of the client's own folder.
+// The path's last component, unless it cannot be a file name: ".." would lead out of the client's own folder.
 std::string nameOf(const PathInfo& info, const Descriptor& found) {
     const std::string name = lastComponent(info.path);
     return name != "." && name != ".." ? name : lastComponent(realPathOf(found));

@@ -16,9 +16,9 @@
 #include <vector>
 
 #include "link_making.h"
-#include "public_link.h"
 #include "orvel/error_state.h"
 #include "program/program.h"
+#include "public_link.h"
 #include "reply.h"
 #include "request.h"
 #include "vexo/user.h"

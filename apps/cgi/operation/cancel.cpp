@@ -8,7 +8,7 @@ namespace orvel::cgi {
 int cancelOperation(Operation& operation) {
     const auto task = taskOf(operation);
     if (task == nullptr) return ORV_ERR_MISSING;
-    // A process that merely has the same number is none of ours.
+    // A process that merely has the same number is not ours.
     const pid_t worker = task->isFinished() ? 0 : task->getWorker();
     if (worker > 0 && !DoKill(worker) && task->getWorker() > 0) return ORV_ERR_GENERAL;
     task->reload();

@@ -1,4 +1,4 @@
-// Who is told once an operation has changed files: the transfer log, and the search that the user has on screen.
+// Who is notified once an operation has changed files: the transfer log, and the search that the user has on screen.
 #ifndef ORVEL_CGI_OPERATION_CHANGE_NOTICES_H
 #define ORVEL_CGI_OPERATION_CHANGE_NOTICES_H
 

@@ -1,4 +1,4 @@
-// Files and folders as the operations handle them: a name in a folder that is open, and the path to tell people.
+// Files and folders as the operations handle them: a name in a folder that is open, and the path to show people.
 #ifndef ORVEL_CGI_OPERATION_ITEM_H
 #define ORVEL_CGI_OPERATION_ITEM_H
 

@@ -1,4 +1,4 @@
-// What a background operation tells about itself in its task record.
+// What a background operation reports about itself in its task record.
 #ifndef ORVEL_CGI_OPERATION_PROGRESS_H
 #define ORVEL_CGI_OPERATION_PROGRESS_H
 
@@ -44,7 +44,7 @@ class Progress {
     // Writes the last word and marks the task as finished.
     void end();
 
-    // For VEXOFileCopy: publishes how far its copy is, and tells whether to stop.
+    // For VEXOFileCopy: publishes how far its copy is, and says whether to stop.
     static int askDuringCopy();
 
  private:

@@ -21,8 +21,8 @@ std::string nextBinName(const std::string& name, int number, bool isFolder);
 
 class RecycleBin {
  public:
-    // That of the share of `info`; nothing where it has none (or a link in its place). 0, or a library code when that
-    // could not be told: what is deleted must then not go for good.
+    // The bin of the share of `info`; nothing where it has none (or a link in its place). 0, or a library code when
+    // that could not be determined: what is deleted must then not be deleted permanently.
     static int open(const PathInfo& info, std::optional<RecycleBin>& bin);
 
     // Whether the item is the bin itself, and whether it lies in it.

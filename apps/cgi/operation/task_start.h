@@ -13,7 +13,7 @@ namespace orvel::cgi {
 // Task identifiers of the operations begin so; what follows is the action and a random number.
 inline constexpr const char* kTaskPrefix = "Quorvane_";
 
-// Goes on with `work` in a background process that publishes its progress, and tells the task's identifier in `data`
+// Goes on with `work` in a background process that publishes its progress, and puts the task's identifier into `data`
 // ("taskid") once the record shows that the process lives. What `work` refers to must be copied into it or outlive this
 // call. 0 or a library code.
 int startTask(Operation& operation, const std::string& action, const std::function<void(Progress&)>& work);

@@ -81,7 +81,7 @@ struct Unpacker::Member {
     std::string name;
     std::string path;   // share-relative
     Descriptor folder;  // that holds it
-    // Archives do not tell the type of a further name.
+    // Archives do not give the type of a further name.
     [[nodiscard]] mode_t type() const {
         return archive_entry_hardlink(entry) != nullptr ? mode_t{AE_IFREG} : archive_entry_filetype(entry);
     }
@@ -184,10 +184,10 @@ int Unpacker::place(archive* source, Member& member) {
     }
 }
 
-// Opens the folder, of which missing parts are made. Links in it are not followed.
+// Opens the folder, creating missing parts. Links in it are not followed.
 int Unpacker::enter(const std::vector<std::string>& folders, Descriptor& folder) {
     constexpr int flags = O_PATH | O_DIRECTORY;
-    // Where the system keeps its own is closed also when it is there.
+    // The system's own folders are refused even if they exist.
     const auto isHidden = [](const std::string& name) { return VEXOEAIsHiddenFile(name.c_str()) != 0; };
     if (std::any_of(folders.begin(), folders.end(), isHidden)) return ORV_ERR_RESERVED_NAME;
     folder = openBeneath(target_.folder, joined(folders), LinkPolicy::kNone, flags);
@@ -320,7 +320,7 @@ int Unpacker::makeLink(Member& member) {
     });
 }
 
-// Opens the folder of the file that this unpacking made for the member of that path, and tells the name that it got.
+// Opens the folder of the file that this unpacking made for the member of that path, and reports the name that it got.
 // What else has the member's name is the user's. False with the library code.
 bool Unpacker::findUnpacked(std::vector<std::string> components, Descriptor& folder, std::string& name,
                             int& code) const {

@@ -71,7 +71,7 @@ Availability Visit::find() {
     const int denied = VexoCgiIsDeniedIP(clientAddress().c_str());
     if (denied == 1) return Availability::kBlocked;
     // A broken list must not close every link: nobody is blocked then, and the server's log says so.
-    if (denied < 0) fprintf(stderr, "share: blocked addresses cannot be told [0x%04X]\n", VLIBCErrGet());
+    if (denied < 0) fprintf(stderr, "share: blocked addresses cannot be read [0x%04X]\n", VLIBCErrGet());
     const std::string id = linkIdOf(web_);
     if (id.empty()) return Availability::kNone;
     std::optional<Link> found;

@@ -14,7 +14,7 @@ namespace orvel::cgi {
 enum class Availability {
     kOpen,
     kBlocked,  // too many failed attempts from this address
-    kNone,     // no such link, revoked, out of its window, its owner gone: a visitor is not told which
+    kNone,     // no such link, revoked, out of its window, its owner gone: a visitor does not learn which
     kBroken    // the database could not be used
 };
 

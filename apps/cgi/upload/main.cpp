@@ -9,7 +9,7 @@
 //   taskid           a search whose results shall show the files
 //
 // "data" of the reply is {"files":[{"path","size","skipped"}]}. The first file that cannot be stored ends the request;
-// those before it stay, and are told in "data" beside the error. Folders that do not exist are made.
+// those before it stay, and are listed in "data" beside the error. Folders that do not exist are made.
 #include <json/value.h>
 #include <unistd.h>
 
@@ -75,7 +75,8 @@ struct Outcome {
     }
 };
 
-// Reads the announced body piece by piece. False when `take` refused one; the body's own end is told by `whole`.
+// Reads the announced body piece by piece. False when `take` refused one; `whole` says whether the body came to its own
+// end.
 template <class Take>
 bool readBody(long long length, bool& whole, Take take) {
     std::string piece(kPiece, '\0');

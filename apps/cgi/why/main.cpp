@@ -5,7 +5,7 @@
 // "data" of the reply is {"share","rule","privilege","administrator","restrictions","remote","read_only","exists",
 // "permissions"}: "rule" one of "home", "no_access", "read_write", "read_only", "no_list" and "service"; "privilege" as
 // OrvLibGetPrivilege answers, -1 for a home; "restrictions" of the share and "permissions" of the file as words. Real
-// paths are not told.
+// paths are not disclosed.
 #include <json/value.h>
 
 #include <string>

@@ -28,7 +28,7 @@ Identities identitiesFor(uid_t maker, gid_t makerGroup);
 // alice, bob and admin, with fresh random passwords.
 std::vector<Person> people(const Identities& ids);
 
-// The files that tell of them: passwd(5), group(5), shadow(5), and the web server's list of names and crypt(3) hashes.
+// The files that describe them: passwd(5), group(5), shadow(5), and the web server's list of names and crypt(3) hashes.
 std::string passwdText(const Identities& ids, const std::vector<Person>& people);
 std::string groupText(const Identities& ids, const std::vector<Person>& people);
 std::string shadowText(const std::vector<Person>& people);

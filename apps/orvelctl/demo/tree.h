@@ -12,8 +12,8 @@
 
 namespace orvel::ctl::appliance {
 
-// Throws std::system_error when something cannot be made, also when it is there already. Modes are exact where the
-// process's umask is 0.
+// Throws std::system_error when something cannot be made, even if it is only that it is there already. Modes are exact
+// where the process's umask is 0.
 class Tree {
  public:
     Tree(const std::string& root, const Identities& ids);

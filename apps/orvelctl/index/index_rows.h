@@ -41,7 +41,7 @@ class IndexRows {
     // A row that is there already stays as it is.
     void insert(const Entry& entry);
     void remove(const std::string& path);
-    // Removes what lies below the folder and tells how much it was.
+    // Removes what lies below the folder and reports how much it was.
     unsigned long long removeBelow(const std::string& folder);
 
  private:

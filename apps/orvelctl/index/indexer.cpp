@@ -199,7 +199,7 @@ bool Indexer::build() {
 bool Indexer::update(bool everything) {
     updating_ = true;
     known_ = rows_.folders();
-    // The root has no row that could tell whether it changed.
+    // The root has no row that could show whether it changed.
     changed_.insert("");
     ++counts_.folders;
     ++counts_.compared;

@@ -22,7 +22,7 @@ struct IndexCounts {
     unsigned long long removed = 0;
 };
 
-// A folder's own row is written behind everything below it, and tells a time that is not the folder's as long as the
+// A folder's own row is written behind everything below it, and has a time that is not the folder's as long as the
 // folder may change without showing it: where the work is broken off, the next update goes on.
 class Indexer {
  public:

@@ -42,8 +42,8 @@ VEXO_BEGIN_C
 // system, 0xA400 cancelled, 0x0D00 a null or empty path, 0x8100 else (the source shrank or could not be read).
 VEXO_API int VEXOFileCopy(const char* source, const char* target, const struct VEXOCOPYOPT* options);
 
-// The bytes of the source that the copy under way has behind it, holes included: for isCancelled to tell how far it is.
-// After the copy, what it came to.
+// The bytes of the source that the copy under way has behind it, holes included: for isCancelled to report how far it
+// is. After the copy, what it came to.
 VEXO_API long long VEXOFileCopyDone(void);
 VEXO_END_C
 

@@ -9,8 +9,8 @@
 // pair of share and path is unique. Operations may be called from callbacks.
 //
 // Where nothing else is said an operation gives 0 or more on success, and on failure <0 with the slot set: 0x0900
-// missing or not to be opened, 0x0300 denied, 0x2900 no space, 0x0D00 a bad argument, 0x8100 anything else, a database
-// that is none among them. A failed write leaves the database as it was before its batch.
+// missing or not to be opened, 0x0300 denied, 0x2900 no space, 0x0D00 a bad argument, 0x8100 anything else, such as
+// a file that is not a database. A failed write leaves the database as it was before its batch.
 #ifndef VEXO_INDEX_H
 #define VEXO_INDEX_H
 
@@ -59,8 +59,8 @@ enum __tag_FI_SQL_COND_OP : int {
 // below what stands before it; no other character is a wildcard. In the condition of a path that a search gives (the
 // `paths` of FILEIDXResultGetAndTableGen) the first component is the share's name and is dropped, and a final "/*" is a
 // folder of that name. Op 6, on any text, is the wildcard comparison of names, without case, backslash escapes; in the
-// `cond` of a search the first 493 bytes of a pattern for names count, as in the criterion. Numbers beyond 64 bits count as the largest; the
-// id 4294967295 (columns 15 and 16) equals nothing.
+// `cond` of a search the first 493 bytes of a pattern for names count, as in the criterion. Numbers beyond 64 bits
+// count as the largest; the id 4294967295 (columns 15 and 16) equals nothing.
 //
 // Evaluation: an or-chain holds when one of its members does; a member holds when its own test does and, where it has
 // an and-link of its own, that; a member without one takes the chain's first non-null and-link.
@@ -146,9 +146,9 @@ VEXO_API int FILEIDXDBSelect(const char* db, const FIQUERY* query, BOOL (*callba
 
 // Copies the records of a share's index that satisfy `paths` and `cond` (null: all) into the result database `out`,
 // with the root that the share has now.
-// `accessTest` (may be null) tells whether a record's file still satisfies what was asked about its access time, which
+// `accessTest` (may be null) says whether a record's file still satisfies what was asked about its access time, which
 // an index cannot know, and may fill in the record's access time; with it, conditions on column 11 are taken to hold.
-// `folderTest` (may be null) tells whether a record in this folder (path within the share) may be seen. Both are called
+// `folderTest` (may be null) says whether a record in this folder (path within the share) may be seen. Both are called
 // with the caller's own identity, after everything else held. `cancel` (may be null): nonzero ends the copying with
 // what is there so far, a success.
 VEXO_API int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_COND* paths,

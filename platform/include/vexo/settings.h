@@ -40,7 +40,7 @@ VEXO_API int VLIBCFileGetKeys(const char* file, PVLIBCSZHASH* out, const char* s
 // and the value must read back as given, or they are bad arguments too: no control bytes but a tab within, no quote in
 // a value, no key that is empty, begins with "#", holds "=" or has blanks at its ends.
 VEXO_API int VLIBCFileSetKeyValue(const char* file, const char* key, const char* value, const char* format);
-// Removes every line of `key`. 0 also when there is none, or no file.
+// Removes every line of `key`. 0 even if there is none, or no file.
 VEXO_API int VLIBCFileRemoveKey(const char* file, const char* key);
 VEXO_END_C
 

@@ -53,7 +53,7 @@ VEXO_API int VexoCgiLDAPGetPrivilege(const char* share, const char* user, const 
 VEXO_API PVLIBCSZLIST VexoCgiDomValidShareGen(const char* context, const char* user, int sort, int writable);
 VEXO_API PVLIBCSZLIST VexoCgiLDAPValidShareGen(const char* context, const char* user, int sort, int writable);
 
-// User homes: setting "userhome_enable". 1 on, 0 off (also when there is no share "homes").
+// User homes: setting "userhome_enable". 1 on, 0 off (likewise when there is no share "homes").
 VEXO_API int VEXOServiceUserHomeIsEnabled(int authType, uid_t uid);
 // 0 and the home's path in `path` when the service is on and the home exists; else nonzero. Creates nothing.
 VEXO_API int VEXOServiceHomePathGet(const char* user, char* path, int size);

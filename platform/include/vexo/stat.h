@@ -26,7 +26,7 @@ struct _tag_VEXOSTAT_ {
 
 enum { VEXO_STAT_BASIC = 1, VEXO_STAT_CREATE_TIME = 8 };
 
-// What decides about writing and removing besides mode and owner. Without KNOWN the file system does not tell, or the
+// What decides about writing and removing besides mode and owner. Without KNOWN the file system does not say, or the
 // entry is the root of another mount.
 enum { VEXO_ATTRIBUTE_KNOWN = 1, VEXO_ATTRIBUTE_IMMUTABLE = 2, VEXO_ATTRIBUTE_APPEND = 4 };
 

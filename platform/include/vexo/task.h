@@ -52,7 +52,7 @@ class VEXO_API Task {
     // Seconds since the epoch, 0 when unknown.
     long long getCreateTime() const;
     std::string getName() const;
-    // Removes the document; true also when it is gone already.
+    // Removes the document; true even if it is gone already.
     bool remove();
 
  private:

@@ -7,8 +7,8 @@
 #include "vexo/export.h"
 #include "vexo/list.h"
 
-// Which source an account comes from, told by the spelling of its name: a backslash domain, else "@" directory server,
-// else local.
+// Which source an account comes from, recognised by the spelling of its name: a backslash domain, else "@" directory
+// server, else local.
 enum AUTH_TYPE { AUTH_LOCAL = 0, AUTH_DOMAIN = 1, AUTH_DIRECTORY = 2 };
 
 struct VEXOUSER {

@@ -6,7 +6,7 @@
 
 VEXO_BEGIN_C
 // Appends one entry with the present time to /var/log/vexo/xfer.log of the system root (docs/formats/xferlog.md), as a
-// whole line or not at all, also when several processes log at once. `address` of the client, `user` and `action` are
+// whole line or not at all, even if several processes log at once. `address` of the client, `user` and `action` are
 // texts, `path` is the share-relative path; bytes that are no UTF-8 are kept beside a readable form. `size` in bytes.
 // `flag` is kept as it is given (the callers': the entry is a folder). The file and its folder are made when they are
 // missing. Raises to the saved uid 0 for itself.

@@ -1,4 +1,4 @@
-// The spelling of user names tells where an account comes from.
+// The spelling of a user name says where the account comes from.
 #ifndef VEXO_LINUX_ACCOUNT_NAME_H
 #define VEXO_LINUX_ACCOUNT_NAME_H
 

@@ -31,11 +31,11 @@ struct FolderFacts {
 
 struct Settled {
     unsigned granted;
-    unsigned open;    // bits that only the kernel can tell
+    unsigned open;    // bits that only the kernel can decide
     unsigned likely;  // those of them that everybody but the owner holds, as far as no ACL says otherwise
 };
 
-// What `who` holds on an entry of the folder, as far as its status tells.
+// What `who` holds on an entry of the folder, as far as its status says.
 [[nodiscard]] Settled settle(const Identity& who, const FolderFacts& folder, const _tag_VEXOSTAT_& entry);
 // Whether `who` may remove the entry.
 [[nodiscard]] bool mayRemove(const Identity& who, const FolderFacts& folder, const _tag_VEXOSTAT_& entry);

@@ -52,7 +52,7 @@ class DataCopy {
         return false;
     }
 
-    // Where data begins at or after `from`; the whole rest counts as data where the file system does not tell.
+    // Where data begins at or after `from`; the whole rest counts as data where the file system does not say.
     off_t dataFrom(off_t from) {
         const off_t found = lseek(source_, from, SEEK_DATA);
         if (found >= 0) return std::min(found, size_);
@@ -76,7 +76,7 @@ class DataCopy {
         return true;
     }
 
-    // Bytes copied, -1 with errno. 0 tells that the kernel does not do it for these two files.
+    // Bytes copied, -1 with errno. 0 means that the kernel does not do it for these two files.
     ssize_t copyInKernel(off_t from, size_t count) {
         off_t to = from;
         const ssize_t done = copy_file_range(source_, &from, target_, &to, count, 0);

@@ -155,7 +155,7 @@ bool mayTake(const Copy& copy) {
            (copy.exists || !vexo::hasDefaultAcl(copy.folder.get()));
 }
 
-// Removes the source's name, unless somebody put another file there: what became the target was told by its descriptor.
+// Removes the source's name, unless somebody put another file there: the target was made through the descriptor.
 void dropName(const char* source, const Copy& copy) {
     struct stat now {};
     if (lstat(source, &now) == 0 && now.st_dev == copy.sourceStatus.st_dev && now.st_ino == copy.sourceStatus.st_ino) {

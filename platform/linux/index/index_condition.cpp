@@ -189,7 +189,7 @@ class Reader {
     static std::optional<Condition> numberTest(const Node& node, const Column& column) {
         const char* comparison = numberComparison(node.op);
         if (comparison == nullptr) return {};
-        // The id that stands for nobody is nobody's, as for the criteria.
+        // The reserved id matches no owner, as for the criteria.
         const bool isId = node.type == FI_COL_UID || node.type == FI_COL_GID;
         if (isId && node.op == FI_OP_EQUAL && textOf(node) == kNobody) return Condition{"0", {}, {}, {}};
         return Condition{std::string(column.name) + comparison + "?", {valueOf(node)}, {}, {}};

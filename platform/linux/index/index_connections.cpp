@@ -22,7 +22,7 @@ namespace {
 
 using Clock = Database::Clock;
 
-// After so long a batch is committed also when nothing more is inserted: somebody looks at the results meanwhile.
+// After so long a batch is committed even if nothing more is inserted: somebody looks at the results meanwhile.
 constexpr std::chrono::milliseconds kBatchAge(500);
 constexpr size_t kMostOpen = 8;
 
@@ -166,7 +166,7 @@ bool Connections::close(const std::string& path) {
     return done;
 }
 
-// The thread takes no signals: they are for the program, which gets them again also when there is no thread to be had.
+// The thread takes no signals: they are for the program, which gets them again even if no thread can be created.
 void Connections::startCommitter() {
     if (committer_.joinable()) {
         changed_.notify_one();
@@ -190,7 +190,7 @@ void Connections::commitOld() {
     }
 }
 
-// Failures are told at the next use.
+// Failures are reported at the next use.
 void Connections::commitAll() {
     const KeepErrno keep;
     const orvel::RaisedIdentity raised;

@@ -15,7 +15,8 @@ namespace vexo::fileindex {
 // reach it. None outlives a call of its caller's functions.
 class Lease {
  public:
-    // Empty with the slot filled on failure, also when the last batch could not be committed behind the scenes.
+    // Empty with the slot filled on failure, even if it is only that the last batch could not be committed behind the
+    // scenes.
     explicit Lease(const char* path);
     explicit operator bool() const { return database_ != nullptr; }
     Database* operator->() const { return database_; }

@@ -20,7 +20,7 @@
 namespace vexo::fileindex {
 namespace {
 
-// What the caller tells about single records; see FILEIDXResultGetAndTableGen.
+// What the caller says about single records; see FILEIDXResultGetAndTableGen.
 struct Tests {
     BOOL (*access)(__tag_FI_FILE_INFO_DATA*, void*);
     void* accessArgument;

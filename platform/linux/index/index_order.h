@@ -11,8 +11,8 @@
 
 namespace vexo::fileindex {
 
-// Appends to `ids` the page that the query asks for. Orders of many records that change no more are kept in the
-// database itself, where that can be written, so that further pages need not sort. False with the slot filled on
+// Appends to `ids` the page that the query asks for. Sort orders of large result sets that no longer change are kept in
+// the database itself, where that can be written, so that further pages need not sort. False with the slot filled on
 // failure.
 [[nodiscard]] bool selectPage(Database& database, const FIQUERY& query, std::vector<int64_t>& ids);
 

@@ -252,7 +252,7 @@ int FILEIDXIndexEnd(const char* share, int done) try {
 int FILEIDXIndexDrop(const char* share) try {
     VEXO_GATE("FILEIDXIndexDrop", -1);
     if (share == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
-    // A share that is no more may have left its index behind.
+    // A share that no longer exists may have left its index behind.
     const orvel::RaisedIdentity raised;
     if (!vexo::fileindex::makeStore()) return -1;
     const orvel::Descriptor lock = vexo::fileindex::lockIndex(share);

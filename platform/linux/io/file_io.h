@@ -37,7 +37,7 @@ class FileVersion {
     explicit FileVersion(const struct stat& status);
     // True when `status`, taken later, still shows the version that was read.
     [[nodiscard]] bool isCurrent(const struct stat& status) const;
-    // The same for one that reads: a later write within the same tick of the clock is not told.
+    // For readers: a later write within the same clock tick may go unnoticed.
     [[nodiscard]] bool isSame(const struct stat& status) const;
 
  private:

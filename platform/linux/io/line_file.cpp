@@ -43,7 +43,7 @@ vexo::Descriptor openRecords(const char* file) {
     return vexo::openTrusted(VEXO::SystemPath(file), O_RDONLY);
 }
 
-// Whether the file ends within a line; false with errno when that cannot be told.
+// Whether the file ends within a line; false with errno when that cannot be determined.
 bool endsWithinLine(int fd, off_t size, bool& within) {
     char last = '\n';
     if (size > 0 && pread(fd, &last, 1, size - 1) != 1) return false;

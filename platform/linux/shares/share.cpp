@@ -89,7 +89,7 @@ int VEXOS2SIsSyncedShare(const char* name) try {
 int VEXOShareIsShareRecycle(const char* realPath) try {
     VEXO_GATE("VEXOShareIsShareRecycle", -1);
     if (realPath == nullptr) return vexo::fail(VEXO_ERR_PARAMETER);
-    // A walk asks this for every entry: nearly all of them are told by their name alone.
+    // A walk asks this for every entry: nearly all of them are decided by their name alone.
     std::string_view path = realPath;
     if (!path.ends_with(kRecycle)) return 0;
     path.remove_suffix(kRecycle.size());

@@ -1,4 +1,4 @@
-// What a section of the share definitions means: a share, or the reason why it is none. Pure.
+// What a section of the share definitions means: a share, or the reason why it is not one. Pure.
 #ifndef VEXO_LINUX_SHARE_OPTIONS_H
 #define VEXO_LINUX_SHARE_OPTIONS_H
 

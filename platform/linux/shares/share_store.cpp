@@ -24,7 +24,7 @@ constexpr const char* kSource = "share_store";
 constexpr const char* kDefinitions = "/etc/vexo/shares.conf";
 constexpr size_t kMaxFile = size_t{1} << 20;
 
-// What tells one state of a file from another.
+// What distinguishes one state of a file from another.
 struct Stamp {
     bool exists = false;
     dev_t device = 0;

@@ -55,7 +55,7 @@ bool parse(const std::string& text, Json::Value& root) try {
     const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
     return reader->parse(text.data(), text.data() + text.size(), &root, nullptr);
 } catch (const Json::Exception&) {
-    return false;  // how the reader tells of too many levels
+    return false;  // the reader's way of reporting too many levels
 }
 
 }  // namespace

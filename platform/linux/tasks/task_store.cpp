@@ -48,7 +48,7 @@ bool makeStore() {
 }
 
 // Opens what has the name `file` at one moment. A file that was replaced since it was opened has no name left; `isOurs`
-// tells whether one with a name may be used.
+// says whether one with a name may be used.
 Descriptor openTask(int folder, const std::string& file, struct stat& status) {
     for (int attempt = 0; attempt < kAttempts; ++attempt) {
         Descriptor fd = openFile(folder, file.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);

@@ -26,7 +26,7 @@ namespace vexo {
 [[nodiscard]] bool createTask(int folder, const std::string& file, const TaskDocument& document);
 // Replaces a locked one. EFBIG for a document that would not be read again.
 [[nodiscard]] bool replaceTask(int folder, const std::string& file, const TaskDocument& document);
-// Removes it; true also when it is gone.
+// Removes it; true even if it is gone already.
 [[nodiscard]] bool removeTask(int folder, const std::string& file);
 
 // The files in the folder that could be tasks.

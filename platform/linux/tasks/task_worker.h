@@ -16,7 +16,7 @@ struct Worker {
     std::string boot;              // identifier of the boot
 };
 
-// The calling process; nobody when the kernel does not tell.
+// The calling process; nobody when the kernel does not say.
 Worker thisProcess();
 
 // True while that process runs; one that waits for its parent to take notice of its end does not.

@@ -19,7 +19,7 @@ struct AutoBlockRules {
 AutoBlockRules parseAutoBlockRules(std::string_view enable, std::string_view attempts, std::string_view minutes,
                                    std::string_view expireMinutes);
 
-// The one spelling of an address, an IPv4 address in IPv6 clothes as IPv4; empty for what is none.
+// The one spelling of an address, IPv4-mapped IPv6 becomes IPv4; empty if not an address.
 std::optional<std::string> normaliseAddress(const char* address);
 
 }  // namespace vexo

@@ -17,7 +17,7 @@ std::string_view takePiece(std::string_view& text, char separator);
 
 using FormFields = std::vector<std::pair<std::string, std::string>>;
 
-// Percent escapes to bytes, "+" to a blank. An escape that is none stays as it is, and so does "%00": no name or text
+// Percent escapes to bytes, "+" to a blank. A broken escape stays as it is, and so does "%00": no name or text
 // of the appliance holds a NUL, and a text that is cut there would be another one than the one that was checked.
 std::string decodeFormText(std::string_view text);
 
