@@ -226,6 +226,7 @@ TEST_F(Places, NothingIsSeenBesideAnExchange) {
             leaks += namesIn(listing).find("secret") != std::string::npos;
         };
         FileSearch::FindTypeComp files(false);
+        const std::vector<FileSearch::FindComp*> criteria = {&files};
         const long rounds = race([&] {
             Place place;
             Listing visited, listed;
@@ -241,7 +242,7 @@ TEST_F(Places, NothingIsSeenBesideAnExchange) {
             std::string culprit;
             FileSearch::OrvSearchWalker walker("alice", nullptr, &stop);
             if (chooseFolders({"alice", "", ""}, {"/photo/dir"}, folders, culprit) != 0) return;
-            if (!walker.init(folders, {&files})) return;
+            if (!walker.init(folders, criteria)) return;
             walker.Walk({});
             FileSearch::OrvSearchDBTask task(walker.getDBVol(), "alice", walker.getDBTaskId());
             unsigned long long total = 0;
