@@ -156,7 +156,7 @@ Json::Value Orveld::figures() const {
                                    {"SCRIPT_NAME", orvel::orveld::kStatusPath},
                                    {"QUERY_STRING", "format=json"}});
     const size_t end = reply.find("\r\n\r\n");
-    if (end == std::string::npos) return {};
+    if (!reply.starts_with("Status: 200") || end == std::string::npos) return {};
     const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());
     Json::Value figures;
     std::string errors;

@@ -163,6 +163,11 @@ TEST_F(OrveldTest, OneAddressHasItsPartAndSlowBodiesEnd) {
         slow.push_back(orveld.connect());
         slow.back().send(blockOf(upload("slow" + std::to_string(i), 10, "10.0.0.1")) + "1");
     }
+    // Until then all that is too much is told so, one by one, and so may others be.
+    waitFor("the crowd to be turned away", [&] {
+        const Json::Value figures = orveld.figures();
+        return !figures.isNull() && figures["queued"].asUInt64() == 0;
+    });
     expectServed(orveld, "10.0.0.2");
     std::multiset<std::string> answers;
     for (const Connection& connection : slow) {
