@@ -3,7 +3,6 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <utility>
 
 namespace orvel::cgi {
 namespace {
@@ -22,7 +21,6 @@ bool Output::finish() {
 }
 
 void Output::write() {
-    if (beginning_ != nullptr) std::exchange(beginning_, nullptr)();
     std::string_view rest = text_;
     while (!rest.empty() && !broken_) {
         const ssize_t written = ::write(fd_, rest.data(), rest.size());

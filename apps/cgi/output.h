@@ -9,8 +9,7 @@ namespace orvel::cgi {
 
 class Output {
  public:
-    // `beginning` is called before anything is written.
-    explicit Output(int fd, void (*beginning)() = nullptr) : fd_(fd), beginning_(beginning) {}
+    explicit Output(int fd) : fd_(fd) {}
     Output(const Output&) = delete;
     Output& operator=(const Output&) = delete;
 
@@ -24,7 +23,6 @@ class Output {
  private:
     void write();
     int fd_;
-    void (*beginning_)();
     bool broken_ = false;
     std::string text_;
 };

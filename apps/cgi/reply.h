@@ -26,8 +26,7 @@ enum class Status {
     kMethodNotAllowed = 405,
     kTooLarge = 413,
     kTooMany = 429,
-    kBroken = 500,
-    kBusy = 503
+    kBroken = 500
 };
 
 // Writes the header. `cookie` is the value of a Set-Cookie line, "" for none.
