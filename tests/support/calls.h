@@ -1,0 +1,13 @@
+/* What tests and programs under test share: see calls.c. */
+#ifndef ORVEL_TESTS_SUPPORT_CALLS_H
+#define ORVEL_TESTS_SUPPORT_CALLS_H
+
+struct Calls {
+    long count;       /* calls so far, of all processes */
+    long target;      /* which one is struck; 0 none */
+    int error;        /* what it fails with; 0: its process is killed */
+    int changesOnly;  /* whether only calls that change something are counted */
+    char struck[200]; /* the struck call and its path */
+};
+
+#endif
