@@ -85,7 +85,7 @@ Finished runProgram(const std::vector<std::string>& words, const Variables& vari
     return finished;
 }
 
-Finished finishCgi(const std::string& program, const std::string& user, const std::string& method,
+std::string runCgi(const std::string& program, const std::string& user, const std::string& method,
                    const std::string& query, const std::string& input, const Variables& more) {
     Variables variables = {{"GATEWAY_INTERFACE", "CGI/1.1"},
                            {"REQUEST_METHOD", method},
@@ -97,14 +97,8 @@ Finished finishCgi(const std::string& program, const std::string& user, const st
     // A web server starts a program in its folder.
     const std::string before = std::filesystem::current_path();
     std::filesystem::current_path(std::filesystem::path(program).parent_path());
-    Finished finished = runProgram({program}, variables, input);
+    const Finished finished = runProgram({program}, variables, input);
     std::filesystem::current_path(before);
-    return finished;
-}
-
-std::string runCgi(const std::string& program, const std::string& user, const std::string& method,
-                   const std::string& query, const std::string& input, const Variables& more) {
-    const Finished finished = finishCgi(program, user, method, query, input, more);
     EXPECT_EQ(finished.status, 0) << query;
     return finished.output;
 }

@@ -23,10 +23,7 @@ using Variables = std::map<std::string, std::string>;
 Finished runProgram(const std::vector<std::string>& words, const Variables& variables = {},
                     const std::string& input = "");
 
-// Runs a CGI program for a user who is logged in, with `input` as body of the request.
-Finished finishCgi(const std::string& program, const std::string& user, const std::string& method,
-                   const std::string& query, const std::string& input = "", const Variables& more = {});
-// The same for one that is expected to end well: its output.
+// Runs a CGI program for a user who is logged in, with `input` as body of the request; expects it to end well.
 std::string runCgi(const std::string& program, const std::string& user, const std::string& method,
                    const std::string& query, const std::string& input = "", const Variables& more = {});
 
