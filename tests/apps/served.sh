@@ -1,7 +1,7 @@
 # Sourced by tests that go through the web server, called as TEST SERVER BUILD: serves a demo appliance made for the test.
 # Gives $demo, $port, $log, $pid, $build, $work, expect, password, root_of and finish.
 server=$1
-build=$2
+build=$(realpath "$2")
 PATH=$PATH:/usr/sbin
 for program in lighttpd curl; do
     command -v "$program" >/dev/null || { echo "FAILED: $program is not installed"; exit 1; }
@@ -38,7 +38,8 @@ for operation in VEXOFileCopy FILEIDXOutputDBInsert; do
 done
 export VEXO_GATE_HOLD
 
-port=$((20000 + RANDOM % 20000))
+# Below what the kernel gives to clients; by the process, so that two tests at once begin apart.
+port=$((20000 + $$ % 12000))
 while (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null; do port=$((port + 1)); done
 "$server" --port "$port" --root "$demo" --build "$build" >"$log" 2>&1 &
 pid=$!
