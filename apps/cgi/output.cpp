@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <utility>
 
 namespace orvel::cgi {
 namespace {
@@ -21,6 +22,7 @@ bool Output::finish() {
 }
 
 void Output::write() {
+    if (beginning_ != nullptr) std::exchange(beginning_, nullptr)();
     std::string_view rest = text_;
     while (!rest.empty() && !broken_) {
         const ssize_t written = ::write(fd_, rest.data(), rest.size());

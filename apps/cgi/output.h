@@ -9,7 +9,8 @@ namespace orvel::cgi {
 
 class Output {
  public:
-    explicit Output(int fd) : fd_(fd) {}
+    // `beginning` is called before anything is written.
+    explicit Output(int fd, void (*beginning)() = nullptr) : fd_(fd), beginning_(beginning) {}
     Output(const Output&) = delete;
     Output& operator=(const Output&) = delete;
 
@@ -23,6 +24,7 @@ class Output {
  private:
     void write();
     int fd_;
+    void (*beginning_)();
     bool broken_ = false;
     std::string text_;
 };

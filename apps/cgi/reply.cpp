@@ -26,6 +26,8 @@ std::string_view statusLine(Status status) {
             return "Status: 413 Content Too Large\r\n";
         case Status::kTooMany:
             return "Status: 429 Too Many Requests\r\n";
+        case Status::kBusy:
+            return "Status: 503 Service Unavailable\r\nRetry-After: 2\r\n";
         case Status::kBroken:
             break;
     }

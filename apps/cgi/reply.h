@@ -26,7 +26,8 @@ enum class Status {
     kMethodNotAllowed = 405,
     kTooLarge = 413,
     kTooMany = 429,
-    kBroken = 500
+    kBroken = 500,
+    kBusy = 503
 };
 
 // Writes the header. `cookie` is the value of a Set-Cookie line, "" for none.

@@ -38,6 +38,8 @@ constexpr Command kCommands[] = {
     {"sharing", orvel::ctl::sharing,
      "sharing set everybody|admin_only|per_user           who may create links; list shows it\n"
      "       sharing set yes|no --user U, sharing get U, sharing list"},
+    {"status", orvel::ctl::status,
+     "status [--json] [--socket PATH]                    what orveld does and has done"},
     {"demo", orvel::ctl::demo,
      "demo FOLDER [--keep | --remove]                    makes a demo appliance, keeps one that is whole, removes one"},
 };

@@ -14,6 +14,7 @@
 #include <memory>
 #include <sstream>
 
+#include "apps/orveld.h"
 #include "text.h"
 
 namespace support {
@@ -51,6 +52,44 @@ std::vector<std::string> environmentWith(std::map<std::string, std::string> vari
         if (!value.empty()) list.emplace_back(name).append("=").append(value);
     }
     return list;
+}
+
+// One for all tests of this process, which share their system root; a process that went into a mount namespace of its
+// own, where an orveld from outside sees nothing, has another.
+const Orveld& orveldOfThisProcess() {
+    static auto& all = *new std::map<std::string, std::unique_ptr<Orveld>>;
+    std::error_code error;
+    const std::string here =
+        std::to_string(getpid()) + " " + std::filesystem::read_symlink("/proc/self/ns/mnt", error).string();
+    auto& orveld = all[here];
+    if (orveld == nullptr) orveld = std::make_unique<Orveld>();
+    return *orveld;
+}
+
+// What a test orders the platform to do, in our environment or beside the request's variables.
+Variables takeOrders(Variables& variables) {
+    const std::string prefix = "VEXO_GATE_";
+    Variables orders;
+    for (char** entry = environ; *entry != nullptr; ++entry) {
+        const std::string text = *entry;
+        if (text.starts_with(prefix)) orders[text.substr(0, text.find('='))] = text.substr(text.find('=') + 1);
+    }
+    for (auto at = variables.begin(); at != variables.end();) {
+        if (at->first.starts_with(prefix)) orders[at->first] = at->second;
+        at = at->first.starts_with(prefix) ? variables.erase(at) : std::next(at);
+    }
+    return orders;
+}
+
+// A request with orders has an orveld of its own, which children have them from.
+std::string throughOrveld(Variables variables, const std::string& input) {
+    const Variables orders = takeOrders(variables);
+    const std::unique_ptr<Orveld> ordered = orders.empty() ? nullptr : std::make_unique<Orveld>(Variables(), orders);
+    const Orveld& orveld = ordered != nullptr ? *ordered : orveldOfThisProcess();
+    for (auto at = variables.begin(); at != variables.end();) at = at->second.empty() ? variables.erase(at) : ++at;
+    variables.emplace("CONTENT_LENGTH", "");
+    variables["SCGI"] = "1";
+    return orveld.ask(variables, input);
 }
 
 }  // namespace
@@ -94,6 +133,10 @@ std::string runCgi(const std::string& program, const std::string& user, const st
                            {"QUERY_STRING", query}};
     if (method != "GET" && method != "HEAD") variables["CONTENT_LENGTH"] = std::to_string(input.size());
     for (const auto& [name, value] : more) variables[name] = value;
+    if (getenv("ORVEL_TEST_THROUGH_ORVELD") != nullptr) {
+        variables["SCRIPT_NAME"] = "/cgi-bin/" + std::filesystem::path(program).filename().string();
+        return throughOrveld(variables, input);
+    }
     // A web server starts a program in its folder.
     const std::string before = std::filesystem::current_path();
     std::filesystem::current_path(std::filesystem::path(program).parent_path());

@@ -23,7 +23,8 @@ using Variables = std::map<std::string, std::string>;
 Finished runProgram(const std::vector<std::string>& words, const Variables& variables = {},
                     const std::string& input = "");
 
-// Runs a CGI program for a user who is logged in, with `input` as body of the request; expects it to end well.
+// Runs a program for a user who is logged in, as plain CGI or, where the variable ORVEL_TEST_THROUGH_ORVELD is set,
+// through an orveld, with `input` as body of the request; expects it to end well.
 std::string runCgi(const std::string& program, const std::string& user, const std::string& method,
                    const std::string& query, const std::string& input = "", const Variables& more = {});
 

@@ -1,6 +1,7 @@
 #include "program/program.h"
 
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <csignal>
 #include <cstdio>
@@ -19,14 +20,14 @@ constexpr std::int64_t kLongForm = std::int64_t{16} << 20;  // a hundred thousan
 constexpr std::int64_t kAnyLength = std::numeric_limits<std::int64_t>::max();
 constexpr std::string_view kAsking = "GET, HEAD, POST";
 
-constexpr Program kPrograms[] = {{"list", kAsking, kForm, Caller::kUser, serveListProgram},
-                                 {"download", kAsking, kLongForm, Caller::kUser, serveDownloadProgram},
-                                 {"link", kAsking, kForm, Caller::kUser, serveLinkProgram},
-                                 {"operation", kAsking, kForm, Caller::kUser, serveOperationProgram},
-                                 {"search", kAsking, kForm, Caller::kUser, serveSearchProgram},
-                                 {"share", kAsking, kForm, Caller::kAnybody, serveShareProgram},
-                                 {"upload", "POST, PUT", kAnyLength, Caller::kUser, serveUploadProgram},
-                                 {"why", kAsking, kForm, Caller::kUser, serveWhyProgram}};
+constexpr Program kPrograms[] = {{"list", kAsking, kForm, Caller::kUser, true, serveListProgram},
+                                 {"download", kAsking, kLongForm, Caller::kUser, true, serveDownloadProgram},
+                                 {"link", kAsking, kForm, Caller::kUser, false, serveLinkProgram},
+                                 {"operation", kAsking, kForm, Caller::kUser, false, serveOperationProgram},
+                                 {"search", kAsking, kForm, Caller::kUser, false, serveSearchProgram},
+                                 {"share", kAsking, kForm, Caller::kAnybody, false, serveShareProgram},
+                                 {"upload", "POST, PUT", kAnyLength, Caller::kUser, false, serveUploadProgram},
+                                 {"why", kAsking, kForm, Caller::kUser, true, serveWhyProgram}};
 
 std::string_view variable(const char* name) {
     const char* value = getenv(name);
@@ -82,8 +83,8 @@ void answer(const Program& program, Output& out) {
     program.serve(request, out);
 }
 
-int serveRequest(const Program& program) {
-    Output out(1);
+int serveRequest(const Program& program, void (*beginning)()) {
+    Output out(STDOUT_FILENO, beginning);
     try {
         answer(program, out);
     } catch (...) {

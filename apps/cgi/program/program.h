@@ -21,6 +21,7 @@ struct Program {
     std::string_view methods;  // as the header Allow lists them
     std::int64_t bodyLimit;    // bytes; what is announced as longer is refused unread
     Caller caller;
+    bool endsWithClient;  // until it replies: nobody waits for what it does but who asked
     void (*serve)(Request& request, Output& out);
 };
 
@@ -32,8 +33,9 @@ const Program* findProgram(std::string_view name);
 // the program does not take, 413 for too long a body), then lets the program write its reply to `out`.
 void answer(const Program& program, Output& out);
 
-// answer() with the reply on standard output. Returns the exit status of a process that has served one request.
-int serveRequest(const Program& program);
+// answer() with the reply on standard output; `beginning` is called before the first of it is written. Returns the exit
+// status of a process that has served one request.
+int serveRequest(const Program& program, void (*beginning)() = nullptr);
 
 // What stands in the table, each in the folder of its name.
 void serveListProgram(Request& request, Output& out);

@@ -13,6 +13,12 @@ VEXO_BEGIN_C
 // Its exit status (0 to 255), or -1 with errno and the slot: 0x0D00 null or no absolute path, 0x0900 the program is
 // missing, 0x0300 denied, 0x8100 else, a program that a signal ended included.
 VEXO_API int VLIBCExec(const char* program, ...) __attribute__((sentinel));
+
+// For a process that stays and forks a child for each request: reads what children would read again and again
+// (settings, share definitions, account files, the mount table where it is a file, folding tables), or nothing where it
+// is unchanged. Children find it in their memory and check it by the versions of the files. No descriptor stays open, no
+// lock is taken, no directory or name service is asked. What fails here fails again, with its error, where it is needed.
+VEXO_API void VEXOWarm(void);
 VEXO_END_C
 
 #endif

@@ -47,6 +47,10 @@ AccountSource::Origin AccountSource::refresh() {
     return read ? Origin::files : Origin::nss;
 }
 
+void AccountSource::refreshFiles() {
+    static_cast<void>(refresh());
+}
+
 template <class Key, class Record, class Nss>
 Lookup AccountSource::find(Memory<Key, Record>& memory, const Key& key, Record& out,
                            const Record* (AccountFiles::*inFiles)(Arg<Key>) const, const Nss& nss) {

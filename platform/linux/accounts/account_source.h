@@ -21,6 +21,9 @@ class AccountSource {
  public:
     static AccountSource& instance();
 
+    // Reads the files of the system root again when they changed. Never asks NSS.
+    void refreshFiles();
+
     // `failed` leaves errno, and `out` is filled only when found. Names are looked up as they are typed, and the record
     // keeps that spelling.
     [[nodiscard]] Lookup user(const std::string& name, Account& out);

@@ -1,0 +1,195 @@
+#!/usr/bin/env bash
+# orveld behind each web server with its configuration of packaging/.
+#   webservers_test.sh SOURCE BUILD [SERVER...]
+set -uo pipefail
+source=$1
+build=$2
+shift 2
+[ "$#" -gt 0 ] || set -- lighttpd nginx apache
+PATH=$PATH:/usr/sbin
+export ASAN_OPTIONS=detect_leaks=0
+slow=20 # connections that dawdle
+[ -z "${ORVEL_TEST_LONG:-}" ] || slow=2000
+ulimit -n 8192 2>/dev/null
+
+work=$(mktemp -d)
+chmod 755 "$work"
+demo=$work/demo
+settings=$demo/etc/vexoinfo.conf
+failures=0
+pids=()
+server_pid=
+cleanup() {
+    [ -z "$server_pid" ] || kill "$server_pid" 2>/dev/null
+    [ "${#pids[@]}" -eq 0 ] || kill "${pids[@]}" 2>/dev/null
+    wait 2>/dev/null
+    [ ! -e "$demo" ] || "$build/apps/orvelctl/orvelctl" demo "$demo" --remove >/dev/null 2>&1
+    rm -rf "$work"
+}
+trap cleanup EXIT
+expect() { # what, wanted, got
+    [ "$2" = "$3" ] && return
+    echo "FAILED: $server: $1: wanted '$2', got '$3'"
+    failures=$((failures + 1))
+}
+until_true() { # what, command...
+    local what=$1
+    shift
+    for _ in $(seq 300); do
+        "$@" >/dev/null 2>&1 && return
+        sleep 0.1
+    done
+    expect "$what" "in half a minute" never
+}
+
+user=$(id -un)
+user_lighttpd='' user_nginx='' user_apache=''
+if [ "$(id -u)" -eq 0 ]; then
+    user=www-data
+    user_lighttpd='server.username = "www-data"' user_nginx='user www-data;' user_apache=$'User www-data\\\nGroup www-data'
+fi
+accounts=$("$build/apps/orvelctl/orvelctl" demo "$demo") || exit 1
+password() { awk -v user="$1" '$1 == "user" && $2 == user { print $4 }' <<<"$accounts"; }
+printf 'orveld_web_servers="%s"\norveld_trusted_logins="%s"\n' "$user" "$user" >>"$settings"
+cp -r "$source/apps/web" "$work/web"
+cp "$demo/etc/vexo/users.htpasswd" "$work/logins"
+chmod -R a+rX "$work/web" "$work/logins"
+socket=$work/orveld.socket
+VEXO_ROOT=$demo "$build/bin/orveld-keeper" "$socket" "$build/bin/orveld" 2>"$work/orveld.log" &
+pids+=($!)
+status() { "$build/apps/orvelctl/orvelctl" --root "$demo" status --socket "$socket" --json; }
+server=orveld
+until_true "orveld" status
+
+fill() { printf 's|@%s@|%s|g\n' "$1" "$(printf '%s' "$2" | sed 's/[|&]/\\&/g')"; }
+configure() { # template, user line
+    sed -f <(fill ADDRESS 127.0.0.1; fill PORT "$port"; fill WEB "$work/web"; fill STATE "$state"; fill LOGINS "$work/logins"
+             fill SOCKET "$socket"; fill USER "$2"; fill MODULES /usr/lib/apache2/modules) "$source/packaging/$1" >"$state/$1"
+}
+start() {
+    case "$server" in
+        lighttpd) exec lighttpd -D -f "$state/lighttpd.conf.in" ;;
+        nginx) exec nginx -p "$state" -c "$state/nginx.conf.in" ;;
+        apache) exec apache2 -D FOREGROUND -f "$state/apache.conf.in" ;;
+    esac >>"$work/$server.log" 2>&1 &
+    server_pid=$!
+    until_true "start" answers
+}
+answers() { (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null; }
+stop() { # signal
+    local workers
+    workers=$(cat "/proc/$server_pid/task/$server_pid/children")
+    # shellcheck disable=SC2086
+    if [ "$1" = KILL ]; then kill -KILL "$server_pid" $workers; else kill "-$1" "$server_pid"; fi
+    wait "$server_pid" 2>/dev/null
+    server_pid=
+}
+ask() { curl -s --max-time 60 -u "alice:$(password alice)" "$@"; }
+code() { ask -o /dev/null -w '%{http_code}' "$@"; }
+url() { echo "http://127.0.0.1:$port/cgi-bin/$1"; }
+
+check_requests() {
+    expect "nobody" 401 "$(curl -s -o /dev/null -w '%{http_code}' "$(url 'list?action=shares')")"
+    expect "the page" 200 "$(code "http://127.0.0.1:$port/")"
+    expect "a picture for visitors" 200 "$(curl -s -o /dev/null -w '%{http_code}' "http://127.0.0.1:$port/favicon.ico")"
+    expect "shares" 1 "$(ask "$(url 'list?action=shares')" | grep -c '"user":"alice"')"
+    expect "no program" 404 "$(code "$(url nothing)")"
+    expect "a method" 405 "$(code -X DELETE "$(url 'list?action=shares')")"
+    expect "the figures" 404 "$(code "http://127.0.0.1:$port/orveld/status")"
+    expect "a link that is not one" 404 "$(curl -s -o /dev/null -w '%{http_code}' "$(url 'share?FOLDER_SHARING=x')")"
+    head -c 3000000 /dev/urandom >"$work/data"
+    expect "upload" 200 "$(code -T "$work/data" "$(url "upload?path=/photo/$server/data")")"
+    expect "upload by form" 200 "$(code -F path=/photo/$server -F "file=@$work/data;filename=form" "$(url upload)")"
+    expect "too long a form" 413 "$(head -c 2000000 /dev/zero | code -H 'Expect:' --data-binary @- "$(url operation)")"
+    # A length that nobody says is refused, or found out; the file is whole or not there.
+    if [ "$(code -H 'Transfer-Encoding: chunked' -T "$work/data" "$(url "upload?path=/photo/$server/chunked")")" = 200 ]; then
+        ask "$(url "download?path=/photo/$server/chunked")" | cmp -s - "$work/data" || expect "chunked" whole cut
+    fi
+    for name in data form; do
+        ask "$(url "download?path=/photo/$server/$name")" | cmp -s - "$work/data" || expect "download of $name" same different
+    done
+    expect "part" "$(tail -c +1000001 "$work/data" | head -c 1000 | md5sum)" \
+        "$(ask -r 1000000-1000999 "$(url "download?path=/photo/$server/data")" | md5sum)"
+    expect "a zip" 200 "$(code "$(url "download?path=/photo/$server")")"
+}
+
+begin_upload() { # fd variable, name
+    local login
+    login=$(printf 'alice:%s' "$(password alice)" | base64 -w 0)
+    printf 'PUT /cgi-bin/upload?path=/photo/%s/%s HTTP/1.1\r\nHost: x\r\nAuthorization: Basic %s\r\nContent-Length: 10\r\n\r\n12' \
+        "$server" "$2" "$login" >&"$1"
+}
+reload() { kill -HUP "${pids[0]}"; }
+one_runs() { status | grep -q '"running":1,'; }
+is_refused() { [ "$(code "$(url 'list?action=shares')")" = 503 ]; }
+
+# The first hop is the web server's, where orveld takes REMOTE_ADDR from; the next a proxy that the setting names. A
+# client that has all it may have at a time shows whom orveld takes for the client.
+check_address() {
+    local fd other=(-H 'X-Forwarded-For: 9.9.9.9, 192.0.2.1')
+    echo 'orveld_children_per_address="1"' >>"$settings"
+    reload
+    exec {fd}<>"/dev/tcp/127.0.0.1/$port"
+    begin_upload "$fd" address
+    until_true "the upload" one_runs
+    until_true "the limit" is_refused
+    expect "what nobody trusts" 503 "$(code "${other[@]}" "$(url 'list?action=shares')")"
+    echo 'trusted_proxies="127.0.0.1"' >>"$settings"
+    expect "a trusted proxy's word" 200 "$(code "${other[@]}" "$(url 'list?action=shares')")"
+    sed -i '/^trusted_proxies/d; /^orveld_children_per_address/d' "$settings"
+    exec {fd}>&-
+    reload
+}
+
+# While many dawdle with their headers and bodies others are served.
+check_slow() {
+    local fds=() fd count=$slow
+    # A slow body keeps one of its threads, of which it has 400.
+    [ "$server" != apache ] || [ "$count" -lt 400 ] || count=400
+    for i in $(seq "$count"); do
+        exec {fd}<>"/dev/tcp/127.0.0.1/$port" || break
+        if [ $((i % 2)) -eq 0 ]; then
+            printf 'GET /cgi-bin/list?action=shares HTTP/1.1\r\nHost: x\r\n' >&"$fd"
+        else
+            begin_upload "$fd" "slow$i"
+        fi
+        fds+=("$fd")
+    done
+    until_true "those beyond the limit to be turned away" none_waits
+    local took
+    took=$(ask -o /dev/null -w '%{http_code} %{time_total}' --interface 127.0.0.2 "$(url 'list?action=shares')")
+    expect "beside slow ones" 200 "${took% *}"
+    [ -z "${ORVEL_TEST_LONG:-}" ] || echo "$server: beside $count slow ones: ${took#* } s"
+    for fd in "${fds[@]}"; do exec {fd}>&-; done
+    until_true "the end of the slow ones" idle
+    expect "what they left" "" "$(ask "$(url "list?action=folder&path=/photo/$server")" | grep -o '"slow[0-9]*"')"
+}
+none_waits() { status | grep -q '"queued":0,'; }
+idle() { status | grep -q '"running":0'; }
+
+for server in "$@"; do
+    if ! command -v "${server/%apache/apache2}" >/dev/null; then
+        echo "FAILED: $server is not installed"
+        failures=$((failures + 1))
+        continue
+    fi
+    port=$((20000 + RANDOM % 20000))
+    while answers; do port=$((port + 1)); done
+    state=$work/$server
+    mkdir -p "$state"
+    user_line=user_$server
+    configure "$server.conf.in" "${!user_line}"
+    [ "$(id -u)" -ne 0 ] || chown "$user" "$state"
+    before=$failures
+    start
+    check_requests
+    check_address
+    check_slow
+    stop KILL
+    start
+    expect "after a kill" 200 "$(code "$(url 'list?action=shares')")"
+    stop TERM
+    [ "$failures" -eq "$before" ] || { echo "--- $server:"; cat "$work/$server.log" "$work/orveld.log"; cat "$state/error.log" 2>/dev/null; }
+done
+expect "crashes" '"crashed":0' "$(status | grep -o '"crashed":[0-9]*')"
+exit "$((failures > 0))"
