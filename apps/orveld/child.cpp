@@ -24,8 +24,6 @@ namespace {
 
 // Of the process's own environment a request sees what begins so.
 constexpr std::string_view kOwnVariables[] = {"PATH=", "TZ=", "VEXO_"};
-constexpr size_t kPiece = size_t{64} * 1024;
-constexpr size_t kMostDrained = size_t{4} << 20;
 
 pid_t answering = 0;  // the child that answers, not one that it made
 Slot* ownSlot = nullptr;
@@ -54,18 +52,6 @@ void keepGoing() {
     std::signal(SIGTERM, SIG_IGN);
 }
 
-// A web server that still sends a body when the connection is closed may lose the reply: it gets a while to see it.
-void drain() {
-    const timeval second = {1, 0};
-    setsockopt(STDIN_FILENO, SOL_SOCKET, SO_RCVTIMEO, &second, sizeof second);
-    std::string piece(kPiece, '\0');
-    for (size_t drained = 0; drained < kMostDrained;) {
-        const ssize_t got = recv(STDIN_FILENO, piece.data(), piece.size(), 0);
-        if (got <= 0) return;
-        drained += static_cast<size_t>(got);
-    }
-}
-
 // The last of what is done at exit, and the end: the libraries' own destructors only give memory back, and running
 // them touches pages of each library.
 void endReply(int status, void*) {
@@ -73,7 +59,7 @@ void endReply(int status, void*) {
     ownSlot->answered = monotonicNow();
     setState(SlotState::kAnswered);
     shutdown(STDOUT_FILENO, SHUT_WR);
-    if (hasBody) drain();
+    ownSlot->bodyLeft = hasBody ? 1 : 0;
     _exit(status);
 }
 

@@ -37,6 +37,8 @@ constexpr rlim_t kMostDescriptors = 65536;
 constexpr size_t kSpareDescriptors = 32;
 constexpr std::chrono::seconds kHeaderTime{5};
 constexpr std::chrono::seconds kWaitingTime{10};
+constexpr std::chrono::seconds kLingerTime{1};
+constexpr size_t kMostDiscarded = size_t{4} << 20;
 constexpr std::chrono::seconds kStopTime{60};
 constexpr std::chrono::seconds kWarmTime{1};
 
@@ -69,7 +71,8 @@ bool Server::prepare() {
     if (signals_ < 0 || epoll_ < 0 || !slots_.map() || !watch(signals_, kSignals, EPOLLIN, false)) return false;
     limits_ = readLimits();
     const size_t descriptors = raiseDescriptors();
-    const size_t others = limits_.children + limits_.queued + kSpareDescriptors;
+    mostLingering_ = limits_.children + limits_.queued;
+    const size_t others = 2 * mostLingering_ + kSpareDescriptors;
     mostReading_ = descriptors > 2 * others ? descriptors - others : descriptors / 2;
     lastNumber_ = kFirstNumber - 1;
     busy_ = wholeReply(cgi::Status::kBusy, ORV_ERR_BUSY);
@@ -89,7 +92,7 @@ std::vector<int> Server::descriptors() const {
 void Server::run() {
     notifyManager("READY=1");
     epoll_event events[kEvents];
-    while (!stopping_ || !(reading_.empty() && waiting_.empty() && served_.empty())) {
+    while (!stopping_ || !(reading_.empty() && waiting_.empty() && served_.empty() && lingering_.empty())) {
         const int count = epoll_wait(epoll_, events, kEvents, patience());
         for (int i = 0; i < count; ++i) handle(events[i].data.u64, events[i].events);
         expire();
@@ -105,6 +108,7 @@ void Server::handle(std::uint64_t number, std::uint32_t events) {
     if (number == kListener) return acceptSome();
     if (number == kSignals) return readSignals();
     if (const auto at = reading_.find(number); at != reading_.end()) return readMore(at);
+    if (const auto at = lingering_.find(number); at != lingering_.end()) return discardSome(at);
     if ((events & (EPOLLHUP | EPOLLERR)) == 0) return;
     if (const auto at = waiting_.find(number); at != waiting_.end()) {
         ++figures_.abandoned;
@@ -139,12 +143,20 @@ void Server::acceptSome() {
     }
 }
 
-// Whoever has been slow for longest goes first.
+// Whoever has its answer goes first, then who has been slow for longest.
 bool Server::makeRoom() {
+    if (!lingering_.empty()) {
+        drop(lingering_, lingering_.begin());
+        return true;
+    }
     if (reading_.empty()) return false;
+    dropSlowest();
+    return true;
+}
+
+void Server::dropSlowest() {
     ++figures_.malformed;
     drop(reading_, reading_.begin());
-    return true;
 }
 
 void Server::acceptOne(int fd) {
@@ -159,7 +171,7 @@ void Server::acceptOne(int fd) {
     if (!known || (peer.uid != 0 && peer.uid != getuid() && !isIn(limits_.speakers, peer.uid))) {
         return refuse(reading_, at, forbidden_);
     }
-    if (reading_.size() > mostReading_) makeRoom();
+    if (reading_.size() > mostReading_) dropSlowest();
     readMore(at);
 }
 
@@ -230,7 +242,29 @@ void Server::start(Connections& from, Connections::iterator at) {
 // What fits into the empty buffer of the socket; nobody is waited for.
 void Server::refuse(Connections& from, Connections::iterator at, const std::string& reply) {
     static_cast<void>(send(at->second.fd, reply.data(), reply.size(), MSG_DONTWAIT | MSG_NOSIGNAL));
-    drop(from, at);
+    shutdown(at->second.fd, SHUT_WR);
+    linger(from, at);
+}
+
+// A web server that still sends a body when the connection is closed may lose the reply: it gets a while to see it, in
+// which no child and no place of its client's is held.
+void Server::linger(Connections& from, Connections::iterator at) {
+    if (lingering_.size() >= mostLingering_) drop(lingering_, lingering_.begin());
+    auto node = from.extract(at);
+    node.key() = ++lastNumber_;
+    Connection& connection = node.mapped();
+    connection.since = Clock::now();
+    connection.watched = watch(connection.fd, node.key(), EPOLLIN, connection.watched);
+    const auto kept = lingering_.insert(std::move(node)).position;
+    if (!kept->second.watched) drop(lingering_, kept);
+}
+
+void Server::discardSome(Connections::iterator at) {
+    static char piece[kLongestBlock];
+    const ssize_t got = recv(at->second.fd, piece, sizeof piece, MSG_DONTWAIT);
+    if (got < 0 && (errno == EAGAIN || errno == EINTR)) return;
+    if (got > 0) at->second.discarded += static_cast<size_t>(got);
+    if (got <= 0 || at->second.discarded > kMostDiscarded) drop(lingering_, at);
 }
 
 void Server::drop(Connections& from, Connections::iterator at) {
@@ -265,9 +299,14 @@ void Server::reap() {
         if (known == children_.end()) continue;
         const auto at = served_.find(known->second);
         account(at->second, at->first, status);
+        const bool bodyLeft = slots_.at(at->second.slot).bodyLeft.load() != 0;
         slots_.give(at->second.slot);
         children_.erase(known);
-        drop(served_, at);
+        if (bodyLeft && !at->second.abandoned) {
+            linger(served_, at);
+        } else {
+            drop(served_, at);
+        }
     }
 }
 
@@ -299,6 +338,7 @@ int Server::patience() const {
     auto by = Clock::time_point::max();
     if (!reading_.empty()) by = std::min(by, reading_.begin()->second.since + kHeaderTime);
     if (!waiting_.empty()) by = std::min(by, waiting_.begin()->second.since + kHeaderTime + kWaitingTime);
+    if (!lingering_.empty()) by = std::min(by, lingering_.begin()->second.since + kLingerTime);
     if (stopping_) by = std::min(by, stopBy_);
     if (by == Clock::time_point::max()) return -1;
     const auto left = std::chrono::ceil<std::chrono::milliseconds>(by - Clock::now());
@@ -307,7 +347,10 @@ int Server::patience() const {
 
 void Server::expire() {
     const auto now = Clock::now();
-    while (!reading_.empty() && reading_.begin()->second.since + kHeaderTime <= now) makeRoom();
+    while (!lingering_.empty() && lingering_.begin()->second.since + kLingerTime <= now) {
+        drop(lingering_, lingering_.begin());
+    }
+    while (!reading_.empty() && reading_.begin()->second.since + kHeaderTime <= now) dropSlowest();
     while (!waiting_.empty() && waiting_.begin()->second.since + kHeaderTime + kWaitingTime <= now) {
         ++figures_.refused;
         refuse(waiting_, waiting_.begin(), busy_);

@@ -45,6 +45,7 @@ class Server {
         pid_t child = 0;
         size_t slot = 0;
         bool abandoned = false;
+        size_t discarded = 0;
     };
     using Connections = std::map<std::uint64_t, Connection>;  // by the number of the request: the oldest first
 
@@ -56,11 +57,14 @@ class Server {
     void acceptOne(int fd);
     void listenAgain(bool on);
     bool makeRoom();
+    void dropSlowest();
     void readMore(Connections::iterator at);
     void begin(Connections::iterator at);
     void startWaiting();
     void start(Connections& from, Connections::iterator at);
     void refuse(Connections& from, Connections::iterator at, const std::string& reply);
+    void linger(Connections& from, Connections::iterator at);
+    void discardSome(Connections::iterator at);
     void drop(Connections& from, Connections::iterator at);
     void hungUp(Connection& connection);
 
@@ -81,6 +85,7 @@ class Server {
     Clock::time_point stopBy_;
     Clock::time_point warmed_;
     size_t mostReading_ = 0;
+    size_t mostLingering_ = 0;
     std::uint64_t lastNumber_ = 0;
     Limits limits_;
     Slots slots_;
@@ -88,6 +93,7 @@ class Server {
     Connections reading_;  // whose block is not whole
     Connections waiting_;  // for a child
     Connections served_;
+    Connections lingering_;  // answered, with a body that nobody has read
     std::unordered_map<pid_t, std::uint64_t> children_;
     std::string busy_, forbidden_, malformed_;  // whole replies
 };

@@ -3,6 +3,7 @@
 #include <arpa/inet.h>
 #include <sys/mman.h>
 
+#include <algorithm>
 #include <cstring>
 #include <string>
 
@@ -31,10 +32,12 @@ std::optional<size_t> Slots::take() {
     for (size_t number = 0; number < kMost; ++number) {
         Slot& slot = slots_[number];
         if (slot.state.load() != static_cast<std::uint32_t>(SlotState::kFree)) continue;
+        slot.bodyLeft = 0;
         slot.program = 0;
         slot.address = 0;
         slot.answered = 0;
         slot.state = static_cast<std::uint32_t>(SlotState::kServing);
+        end_ = std::max(end_, number + 1);
         return number;
     }
     return std::nullopt;
@@ -42,13 +45,14 @@ std::optional<size_t> Slots::take() {
 
 void Slots::give(size_t number) {
     slots_[number].state = static_cast<std::uint32_t>(SlotState::kFree);
+    while (end_ > 0 && slots_[end_ - 1].state.load() == static_cast<std::uint32_t>(SlotState::kFree)) --end_;
 }
 
 bool Slots::admit(size_t number, std::string_view address, size_t most) {
     const std::uint64_t hash = hashOfAddress(address);
     slots_[number].address = hash;
     size_t others = 0;
-    for (size_t i = 0; i < kMost; ++i) {
+    for (size_t i = 0; i < end_; ++i) {
         const Slot& slot = slots_[i];
         const auto state = static_cast<SlotState>(slot.state.load());
         const bool serves = state == SlotState::kServing || state == SlotState::kKept;

@@ -23,6 +23,7 @@ enum class SlotState : std::uint32_t {
 
 struct Slot {
     std::atomic<std::uint32_t> state;
+    std::atomic<std::uint32_t> bodyLeft;  // not 0: the web server may still be sending
     std::atomic<std::uint32_t> program;  // place in the table of programs, counted from 1; 0: not known yet
     std::atomic<std::uint64_t> address;  // hash of the client's; 0: not known yet
     std::atomic<std::int64_t> answered;  // nanoseconds of the monotonic clock
@@ -45,6 +46,7 @@ class Slots {
 
  private:
     Slot* slots_ = nullptr;
+    size_t end_ = 0;  // behind the last that is taken: a child looks at no more of the memory than that
 };
 
 // Clients with the same hash count as one: an address, and of an IPv6 address the network (64 bits), as every address

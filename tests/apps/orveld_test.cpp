@@ -163,7 +163,7 @@ TEST_F(OrveldTest, OneAddressHasItsPartAndSlowBodiesEnd) {
         slow.push_back(orveld.connect());
         slow.back().send(blockOf(upload("slow" + std::to_string(i), 10, "10.0.0.1")) + "1");
     }
-    // Until then all that is too much is told so, one by one, and so may others be.
+    // Until then all that is too much is refused one by one, and so may others be.
     waitFor("the crowd to be turned away", [&] {
         const Json::Value figures = orveld.figures();
         return !figures.isNull() && figures["queued"].asUInt64() == 0;
@@ -177,7 +177,8 @@ TEST_F(OrveldTest, OneAddressHasItsPartAndSlowBodiesEnd) {
     }
     EXPECT_GE(answers.count("400"), 1U) << "a body that stood still";
     EXPECT_EQ(answers.count("400") + answers.count("503"), count);
-    waitFor("the count", [&] { return orveld.figures()["refused"].asUInt64() == answers.count("503"); });
+    // Questions for the figures may have been refused beside them.
+    waitFor("the count", [&] { return orveld.figures()["refused"].asUInt64() >= answers.count("503"); });
     EXPECT_EQ(access((root_ + "/slow0").c_str(), F_OK), -1);
 }
 
