@@ -12,7 +12,7 @@
 
 namespace FileSearch {
 
-// Where a real path stops being one of an entry in a share ("/<volume>/<share>/<path within the share>").
+// Where a path that lies below no known root of a share stops being "/<volume>/<share>/<path within the share>".
 enum class PathFault { kNone, kNoShare /* no second "/" */, kNoPath /* no third "/" */ };
 
 // Refilled for each entry; its buffers stay. Not for sharing between threads. Filling may throw std::bad_alloc and

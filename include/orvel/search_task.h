@@ -43,7 +43,7 @@ class ORVEL_API OrvSearchDBTask {
                      BOOL (*callback)(__tag_FI_FILE_INFO_DATA*, void*), void* userData, unsigned long long* count);
 
     // Updates after file operations. A record is addressed by a share's name ("home" counts as "homes") and a real path
-    // ("/<volume>/<share>/<path within the share>"); a path with fewer components fails before the database is touched.
+    // below that share's root; another one is cut behind its second component, or fails before the database is touched.
     // Records that are not there are no failure.
 
     // Removes the record of a file or folder that is gone, and all below it.

@@ -53,7 +53,8 @@ PathFault FileRecord::fill(const std::string& realPath, const std::string& share
                            const std::string& name, const _tag_VEXOSTAT_& status, const std::string& owner,
                            const std::string& group) {
     std::size_t within = 0;
-    if (const PathFault fault = orvel::splitRealPath(realPath, within); fault != PathFault::kNone) return fault;
+    const PathFault fault = orvel::splitRealPath(realPath, shareRoot, within);
+    if (fault != PathFault::kNone) return fault;
     const std::size_t slash = std::max(realPath.rfind('/'), within);
     share_.assign(shareName, 0, kNameLimit);
     parent_.assign(realPath, within, slash - within);

@@ -16,9 +16,13 @@ struct RecordAddress {
     std::string within;
 };
 
-// Slashes at its end do not count. False, logged, when the path does not reach into a share, or is longer than a
-// condition can hold.
-[[nodiscard]] bool deriveAddress(const std::string& share, const std::string& realPath, RecordAddress& out);
+// Slashes at its end do not count. `user`: whose home it is, where "home" is in no share. False, logged, when the path
+// does not reach into a share, or is longer than a condition can hold.
+[[nodiscard]] bool deriveAddress(const std::string& share, const std::string& realPath, const std::string& user,
+                                 RecordAddress& out);
+
+// The address of what lies at `within` in the share of `folder`. False, logged, when a condition cannot hold it.
+[[nodiscard]] bool addressWithin(const RecordAddress& folder, const std::string& within, RecordAddress& out);
 
 // The condition "this share and this path", or "... and any path below it". Names are compared as they stand: neither
 // test knows a wildcard in them.

@@ -57,12 +57,25 @@ BOOL collect(__tag_FI_FILE_INFO_DATA* record, void* collection) {
     return records.complete ? 1 : 0;
 }
 
+// Gives the record at `from` the address `to`, and what follows from that and from its status.
+bool moveRecord(const ResultDatabase& database, const RecordAddress& from, const RecordAddress& to,
+                const _tag_VEXOSTAT_& status) {
+    const std::string name = lastComponent(to.realPath);
+    FileRecord record;
+    static_cast<void>(record.fill(to.realPath, to.shareRoot, to.share, name, status));
+    ColumnValues columns;
+    columns.addAddress(record.data());
+    columns.addStatus(record.data());
+    columns.addRest(record.data());
+    return database.update(columns, RecordCondition(from, Reach::kItself));
+}
+
 }  // namespace
 
 bool OrvSearchDBTask::delRecs(std::string shareName, std::string path) {
     return orvel::guardedQuietly(false, [&] {
         RecordAddress address;
-        if (!deriveAddress(shareName, path, address)) return false;
+        if (!deriveAddress(shareName, path, owner_, address)) return false;
         const ResultDatabase database(filePath_);
         return database.remove(RecordCondition(address, Reach::kItself)) &&
                database.remove(RecordCondition(address, Reach::kBelow));
@@ -73,7 +86,7 @@ bool OrvSearchDBTask::updatePermRecs(std::string shareName, std::string path, co
                                      const char* groupName, _tag_VEXOSTAT_& status) {
     return orvel::guardedQuietly(false, [&] {
         RecordAddress address;
-        if (!deriveAddress(shareName, path, address)) return false;
+        if (!deriveAddress(shareName, path, owner_, address)) return false;
         const std::string name = lastComponent(address.realPath);
         FileRecord record;
         static_cast<void>(record.fill(address.realPath, address.shareRoot, address.share, name, status,
@@ -90,7 +103,7 @@ bool OrvSearchDBTask::insertFile(std::string shareName, std::string path, std::s
                                  _tag_VEXOSTAT_& status) {
     return orvel::guardedQuietly(false, [&] {
         RecordAddress address;
-        if (!deriveAddress(shareName, path, address)) return false;
+        if (!deriveAddress(shareName, path, owner_, address)) return false;
         const ResultDatabase database(filePath_);
         bool present = false;
         if (!database.find(address, present)) return false;
@@ -105,15 +118,8 @@ bool OrvSearchDBTask::updateFile(std::string shareName, std::string path, std::s
                                  _tag_VEXOSTAT_& status) {
     return orvel::guardedQuietly(false, [&] {
         RecordAddress from, to;
-        if (!deriveAddress(shareName, path, from) || !deriveAddress(newShareName, newPath, to)) return false;
-        const std::string name = lastComponent(to.realPath);
-        FileRecord record;
-        static_cast<void>(record.fill(to.realPath, to.shareRoot, to.share, name, status));
-        ColumnValues columns;
-        columns.addAddress(record.data());
-        columns.addStatus(record.data());
-        columns.addRest(record.data());
-        return ResultDatabase(filePath_).update(columns, RecordCondition(from, Reach::kItself));
+        return deriveAddress(shareName, path, owner_, from) && deriveAddress(newShareName, newPath, owner_, to) &&
+               moveRecord(ResultDatabase(filePath_), from, to, status);
     });
 }
 
@@ -121,20 +127,24 @@ bool OrvSearchDBTask::updateFileInFolder(std::string shareName, std::string path
                                          std::string newPath) {
     return orvel::guardedQuietly(false, [&] {
         RecordAddress from, to;
-        if (!deriveAddress(shareName, path, from) || !deriveAddress(newShareName, newPath, to)) return false;
+        if (!deriveAddress(shareName, path, owner_, from) || !deriveAddress(newShareName, newPath, owner_, to)) {
+            return false;
+        }
         // All of them before the first is moved: a database that is read is not written to.
         MovedRecords records;
         const RecordCondition below(from, Reach::kBelow);
-        if (!ResultDatabase(filePath_).select(below, collect, &records) || !records.complete) return false;
+        const ResultDatabase database(filePath_);
+        if (!database.select(below, collect, &records) || !records.complete) return false;
         const std::size_t prefix = from.within.empty() ? 0 : from.within.size() + 1;
         bool all = true;  // one that cannot be moved keeps no other from it
         for (MovedRecord& record : records.list) {
-            const std::string target = to.realPath + "/" + record.within.substr(prefix);
+            const std::string rest = record.within.substr(prefix);
+            RecordAddress source, target;
             _tag_VEXOSTAT_ present{};
-            const bool readable = VLIBCFileLStat(target.c_str(), kStatusFlags, &present) >= 0;
-            all = updateFile(from.share, from.shareRoot + "/" + record.within, to.share, target,
-                             readable ? present : record.status) &&
-                  all;
+            const bool placed = addressWithin(from, record.within, source) &&
+                                addressWithin(to, to.within.empty() ? rest : to.within + "/" + rest, target);
+            const bool readable = placed && VLIBCFileLStat(target.realPath.c_str(), kStatusFlags, &present) >= 0;
+            all = placed && moveRecord(database, source, target, readable ? present : record.status) && all;
         }
         return all;
     });

@@ -19,11 +19,14 @@ namespace {
 
 // A home folder as what it is on disk, a folder of the share that holds the homes: so that the records of a walk, the
 // conditions for the index and the index's own records name the same share, root and path.
-void moveToHomes(PathInfo& info) {
+// Where homes are in no share, the home itself stands for that share's root.
+void moveToHomes(const std::string& user, PathInfo& info) {
     info.shareName = orvel::kHomesShare;
-    std::size_t within = 0;
-    if (orvel::splitRealPath(info.shareRoot, within) != PathFault::kNone) return;
-    info.path = "/" + info.shareName + "/" + info.realPath.substr(within);
+    const std::string root = orvel::rootAbove(info.shareName, user, info.shareRoot);
+    std::size_t within = info.shareRoot.size() + 1;
+    if (root != info.shareRoot && orvel::splitRealPath(info.shareRoot, root, within) != PathFault::kNone) return;
+    info.path = "/" + info.shareName;
+    if (info.realPath.size() >= within) info.path += "/" + info.realPath.substr(within);
     info.shareRoot.resize(within - 1);
 }
 
@@ -49,7 +52,7 @@ bool SearchShareDirMap::insertDir(const char* user, const char* sid, const std::
         orvel::FolderIdentity identity{};
         if (!place || !orvel::identify(place.get(), identity)) return true;
         if (!orvel::mayListFolder(orvel::GivenFolder(std::move(place), info.realPath))) return true;
-        if (IsDirUserHome(info.shareName, nullptr)) moveToHomes(info);
+        if (IsDirUserHome(info.shareName, nullptr)) moveToHomes(user, info);
         marks_[info.shareName].push_back({identity.device, identity.inode});
         shares_[info.shareName].push_back(info);
         return true;

@@ -166,10 +166,10 @@ vexo::ShareReading read(const std::string& text, std::string before = {}) {
 TEST(ShareSection, MalformedOnesSayWhy) {
     for (const auto& [text, fault] : Rows<std::string, const char*>{
              {"path =\n", "no path"},
-             {"path = volume1/photo\n", "is not of the form"},
-             {"path = /volume1/a/b\n", "is not of the form"},
-             {"path = /volume1/..\n", "is not of the form"},
-             {"path = /volume1/" + std::string(256, 'x') + "\n", "is not of the form"},
+             {"path = volume1/photo\n", "is not that of a folder"},
+             {"path = //\n", "is not that of a folder"},
+             {"path = /volume1/..\n", "is not that of a folder"},
+             {"path = /volume1/" + std::string(256, 'x') + "\n", "is not that of a folder"},
              {std::string("path = /volume1/a\0b\n", 20), "a zero byte"},
              {"path = /v/p\nvexo:index =\n", "neither yes nor no"},
              {"path = /v/p\nvexo:restriction = -1\n", "is no number"},

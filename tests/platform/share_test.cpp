@@ -86,11 +86,11 @@ TEST_F(ShareTest, FailuresSayWhy) {
 
 TEST_F(ShareTest, MalformedSectionsDoNotHideTheOthers) {
     define(
-        "[a]\npath = /v//a/\n[no path]\nread only = no\n[deep]\npath = /v/w/deep\n[a/b]\npath = /v/b\n"
+        "[a]\npath = /v//a/\n[no path]\nread only = no\n[deep]\npath = /v/../deep\n[a/b]\npath = /v/b\n"
         "[mask]\npath = /v/m\nvexo:restriction = 0x\n[off]\navailable = no\n[z\x07]\n[z\nx\n"
         "[global]\nnonsense\n[b]\npath = /v/b\n");
     announceLog("share [no path] is left out: no path");
-    announceLog("share [deep] is left out: the path \"/v/w/deep\" is not of the form /<volume>/<share>");
+    announceLog("share [deep] is left out: the path \"/v/../deep\" is not that of a folder below \"/\"");
     announceLog("share [a/b] is left out: no name for a share");
     announceLog("share [mask] is left out: \"0x\" is no number or too large");
     announceLog("share [z\\x07] is left out: no name for a share");

@@ -28,7 +28,7 @@ std::vector<LogLine> takeLog();
 enum : unsigned { kAliceUid = 20001, kBobUid = 20002, kCarolUid = 20003, kUsersGid = 20100, kAdminGid = 20101 };
 
 // The users, settings and shares below are there from the start; tests add what else they need. Share roots are
-// /tmp/<tag>-<share>, since a root must be the second component of its path.
+// /tmp/<tag>-<share>; an option "path" replaces that.
 class ApplianceTest : public ::testing::Test {
  protected:
     void SetUp() override;

@@ -12,7 +12,7 @@ enum { VEXO_SHARE_HIDDEN = 0x1, VEXO_SHARE_ENCRYPTED = 0x2 };
 
 struct VEXOSHARE {
     char szName[256];
-    char szPath[4096];    // /<volume>/<share>; a real path
+    char szPath[4096];    // a real path of one component or more: /data, /volume1/photo, /srv/samba/team
     unsigned fStatus;     // VEXO_SHARE_...
     PVLIBCSZLIST naList;  // no access
     PVLIBCSZLIST rwList;  // read-write

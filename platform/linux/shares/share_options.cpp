@@ -74,7 +74,7 @@ std::string faultOf(const DefinitionSection& section) {
     }
     const std::string& path = section.value(ShareOption::path).text;
     if (path.empty()) return "no path";
-    if (!normalRoot(path)) return "the path \"" + path + "\" is not of the form /<volume>/<share>";
+    if (!normalRoot(path)) return "the path \"" + path + "\" is not that of a folder below \"/\"";
     return {};
 }
 
@@ -104,7 +104,8 @@ ShareReading readShare(const DefinitionSection& section) {
     share.ftp = static_cast<int>(values.number(ShareOption::ftp, INT_MAX));
     share.acl = values.boolean(ShareOption::acl, false);
     share.synced = values.boolean(ShareOption::synced, false);
-    share.index = values.boolean(ShareOption::index, false);
+    // One index cannot be of as many folders as there are users.
+    share.index = values.boolean(ShareOption::index, false) && !hasVariables(share.path);
     fillLists(values, values.boolean(ShareOption::readOnly, true), share);
     if (!values.fault().empty()) return {std::nullopt, values.fault()};
     return {std::move(share), {}};
@@ -113,7 +114,6 @@ ShareReading readShare(const DefinitionSection& section) {
 std::optional<std::string> normalRoot(std::string_view path) {
     if (!path.starts_with('/')) return std::nullopt;
     std::string root;
-    int components = 0;
     while (!path.empty()) {
         path.remove_prefix(1);
         const std::string_view component = path.substr(0, path.find('/'));
@@ -122,9 +122,8 @@ std::optional<std::string> normalRoot(std::string_view path) {
         if (component == "." || component == ".." || component.size() > kMaxComponent) return std::nullopt;
         root += '/';
         root += component;
-        ++components;
     }
-    if (components != 2 || root.size() > kMaxPath) return std::nullopt;
+    if (root.empty() || root.size() > kMaxPath) return std::nullopt;
     return root;
 }
 

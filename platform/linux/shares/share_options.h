@@ -13,7 +13,7 @@ namespace vexo {
 
 struct ShareDefinition {
     std::string name;
-    std::string path;     // /<volume>/<share>, possibly with variables
+    std::string path;     // absolute, possibly with variables
     unsigned status = 0;  // VEXO_SHARE_...
     unsigned mask = 0;    // restriction
     int ftp = 0;
@@ -32,7 +32,8 @@ struct ShareReading {
 
 [[nodiscard]] ShareReading readShare(const DefinitionSection& section);
 
-// `path` without repeated and trailing slashes when it has the form /<volume>/<share>, both real names; else nothing.
+// `path` without repeated and trailing slashes when it is absolute, has a component or more, and neither "." nor ".."
+// is one; else nothing.
 [[nodiscard]] std::optional<std::string> normalRoot(std::string_view path);
 
 // What the variables of a path stand for.
