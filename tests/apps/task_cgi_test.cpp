@@ -57,6 +57,34 @@ TEST_F(HeldTask, ProgressIsNeverOutOfStep) {
     EXPECT_EQ(end["progress"], 1.0);
 }
 
+TEST_F(HeldTask, WorkThatDidNotBeginIsRefused) {
+    SKIP_WITHOUT_ROOT();
+    for (const bool killed : {false, true}) {
+        SCOPED_TRACE(killed ? "its process was killed" : "it could not be recorded");
+        support::Gate gate("KTR::Task::attach", file_);
+        std::string output;
+        std::thread asking([&] {
+            const support::Variables more = {gate.order(), {"CONTENT_TYPE", "application/x-www-form-urlencoded"}};
+            output = support::finishCgi(PROGRAM_OPERATION, "alice", "POST", "",
+                                        "action=copy" + about({"/photo/tree"}, "/video"), more)
+                         .output;
+        });
+        const bool held = gate.holds();
+        if (held && killed) kill(std::stoi(readFile(file_)), SIGKILL);
+        if (!killed) fs::remove_all(recordOf(""));
+        gate.open();
+        asking.join();
+        ASSERT_TRUE(held);
+        const CgiReply reply(output);
+        EXPECT_EQ(code(reply), killed ? 401 : 408) << reply.body;
+        EXPECT_TRUE(reply.json["data"]["taskid"].isNull());
+        EXPECT_EQ(CgiReply(support::runCgi(PROGRAM_OPERATION, "alice", "GET", "action=status")).json["data"]["tasks"],
+                  Json::Value(Json::arrayValue))
+            << "no record is left of it";
+        EXPECT_FALSE(fs::exists(video_ + "/tree"));
+    }
+}
+
 TEST_F(HeldTask, CancelledOrKilledItLeavesWholeFilesOnly) {
     SKIP_WITHOUT_ROOT();
     for (const bool killed : {false, true}) {

@@ -1,30 +1,21 @@
 #include "operation/task_start.h"
 
 #include <sys/resource.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <memory>
 
 #include "background.h"
 #include "base/random.h"
 #include "orvel/error_state.h"
-#include "orvel/task_progress.h"
+#include "reply.h"
 #include "search_task.h"
 #include "vexo/error.h"
 
 namespace orvel::cgi {
 namespace {
 
-constexpr unsigned kPatience = 1000;        // ten seconds, as waits are counted
 constexpr rlim_t kMostDescriptors = 16384;  // two for each level of a tree
-
-struct Background {
-    KTR::Task& task;
-    const std::string& action;
-    const std::function<void(Progress&)>& work;
-};
 
 // "" with errno when the kernel gives no random bytes.
 std::string newTaskId(const std::string& action) {
@@ -39,13 +30,16 @@ void allowDeepTrees() {
     setrlimit(RLIMIT_NOFILE, &limit);
 }
 
-int runInBackground(void* arg) {
-    const auto& background = *static_cast<Background*>(arg);
-    if (!background.task.attach()) return 1;
-    Progress progress(background.task, background.action);
-    if (!progress.publish()) return 1;
+// The process of the work: it begins once its record shows it and who asked for it knows.
+int runInBackground(KTR::Task& task, const std::string& action, const std::function<void(Progress&)>& work,
+                    const Begun& begun) {
+    Progress progress(task, action);
+    const bool recorded = task.attach() && progress.publish();
+    const bool heard = begun(recorded ? ORV_ERR_NONE : platformCode());
+    if (!heard) task.remove();  // nobody waits for it, nobody would look for it
+    if (!heard || !recorded) return 1;
     allowDeepTrees();
-    background.work(progress);
+    work(progress);
     progress.end();
     return 0;
 }
@@ -60,14 +54,14 @@ int startTask(Operation& operation, const std::string& action, const std::functi
     KTR::TaskMgr manager(user);
     const std::unique_ptr<KTR::Task> task(id.empty() ? nullptr : manager.createTask(id.c_str()));
     if (task == nullptr) return OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
-    Background background = {.task = *task, .action = action, .work = work};
-    if (startBackground(runInBackground, &background) < 0) {
-        const int reason = OrvParseErrnoToError(errno, nullptr, nullptr);
+    const int failure =
+        startBackground([&](const Begun& begun) { return runInBackground(*task, action, work, begun); });
+    if (failure != ORV_ERR_NONE) {
         task->remove();
-        return reason;
+        return failure;
     }
     operation.data["taskid"] = id;
-    return WaitForMgrTaskDataReady(&manager, id.c_str(), "data", kPatience) ? ORV_ERR_NONE : ORV_ERR_GENERAL;
+    return ORV_ERR_NONE;
 }
 
 }  // namespace orvel::cgi

@@ -1,15 +1,11 @@
-#include <fcntl.h>
 #include <json/value.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
-#include <cerrno>
 #include <memory>
 #include <string>
 #include <vector>
 
 #include "background.h"
-#include "base/descriptor.h"
 #include "chosen_folders.h"
 #include "criteria.h"
 #include "orvel/error_state.h"
@@ -34,14 +30,12 @@ struct Search {
     OrvSearchWalker walker;
     const Criteria& criteria;
     std::unique_ptr<KTR::Task> record;
-    Descriptor ready;  // closed once the background process has noted itself
 };
 
 // The search itself, in a process of its own.
-int run(void* arg) {
-    Search& search = *static_cast<Search*>(arg);
-    if (!search.record->attach()) return 1;
-    search.ready = Descriptor();
+int run(Search& search, const Begun& begun) {
+    const bool noted = search.record->attach();
+    if (!begun(noted ? ORV_ERR_NONE : platformCode()) || !noted) return 1;
     VLIBCErrSetEx(0, __FILE__, __LINE__);
     // Records that could not be stored do not end a walk, but the platform's error says that some are missing.
     const bool walked = search.walker.Walk(search.criteria.accessTimes());
@@ -78,20 +72,6 @@ bool note(Search& search, const std::vector<std::string>& folders, const User& u
     return record.endUpdate();
 }
 
-// Goes on with the search in the background. 0 once its process can be found there.
-int launch(Search& search) {
-    int ends[2];
-    if (pipe2(ends, O_CLOEXEC) != 0) return OrvParseErrnoToError(errno, nullptr, nullptr);
-    const Descriptor noted(ends[0]);
-    search.ready = Descriptor(ends[1]);
-    if (startBackground(run, &search) < 0) return OrvParseErrnoToError(errno, nullptr, nullptr);
-    search.ready = Descriptor();
-    char nothing = 0;
-    while (read(noted.get(), &nothing, 1) < 0 && errno == EINTR) {
-    }
-    return ORV_ERR_NONE;
-}
-
 int beginSearch(const User& user, const std::vector<std::string>& folders, bool recursive, const Criteria& criteria,
                 std::string& id) {
     Search search(user, criteria);
@@ -100,7 +80,7 @@ int beginSearch(const User& user, const std::vector<std::string>& folders, bool 
     id = search.walker.getDBTaskId();
     const std::string volume = search.walker.getDBVol();
     int code = note(search, folders, user) ? ORV_ERR_NONE : platformCode();
-    if (code == ORV_ERR_NONE) code = launch(search);
+    if (code == ORV_ERR_NONE) code = startBackground([&](const Begun& begun) { return run(search, begun); });
     if (code == ORV_ERR_NONE) return code;
     unlink(OrvSearchDBTask::getDBTaskFilePath(volume.c_str(), user.name.c_str(), id.c_str()).c_str());
     if (search.record != nullptr) search.record->remove();
