@@ -242,7 +242,7 @@ int main(int count, char** words) {
     const Place place = {words[1], work + "/root", work + "/orveld", work + "/floor", work + "/resident"};
     makeAppliance(place);
     const std::string floor = place.build + "/bench/floor_request";
-    const Texts environment = {"PATH=/usr/bin:/bin", "VEXO_ROOT=" + place.root};
+    const Texts environment = {"PATH=/usr/bin:/bin", "VEXO_ROOT=" + place.root, "LD_BIND_NOW=1"};  // as its unit has it
     const pid_t servers[] = {start({floor, "fork", place.floor}, environment),
                              start({floor, "resident", place.resident}, environment),
                              start({place.build + "/bin/orveld", "--socket", place.orveld}, environment)};

@@ -6,84 +6,13 @@ source=$1
 build=$2
 shift 2
 [ "$#" -gt 0 ] || set -- lighttpd nginx apache
-PATH=$PATH:/usr/sbin
 export ASAN_OPTIONS=detect_leaks=0
 slow=20 # connections that dawdle
 [ -z "${ORVEL_TEST_LONG:-}" ] || slow=2000
 ulimit -n 8192 2>/dev/null
 
-work=$(mktemp -d)
-chmod 755 "$work"
-demo=$work/demo
-settings=$demo/etc/vexoinfo.conf
-failures=0
-pids=()
-server_pid=
-cleanup() {
-    [ -z "$server_pid" ] || kill "$server_pid" 2>/dev/null
-    [ "${#pids[@]}" -eq 0 ] || kill "${pids[@]}" 2>/dev/null
-    wait 2>/dev/null
-    [ ! -e "$demo" ] || "$build/apps/orvelctl/orvelctl" demo "$demo" --remove >/dev/null 2>&1
-    rm -rf "$work"
-}
-trap cleanup EXIT
-expect() { # what, wanted, got
-    [ "$2" = "$3" ] && return
-    echo "FAILED: $server: $1: wanted '$2', got '$3'"
-    failures=$((failures + 1))
-}
-until_true() { # what, command...
-    local what=$1
-    shift
-    for _ in $(seq 300); do
-        "$@" >/dev/null 2>&1 && return
-        sleep 0.1
-    done
-    expect "$what" "in half a minute" never
-}
+. "$(dirname "$0")/webserver.sh"
 
-user=$(id -un)
-user_lighttpd='' user_nginx='' user_apache=''
-if [ "$(id -u)" -eq 0 ]; then
-    user=www-data
-    user_lighttpd='server.username = "www-data"' user_nginx='user www-data;' user_apache=$'User www-data\\\nGroup www-data'
-fi
-accounts=$("$build/apps/orvelctl/orvelctl" demo "$demo") || exit 1
-password() { awk -v user="$1" '$1 == "user" && $2 == user { print $4 }' <<<"$accounts"; }
-printf 'orveld_web_servers="%s"\norveld_trusted_logins="%s"\n' "$user" "$user" >>"$settings"
-cp -r "$source/apps/web" "$work/web"
-cp "$demo/etc/vexo/users.htpasswd" "$work/logins"
-chmod -R a+rX "$work/web" "$work/logins"
-socket=$work/orveld.socket
-VEXO_ROOT=$demo "$build/bin/orveld-keeper" "$socket" "$build/bin/orveld" 2>"$work/orveld.log" &
-pids+=($!)
-status() { "$build/apps/orvelctl/orvelctl" --root "$demo" status --socket "$socket" --json; }
-server=orveld
-until_true "orveld" status
-
-fill() { printf 's|@%s@|%s|g\n' "$1" "$(printf '%s' "$2" | sed 's/[|&]/\\&/g')"; }
-configure() { # template, user line
-    sed -f <(fill ADDRESS 127.0.0.1; fill PORT "$port"; fill WEB "$work/web"; fill STATE "$state"; fill LOGINS "$work/logins"
-             fill SOCKET "$socket"; fill USER "$2"; fill MODULES /usr/lib/apache2/modules) "$source/packaging/$1" >"$state/$1"
-}
-start() {
-    case "$server" in
-        lighttpd) exec lighttpd -D -f "$state/lighttpd.conf.in" ;;
-        nginx) exec nginx -p "$state" -c "$state/nginx.conf.in" ;;
-        apache) exec apache2 -D FOREGROUND -f "$state/apache.conf.in" ;;
-    esac >>"$work/$server.log" 2>&1 &
-    server_pid=$!
-    until_true "start" answers
-}
-answers() { (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null; }
-stop() { # signal
-    local workers
-    workers=$(cat "/proc/$server_pid/task/$server_pid/children")
-    # shellcheck disable=SC2086
-    if [ "$1" = KILL ]; then kill -KILL "$server_pid" $workers; else kill "-$1" "$server_pid"; fi
-    wait "$server_pid" 2>/dev/null
-    server_pid=
-}
 ask() { curl -s --max-time 60 -u "alice:$(password alice)" "$@"; }
 code() { ask -o /dev/null -w '%{http_code}' "$@"; }
 url() { echo "http://127.0.0.1:$port/cgi-bin/$1"; }
@@ -171,15 +100,8 @@ for server in "$@"; do
         failures=$((failures + 1))
         continue
     fi
-    port=$((20000 + $$ % 12000))
-    while answers; do port=$((port + 1)); done
-    state=$work/$server
-    mkdir -p "$state"
-    user_line=user_$server
-    configure "$server.conf.in" "${!user_line}"
-    [ "$(id -u)" -ne 0 ] || chown "$user" "$state"
     before=$failures
-    start
+    serve
     check_requests
     check_address
     check_slow
