@@ -31,6 +31,7 @@ constexpr timespec kPause = {0, 100000000};  // before a program that ended is s
     }
     setenv("LISTEN_PID", std::to_string(getpid()).c_str(), 1);
     setenv("LISTEN_FDS", "1", 1);
+    setenv("LD_BIND_NOW", "1", 1);  // once in the parent, not again in each child
     execv(words[0], words);
     std::perror(words[0]);
     _exit(127);

@@ -24,9 +24,9 @@ enum class SlotState : std::uint32_t {
 struct Slot {
     std::atomic<std::uint32_t> state;
     std::atomic<std::uint32_t> bodyLeft;  // not 0: the web server may still be sending
-    std::atomic<std::uint32_t> program;  // place in the table of programs, counted from 1; 0: not known yet
-    std::atomic<std::uint64_t> address;  // hash of the client's; 0: not known yet
-    std::atomic<std::int64_t> answered;  // nanoseconds of the monotonic clock
+    std::atomic<std::uint32_t> program;   // place in the table of programs, counted from 1; 0: not known yet
+    std::atomic<std::uint64_t> address;   // hash of the client's; 0: not known yet
+    std::atomic<std::int64_t> answered;   // nanoseconds of the monotonic clock
 };
 
 class Slots {

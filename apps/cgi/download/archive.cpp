@@ -1,7 +1,5 @@
 #include "download/archive.h"
 
-#include <archive.h>
-#include <archive_entry.h>
 #include <fcntl.h>
 
 #include <algorithm>
@@ -11,6 +9,7 @@
 #include <ctime>
 #include <memory>
 
+#include "archive_library.h"
 #include "base/owner.h"
 #include "folder_names.h"
 #include "orvel/error_state.h"
@@ -35,23 +34,24 @@ const char* reasonOf(int code) {
     return code == ORV_ERR_MISSING ? "missing" : "could not be opened";
 }
 
-ZipStream::ZipStream(int fd, ZipObserver* observer) : archive_(archive_write_new()), observer_(observer) {
+ZipStream::ZipStream(int fd, ZipObserver* observer)
+    : archive_(loadArchiveLibrary() ? libarchive.archive_write_new() : nullptr), observer_(observer) {
     setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted from
-    if (archive_ == nullptr || archive_write_set_format_zip(archive_) != ARCHIVE_OK ||
-        archive_write_set_options(archive_, "zip:hdrcharset=UTF-8") < ARCHIVE_WARN ||
-        archive_write_set_bytes_per_block(archive_, static_cast<int>(kPiece)) != ARCHIVE_OK ||
-        archive_write_set_bytes_in_last_block(archive_, 1) != ARCHIVE_OK ||
-        archive_write_open_fd(archive_, fd) != ARCHIVE_OK) {
+    if (archive_ == nullptr || libarchive.archive_write_set_format_zip(archive_) != ARCHIVE_OK ||
+        libarchive.archive_write_set_options(archive_, "zip:hdrcharset=UTF-8") < ARCHIVE_WARN ||
+        libarchive.archive_write_set_bytes_per_block(archive_, static_cast<int>(kPiece)) != ARCHIVE_OK ||
+        libarchive.archive_write_set_bytes_in_last_block(archive_, 1) != ARCHIVE_OK ||
+        libarchive.archive_write_open_fd(archive_, fd) != ARCHIVE_OK) {
         broken_ = true;
     }
 }
 
 ZipStream::~ZipStream() {
-    archive_write_free(archive_);
+    if (archive_ != nullptr) libarchive.archive_write_free(archive_);
 }
 
 bool ZipStream::recordFailure() {
-    error_ = archive_errno(archive_);
+    error_ = libarchive.archive_errno(archive_);
     return recordStop();
 }
 
@@ -74,14 +74,15 @@ void ZipStream::leaveOut(const std::string& name, const std::string& reason) {
 }
 
 bool ZipStream::begin(const std::string& name, const struct stat& status, long long size) {
-    const std::unique_ptr<archive_entry, Releaser<archive_entry_free>> entry(archive_entry_new());
+    const std::unique_ptr<archive_entry, decltype(libarchive.archive_entry_free)> entry(libarchive.archive_entry_new(),
+                                                                                        libarchive.archive_entry_free);
     if (entry == nullptr) return recordFailure();
-    archive_entry_set_pathname(entry.get(), name.c_str());
-    archive_entry_set_mode(entry.get(), status.st_mode & (S_IFMT | 0777));
-    archive_entry_set_mtime(entry.get(), status.st_mtim.tv_sec, status.st_mtim.tv_nsec);
-    if (size >= 0) archive_entry_set_size(entry.get(), size);
+    libarchive.archive_entry_set_pathname(entry.get(), name.c_str());
+    libarchive.archive_entry_set_mode(entry.get(), status.st_mode & (S_IFMT | 0777));
+    libarchive.archive_entry_set_mtime(entry.get(), status.st_mtim.tv_sec, status.st_mtim.tv_nsec);
+    if (size >= 0) libarchive.archive_entry_set_size(entry.get(), size);
     begun_ = true;
-    return archive_write_header(archive_, entry.get()) >= ARCHIVE_WARN || recordFailure();
+    return libarchive.archive_write_header(archive_, entry.get()) >= ARCHIVE_WARN || recordFailure();
 }
 
 bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
@@ -97,12 +98,12 @@ bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
             miss(name, got < 0 ? errno : EIO, got < 0 ? nullptr : "became shorter while it was read");
             break;
         }
-        if (archive_write_data(archive_, piece.data(), static_cast<size_t>(got)) < 0) return recordFailure();
+        if (libarchive.archive_write_data(archive_, piece.data(), static_cast<size_t>(got)) < 0) return recordFailure();
         left -= got;
         bytes_ += got;
         if (observer_ != nullptr && !observer_->wrote(got)) return recordStop();
     }
-    return archive_write_finish_entry(archive_) >= ARCHIVE_WARN || recordFailure();
+    return libarchive.archive_write_finish_entry(archive_) >= ARCHIVE_WARN || recordFailure();
 }
 
 bool ZipStream::addChild(const Descriptor& folder, const std::string& child, const std::string& name) {
@@ -152,12 +153,12 @@ bool ZipStream::writeLeftOut() {
     status.st_mode = S_IFREG | 0644;
     status.st_mtim.tv_sec = time(nullptr);
     if (!begin("_not_included.txt", status, static_cast<long long>(text.size()))) return false;
-    return archive_write_data(archive_, text.data(), text.size()) >= 0 || recordFailure();
+    return libarchive.archive_write_data(archive_, text.data(), text.size()) >= 0 || recordFailure();
 }
 
 bool ZipStream::finish() {
     if (!leftOut_.empty() && !broken_) static_cast<void>(writeLeftOut());
-    return !broken_ && (archive_write_close(archive_) == ARCHIVE_OK || recordFailure());
+    return !broken_ && (libarchive.archive_write_close(archive_) == ARCHIVE_OK || recordFailure());
 }
 
 }  // namespace orvel::cgi

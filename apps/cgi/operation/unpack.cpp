@@ -1,7 +1,5 @@
 #include "operation/unpack.h"
 
-#include <archive.h>
-#include <archive_entry.h>
 #include <fcntl.h>
 #include <unistd.h>
 
@@ -13,6 +11,7 @@
 #include <clocale>
 #include <memory>
 
+#include "archive_library.h"
 #include "base/new_file.h"
 #include "free_names.h"
 #include "operation/member_path.h"
@@ -31,7 +30,7 @@ constexpr int kSkipped = -1;  // beside library codes
 constexpr int kStopped = -2;
 
 struct CloseArchive {
-    void operator()(archive* source) const { archive_read_free(source); }
+    void operator()(archive* source) const { libarchive.archive_read_free(source); }
 };
 
 int codeOf(int error) {
@@ -59,18 +58,20 @@ std::string joined(const std::vector<std::string>& components) {
 
 std::unique_ptr<archive, CloseArchive> openArchive(int file) {
     setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted to
-    std::unique_ptr<archive, CloseArchive> source(archive_read_new());
+    if (!loadArchiveLibrary()) return nullptr;
+    std::unique_ptr<archive, CloseArchive> source(libarchive.archive_read_new());
     if (source == nullptr) return nullptr;
-    archive_read_support_format_zip(source.get());
-    archive_read_support_format_tar(source.get());
+    libarchive.archive_read_support_format_zip(source.get());
+    libarchive.archive_read_support_format_tar(source.get());
     // Not all there are: some would run outside programs.
     for (const auto support :
-         {archive_read_support_filter_gzip, archive_read_support_filter_bzip2, archive_read_support_filter_compress,
-          archive_read_support_filter_lzip, archive_read_support_filter_lzma, archive_read_support_filter_xz,
-          archive_read_support_filter_zstd, archive_read_support_filter_lz4}) {
+         {libarchive.archive_read_support_filter_gzip, libarchive.archive_read_support_filter_bzip2,
+          libarchive.archive_read_support_filter_compress, libarchive.archive_read_support_filter_lzip,
+          libarchive.archive_read_support_filter_lzma, libarchive.archive_read_support_filter_xz,
+          libarchive.archive_read_support_filter_zstd, libarchive.archive_read_support_filter_lz4}) {
         support(source.get());
     }
-    return archive_read_open_fd(source.get(), file, kBlock) == ARCHIVE_OK ? std::move(source) : nullptr;
+    return libarchive.archive_read_open_fd(source.get(), file, kBlock) == ARCHIVE_OK ? std::move(source) : nullptr;
 }
 
 }  // namespace
@@ -83,12 +84,13 @@ struct Unpacker::Member {
     Descriptor folder;  // that holds it
     // Archives do not give the type of a further name.
     [[nodiscard]] mode_t type() const {
-        return archive_entry_hardlink(entry) != nullptr ? mode_t{AE_IFREG} : archive_entry_filetype(entry);
+        return libarchive.archive_entry_hardlink(entry) != nullptr ? mode_t{AE_IFREG}
+                                                                   : libarchive.archive_entry_filetype(entry);
     }
-    [[nodiscard]] mode_t mode() const { return archive_entry_perm(entry); }
+    [[nodiscard]] mode_t mode() const { return libarchive.archive_entry_perm(entry); }
     [[nodiscard]] timespec modified() const {
-        if (archive_entry_mtime_is_set(entry) == 0) return {0, UTIME_NOW};
-        return {archive_entry_mtime(entry), archive_entry_mtime_nsec(entry)};
+        if (libarchive.archive_entry_mtime_is_set(entry) == 0) return {0, UTIME_NOW};
+        return {libarchive.archive_entry_mtime(entry), libarchive.archive_entry_mtime_nsec(entry)};
     }
     [[nodiscard]] bool isThere(struct stat& status) const {
         return fstatat(folder.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
@@ -115,7 +117,7 @@ int Unpacker::readAll(archive* source) {
     for (;;) {
         if (progress_.stopped()) return ORV_ERR_NONE;
         archive_entry* entry = nullptr;
-        const int result = archive_read_next_header(source, &entry);
+        const int result = libarchive.archive_read_next_header(source, &entry);
         if (result == ARCHIVE_EOF) return locked_ ? ORV_ERR_ARCHIVE_PASSWORD : ORV_ERR_NONE;
         if (result == ARCHIVE_RETRY) continue;
         if (result < ARCHIVE_WARN) return members_ == 0 ? ORV_ERR_ARCHIVE : ORV_ERR_ARCHIVE_DATA;
@@ -129,19 +131,19 @@ int Unpacker::readAll(archive* source) {
 
 // How much of the archive was read.
 void Unpacker::tellConsumed(archive* source) {
-    const long long consumed = archive_filter_bytes(source, -1);
+    const long long consumed = libarchive.archive_filter_bytes(source, -1);
     progress_.bytes(std::max(consumed - consumed_, 0LL));
     consumed_ = std::max(consumed, consumed_);
 }
 
 void Unpacker::take(archive* source, archive_entry* entry) {
     progress_.expect(1, 0);
-    const char* name = archive_entry_pathname(entry);
+    const char* name = libarchive.archive_entry_pathname(entry);
     const std::string shown = target_.path + "/" + (name == nullptr ? "" : name);
     progress_.begin(shown);
     auto components = memberComponents(name == nullptr ? "" : name);
     // The top itself, as archives of "." have it.
-    if (!components && name != nullptr && archive_entry_filetype(entry) == AE_IFDIR &&
+    if (!components && name != nullptr && libarchive.archive_entry_filetype(entry) == AE_IFDIR &&
         std::string_view(name).find_first_not_of("./") == std::string_view::npos && *name != '/' &&
         std::string_view(name).find("..") == std::string_view::npos) {
         return progress_.done();
@@ -170,9 +172,9 @@ int Unpacker::place(archive* source, Member& member) {
     int code = enter(member.folders, member.folder);
     if (code == ORV_ERR_NONE) code = checkNewName(member.folder, member.name);
     if (code != ORV_ERR_NONE) return code;
-    if (archive_entry_hardlink(member.entry) != nullptr) return makeHardLink(member);
-    if (archive_entry_is_encrypted(member.entry) != 0) return ORV_ERR_ARCHIVE_PASSWORD;
-    switch (archive_entry_filetype(member.entry)) {
+    if (libarchive.archive_entry_hardlink(member.entry) != nullptr) return makeHardLink(member);
+    if (libarchive.archive_entry_is_encrypted(member.entry) != 0) return ORV_ERR_ARCHIVE_PASSWORD;
+    switch (libarchive.archive_entry_filetype(member.entry)) {
         case AE_IFREG:
             return makeFile(source, member);
         case AE_IFDIR:
@@ -255,7 +257,7 @@ int Unpacker::nameIt(Member& member, Give give) {
 int Unpacker::makeFile(archive* source, Member& member) {
     struct stat there {};
     if (target_.conflict == Conflict::kSkip && member.isThere(there)) return kSkipped;
-    if (archive_entry_size(member.entry) > limits_.bytes - bytes_) {
+    if (libarchive.archive_entry_size(member.entry) > limits_.bytes - bytes_) {
         exceeded_ = true;
         return ORV_ERR_FILE_TOO_BIG;
     }
@@ -278,14 +280,15 @@ int Unpacker::makeFile(archive* source, Member& member) {
 
 // Writes the member's data; what the archive leaves out stays a hole.
 int Unpacker::fill(archive* source, const Member& member, int file) {
-    long long end = archive_entry_size_is_set(member.entry) != 0 ? archive_entry_size(member.entry) : 0;
+    long long end =
+        libarchive.archive_entry_size_is_set(member.entry) != 0 ? libarchive.archive_entry_size(member.entry) : 0;
     end = std::max(end, 0LL);
     const long long before = bytes_;
     for (;;) {
         const void* block = nullptr;
         size_t size = 0;
         la_int64_t offset = 0;
-        const int result = archive_read_data_block(source, &block, &size, &offset);
+        const int result = libarchive.archive_read_data_block(source, &block, &size, &offset);
         if (result == ARCHIVE_EOF) break;
         if (result == ARCHIVE_RETRY) continue;
         if (result < ARCHIVE_WARN) {
@@ -313,7 +316,7 @@ int Unpacker::fill(archive* source, const Member& member, int file) {
 }
 
 int Unpacker::makeLink(Member& member) {
-    const char* text = archive_entry_symlink(member.entry);
+    const char* text = libarchive.archive_entry_symlink(member.entry);
     if (text == nullptr || !staysInside(text, member.folders.size())) return ORV_ERR_DENIED;
     return nameIt(member, [&](const std::string& name, bool replace) {
         return putLink(member.folder.get(), name, text, replace);
@@ -341,7 +344,7 @@ bool Unpacker::findUnpacked(std::vector<std::string> components, Descriptor& fol
 
 // One more name of a member that was unpacked before.
 int Unpacker::makeHardLink(Member& member) {
-    const auto other = memberComponents(archive_entry_hardlink(member.entry));
+    const auto other = memberComponents(libarchive.archive_entry_hardlink(member.entry));
     if (!other) return ORV_ERR_ILLEGAL_NAME;
     struct stat there {};
     if (member.isThere(there) && target_.conflict == Conflict::kSkip) return kSkipped;
