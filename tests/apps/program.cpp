@@ -92,6 +92,18 @@ std::string throughOrveld(Variables variables, const std::string& input) {
     return orveld.ask(variables, input);
 }
 
+Variables requestVariables(const std::string& user, const std::string& method, const std::string& query,
+                           const std::string& input, const Variables& more) {
+    Variables variables = {{"GATEWAY_INTERFACE", "CGI/1.1"},
+                           {"REQUEST_METHOD", method},
+                           {"REMOTE_ADDR", "127.0.0.1"},
+                           {"REMOTE_USER", user},
+                           {"QUERY_STRING", query}};
+    if (method != "GET" && method != "HEAD") variables["CONTENT_LENGTH"] = std::to_string(input.size());
+    for (const auto& [name, value] : more) variables[name] = value;
+    return variables;
+}
+
 }  // namespace
 
 Finished runProgram(const std::vector<std::string>& words, const Variables& variables, const std::string& input) {
@@ -124,24 +136,24 @@ Finished runProgram(const std::vector<std::string>& words, const Variables& vari
     return finished;
 }
 
-std::string runCgi(const std::string& program, const std::string& user, const std::string& method,
+Finished finishCgi(const std::string& program, const std::string& user, const std::string& method,
                    const std::string& query, const std::string& input, const Variables& more) {
-    Variables variables = {{"GATEWAY_INTERFACE", "CGI/1.1"},
-                           {"REQUEST_METHOD", method},
-                           {"REMOTE_ADDR", "127.0.0.1"},
-                           {"REMOTE_USER", user},
-                           {"QUERY_STRING", query}};
-    if (method != "GET" && method != "HEAD") variables["CONTENT_LENGTH"] = std::to_string(input.size());
-    for (const auto& [name, value] : more) variables[name] = value;
-    if (getenv("ORVEL_TEST_THROUGH_ORVELD") != nullptr) {
-        variables["SCRIPT_NAME"] = "/cgi-bin/" + std::filesystem::path(program).filename().string();
-        return throughOrveld(variables, input);
-    }
     // A web server starts a program in its folder.
     const std::string before = std::filesystem::current_path();
     std::filesystem::current_path(std::filesystem::path(program).parent_path());
-    const Finished finished = runProgram({program}, variables, input);
+    Finished finished = runProgram({program}, requestVariables(user, method, query, input, more), input);
     std::filesystem::current_path(before);
+    return finished;
+}
+
+std::string runCgi(const std::string& program, const std::string& user, const std::string& method,
+                   const std::string& query, const std::string& input, const Variables& more) {
+    if (getenv("ORVEL_TEST_THROUGH_ORVELD") != nullptr) {
+        Variables variables = requestVariables(user, method, query, input, more);
+        variables["SCRIPT_NAME"] = "/cgi-bin/" + std::filesystem::path(program).filename().string();
+        return throughOrveld(variables, input);
+    }
+    const Finished finished = finishCgi(program, user, method, query, input, more);
     EXPECT_EQ(finished.status, 0) << query;
     return finished.output;
 }

@@ -23,8 +23,11 @@ using Variables = std::map<std::string, std::string>;
 Finished runProgram(const std::vector<std::string>& words, const Variables& variables = {},
                     const std::string& input = "");
 
-// Runs a program for a user who is logged in, as plain CGI or, where the variable ORVEL_TEST_THROUGH_ORVELD is set,
-// through an orveld, with `input` as body of the request; expects it to end well.
+// Runs a program for a user who is logged in, as plain CGI, with `input` as body of the request.
+Finished finishCgi(const std::string& program, const std::string& user, const std::string& method,
+                   const std::string& query, const std::string& input = "", const Variables& more = {});
+// The same for one that is expected to end well: its output. Where the variable ORVEL_TEST_THROUGH_ORVELD is set it
+// goes through an orveld.
 std::string runCgi(const std::string& program, const std::string& user, const std::string& method,
                    const std::string& query, const std::string& input = "", const Variables& more = {});
 
