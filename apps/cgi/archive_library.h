@@ -14,7 +14,7 @@ namespace orvel::cgi {
     X(archive_entry_mtime) X(archive_entry_mtime_is_set) X(archive_entry_mtime_nsec) X(archive_entry_new) \
     X(archive_entry_pathname) X(archive_entry_perm) X(archive_entry_set_mode) X(archive_entry_set_mtime) \
     X(archive_entry_set_pathname) X(archive_entry_set_size) X(archive_entry_size) X(archive_entry_size_is_set) \
-    X(archive_entry_symlink) X(archive_errno) X(archive_filter_bytes) X(archive_read_data_block) \
+    X(archive_entry_symlink) X(archive_errno) X(archive_filter_bytes) X(archive_read_add_passphrase) X(archive_read_data_block) \
     X(archive_read_free) X(archive_read_new) X(archive_read_next_header) X(archive_read_open_fd) \
     X(archive_read_support_filter_bzip2) X(archive_read_support_filter_compress) X(archive_read_support_filter_gzip) \
     X(archive_read_support_filter_lz4) X(archive_read_support_filter_lzip) X(archive_read_support_filter_lzma) \

@@ -8,6 +8,7 @@
 #include <cstdlib>
 
 #include "apps/task_fixture.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -155,7 +156,7 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
     for (const char* name : {"/torn.tar.xz", "/cut.zip"}) {
         ASSERT_EQ(truncate((video_ + name).c_str(), static_cast<off_t>(fs::file_size(video_ + name) * 3 / 4)), 0);
     }
-    pack(video_ + "/secret.zip", "zip", nullptr, {{"hidden", AE_IFREG, "1"}, {"too", AE_IFREG, "1"}}, "password");
+    pack(video_ + "/secret.zip", "zip", nullptr, {{"hidden", AE_IFREG, "1"}, {"too", AE_IFREG, "2"}}, "p\xC3\xA9 +&");
     writeFile(video_ + "/none.zip", "no archive at all");
     writeFile(video_ + "/empty.zip", "");
     const auto extract = [](const std::string& name) {
@@ -172,7 +173,19 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
     pack(video_ + "/deep.tar", "ustar", nullptr, {{(deep + "/x").c_str(), AE_IFREG, "1"}});
     EXPECT_EQ(extract("deep.tar"), "/video/t/" + deep + "/x 1007\n/video/deep.tar 1007\n");
     EXPECT_EQ(extract("good.zip"), "");
-    EXPECT_EQ(extract("secret.zip"), "/video/secret.zip 1403\n") << "not a member";
+    const Rows<const char*, std::string, std::string> passwords = {
+        {"none", "", "/video/secret.zip 1403\n"},
+        {"a wrong one", "&password=wrong", "/video/secret.zip 1403\n"},
+        {"the right one", "&password=p%C3%A9%20%2B%26", ""},
+    };
+    for (const auto& [what, password, wanted] : passwords) {
+        EXPECT_FALSE(fs::exists(video_ + "/t/hidden") || fs::exists(video_ + "/t/too")) << what;
+        const std::string asked = "action=extract" + password + about({"/video/secret.zip"}, "/video/t");
+        EXPECT_EQ(errors(perform("alice", asked)), wanted) << what;
+    }
+    EXPECT_EQ(readFile(video_ + "/t/hidden") + readFile(video_ + "/t/too"), "12");
+    const std::string endless = "action=extract&password=" + std::string(1025, 'x');
+    EXPECT_EQ(code(ask("alice", endless + about({"/video/secret.zip"}, "/video/t"))), 400);
     EXPECT_EQ(extract("none.zip"), "/video/none.zip 1401\n");
     EXPECT_EQ(extract("empty.zip"), "/video/empty.zip 1401\n");
     EXPECT_NE(extract("torn.tar.xz").find("/video/torn.tar.xz 1402"), std::string::npos);

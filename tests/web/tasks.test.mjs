@@ -1,6 +1,6 @@
 // What goes on behind the page: searches and background operations.
 import assert from "node:assert/strict";
-import { existsSync, mkdirSync, readdirSync, writeFileSync } from "node:fs";
+import { existsSync, mkdirSync, readdirSync, readFileSync, writeFileSync } from "node:fs";
 import { after, before, test } from "node:test";
 import { launch, row, rowsReady, screenshot, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
 import { Gate } from "./gate.mjs";
@@ -12,6 +12,8 @@ let chrome;
 before(async () => {
   chrome = await launch();
   mkdirSync(`${projects}/many/target`, { recursive: true });
+  mkdirSync(`${projects}/locked`);
+  writeFileSync(`${projects}/locked/locked.zip`, LOCKED, "base64");
   for (let i = 0; i < MANY; ++i) writeFileSync(`${projects}/many/part ${i}.dat`, "x");
   mkdirSync(`${projects}/<i>odd`, { mode: 0o777 });
   for (const name of ["needle 'one'.txt", "needle & two.txt", "Needle \u202Ethree.txt"])
@@ -163,6 +165,26 @@ test("dragged to another folder", () =>
     await row(page, "notes.md").dragTo(page.locator("#tree >> text=projects"));
     await wentWell(page, "Move “notes.md” to projects");
     assert.ok(existsSync(`${projects}/notes.md`));
+  }));
+
+// A zip with "locked.txt", encrypted with the password "open me".
+const LOCKED =
+  "UEsDBBQACQAIANQNKSsAAAAAAAAAAAYAAAAKABgAbG9ja2VkLnR4dFVUBQABAMqaO3V4CwABBAAAAAAEAAAAAFnL2rTVBShtKxVK0KvrQHWEU1aBUEsHCL3pXYgUAAAABgAAAFBLAQIUAxQACQAIANQNKSu96V2IFAAAAAYAAAAKABgAAAAAAAAAAACkgQAAAABsb2NrZWQudHh0VVQFAAEAypo7dXgLAAEEAAAAAAQAAAAAUEsFBgAAAAABAAEAUAAAAGQAAAAAAA==";
+
+test("an archive with a password: asked for, refused, opened", () =>
+  withPage(chrome, "admin", { path: "/projects/locked" }, async (page) => {
+    await row(page, "locked.zip").click();
+    await page.click("[aria-label='More actions']");
+    await page.click(".menu >> text=Extract to");
+    await page.click(".picker >> text=Extract here");
+    for (const password of ["wrong", "open me"]) {
+      await page.waitForSelector(".activity-card.failed >> text=The archive “locked.zip” needs a password");
+      await page.click(".activity-card.failed >> text=Enter password…");
+      await page.fill(".dialog input[type=password]", password);
+      await page.keyboard.press("Enter");
+    }
+    await page.waitForSelector(".activity-card.good >> text=Extract");
+    assert.equal(readFileSync(`${projects}/locked/locked.txt`, "latin1"), "hidden");
   }));
 
 test("packed, extracted, refused item by item", () =>

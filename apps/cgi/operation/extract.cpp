@@ -12,11 +12,14 @@
 namespace orvel::cgi {
 namespace {
 
+constexpr size_t kLongestPassword = 1024;
+
 struct Job {
     const Operation& operation;
     Conflict conflict;
     PathInfo info;  // the target folder
     Descriptor folder;
+    std::string password;
 };
 
 int openArchive(const Job& job, const std::string& path, Item& item, Descriptor& file) {
@@ -40,9 +43,11 @@ void extractOne(const Job& job, const std::string& path, Progress& progress) {
     Descriptor file;
     int code = openArchive(job, path, item, file);
     if (code != ORV_ERR_NONE) return failed(path, code, progress);
-    Unpacker unpacker(
-        progress,
-        {.folder = job.folder, .path = job.info.path, .conflict = job.conflict, .owner = ownerFor(user.name)});
+    Unpacker unpacker(progress, {.folder = job.folder,
+                                 .path = job.info.path,
+                                 .conflict = job.conflict,
+                                 .owner = ownerFor(user.name),
+                                 .password = job.password});
     code = unpacker.run(file.get(), UnpackLimits::of(item.status.st_size));
     if (code != ORV_ERR_NONE) failed(path, code, progress);
     if (unpacker.names().empty()) return;
@@ -70,7 +75,12 @@ int extractOperation(Operation& operation) {
     const auto conflict = conflictOf(operation.web.GetParam("conflict", "error"));
     if (!target || !conflict) return ORV_ERR_PARAMETER;
     operation.culprit = *target;
-    Job job = {.operation = operation, .conflict = *conflict, .info = {}, .folder = Descriptor()};
+    Job job = {.operation = operation,
+               .conflict = *conflict,
+               .info = {},
+               .folder = Descriptor(),
+               .password = operation.web.GetParam("password", "")};
+    if (job.password.size() > kLongestPassword) return ORV_ERR_PARAMETER;
     int code = openFolder(operation.user, *target, job.info, job.folder);
     if (code == ORV_ERR_NONE) code = judgeTarget(operation.user, job.info, job.conflict);
     if (code != ORV_ERR_NONE) return code;

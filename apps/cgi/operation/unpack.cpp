@@ -56,7 +56,7 @@ std::string joined(const std::vector<std::string>& components) {
     return path;
 }
 
-std::unique_ptr<archive, CloseArchive> openArchive(int file) {
+std::unique_ptr<archive, CloseArchive> openArchive(int file, const std::string& password) {
     setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted to
     if (!loadArchiveLibrary()) return nullptr;
     std::unique_ptr<archive, CloseArchive> source(libarchive.archive_read_new());
@@ -71,6 +71,7 @@ std::unique_ptr<archive, CloseArchive> openArchive(int file) {
           libarchive.archive_read_support_filter_zstd, libarchive.archive_read_support_filter_lz4}) {
         support(source.get());
     }
+    if (!password.empty()) libarchive.archive_read_add_passphrase(source.get(), password.c_str());
     return libarchive.archive_read_open_fd(source.get(), file, kBlock) == ARCHIVE_OK ? std::move(source) : nullptr;
 }
 
@@ -87,6 +88,7 @@ struct Unpacker::Member {
         return libarchive.archive_entry_hardlink(entry) != nullptr ? mode_t{AE_IFREG}
                                                                    : libarchive.archive_entry_filetype(entry);
     }
+    [[nodiscard]] bool isEncrypted() const { return libarchive.archive_entry_is_encrypted(entry) != 0; }
     [[nodiscard]] mode_t mode() const { return libarchive.archive_entry_perm(entry); }
     [[nodiscard]] timespec modified() const {
         if (libarchive.archive_entry_mtime_is_set(entry) == 0) return {0, UTIME_NOW};
@@ -107,7 +109,7 @@ int Unpacker::run(int file, const UnpackLimits& limits) {
     limits_ = limits;
     bytes_ = members_ = folders_ = consumed_ = 0;
     exceeded_ = torn_ = locked_ = false;
-    const auto source = openArchive(file);
+    const auto source = openArchive(file, target_.password);
     const int code = source == nullptr ? static_cast<int>(ORV_ERR_ARCHIVE) : readAll(source.get());
     finishFolders();
     return code;
@@ -118,12 +120,13 @@ int Unpacker::readAll(archive* source) {
         if (progress_.stopped()) return ORV_ERR_NONE;
         archive_entry* entry = nullptr;
         const int result = libarchive.archive_read_next_header(source, &entry);
-        if (result == ARCHIVE_EOF) return locked_ ? ORV_ERR_ARCHIVE_PASSWORD : ORV_ERR_NONE;
+        if (result == ARCHIVE_EOF) return ORV_ERR_NONE;
         if (result == ARCHIVE_RETRY) continue;
         if (result < ARCHIVE_WARN) return members_ == 0 ? ORV_ERR_ARCHIVE : ORV_ERR_ARCHIVE_DATA;
         if (++members_ > limits_.members) return ORV_ERR_FILE_TOO_BIG;
         take(source, entry);
         if (exceeded_) return ORV_ERR_FILE_TOO_BIG;
+        if (locked_) return ORV_ERR_ARCHIVE_PASSWORD;
         if (torn_) return ORV_ERR_ARCHIVE_DATA;
         tellConsumed(source);
     }
@@ -173,7 +176,7 @@ int Unpacker::place(archive* source, Member& member) {
     if (code == ORV_ERR_NONE) code = checkNewName(member.folder, member.name);
     if (code != ORV_ERR_NONE) return code;
     if (libarchive.archive_entry_hardlink(member.entry) != nullptr) return makeHardLink(member);
-    if (libarchive.archive_entry_is_encrypted(member.entry) != 0) return ORV_ERR_ARCHIVE_PASSWORD;
+    if (member.isEncrypted() && target_.password.empty()) return ORV_ERR_ARCHIVE_PASSWORD;
     switch (libarchive.archive_entry_filetype(member.entry)) {
         case AE_IFREG:
             return makeFile(source, member);
@@ -293,7 +296,8 @@ int Unpacker::fill(archive* source, const Member& member, int file) {
         if (result == ARCHIVE_RETRY) continue;
         if (result < ARCHIVE_WARN) {
             torn_ = result == ARCHIVE_FATAL;
-            return ORV_ERR_ARCHIVE_DATA;
+            // One password in a few hundred passes for the right one until the data does not fit.
+            return member.isEncrypted() && !torn_ ? ORV_ERR_ARCHIVE_PASSWORD : ORV_ERR_ARCHIVE_DATA;
         }
         if (progress_.stopped()) return kStopped;
         if (offset < 0 || offset > limits_.bytes - before - static_cast<long long>(size)) {

@@ -30,7 +30,8 @@ struct UnpackLimits {
 // Unpacks zip and tar, these also compressed as a whole, into one folder. Nothing of a member's name or of links in the
 // folder leads out of it; a member appears under its name whole or not at all. What cannot be unpacked is reported,
 // each member for itself, and the rest goes on: names that lead out or may not be used, links that lead out, hard links
-// to what was not unpacked, devices, encrypted members. Names are the bytes that the archive has.
+// to what was not unpacked, devices. At the first member that the password does not open it ends: who asks for the
+// right one then wants the archive once. Names are the bytes that the archive has.
 class Unpacker {
  public:
     struct Target {
@@ -38,11 +39,12 @@ class Unpacker {
         std::string path;  // share-relative
         Conflict conflict;
         Owner owner;
+        std::string password;  // of encrypted members, as bytes; "" for none
     };
     Unpacker(Progress& progress, const Target& target) : progress_(progress), target_(target) {}
 
     // Unpacks the open file. 0, or the library code of why not all could be read: 1401 no archive, 1402 broken, 1403
-    // encrypted members, which are left out, 1007 beyond the limits.
+    // an encrypted member without its password, 1007 beyond the limits.
     int run(int file, const UnpackLimits& limits);
     // The names that were given in the folder.
     [[nodiscard]] const std::set<std::string>& names() const { return names_; }
@@ -80,7 +82,7 @@ class Unpacker {
     std::vector<MadeFolder> madeFolders_;
     long long bytes_ = 0, members_ = 0, folders_ = 0, consumed_ = 0;
     bool exceeded_ = false, torn_ = false;
-    bool locked_ = false;  // a member is encrypted
+    bool locked_ = false;  // the password of a member is not known
 };
 
 }  // namespace orvel::cgi

@@ -43,16 +43,16 @@ function isOutside({ clientX, clientY }, { left, right, top, bottom }) {
 }
 
 // One line of text. `check(text)` gives a complaint or "", `submit(text)` does it and throws what fails.
-export function askText({ title, label, value = "", selectTo = null, action, check = () => "", submit }) {
+export function askText({ title, label, value = "", type = "text", selectTo = null, action, check = () => "", submit }) {
   return dialog({
     title,
     fill: (close) => {
       const input = h("input.input", {
-        type: "text",
+        type,
         value,
         autofocus: true,
         spellcheck: "false",
-        autocomplete: "off",
+        autocomplete: type === "password" ? "new-password" : "off", // none that the browser keeps for this page
         maxlength: 255,
       });
       const complaint = h("span.complaint", { role: "alert" });

@@ -4,7 +4,7 @@
 import { get, post } from "./api.js";
 import { Card } from "./activity.js";
 import { browser, go, refresh } from "./browser.js";
-import { toastFailure } from "./dialogs.js";
+import { askText, toastFailure } from "./dialogs.js";
 import { plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { emit } from "./events.js";
@@ -16,6 +16,7 @@ import { forget, note, noteOf } from "./task_notes.js";
 import { t } from "./strings.js";
 
 const POLL = 600;
+const LOCKED = 1403;
 const ICONS = {
   copy: "copy",
   move: "move",
@@ -153,10 +154,12 @@ function finish(task, card, order) {
   const actions = [
     target && task.items_done > 0 && { label: t("activity.show"), run: () => go(target) },
     again && {
-      label: t("state.retry"),
-      run: () => {
+      label: t(isLocked(task) ? "extract.password.ask" : "state.retry"),
+      run: async () => {
+        const password = isLocked(task) ? await askPassword(again.ids[0]) : undefined;
+        if (password === null) return;
         card.remove();
-        startTask(task.action, again.ids, { ...again, target, bin });
+        startTask(task.action, again.ids, { ...again, params: { ...again.params, password }, target, bin });
       },
     },
   ];
@@ -164,6 +167,20 @@ function finish(task, card, order) {
   if (!document.hidden) note(task.taskid, { seen: true });
   emit("folders-changed", { ids: [...new Set([...order.folders, browser.id])] });
   refresh();
+}
+
+// Whether what failed is an archive whose password is not known.
+const isLocked = (task) => task.action === "extract" && task.errors?.some(({ code }) => code === LOCKED);
+
+function askPassword(id) {
+  return askText({
+    title: t("extract.password.title", { name: nameOf(id) }),
+    label: t("extract.password"),
+    type: "password",
+    action: t("extract.again"),
+    check: (text) => (text === "" ? t("extract.password.empty") : ""),
+    submit: (text) => text,
+  });
 }
 
 // What of a task that did not end well can be tried again, and how: nothing that is done already is done twice. Folders
