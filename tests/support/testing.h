@@ -57,6 +57,13 @@ inline std::string joined(PVLIBCSZLIST list) {
 namespace fs = std::filesystem;
 using namespace support;  // tests alone include this
 
+// The library's function answers this, and leaves this code.
+#define EXPECT_CODE(call, answer, code)  \
+    do {                                 \
+        EXPECT_EQ(call, answer);         \
+        EXPECT_EQ(OrvLibGetErr(), code); \
+    } while (false)
+
 // The platform's operation fails, with this errno and this error number.
 #define EXPECT_FAILS(operation, systemCode, platformCode) \
     do {                                                  \
