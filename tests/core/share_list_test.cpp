@@ -40,8 +40,7 @@ TEST_F(ShareListTest, OnlyTheListsDecide) {
 }
 
 TEST_F(ShareListTest, Failures) {
-    EXPECT_EQ(OrvLibValidShareGen(nullptr, 0, 0), nullptr);
-    EXPECT_EQ(OrvLibGetErr(), 401);
+    EXPECT_CODE(OrvLibValidShareGen(nullptr, 0, 0), nullptr, 401);
     EXPECT_EQ(takeLogText(), "orveldir(#) bad parameter");
     for (const auto& [operation, log] :
          Rows<const char*, const char*>{{"VLIBCSzListAlloc", "orveldir(#) malloc fail"},

@@ -47,8 +47,7 @@ TEST_F(UploadCheckTest, MoveGivesTheFileToItsUser) {
 
     writeFile(source, "data", 0600);
     announceLog("reason=[A400]");
-    EXPECT_FALSE(MoveFile("alice", source.c_str(), (target + "2").c_str(), [] { return 1; }));
-    EXPECT_EQ(OrvLibGetErr(), 1804);
+    EXPECT_CODE(MoveFile("alice", source.c_str(), (target + "2").c_str(), [] { return 1; }), false, 1804);
     EXPECT_NE(access((target + "2").c_str(), F_OK), 0);
 }
 
@@ -79,23 +78,19 @@ TEST_F(UploadCheckTest, CheckedInOrder) {
             EXPECT_EQ(geteuid() != 0, switched);
             EXPECT_EQ(static_cast<int>(changed), after);
             EXPECT_NE(takeLogText().find(log), std::string::npos) << log;
-            return 0;
         });
     }
 }
 
 // The look-up of permissions can fail without a code; what was stored before is answered then, but never "acceptable".
 TEST_F(UploadCheckTest, ARefusalIsNeverZero) {
-    for (const int before : {0, 7}) {
-        inChild([&] {
+    for (const auto& [before, answer, log] : Rows<int, int, const char*>{{0, 401, "reason=[191]"}, {7, 7, "=[7]"}}) {
+        inChild([before = before, answer = answer, log = log] {
             OrvLibSetErr(before);
             vexo::gate::fail("VEXOACLPermGet", VEXO_ERR_GENERAL);
             auto mode = kError;
-            const int expected = before == 0 ? 401 : before;
-            EXPECT_EQ(CheckFile("/photo/a", "alice", nullptr, mode), expected);
-            EXPECT_EQ(OrvLibGetErr(), expected);
-            EXPECT_TRUE(takeLogText().ends_with(before == 0 ? "reason=[191]" : "reason=[7]"));
-            return 0;
+            EXPECT_EQ(CheckFile("/photo/a", "alice", nullptr, mode), answer);
+            EXPECT_TRUE(OrvLibGetErr() == answer && takeLogText().ends_with(log));
         });
     }
 }
@@ -111,7 +106,6 @@ TEST_F(UploadCheckTest, ASwitchThatLeavesRootIsRefused) {
         const std::string log = takeLogText();
         EXPECT_NE(log.find("left the process at uid 0"), std::string::npos) << log;
         EXPECT_NE(log.find("Failed to set UGID for user=toor, sid=(null)"), std::string::npos) << log;
-        return 0;
     });
 }
 

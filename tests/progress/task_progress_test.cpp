@@ -49,7 +49,6 @@ class TaskProgress : public support::ApplianceTest {
         pauses = 0;
         duringPause = nullptr;
         stoppedClock = 0;
-        vexo::gate::reset();
     }
     static std::unique_ptr<KTR::Task> make(const std::string& name) {
         return std::unique_ptr<KTR::Task>(KTR::TaskMgr("alice").createTask(name.c_str()));
@@ -68,13 +67,10 @@ class TaskProgress : public support::ApplianceTest {
 TEST_F(TaskProgress, WaitsAreCounted) {
     const auto task = make("x");
     ASSERT_NE(task, nullptr);
-    struct {
-        unsigned limit;
-        int readyAfter;  // pauses, -1 never
-        bool ready;
-        int checks, pauses;
-    } const cases[] = {{0, 0, false, 0, 0},   {10, -1, false, 1, 1}, {10, 0, true, 1, 0},  {10, 1, false, 1, 1},
-                       {25, -1, false, 3, 3}, {25, 2, true, 3, 2},   {25, 3, false, 3, 3}, {1, -1, false, 1, 1}};
+    // The limit, after how many pauses (-1: never) it is ready, whether that is seen, checks and pauses.
+    const std::tuple<unsigned, int, bool, int, int> cases[] = {
+        {0, 0, false, 0, 0},   {10, -1, false, 1, 1}, {10, 0, true, 1, 0},  {10, 1, false, 1, 1},
+        {25, -1, false, 3, 3}, {25, 2, true, 3, 2},   {25, 3, false, 3, 3}, {1, -1, false, 1, 1}};
     const std::function<bool(unsigned)> waits[] = {
         [&](unsigned limit) { return WaitForTaskDataReady(task.get(), "data", limit); },
         [&](unsigned limit) { return WaitForTaskDataKeyReady(task.get(), "data", "key", limit); }};
@@ -215,7 +211,6 @@ TEST_F(TaskProgress, OnlyAProcessThatIsThereIsStopped) {
     support::asUser(support::kAliceUid, support::kUsersGid, [ours] {
         support::announceLog("Failed to kill " + std::to_string(ours) + ", reason=Operation not permitted(1)");
         EXPECT_FALSE(DoKill(ours));
-        return 0;
     });
 }
 

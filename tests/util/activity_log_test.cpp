@@ -40,12 +40,9 @@ TEST_F(ActivityLog, Entries) {
         const Json::Value line = entry();
         ASSERT_EQ(line.isNull(), texts[action] == nullptr);
         if (line.isNull()) continue;
-        EXPECT_EQ(line["action"], texts[action]);
-        EXPECT_EQ(line["flag"], flag);
-        EXPECT_EQ(line["address"], "192.0.2.7");
-        EXPECT_EQ(line["user"], "DOM\\al");
-        EXPECT_EQ(line["path"], "/photo/%s%n\n");
-        EXPECT_EQ(line["size"].asInt64(), 5000000000LL);
+        EXPECT_TRUE(line["action"] == texts[action] && line["flag"] == flag) << line;
+        EXPECT_TRUE(line["user"] == "DOM\\al" && line["address"] == "192.0.2.7") << line;
+        EXPECT_TRUE(line["path"] == "/photo/%s%n\n" && line["size"].asInt64() == 5000000000LL) << line;
     }
 }
 
