@@ -142,7 +142,6 @@ TEST_F(AccountTest, UnreadableFilesAreAFailure) {
         EXPECT_EQ(VEXOGroupIsAdminGroupMem("carol"), -1);
         EXPECT_TRUE(VEXOUserDBOpen() == nullptr && VEXOGroupDBOpen() == nullptr);
         EXPECT_FALSE(isIn("bob", {"@users"}));
-        return 0;
     });
 }
 
@@ -162,10 +161,8 @@ TEST_F(AccountTest, ExpiryIsReadAsRootAfterTheSwitch) {
     writeRootFile("/etc/shadow", "alice:x:1:0:9:7::77:\n");
     chmod((systemRoot() + "/etc/shadow").c_str(), 0600);
     actingForAlice([] { EXPECT_TRUE(userOf("alice").ends_with(" 77")); });
-    asUser(kBobUid, kUsersGid, [] {
-        EXPECT_TRUE(userOf("alice").ends_with(" -1")) << "unknown without the right to look";
-        return 0;
-    });
+    asUser(kBobUid, kUsersGid,
+           [] { EXPECT_TRUE(userOf("alice").ends_with(" -1")) << "unknown without the right to look"; });
     const long today = time(nullptr) / 86400;
     for (const long expiry : {-1L, today + 2}) EXPECT_EQ(VEXOUserIsExpired(expiry), 0);
     for (const long expiry : {0L, today}) EXPECT_EQ(VEXOUserIsExpired(expiry), 1);
@@ -174,13 +171,10 @@ TEST_F(AccountTest, ExpiryIsReadAsRootAfterTheSwitch) {
 TEST_F(AccountTest, Administrators) {
     addGroup("Managers", 20180, {"bob"});
     addUser("primary", 20014, kAdminGid);
-    for (const auto& [user, group, answer] : Rows<const char*, const char*, int>{{"alice", nullptr, 0},
-                                                                                 {"carol", nullptr, 1},
-                                                                                 {"primary", nullptr, 1},
-                                                                                 {"nobody known", nullptr, -1},
-                                                                                 {"bob", "Managers", 1},
-                                                                                 {"carol", "Managers", 0},
-                                                                                 {"carol", "no such", 0}}) {
+    for (const auto& [user, group, answer] : Rows<const char*, const char*, int>{
+             row("alice", nullptr, 0), row("carol", nullptr, 1), row("primary", nullptr, 1),
+             row("nobody known", nullptr, -1), row("bob", "Managers", 1), row("carol", "Managers", 0),
+             row("carol", "no such", 0)}) {
         if (group != nullptr) setSetting("admin_group", group);
         EXPECT_EQ(VEXOGroupIsAdminGroupMem(user), answer) << user;
         EXPECT_TRUE(answer >= 0 || VLIBCErrGet() == VEXO_ERR_USER_MISSING);
@@ -216,13 +210,9 @@ TEST_F(AccountTest, Applications) {
     EXPECT_EQ(VLIBUserPrivilegeHas("alice", "any"), 1) << "no file";
     writeRootFile("/etc/vexo/applications", "files: alice @administrators\nnobodys:\nforgotten bob\n");
     announceLog("line 3 of /etc/vexo/applications has no \"identifier:\"");
-    for (const auto& [user, application, answer] : Rows<const char*, const char*, int>{{"alice", "files", 1},
-                                                                                       {"carol", "files", 1},
-                                                                                       {"bob", "files", 0},
-                                                                                       {"bob", "FILES", 1},
-                                                                                       {"alice", "nobodys", 0},
-                                                                                       {"bob", "forgotten", 0},
-                                                                                       {"", "other", 0}}) {
+    for (const auto& [user, application, answer] : Rows<const char*, const char*, int>{
+             row("alice", "files", 1), row("carol", "files", 1), row("bob", "files", 0), row("bob", "FILES", 1),
+             row("alice", "nobodys", 0), row("bob", "forgotten", 0), row("", "other", 0)}) {
         EXPECT_EQ(VLIBUserPrivilegeHas(user, application), answer) << user << application;
     }
     writeRootFile("/etc/vexo/applications", "files: bob\n");
@@ -236,8 +226,8 @@ TEST_F(AccountTest, Applications) {
 TEST_F(AccountTest, ReadErrorsThatPassAreNoAnswer) {
     const std::string applications = "/etc/vexo/applications";
     writeRootFile(applications, "files: alice @administrators\n");
-    for (const auto& [error, times, passes] :
-         Rows<int, int, bool>{{EIO, 1, true}, {EIO, 2, true}, {ENOMEM, 2, true}, {EIO, 3, false}, {EACCES, 1, false}}) {
+    for (const auto& [error, times, passes] : Rows<int, int, bool>{
+             row(EIO, 1, true), row(EIO, 2, true), row(ENOMEM, 2, true), row(EIO, 3, false), row(EACCES, 1, false)}) {
         SCOPED_TRACE(std::to_string(error) + " " + std::to_string(times));
         for (const char* file : {"/etc/passwd", "/etc/group", "/etc/vexo/applications"}) {
             fs::last_write_time(systemRoot() + file, fs::file_time_type::clock::now() - std::chrono::hours(times));

@@ -4,9 +4,10 @@
 #include <sys/wait.h>
 
 #include <chrono>
-#include <csignal>
 
+#include "support/race.h"
 #include "support/testing.h"
+#include "support/wait.h"
 
 namespace {
 
@@ -32,48 +33,48 @@ TEST_F(CriticalSection, TheTimeIsKeptAndASweptFolderToo) {
         EXPECT_GE(Clock::now() - begin, milliseconds(std::max(limit, 0)));
     }
     // Who waits for a lock file that was replaced must not go in beside who holds the new one.
+    const std::string lock = systemRoot() + kLock, left = systemRoot() + "/tmp/left";
     const pid_t waiter = fork();
-    if (waiter == 0) _exit(VexoCgiBeginCriticalSection(kLock, 300) == -1 ? 0 : 1);
+    if (waiter == 0) _exit(VexoCgiBeginCriticalSection(kLock, 60000) >= 0 && fs::exists(left) ? 0 : 1);
+    const auto hasOpen = [&](int count) {
+        return waitUntil("who waits to open the lock", [&] {
+            std::error_code gone;
+            const auto isLock = [&](const fs::path& fd) { return fs::read_symlink(fd, gone) == lock; };
+            const fs::directory_iterator open("/proc/" + std::to_string(waiter) + "/fd", gone);
+            return std::count_if(open, {}, isLock) == count;
+        });
+    };
+    EXPECT_TRUE(hasOpen(2)) << "beside the one that it has from here";
     const int second = VexoCgiBeginCriticalSection("/tmp/new.lock", 0);
     EXPECT_GE(second, 0);
-    fs::rename(systemRoot() + "/tmp/new.lock", systemRoot() + kLock);
+    fs::rename(systemRoot() + "/tmp/new.lock", lock);
     errno = EDOM;
     VexoCgiEndCriticalSection(handle);
     VexoCgiEndCriticalSection(-1);
     EXPECT_EQ(errno, EDOM);
-    int status = 0;
-    waitpid(waiter, &status, 0);
-    EXPECT_EQ(status, 0);
+    EXPECT_TRUE(hasOpen(1)) << "the new one";
+    writeFile(left, "");
     VexoCgiEndCriticalSection(second);
+    int status = 0;
+    EXPECT_EQ(waitpid(waiter, &status, 0), waiter);
+    EXPECT_EQ(status, 0);
     EXPECT_FAILS(VexoCgiBeginCriticalSection("/none/lock", 10), ENOENT, VEXO_ERR_FILE);
 }
 
 // Who is inside marks it by a folder, which nobody else may find there.
 TEST_F(CriticalSection, SixtyFourProcessesAllGetInOneAtATime) {
     const std::string mark = systemRoot() + "/tmp/inside";
-    for (int process = 0; process < 64; ++process) {
-        if (fork() != 0) continue;
+    const auto enters = [&] {
         for (int time = 0; time < 3; ++time) {
             const int handle = VexoCgiBeginCriticalSection(kLock, 30000);
-            if (handle < 0 || mkdir(mark.c_str(), 0700) != 0) _exit(1);
+            if (handle < 0 || mkdir(mark.c_str(), 0700) != 0) return false;
             usleep(2000);
             rmdir(mark.c_str());
             VexoCgiEndCriticalSection(handle);
         }
-        _exit(0);
-    }
-    for (int status = 0; wait(&status) > 0;) EXPECT_EQ(status, 0);
-}
-
-TEST_F(CriticalSection, DeathFreesIt) {
-    const pid_t holder = fork();
-    if (holder == 0) _exit(VexoCgiBeginCriticalSection(kLock, 0) >= 0 ? raise(SIGKILL) : 1);
-    int status = 0;
-    waitpid(holder, &status, 0);
-    EXPECT_TRUE(WIFSIGNALED(status));
-    const int handle = VexoCgiBeginCriticalSection(kLock, 0);
-    EXPECT_GE(handle, 0);
-    VexoCgiEndCriticalSection(handle);
+        return true;
+    };
+    EXPECT_EQ(countAtOnce(64, enters), 64);
 }
 
 }  // namespace

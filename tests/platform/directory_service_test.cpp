@@ -41,12 +41,13 @@ class DirectoryServiceTest : public ApplianceTest {
 TEST_F(DirectoryServiceTest, PrivilegesAndUsableSharesComeFromTheLists) {
     for (const Service& service : kServices) {
         for (const auto& [share, answer] : Rows<const char*, const char*>{
-                 {"zoo", "0 0 2"}, {"all", "0 0 1"}, {"closed", "0 0 0"}, {"hidden", "0 0 2"}})
+                 row("zoo", "0 0 2"), row("all", "0 0 1"), row("closed", "0 0 0"), row("hidden", "0 0 2")})
             EXPECT_EQ(privilege(service, share, service.user), answer) << share;
-        EXPECT_EQ(privilege(service, "none", service.user), "-1 0 7");
-        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_SHARE_MISSING);
-        EXPECT_EQ(privilege(service, "all", "X\\y"), "-1 0 7");
-        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_USER_MISSING);
+        for (const auto& [share, user, code] : Rows<const char*, const char*, int>{
+                 {"none", service.user, VEXO_ERR_SHARE_MISSING}, {"all", "X\\y", VEXO_ERR_USER_MISSING}}) {
+            EXPECT_EQ(privilege(service, share, user), "-1 0 7");
+            EXPECT_EQ(VLIBCErrGet(), code);
+        }
         EXPECT_EQ(shares(service, service.user), "Zoo|all|");
         EXPECT_EQ(shares(service, service.user, 1), "all|Zoo|");
         EXPECT_EQ(shares(service, service.user, 0, 1), "Zoo|");
@@ -70,7 +71,6 @@ TEST_F(DirectoryServiceTest, FailingLookups) {
             EXPECT_EQ(privilege(service, "all", service.user), "-2 " + std::to_string(EACCES) + " 7");
             EXPECT_EQ(shares(service, service.user), "null");
         }
-        return 0;
     });
 }
 

@@ -7,12 +7,7 @@ class PlatformBasics : public ApplianceTest {};
 
 TEST_F(PlatformBasics, Lists) {
     PVLIBCSZLIST list = VLIBCSzListAlloc(-5);
-    for (int i = 1; i <= 3000; ++i) ASSERT_EQ(VLIBCSzListPush(&list, std::to_string(i).c_str()), i);
-    EXPECT_STREQ(VLIBCSzListGet(list, 2999), "3000");
-    for (const int outside : {3000, -1}) EXPECT_EQ(VLIBCSzListGet(list, outside), nullptr);
-    VLIBCSzListFree(list);
     // Cut at each of the separators. Ascending without case, ties by bytes; other options leave the order.
-    list = VLIBCSzListAlloc(0);
     char text[] = "/b/;\xC3\xA9t\xC3\xA9/B//a b/\xFFz/\xC3\x89T\xC3\x89;A2", nothing[] = "//", again[] = "a/b";
     EXPECT_EQ(VLIBCStrTok(text, "/;", &list), 7);
     VLIBCSzListSortItems(list, 1);
@@ -23,6 +18,7 @@ TEST_F(PlatformBasics, Lists) {
     vexo::gate::fail("VLIBCSzListPush", VEXO_ERR_GENERAL, ENOMEM, 2);
     EXPECT_EQ(VLIBCStrTok(again, "/", &list), -1);
     EXPECT_EQ(errno, ENOMEM);
+    for (const int outside : {8, -1}) EXPECT_EQ(VLIBCSzListGet(list, outside), nullptr);
     VLIBCSzListFree(list);
 }
 

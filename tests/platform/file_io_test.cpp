@@ -1,4 +1,4 @@
-// What the platform's files rely on: limits, and knowing a version again.
+// What the platform's files rely on: knowing a version again.
 #include "io/file_io.h"
 
 #include "support/testing.h"
@@ -13,19 +13,6 @@ class FileIo : public ApplianceTest {
         writeFile(path("a"), "0123456789", 0600);
     }
 };
-
-TEST_F(FileIo, ReadStopsAtTheLimitAndAtAnythingButAFile) {
-    ASSERT_EQ(mkfifo(path("pipe").c_str(), 0600), 0);
-    for (const auto& [name, limit, systemCode] :
-         Rows<const char*, size_t, int>{{"a", 10, 0}, {"a", 9, EFBIG}, {"pipe", 10, EINVAL}, {"none", 10, ENOENT}}) {
-        std::string text = "before";
-        vexo::FileVersion version;
-        errno = 0;
-        EXPECT_EQ(vexo::readRegularFile(path(name), limit, text, version), systemCode == 0);
-        EXPECT_EQ(errno, systemCode);
-        EXPECT_TRUE(systemCode != 0 || text == "0123456789");
-    }
-}
 
 TEST_F(FileIo, AVersionIsKnownAgainUntilTheFileChanges) {
     const auto age = [](const char* name) {

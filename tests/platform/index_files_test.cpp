@@ -91,14 +91,11 @@ TEST_F(IndexFilesTest, DamagedDatabasesDoNoHarm) {
 
 // A search that has nothing more to insert for long, and is killed then.
 TEST_F(IndexFilesTest, ResultsAreSeenWhileTheSearchGoesOnAndAfterItDies) {
-    const std::string ready = folder_ + "/ready";
     const pid_t child = fork();
     if (child == 0) {
         for (int i = 0; i < 1000; ++i) insert(db_, {.path = "a" + std::to_string(i)});
-        writeFile(ready, "");
         pause();
     }
-    EXPECT_TRUE(waitUntil("the writer", [&] { return fs::exists(ready); }));
     EXPECT_TRUE(waitUntil("all its results", [&] { return select(db_).size() == 1000; }));
     kill(child, SIGKILL);
     waitpid(child, nullptr, 0);
@@ -118,7 +115,6 @@ TEST_F(IndexFilesTest, HalfACommitIsTakenBack) {
             EXPECT_EQ(sqlite3_open(file.c_str(), &db), SQLITE_OK);
             constexpr const char* half = "PRAGMA cache_size=1;BEGIN;UPDATE record SET size=2";
             EXPECT_EQ(sqlite3_exec(db, half, nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
-            return 0;
         });
         EXPECT_TRUE(fs::exists(file + "-journal"));
     }
@@ -134,7 +130,6 @@ TEST_F(IndexFilesTest, AForkedChildHasConnectionsOfItsOwn) {
     EXPECT_EQ(inChild([&] {
                   const bool done = select(db_).size() == 1 && insert(db_, {"child"}) == 0;
                   exit(done ? 5 : 1);  // through the handlers of exit
-                  return 0;
               }),
               5);
     ASSERT_EQ(insert(db_, {"parent again"}), 0);
@@ -143,19 +138,14 @@ TEST_F(IndexFilesTest, AForkedChildHasConnectionsOfItsOwn) {
 
 TEST_F(IndexFilesTest, AFullDiskTakesTheBatchBackAndNothingElse) {
     EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
-        const std::string small = folder_ + "/small";
-        makeFolder(small);
-        if (mount("none", small.c_str(), "tmpfs", 0, "size=2m") != 0) return kNoPrivateMounts;
-        const std::string db = small + "/db";
-        EXPECT_EQ(FILEIDXDBCreate(db.c_str()), 0);
-        EXPECT_EQ(insert(db, {"first"}), 0);
-        EXPECT_EQ(FILEIDXDBFlush(db.c_str()), 0);
-        bool full = false;
-        for (int i = 0; i < 40000 && !full; ++i) {
-            full =
-                insert(db, {.path = "p" + std::to_string(i)}) < 0 || (i % 1000 == 0 && FILEIDXDBFlush(db.c_str()) < 0);
+        if (mount("none", folder_.c_str(), "tmpfs", 0, "size=2m") != 0) return kNoPrivateMounts;
+        const std::string db = folder_ + "/small";
+        EXPECT_TRUE(FILEIDXDBCreate(db.c_str()) == 0 && insert(db, {"first"}) == 0 && FILEIDXDBFlush(db.c_str()) == 0);
+        int added = 0;
+        while (added < 40000 && insert(db, {.path = "p" + std::to_string(added)}) == 0 &&
+               (++added % 1000 != 0 || FILEIDXDBFlush(db.c_str()) == 0)) {
         }
-        EXPECT_TRUE(full);
+        EXPECT_LT(added, 40000);
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_NO_SPACE);
         EXPECT_EQ(errno, ENOSPC);
         const Addresses left = select(db);
@@ -166,7 +156,6 @@ TEST_F(IndexFilesTest, AFullDiskTakesTheBatchBackAndNothingElse) {
 
 TEST_F(IndexFilesTest, AnIndexIsReplacedAsAWholeByOneAtATime) {
     FIINDEXSTATUS status{};
-    EXPECT_EQ(FILEIDXIsIndexEnable("photo"), 0);
     EXPECT_FAILS(FILEIDXIndexStatus("photo", &status), ENOENT, VEXO_ERR_MISSING);
     EXPECT_FAILS(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path_, sizeof path_), ENOENT, VEXO_ERR_MISSING);
     EXPECT_FAILS(FILEIDXIndexBegin("photo", FI_INDEX_BUILD, path_, 20), EINVAL, VEXO_ERR_PARAMETER);
@@ -183,10 +172,8 @@ TEST_F(IndexFilesTest, AnIndexIsReplacedAsAWholeByOneAtATime) {
             EXPECT_LT(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path_, sizeof path_), 0);
             EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_EXISTS);
             EXPECT_LT(FILEIDXIndexDrop("photo"), 0);
-            return 0;
         });
         EXPECT_TRUE(insert(path_, {"half"}) == 0 && FILEIDXDBFlush(path_) == 0);
-        return 0;
     });
     EXPECT_EQ(files(), 2);
     ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_BUILD, path_, sizeof path_), 0);
@@ -221,46 +208,6 @@ TEST_F(IndexFilesTest, AnUpdateKeepsNamesFindable) {
     Cond quoted = node(FI_COL_NAME, FI_OP_WILDCARD, "*\"holiday\"*");
     EXPECT_EQ(searched(&quoted), Addresses{"photo:c/\"HOLIDAY\".gif"});
     ASSERT_EQ(FILEIDXIndexEnd("photo", 1), 0);
-}
-
-struct Asked {
-    std::string folders, files;
-    int cancel = 0;
-};
-
-BOOL seesFolder(const char* folder, void* argument) {
-    static_cast<Asked*>(argument)->folders += std::string(folder) + "|";
-    return geteuid() == kAliceUid && strcmp(folder, "secret") != 0 ? 1 : 0;
-}
-
-BOOL wasRead(Data* data, void* argument) {
-    auto* asked = static_cast<Asked*>(argument);
-    asked->files += std::string(data->szPath) + "|";
-    data->accessed = 77;
-    if (strcmp(data->szName, "stop") == 0) asked->cancel = 1;
-    return geteuid() == kAliceUid ? 1 : 0;
-}
-
-TEST_F(IndexFilesTest, ASearchAsksWithTheCallersIdentity) {
-    SKIP_WITHOUT_ROOT();
-    build({{"open/a"}, {"open/b"}, {"secret/c"}, {"stop"}, {"never asked"}});
-    actingForAlice([&] {
-        const std::string out = folder_ + "/alice";
-        Asked asked;
-        Cond read = node(FI_COL_ACCESS_TIME, FI_OP_LESS, "0");
-        EXPECT_EQ(FILEIDXDBCreate(out.c_str()), 0);
-        EXPECT_EQ(FILEIDXIsIndexEnable("photo"), 1);
-        for (int time = 0; time < 2; ++time) {  // the second one is stopped from the begin, which is no failure
-            EXPECT_EQ(FILEIDXResultGetAndTableGen("photo", nullptr, &read, out.c_str(), wasRead, &asked, &asked.cancel,
-                                                  seesFolder, &asked),
-                      0);
-            EXPECT_EQ(asked.folders, "open|open|secret||");
-            EXPECT_EQ(asked.files, "open/a|open/b|stop|");
-        }
-        Cond seen = node(FI_COL_ACCESS_TIME, FI_OP_EQUAL, "77");
-        EXPECT_EQ(select(out, &seen), (Addresses{"photo:open/a", "photo:open/b", "photo:stop"}));
-        EXPECT_EQ(statusOf(out).st_uid, kAliceUid);
-    });
 }
 
 }  // namespace

@@ -27,11 +27,9 @@ TEST_F(LanguageTest, TablesOfTexts) {
     writeRootFile("/usr/vexo/texts/de/filetable.conf", "name=\"Gr\xC3\xB6\xC3\x9F\x65\"\n");
     writeRootFile("/usr/vexo/texts/en/other.conf", "a=b\n");
     setSetting("language", "de");
-    for (const auto& [wanted, module, key, text] :
-         Rows<const char*, const char*, const char*, const char*>{{"en-GB", "filetable", "say", "\"Hi\""},
-                                                                  {"", "filetable", "name", "Gr\xC3\xB6\xC3\x9F\x65"},
-                                                                  {"", "filetable", "say", nullptr},
-                                                                  {"de", "other", "a", "b"}}) {
+    for (const auto& [wanted, module, key, text] : Rows<const char*, const char*, const char*, const char*>{
+             row("en-GB", "filetable", "say", "\"Hi\""), row("", "filetable", "name", "Gr\xC3\xB6\xC3\x9F\x65"),
+             row("", "filetable", "say", nullptr), row("de", "other", "a", "b")}) {
         setenv("HTTP_ACCEPT_LANGUAGE", wanted, 1);
         PVEXOSTRINGS bundle = VexoCgiStringBundleOpen(module);
         EXPECT_STREQ(VexoCgiStringBundleGet(bundle, key), text) << module;

@@ -2,12 +2,10 @@
 #include "vexo/line_file.h"
 
 #include <sys/mount.h>
-#include <sys/wait.h>
-
-#include <csignal>
 
 #include "platform/private_mounts.h"
 #include "platform/trust.h"
+#include "support/race.h"
 #include "vexo/critical_section.h"
 
 namespace {
@@ -27,16 +25,11 @@ class LineFile : public ApplianceTest {
 TEST_F(LineFile, AKeyIsAWholeFieldOfALine) {
     using namespace std::string_literals;
     writeFile(file_, "10.0.0.1,alice,AB,1\nnul\0,CD\n\n,,AB2\r\n10.0.0.2,bob,AB\r\nlast;EF"s, 0600);
-    for (const auto& [key, separators, size, expected, text] :
-         Rows<const char*, const char*, int, int, const char*>{{"AB", ",", 64, 1, "10.0.0.1,alice,AB,1"},
-                                                               {"AB2", ",", 64, 1, ",,AB2"},
-                                                               {"bob", ",", 5, 1, "10.0"},
-                                                               {"A", ",", 64, 0, ""},
-                                                               {"EF", ",;", 64, 1, "last;EF"},
-                                                               {"last;EF", "", 64, 1, "last;EF"},
-                                                               {"CD", ",", 64, 0, ""},
-                                                               {"10.0.0.1,alice,AB", ",", 64, 0, ""},
-                                                               {"", ",", 64, -1, "?"}}) {
+    for (const auto& [key, separators, size, expected, text] : Rows<const char*, const char*, int, int, const char*>{
+             row("AB", ",", 64, 1, "10.0.0.1,alice,AB,1"), row("AB2", ",", 64, 1, ",,AB2"),
+             row("bob", ",", 5, 1, "10.0"), row("A", ",", 64, 0, ""), row("EF", ",;", 64, 1, "last;EF"),
+             row("last;EF", "", 64, 1, "last;EF"), row("CD", ",", 64, 0, ""), row("10.0.0.1,alice,AB", ",", 64, 0, ""),
+             row("", ",", 64, -1, "?")}) {
         char line[64] = "?";
         EXPECT_EQ(VLIBCFileGetLine(kFile, key, line, size, separators), expected) << key;
         EXPECT_STREQ(line, text) << key;
@@ -85,21 +78,16 @@ TEST_F(LineFile, PlantedFilesAreRefusedAtOnce) {
 // Who looks for a line holds no lock while a check renames its rewrite onto the file.
 TEST_F(LineFile, AFileThatIsReplacedMeanwhileIsReadAllTheSame) {
     writeFile(file_, "a,b\n", 0600);
-    const pid_t replacer = fork();
-    if (replacer == 0) {
-        const std::string rewrite = file_ + ".tmp";
-        do {
-            writeFile(rewrite, "a,b\n", 0600);
-        } while (rename(rewrite.c_str(), file_.c_str()) == 0);
-        _exit(1);
-    }
+    const std::string rewrite = file_ + ".tmp";
+    const Rival replacer([&] {
+        writeFile(rewrite, "a,b\n", 0600);
+        if (rename(rewrite.c_str(), file_.c_str()) != 0) _exit(1);
+    });
     int missed = 0;
     for (int i = 0; i < 20000; ++i) {
         char line[8];
         missed += VLIBCFileGetLine(kFile, "b", line, sizeof line, ",") == 1 ? 0 : 1;
     }
-    kill(replacer, SIGKILL);
-    waitpid(replacer, nullptr, 0);
     EXPECT_EQ(missed, 0);
 }
 

@@ -1,9 +1,8 @@
 // The link database: whole before it has its name, trusted or not used.
 #include "vexo/link_store.h"
 
-#include <sys/wait.h>
-
 #include "platform/trust.h"
+#include "support/race.h"
 #include "support/refuse_calls.h"
 
 namespace {
@@ -12,14 +11,7 @@ class LinkStoreTest : public ApplianceTest {
  protected:
     // Adds a link with a store of its own; its identifier, "" on failure.
     static std::string add(const std::string& path) {
-        VEXO::Link link = {.id = "",
-                           .owner = "alice",
-                           .uid = kAliceUid,
-                           .path = path,
-                           .passwordHash = "hash",
-                           .available = 0,
-                           .expires = 7,
-                           .created = 0};
+        VEXO::Link link{"", "alice", kAliceUid, path, "hash", 0, 7, 0};
         VEXO::LinkStore store;
         return store.add(link) ? link.id : "";
     }
@@ -69,16 +61,7 @@ TEST_F(LinkStoreTest, AFirstLinkThatFailsLeavesNothingBroken) {
 }
 
 TEST_F(LinkStoreTest, ManyMakeItAtOnce) {
-    std::vector<pid_t> children;
-    for (int i = 0; i < 8; ++i) {
-        children.push_back(fork());
-        if (children.back() == 0) _exit(add("/photo") == "" ? 1 : 0);
-    }
-    for (const pid_t child : children) {
-        int status = 0;
-        EXPECT_EQ(waitpid(child, &status, 0), child);
-        EXPECT_EQ(status, 0);
-    }
+    EXPECT_EQ(countAtOnce(8, [] { return !add("/photo").empty(); }), 8);
     EXPECT_EQ(paths().size(), 8 * sizeof "/photo");
 }
 

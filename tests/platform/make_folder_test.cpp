@@ -4,6 +4,7 @@
 
 #include <chrono>
 
+#include "support/race.h"
 #include "support/refuse_calls.h"
 #include "support/testing.h"
 #include "vexo/filesystem.h"
@@ -116,7 +117,6 @@ TEST_F(MakeFolderTest, FirstRequestsAtOnceAllFindTheirHome) {
         for (const auto& entry : fs::directory_iterator(homes)) fs::remove_all(entry.path());
     }
     EXPECT_EQ(refused, 0);
-    printf("%d homes, %d requests, %d refused\n", made, made * 8, refused);
 }
 
 // Whenever a process is killed: nobody sees what it left, and the next one ends its work.
@@ -127,11 +127,7 @@ TEST_F(MakeFolderTest, WhatAKilledProcessLeftIsEndedByTheNext) {
         SCOPED_TRACE(call);
         fs::remove_all(homes + "/@CORP");
         makeFolder(homes + "/@CORP");
-        const pid_t child = fork();
-        if (child == 0) _exit(refuseCalls({{call, kKilled}}) ? useHome(home) : 5);
-        int status = 0;
-        ASSERT_EQ(waitpid(child, &status, 0), child);
-        EXPECT_TRUE(WIFSIGNALED(status)) << "went on with " << status;
+        expectKilled([&] { return refuseCalls({{call, kKilled}}) ? useHome(home) : 0; });
         EXPECT_TRUE(shownIn(homes + "/@CORP").empty());
         EXPECT_EQ(inChild([&] { return useHome(home); }), 0);
         EXPECT_EQ(std::distance(fs::directory_iterator(homes + "/@CORP"), {}), 1) << "and nothing else is left";

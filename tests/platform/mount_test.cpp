@@ -98,16 +98,12 @@ TEST_F(MountTest, VolumesAndTheirKinds) {
     const std::string internal = " " + std::to_string(VEXO_VOLUME_INTERNAL);
     writeRootFile("/etc/vexo/volumes",
                   "# removable\n/volumeUSB1 4\n/volumeSATA esata\n/mnt/deep/ usb\n/torn\n/volumeX what\n");
-    for (const auto& [path, volume] : Rows<std::string, std::string>{{"/volume1/photo/a", "/volume1" + internal},
-                                                                     {"/volumeUSB1", "/volumeUSB1 4"},
-                                                                     {"/volumeUSB12/share", "/volumeUSB12" + internal},
-                                                                     {"/volumeSATA/x", "/volumeSATA 8"},
-                                                                     {"/mnt/deep/share", "/mnt 4"},
-                                                                     {"/mnt/other", "/mnt" + internal},
-                                                                     {"/volumeX/a", "/volumeX" + internal},
-                                                                     {"/", "/" + internal},
-                                                                     {"volume1/a", refused},
-                                                                     {longOne, refused}})
+    for (const auto& [path, volume] : Rows<std::string, std::string>{
+             row("/volume1/photo/a", "/volume1" + internal), row("/volumeUSB1", "/volumeUSB1 4"),
+             row("/volumeUSB12/share", "/volumeUSB12" + internal), row("/volumeSATA/x", "/volumeSATA 8"),
+             row("/mnt/deep/share", "/mnt 4"), row("/mnt/other", "/mnt" + internal),
+             row("/volumeX/a", "/volumeX" + internal), row("/", "/" + internal), row("volume1/a", refused),
+             row(longOne, refused)})
         EXPECT_EQ(text(path.c_str()), volume) << path;
     // Anything but a regular file is no volumes file, and a pipe's writer is not waited for.
     const std::string file = systemRoot() + "/etc/vexo/volumes";

@@ -3,6 +3,7 @@
 
 #include "settings/settings_text.h"
 #include "support/testing.h"
+#include "vexo/ddns.h"
 
 namespace {
 
@@ -38,28 +39,20 @@ TEST_F(Settings, ValuesAndFailures) {
     writeRootFile("/etc/x.conf", "a=\"Hello\"\na=\"second\"\nempty=\"\"\nname=\"\xC3\x89T\xC3\x89\"\n");
     writeRootFile("/etc/huge.conf", "a=1\n");
     ASSERT_EQ(truncate((systemRoot() + "/etc/huge.conf").c_str(), (16 << 20) + 1), 0);
-    for (const auto& [file, key, size, expected] :
-         Rows<const char*, const char*, int, std::string>{{"/etc/x.conf", "a", 6, "1 Hello"},
-                                                          {"/etc/x.conf", "a", 4, "1 Hel"},
-                                                          {"/etc/x.conf", "empty", 1, "1 "},
-                                                          {"/etc/x.conf", "A", 8, "0 "},
-                                                          {"/etc/x.conf/below", "a", 8, failure(VEXO_ERR_FILE)},
-                                                          {"/etc", "a", 8, failure(VEXO_ERR_GENERAL)},
-                                                          {"/etc/huge.conf", "a", 8, failure(VEXO_ERR_GENERAL)},
-                                                          {"/etc/x.conf", "a", 0, failure(VEXO_ERR_PARAMETER)}})
+    for (const auto& [file, key, size, expected] : Rows<const char*, const char*, int, std::string>{
+             row("/etc/x.conf", "a", 6, "1 Hello"), row("/etc/x.conf", "a", 4, "1 Hel"),
+             row("/etc/x.conf", "empty", 1, "1 "), row("/etc/x.conf", "A", 8, "0 "),
+             row("/etc/x.conf/below", "a", 8, failure(VEXO_ERR_FILE)), row("/etc", "a", 8, failure(VEXO_ERR_GENERAL)),
+             row("/etc/huge.conf", "a", 8, failure(VEXO_ERR_GENERAL)),
+             row("/etc/x.conf", "a", 0, failure(VEXO_ERR_PARAMETER))})
         EXPECT_EQ(ask(file, key, size), expected) << file << key << size;
-    for (const auto& [key, value, nocase, answer] :
-         Rows<const char*, const char*, int, int>{{"a", "Hello", 0, 1},
-                                                  {"a", "hello", 0, 0},
-                                                  {"name", "\xC3\xA9t\xC3\xA9", 1, 1},
-                                                  {"b", "", 0, 0}})  // absent is not empty
+    for (const auto& [key, value, nocase, answer] : Rows<const char*, const char*, int, int>{
+             row("a", "Hello", 0, 1), row("a", "hello", 0, 0), row("name", "\xC3\xA9t\xC3\xA9", 1, 1),
+             row("b", "", 0, 0)})  // absent is not empty
         EXPECT_EQ(VLIBCFileCheckKeyValue("/etc/x.conf", key, value, nocase), answer) << value;
     if (geteuid() != 0) return;
     chmod((systemRoot() + "/etc/huge.conf").c_str(), 0600);
-    asUser(kAliceUid, kUsersGid, [] {
-        EXPECT_EQ(ask("/etc/huge.conf"), failure(VEXO_ERR_DENIED));
-        return 0;
-    });
+    asUser(kAliceUid, kUsersGid, [] { EXPECT_EQ(ask("/etc/huge.conf"), failure(VEXO_ERR_DENIED)); });
 }
 
 TEST_F(Settings, GetKeysFillsTheCallersHashOrANewOne) {
@@ -89,10 +82,28 @@ TEST_F(Settings, TheAppliancesOwnFiles) {
         setDefaultSetting("support_s2s", value);
         EXPECT_EQ(VLIBCSupportGet("support_s2s"), answer);
     }
-    for (const auto& [value, minutes] :
-         Rows<const char*, int>{{"0", 0}, {"-3", -3}, {"30 minutes", -1}, {"", -1}, {"99999999999", -1}}) {
+    for (const auto& [value, minutes] : Rows<const char*, int>{row("0", 0), row("-3", -3), row("30 minutes", -1),
+                                                               row("", -1), row("99999999999", -1)}) {
         setSetting("session_timeout", value);
         EXPECT_EQ(VLIBCConfGetKTRTimeout(), minutes) << value;
+    }
+}
+
+TEST_F(Settings, DynamicNamesByProvider) {
+    VEXODDNS entry;
+    EXPECT_FAILS(VEXODDNSConfigGet("here.example", &entry), ENOENT, VEXO_ERR_FILE);
+    writeRootFile("/etc/vexo/ddns.conf",
+                  "hostname=\"outside.of.sections\"\n"
+                  "[here.example]\r\nuser=\"u\"\r\nhostname=\"box.here.example\"\r\n"
+                  "# [commented]\nhostname=\"second.is.ignored\"\n"
+                  "[there]\nuser=\"nobody\"\n[link]\nhostname=\"a/b@c\"\n[last]\nhostname=last.example");
+    for (const auto& [provider, host] : Rows<const char*, const char*>{
+             row("here.example", "box.here.example"), row("last", "last.example"), row("Here.Example", ""),
+             row("there", ""), row("link", ""), row("missing", ""), row("", "")}) {
+        EXPECT_EQ(VEXODDNSConfigGet(provider, &entry) >= 0, *host != '\0') << provider;
+        EXPECT_STREQ(entry.szHostname, host);
+        EXPECT_STREQ(entry.szProvider, *host != '\0' ? provider : "");
+        EXPECT_TRUE(*host != '\0' || VLIBCErrGet() == VEXO_ERR_MISSING);
     }
 }
 

@@ -20,10 +20,9 @@ using Sections = std::map<std::string, Fields>;  // by folded name
 const Rows<const char*, ShareOption> kBooleans = {{"read only", ShareOption::readOnly},
                                                   {"browseable", ShareOption::browseable},
                                                   {"available", ShareOption::available}};
-const Rows<const char*, ShareOption> kLists = {{"valid users", ShareOption::validUsers},
-                                               {"invalid users", ShareOption::invalidUsers},
-                                               {"read list", ShareOption::readList},
-                                               {"write list", ShareOption::writeList}};
+const Rows<const char*, ShareOption> kLists = {
+    row("valid users", ShareOption::validUsers), row("invalid users", ShareOption::invalidUsers),
+    row("read list", ShareOption::readList), row("write list", ShareOption::writeList)};
 
 Sections ours(const vexo::Definitions& definitions) {
     Sections out;
@@ -126,9 +125,11 @@ const Rows<std::string, std::set<std::string>> kRefusedBySamba = {
     {"[a]\npath = /v/a\ncopy = b\n[b]\npath = /v/b\n[c]\npath = /v/c\ncopy = c\n[d]\npath = /v/d\n", {"b", "d"}},
     {"[a]\npath = /v/a\n[b]\npath = /v/b\ninclude = @/loop.conf\n", {"a"}}};
 
-TEST(SambaGrammar, ReadsAlike) {
+using SambaGrammar = ApplianceTest;
+
+TEST_F(SambaGrammar, ReadsAlike) {
     const bool hasOracle = system("command -v testparm >/dev/null") == 0;
-    const std::string folder = "/tmp/definitions-" + std::to_string(getpid());
+    const std::string folder = systemRoot() + "/definitions";
     writeFile(folder + "/users.conf", "valid users = included\n# no section of its own\n");
     writeFile(folder + "/sections.conf", "read list = first\n[inner]\npath = /v/inner\n");
     writeFile(folder + "/loop.conf", "include = " + folder + "/loop.conf\n");
@@ -151,7 +152,6 @@ TEST(SambaGrammar, ReadsAlike) {
         EXPECT_EQ(names, sections) << text;
         EXPECT_FALSE(hasOracle && samba(folder + "/smb.conf")) << text;
     }
-    fs::remove_all(folder);
     if (!hasOracle) GTEST_SKIP() << "testparm (package samba-common-bin) is not installed";
 }
 

@@ -28,12 +28,11 @@ TEST_F(StatTest, RecordsWhatLstatTells) {
             memset(&byName, 0xCD, sizeof byName);
             ASSERT_EQ(VLIBCFileLStat((root_ + "/" + name).c_str(), flags, &got), 0);
             ASSERT_EQ(VLIBCFileLStatAt(folder.get(), name, flags, &byName), 0);
-            EXPECT_EQ(std::tie(got.st_mode, got.st_uid, got.st_gid, got.st_device, got.st_inode, got.st_links),
+            EXPECT_EQ(std::tie(got.st_mode, got.st_uid, got.st_gid, got.st_device, got.st_inode, got.st_links,
+                               got.st_size, got.st_access, got.st_modify, got.st_change),
                       std::make_tuple(wanted.st_mode, wanted.st_uid, wanted.st_gid, wanted.st_dev, wanted.st_ino,
-                                      wanted.st_nlink));
-            EXPECT_EQ(
-                std::tie(got.st_size, got.st_access, got.st_modify, got.st_change),
-                std::make_tuple(wanted.st_size, wanted.st_atim.tv_sec, wanted.st_mtim.tv_sec, wanted.st_ctim.tv_sec));
+                                      wanted.st_nlink, wanted.st_size, wanted.st_atim.tv_sec, wanted.st_mtim.tv_sec,
+                                      wanted.st_ctim.tv_sec));
             EXPECT_EQ(got.st_create != 0, flags == 9U);
             EXPECT_TRUE(byName.st_inode == got.st_inode && byName.st_create == got.st_create);
         }
@@ -59,10 +58,7 @@ TEST_F(StatTest, FailuresLeaveErrnoCodeAndAnEmptyRecord) {
     expectFailure("/dev/null/below", ENOTDIR, VEXO_ERR_MISSING);
     expectFailure(root_ + "/" + std::string(256, 'n'), ENAMETOOLONG, VEXO_ERR_GENERAL);
     if (geteuid() != 0) return;
-    asUser(kAliceUid, kUsersGid, [&] {
-        expectFailure(root_ + "/closed/a", EACCES, VEXO_ERR_DENIED);
-        return 0;
-    });
+    asUser(kAliceUid, kUsersGid, [&] { expectFailure(root_ + "/closed/a", EACCES, VEXO_ERR_DENIED); });
 }
 
 }  // namespace

@@ -8,6 +8,8 @@
 #include <csignal>
 
 #include "platform/trust.h"
+#include "support/race.h"
+#include "support/wait.h"
 #include "tasks/task_document.h"
 #include "tasks/task_name.h"
 #include "tasks/task_worker.h"
@@ -18,12 +20,9 @@ using Record = std::unique_ptr<KTR::Task>;
 
 TEST(TaskName, StandsForOneFileThatIsNeverHidden) {
     const std::string longest(200, 'x');
-    for (const auto& [name, file] : Rows<std::string, std::string>{{"Quorvane_1", "Quorvane_1"},
-                                                                   {"a/../b", "a%2F..%2Fb"},
-                                                                   {"...", "%2E.."},
-                                                                   {"50%2F", "50%252F"},
-                                                                   {"DOM\\al\xFF\n", "DOM\\al\xFF\n"},
-                                                                   {longest, longest}}) {
+    for (const auto& [name, file] : Rows<std::string, std::string>{
+             row("Quorvane_1", "Quorvane_1"), row("a/../b", "a%2F..%2Fb"), row("...", "%2E.."), row("50%2F", "50%252F"),
+             row("DOM\\al\xFF\n", "DOM\\al\xFF\n"), row(longest, longest)}) {
         EXPECT_EQ(vexo::fileNameOfTask(name), file);
         EXPECT_EQ(vexo::taskNameOfFile(file), name);
     }
@@ -75,10 +74,8 @@ TEST_F(Tasks, LiveFromCreationToRemoval) {
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_EXISTS);
     const Record read = get("Quorvane_a/b");
     ASSERT_NE(read, nullptr);
-
     EXPECT_FALSE(made->endUpdate()) << "none is open";
-    ASSERT_TRUE(made->beginUpdate());
-    EXPECT_FALSE(made->beginUpdate());
+    EXPECT_TRUE(made->beginUpdate() && !made->beginUpdate());
     EXPECT_TRUE(made->setProperty("a", 1) && made->setProperty("b", "\xC3\xA9\n"));
     EXPECT_TRUE(made->reload()) << "keeps what was set";
     EXPECT_TRUE(read->reload());
@@ -181,42 +178,29 @@ TEST_F(Tasks, AFileThatOthersCouldHaveMadeIsNoTask) {
 }
 
 TEST_F(Tasks, NoUpdateIsLostAndNoneIsSeenByHalves) {
-    constexpr int kWriters = 4, kUpdates = 150;
     const Record task = make("x");
     ASSERT_NE(task, nullptr);
     ASSERT_TRUE(task->setProperty("a", 0) && task->setProperty("b", 0));
-    for (int writer = 0; writer < kWriters; ++writer) {
-        fork([] {
-            const Record own = get("x");
-            for (int update = 0; update < kUpdates; ++update) {
-                if (!own->beginUpdate()) return 1;
-                const int next = own->getProperty("a").asInt() + 1;
-                own->setProperty("a", next);
-                own->setProperty("b", next);
-                if (!own->endUpdate()) return 1;
-            }
-            return 0;
-        });
-    }
-    int ended = 0, status = 0, seen = 0;
-    while (ended < kWriters) {
-        if (waitpid(-1, &status, WNOHANG) > 0) {
-            EXPECT_EQ(status, 0);
-            ++ended;
+    const auto updates = [] {
+        const Record own = get("x"), seen = get("x");
+        for (int update = 0; update < 150; ++update) {
+            if (!own->beginUpdate()) return false;
+            const int next = own->getProperty("a").asInt() + 1;
+            own->setProperty("a", next);
+            own->setProperty("b", next);
+            if (!own->endUpdate() || !seen->reload()) return false;
+            if (seen->getProperty("a") != seen->getProperty("b") || seen->getProperty("a").asInt() < next) return false;
         }
-        ASSERT_TRUE(task->reload());
-        ASSERT_EQ(task->getProperty("a"), task->getProperty("b"));
-        ASSERT_GE(task->getProperty("a").asInt(), seen);
-        seen = task->getProperty("a").asInt();
-    }
-    EXPECT_EQ(seen, kWriters * kUpdates);
+        return true;
+    };
+    EXPECT_EQ(countAtOnce(4, updates), 4);
+    EXPECT_EQ(get("x")->getProperty("a"), 4 * 150);
 }
 
 TEST_F(Tasks, WhatAKilledWriterLeftIsInNobodysWay) {
     const Record task = make("x");
     ASSERT_NE(task, nullptr);
-    const pid_t writer = fork([] { return get("x")->beginUpdate() ? raise(SIGKILL) : 1; });
-    waitpid(writer, nullptr, 0);
+    expectKilled([] { return get("x")->beginUpdate() ? raise(SIGKILL) : 0; });
     for (const bool last : {false, true}) {
         writeFile(fileOf(".new-x"), "half a docu");
         EXPECT_TRUE(last ? task->remove() : task->setProperty("a", 1));
@@ -229,7 +213,7 @@ TEST_F(Tasks, AnEndWithoutAWordIsAFailure) {
     for (const bool finishing : {false, true}) {
         const pid_t worker = fork([&] { return get("x")->attach() ? pause() : 1; });
         Record task;
-        while (task == nullptr || task->getWorker() != worker) task = get("x");
+        EXPECT_TRUE(waitUntil("the worker", [&] { return (task = get("x"))->getWorker() == worker; }));
         EXPECT_FALSE(task->isFinished());
         // The document in hand still says that it runs when the end comes.
         if (finishing) {
@@ -260,7 +244,6 @@ TEST_F(Tasks, TheStoreIsRootsAndReachedAfterTheSwitch) {
     asUser(kBobUid, kUsersGid, [] {
         EXPECT_EQ(get("x"), nullptr) << "closed to a mere user";
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_DENIED);
-        return 0;
     });
 }
 

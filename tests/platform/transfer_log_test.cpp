@@ -1,12 +1,12 @@
 // The transfer log: its lines and its file.
 #include <json/reader.h>
 #include <sys/mount.h>
-#include <sys/wait.h>
 
 #include <sstream>
 
 #include "platform/private_mounts.h"
 #include "platform/trust.h"
+#include "support/race.h"
 #include "transfer_entry.h"
 #include "vexo/xferlog.h"
 
@@ -49,13 +49,13 @@ class TransferLogTest : public ApplianceTest {
 
 TEST_F(TransferLogTest, EntriesOfManyProcessesAreAllThereAndWhole) {
     const mode_t before = umask(0);
-    for (int writer = 0; writer < 4; ++writer) {
-        if (fork() != 0) continue;
-        for (int i = 0; i < 200; ++i) log();
-        _exit(0);
-    }
-    while (wait(nullptr) > 0) {
-    }
+    const auto writes = [this] {
+        for (int i = 0; i < 200; ++i) {
+            if (log() != 0) return false;
+        }
+        return true;
+    };
+    EXPECT_EQ(countAtOnce(4, writes), 4);
     umask(before);
     EXPECT_EQ(lines(), 4 * 200);
     EXPECT_EQ(statusOf(log_).st_mode & 0777, 0600U);

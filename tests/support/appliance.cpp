@@ -95,8 +95,9 @@ void writeFile(const std::string& path, const std::string& text, mode_t mode) {
 }
 
 std::string readFile(const std::string& path) {
-    std::ifstream in(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(in), {}};
+    std::ostringstream text;
+    text << std::ifstream(path, std::ios::binary).rdbuf();
+    return text.str();
 }
 
 void makeFolder(const std::string& path, mode_t mode) {
