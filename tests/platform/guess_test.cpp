@@ -81,6 +81,9 @@ TEST_F(GuessTest, AnAddressIsJudgedMoreAndMoreSlowlyAtThatLinkOnly) {
     setTime(now_ + 60000 + 10 * 60000);
     EXPECT_EQ(guessPatiently("192.0.2.1"), 0);
     EXPECT_EQ(guessPatiently("192.0.2.1"), 2000) << "forgotten after ten quiet minutes";
+    setTime(now_ + 4000);
+    EXPECT_EQ(guess("192.0.2.1", true), 0);
+    for (const Time wait : {1, 8}) EXPECT_EQ(guessPatiently("192.0.2.1"), wait * 1000) << "the right one took one back";
 
     EXPECT_EQ(guess("2001:db8:1:2::3", false, "six"), 0);
     EXPECT_EQ(guess("2001:db8:1:2:ffff::", false, "six"), 2000) << "64 bits are one client";
