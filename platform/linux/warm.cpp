@@ -6,6 +6,7 @@
 #include "accounts/account_source.h"
 #include "failure.h"
 #include "filesystem/mount_table.h"
+#include "io/file_io.h"
 #include "shares/share_store.h"
 #include "vexo/process.h"
 #include "vexo/settings.h"
@@ -25,6 +26,10 @@ void warmFiles() {
 }
 
 }  // namespace
+
+void VEXORequestBegin() {
+    vexo::RecentLook::beginRequest();
+}
 
 void VEXOWarm() try {
     const vexo::KeepErrno keep;

@@ -10,6 +10,7 @@
 #include <string>
 
 #include "text.h"
+#include "vexo/process.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
@@ -84,6 +85,7 @@ void answer(const Program& program, Output& out) {
 }
 
 int serveRequest(const Program& program, void (*beginning)()) {
+    VEXORequestBegin();
     Output out(STDOUT_FILENO, beginning);
     try {
         answer(program, out);

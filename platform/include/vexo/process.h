@@ -19,6 +19,11 @@ VEXO_API int VLIBCExec(const char* program, ...) __attribute__((sentinel));
 // is unchanged. Children find it in their memory and check it by the versions of the files. No descriptor stays open, no
 // lock is taken, no directory or name service is asked. What fails here fails again, with its error, where it is needed.
 VEXO_API void VEXOWarm(void);
+
+// For a process that serves one request: a central file (settings, share definitions, account files, applications) that
+// was found unchanged counts as unchanged for the next 50 ms, in which a request asks for each of them a dozen times.
+// What was changed before this call is seen after it, and what this process changes itself is seen at once.
+VEXO_API void VEXORequestBegin(void);
 VEXO_END_C
 
 #endif

@@ -33,11 +33,6 @@ File openRecords(const std::string& path, FileVersion& version) {
     return file;
 }
 
-bool isUnchanged(const std::string& path, const FileVersion& version) {
-    struct stat status {};
-    return stat(path.c_str(), &status) == 0 && version.isCurrent(status);
-}
-
 // Lines that begin so stand for records of another service, which these files are not asked for.
 bool isRecordName(const char* name) {
     return name[0] != '\0' && name[0] != '+' && name[0] != '-';
@@ -53,7 +48,7 @@ const Record* recordAt(const std::unordered_map<Key, size_t>& index, const Key& 
 }  // namespace
 
 bool AccountFiles::refresh(const std::string& passwd, const std::string& group) {
-    if (wereRead_ && isUnchanged(passwd, passwdVersion_) && isUnchanged(group, groupVersion_)) return true;
+    if (wereRead_ && passwdVersion_.isCurrentAt(passwd) && groupVersion_.isCurrentAt(group)) return true;
     ++readings_;
     wereRead_ = readUsers(passwd) && readGroups(group);
     return wereRead_;
@@ -115,7 +110,7 @@ const std::vector<gid_t>& AccountFiles::listing(const std::string& user) const {
 
 long AccountFiles::expiry(const std::string& shadow, const std::string& user) {
     const KeepErrno keep;
-    if (!isUnchanged(shadow, shadowVersion_)) readExpiries(shadow);
+    if (!shadowVersion_.isCurrentAt(shadow)) readExpiries(shadow);
     const auto found = expiries_.find(user);
     return found == expiries_.end() ? -1 : found->second;
 }

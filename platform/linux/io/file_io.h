@@ -10,6 +10,7 @@
 #include <cerrno>
 #include <cstddef>
 #include <ctime>
+#include <cstdint>
 #include <string>
 #include <string_view>
 
@@ -29,6 +30,21 @@ using orvel::Descriptor;
 [[nodiscard]] bool readAll(int fd, std::string& out, size_t limit);
 [[nodiscard]] bool writeAll(int fd, std::string_view text);
 
+// When something was found unchanged: while it is recent nobody needs to look again. Never in a process that does not
+// serve a request.
+class RecentLook {
+ public:
+    [[nodiscard]] bool isRecent() const;
+    void note();
+    // From here on no look is recent; of a request that begins, or where this process has changed something.
+    static void forgetAll();
+    static void beginRequest();
+
+ private:
+    unsigned generation_ = 0;
+    std::int64_t time_ = 0;
+};
+
 // Which version of a file was read, for whoever remembers what it held.
 class FileVersion {
  public:
@@ -37,6 +53,8 @@ class FileVersion {
     explicit FileVersion(const struct stat& status);
     // True when `status`, taken later, still shows the version that was read.
     [[nodiscard]] bool isCurrent(const struct stat& status) const;
+    // The same of the file at `path` as it is now, or was at a recent look.
+    [[nodiscard]] bool isCurrentAt(const std::string& path) const;
     // For readers: a later write within the same clock tick may go unnoticed.
     [[nodiscard]] bool isSame(const struct stat& status) const;
 
@@ -46,6 +64,7 @@ class FileVersion {
     off_t size_ = 0;
     timespec modified_{};
     bool settled_ = false;  // no later write can leave the same time
+    mutable RecentLook look_;
 };
 
 // Reads a regular file (anything else: EINVAL, without waiting on a pipe) into `text`; `version` is what was read.

@@ -36,8 +36,7 @@ const std::vector<vexo::Setting>* load(const char* file) {
     static auto& files = *new std::map<std::string, SettingsFile>;  // still asked at exit
     const std::string path = VEXO::SystemPath(file);
     SettingsFile& entry = files[path];
-    struct stat status {};
-    if (stat(path.c_str(), &status) == 0 && entry.version.isCurrent(status)) return &entry.settings;
+    if (entry.version.isCurrentAt(path)) return &entry.settings;
     entry = {};
     vexo::FileVersion version;
     if (!vexo::readSettingsFile(path, entry.text, version)) return nullptr;

@@ -68,6 +68,7 @@ bool overwrite(int fd, std::string_view text, off_t size) {
 bool carryOut(int fd, const Change& change) {
     const bool done = overwrite(fd, change.padded, change.newSize);
     const KeepErrno keep;
+    RecentLook::forgetAll();
     if (done || overwrite(fd, change.before, static_cast<off_t>(change.before.size()))) unlink(change.pending.c_str());
     return done;
 }

@@ -47,9 +47,9 @@ struct Origin {
     Stamp stamp;
 
     [[nodiscard]] bool isUnchanged() const {
+        if (read) return version.isCurrentAt(path);
         struct stat status {};
         const bool exists = stat(path.c_str(), &status) == 0;
-        if (read) return exists && version.isCurrent(status);
         return stamp == (exists ? stampOf(status) : Stamp());
     }
 };
