@@ -172,7 +172,12 @@ std::shared_ptr<const ShareTable> currentShares() {
 
 std::optional<std::string> rootOf(const ShareDefinition& share) {
     if (!hasVariables(share.path)) return share.path;
-    return normalRoot(replaceVariables(share.path, variablesFor(share.name)));
+    std::optional<std::string> root = normalRoot(replaceVariables(share.path, variablesFor(share.name)));
+    // Where a variable is empty the folder above would be everybody's.
+    if (root && std::count(root->begin(), root->end(), '/') != std::count(share.path.begin(), share.path.end(), '/')) {
+        return std::nullopt;
+    }
+    return root;
 }
 
 }  // namespace vexo
