@@ -19,23 +19,20 @@ TEST_F(StatTest, RecordsWhatLstatTells) {
     fs::create_symlink("a", root_ + "/link");
     fs::create_hard_link(file, root_ + "/second");
     const orvel::Descriptor folder = vexo::openFile(root_, O_RDONLY | O_DIRECTORY);
-    for (const char* name : {"a", "link", "."}) {
+    for (const char* name : {"a", "link"}) {
+        SCOPED_TRACE(name);
         const struct stat wanted = statusOf(root_ + "/" + name);
-        for (const unsigned flags : {unsigned{VEXO_STAT_BASIC}, 9U}) {
-            SCOPED_TRACE(name + std::to_string(flags));
-            _tag_VEXOSTAT_ got, byName;
-            memset(&got, 0xAB, sizeof got);
-            memset(&byName, 0xCD, sizeof byName);
-            ASSERT_EQ(VLIBCFileLStat((root_ + "/" + name).c_str(), flags, &got), 0);
-            ASSERT_EQ(VLIBCFileLStatAt(folder.get(), name, flags, &byName), 0);
-            EXPECT_EQ(std::tie(got.st_mode, got.st_uid, got.st_gid, got.st_device, got.st_inode, got.st_links,
-                               got.st_size, got.st_access, got.st_modify, got.st_change),
-                      std::make_tuple(wanted.st_mode, wanted.st_uid, wanted.st_gid, wanted.st_dev, wanted.st_ino,
-                                      wanted.st_nlink, wanted.st_size, wanted.st_atim.tv_sec, wanted.st_mtim.tv_sec,
-                                      wanted.st_ctim.tv_sec));
-            EXPECT_EQ(got.st_create != 0, flags == 9U);
-            EXPECT_TRUE(byName.st_inode == got.st_inode && byName.st_create == got.st_create);
-        }
+        _tag_VEXOSTAT_ got, basic;
+        memset(&got, 0xAB, sizeof got);
+        memset(&basic, 0xCD, sizeof basic);
+        ASSERT_EQ(VLIBCFileLStatAt(folder.get(), name, 9, &got), 0);
+        ASSERT_EQ(VLIBCFileLStat((root_ + "/" + name).c_str(), VEXO_STAT_BASIC, &basic), 0);
+        EXPECT_EQ(
+            std::tie(got.st_mode, got.st_uid, got.st_gid, got.st_device, got.st_inode, got.st_links, got.st_size,
+                     got.st_access, got.st_modify, got.st_change),
+            std::make_tuple(wanted.st_mode, wanted.st_uid, wanted.st_gid, wanted.st_dev, wanted.st_ino, wanted.st_nlink,
+                            wanted.st_size, wanted.st_atim.tv_sec, wanted.st_mtim.tv_sec, wanted.st_ctim.tv_sec));
+        EXPECT_TRUE(basic.st_inode == got.st_inode && basic.st_create == 0 && got.st_create != 0);
     }
     // Files of /proc have no time of creation: the smaller of the other two.
     _tag_VEXOSTAT_ status;
