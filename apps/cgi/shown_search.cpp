@@ -11,6 +11,7 @@
 
 #include "confined.h"
 #include "orvel/user_directory.h"
+#include "vexo/index.h"
 #include "vexo/stat.h"
 
 namespace orvel::cgi {
@@ -60,6 +61,10 @@ BOOL collectGone(__tag_FI_FILE_INFO_DATA* row, void* gone) try {
 
 ShownSearch::ShownSearch(const std::string& user, const std::string& taskId) {
     if (isTaskId(taskId)) findTask(user, taskId, task_);
+}
+
+ShownSearch::~ShownSearch() {
+    if (task_.results != nullptr) FILEIDXDBFlush(task_.results->getDBTaskFilePath());
 }
 
 void ShownSearch::added(const ChangedFile& file) {

@@ -23,6 +23,10 @@ class ShownSearch {
  public:
     // `taskId`: parameter "taskid", "" for none. An unknown or expired id counts as none.
     ShownSearch(const std::string& user, const std::string& taskId);
+    // The rows are as they are to be: whoever is answered after this, or sees the task's end, finds them so.
+    ~ShownSearch();
+    ShownSearch(const ShownSearch&) = delete;
+    ShownSearch& operator=(const ShownSearch&) = delete;
 
     // A file or folder came into being, or a file got a new content.
     void added(const ChangedFile& file);

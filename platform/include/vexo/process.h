@@ -16,8 +16,9 @@ VEXO_API int VLIBCExec(const char* program, ...) __attribute__((sentinel));
 
 // For a process that stays and forks a child for each request: reads what children would read again and again
 // (settings, share definitions, account files, the mount table where it is a file, folding tables), or nothing where it
-// is unchanged. Children find it in their memory and check it by the versions of the files. No descriptor stays open, no
-// lock is taken, no directory or name service is asked. What fails here fails again, with its error, where it is needed.
+// is unchanged. Children find it in their memory and check it by the versions of the files. No descriptor stays open,
+// no lock is taken, no directory or name service is asked. What fails here fails again, with its error, where it is
+// needed.
 VEXO_API void VEXOWarm(void);
 
 // For a process that serves one request: a central file (settings, share definitions, account files, applications) that

@@ -9,8 +9,8 @@
 
 #include <cerrno>
 #include <cstddef>
-#include <ctime>
 #include <cstdint>
+#include <ctime>
 #include <string>
 #include <string_view>
 
