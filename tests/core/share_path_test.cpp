@@ -57,13 +57,17 @@ TEST_F(SharePathTest, SharesResolve) {
         EXPECT_EQ(out.share + out.root + out.volume, "photo" + root + "/tmp");
     }
     // The volume of a root is its first component, however many follow.
-    for (const auto& [top, volume] :
-         Rows<const char*, const char*>{{"/data", "/data"}, {"/srv/samba/team", "/srv"}, {"/home/%u", "/home"}}) {
-        addShare("team", std::string("path = ") + top + "\n");
+    setenv("REMOTE_USER", "bob", 1);
+    for (const auto& [path, top, volume] :
+         Rows<std::string, const char*, const char*>{{"/data", "/data", "/data"},
+                                                     {"/srv/samba/team", "/srv/samba/team", "/srv"},
+                                                     {"/home/%u", "/home/bob", "/home"}}) {  // of whoever asks
+        addShare("team", "path = " + path + "\n");
         const Resolved out = resolve("/team/a/b", "alice");
-        EXPECT_EQ(out.root, fs::path(top).filename() == "%u" ? "/home/root" : top) << "of whoever asks";
-        EXPECT_EQ(out.real + out.volume, out.root + "/a/b" + volume);
+        EXPECT_EQ(out.root, top);
+        EXPECT_EQ(out.real + out.volume, std::string(top) + "/a/b" + volume);
     }
+    unsetenv("REMOTE_USER");
     std::string both = "/photo/x", real, volume, top;  // the path may lie in an output
     EXPECT_EQ(OrvFullPathGet(both.c_str(), real, both, volume, top, "alice"), 1);
     EXPECT_EQ(real + both, root + "/xphoto");
