@@ -3,6 +3,8 @@
 #include <dirent.h>
 #include <fcntl.h>
 #include <grp.h>
+#include <sched.h>
+#include <sys/mount.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <syslog.h>
@@ -44,10 +46,17 @@ const std::string& tag() {
     return value;
 }
 
-// Made and removed once a program, before main and after it: the platform reads VEXO_ROOT once.
+// Made and removed once a program, before main and after it: the platform reads VEXO_ROOT once. Where that may be
+// mounted, the program has a /tmp of its own: the shares' temporary place, /tmp/@tmp, is the machine's otherwise.
 class SystemRootFolder {
  public:
-    SystemRootFolder() : path_("/tmp/" + tag()), owner_(getpid()) {
+    SystemRootFolder() : path_("/tmp/" + tag()), machine_(open("/tmp", O_PATH | O_DIRECTORY | O_CLOEXEC)) {
+        const std::string own = path_ + "-tmp";
+        mkdir(own.c_str(), 01777);
+        chmod(own.c_str(), 01777);
+        if (unshare(CLONE_NEWNS) == 0 && mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0) {
+            mount(own.c_str(), "/tmp", nullptr, MS_BIND, nullptr);
+        }
         fs::create_directories(path_);
         fs::permissions(path_, fs::perms(0755));
         setenv("VEXO_ROOT", path_.c_str(), 1);
@@ -55,15 +64,18 @@ class SystemRootFolder {
     ~SystemRootFolder() {
         if (getpid() != owner_) return;
         std::error_code ignored;
-        for (const auto& entry : fs::directory_iterator("/tmp", ignored)) {
-            if (entry.path().filename().string().starts_with(tag())) fs::remove_all(entry.path(), ignored);
+        for (const std::string& place : {std::string("/tmp"), "/proc/self/fd/" + std::to_string(machine_)}) {
+            for (const auto& entry : fs::directory_iterator(place + "/", ignored)) {
+                if (entry.path().filename().string().starts_with(tag())) fs::remove_all(entry.path(), ignored);
+            }
         }
     }
     [[nodiscard]] const std::string& path() const { return path_; }
 
  private:
     std::string path_;
-    pid_t owner_;
+    int machine_;  // its /tmp
+    pid_t owner_ = getpid();
 };
 
 const SystemRootFolder root;

@@ -13,59 +13,35 @@
 namespace support {
 namespace {
 
-struct Order {
-    std::string path;
-    int error = 0;
-    int nth = 0;
-};
-
-Order reading, status, opening;
-
 std::string folderOf(int fd) {
     std::error_code ignored;
     return std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(fd), ignored);
 }
 
-bool refuses(Order& order, const std::string& path) {
-    if (order.path != path || --order.nth != 0) return false;
+bool refusesOnce(FaultOrder& order, const std::string& path) {
+    if (order.path != path || --order.count != 0) return false;
     errno = order.error;
     return true;
 }
 
 }  // namespace
 
-ReadingFault::ReadingFault(const std::string& path, int error, int nth) {
-    reading = {path, error, nth};
+SystemFault::SystemFault(FaultOrder& order, const std::string& path, int error, int count) : order_(order) {
+    order_ = {path, error, count};
 }
 
-ReadingFault::~ReadingFault() {
-    reading = {};
-}
-
-StatusFault::StatusFault(const std::string& path, int error) {
-    status = {path, error, 1};
-}
-
-StatusFault::~StatusFault() {
-    status = {};
-}
-
-OpeningFault::OpeningFault(const std::string& path, int error, int times) {
-    opening = {path, error, times};
-}
-
-OpeningFault::~OpeningFault() {
-    opening = {};
+SystemFault::~SystemFault() {
+    order_ = {};
 }
 
 }  // namespace support
 
 extern "C" {
 int openat(int folder, const char* name, int flags, ...) {
-    using namespace support;
-    if (opening.nth > 0 && opening.path == name) {
-        --opening.nth;
-        errno = opening.error;
+    using support::failingOpening;
+    if (failingOpening.count > 0 && failingOpening.path == name) {
+        --failingOpening.count;
+        errno = failingOpening.error;
         return -1;
     }
     va_list rest;
@@ -77,13 +53,13 @@ int openat(int folder, const char* name, int flags, ...) {
 
 ssize_t getdents64(int fd, void* buffer, size_t size) {
     using namespace support;
-    if (!reading.path.empty() && refuses(reading, folderOf(fd))) return -1;
+    if (!failingReading.path.empty() && refusesOnce(failingReading, folderOf(fd))) return -1;
     return syscall(SYS_getdents64, fd, buffer, size);
 }
 
 int fstatat(int fd, const char* name, struct stat* out, int flags) noexcept {
     using namespace support;
-    if (!status.path.empty() && refuses(status, folderOf(fd) + "/" + name)) return -1;
+    if (!failingStatus.path.empty() && refusesOnce(failingStatus, folderOf(fd) + "/" + name)) return -1;
     return static_cast<int>(syscall(SYS_newfstatat, fd, name, out, flags));
 }
 }

@@ -7,31 +7,37 @@
 
 namespace support {
 
-// While it lives, the `nth` reading (getdents64, 1 is the next) of the open folder `path` fails.
-class ReadingFault {
- public:
-    ReadingFault(const std::string& path, int error, int nth = 1);
-    ~ReadingFault();
-    ReadingFault(const ReadingFault&) = delete;
-    ReadingFault& operator=(const ReadingFault&) = delete;
+// What fails while a fault lives, at one path.
+struct FaultOrder {
+    std::string path;
+    int error = 0;
+    int count = 0;
 };
 
-// While it lives, the status of `path` cannot be read by fstatat.
-class StatusFault {
+class SystemFault {
  public:
-    StatusFault(const std::string& path, int error);
-    ~StatusFault();
-    StatusFault(const StatusFault&) = delete;
-    StatusFault& operator=(const StatusFault&) = delete;
+    SystemFault(FaultOrder& order, const std::string& path, int error, int count);
+    ~SystemFault();
+    SystemFault(const SystemFault&) = delete;
+    SystemFault& operator=(const SystemFault&) = delete;
+
+ private:
+    FaultOrder& order_;
 };
 
-// While it lives, the next `times` openings of the absolute path `path` fail.
-class OpeningFault {
- public:
-    OpeningFault(const std::string& path, int error, int times);
-    ~OpeningFault();
-    OpeningFault(const OpeningFault&) = delete;
-    OpeningFault& operator=(const OpeningFault&) = delete;
+inline FaultOrder failingReading, failingStatus, failingOpening;
+
+// The `nth` reading (getdents64, 1 is the next) of the open folder `path` fails.
+struct ReadingFault : SystemFault {
+    ReadingFault(const std::string& path, int error, int nth = 1) : SystemFault(failingReading, path, error, nth) {}
+};
+// The status of `path` cannot be read by fstatat.
+struct StatusFault : SystemFault {
+    StatusFault(const std::string& path, int error) : SystemFault(failingStatus, path, error, 1) {}
+};
+// The next `times` openings of the absolute path `path` fail.
+struct OpeningFault : SystemFault {
+    OpeningFault(const std::string& path, int error, int times) : SystemFault(failingOpening, path, error, times) {}
 };
 
 }  // namespace support
