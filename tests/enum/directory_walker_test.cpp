@@ -1,13 +1,11 @@
 #include "orvel/directory_walker.h"
 
 #include <dirent.h>
-#include <sys/mount.h>
 #include <sys/resource.h>
 
 #include <stdexcept>
 
 #include "base/descriptor.h"
-#include "platform/private_mounts.h"
 #include "support/log_texts.h"
 #include "support/system_faults.h"
 #include "support/testing.h"
@@ -185,11 +183,14 @@ TEST_F(DirectoryWalkerTest, AbortFlagCancels) {
 TEST_F(DirectoryWalkerTest, CancelledOnceIsCancelledForGood) {
     makeTree();
     int flag = 0;
-    before_.action = [&](const auto&, const auto& name) { return flag = name == "a" ? 1 : 0, true; };
+    std::string chosen;  // the first folder, behind which more comes in any order
+    before_.action = [&](const std::string& path, const std::string& name) {
+        if (chosen.empty() && fs::is_directory(path)) chosen = name, flag = 1;
+        return true;
+    };
     after_.action = [&](const auto&, const auto&) { return flag = 0, true; };
     EXPECT_TRUE(walk(Order::kWalk, ENUM_IGNORE_NO_ERR, root_, &flag));
-    EXPECT_EQ(lines_.back(), "-show/a");
-    EXPECT_LT(lines_.size(), expected(Order::kWalk).size() - 6) << "nothing below it";
+    EXPECT_EQ(lines_.back(), "-show/" + chosen) << "nothing below it, nothing behind it";
 }
 
 TEST_F(DirectoryWalkerTest, LeavesTheProcessInTheLastFolderEntered) {
@@ -340,23 +341,6 @@ TEST_F(DirectoryWalkerTest, AnOpenFolder) {
         fs::remove(root_ + "/a");
         fs::rename(root_ + "/moved", root_ + "/a");
     }
-}
-
-// A folder may turn into the root of a mount when it is first entered.
-TEST_F(DirectoryWalkerTest, EntersAFolderMountedDuringTheWalk) {
-    makeFolder(root_ + "/mount");
-    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
-        int result = kNoPrivateMounts;
-        before_.action = [&](const std::string& path, const std::string& name) {
-            if (name != "mount") return true;
-            if (mount("none", path.c_str(), "tmpfs", 0, nullptr) == 0) result = 0;
-            writeFile(path + "/inside", "x");
-            return true;
-        };
-        EXPECT_TRUE(walk(Order::kTopDown, ENUM_IGNORE_NO_ERR, root_));
-        EXPECT_EQ(lines_, (Lines{"show/mount", "show/mount/inside"}));
-        return result;
-    }));
 }
 
 std::string levels(int count) {

@@ -120,16 +120,10 @@ TEST(FileInfoText, EqualsTheObjectsTextForEveryName) {
 }
 
 TEST(FileInfoText, EqualsTheObjectsTextForEverySize) {
-    constexpr int64_t kSeventeenDigits = 99999999999999999, kExact = int64_t{1} << 53;
-    std::vector<int64_t> sizes = {-1,
-                                  kExact + 1,
-                                  kExact + 3,
-                                  kSeventeenDigits,
-                                  kSeventeenDigits - 8,
-                                  kSeventeenDigits + 1,
-                                  kSeventeenDigits + 2,
-                                  INT64_MIN,
-                                  INT64_MIN + 1};
+    std::vector<int64_t> sizes = {-1, INT64_MIN, INT64_MIN + 1};
+    for (const int64_t edge : {int64_t{1} << 53, int64_t{99999999999999999}}) {  // exact as a double, seventeen digits
+        for (int64_t beside = -8; beside <= 3; ++beside) sizes.push_back(edge + beside);
+    }
     for (int shift = 0; shift < 64; ++shift) {
         const uint64_t power = uint64_t{1} << shift;
         sizes.insert(sizes.end(), {static_cast<int64_t>(power - 1), static_cast<int64_t>(power)});

@@ -36,18 +36,6 @@ TEST_F(SubDirectoriesTest, Failures) {
     expectFailure(root_, 402);
 }
 
-TEST_F(SubDirectoriesTest, DeniedToAnUnprivilegedUser) {
-    SKIP_WITHOUT_ROOT();
-    for (const mode_t mode : {0000, 0444, 0111}) {
-        makeFolder(root_ + "/closed", mode);
-        const auto body = [&] {
-            expectFailure(root_ + "/closed", 407);
-            return 0;
-        };
-        EXPECT_EQ(asUser(kBobUid, kUsersGid, body), 0);
-    }
-}
-
 TEST_F(SubDirectoriesTest, ListsFoldersSortedWithoutCase) {
     for (const char* folder : {"/b", "/A", "/c\xFF", "/Ä", "/@tmp", "/@vexoea", "/.dot", "/B/inner"}) {
         makeFolder(root_ + folder, 0750);
