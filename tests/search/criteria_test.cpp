@@ -156,7 +156,6 @@ TEST_F(CriteriaTest, Times) {
          Rows<int, int, int64_t _tag_VEXOSTAT_::*>{{5, 12, &_tag_VEXOSTAT_::st_modify},
                                                    {6, 9, &_tag_VEXOSTAT_::st_create},
                                                    {7, 11, &_tag_VEXOSTAT_::st_access}}) {
-        SCOPED_TRACE(field);
         for (const bool before : {false, true}) {
             Criteria criteria;
             ASSERT_TRUE(criteria.add(field, before ? "Before" : "after", "1000"));
@@ -165,7 +164,7 @@ TEST_F(CriteriaTest, Times) {
             for (const int64_t time : {999, 1000, 1001}) {
                 _tag_VEXOSTAT_ st{};
                 st.*member = time;
-                EXPECT_EQ(criteria.match("a", st), (time < 1000) == before) << time;
+                EXPECT_EQ(criteria.match("a", st), (time < 1000) == before) << field << " " << time;
             }
         }
     }
@@ -175,9 +174,10 @@ TEST_F(CriteriaTest, OwnersAndGroups) {
     Criteria criteria;
     ASSERT_TRUE(criteria.add(3, nullptr, "alice") && criteria.add(4, nullptr, "users"));
     EXPECT_EQ(textOf(criteria.list[1]->getFirstCond()), "16.0.20100|18.6.users");
-    EXPECT_TRUE(criteria.match("a", statusOf(S_IFREG, 0, kAliceUid, kUsersGid)));
-    EXPECT_FALSE(criteria.match("a", statusOf(S_IFREG, 0, kBobUid, kUsersGid)));
-    EXPECT_FALSE(criteria.match("a", statusOf(S_IFREG, 0, kAliceUid, kAdminGid)));
+    for (const auto& [uid, gid, matches] : Rows<unsigned, unsigned, bool>{
+             {kAliceUid, kUsersGid, true}, {kBobUid, kUsersGid, false}, {kAliceUid, kAdminGid, false}}) {
+        EXPECT_EQ(criteria.match("a", statusOf(S_IFREG, 0, uid, gid)), matches) << uid << " " << gid;
+    }
     const _tag_VEXOSTAT_ unknown = statusOf(S_IFREG, 0, 0xFFFFFFFF, 0xFFFFFFFF);
     EXPECT_FALSE(FindUserComp("x", 0xFFFFFFFF)("a", unknown) || FindGroupComp(nullptr, 0xFFFFFFFF)("a", unknown));
 }
@@ -193,25 +193,20 @@ TEST_F(CriteriaTest, ChainsIntoOneTree) {
 }
 
 TEST_F(CriteriaTest, AlternativesMayBeDeletedInAnyOrder) {
-    const _tag_VEXOSTAT_ st{};
     for (const bool headFirst : {false, true}) {
-        auto head = std::make_unique<FindNameComp>("first");
-        auto second = std::make_unique<FindNameComp>("second");
-        auto third = std::make_unique<FindNameComp>("third");
-        head->orComp(nullptr);
-        head->orComp(head.get());
-        head->orComp(second.get());
-        head->orComp(third.get());
-        EXPECT_EQ(textOf(head->getFirstCond()), "0.6.*third*|0.6.*second*|0.6.*first*");
-        EXPECT_TRUE((*head)("/x/THIRD", st) && (*head)("second", st) && !(*second)("third", st));
+        std::unique_ptr<FindNameComp> all[3];
+        for (int i = 0; i < 3; ++i) all[i] = std::make_unique<FindNameComp>(std::to_string(i + 1).c_str());
+        for (FindNameComp* other : {static_cast<FindNameComp*>(nullptr), all[0].get(), all[1].get(), all[2].get()})
+            all[0]->orComp(other);
+        EXPECT_EQ(textOf(all[0]->getFirstCond()), "0.6.*3*|0.6.*2*|0.6.*1*");
+        EXPECT_TRUE((*all[0])("/x/3", {}) && (*all[0])("2", {}) && !(*all[1])("3", {}));
         if (headFirst) {
-            head.reset();
-            EXPECT_TRUE((*second)("second", st));
-            EXPECT_STREQ(third->getFirstCond()->szValue, "*third*");
+            all[0].reset();
+            EXPECT_TRUE((*all[1])("2", {}));
+            EXPECT_STREQ(all[2]->getFirstCond()->szValue, "*3*");
         } else {
-            third.reset();
-            second.reset();
-            EXPECT_EQ(textOf(head->getFirstCond()), "0.6.*third*|0.6.*second*|0.6.*first*");
+            for (const int gone : {2, 1}) all[gone].reset();
+            EXPECT_EQ(textOf(all[0]->getFirstCond()), "0.6.*3*|0.6.*2*|0.6.*1*");
         }
     }
 }

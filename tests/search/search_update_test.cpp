@@ -222,8 +222,9 @@ struct Page {
 };
 
 BOOL addToPage(__tag_FI_FILE_INFO_DATA* record, void* page) {
-    static_cast<Page*>(page)->columns.push_back(static_cast<Page*>(page)->column(*record));
-    static_cast<Page*>(page)->shares.emplace_back(record->szShare);
+    auto& [column, columns, shares] = *static_cast<Page*>(page);
+    columns.push_back(column(*record));
+    shares.emplace_back(record->szShare);
     return 1;
 }
 
@@ -247,19 +248,14 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
     };
     onScreen([&] {
         unsigned long long count = 0;
-        for (const auto& [word, column] :
-             Rows<std::string, std::function<std::string(const Data&)>>{{"name", text(&Data::szName)},
-                                                                        {"any other word", text(&Data::szName)},
-                                                                        {"size", number(&Data::size)},
-                                                                        {"mtime", number(&Data::modified)},
-                                                                        {"crtime", number(&Data::created)},
-                                                                        {"ctime", number(&Data::changed)},
-                                                                        {"atime", number(&Data::accessed)},
-                                                                        {"user", text(&Data::szOwner)},
-                                                                        {"group", text(&Data::szGroup)},
-                                                                        {"posix", text(&Data::szPermission)},
-                                                                        {"type", text(&Data::szExtension)},
-                                                                        {"ppath", text(&Data::szParent)}}) {
+        using Column = std::function<std::string(const Data&)>;
+        for (const auto& [word, column] : Rows<std::string, Column>{
+                 row("name", Column(text(&Data::szName))), row("any other word", Column(text(&Data::szName))),
+                 row("size", Column(number(&Data::size))), row("mtime", Column(number(&Data::modified))),
+                 row("crtime", Column(number(&Data::created))), row("ctime", Column(number(&Data::changed))),
+                 row("atime", Column(number(&Data::accessed))), row("user", Column(text(&Data::szOwner))),
+                 row("group", Column(text(&Data::szGroup))), row("posix", Column(text(&Data::szPermission))),
+                 row("type", Column(text(&Data::szExtension))), row("ppath", Column(text(&Data::szParent)))}) {
             for (const bool ascending : {true, false}) {
                 SCOPED_TRACE(word + (ascending ? " ascending" : " descending"));
                 Page page{column, {}, {}};
@@ -274,8 +270,7 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
                 EXPECT_EQ(sorted.size(), 66U);
                 for (size_t i = 1; word == "ppath" && i < 66; ++i) {  // shares the other way round
                     if (page.columns[i] != page.columns[i - 1]) continue;
-                    EXPECT_TRUE(ascending ? page.shares[i - 1] >= page.shares[i]
-                                          : page.shares[i - 1] <= page.shares[i]);
+                    EXPECT_LE(page.shares[ascending ? i : i - 1], page.shares[ascending ? i - 1 : i]);
                 }
             }
         }
@@ -299,13 +294,15 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
             EXPECT_EQ(page.columns.size() + (expected == 0 ? 0 : 1), expected);
         }
         vexo::gate::reset();
-        EXPECT_FALSE(screen_->queryResult(0, 0, nullptr, nullptr, nullptr, nullptr, addToPage, nullptr, &count));
-        EXPECT_FALSE(screen_->queryResult(0, 1, nullptr, nullptr, nullptr, nullptr, addToPage, nullptr, nullptr));
+        const auto query = [&](unsigned long limit, unsigned long long* out) {
+            return screen_->queryResult(0, limit, nullptr, nullptr, nullptr, nullptr, addToPage, nullptr, out);
+        };
+        EXPECT_FALSE(query(0, &count) || query(1, nullptr));
         EXPECT_EQ(vexo::gate::calls("*"), 0) << "refused before the database is touched";
         for (const auto& [call, log] : Rows<const char*, const char*>{{"FILEIDXCountGet", "Select the record from"},
                                                                       {"FILEIDXDBSelect", "select data from"}}) {
             vexo::gate::fail(call, VEXO_ERR_GENERAL, EIO);
-            EXPECT_FALSE(screen_->queryResult(0, 1, nullptr, nullptr, nullptr, nullptr, addToPage, nullptr, &count));
+            EXPECT_FALSE(query(1, &count));
             EXPECT_EQ(takeLogText(),
                       std::string("orvelsearch:# Fail to ") + log + " DB " + screen_->getDBTaskFilePath());
             vexo::gate::reset();
