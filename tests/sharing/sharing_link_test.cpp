@@ -196,12 +196,12 @@ TEST_F(SharingLinkTest, RefusedLogins) {
 TEST_F(SharingLinkTest, ThePageOnStandardOutput) {
     const std::string desktop = systemRoot() + "/usr/vexo/vexoman/webman";
     makeFolder(desktop);
-    setenv("QUERY_STRING", "tunnel=/t&noCache=", 1);
+    setenv("QUERY_STRING", "tunnel=/t{path}&noCache=", 1);
     VEXO::WebCGI cgi;
     ASSERT_TRUE(cgi.AddCookieToHeader("/", "L", "s"));
     const auto page = [&](VEXO::WebCGI& request) {
         testing::internal::CaptureStdout();
-        manager.WriteWebPage(request, "digest", "/photo/a'b");
+        manager.WriteWebPage(request, "c'h</script>", "/photo/a'b\\c\"d<{tunnel}>\n&\xFF");
         return testing::internal::GetCapturedStdout();
     };
     const std::string plain = page(cgi), version = std::to_string(statusOf(desktop).st_mtime);
@@ -210,8 +210,9 @@ TEST_F(SharingLinkTest, ThePageOnStandardOutput) {
         "    <!DOCTYPE html>    <html>\n"));
     EXPECT_TRUE(plain.ends_with("<body>\n</body></html>\n"));
     for (const std::string& part :
-         {std::string("var g_FolderPath = '/photo/a\\'b';"), std::string("var g_MD5 = 'digest';"),
-          "src='/t/webman/vexodefs.cgi?v=" + version + "'", "FolderSharingLoader.js?" + version + "'"})
+         {"var g_FolderPath = '/photo/a\\'b\\\\c\\\"d<{tunnel}>\n&\xFF';" + std::string(),
+          std::string("<title>a'b\\c\"d<{tunnel}>\n&\xFF</title>"), std::string("var g_MD5 = 'c'h</script>';"),
+          "src='/t{path}/webman/vexodefs.cgi?v=" + version + "'", "FolderSharingLoader.js?" + version + "'"})
         EXPECT_NE(plain.find(part), std::string::npos) << part;
 
     setenv("QUERY_STRING", "noCache=1", 1);
