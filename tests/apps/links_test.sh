@@ -14,11 +14,12 @@ status() { curl -s -o "$work/body" -w '%{http_code}' -b "$(jar)" -c "$(jar)" "$@
 visit() { status "$share?FOLDER_SHARING=$1&action=list&${2:-}" "${@:3}"; }             # link, more of the query, options
 names() { grep -o '"name":"[^"]*"' "$work/body" | cut -d'"' -f4 | tr '\n' ' '; }
 enter() { # link, password, options: comes again for as long as it is not its turn
-    local code=429 turn=
-    while [ "$code" = 429 ]; do
+    local code turn=
+    for _ in $(seq 60); do
         code=$(status -d action=login --data-urlencode "password=$2" -d "turn=$turn" "$share?FOLDER_SHARING=$1" "${@:3}")
         turn=$(sed -n 's/.*"turn":"\([0-9a-f]*\)".*/\1/p' "$work/body")
-        [ "$code" != 429 ] || sleep "$(awk -v ms="$(sed -n 's/.*"wait":\([0-9]*\).*/\1/p' "$work/body")" 'BEGIN { print ms / 1000 }')"
+        [ "$code" = 429 ] || break
+        sleep "$(awk -v ms="$(sed -n 's/.*"wait":\([0-9]*\).*/\1/p' "$work/body")" 'BEGIN { print ms / 1000 }')"
     done
     echo "$code"
 }
@@ -47,7 +48,6 @@ expect "through a link that stays within" "inner two.txt " "$(names)"
 for path in out ../secret inner/../../secret /photo/secret .. ./../.. %2e%2e/secret; do
     visit "$free" "path=$path" >/dev/null
     expect "listing of $path" 0 "$(grep -c hidden "$work/body")"
-    visit "$free" "action=x" >/dev/null
     code=$(status "$share?FOLDER_SHARING=$free&action=download&path=$path/hidden.txt")
     expect "download of $path" "refused" "$([ "$code" = 200 ] && echo 200 || echo refused)"
 done
@@ -85,26 +85,12 @@ expect "from another address" 401 "$(visit "$file" "" --interface 127.0.0.3)"
 echo 'skip_checksrcip="yes"' >>"$demo/etc/vexoinfo.conf"
 expect "where that does not count" 200 "$(visit "$file" "" --interface 127.0.0.3)"
 
-# Windows, to the second, with both forms of an end.
+# Before and after their time; what that means to the second is tested where it is judged.
 now=$(date +%s)
-until=$((now + 4)); [ $((until % 10)) -ne 0 ] || until=$((until + 1))
-ends=$(link /photo/shared --until "$until")
-day=$(((now - 86399 + 17) / 10 * 10)) # a day's first second: valid through its last one
-last=$(link /photo/shared --until "$day")
-begins=$(link /photo/shared --from "$until" --until "$((until + 100000))")
-at() { while [ "$(date +%s)" -lt "$1" ]; do sleep 0.05; done; }
 page() { status "$share?FOLDER_SHARING=$1&action=list"; }
-expect "before the end" 200 "$(page "$ends")"
-expect "before the begin" 404 "$(page "$begins")"
-at "$until"
-expect "in the last second" 200 "$(page "$ends")"
-expect "in the first second" 200 "$(page "$begins")"
-at "$((until + 1))"
-expect "after the end" 404 "$(page "$ends")"
-at "$((day + 86399))"
-expect "in the last second of a day" 200 "$(page "$last")"
-at "$((day + 86400))"
-expect "after the day" 404 "$(page "$last")"
+expect "in time" 200 "$(page "$(link /photo/shared --from "$((now - 100000))" --until "$((now + 100000))")")"
+expect "too early" 404 "$(page "$(link /photo/shared --from "$((now + 100000))" --until "$((now + 200000))")")"
+expect "too late" 404 "$(page "$(link /photo/shared --until "$((now - 200000))")")"
 
 # Ends of links: revoked, the account ended, the owner another one.
 expect "one's own links" 7 "$(curl -s -u "alice:$(password alice)" "$site/cgi-bin/link?action=list" | grep -o '"id"' | wc -l)"
