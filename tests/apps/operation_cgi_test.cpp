@@ -1,20 +1,16 @@
 // The program operation, run as a web server runs it.
-#include "apps/program.h"
-#include "support/testing.h"
-#include "text.h"
-
-using orvel::cgi::percentEncode;
+#include "apps/cgi_test.h"
 
 namespace {
 
-class OperationCgi : public ApplianceTest {
+class OperationCgi : public CgiTest {
  protected:
-    static CgiReply ask(const std::string& user, const std::string& form, const std::string& method = "POST") {
-        if (method == "GET") return CgiReply(runCgi(PROGRAM_OPERATION, user, method, form));
-        return CgiReply(
-            runCgi(PROGRAM_OPERATION, user, method, "", form, {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
+    static CgiReply ask(const std::string& user, const std::string& form) {
+        return post(PROGRAM_OPERATION, user, form);
     }
-    static int code(const CgiReply& reply) { return reply.json["error"]["code"].asInt(); }
+    static CgiReply look(const std::string& user, const std::string& query) {
+        return get(PROGRAM_OPERATION, user, query);
+    }
     static int mkdir(const std::string& user, const std::string& path, const std::string& more = "") {
         return code(ask(user, "action=mkdir&path=" + percentEncode(path) + more));
     }
@@ -28,7 +24,7 @@ TEST_F(OperationCgi, RequestsAreTakenStrictly) {
     for (const char* form : {"", "action=burn&path=/photo/x", "action=mkdir&path_raw=/photo/%25zz"}) {
         EXPECT_EQ(ask("alice", form).status, 400) << form;
     }
-    EXPECT_EQ(ask("alice", "action=mkdir&path=/photo/x", "GET").status, 400) << "a link must change nothing";
+    EXPECT_EQ(look("alice", "action=mkdir&path=/photo/x").status, 400) << "a link must change nothing";
     EXPECT_FALSE(fs::exists(shareRoot("photo") + "/x"));
     // However late a parameter shows to be wrong.
     for (const char* form :
@@ -46,39 +42,28 @@ TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
     makeFolder(root + "/root's", 0755);
     makeFolder(root + "/old/@tmp", 0777);
     fs::create_symlink("/tmp", root + "/outside");
-    for (const auto& [user, path, more, code] :
-         Rows<std::string, std::string, std::string, int>{row("alice", "/photo/a", "", 0),
-                                                          row("alice", "/photo/a/", "", 414),
-                                                          row("alice", "/photo/p/q/r", "", 408),
-                                                          row("alice", "/photo/p/q/._r", "&parents=true", 418),
-                                                          row("alice", "/photo/p/q/r", "&parents=true", 0),
-                                                          row("carol", "/photo/c", "", 0),
-                                                          row("bob", "/photo/b", "", 407),
-                                                          row("bob", "/home/b", "", 0),
-                                                          row("alice", "/photo/root's/x", "", 407),
-                                                          row("alice", "/photo/outside/x", "", 407),
-                                                          row("alice", "/photo/@tmp", "", 418),
-                                                          row("alice", "/photo/p/@tmp/x", "&parents=true", 418),
-                                                          row("alice", "/photo/old/@tmp/x", "", 418),
-                                                          row("alice", "/photo/.vexo-part-x", "", 418),
-                                                          row("alice", "/photo", "", 400),
-                                                          row("alice", "/photo/a/..", "", 418),
-                                                          row("alice", "/photo/a:b", "", 418),
-                                                          row("alice", "/nowhere/x", "", 408),
-                                                          row("alice", "/usb/a|b", "", 419),
-                                                          row("alice", "/photo/" + std::string(256, 'n'), "", 412)}) {
-        EXPECT_EQ(mkdir(user, path, more), code) << path << more;
+    for (const auto& [user, expected, paths] : Rows<std::string, int, Names>{
+             {"alice", 0, {"/photo/a"}},
+             {"carol", 0, {"/photo/c"}},
+             {"bob", 0, {"/home/b"}},
+             {"bob", 407, {"/photo/b"}},
+             {"alice", 400, {"/photo"}},
+             {"alice", 407, {"/photo/root's/x", "/photo/outside/x"}},
+             {"alice", 408, {"/photo/p/q/r", "/nowhere/x"}},
+             {"alice", 412, {"/photo/" + std::string(256, 'n')}},
+             {"alice", 414, {"/photo/a/"}},
+             {"alice", 418, {"/photo/@tmp", "/photo/old/@tmp/x", "/photo/.vexo-part-x", "/photo/a/..", "/photo/a:b"}},
+             {"alice", 419, {"/usb/a|b"}}}) {
+        for (const std::string& path : paths) EXPECT_EQ(mkdir(user, path), expected) << path;
     }
+    EXPECT_EQ(mkdir("alice", "/photo/p/q/._r", "&parents=true"), 418);
+    EXPECT_EQ(mkdir("alice", "/photo/p/q/r", "&parents=true"), 0);
     const std::pair<std::string, unsigned> made[] = {{root + "/a", kAliceUid},
                                                      {root + "/p", kAliceUid},
                                                      {root + "/p/q/r", kAliceUid},
                                                      {root + "/c", kCarolUid},
                                                      {shareRoot("homes") + "/bob/b", kBobUid}};
-    for (const auto& [path, owner] : made) {
-        const struct stat status = statusOf(path);
-        EXPECT_TRUE(status.st_uid == owner && status.st_gid == kUsersGid) << path;
-        EXPECT_EQ(status.st_mode & 07777, 0755U) << path;
-    }
+    for (const auto& [path, owner] : made) expectOwned(path, owner, 0755);
 }
 
 TEST_F(OperationCgi, RenamingReplacesNothing) {
@@ -96,35 +81,20 @@ TEST_F(OperationCgi, RenamingReplacesNothing) {
     writeFile(shareRoot("archive") + "/f", "x");
     fs::create_symlink("folder", root + "/inside");
     fs::create_symlink("/etc", root + "/outside");
-    for (const auto& [user, path, name, code] :
-         Rows<std::string, std::string, std::string, int>{row("alice", "/photo/one", "two", 414),
-                                                          row("alice", "/photo/folder", "one", 414),
-                                                          row("alice", "/photo/one", "one", 0),
-                                                          row("alice", "/photo/folder", "folder", 0),
-                                                          row("alice", "/photo/one", "", 400),
-                                                          row("alice", "/photo/one", "folder/one", 418),
-                                                          row("alice", "/photo/one", "@tmp", 418),
-                                                          row("alice", "/photo/hidden/@tmp/x", "y", 408),
-                                                          row("alice", "/photo/hidden/@tmp", "y", 408),
-                                                          row("alice", "/photo/one", ".vexo-part-x", 418),
-                                                          row("alice", "/photo/one", "a:b", 418),
-                                                          row("alice", "/photo/one", std::string(256, 'n'), 412),
-                                                          row("alice", "/photo/missing", "x", 408),
-                                                          row("alice", "/photo", "x", 400),
-                                                          row("alice", "/photo/folder/..", "x", 418),
-                                                          row("alice", "/photo/root's/f", "x", 407),
-                                                          row("alice", "/photo/outside/passwd", "x", 407),
-                                                          row("bob", "/photo/one", "x", 407),
-                                                          row("alice", "/archive/f", "x", 407),
-                                                          row("alice", "/usb/f", "a?", 419),
-                                                          row("alice", "/photo/inside/f", "g\nh", 0),
-                                                          row("alice", "/photo/outside", "link", 0),
-                                                          row("alice", "/photo/one", "ONE", 0)}) {
-        EXPECT_EQ(rename(user, path, name), code) << path << " to " << name;
+    for (const auto& [path, name, expected] : Rows<std::string, std::string, int>{
+             row("/photo/one", "two", 414), row("/photo/folder", "one", 414), row("/photo/one", "one", 0),
+             row("/photo/folder", "folder", 0), row("/photo/one", "", 400), row("/photo", "x", 400),
+             row("/photo/one", "folder/one", 418), row("/photo/one", "@tmp", 418), row("/photo/folder/..", "x", 418),
+             row("/photo/hidden/@tmp/x", "y", 408), row("/photo/hidden/@tmp", "y", 408),
+             row("/photo/missing", "x", 408), row("/photo/root's/f", "x", 407), row("/photo/outside/passwd", "x", 407),
+             row("/archive/f", "x", 407), row("/usb/f", "a?", 419), row("/photo/inside/f", "g\nh", 0),
+             row("/photo/outside", "link", 0), row("/photo/one", "ONE", 0)}) {
+        EXPECT_EQ(rename("alice", path, name), expected) << path << " to " << name;
     }
+    EXPECT_EQ(rename("bob", "/photo/two", "x"), 407);
     EXPECT_EQ(readFile(root + "/ONE"), "/one");
     EXPECT_EQ(ask("alice", "action=rename&path=/photo/ONE&name=two").json["error"]["path"], "/photo/two");
-    EXPECT_EQ(code(ask("alice", "action=subfolders&path=/photo/hidden/@tmp", "GET")), 408);
+    EXPECT_EQ(code(look("alice", "action=subfolders&path=/photo/hidden/@tmp")), 408);
     EXPECT_EQ(readFile(root + "/two"), "/two");
     EXPECT_EQ(readFile(root + "/folder/g\nh"), "/folder/f");
     EXPECT_EQ(fs::read_symlink(root + "/link"), "/etc");
@@ -138,10 +108,8 @@ TEST_F(OperationCgi, SubFoldersOfAFolder) {
     for (const char* name : {"/b", "/a", "/a/deep", "/@tmp", "/\xFF"}) makeFolder(root + name);
     writeFile(root + "/file", "x");
     fs::create_symlink("/etc", root + "/outside");
-    const CgiReply reply = ask("bob", "action=subfolders&path=/photo", "GET");
-    std::vector<std::string> names;
-    for (const Json::Value& item : reply.json["data"]["items"]) names.push_back(item["path"].asString());
-    EXPECT_EQ(names, (std::vector<std::string>{"/photo/a", "/photo/b", "/photo/\uFFFD"}));
+    const CgiReply reply = look("bob", "action=subfolders&path=/photo");
+    EXPECT_EQ(each(reply.json["data"]["items"], "path"), (Names{"/photo/a", "/photo/b", "/photo/\uFFFD"}));
     EXPECT_EQ(reply.json["data"]["items"][2]["name_raw"], "%FF");
     EXPECT_EQ(reply.json["data"]["items"][2]["path_raw"], "/photo/%FF");
 
@@ -151,25 +119,41 @@ TEST_F(OperationCgi, SubFoldersOfAFolder) {
                                          {"/photo/missing", 408}, {"/photo/outside", 407}, {"/photo/../..", 407},
                                          {"/photo/file", 408}};
     for (const auto& [path, expected] : rows) {
-        const std::string query = std::string("action=subfolders&path=") + path;
-        EXPECT_EQ(code(ask("bob", query, "GET")), expected) << path;
+        EXPECT_EQ(code(look("bob", std::string("action=subfolders&path=") + path)), expected) << path;
     }
 }
 
-TEST_F(OperationCgi, TheTransferLogTellsWhatChanged) {
-    const std::string log = systemRoot() + "/var/log/vexo/xfer.log";
+// Of all programs that change or fetch files, as far as something happened.
+TEST_F(OperationCgi, TheTransferLogTellsWhatWasDone) {
+    SKIP_WITHOUT_ROOT();
+    writeFile(shareRoot("photo") + "/f", "0123456789", 0644);
+    const auto upload = [](const std::string& mode) {
+        runCgi(PROGRAM_UPLOAD, "alice", "PUT", "path=/photo/new&overwrite=" + mode, "data");
+    };
+    const auto download = [](const std::string& query, const Variables& more = {}, const std::string& method = "GET") {
+        runCgi(PROGRAM_DOWNLOAD, "alice", method, query, "", more);
+    };
     mkdir("alice", "/photo/silent");
-    EXPECT_FALSE(fs::exists(log));
+    download("path=/photo/f");
+    EXPECT_EQ(transferLog(), "");
     setSetting("pexlanderxferlog", "yes");
-    mkdir("alice", "/photo/a");
-    mkdir("alice", "/photo/a");
-    rename("alice", "/photo/a", "b");
-    rename("alice", "/photo/a", "b");
-    ask("alice", "action=subfolders&path=/photo", "GET");
-    const std::string text = readFile(log);
-    EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 2) << text;
-    EXPECT_LT(text.find("\"mkdir\""), text.find("\"rename\"")) << text;
-    EXPECT_EQ(text.find("\"flag\":false"), std::string::npos) << "both are folders" << text;
+    for (int i = 0; i < 2; ++i) mkdir("alice", "/photo/a");
+    for (int i = 0; i < 2; ++i) rename("alice", "/photo/a", "b");
+    look("alice", "action=subfolders&path=/photo");
+    for (const char* mode : {"error", "error", "skip"}) upload(mode);
+    download("path=/photo/f", {{"HTTP_RANGE", "bytes=2-4"}});
+    download("path=/photo/f", {}, "HEAD");
+    download("path=/photo/missing");
+    download("path=/photo/f&path=/photo/b");
+    std::string log = transferLog();
+    EXPECT_EQ(std::count(log.begin(), log.end(), '\n'), 6) << log;
+    for (const char* part : {R"("action":"mkdir","size":0,"path":"/photo/a","flag":true)", R"("action":"rename")",
+                             R"("action":"upload","size":4,"path":"/photo/new","flag":false)",
+                             R"("action":"download","size":3,"path":"/photo/f")", "\"alice\"", "127.0.0.1"}) {
+        const size_t at = log.find(part);
+        EXPECT_NE(at, std::string::npos) << part << log;
+        log.erase(0, std::min(at, log.size()));  // in this order
+    }
 }
 
 TEST_F(OperationCgi, NamesThatAreTakenAreToldInOneQuestion) {

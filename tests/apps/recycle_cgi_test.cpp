@@ -1,17 +1,13 @@
 // What is deleted, put back, and emptied.
-#include <sys/stat.h>
-
 #include "apps/task_fixture.h"
 
 namespace {
 
 TEST_F(TaskCgi, WhatIsDeletedCanBePutBack) {
-    SKIP_WITHOUT_ROOT();
     setSetting("pexlanderxferlog", "yes");
     const std::string bin = photo_ + "/#recycle";
     const auto fill = [&](const std::string& content) {
-        for (const char* file : {"/a/b/f.txt", "/a/b/f (#2).txt", "/a/g"}) writeFile(photo_ + file, content, 0600);
-        for (const char* path : {"/a", "/a/b", "/a/b/f.txt", "/a/b/f (#2).txt", "/a/g"}) give(photo_ + path);
+        writeFiles(photo_, {"/a/b/f.txt", "/a/b/f (#2).txt", "/a/g"}, content);
         ASSERT_EQ(chmod((photo_ + "/a/b").c_str(), 0700), 0);
     };
     const auto remove = [](const std::vector<std::string>& paths, const std::string& more = "") {
@@ -20,17 +16,14 @@ TEST_F(TaskCgi, WhatIsDeletedCanBePutBack) {
     fill("1");
     EXPECT_EQ(remove({"/photo/a/b/f.txt"}), "");
     EXPECT_FALSE(fs::exists(photo_ + "/a/b/f.txt")) << "no bin: for good";
-    support::makeFolder(bin, 0777);
+    openFolder(bin);
     fill("1");
     EXPECT_EQ(remove({"/photo/a/b/f.txt", "/photo/a/b/f (#2).txt"}), "");
     fill("2");
     EXPECT_EQ(remove({"/photo/a/b/f.txt", "/photo/a/none"}), "/photo/a/none 408\n");
     EXPECT_EQ(readFile(bin + "/a/b/f.txt") + readFile(bin + "/a/b/f (#2).txt"), "12");
     EXPECT_EQ(readFile(bin + "/a/b/f (#2) (#1).txt"), "1");
-    struct stat status {};
-    ASSERT_EQ(stat((bin + "/a/b").c_str(), &status), 0);
-    EXPECT_EQ(status.st_mode & 07777, 0700U) << "no more open than it was";
-    EXPECT_EQ(status.st_uid, support::kAliceUid);
+    expectOwned(bin + "/a/b", kAliceUid, 0700);  // no more open than it was
     EXPECT_EQ(remove({"/photo/a"}), "");
     EXPECT_EQ(readFile(bin + "/a (#2)/g"), "2");
 
@@ -71,7 +64,7 @@ TEST_F(TaskCgi, WhatIsDeletedCanBePutBack) {
     EXPECT_EQ(emptied["items_skipped"], 1) << "the folder that stays with it";
     EXPECT_FALSE(fs::exists(bin + "/a"));
     EXPECT_EQ(code(ask("alice", "action=empty&path=/video")), 408) << "no bin";
-    const std::string log = readFile(systemRoot() + "/var/log/vexo/xfer.log");
+    const std::string log = transferLog();
     EXPECT_EQ(std::count(log.begin(), log.end(), '\n'), 14) << log;
     EXPECT_NE(log.find(R"("action":"delete","size":0,"path":"/photo/a/b/f.txt","flag":false)"), std::string::npos);
     EXPECT_NE(log.find(R"("action":"delete","size":0,"path":"/photo/a","flag":true)"), std::string::npos);

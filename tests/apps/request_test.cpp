@@ -39,15 +39,11 @@ TEST(Request, ListsOfPathsNameTheFolderOnce) {
 
 TEST(ClientAddress, IsWhatTheLastTrustedProxySaw) {
     const std::vector<std::string> proxies = {"10.0.0.1", "2001:db8::1"};
-    for (const auto& [forwarded, client] :
-         Rows<const char*, const char*>{{"192.0.2.1", "192.0.2.1"},
-                                        {"198.51.100.7, 192.0.2.1", "192.0.2.1"},
-                                        {"198.51.100.7,192.0.2.1 , ::ffff:10.0.0.1,2001:DB8:0::1", "192.0.2.1"},
-                                        {"10.0.0.1", "10.0.0.1"},
-                                        {"192.0.2.1, unknown", "10.0.0.9"},
-                                        {"192.0.2.1, , 10.0.0.1", "10.0.0.1"},
-                                        {"2001:db8::7", "2001:db8::7"},
-                                        {"", "10.0.0.9"}}) {
+    for (const auto& [forwarded, client] : Rows<const char*, const char*>{
+             row("192.0.2.1", "192.0.2.1"), row("198.51.100.7, 192.0.2.1", "192.0.2.1"),
+             row("198.51.100.7,192.0.2.1 , ::ffff:10.0.0.1,2001:DB8:0::1", "192.0.2.1"), row("10.0.0.1", "10.0.0.1"),
+             row("192.0.2.1, unknown", "10.0.0.9"), row("192.0.2.1, , 10.0.0.1", "10.0.0.1"),
+             row("2001:db8::7", "2001:db8::7"), row("", "10.0.0.9")}) {
         EXPECT_EQ(clientBehind(forwarded, "10.0.0.9", proxies), client) << forwarded;
     }
 }

@@ -6,30 +6,20 @@
 #include <map>
 #include <set>
 
-#include "apps/program.h"
+#include "apps/cgi_test.h"
 #include "support/gate.h"
-#include "support/testing.h"
-#include "text.h"
 #include "vexo/task.h"
-
-using orvel::cgi::percentEncode;
 
 namespace {
 
 constexpr const char* kIndexed = "read only = no\nvexo:index = yes\n";
 constexpr const char* kProperties = "additional=size,owner,time,perm,type,real_path";
 
-class SearchCgi : public ApplianceTest {
+class SearchCgi : public CgiTest {
  protected:
-    static CgiReply post(const std::string& program, const std::string& user, const std::string& form,
-                         Variables more = {}) {
-        more["CONTENT_TYPE"] = "application/x-www-form-urlencoded";
-        return CgiReply(runCgi(program, user, "POST", "", form, more));
-    }
     static CgiReply ask(const std::string& user, const std::string& form, const Variables& more = {}) {
         return post(PROGRAM_SEARCH, user, form, more);
     }
-    static int code(const CgiReply& reply) { return reply.json["error"]["code"].asInt(); }
     static std::string start(const std::string& user, const std::string& form, const Variables& more = {}) {
         const CgiReply reply = ask(user, "action=start&" + form, more);
         EXPECT_TRUE(reply.json["success"].asBool()) << form << reply.body;
@@ -37,7 +27,7 @@ class SearchCgi : public ApplianceTest {
         return started().back().second;
     }
     static CgiReply list(const std::string& user, const std::string& id, const std::string& more = "") {
-        return CgiReply(runCgi(PROGRAM_SEARCH, user, "GET", "action=list&" + more + "&limit=10000&taskid=" + id));
+        return get(PROGRAM_SEARCH, user, "action=list&" + more + "&limit=10000&taskid=" + id);
     }
     // Waits until the state of a search satisfies `ready`.
     static CgiReply await(const std::string& user, const std::string& id,
@@ -181,60 +171,46 @@ TEST_F(SearchCgi, RequestsAreTakenStrictly) {
     std::string manyPatterns = "a", manyFolders;
     for (int i = 0; i < 100; ++i) manyPatterns += ",a";
     for (int i = 0; i < 501; ++i) manyFolders += "&path=/photo";
-    struct {
-        std::string form;
-        int status, code;
-        std::string parameter;
-    } const cases[] = {
-        {"", 400, 400, ""},
-        {"action=burn", 400, 400, ""},
-        {"action=start&path=/photo", 400, 400, ""},
-        {"action=start&path=/photo&name=&type=all", 400, 400, ""},
-        {"action=start&name=a", 400, 400, ""},
-        {"action=start&name=a" + manyFolders, 400, 400, ""},
-        {"action=start&name=a&path_raw=/photo/%25zz", 400, 400, ""},
-        {"action=start&name=a&path=/photo&recursive=maybe", 400, 400, ""},
-        {"action=start&path=/photo&name=%20,%20", 400, 400, "name"},
-        {"action=start&path=/photo&name=" + longPattern, 400, 400, "name"},
-        {"action=start&path=/photo&name=" + std::string(10000, '*'), 400, 400, "name"},
-        {"action=start&path=/photo&name=" + manyPatterns, 400, 400, "name"},
-        {"action=start&path=/photo&type=link", 400, 400, "type"},
-        {"action=start&path=/photo&extension=,", 400, 400, "extension"},
-        {"action=start&path=/photo&owner=nobody%20here", 200, 403, "owner"},
-        {"action=start&path=/photo&group=*", 200, 404, "group"},
-        {"action=start&path=/photo&mtime_from=yesterday", 400, 400, "mtime_from"},
-        {"action=start&path=/photo&crtime_to=-1", 400, 400, "crtime_to"},
-        {"action=start&path=/photo&atime_to=1e9", 400, 400, "atime_to"},
-        {"action=start&path=/photo&size_less=10%20MB", 400, 400, "size_less"},
-        {"action=start&path=/photo&size_equal=99999999999999999999", 400, 400, "size_equal"},
-        {"action=start&name=a&path=", 400, 400, ""},
-        {"action=start&name=a&path=/", 200, 401, ""},
-        {"action=start&name=a&path=/nowhere", 200, 408, ""},
-        {"action=start&name=a&path=/photo&path=/photo/missing", 200, 408, ""},
-        {"action=start&name=a&path=/photo/file", 200, 408, ""},
-        {"action=start&name=a&path=/photo/outside", 200, 407, ""},
-        {"action=start&name=a&path=/photo/%23recycle", 200, 407, ""},
-        {"action=start&name=a&path=/photo/../..", 200, 407, ""},
-        {"action=list&taskid=../alice", 400, 400, ""},
-        {"action=list&taskid=", 400, 400, ""},
-        {"action=stop&taskid=5a1f", 400, 400, ""},
-        {"action=clean&taskid=../../../../etc/passwd", 400, 400, ""},
-        {"action=clean&taskid=" + std::string(17, 'A'), 400, 400, ""},
-        {"action=list&taskid=5A1F", 200, 408, ""},
-        {"action=stop&taskid=5A1F", 200, 408, ""},
-        {"action=clean&taskid=5A1F", 200, 408, ""},
-    };
-    for (const auto& broken : cases) {
-        const CgiReply reply = ask("alice", broken.form);
-        EXPECT_EQ(reply.status, broken.status) << broken.form;
-        EXPECT_EQ(code(reply), broken.code) << broken.form;
-        EXPECT_EQ(reply.json["data"]["parameter"], broken.parameter.empty() ? Json::Value() : broken.parameter)
-            << broken.form;
+    const std::string start = "action=start&path=/photo&", named = "action=start&name=a";
+    for (const auto& [parameter, forms] : Rows<std::string, Names>{
+             {"",
+              {"", "action=burn", "action=start&path=/photo", start + "name=&type=all", named, named + manyFolders,
+               named + "&path_raw=/photo/%25zz", start + "name=a&recursive=maybe",
+               named + "&path=", "action=list&taskid=../alice", "action=list&taskid=", "action=stop&taskid=5a1f",
+               "action=clean&taskid=../../../../etc/passwd", "action=clean&taskid=" + std::string(17, 'A')}},
+             {"name",
+              {start + "name=%20,%20", start + "name=" + longPattern, start + "name=" + std::string(10000, '*'),
+               start + "name=" + manyPatterns}},
+             {"type", {start + "type=link"}},
+             {"extension", {start + "extension=,"}},
+             {"mtime_from", {start + "mtime_from=yesterday"}},
+             {"crtime_to", {start + "crtime_to=-1"}},
+             {"atime_to", {start + "atime_to=1e9"}},
+             {"size_less", {start + "size_less=10%20MB"}},
+             {"size_equal", {start + "size_equal=99999999999999999999"}}}) {
+        for (const std::string& form : forms) {
+            const CgiReply reply = ask("alice", form);
+            EXPECT_TRUE(reply.status == 400 && code(reply) == 400) << form;
+            EXPECT_EQ(reply.json["data"]["parameter"], parameter.empty() ? Json::Value() : parameter) << form;
+        }
+    }
+    for (const auto& [refusal, forms] : Rows<int, Names>{
+             {401, {named + "&path=/"}},
+             {403, {start + "owner=nobody%20here"}},
+             {404, {start + "group=*"}},
+             {407, {named + "&path=/photo/outside", named + "&path=/photo/%23recycle", named + "&path=/photo/../.."}},
+             {408,
+              {named + "&path=/nowhere", named + "&path=/photo&path=/photo/missing", named + "&path=/photo/file",
+               "action=list&taskid=5A1F", "action=stop&taskid=5A1F", "action=clean&taskid=5A1F"}}}) {
+        for (const std::string& form : forms) {
+            const CgiReply reply = ask("alice", form);
+            EXPECT_TRUE(reply.status == 200 && code(reply) == refusal) << form << code(reply);
+        }
     }
     EXPECT_EQ(ask("", "action=list&taskid=5A1F").status, 401);
     for (const std::string action : {"start", "stop", "clean"}) {
         const std::string query = "action=" + action + "&path=/photo&name=a&taskid=5A1F";
-        EXPECT_EQ(CgiReply(runCgi(PROGRAM_SEARCH, "alice", "GET", query)).status, 400) << action;
+        EXPECT_EQ(get(PROGRAM_SEARCH, "alice", query).status, 400) << action;
     }
 }
 

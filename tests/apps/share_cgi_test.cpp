@@ -1,13 +1,9 @@
 // The program share as a web server runs it: who is let in, whose password is judged when. The time of guesses stands
 // where a test puts it.
-#include <sys/stat.h>
-
 #include <sstream>
 
-#include "apps/program.h"
+#include "apps/cgi_test.h"
 #include "public_link.h"
-#include "support/testing.h"
-#include "text.h"
 #include "vexo/guess.h"
 
 namespace {
@@ -17,7 +13,7 @@ using orvel::cgi::LinkStore;
 
 constexpr const char* kPassword = "pass word";
 
-class ShareCgi : public ApplianceTest {
+class ShareCgi : public CgiTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -30,14 +26,11 @@ class ShareCgi : public ApplianceTest {
         guarded_ = addLink("alice", kAliceUid, kPassword);
     }
     static std::string addLink(const std::string& owner, uid_t uid, const std::string& password) {
-        Link link = {.id = "",
-                     .owner = owner,
-                     .uid = uid,
-                     .path = "/photo/shared",
-                     .passwordHash = password.empty() ? "" : orvel::cgi::hashPassword(password),
-                     .available = 0,
-                     .expires = 0,
-                     .created = 0};
+        Link link;
+        link.owner = owner;
+        link.uid = uid;
+        link.path = "/photo/shared";
+        if (!password.empty()) link.passwordHash = orvel::cgi::hashPassword(password);
         LinkStore store;
         EXPECT_TRUE(store.add(link)) << store.error();
         return link.id;
@@ -55,7 +48,7 @@ class ShareCgi : public ApplianceTest {
         return CgiReply(ask(link, "action=" + action)).status;
     }
     CgiReply enter(const std::string& password, const std::string& turn = "") {
-        const std::string form = "action=login&password=" + orvel::cgi::percentEncode(password) + "&turn=" + turn;
+        const std::string form = "action=login&password=" + percentEncode(password) + "&turn=" + turn;
         last_ = ask(guarded_, "", "POST", form);
         return CgiReply(last_);
     }
@@ -180,16 +173,14 @@ TEST_F(ShareCgi, APathNamedAgainAndAgainIsPackedOnce) {
 
 TEST_F(ShareCgi, WhatCannotBePublished) {
     ASSERT_EQ(mkfifo((shareRoot("photo") + "/pipe").c_str(), 0666), 0);
-    for (const auto& [path, dates, code] : Rows<const char*, const char*, int>{
+    for (const auto& [path, dates, expected] : Rows<const char*, const char*, int>{
              row("/photo/pipe", "", ORV_ERR_DENIED),
              row("/photo/shared", "&available=5&expires=9223372036854775807", ORV_ERR_PARAMETER),
              row("/photo/shared", "&expires=9223372036854775808", ORV_ERR_PARAMETER),
              row("/photo/shared", "&available=9223372036854775808&expires=5", ORV_ERR_PARAMETER),
              row("/photo/shared", "&available=5&expires=9223372036854689407", 0)}) {
         const std::string form = std::string("action=create&path=") + path + dates;
-        const CgiReply reply(
-            runCgi(PROGRAM_LINK, "alice", "POST", "", form, {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
-        EXPECT_EQ(reply.json["error"]["code"].asInt(), code) << form;
+        EXPECT_EQ(code(post(PROGRAM_LINK, "alice", form)), expected) << form;
     }
 }
 

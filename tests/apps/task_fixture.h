@@ -2,27 +2,9 @@
 #ifndef ORVEL_TESTS_APPS_TASK_FIXTURE_H
 #define ORVEL_TESTS_APPS_TASK_FIXTURE_H
 
-#include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <algorithm>
-#include <filesystem>
-#include <memory>
-#include <string>
-#include <vector>
-
-#include "apps/program.h"
-#include "support/appliance.h"
+#include "apps/cgi_test.h"
 #include "support/wait.h"
-#include "text.h"
 #include "vexo/task.h"
-
-namespace fs = std::filesystem;
-using orvel::cgi::percentEncode;
-using support::CgiReply;
-using support::readFile;
-using support::writeFile;
 
 // "path=..&path=.." of these paths, and a target unless it is empty.
 inline std::string about(const std::vector<std::string>& paths, const std::string& target = "") {
@@ -31,52 +13,59 @@ inline std::string about(const std::vector<std::string>& paths, const std::strin
     return target.empty() ? form : form + "&target=" + percentEncode(target);
 }
 
-// What lies below a folder: a line for each entry with its permissions, and a file's content or a link's text.
-inline std::string treeOf(const std::string& root) {
-    std::vector<std::string> lines;
+// The paths below a folder with what `shown` says of each, sorted; nothing where it says nothing.
+inline std::string treeOf(const std::string& root,
+                          const std::function<std::string(const fs::directory_entry& entry)>& shown) {
+    Names lines;
     for (const auto& entry : fs::recursive_directory_iterator(root)) {
-        struct stat status {};
-        lstat(entry.path().c_str(), &status);
-        std::string line = entry.path().string().substr(root.size()) + " " + std::to_string(status.st_mode);
-        if (entry.is_symlink()) {
-            line += " " + fs::read_symlink(entry.path()).string();
-        } else if (entry.is_regular_file()) {
-            line += " " + std::to_string(status.st_mtime) + " " + readFile(entry.path());
-        }
-        lines.push_back(line);
+        const std::string text = shown(entry);
+        if (!text.empty()) lines.push_back(entry.path().string().substr(root.size() + 1) + text);
     }
     std::sort(lines.begin(), lines.end());
     std::string all;
-    for (const std::string& line : lines) all += line + "\n";
+    for (const std::string& line : lines) all += (all.empty() ? "" : " ") + line;
     return all;
 }
 
-class TaskCgi : public support::ApplianceTest {
+// The files with their contents.
+inline std::string filesOf(const std::string& root) {
+    return treeOf(root, [](const auto& file) { return file.is_regular_file() ? "=" + readFile(file.path()) : ""; });
+}
+
+// Everything with its permissions, and a file's time and content or a link's text.
+inline std::string treeOf(const std::string& root) {
+    return treeOf(root, [](const auto& entry) {
+        const struct stat status = statusOf(entry.path());
+        const std::string kind = " " + std::to_string(status.st_mode) + " ";
+        if (entry.is_symlink()) return kind + fs::read_symlink(entry.path()).string();
+        return entry.is_directory() ? kind : kind + std::to_string(status.st_mtime) + " " + readFile(entry.path());
+    });
+}
+
+class TaskCgi : public support::CgiTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
+        SKIP_WITHOUT_ROOT();
         photo_ = addShare("photo", "read only = no\nvalid users = alice, carol\nread list = bob\n");
         video_ = addShare("video", "read only = no\n");
     }
-    static CgiReply ask(const std::string& user, const std::string& form, support::Variables more = {}) {
-        more["CONTENT_TYPE"] = "application/x-www-form-urlencoded";
-        return CgiReply(support::runCgi(PROGRAM_OPERATION, user, "POST", "", form, more));
+    static CgiReply ask(const std::string& user, const std::string& form, const Variables& more = {}) {
+        return post(PROGRAM_OPERATION, user, form, more);
     }
-    static int code(const CgiReply& reply) { return reply.json["error"]["code"].asInt(); }
     // Starts an operation. "" when it was refused.
-    static std::string start(const std::string& user, const std::string& form, const support::Variables& more = {}) {
+    static std::string start(const std::string& user, const std::string& form, const Variables& more = {}) {
         const CgiReply reply = ask(user, form, more);
         EXPECT_EQ(reply.status, 200) << form;
         return reply.json["data"]["taskid"].asString();
     }
     static Json::Value status(const std::string& user, const std::string& id) {
-        return CgiReply(support::runCgi(PROGRAM_OPERATION, user, "GET", "action=status&taskid=" + id)).json["data"];
+        return get(PROGRAM_OPERATION, user, "action=status&taskid=" + id).json["data"];
     }
     static Json::Value ended(const std::string& user, const std::string& id) {
         const std::unique_ptr<KTR::Task> task(KTR::TaskMgr(user.c_str()).getTask(id.c_str()));
         EXPECT_NE(task, nullptr) << id;
-        support::waitUntil("the end of " + id,
-                           [&] { return task == nullptr || (task->reload() && task->isFinished()); });
+        waitUntil("the end of " + id, [&] { return task == nullptr || (task->reload() && task->isFinished()); });
         return status(user, id);
     }
     static Json::Value perform(const std::string& user, const std::string& form) {
@@ -93,14 +82,13 @@ class TaskCgi : public support::ApplianceTest {
         return all;
     }
     static std::string recordOf(const std::string& id) { return systemRoot() + "/var/lib/vexo/tasks/alice/" + id; }
-    static bool hasParts(const std::string& root) {
-        for (const auto& entry : fs::recursive_directory_iterator(root)) {
-            if (entry.path().filename().string().starts_with(".vexo-part-")) return true;
+    static bool hasParts(const std::string& root) { return treeOf(root).find(".vexo-part-") != std::string::npos; }
+    // What alice may read and change, the folders above it too.
+    static void writeFiles(const std::string& root, const Names& paths, const std::string& text = "") {
+        for (const std::string& path : paths) {
+            writeFile(root + path, text.empty() ? path : text, 0666);
+            for (fs::path at = root + path; at != root; at = at.parent_path()) give(at);
         }
-        return false;
-    }
-    static void give(const std::string& path, uid_t owner = support::kAliceUid) {
-        EXPECT_EQ(lchown(path.c_str(), owner, support::kUsersGid), 0) << path;
     }
     std::string photo_, video_;
 };

@@ -1,7 +1,5 @@
 // Copies and moves.
-#include <fcntl.h>
 #include <sys/mount.h>
-#include <sys/stat.h>
 
 #include <map>
 
@@ -12,8 +10,7 @@
 namespace {
 
 TEST_F(TaskCgi, CopiesKeepWhatFilesAre) {
-    SKIP_WITHOUT_ROOT();
-    support::makeFolder(photo_ + "/a/b", 0777);
+    makeFolder(photo_ + "/a/b", 0777);
     writeFile(photo_ + "/a/private", "secret", 0600);
     writeFile(photo_ + "/a/b/tool", "#!", 0755);
     writeFile(photo_ + "/a/b/\xFFraw\n", "bytes");
@@ -38,16 +35,12 @@ TEST_F(TaskCgi, CopiesKeepWhatFilesAre) {
     EXPECT_FALSE(fs::exists(video_ + "/a/@vexoea"));
     fs::remove_all(photo_ + "/a/@vexoea");
     EXPECT_TRUE(treeOf(photo_ + "/a") == treeOf(video_ + "/a"));
-    struct stat copied {};
-    ASSERT_EQ(stat((video_ + "/a/holes").c_str(), &copied), 0);
-    EXPECT_LT(copied.st_blocks, 100) << "holes stay holes";
-    EXPECT_EQ(copied.st_uid, support::kAliceUid);
-    ASSERT_EQ(stat((video_ + "/a/b").c_str(), &copied), 0);
-    EXPECT_EQ(copied.st_mtime, 1000000000);
+    EXPECT_LT(statusOf(video_ + "/a/holes").st_blocks, 100) << "holes stay holes";
+    EXPECT_EQ(statusOf(video_ + "/a/holes").st_uid, kAliceUid);
+    EXPECT_EQ(statusOf(video_ + "/a/b").st_mtime, 1000000000);
 }
 
 TEST_F(TaskCgi, ConflictsAreSolvedAsAsked) {
-    SKIP_WITHOUT_ROOT();
     struct {
         const char *policy, *errors, *tree;  // names and contents in the target
         int done, skipped;
@@ -59,25 +52,14 @@ TEST_F(TaskCgi, ConflictsAreSolvedAsAsked) {
     for (const char* action : {"copy", "move"}) {
         for (const auto& [policy, refused, tree, done, skipped] : cases) {
             SCOPED_TRACE(std::string(action) + " " + policy);
-            for (const std::string& root : {photo_, video_}) fs::remove_all(root), support::makeFolder(root, 0777);
-            ASSERT_EQ(chmod(photo_.c_str(), 0777) + chmod(video_.c_str(), 0777), 0);
-            for (const char* file : {"/a.txt", "/d/x", "/d/y", "/m"}) writeFile(photo_ + file, "new", 0666);
-            for (const char* file : {"/a.txt", "/d/x", "/m/f"}) writeFile(video_ + file, "old", 0666);
-            for (const std::string& folder : {photo_ + "/d", video_ + "/d", video_ + "/m"}) give(folder);
+            for (const std::string& root : {photo_, video_}) fs::remove_all(root), openFolder(root);
+            writeFiles(photo_, {"/a.txt", "/d/x", "/d/y", "/m"}, "new");
+            writeFiles(video_, {"/a.txt", "/d/x", "/m/f"}, "old");
             const Json::Value task = perform("alice", "action=" + std::string(action) + "&conflict=" + policy +
                                                           about({"/photo/a.txt", "/photo/d", "/photo/m"}, "/video"));
             EXPECT_EQ(errors(task), refused);
             EXPECT_EQ(task["state"], "done");
-            std::string found;
-            std::vector<std::string> paths;
-            for (const auto& entry : fs::recursive_directory_iterator(video_)) {
-                if (entry.is_regular_file()) paths.push_back(entry.path());
-            }
-            std::sort(paths.begin(), paths.end());
-            for (const std::string& path : paths) {
-                found += (found.empty() ? "" : " ") + path.substr(video_.size() + 1) + "=" + readFile(path);
-            }
-            EXPECT_EQ(found, tree);
+            EXPECT_EQ(filesOf(video_), tree);
             if (std::string(action) == "copy") {
                 EXPECT_EQ(task["items_done"], done);
                 EXPECT_EQ(task["items_skipped"], skipped);
@@ -93,7 +75,6 @@ TEST_F(TaskCgi, ConflictsAreSolvedAsAsked) {
 
 // A link that climbs far is harmless deep in a share alone.
 TEST_F(TaskCgi, ALinkThatWouldLeadOutStaysWhereItIs) {
-    SKIP_WITHOUT_ROOT();
     writeFile(photo_ + "/a/b/f", "x", 0666);
     for (const auto& [text, link] : std::map<std::string, std::string>{
              {"../f", "/a/b/c/near"}, {"../../../..", "/a/b/c/d/top"}, {"/etc", "/a/b/c/d/e/absolute"}}) {
@@ -102,41 +83,31 @@ TEST_F(TaskCgi, ALinkThatWouldLeadOutStaysWhereItIs) {
     }
     fs::create_directories(photo_ + "/a/b/c/deeper");
     for (const auto& entry : fs::recursive_directory_iterator(photo_)) give(entry.path());
-    struct {
-        const char *path, *target;
-        bool passes;
-    } const cases[] = {{"/photo/a/b/c/d", "/photo/a", false},
-                       {"/photo/a/b/c/d", "/photo", false},
-                       {"/photo/a/b/c/d/top", "/photo/a", false},
-                       {"/photo/a/b", "/photo", false},
-                       {"/photo/a/b/c/d", "/video", false},
-                       {"/photo/a/b/c/d/e", "/photo", true},
-                       {"/photo/a/b/c/near", "/photo/a", true},
-                       {"/photo/a/near", "/video", false},
-                       {"/photo/a/b/c/d", "/photo/a/b/c/deeper", true}};
     for (const char* action : {"copy", "move"}) {
-        for (const auto& [path, target, passes] : cases) {
-            if (action[0] == 'c' && !fs::exists(fs::symlink_status(shareRoot("photo") + (path + 6)))) continue;
+        for (const auto& [path, target, passes] : Rows<std::string, std::string, bool>{
+                 row("/photo/a/b/c/d", "/photo/a", false), row("/photo/a/b/c/d", "/photo", false),
+                 row("/photo/a/b/c/d/top", "/photo/a", false), row("/photo/a/b", "/photo", false),
+                 row("/photo/a/b/c/d", "/video", false), row("/photo/a/b/c/d/e", "/photo", true),
+                 row("/photo/a/b/c/near", "/photo/a", true), row("/photo/a/near", "/video", false),
+                 row("/photo/a/b/c/d", "/photo/a/b/c/deeper", true)}) {
+            const bool isCopy = *action == 'c';
+            if (isCopy && !fs::exists(fs::symlink_status(photo_ + path.substr(6)))) continue;
             const auto task = perform("alice", std::string("action=") + action + about({path}, target));
-            EXPECT_EQ(errors(task), passes ? "" : path + std::string(" 407\n")) << action << path << target;
-            if (action[0] == 'c' && passes) {
-                fs::remove_all(shareRoot("photo") + (target + 6) + "/" + fs::path(path).filename().string());
-            }
+            EXPECT_EQ(errors(task), passes ? "" : path + " 407\n") << action << path << target;
+            if (isCopy && passes) fs::remove_all(photo_ + target.substr(6) + path.substr(path.rfind('/')));
         }
     }
 }
 
 TEST_F(TaskCgi, SourcesAndTargetsAreJudged) {
-    SKIP_WITHOUT_ROOT();
     addShare("fixed", "read only = no\nvexo:restriction = 2\n");
     addShare("locked", "read only = no\nvexo:restriction = 4\n");
     const std::string fat = addShare("usb", "read only = no\n");
     addMount(fat, "vfat");
     for (const char* share : {"fixed", "locked"}) writeFile(shareRoot(share) + "/f", "x", 0666);
     writeFile(photo_ + "/a/b/f", "1", 0666);
-    for (const char* name : {"/case/Name", "/case/name", "/case/q?"}) writeFile(photo_ + name, name, 0666);
     give(photo_ + "/a");
-    give(photo_ + "/case");
+    writeFiles(photo_, {"/case/Name", "/case/name", "/case/q?"});
     fs::create_symlink("/etc", photo_ + "/out");
     struct {
         const char *user, *form;
@@ -177,9 +148,7 @@ TEST_F(TaskCgi, SourcesAndTargetsAreJudged) {
     EXPECT_EQ(readFile(photo_ + "/a (2)/b/f"), "1");
     EXPECT_EQ(readFile(shareRoot("homes") + "/alice/a/b/f"), "1");
     for (const char* made : {"/case", "/case/name", "/out"}) {
-        struct stat status {};
-        EXPECT_EQ(lstat((shareRoot("homes") + "/carol" + made).c_str(), &status), 0);
-        EXPECT_EQ(status.st_uid, support::kCarolUid) << made << ": not root's";
+        EXPECT_EQ(statusOf(shareRoot("homes") + "/carol" + made).st_uid, kCarolUid) << made << ": not root's";
     }
     EXPECT_EQ(readFile(fat + "/case/Name"), "/case/Name");
     for (const char* form : {"action=copy&target=/video", "action=copy&path=/photo/a&target=/video&taskid=../x",
@@ -189,14 +158,13 @@ TEST_F(TaskCgi, SourcesAndTargetsAreJudged) {
 }
 
 TEST_F(TaskCgi, AFullDiskFailsItsItemAndTheRestGoesOn) {
-    SKIP_WITHOUT_ROOT();
     const std::string small = addShare("small", "read only = no\n");
     writeFile(photo_ + "/t/1", "one", 0666);
     writeFile(photo_ + "/t/2big", std::string(3 << 20, 'x'), 0666);
     writeFile(photo_ + "/t/3", "three", 0666);
     give(photo_ + "/t");
-    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
-        if (mount("none", small.c_str(), "tmpfs", 0, "size=1m,mode=0777") != 0) return support::kNoPrivateMounts;
+    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
+        if (mount("none", small.c_str(), "tmpfs", 0, "size=1m,mode=0777") != 0) return kNoPrivateMounts;
         const Json::Value task = perform("alice", "action=copy" + about({"/photo/t"}, "/small"));
         EXPECT_EQ(errors(task), "/photo/t/2big 416\n");
         EXPECT_EQ(task["state"], "done");
@@ -210,23 +178,19 @@ TEST_F(TaskCgi, AFullDiskFailsItsItemAndTheRestGoesOn) {
 }
 
 TEST_F(TaskCgi, MovesAreRenamesOrCopiesThatGo) {
-    SKIP_WITHOUT_ROOT();
     const std::string other = addShare("other", "read only = no\n");
     for (const char* file : {"/d/x", "/e/sub/y", "/stuck/z"}) writeFile(photo_ + file, file, 0666);
     writeFile(photo_ + "/e/@vexoea/meta", "", 0666);
     writeFile(photo_ + "/e/@tmp/f", "theirs", 0666);
     writeFile(photo_ + "/e/.vexo-part-x", "of a killed process", 0666);
     for (const char* folder : {"/d", "/e", "/e/sub", "/e/@vexoea", "/e/@tmp"}) give(photo_ + folder);
-    struct stat before {
-    }, after{};
-    ASSERT_EQ(stat((photo_ + "/d/x").c_str(), &before), 0);
-    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
-        if (mount("none", other.c_str(), "tmpfs", 0, "mode=0777") != 0) return support::kNoPrivateMounts;
+    const ino_t before = statusOf(photo_ + "/d/x").st_ino;
+    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
+        if (mount("none", other.c_str(), "tmpfs", 0, "mode=0777") != 0) return kNoPrivateMounts;
         Json::Value task = perform("alice", "action=move" + about({"/photo/d"}, "/video"));
         EXPECT_EQ(task["items_done"], 1);
         EXPECT_EQ(task["bytes_total"], 0);
-        EXPECT_EQ(stat((video_ + "/d/x").c_str(), &after), 0);
-        EXPECT_EQ(before.st_ino, after.st_ino);
+        EXPECT_EQ(statusOf(video_ + "/d/x").st_ino, before);
         task = perform("alice", "action=move" + about({"/photo/e", "/photo/stuck/z"}, "/other"));
         EXPECT_EQ(errors(task), "/photo/stuck/z 407\n");
         EXPECT_EQ(task["items_done"], 3) << "what is never shown is not counted";
@@ -235,7 +199,7 @@ TEST_F(TaskCgi, MovesAreRenamesOrCopiesThatGo) {
         EXPECT_TRUE(fs::exists(other + "/e/@vexoea/meta"));
         EXPECT_FALSE(fs::exists(photo_ + "/e"));
         EXPECT_EQ(readFile(other + "/z") + readFile(photo_ + "/stuck/z"), "/stuck/z/stuck/z") << "lost nowhere";
-        if (mount("none", (video_ + "/d").c_str(), "tmpfs", 0, "mode=0777") != 0) return support::kNoPrivateMounts;
+        if (mount("none", (video_ + "/d").c_str(), "tmpfs", 0, "mode=0777") != 0) return kNoPrivateMounts;
         writeFile(video_ + "/d/theirs", "x", 0666);
         EXPECT_EQ(errors(perform("alice", "action=delete" + about({"/video/d"}))), "/video/d 421\n");
         EXPECT_EQ(readFile(video_ + "/d/theirs"), "x") << "mounted ones stay";
@@ -245,28 +209,22 @@ TEST_F(TaskCgi, MovesAreRenamesOrCopiesThatGo) {
 
 // A move to another file system whose copy does not come to the disk, or not to its end, leaves the source.
 TEST_F(TaskCgi, NothingIsRemovedBeforeItsCopyIsOnTheDisk) {
-    SKIP_WITHOUT_ROOT();
     const std::string other = addShare("other", "read only = no\n");
     struct {
-        support::Refusal refusal;
+        Refusal refusal;
         bool single;  // what was chosen by itself stays, too
-    } const cases[] = {{{SYS_fsync, EIO}, true},
-                       {{SYS_syncfs, EIO}, false},
-                       {{SYS_fsync, support::kKilled}, true},
-                       {{SYS_syncfs, support::kKilled}, true},
-                       {{SYS_unlinkat, EACCES}, true},
-                       {{SYS_unlinkat, support::kKilled}, true},
+    } const cases[] = {{{SYS_fsync, EIO}, true},      {{SYS_syncfs, EIO}, false},     {{SYS_fsync, kKilled}, true},
+                       {{SYS_syncfs, kKilled}, true}, {{SYS_unlinkat, EACCES}, true}, {{SYS_unlinkat, kKilled}, true},
                        {{SYS_ftruncate, EIO}, true}};
     for (const auto& [refusal, single] : cases) {
         SCOPED_TRACE(std::to_string(refusal.call) + " " + std::to_string(refusal.systemCode));
-        for (const char* file : {"/t/a", "/t/sub/b", "/t/sub/c", "/single"}) writeFile(photo_ + file, file, 0666);
-        for (const char* folder : {"/t", "/t/sub"}) give(photo_ + folder);
-        EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&, wanted = refusal, stays = single] {
-            if (mount("none", other.c_str(), "tmpfs", 0, "mode=0777") != 0) return support::kNoPrivateMounts;
-            if (!support::refuseCalls({wanted})) return 97;
+        writeFiles(photo_, {"/t/a", "/t/sub/b", "/t/sub/c", "/single"});
+        EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&, wanted = refusal, stays = single] {
+            if (mount("none", other.c_str(), "tmpfs", 0, "mode=0777") != 0) return kNoPrivateMounts;
+            if (!refuseCalls({wanted})) return 97;
             const std::string id = start("alice", "action=move" + about({"/photo/t", "/photo/single"}, "/other"));
             const Json::Value task = ended("alice", id);
-            EXPECT_TRUE(wanted.systemCode == support::kKilled || task["items_failed"].asInt() > 0) << errors(task);
+            EXPECT_TRUE(wanted.systemCode == kKilled || task["items_failed"].asInt() > 0) << errors(task);
             for (const char* file : {"/t/a", "/t/sub/b", "/t/sub/c"}) EXPECT_EQ(readFile(photo_ + file), file);
             EXPECT_TRUE(!stays || readFile(photo_ + "/single") == "/single");
             return 0;

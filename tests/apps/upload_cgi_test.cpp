@@ -6,26 +6,21 @@
 #include <fstream>
 #include <thread>
 
-#include "apps/program.h"
+#include "apps/cgi_test.h"
 #include "support/refuse_calls.h"
-#include "support/testing.h"
-#include "text.h"
 #include "vexo/filesystem.h"
 
 namespace {
 
-class UploadCgi : public ApplianceTest {
+class UploadCgi : public CgiTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
         SKIP_WITHOUT_ROOT();
-        // The machine's temporary place outlives the tests: what an earlier run that was killed left there is not ours.
-        for (const unsigned uid : {0U, unsigned{kAliceUid}, unsigned{kBobUid}})
-            fs::remove_all("/tmp/@tmp/orvel/upload-" + std::to_string(uid));
     }
     static CgiReply put(const std::string& user, const std::string& path, const std::string& body,
                         const std::string& mode = "error", const Variables& more = {}) {
-        const std::string query = "path=" + orvel::cgi::percentEncode(path) + "&overwrite=" + mode;
+        const std::string query = "path=" + percentEncode(path) + "&overwrite=" + mode;
         return CgiReply(runCgi(PROGRAM_UPLOAD, user, "PUT", query, body, more));
     }
     // The same where the kernel refuses these calls, or kills the process before them; "" then.
@@ -46,11 +41,11 @@ class UploadCgi : public ApplianceTest {
                 {"REMOTE_ADDR", "127.0.0.1"},
                 {"REMOTE_USER", "alice"},
                 {"CONTENT_LENGTH", std::to_string(body.size())},
-                {"QUERY_STRING", "path=" + orvel::cgi::percentEncode(path) + "&overwrite=" + mode}};
+                {"QUERY_STRING", "path=" + percentEncode(path) + "&overwrite=" + mode}};
     }
     // What a user sees in a folder.
-    static std::vector<std::string> shownIn(const std::string& folder) {
-        std::vector<std::string> names = namesIn(folder);
+    static Names shownIn(const std::string& folder) {
+        Names names = namesIn(folder);
         std::erase_if(names, [](const std::string& name) { return VEXOEAIsHiddenFile(name.c_str()) == 1; });
         return names;
     }
@@ -61,26 +56,12 @@ class UploadCgi : public ApplianceTest {
         return CgiReply(
             runCgi(PROGRAM_UPLOAD, user, "POST", query, body, {{"CONTENT_TYPE", "multipart/form-data; boundary=XX"}}));
     }
-    static int code(const CgiReply& reply) { return reply.json["error"]["code"].asInt(); }
     // What uploads of this user left in the temporary place of the volume.
-    static std::vector<std::string> temporaries(unsigned uid) {
+    static Names temporaries(unsigned uid) {
         const std::string folder = "/tmp/@tmp/orvel/upload-" + std::to_string(uid);
-        return fs::exists(folder) ? namesIn(folder) : std::vector<std::string>();
-    }
-    static std::vector<std::string> namesIn(const std::string& folder) {
-        std::vector<std::string> names;
-        for (const auto& entry : fs::directory_iterator(folder)) names.push_back(entry.path().filename());
-        std::sort(names.begin(), names.end());
-        return names;
-    }
-    static void expectOwned(const std::string& path, unsigned uid, unsigned mode) {
-        const struct stat status = statusOf(path);
-        EXPECT_TRUE(status.st_uid == uid && status.st_gid == kUsersGid) << path;
-        EXPECT_EQ(status.st_mode & 07777, mode) << path;
+        return fs::exists(folder) ? namesIn(folder) : Names();
     }
 };
-
-using Names = std::vector<std::string>;
 
 TEST_F(UploadCgi, AFileBelongsToItsUserWithTheFoldersAboveIt) {
     const std::string root = addShare("photo", "read only = no\nvalid users = alice, carol\n");
@@ -135,7 +116,6 @@ TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
     writeFile(root + "/file", "x", 0666);
     ASSERT_EQ(mkfifo((root + "/pipe").c_str(), 0666), 0);
     ASSERT_EQ(mknod((root + "/device").c_str(), S_IFCHR | 0666, makedev(1, 3)), 0);
-    makeFolder(root + "/inner", 0777);
     makeFolder(root + "/folder/@tmp", 0777);
     fs::create_symlink("folder/@tmp", root + "/hidden");
     fs::create_symlink("folder", root + "/inside");
@@ -146,18 +126,15 @@ TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
              row("bob", "/photo/x", 407), row("alice", "/photo/root's/x", 407), row("alice", "/nowhere/x", 408),
              row("alice", "/photo", 414), row("alice", "/photo/pipe", 414), row("alice", "/photo/device", 414),
              row("alice", "/photo/file/x", 408), row("alice", "/photo/outside/orveltest-x", 407),
-             row("alice", "/photo/../orveltest-x", 407), row("alice", "/photo/new/@vexoea/x", 418),
-             row("alice", "/photo/folder/.", 418), row("alice", "/photo/@tmp", 418),
-             row("alice", "/photo/new/@tmp/x", 418), row("alice", "/photo/folder/@tmp/x", 418),
+             row("alice", "/photo/../orveltest-x", 407), row("alice", "/home/../../../etc/passwd", 407),
+             row("alice", "/photo/../../etc/none", 407), row("alice", "/photo/new/@vexoea/x", 418),
+             row("alice", "/photo/@tmp", 418), row("alice", "/photo/folder/@tmp/x", 418),
              row("alice", "/photo/hidden/x", 418), row("alice", "/photo/.vexo-part-x", 418),
              row("alice", "/usb/new*/b", 419), row("alice", "/photo/new/" + std::string(256, 'n') + "/x", 412),
              row("alice", "", 400)}) {
         for (const char* mode : {"error", "overwrite"}) {
-            SCOPED_TRACE(path + " " + mode);
-            const bool shareRoot = path == "/photo" && std::string(mode) == "overwrite";
-            const CgiReply reply = put(user, path, "data", mode);
-            EXPECT_FALSE(reply.json["success"].asBool());
-            EXPECT_EQ(code(reply), shareRoot ? 400 : expected);
+            const bool shareRoot = path == "/photo" && *mode == 'o';
+            EXPECT_EQ(code(put(user, path, "data", mode)), shareRoot ? 400 : expected) << path << mode;
         }
     }
     std::string deep = "/photo";
@@ -222,9 +199,6 @@ TEST_F(UploadCgi, ABrokenFormKeepsOnlyItsWholeFiles) {
              {file, 1800, {}},
              {file + "--XX", 1800, {"one"}},
              {file + "--XX\r\nContent-Disposition: form-data; name=b; filename=two\r\n\r\n22222", 1800, {"one"}},
-             {"", 1800, {}},
-             {"--XX\r\n\r\ndata\r\n--XX--", 1800, {}},
-             {"--XX\r\nContent-Disposition: form-data; filename=two\r\n\r\n2\r\n--XX--", 1800, {}},
              {part("name=path", "/photo/%00") + part("name=path_raw", "%00") + file + "--XX--", 1801, {}},
              {part("name=path", std::string("/photo\0/x", 9)) + file + "--XX--", 1801, {}},
              {part("name=path", std::string(70000, '/')) + file + "--XX--", 1801, {}},
@@ -266,7 +240,7 @@ TEST_F(UploadCgi, FullAndReadOnlyFileSystems) {
     for (const auto& full : cases) {
         SCOPED_TRACE(full.folder + " " + full.options);
         const int result = inChild([&] {
-            if (unshare(CLONE_NEWNS) != 0 || mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) return 2;
+            if (unshare(CLONE_NEWNS) != 0) return 3;
             if (mount("full", full.folder.c_str(), "tmpfs", full.flags, full.options) != 0) return 3;
             EXPECT_EQ(code(put("alice", "/photo/new/big", big)), full.code);
             EXPECT_EQ(code(put("alice", "/photo/new/big", big, "overwrite")), full.code);
@@ -277,25 +251,9 @@ TEST_F(UploadCgi, FullAndReadOnlyFileSystems) {
             EXPECT_EQ(left, Names{});
             return 0;
         });
-        if (result == 2) GTEST_SKIP() << "needs the right to mount";
-        if (result == 3) std::cout << "SKIPPED: no file system with " << full.options << '\n';
+        if (result != 0) std::cout << "SKIPPED: could not mount a file system with " << full.options << '\n';
     }
     EXPECT_EQ(namesIn(root), Names{"first"});
-}
-
-TEST_F(UploadCgi, TheTransferLogTellsWhatWasStored) {
-    const std::string log = systemRoot() + "/var/log/vexo/xfer.log";
-    put("alice", "/photo/silent", "data");
-    EXPECT_FALSE(fs::exists(log));
-    setSetting("pexlanderxferlog", "yes");
-    put("alice", "/photo/told", "data");
-    put("alice", "/photo/told", "data");
-    put("alice", "/photo/told", "data", "skip");
-    const std::string text = readFile(log);
-    EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 1) << text;
-    for (const char* piece : {"\"upload\"", "\"alice\"", "127.0.0.1", "\"/photo/told\""}) {
-        EXPECT_NE(text.find(piece), std::string::npos) << piece << text;
-    }
 }
 
 TEST_F(UploadCgi, WhatAKilledUploadLeftIsRemovedByALaterOne) {
@@ -310,18 +268,6 @@ TEST_F(UploadCgi, WhatAKilledUploadLeftIsRemovedByALaterOne) {
     EXPECT_EQ(code(put("alice", "/photo/second", "data")), 0);
     EXPECT_EQ(temporaries(kAliceUid), (Names{"other", "part-new"}));
     fs::remove_all(folder);
-
-    // Nothing that others could have prepared is used, nor does it keep anybody from uploading.
-    fs::create_directory_symlink(shareRoot("photo"), folder);
-    EXPECT_EQ(code(put("alice", "/photo/third", "data")), 0);
-    EXPECT_FALSE(fs::is_symlink(folder));
-    fs::remove_all(folder);
-    makeFolder(folder, 0777);
-    EXPECT_EQ(code(put("alice", "/photo/fourth", "data")), 0);
-    EXPECT_EQ(namesIn(shareRoot("photo")), (Names{"first", "fourth", "second", "third"}));
-    for (const std::string& name : namesIn("/tmp/@tmp/orvel")) {
-        if (name.starts_with("upload-" + std::to_string(kAliceUid))) fs::remove_all("/tmp/@tmp/orvel/" + name);
-    }
 }
 
 // What happens at each call that puts an upload in its place: the file is there whole or not at all, and the next one
@@ -383,6 +329,8 @@ TEST_F(UploadCgi, TwoAtOnceEndAsTheirModesSay) {
             EXPECT_TRUE(stored(replies[found == bodies[0] ? 0 : 1]));
             const int both = stored(replies[0]) + stored(replies[1]);
             EXPECT_TRUE(first != second ? found == bodies[1] : both == (first == "overwrite" ? 2 : 1)) << both;
+            const bool refused = (replies[0] + replies[1]).find("\"code\":414") != std::string::npos;
+            EXPECT_TRUE(refused || first != "error" || second != "error") << replies[0] << replies[1];
             EXPECT_EQ(namesIn(shareRoot("photo")), Names{"f"});
             fs::remove(file);
         }
