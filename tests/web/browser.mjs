@@ -1,9 +1,9 @@
 // A browser for the tests: Debian's Chromium through playwright-core, with every complaint of the page collected.
-import { existsSync, mkdirSync, mkdtempSync, rmSync } from "node:fs";
+import { existsSync, mkdtempSync, rmSync } from "node:fs";
 import assert from "node:assert/strict";
 import { tmpdir } from "node:os";
-import { join } from "node:path";
-import { crc32, deflateSync } from "node:zlib";
+import { basename, join } from "node:path";
+import { after } from "node:test";
 import { chromium } from "playwright-core";
 
 const PROGRAM = process.env.ORVEL_TEST_CHROMIUM ?? "/usr/bin/chromium";
@@ -18,42 +18,53 @@ const SCREENSHOTS = process.env.ORVEL_TEST_SCREENSHOTS;
 if (!existsSync(PROGRAM)) throw new Error(`${PROGRAM} is not installed: script/bootstrap does that`);
 if (!URL_OF_PAGE) throw new Error("ORVEL_TEST_URL is not set: run tests/web/run.sh");
 
-export async function launch() {
-  const data = mkdtempSync(join(tmpdir(), "orvel-chromium-"));
-  const browser = await chromium.launch({
-    executablePath: PROGRAM,
-    args: [
-      "--headless",
-      "--no-sandbox",
-      "--disable-gpu",
-      "--disable-quic",
-      "--no-first-run",
-      "--disable-background-networking",
-      "--disable-component-update",
-      "--disable-sync",
-      `--disk-cache-dir=${data}`,
-    ],
-  });
-  return {
-    browser,
-    close: async () => {
-      await browser.close();
-      rmSync(data, { recursive: true, force: true });
-    },
-  };
+const data = mkdtempSync(join(tmpdir(), "orvel-chromium-"));
+export const browser = await chromium.launch({
+  executablePath: PROGRAM,
+  args: [
+    "--headless",
+    "--no-sandbox",
+    "--disable-gpu",
+    "--disable-quic",
+    "--no-first-run",
+    "--disable-background-networking",
+    "--disable-component-update",
+    "--disable-sync",
+    `--disk-cache-dir=${data}`,
+  ],
+});
+after(async () => {
+  await browser.close();
+  rmSync(data, { recursive: true, force: true });
+});
+
+// Of each kind of visitor one, so that the page's files are fetched once. What a page stored there goes before the next.
+const contexts = new Map();
+async function contextOf(user, options) {
+  const kind = JSON.stringify([user, options]);
+  if (!contexts.has(kind)) {
+    const context = await browser.newContext({
+      viewport: { width: 1280, height: 800 },
+      locale: "en-GB",
+      colorScheme: "light",
+      reducedMotion: "reduce",
+      httpCredentials: user && { username: user, password: PASSWORDS[user] },
+      ...options,
+    });
+    contexts.set(kind, context);
+  }
+  return contexts.get(kind);
 }
 
 // A page of `user`. `complaints` is what must be empty at the end: errors on the console or of scripts, failed requests.
-export async function openPage(browser, user, { path = "/", ...options } = {}) {
-  const context = await browser.newContext({
-    viewport: { width: 1280, height: 800 },
-    locale: "en-GB",
-    colorScheme: "light",
-    reducedMotion: "reduce",
-    httpCredentials: user && { username: user, password: PASSWORDS[user] },
-    ...options,
-  });
+export async function openPage(user, { path = "/", ...options } = {}) {
+  const context = await contextOf(user, options);
   const page = await context.newPage();
+  const session = await context.newCDPSession(page);
+  const { origin } = new URL(URL_OF_PAGE);
+  await session.send("Storage.clearDataForOrigin", { origin, storageTypes: "local_storage,indexeddb" });
+  await session.detach();
+  if (SCREENSHOTS) photograph(page);
   page.complaints = [];
   page.on("console", (message) => {
     if (["error", "warning"].includes(message.type())) page.complaints.push(`console: ${message.text()}`);
@@ -73,8 +84,8 @@ export async function openPage(browser, user, { path = "/", ...options } = {}) {
 }
 
 // What `run` does as `user`; `expected` are complaints that must come.
-export async function withPage({ browser }, user, options, run, expected = []) {
-  const page = await openPage(browser, user, options);
+export async function withPage(user, options, run, expected = []) {
+  const page = await openPage(user, options);
   try {
     await rowsReady(page);
     await run(page);
@@ -92,13 +103,38 @@ export async function withPage({ browser }, user, options, run, expected = []) {
     failure.message += `\nComplaints: ${page.complaints.join("\n")}`;
     throw failure;
   } finally {
-    await page.context().close();
+    for (const one of page.context().pages()) await one.close();
   }
 }
 
+// A picture of each dialog, message and state that a test waits for.
+const file = basename(process.argv[1], ".test.mjs");
+let pictures = 0;
+function photograph(page) {
+  const wait = page.waitForSelector.bind(page);
+  page.waitForSelector = async (selector, ...options) => {
+    const found = await wait(selector, ...options);
+    if (found && /\.(activity-card|dialog|home|menu|picker|preview|state|toast)/.test(selector))
+      await screenshot(page, `${file} ${String(++pictures).padStart(3, "0")} ${selector.replace(/[^\w .-]+/g, " ").slice(0, 80)}`);
+    return found;
+  };
+}
+
 export async function screenshot(page, name) {
-  mkdirSync(SCREENSHOTS, { recursive: true });
-  await page.screenshot({ path: join(SCREENSHOTS, `${name}.png`) });
+  if (SCREENSHOTS) await page.screenshot({ path: join(SCREENSHOTS, `${name}.png`) });
+}
+
+export function go(page, place) {
+  return page.evaluate((id) => {
+    location.hash = id;
+  }, place);
+}
+
+export async function upload(page, command, paths) {
+  const chooser = page.waitForEvent("filechooser");
+  await page.click("#toolbar >> text=Upload");
+  await page.click(`.menu >> text=${command}`);
+  await (await chooser).setFiles(paths);
 }
 
 export async function rowsReady(page) {
@@ -125,43 +161,4 @@ export async function wentWell(page, text) {
     card?.querySelector(":scope > .icon-button").click();
     return card !== undefined;
   }, text);
-}
-
-// A PNG of hills under a sky, different for each number.
-export function picture(width, height, number) {
-  const rows = Buffer.alloc(height * (width * 3 + 1));
-  for (let y = 0; y < height; ++y) {
-    for (let x = 0; x < width; ++x) {
-      let layer = 0;
-      for (let i = 1; i <= 4; ++i) {
-        const ridge =
-          height * (0.3 + i * 0.15) +
-          Math.sin(x / (34 + 9 * i) + number * i * 1.7) * 18 +
-          Math.sin(x / 13 + number + i) * 4;
-        if (y > ridge) layer = i;
-      }
-      const hue = ((number * 47) % 360) + layer * 14;
-      const light = layer === 0 ? 0.92 - (0.35 * (height - y)) / height : 0.66 - layer * 0.13;
-      const channel = (shift) => Math.round(255 * light * (0.72 + 0.28 * Math.cos(((hue + shift) * Math.PI) / 180)));
-      rows.set([channel(0), channel(120), channel(240)], y * (width * 3 + 1) + 1 + x * 3);
-    }
-  }
-  const chunk = (name, data) => {
-    const body = Buffer.concat([Buffer.from(name), data]);
-    const out = Buffer.alloc(body.length + 8);
-    out.writeUInt32BE(data.length, 0);
-    body.copy(out, 4);
-    out.writeUInt32BE(crc32(body) >>> 0, body.length + 4);
-    return out;
-  };
-  const head = Buffer.alloc(13);
-  head.writeUInt32BE(width, 0);
-  head.writeUInt32BE(height, 4);
-  head.set([8, 2], 8);
-  return Buffer.concat([
-    Buffer.from("\x89PNG\r\n\x1a\n", "latin1"),
-    chunk("IHDR", head),
-    chunk("IDAT", deflateSync(rows)),
-    chunk("IEND", Buffer.alloc(0)),
-  ]);
 }

@@ -1,17 +1,12 @@
 // What is chosen is what is done, whatever others do meanwhile and however many it is.
 import assert from "node:assert/strict";
 import { existsSync, mkdirSync, readdirSync, renameSync, rmSync, writeFileSync } from "node:fs";
-import { after, before, beforeEach, test } from "node:test";
-import { launch, row, rowsReady, screenshot, wentWell, withPage } from "./browser.mjs";
+import { beforeEach, test } from "node:test";
+import { row, rowsReady, wentWell, withPage } from "./browser.mjs";
 
 const folder = `${process.env.ORVEL_TEST_PROJECTS}/chosen`;
 const MANY = 1500; // of which the middle is never on screen
-let chrome;
 
-before(async () => {
-  chrome = await launch();
-});
-after(() => chrome.close());
 beforeEach(() => {
   rmSync(folder, { recursive: true, force: true });
   mkdirSync(folder, { mode: 0o777 });
@@ -53,7 +48,7 @@ async function deleteForGood(page) {
 }
 
 test("deletes what was chosen, though others renamed and added", () =>
-  withPage(chrome, "admin", { path: "/projects/chosen" }, async (page) => {
+  withPage("admin", { path: "/projects/chosen" }, async (page) => {
     await chooseRange(page, 2, 1299);
     renameSync(`${folder}/${nameOf(5)}`, `${folder}/a first one.dat`); // as many as before, each row one further down
     renameSync(`${folder}/${nameOf(900)}`, `${folder}/zz last.dat`);
@@ -61,14 +56,13 @@ test("deletes what was chosen, though others renamed and added", () =>
     await page.keyboard.press("Alt+r");
     await page.waitForSelector(".toast >> text=2 selected items are no longer here");
     await chosenCount(page, 1296);
-    await screenshot(page, "chosen-gone");
     await deleteForGood(page);
     const left = [0, 1, ...Array.from({ length: 200 }, (_, i) => 1300 + i)].map(nameOf);
     assert.deepEqual(readdirSync(folder).sort(), [...left, "a first one.dat", "item-00700 new.dat", "zz last.dat"].sort());
   }));
 
 test("a range and everything, chosen of a list that has changed since it was shown", () =>
-  withPage(chrome, "admin", { path: "/projects/chosen" }, async (page) => {
+  withPage("admin", { path: "/projects/chosen" }, async (page) => {
     await row(page, nameOf(3)).click();
     renameSync(`${folder}/${nameOf(600)}`, `${folder}/before all.dat`); // the list on screen is older
     await page.keyboard.press("Shift+End");
@@ -82,7 +76,7 @@ test("a range and everything, chosen of a list that has changed since it was sho
   }));
 
 test("many at once: dragged as one task after one question, renamed far away", () =>
-  withPage(chrome, "admin", { path: "/projects/chosen" }, async (page) => {
+  withPage("admin", { path: "/projects/chosen" }, async (page) => {
     await row(page, nameOf(0)).click();
     await page.keyboard.press("F2");
     await page.fill(".dialog .input", "zz far away.dat");
@@ -106,7 +100,6 @@ test("many at once: dragged as one task after one question, renamed far away", (
 
 test("sorting keeps a choice, a filter says what it takes away, a failure chooses nothing", () =>
   withPage(
-    chrome,
     "admin",
     { path: "/projects/chosen" },
     async (page) => {
@@ -138,7 +131,6 @@ test("sorting keeps a choice, a filter says what it takes away, a failure choose
 
 test("many are downloaded as one field, and what the web server refuses says so", () =>
   withPage(
-    chrome,
     "alice",
     { path: "/warehouse" },
     async (page) => {

@@ -1,41 +1,31 @@
 // Files that come and go: uploads, conflicts, downloads, new folders, names, previews.
 import assert from "node:assert/strict";
 import { once } from "node:events";
-import { existsSync, mkdirSync, mkdtempSync, readFileSync, rmSync, statSync, writeFileSync } from "node:fs";
+import { copyFileSync, existsSync, mkdirSync, mkdtempSync, readdirSync, readFileSync, rmSync, statSync, writeFileSync } from "node:fs";
 import http from "node:http";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
-import { drawn, launch, PASSWORDS, picture, row, screenshot, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
+import { drawn, PASSWORDS, row, upload, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const files = mkdtempSync(join(tmpdir(), "orvel-upload-"));
-let chrome;
 
-before(async () => {
-  chrome = await launch();
+before(() => {
   mkdirSync(join(files, "trip/day 1/empty"), { recursive: true });
-  for (let i = 1; i <= 8; ++i) writeFileSync(join(files, `trip/day 1/view ${i}.png`), picture(480, 320, i));
+  const pictures = `${process.env.ORVEL_TEST_PHOTO}/Landscapes`;
+  for (const [i, name] of readdirSync(pictures).slice(0, 8).entries())
+    copyFileSync(`${pictures}/${name}`, join(files, `trip/day 1/view ${i + 1}.png`));
   writeFileSync(join(files, "trip/list & more.md"), "# List\n\n- <b>bread</b>\n- Käse\n");
   for (const name of ["one.txt", "two, three*.txt", "four.txt"]) writeFileSync(join(files, name), `${name}, new`);
   writeFileSync(join(files, "large.bin"), Buffer.alloc(8 << 20, 7));
 });
-after(async () => {
-  await chrome.close();
-  rmSync(files, { recursive: true });
-});
-
-async function upload(page, command, paths) {
-  const chooser = page.waitForEvent("filechooser");
-  await page.click("#toolbar >> text=Upload");
-  await page.click(`.menu >> text=${command}`);
-  await (await chooser).setFiles(paths);
-}
+after(() => rmSync(files, { recursive: true }));
 
 const card = (page, text) => page.locator(".activity-card", { hasText: text }).first();
 
 test("uploads: files, a folder, a conflict asked about once, cancel", () =>
-  withPage(chrome, "alice", { path: "/projects" }, async (page) => {
+  withPage("alice", { path: "/projects" }, async (page) => {
     await page.click("#toolbar >> text=New folder");
     await page.waitForSelector(".dialog .input");
     await page.keyboard.type("in/out");
@@ -49,7 +39,6 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     await page.waitForSelector("#view .row.selected >> text=incoming");
     await page.keyboard.press("Enter");
     await page.waitForSelector(".state >> text=This folder is empty");
-    await screenshot(page, "empty");
 
     const there = join(projects, "incoming “1”");
     const some = ["one.txt", "two, three*.txt", "four.txt"].map((name) => join(files, name));
@@ -58,7 +47,6 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     assert.equal(readFileSync(join(there, "two, three*.txt"), "utf8"), "two, three*.txt, new");
     await upload(page, "Upload files", some);
     await page.waitForSelector(".dialog >> text=The file exists already");
-    await screenshot(page, "conflict");
     await page.click(".dialog >> text=Keep both");
     await page.waitForSelector("#view >> text=four (2).txt");
     await wentWell(page, "3 files uploaded");
@@ -111,27 +99,23 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     await page.waitForFunction(
       () => Number(document.querySelector(".activity-card [role=progressbar]").getAttribute("aria-valuenow")) > 2,
     );
-    await screenshot(page, "upload");
     await page.locator(".activity-card").first().locator("button").click();
     await card(page, "Cancelled").waitFor();
     assert.ok(!existsSync(join(there, "large.bin")));
   }));
 
 test("previews, thumbnails, rename, downloads", () =>
-  withPage(chrome, "alice", { path: "/projects/incoming%20%E2%80%9C1%E2%80%9D/trip" }, async (page) => {
+  withPage("alice", { path: "/projects/incoming%20%E2%80%9C1%E2%80%9D/trip" }, async (page) => {
     await row(page, "list & more").dblclick();
     await page.waitForSelector(".preview pre >> text=<b>bread</b>");
-    await screenshot(page, "preview-text");
     await page.keyboard.press("Escape");
     await row(page, "day 1").dblclick();
     await page.click(".view-switch button >> nth=1");
     await page.waitForFunction(() => document.querySelectorAll(".thumbnail.loaded img").length === 8);
-    await screenshot(page, "thumbnails");
     await row(page, "view 3").click();
     await page.focus("#view");
     await page.keyboard.press(" ");
     await page.waitForSelector(".preview img");
-    await screenshot(page, "preview-image");
     await page.keyboard.press("ArrowRight");
     await page.waitForSelector(".preview-title >> text=view 4.png");
     await page.keyboard.press(" ");
@@ -179,7 +163,6 @@ test("another site's page changes nothing", async () => {
 
 test("a refused download says so in words", () =>
   withPage(
-    chrome,
     "alice",
     { path: "/preview" },
     async (page) => {

@@ -1,13 +1,8 @@
 // Public links: made, opened by a visitor who has no account, revoked.
 import assert from "node:assert/strict";
-import { after, before, test } from "node:test";
-import { launch, row, screenshot, withPage } from "./browser.mjs";
+import { test } from "node:test";
+import { browser, go, row, screenshot, withPage } from "./browser.mjs";
 
-let chrome;
-before(async () => {
-  chrome = await launch();
-});
-after(() => chrome.close());
 
 async function makeLink(page, name, password) {
   await row(page, name).click();
@@ -19,13 +14,12 @@ async function makeLink(page, name, password) {
   if (password) assert.equal(await page.inputValue(".dialog .password"), password);
   await page.click(".dialog >> text=Copy link");
   await page.click(".toast:has-text('Link copied') button");
-  await screenshot(page, "link");
   await page.keyboard.press("Escape");
   return address;
 }
 
 async function visit(address, run, options = {}) {
-  const context = await chrome.browser.newContext({
+  const context = await browser.newContext({
     viewport: { width: 1280, height: 800 },
     locale: "en-GB",
     ...options,
@@ -45,7 +39,7 @@ async function visit(address, run, options = {}) {
 }
 
 test("a folder with a password, opened elsewhere, then revoked", () =>
-  withPage(chrome, "alice", { path: "/projects" }, async (page) => {
+  withPage("alice", { path: "/projects" }, async (page) => {
     const address = await makeLink(page, "house", "let me in");
     await visit(address, async (visitor, status, wrong) => {
       assert.equal(status, 200);
@@ -68,7 +62,6 @@ test("a folder with a password, opened elsewhere, then revoked", () =>
     await page.click("#settings-button");
     await page.click(".menu >> text=My public links");
     await page.waitForSelector(".link-list >> text=with password");
-    await screenshot(page, "links");
     await page.click(".link-list [aria-label=Revoke]");
     await page.click(".dialog .button.danger");
     await page.waitForSelector(".link-list >> text=You have no public links");
@@ -79,17 +72,14 @@ test("a folder with a password, opened elsewhere, then revoked", () =>
   }));
 
 test("names of markup reach a visitor as text", () =>
-  withPage(chrome, "alice", { path: "/" }, async (page) => {
-    await page.evaluate(() => {
-      location.hash = "/worldwide";
-    });
+  withPage("alice", { path: "/" }, async (page) => {
+    await go(page, "/worldwide");
     await page.waitForSelector("#view >> text=#hash.txt");
     const address = await makeLink(page, "<img src=x onerror", "");
     await visit(address, async (visitor, status, wrong) => {
       assert.equal(status, 200);
       await visitor.waitForSelector("text=<img src=x onerror=alert(1)>.txt");
       assert.equal(await visitor.locator("img:not(.picture, .brand img)").count(), 0);
-      await screenshot(visitor, "visitor-file");
       assert.deepEqual(wrong, []);
     });
     const phone = { viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true };

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # The page in a real browser, against the web server and a demo appliance made for the test.
 #   run.sh SERVER BUILD [TEST...]
-# ORVEL_TEST_SCREENSHOTS: where pictures of the main states go; without it they go with the demo appliance.
+# ORVEL_TEST_SCREENSHOTS: where pictures of the main states and of failures go; without it none are taken.
 set -uo pipefail
 here=$(cd "$(dirname "$0")" && pwd)
 . "$here/../apps/served.sh"
@@ -14,9 +14,8 @@ cmp -s "$here/package-lock.json" "$here/node_modules/.installed" ||
     { (cd "$here" && npm ci --no-audit --no-fund --loglevel=error) && cp "$here/package-lock.json" "$here/node_modules/.installed"; } ||
     { echo "FAILED: npm ci"; exit 1; }
 
-export ORVEL_TEST_SCREENSHOTS=${ORVEL_TEST_SCREENSHOTS:-$work/screenshots}
-mkdir -p "$ORVEL_TEST_SCREENSHOTS"
-export ORVEL_TEST_GATES=$gates ORVEL_TEST_URL=http://127.0.0.1:$port/ ORVEL_TEST_LARGE=${ORVEL_TEST_LARGE:-20000}
+[ -z "${ORVEL_TEST_SCREENSHOTS:-}" ] || mkdir -p "$ORVEL_TEST_SCREENSHOTS"
+export ORVEL_TEST_GATES=$gates ORVEL_TEST_URL=http://127.0.0.1:$port/
 for user in alice bob admin; do export "ORVEL_TEST_${user^^}=$(password "$user")"; done
 ORVEL_TEST_PHOTO=$(root_of photo) ORVEL_TEST_PROJECTS=$(root_of projects)
 export ORVEL_TEST_PHOTO ORVEL_TEST_PROJECTS

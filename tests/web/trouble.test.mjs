@@ -4,15 +4,13 @@ import { chmodSync, existsSync, mkdirSync, mkdtempSync, readdirSync, rmSync, wri
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
-import { launch, row, screenshot, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
+import { go, row, upload, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const files = mkdtempSync(join(tmpdir(), "orvel-trouble-"));
 const FILES = 30;
-let chrome;
 
-before(async () => {
-  chrome = await launch();
+before(() => {
   mkdirSync(join(files, "trip/a/b"), { recursive: true });
   for (let i = 0; i < FILES; ++i) writeFileSync(join(files, "trip", i % 2 ? "a/b" : "a", `photo ${i}.jpg`), `photo ${i}`);
   writeFileSync(join(files, "thing"), "a file");
@@ -25,26 +23,10 @@ before(async () => {
     writeFileSync(`${projects}/trouble/to/${name}`, `${name}, there before`, { mode: 0o666 });
   }
 });
-after(async () => {
-  await chrome.close();
-  rmSync(files, { recursive: true });
-});
-
-async function upload(page, command, paths) {
-  const chooser = page.waitForEvent("filechooser");
-  await page.click("#toolbar >> text=Upload");
-  await page.click(`.menu >> text=${command}`);
-  await (await chooser).setFiles(paths);
-}
-
-const go = (page, place) =>
-  page.evaluate((id) => {
-    location.hash = id;
-  }, place);
+after(() => rmSync(files, { recursive: true }));
 
 test("a connection that breaks: the queue waits and goes on, the list stays", () =>
   withPage(
-    chrome,
     "alice",
     { path: "/projects/trouble/in" },
     async (page) => {
@@ -63,26 +45,28 @@ test("a connection that breaks: the queue waits and goes on, the list stays", ()
         }
         return away ? route.abort("connectionreset") : route.continue();
       });
+      await page.clock.install();
       await upload(page, "Upload a folder", join(files, "trip"));
       await page.waitForSelector(".activity-card >> text=Waiting for the connection");
       await page.keyboard.press("Alt+r");
       await page.waitForSelector("#notice >> text=may be out of date");
       await page.waitForSelector("#view >> text=two.txt");
-      await screenshot(page, "connection-away");
       away = false;
+      await page.clock.fastForward("00:20"); // to its next try
       const well = page.locator(".activity-card.good", { hasText: `${FILES} files uploaded` });
       await well.waitFor();
       await page.waitForSelector("#notice", { state: "hidden" });
       const there = ["a", "a/b"].flatMap((folder) => readdirSync(`${projects}/trouble/in/trip/${folder}`));
       assert.equal(there.filter((name) => name !== "b").length, FILES); // nothing twice
       assert.equal(questions, 1); // what goes into a new folder meets nothing
+      await page.clock.fastForward("00:07");
       await well.waitFor({ state: "detached" }); // by itself
     },
     [/ERR_CONNECTION_RESET/],
   ));
 
 test("a file that is refused: its name, the advice, once more", () =>
-  withPage(chrome, "alice", { path: "/projects/trouble/in" }, async (page) => {
+  withPage("alice", { path: "/projects/trouble/in" }, async (page) => {
     await page.route("**/cgi-bin/upload?*", (route) =>
       route.fulfill({ json: { success: false, error: { code: 416, key: "error:error_space_not_enough", path: "" } } }),
     );
@@ -91,7 +75,6 @@ test("a file that is refused: its name, the advice, once more", () =>
     await failed.locator("text=no room left for “thing”").waitFor();
     await failed.locator("text=Free some space on the volume").waitFor();
     assert.match(await page.textContent("#activity-title"), /activit.* failed/);
-    await screenshot(page, "upload-failed");
     await page.unroute("**/cgi-bin/upload?*");
     await failed.locator("text=Try again").click();
     await wentWell(page, "1 file uploaded");
@@ -99,7 +82,7 @@ test("a file that is refused: its name, the advice, once more", () =>
   }));
 
 test("a file and a folder of one name: neither replaces the other", () =>
-  withPage(chrome, "alice", { path: "/projects/trouble/taken" }, async (page) => {
+  withPage("alice", { path: "/projects/trouble/taken" }, async (page) => {
     await upload(page, "Upload files", join(files, "thing"));
     await page.waitForSelector(".dialog >> text=Neither can replace the other");
     assert.equal(await page.locator(".dialog button >> text=Replace").count(), 0);
@@ -121,12 +104,11 @@ test("a file and a folder of one name: neither replaces the other", () =>
     await page.waitForSelector("#view >> text=one.txt");
     await page.keyboard.press("Control+v");
     await page.waitForSelector(".dialog >> text=files of the same name are replaced");
-    await screenshot(page, "conflict-folder");
     await page.keyboard.press("Escape");
   }));
 
 test("cut, a question dismissed, pasted after all; every tab follows, and what failed says why", () =>
-  withPage(chrome, "alice", { path: "/projects/trouble/source" }, async (page) => {
+  withPage("alice", { path: "/projects/trouble/source" }, async (page) => {
     const other = await page.context().newPage();
     await other.goto(`${URL_OF_PAGE}#/projects/trouble/to`);
     await other.waitForSelector("#view >> text=two.txt");
@@ -145,7 +127,6 @@ test("cut, a question dismissed, pasted after all; every tab follows, and what f
     await page.waitForFunction(() => !document.querySelector("#view .row.cut"));
     await page.keyboard.press("Control+v");
     await page.waitForSelector(".dialog >> text=2 names are taken");
-    await screenshot(page, "conflict-many");
     await page.keyboard.press("Escape");
     await page.click("#toolbar >> text=Paste");
     await page.waitForSelector(".dialog >> text=2 names are taken");
@@ -162,7 +143,6 @@ test("cut, a question dismissed, pasted after all; every tab follows, and what f
     await page.keyboard.press("Control+v");
     const failed = page.locator(".activity-card.failed", { hasText: "Copy “board” to in" });
     await failed.locator("text=Ask the owner or an administrator").waitFor();
-    await screenshot(page, "task-failed");
     await failed.locator("text=Why?").first().click();
     await page.waitForSelector(".dialog .why li");
     await page.keyboard.press("Escape");

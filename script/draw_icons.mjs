@@ -1,11 +1,11 @@
 // Draws the icons that programs name, apps/web/images, from the page's own: one picture a kind, and for each extension
 // a link to that of its kind. To be run by hand when icons.svg or the kinds of js/icons.js change:
-//   node tests/web/draw_icons.mjs
+//   node script/draw_icons.mjs
 import { mkdirSync, readFileSync, rmSync, symlinkSync } from "node:fs";
-import { chromium } from "playwright-core";
-import { KINDS, PICTURES } from "../../apps/web/js/icons.js";
+import { chromium } from "../tests/web/node_modules/playwright-core/index.mjs";
+import { KINDS, PICTURES } from "../apps/web/js/icons.js";
 
-const web = new URL("../../apps/web/", import.meta.url);
+const web = new URL("../apps/web/", import.meta.url);
 const images = new URL("images/", web);
 rmSync(images, { recursive: true, force: true });
 for (const folder of ["kinds", "files_ext"]) mkdirSync(new URL(folder, images), { recursive: true });
