@@ -46,6 +46,24 @@ void handOver(const Descriptor& made, const std::string& user) {
     [[maybe_unused]] const int ignored = fchownat(made.get(), "", uid, gid, AT_EMPTY_PATH);  // FAT keeps no owners
 }
 
+// Removes what did not become of a folder; the code for errno.
+int takeBack(const Descriptor& folder, const std::string& name) {
+    const int error = errno;
+    unlinkat(folder.get(), name.c_str(), AT_REMOVEDIR);
+    return OrvParseErrnoToError(error, nullptr, nullptr);
+}
+
+// It has its owner before it has its name.
+int makeFolderFor(const std::string& user, const Descriptor& folder, const std::string& name, Descriptor& made) {
+    std::string part;
+    made = makeFolderPart(folder.get(), name, kFolderMode, part);
+    if (!made) return OrvParseErrnoToError(errno, nullptr, nullptr);
+    handOver(made, user);
+    if (renameNew(folder.get(), part, folder.get(), name)) return ORV_ERR_NONE;
+    made.reset();
+    return takeBack(folder, part);
+}
+
 // The folders above a target, of which the first `existing` ones exist.
 struct Way {
     Descriptor root;
@@ -83,18 +101,10 @@ int checkNewName(const Descriptor& folder, const std::string& name) {
 int makeFolder(const Descriptor& folder, const std::string& name, const std::string& user, Descriptor& made) {
     const int code = checkNewName(folder, name);
     if (code != ORV_ERR_NONE) return code;
-    const bool handed = geteuid() == 0;  // then it has its owner before it has its name
-    const std::string first = handed ? drawPartName() : name;
-    if (first.empty() || mkdirat(folder.get(), first.c_str(), kFolderMode) != 0) {
-        return OrvParseErrnoToError(errno, nullptr, nullptr);
-    }
-    made = Descriptor(openat(folder.get(), first.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-    if (made && handed) handOver(made, user);
-    if (made && (!handed || renameNew(folder.get(), first, folder.get(), name))) return ORV_ERR_NONE;
-    const int error = errno;
-    made.reset();
-    unlinkat(folder.get(), first.c_str(), AT_REMOVEDIR);
-    return OrvParseErrnoToError(error, nullptr, nullptr);
+    if (geteuid() == 0) return makeFolderFor(user, folder, name, made);
+    if (mkdirat(folder.get(), name.c_str(), kFolderMode) != 0) return OrvParseErrnoToError(errno, nullptr, nullptr);
+    made = Descriptor(openat(folder.get(), name.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    return made ? static_cast<int>(ORV_ERR_NONE) : takeBack(folder, name);
 }
 
 int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target) {

@@ -46,7 +46,7 @@ void removeMadeFolders(Target& target);
 // OrvCheckFileName.
 int checkNewName(const Descriptor& folder, const std::string& name);
 
-// Makes the folder `name` in `folder`, owned as above, and opens it O_PATH. EEXIST gives 414.
+// Makes the folder `name` in `folder`, owned as above, and opens it. EEXIST gives 414.
 int makeFolder(const Descriptor& folder, const std::string& name, const std::string& user, Descriptor& made);
 
 }  // namespace orvel::cgi

@@ -127,11 +127,31 @@ bool removeAbandonedPart(int folder, const std::string& name) {
     if (fstatat(folder, name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) return errno == ENOENT;
     Descriptor file;
     bool abandoned = S_ISLNK(status.st_mode) && status.st_ctim.tv_sec < time(nullptr) - kLinkAbandonedAfter;
-    if (S_ISREG(status.st_mode)) {
+    const bool isFolder = S_ISDIR(status.st_mode);
+    if (S_ISREG(status.st_mode) || isFolder) {
         file = openIn(folder, name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
         abandoned = file && lock(file.get(), LOCK_EX | LOCK_NB);
     }
-    return abandoned && unlinkat(folder, name.c_str(), 0) == 0;
+    return abandoned && unlinkat(folder, name.c_str(), isFolder ? AT_REMOVEDIR : 0) == 0;
+}
+
+Descriptor makeFolderPart(int folder, const std::string& name, mode_t mode, std::string& part) {
+    for (int attempt = 0; attempt < kAttempts; ++attempt) {
+        part =
+            makePart(folder, name, [&](const std::string& drawn) { return mkdirat(folder, drawn.c_str(), mode) == 0; });
+        if (part.empty()) return Descriptor();
+        Descriptor made = openIn(folder, part.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
+        // Until it was locked it looked abandoned. A file system without locks knows nothing abandoned.
+        const bool ours = made && (lock(made.get(), LOCK_EX | LOCK_NB) || errno != EWOULDBLOCK);
+        struct stat status = {};
+        if (ours && fstat(made.get(), &status) == 0 && status.st_nlink > 0) return made;
+        if (made || errno == ENOENT) continue;  // taken for abandoned
+        const KeepErrno keep;
+        unlinkat(folder, part.c_str(), AT_REMOVEDIR);
+        return Descriptor();
+    }
+    errno = EEXIST;
+    return Descriptor();
 }
 
 bool renameNew(int fromFolder, const std::string& from, int toFolder, const std::string& to) {

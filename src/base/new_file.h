@@ -24,8 +24,9 @@ inline constexpr std::string_view kPartPrefix = ".vexo-part-";
 // Such a name, drawn anew; "" with errno when the kernel gives no random bytes.
 [[nodiscard]] std::string drawPartName();
 
-// Removes the unfinished thing `name` from the open folder unless somebody is at work on it: a file is locked by its
-// owner; a link cannot be, so it must have been there for a minute. True when the name is free.
+// Removes the unfinished thing `name` from the open folder unless somebody is at work on it: a file or folder is locked
+// by its owner; a link cannot be, so it must have been there for a minute. A folder that is not empty stays. True when
+// the name is free.
 bool removeAbandonedPart(int folder, const std::string& name);
 
 // Gives `from` in the open folder `fromFolder` the name `to` in `toFolder`, in the place of nothing: EEXIST when there
@@ -33,6 +34,10 @@ bool removeAbandonedPart(int folder, const std::string& name);
 // On a file system that cannot rename so, the name is taken first, by a second name of the file, or an empty file or
 // folder where it can have none.
 [[nodiscard]] bool renameNew(int fromFolder, const std::string& from, int toFolder, const std::string& to);
+
+// Makes a folder under a hidden name, `part`, which follows from the one that it will have, and opens it. It is locked
+// as long as it is open: what a killed process left goes when the name is wanted next. Empty with errno on failure.
+[[nodiscard]] Descriptor makeFolderPart(int folder, const std::string& name, mode_t mode, std::string& part);
 
 // Makes a symbolic link, in the place of what has that name when `replace`; else EEXIST when there is something.
 [[nodiscard]] bool putLink(int folder, const std::string& name, const char* text, bool replace);

@@ -164,4 +164,21 @@ TEST_F(NewFileTest, WhatAKilledProcessLeftIsHiddenAndGoesWithTheNextOne) {
     }
 }
 
+TEST_F(NewFileTest, AFolderOnItsWayGoesUnlessSomebodyIsAtWork) {
+    const int folder = folder_.get();
+    std::string left, first, second;
+    EXPECT_TRUE(orvel::makeFolderPart(folder, "a", 0700, left));  // closed at once, as by the end of its process
+    EXPECT_TRUE(orvel::isPartName(left)) << left;
+    orvel::Descriptor atWork = orvel::makeFolderPart(folder, "a", 0700, first);
+    EXPECT_EQ(first, left) << "in the place of what was left";
+    EXPECT_TRUE(orvel::makeFolderPart(folder, "a", 0700, second));
+    EXPECT_NE(second, first);
+    EXPECT_FALSE(orvel::removeAbandonedPart(folder, first)) << "somebody is at work on it";
+    EXPECT_TRUE(orvel::removeAbandonedPart(folder, second));
+    writeFile("./" + first + "/inside", "of somebody");
+    atWork.reset();
+    EXPECT_FALSE(orvel::removeAbandonedPart(folder, first)) << "not empty";
+    EXPECT_EQ(entries(), Entries{first + "/"});
+}
+
 }  // namespace
