@@ -27,7 +27,9 @@ std::string linkedPath(const std::string& link) {
     char path[PATH_MAX];
     const ssize_t length = readlink(link.c_str(), path, sizeof path);
     const bool whole = length > 0 && length < static_cast<ssize_t>(sizeof path) && path[0] == '/';
-    return whole ? std::string(path, static_cast<size_t>(length)) : "";
+    if (whole) return {path, static_cast<size_t>(length)};
+    if (length >= 0) errno = length < static_cast<ssize_t>(sizeof path) ? ENOENT : ENAMETOOLONG;
+    return "";
 }
 
 std::string pathBelow(const std::string& root, const std::string& path) {

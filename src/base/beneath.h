@@ -18,7 +18,7 @@ enum class LinkPolicy {
 // path leaves the folder, ELOOP when the policy forbids a link in it.
 [[nodiscard]] Descriptor openBeneath(const Descriptor& root, const std::string& path, LinkPolicy policy, int flags);
 
-// What a link of /proc says; "" when that is no path, or longer than 4,095 bytes.
+// What a link of /proc says; "" with errno when that is no path, or longer than 4,095 bytes.
 [[nodiscard]] std::string linkedPath(const std::string& link);
 // Where an open file or folder lies, free of links; "" as above.
 [[nodiscard]] inline std::string realPathOf(const Descriptor& opened) {

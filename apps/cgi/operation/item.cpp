@@ -36,8 +36,9 @@ int openItem(const User& user, const std::string& path, std::initializer_list<Ne
     }
     code = openPresent(item.info, user.name, item.place);
     if (code != ORV_ERR_NONE) return code;
-    const bool there =
-        fstatat(item.place.folder.get(), item.place.name.c_str(), &item.status, AT_SYMLINK_NOFOLLOW) == 0;
+    item.realFolder = realPathOf(item.place.folder);
+    const bool there = !item.realFolder.empty() && fstatat(item.place.folder.get(), item.place.name.c_str(),
+                                                           &item.status, AT_SYMLINK_NOFOLLOW) == 0;
     return there ? ORV_ERR_NONE : refusalCode(errno, item.info.realPath);
 }
 

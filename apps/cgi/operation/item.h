@@ -32,11 +32,11 @@ struct Entry {
 struct Item {
     PathInfo info;
     Target place;
-    struct stat status {};  // a link's own
+    std::string realFolder;  // where that is, free of links
+    struct stat status {};   // a link's own
     [[nodiscard]] Entry entry() const { return {place.folder.get(), place.name, info.path}; }
     [[nodiscard]] ChangedFile changed() const { return {info, place.folder, place.name}; }
-    // Where it lies, free of links.
-    [[nodiscard]] std::string realPath() const { return realPathOf(place.folder) + "/" + place.name; }
+    [[nodiscard]] std::string realPath() const { return realFolder + "/" + place.name; }
 };
 
 // Resolves `path`, asks the share's rules (`needs` one after the other) and looks, as the user. 0 or a library code.

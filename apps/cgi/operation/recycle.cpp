@@ -113,7 +113,8 @@ int RecycleBin::open(const PathInfo& info, std::optional<RecycleBin>& bin) {
     if (!found.folder_) return none ? static_cast<int>(ORV_ERR_NONE) : refusalCode(errno, info.shareRoot);
     found.shareName_ = info.shareName;
     found.rootPath_ = realPathOf(found.root_);
-    found.path_ = realPathOf(found.folder_);
+    if (!found.rootPath_.empty()) found.path_ = realPathOf(found.folder_);
+    if (found.path_.empty()) return refusalCode(errno, info.shareRoot);  // anything would seem to lie in it
     bin = std::move(found);
     return ORV_ERR_NONE;
 }

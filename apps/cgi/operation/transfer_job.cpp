@@ -28,6 +28,7 @@ int openSource(const Job& job, const std::string& path, Item& item) {
 // Whether the item may get a place in the target folder.
 int checkPlace(const Job& job, const Item& item) {
     const std::string folder = realPathOf(job.folder);
+    if (folder.empty()) return refusalCode(errno, job.info.realPath);
     if (S_ISDIR(item.status.st_mode) && (folder + "/").starts_with(item.realPath() + "/")) {
         return ORV_ERR_SELECT_CONFLICT;  // a folder into itself
     }
