@@ -38,6 +38,12 @@ TEST(LoginRecordTest, LinesAsTheyAreReadAndWrittenBack) {
              {"a,u,s,1,2,3,4,\n", "a,u,s,1,2,3,4,0\n"},                        // an empty link reads as "0"
              {std::string("\n,,,\n\0\xFF\x01,\n", 10) + whole, whole},         // nothing to read
              {std::string("a,u,s,1,2,3\0x,y,z,\n", 19), "a,u,s,1,2,3,0,0\n"},  // a NUL ends what is read
+             // The same where what follows lets lines be read in blocks.
+             {"alice,u,s,1,2,3,4,\n" + whole + whole, "alice,u,s,1,2,3,4,0\n" + whole + whole},
+             {",alice,u,s,1,2,3,link\n" + whole + whole, "alice,u,s,1,2,3,link,0\n" + whole + whole},
+             {"alice,u,s,1,2,3,4,l\r\n" + whole + whole, "alice,u,s,1,2,3,4,l\n" + whole + whole},
+             {std::string("alice,u,s,1,2,3,4\0,l\n", 21) + whole + whole, "alice,u,s,1,2,3,4,0\n" + whole + whole},
+             {"x" + longest + whole + whole, whole + whole},
              {longest, longest},
              {"x" + longest + whole, whole},  // too long: no part of it is a record
          }) {
