@@ -36,7 +36,7 @@ TEST_F(OperationCgi, RequestsAreTakenStrictly) {
 
 TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
     SKIP_WITHOUT_ROOT();
-    const std::string root = addShare("photo", "read only = no\nvalid users = alice, carol\nread list = bob\n");
+    const std::string root = addShare("photo", "read only = no\nvalid users = alice, bob, carol\nread list = bob\n");
     const std::string fat = addShare("usb", "read only = no\n");
     addMount(fat, "vfat");
     makeFolder(root + "/root's", 0755);

@@ -47,7 +47,7 @@ class TaskCgi : public support::CgiTest {
     void SetUp() override {
         ApplianceTest::SetUp();
         SKIP_WITHOUT_ROOT();
-        photo_ = addShare("photo", "read only = no\nvalid users = alice, carol\nread list = bob\n");
+        photo_ = addShare("photo", "read only = no\nvalid users = alice, bob, carol\nread list = bob\n");
         video_ = addShare("video", "read only = no\n");
     }
     static CgiReply ask(const std::string& user, const std::string& form, const Variables& more = {}) {

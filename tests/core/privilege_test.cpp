@@ -25,11 +25,11 @@ class PrivilegeTest : public ApplianceTest {
         addUser("fay@corp", 20011, kUsersGid);
         addGroup("editors", 20110, {"bob", "CORP\\eve"});
         addShare("mixed",
-                 "invalid users = bob\nwrite list = bob, alice, CORP\\eve\nread list = alice\nvalid users = fay@corp\n"
-                 "vexo:restriction = 5\n");
-        addShare("drop", "write list = alice, carol\nvalid users = bob\nvexo:restriction = 2\n");
-        addShare("quiet", "write list = alice, carol\nvalid users = bob\nvexo:restriction = 1\n");
-        addShare("view", "write list = alice\nvalid users = bob, @editors\nvexo:restriction = 4\n");
+                 "invalid users = bob\nwrite list = bob, alice, CORP\\eve\nread list = alice\nvexo:restriction = 5\n"
+                 "valid users = alice, bob, CORP\\eve, fay@corp\n");
+        addShare("drop", "write list = alice, carol\nvalid users = alice, bob, carol\nvexo:restriction = 2\n");
+        addShare("quiet", "write list = alice, carol\nvalid users = alice, bob, carol\nvexo:restriction = 1\n");
+        addShare("view", "write list = alice\nvalid users = alice, bob, @editors\nvexo:restriction = 4\n");
     }
 };
 
@@ -186,7 +186,7 @@ TEST_F(PrivilegeTest, Explanations) {
     addMount(shareRoot("view"), "nfs", "ro");
     ASSERT_TRUE(ExplainPrivilege("/mixed/a", "bob", nullptr, reason));
     EXPECT_EQ(reason.rule, PrivilegeRule::kNoAccess);
-    EXPECT_TRUE(reason.inNoAccessList && reason.inReadWriteList && !reason.inReadOnlyList);
+    EXPECT_TRUE(reason.inNoAccessList && reason.inReadWriteList && reason.inReadOnlyList);
     EXPECT_TRUE(reason.exists && !reason.remote && !reason.readOnly);
     EXPECT_EQ(std::tie(reason.privilege, reason.shareMask, reason.effectiveMask), std::make_tuple(0, 5U, 5U));
     EXPECT_EQ(reason.shareName + reason.fsType, "mixedext4");

@@ -9,7 +9,7 @@ class ShareListTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
-        addShare("Zoo", "write list = alice\nvalid users = bob\n");
+        addShare("Zoo", "write list = alice\nvalid users = alice, bob\n");
         addShare("attic", "valid users = alice, bob\n");
         addShare("barn", "write list = alice\nvalid users = alice\nbrowseable = no\n");
         addShare("cave", "invalid users = alice\nwrite list = alice, bob\nvalid users = bob\n");

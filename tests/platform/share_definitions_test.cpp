@@ -160,7 +160,9 @@ vexo::ShareReading read(const std::string& text, std::string before = {}) {
     for (const auto& section : vexo::parseDefinitions(before.append("[photo]\n").append(text), kNoIncludes).sections) {
         if (section.name == "photo") return vexo::readShare(section);
     }
-    return {std::nullopt, "no section"};
+    vexo::ShareReading none;
+    none.fault = "no section";
+    return none;
 }
 
 TEST(ShareSection, MalformedOnesSayWhy) {
@@ -170,12 +172,12 @@ TEST(ShareSection, MalformedOnesSayWhy) {
              {"path = //\n", "is not that of a folder"},
              {"path = /volume1/..\n", "is not that of a folder"},
              {"path = /volume1/" + std::string(256, 'x') + "\n", "is not that of a folder"},
-             {std::string("path = /volume1/a\0b\n", 20), "a zero byte"},
+             {std::string("path = /volume1/a\0b\n", 20), "a zero or control byte"},
              {"path = /v/p\nvexo:index =\n", "neither yes nor no"},
              {"path = /v/p\nvexo:restriction = -1\n", "is no number"},
              {"path = /v/p\nvexo:restriction = 4294967296\n", "is no number or too large"},
              {"path = /v/p\nvexo:ftp = 2147483648\n", "is no number or too large"},
-             {"path = /v/p\nvalid users alice\n", "line 3: neither"},
+             {"path = /v/p\nvalid users alice\n", "neither"},
              // What is not offered is no fault.
              {"available = no\n", ""},
              {"printable = yes\npath = /var/tmp\n", ""},
@@ -201,9 +203,11 @@ TEST(ShareSection, NamesAndVariablesOfPaths) {
     EXPECT_TRUE(isSound("a b.c \xFF") && isSound("homes") && isSound(longest));
     EXPECT_FALSE(isSound(longest + "x"));
     for (const char* name : {".", "..", "a/b", "a\x01", "HOME", "\x7F"}) EXPECT_FALSE(isSound(name)) << name;
-    const vexo::PathVariables variables{"photo", "DOM\\alice", "alice", "DOM", "users"};
-    EXPECT_EQ(vexo::replaceVariables("/%S-%U/%D%g%u%%U%x%", variables), "/photo-alice/DOMusersDOM\\alice%alice%x%");
-    EXPECT_EQ(vexo::replaceVariables("%U", {"", "", "%S", "", ""}), "%S") << "a name is not looked through again";
+    const vexo::PathVariables variables{"photo", "DOM\\alice", "alice", "DOM", "users", "/h"};
+    EXPECT_EQ(vexo::replaceVariables("/%S-%U/%D%g%u%G%H%%U%x%", variables),
+              "/photo-alice/DOMusersDOM\\aliceusers/h%%U%x%");
+    EXPECT_EQ(vexo::replaceVariables("%U", {"", "", "%S", "", "", ""}), "%S") << "a name is not looked through again";
+    EXPECT_FALSE(vexo::replaceVariables("/v/%D", {"s", "u", "u", "", "g", "/h"})) << "another folder than is meant";
 }
 
 // Files that include each other without end cost a section, not the process.

@@ -51,7 +51,9 @@ TEST_F(ShareTest, RecordsAreFoundWithoutCase) {
              "valid users = alice, @users\ninvalid users = bob\nwrite list = \"DOM\\carl x\"\nbrowseable = no\n"
              "vexo:restriction = 0x5\nVexo : Encrypted = yes\nvexo:ftp = 2\nvexo:acl = 1\nvexo:synced = true\n");
     addShare("plain", "vexo:index = on\n");
-    EXPECT_EQ(textOf("mUSIC"), "Music no bob| rw DOM\\carl x| ro alice|@users| 3 5 2 1 1 0");
+    EXPECT_EQ(textOf("mUSIC"),
+              "Music no bob| rw DOM\\carl x\x1F"
+              "alice|DOM\\carl x\x1F@users| ro alice|@users| 3 5 2 1 1 0");
     EXPECT_EQ(textOf("plain"), "plain no  rw  ro *| 0 0 0 0 0 1");
     EXPECT_EQ(rootOf("music"), shareRoot("Music"));
     SDK::Share* loaded = SDK::Share::LoadShare("mUSIC");
@@ -103,13 +105,20 @@ TEST_F(ShareTest, MalformedSectionsDoNotHideTheOthers) {
 TEST_F(ShareTest, RightsFromLists) {
     addUser("erin", 20030, kUsersGid);
     addGroup("Editors", 20130, {"erin"});
+    // More pairs of entries than are written out.
+    std::string longLists = "valid users = bob @Editors\nwrite list = bob";
+    for (int i = 0; i < 2100; ++i) longLists += " nobody" + std::to_string(i);
+    longLists += "\n";
     for (const auto& [options, alice, bob, erin] : Rows<const char*, int, int, int>{
              row("", 1, 1, 1), row("read only = no\n", 2, 2, 2),
-             row("valid users = ALICE, @editors\nwrite list = bob\n", 1, 2, 1),
-             row("valid users = +Editors\nread list = alice\nread only = no\n", 1, 0, 2),
-             row("valid users = &Editors\ninvalid users = +users\n", 0, 0, 0),
+             row("valid users = ALICE, @Editors\nwrite list = bob, erin\n", 1, 0, 2),
+             row("valid users = +Editors bob\nread list = alice @Editors\nread only = no\n", 0, 2, 1),
+             row("valid users = @users\nread list = @users\nwrite list = @Editors\nread only = no\n", 1, 1, 2),
+             row("read list = @Editors alice\nread only = no\nwrite list = alice\n", 2, 2, 1),
+             row("valid users = &Editors\ninvalid users = alice\n", 0, 0, 0),
              row("invalid users = bob @none\nwrite list = bob @Editors\nread only = yes\n", 1, 0, 2),
-             row("valid users = \"\"\nread only = no\n", 0, 0, 0),
+             row("valid users = \"\"\nread only = no\n", 0, 0, 0), row("valid users = bob %S\n", 0, 1, 0),
+             row("valid users = @editors *\n", 0, 0, 0), row(longLists.c_str(), 0, 2, 1),
              row("write list = erin\nread list = erin alice\nvalid users = @users\ninvalid users = @\"no such\"\n", 1,
                  1, 2)}) {
         addShare("music", options);
@@ -159,7 +168,7 @@ TEST_F(ShareTest, RootsWithVariablesFollowTheUser) {
          Rows<const char*, const char*, const char*, const char*, const char*>{
              row("alice", "/v/alice", "/v/all.users.alice", "", "own|all|"),
              row("DOM\\dora", "/v/dora", "/v/all.users.DOM\\dora", "/DOM/dora", "own|all|dom|"),
-             row("..", "", "/v/all.users...", "", "all|"), row("nobody known", "", "/v/all..", "", "all|")}) {
+             row("..", "", "/v/all.users...", "", "all|"), row("nobody known", "", "", "", "")}) {
         setenv("REMOTE_USER", user, 1);
         EXPECT_EQ(rootOf("own"), own) << user;
         EXPECT_EQ(rootOf("all"), all) << user;
@@ -200,6 +209,136 @@ TEST_F(ShareTest, Homes) {
     setSetting("userhome_enable", "yes");
     define("[photo]\npath = /v/photo\n");
     EXPECT_EQ(VEXOServiceUserHomeIsEnabled(AUTH_LOCAL, kAliceUid), 0) << "without the share";
+}
+
+// [homes] without a path, or with one of each user's own: there is no share, but everybody whom it admits has a home.
+TEST_F(ShareTest, HomesThatAreInNoShare) {
+    const auto homeOf = [](const char* name) {
+        PVEXOUSER user = nullptr;
+        if (VEXOUserGet(name, &user) < 0) return std::string("nobody");
+        const std::string home = user->szHome;
+        EXPECT_EQ(VEXOServiceUserHomeIsEnabled(AUTH_LOCAL, user->uid) == 1, !home.empty()) << name;
+        VEXOUserFree(user);
+        return home;
+    };
+    const std::string place = shareRoot("photo");
+    writeRootFile("/etc/passwd", "alice:x:20001:20100::" + place +
+                                     "/al:\nbob:x:20002:20100::/nonexistent:\n"
+                                     "carol:x:20003:20100::/:\ndave:x:20004:20100::" +
+                                     place + "/d:\n");
+    for (const auto& [options, alice, dave] : Rows<const char*, std::string, std::string>{
+             {"read only = no\n", "/al", "/d"},
+             {"read only = no\nvalid users = %S\nbrowseable = no\n", "/al", "/d"},
+             {"writeable = yes\ninvalid users = dave\n", "/al", ""},
+             {"read only = no\nread list = alice\n", "", "/d"},
+             {"vexo:ignore = read only\n", "/al", "/d"},
+             {"read only = no\npath = %H/sub\n", "/al/sub", "/d/sub"},
+             {"available = no\nread only = no\n", "", ""}}) {
+        define(std::string("[homes]\n") + options);
+        const auto full = [&](const std::string& end) { return end.empty() ? end : place + end; };
+        EXPECT_EQ(homeOf("alice"), full(alice)) << options;
+        EXPECT_EQ(homeOf("dave"), full(dave)) << options;
+        EXPECT_EQ(homeOf("bob"), "") << "no home in the account";
+        EXPECT_EQ(rootOf("homes") + allNames(), "");
+        EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_SHARE_MISSING);
+    }
+    define("[homes]\nread only = no\npath = " + place + "/%S\n");
+    EXPECT_EQ(homeOf("carol"), place + "/carol");
+    define("[homes]\nbrowseable = no\n");
+    announceLog("share [homes] is closed: line 1: read only = yes (not stated): a user's home is always to read");
+    EXPECT_EQ(homeOf("alice"), "") << "what is read only there is not open here";
+}
+
+// Options that keep somebody out and are not honoured, those that are not known among them, close a share, and nothing
+// else does.
+TEST_F(ShareTest, WhatClosesAShare) {
+    const auto stateOf = [&](const std::string& options, const std::string& global = "") {
+        define("[global]\n" + global + "[s]\npath = /srv/samba/team\n" + options);
+        const std::string root = rootOf("s");
+        std::string closing;
+        for (const auto& line : takeLog()) closing += line.text;
+        const size_t begin = closing.find("is closed: ");
+        EXPECT_EQ(root.empty(), begin != std::string::npos) << options << closing;
+        return begin == std::string::npos ? "" : closing.substr(begin + 11, closing.find(" = ", begin) - begin - 11);
+    };
+    for (const auto& [options, closing] : Rows<const char*, const char*>{
+             {"", ""},
+             {"hosts allow = 192.168.1.\n", "line 4: hosts allow"},
+             {"comment = x\nallow hosts = 10.\n", "line 5: hosts allow"},
+             {"hosts allow = ALL\nhosts deny =\n", ""},
+             {"hosts allow = 10.\nvexo:ignore = Hosts Allow\n", ""},
+             {"hosts allow = 10.\nvexo:ignore = hosts deny, allowhosts; force user\nforce user = x\n", ""},
+             {"hosts allow = 10.\nvexo:ignore = hosts deny\n", "line 4: hosts allow"},
+             {"force user = nobody\n", "line 4: force user"},
+             {"force group = team\ncreate mask = 0600\nadmin users = bob\nguest ok = yes\nwide links = yes\n", ""},
+             {"guest only = no\nhide unreadable = no\nfollow symlinks = yes\npreexec close = 0\n", ""},
+             {"only guest = yes\n", "line 4: guest only"},
+             {"hide unreadable = yes\n", "line 4: hide unreadable"},
+             {"hide unreadable = perhaps\n", "line 4: hide unreadable"},
+             {"hide new files timeout = 0\n", ""},
+             {"hide new files timeout = 5\n", "line 4: hide new files timeout"},
+             {"follow symlinks = no\n", "line 4: follow symlinks"},
+             {"veto files = /@tmp/\n", ""},
+             {"veto files = /@tmp/*.exe/\n", "line 4: veto files"},
+             {"vfs objects = fruit streams_xattr, recycle\nfruit:model = X\nrecycle:keeptree = yes\n", ""},
+             {"vfs objects = recycle acl_xattr\n", "line 4: vfs objects"},
+             {"worm:grace_period = 5\n", "line 4: worm:grace_period"},
+             {"smb encrypt = desired\n", ""},
+             {"smb encrypt = mandatory\n", "line 4: server smb encrypt"},
+             {"some new option = 1\n", "line 4: some new option"},
+             {"vexo:restrict = 7\n", "line 4: vexo:restrict"},
+             {"valid users = %D\\alice\n", "line 4: valid users"},
+             {"invalid users = &staff\n", "line 4: invalid users"},
+             {"path = /srv/%m\n", "line 4: path"},
+             {"include = /etc/samba/%m.conf\n", "line 4: include"}}) {
+        EXPECT_EQ(stateOf(options), closing) << options;
+    }
+    // What [global] says counts below it, and some of it everywhere.
+    for (const auto& [global, options, closing] : Rows<const char*, const char*, const char*>{
+             {"workgroup = W\nserver role = standalone server\nlog file = x\nmap to guest = bad user\n", "", ""},
+             {"force user = x\n", "", "line 2: force user"},
+             {"force user = x\n", "force user =\n", ""},
+             {"hosts allow = 10.\n", "hosts allow =\n", "line 2: hosts allow"},
+             {"hosts allow = 10.\n", "vexo:ignore = hosts allow\n", ""},
+             {"vexo:ignore = hosts allow\nhosts allow = 10.\n", "", ""},
+             {"", "[global]\nhosts deny = ALL\n", "line 5: hosts deny"},
+             {"", "[global]\nroot directory = /chroot\n", "line 5: root directory"},
+             {"config backend = registry\n", "", "line 2: config backend"},
+             {"config backend = file\n", "", ""}}) {
+        EXPECT_EQ(stateOf(options, global), closing) << global << options;
+    }
+    EXPECT_EQ(stateOf("", "include = registry\n"), "line 2: include");
+    define(
+        "[t]\npath = /srv/t\nforce user = x\n[s]\ncopy = t\npath = /srv/s\n[u]\ncopy = t\nforce user =\npath = "
+        "/srv/u\n");
+    EXPECT_EQ(allNames(), "u|") << "a copy is closed as what it copies";
+    takeLog();
+    define(
+        "[printers]\npath = /var/spool\n[print$]\npath = /var/lib\n[p]\nprintable = yes\npath = /var/x\n[b]\npath = "
+        "/v/b\n");
+    EXPECT_EQ(allNames(), "b|") << "printers are meant to be no shares, and said nowhere";
+}
+
+// Whatever a request meets while the file is written, nobody sees more than the whole file gives.
+TEST_F(ShareTest, HalfWrittenDefinitions) {
+    define("[a]\npath = /v/a\n[b]\npath = /v/b\nvalid users = al");
+    announceLog("share [b] is left out: line 5: the file ends within a line");
+    EXPECT_EQ(allNames(), "a|");
+    timespec old[2] = {{1000000000, 0}, {1000000000, 0}};
+    ASSERT_EQ(utimensat(AT_FDCWD, (systemRoot() + kDefinitions).c_str(), old, 0), 0);
+    EXPECT_EQ(allNames(), "a|b|") << "a last line without its end that nobody goes on with";
+    define("");
+    EXPECT_EQ(allNames(), "");
+    define(std::string((1 << 20) + 1, '#'));
+    EXPECT_EQ(allNames(), "no database");
+    EXPECT_EQ(errno, EFBIG);
+    std::string many;
+    for (int i = 0; many.size() < (1 << 20) - 40; ++i)
+        many += "[" + std::to_string(i) + "]\npath = /v/" + std::to_string(i) + "\n";
+    define(many);
+    announceLog("more than 10000 sections");
+    const std::string names = allNames();
+    EXPECT_EQ(std::count(names.begin(), names.end(), '|'), 10000);
 }
 
 }  // namespace

@@ -148,7 +148,7 @@ class SearchFixture : public ApplianceTest {
     void SetUp() override {
         ApplianceTest::SetUp();
         for (const char* share : {"photo", "docs", "homes"}) {
-            addShare(share, "read only = no\nvalid users = alice, carol\nread list = bob\nvexo:index = yes\n");
+            addShare(share, "read only = no\nvalid users = alice, bob, carol\nread list = bob\nvexo:index = yes\n");
         }
     }
     static void makeFile(const std::string& path, off_t size = 0, uid_t uid = 0, gid_t gid = 0, time_t modified = 0,

@@ -120,7 +120,7 @@ TEST_F(SearchRunTest, WhatAWalkMeets) {
                       expected != VEXO_ERR_GENERAL ? "" : only("Fail to Stat " + folder + ", Not a directory"));
         });
         fs::remove_all(shareRoot("photo"));
-        addShare("photo", "read only = no\nvalid users = alice\nread list = bob\nvexo:index = yes\n");
+        addShare("photo", "read only = no\nvalid users = alice, bob\nread list = bob\nvexo:index = yes\n");
     }
 
     // Without a flag the walk ends, as failed, with its first entry; a failing index fails the search.

@@ -172,7 +172,7 @@ void ApplianceTest::SetUp() {
     writeRootFile("/etc/vexoinfo.conf", settings_);
     writeRootFile("/etc.defaults/vexoinfo.conf", defaults_);
     writeRootFile("/proc/mounts", mounts_);
-    addShare("photo", "read only = no\nvalid users = alice\nread list = bob\n");
+    addShare("photo", "read only = no\nvalid users = alice, bob\nread list = bob\n");
     addShare("homes", "read only = no\nvalid users = alice, bob, carol\n");
     vexo::gate::reset();
     capturedLog.clear();

@@ -15,12 +15,14 @@ struct DemoShare {
     void (*fill)(Tree&);
 };
 
-// In smb.conf(5) terms `valid users` may read, or write where the share is not read-only; `write list` may write.
+// In smb.conf(5) terms `valid users` may enter, and write where the share is not read-only; of them `write list` may
+// write and `read list` may not.
 constexpr DemoShare kShares[] = {
     {"homes", "comment = home folders, made on first use\nread only = no\nvalid users = alice, bob, admin\n",
      fillHomes},
     {"photo",
-     "read only = no\nvalid users = alice, @administrators\nread list = bob\nvexo:synced = yes\nvexo:index = yes\n",
+     "read only = no\nvalid users = alice, bob, @administrators\nread list = bob\nvexo:synced = yes\nvexo:index = "
+     "yes\n",
      fillPhoto},
     {"music", "valid users = alice, bob, admin\nwrite list = alice, admin\n", fillMusic},
     {"projects", "read only = no\nvalid users = @users\ninvalid users = bob\n", fillProjects},
@@ -29,11 +31,11 @@ constexpr DemoShare kShares[] = {
     {"sealed", "comment = no listing, no download\nread only = no\nvalid users = @users\nvexo:restriction = 1\n",
      fillSample},
     {"archive",
-     "comment = existing files stay as they are\nread only = no\nvalid users = alice, admin\nread list = bob\n"
+     "comment = existing files stay as they are\nread only = no\nvalid users = alice, bob, admin\nread list = bob\n"
      "vexo:restriction = 2\n",
      fillSample},
     {"preview",
-     "comment = no download\nread only = no\nvalid users = alice, admin\nread list = bob\nvexo:restriction = 4\n",
+     "comment = no download\nread only = no\nvalid users = alice, bob, admin\nread list = bob\nvexo:restriction = 4\n",
      fillSample},
     {"backstage", "comment = hidden\nbrowseable = no\nread only = no\nvalid users = alice, admin\n", fillSample},
 };

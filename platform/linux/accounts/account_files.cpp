@@ -64,7 +64,7 @@ bool AccountFiles::readUsers(const std::string& path) {
         if (!isRecordName(record->pw_name)) continue;
         userByName_.emplace(record->pw_name, users_.size());
         userByUid_.emplace(record->pw_uid, users_.size());
-        users_.push_back({record->pw_name, record->pw_uid, record->pw_gid});
+        users_.push_back({record->pw_name, record->pw_uid, record->pw_gid, record->pw_dir});
     }
     return ferror(file.get()) == 0;
 }

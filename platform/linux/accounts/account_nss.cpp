@@ -45,7 +45,7 @@ Lookup askUser(Account& out, const Call& call) {
     passwd record{};
     std::vector<char> buffer;
     const Lookup answer = ask(record, buffer, call);
-    if (answer == Lookup::found) out = {record.pw_name, record.pw_uid, record.pw_gid};
+    if (answer == Lookup::found) out = {record.pw_name, record.pw_uid, record.pw_gid, record.pw_dir};
     return answer;
 }
 
@@ -115,7 +115,7 @@ bool users(std::vector<Account>& out) {
         errno = 0;
         const passwd* record = getpwent();
         if (record == nullptr) break;
-        out.push_back({record->pw_name, record->pw_uid, record->pw_gid});
+        out.push_back({record->pw_name, record->pw_uid, record->pw_gid, record->pw_dir});
     }
     const int error = errno;
     endpwent();

@@ -14,6 +14,7 @@ struct Account {
     std::string name;
     uid_t uid = 0;
     gid_t gid = 0;  // primary group
+    std::string home;
 };
 
 struct Group {

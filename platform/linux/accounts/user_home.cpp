@@ -7,8 +7,10 @@
 
 #include "accounts/account_name.h"
 #include "accounts/account_source.h"
+#include "accounts/user_list.h"
 #include "failure.h"
 #include "fault_gate.h"
+#include "shares/share_record.h"
 #include "shares/share_store.h"
 #include "vexo/settings.h"
 #include "vexo/share.h"
@@ -17,6 +19,7 @@ namespace vexo {
 namespace {
 
 constexpr const char* kSettings = "/etc/vexoinfo.conf";
+constexpr std::string_view kNoHome = "/nonexistent";  // what accounts without a home have
 
 std::string rootOfHomes() {
     const auto shares = currentShares();
@@ -24,8 +27,21 @@ std::string rootOfHomes() {
     return homes == nullptr ? std::string() : rootOf(*homes).value_or(std::string());
 }
 
+// Where homes are in no share, the account source says where they are, and [homes] who has one.
+std::string ownHomeOf(const Account& account) {
+    const auto shares = currentShares();
+    const ShareDefinition* homes = shares == nullptr ? nullptr : shares->homes();
+    if (homes == nullptr || account.home == kNoHome) return {};
+    const std::optional<std::string> home = homeIn(*homes, account);
+    VEXOSHARE* const record = new VEXOSHARE();
+    const ShareRecord owner(record);
+    if (!home || !fillShare(homesOf(*homes, account.name), *home, *record)) return {};
+    ListedUser listed(account.name);
+    return listed.rightOn(*record) == 2 && !listed.failed() ? *home : std::string();
+}
+
 bool isServiceOn() {
-    return VLIBCFileCheckKeyValue(kSettings, "userhome_enable", "yes", 1) == 1 && !rootOfHomes().empty();
+    return VLIBCFileCheckKeyValue(kSettings, "userhome_enable", "yes", 1) == 1;
 }
 
 // Writes the home of a user who is known.
@@ -43,16 +59,24 @@ int findHome(const std::string& user, char* path, int size) {
 
 std::string homeOf(const std::string& user) {
     const KeepErrno keep;
-    std::string root = rootOfHomes();
-    if (root.empty()) return root;
+    const std::string root = rootOfHomes();
+    if (root.empty()) {
+        Account account;
+        const bool known = AccountSource::instance().user(user, account) == Lookup::found;
+        return known ? ownHomeOf(account) : std::string();
+    }
     const AccountName name = splitAccountName(user);
     return root + (name.type == AUTH_DOMAIN ? "/@" + name.domain : "") + '/' + name.name;
 }
 
-bool isAboveHomes(std::string_view folder) {
+bool isAboveHomes(std::string_view folder, uid_t user) {
     const KeepErrno keep;
     const std::string root = rootOfHomes();
-    if (root.empty()) return false;
+    if (root.empty()) {
+        Account account;
+        const bool known = AccountSource::instance().user(user, account) == Lookup::found;
+        return known && ownHomeOf(account).starts_with(std::string(folder) + '/');
+    }
     const bool isDomain =
         folder.starts_with(root + "/@") && folder.find('/', root.size() + 1) == std::string_view::npos;
     return isDomain || (root + '/').starts_with(std::string(folder) + '/');
@@ -62,11 +86,13 @@ bool isAboveHomes(std::string_view folder) {
 
 int VEXOServiceUserHomeIsEnabled(int authType, uid_t uid) try {
     VEXO_GATE("VEXOServiceUserHomeIsEnabled", 0);
-    // One switch for every kind of account and every user.
-    static_cast<void>(authType);
-    static_cast<void>(uid);
+    static_cast<void>(authType);  // one switch for every kind of account
     const vexo::KeepErrno keep;
-    return static_cast<int>(vexo::isServiceOn());
+    if (!vexo::isServiceOn()) return 0;
+    if (!vexo::rootOfHomes().empty()) return 1;
+    vexo::Account account;
+    const bool known = vexo::AccountSource::instance().user(uid, account) == vexo::Lookup::found;
+    return static_cast<int>(known && !vexo::ownHomeOf(account).empty());
 } catch (const std::exception&) {
     vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
     return 0;
@@ -81,7 +107,7 @@ int VEXOServiceHomePathGet(const char* user, char* path, int size) try {
         vexo::isAccountName(user) ? vexo::AccountSource::instance().user(user, account) : vexo::Lookup::missing;
     if (known == vexo::Lookup::failed) return vexo::fail(VEXO_ERR_GENERAL);
     if (known == vexo::Lookup::missing) return vexo::fail(VEXO_ERR_USER_MISSING);
-    if (!vexo::isServiceOn()) return vexo::fail(VEXO_ERR_MISSING, ENOENT);
+    if (!vexo::isServiceOn() || vexo::homeOf(user).empty()) return vexo::fail(VEXO_ERR_MISSING, ENOENT);
     return vexo::findHome(user, path, size);
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);

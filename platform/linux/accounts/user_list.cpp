@@ -8,6 +8,7 @@
 #include "accounts/account_source.h"
 #include "failure.h"
 #include "fault_gate.h"
+#include "shares/share_options.h"
 #include "vexo/text.h"
 
 namespace vexo {
@@ -29,8 +30,20 @@ bool ListedUser::isIn(PVLIBCSZLIST list) {
     return false;
 }
 
+// All of its conditions must hold. What cannot be determined does not, neither way.
 bool ListedUser::matches(std::string_view entry) {
-    if (name_.empty()) return false;
+    while (true) {
+        const size_t end = entry.find(kListAnd);
+        std::string_view condition = entry.substr(0, end);
+        const bool isNot = condition.starts_with(kListNot);
+        if (isNot) condition.remove_prefix(1);
+        if (holds(condition) == isNot || failed_ || name_.empty()) return false;
+        if (end == std::string_view::npos) return true;
+        entry.remove_prefix(end + 1);
+    }
+}
+
+bool ListedUser::holds(std::string_view entry) {
     if (entry == kEverybody) return true;
     const size_t marks = std::min(entry.find_first_not_of(kGroupMarks), entry.size());
     const std::string name(entry.substr(marks));
@@ -43,7 +56,7 @@ int ListedUser::rightOn(const VEXOSHARE& share) {
     return isIn(share.roList) ? 1 : 0;
 }
 
-// The name as it stands decides where there is such a group; else its case does not count.
+// The name as it stands decides where there is such a group; else case does not count for one of a domain.
 bool ListedUser::isInGroup(const std::string& group) {
     const std::vector<gid_t>& mine = groups();
     if (mine.empty() || group.empty()) return false;
@@ -51,9 +64,9 @@ bool ListedUser::isInGroup(const std::string& group) {
     Group record;
     Lookup answer = accounts.group(group, record);
     if (answer == Lookup::found) return std::find(mine.begin(), mine.end(), record.gid) != mine.end();
-    for (const gid_t gid : mine) {
-        if (answer == Lookup::failed) break;
-        answer = accounts.group(gid, record);
+    const bool ofDomain = group.find('\\') != std::string::npos;
+    for (size_t i = 0; ofDomain && i < mine.size() && answer != Lookup::failed; ++i) {
+        answer = accounts.group(mine[i], record);
         if (answer == Lookup::found && areEqual(record.name, group)) return true;
     }
     if (answer == Lookup::failed) {

@@ -20,6 +20,7 @@ class ListedUser {
     explicit ListedUser(std::string name) : name_(std::move(name)) {}
 
     [[nodiscard]] bool isIn(PVLIBCSZLIST list);
+    // `entry`: a name, a group or "*", or conditions as the lists of shares have them.
     [[nodiscard]] bool matches(std::string_view entry);
     // The right that the lists of a share give: no access beats read-write beats read-only.
     [[nodiscard]] int rightOn(const VEXOSHARE& share);
@@ -28,6 +29,7 @@ class ListedUser {
     [[nodiscard]] bool failed() const { return failed_; }
 
  private:
+    [[nodiscard]] bool holds(std::string_view entry);
     [[nodiscard]] bool isInGroup(const std::string& group);
     [[nodiscard]] const std::vector<gid_t>& groups();
 

@@ -136,9 +136,10 @@ Descriptor enter(int parent, const std::string& name, std::string_view at, bool 
                  const Attributes& attributes) {
     constexpr Attributes system = {kKeep, kKeep, kSystemMode};
     Descriptor fd = vexo::openFile(parent, name.c_str(), O_PATH | O_DIRECTORY);
-    if (fd && above && name.front() == '@' && vexo::isAboveHomes(at)) takeBack(fd.get(), parent, name, attributes.uid);
+    if (fd && above && name.front() == '@' && vexo::isAboveHomes(at, attributes.uid))
+        takeBack(fd.get(), parent, name, attributes.uid);
     if (fd || errno != ENOENT || !mayMake) return fd;
-    return makeOne(parent, name, above && vexo::isAboveHomes(at) ? system : attributes);
+    return makeOne(parent, name, above && vexo::isAboveHomes(at, attributes.uid) ? system : attributes);
 }
 
 // The next component of `rest`, which moves behind it; empty at the end.

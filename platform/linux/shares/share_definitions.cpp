@@ -1,6 +1,7 @@
 #include "shares/share_definitions.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <cstdint>
 #include <iterator>
 #include <unordered_map>
@@ -14,6 +15,7 @@ namespace {
 
 constexpr int kIncludeDepth = 16;
 constexpr int kIncludedFiles = 128;
+constexpr size_t kMaxSections = 10000;
 constexpr size_t kGlobal = SIZE_MAX;
 constexpr size_t kNowhere = SIZE_MAX - 1;  // behind a header that names nothing
 
@@ -66,6 +68,7 @@ constexpr KnownKey kKeys[] = {
     {"vexo:synced", ShareOption::synced},
     {"vexo:ftp", ShareOption::ftp},
     {"vexo:acl", ShareOption::acl},
+    {"vexo:ignore", ShareOption::ignore},
 };
 
 class Parser {
@@ -74,11 +77,13 @@ class Parser {
 
     // `file` names an included text in what is said about its lines.
     void parse(std::string_view text, const std::string& file) {
+        const int position = static_cast<int>(out_.files.size());
+        out_.files.push_back(file);
         DefinitionLines lines(text);
         std::string line;
         int number = 0;
         while (lines.next(line, number)) {
-            place_ = "line " + std::to_string(number) + (file.empty() ? "" : " of " + file);
+            place_ = {position, number};
             if (line.front() == '[') {
                 takeHeader(line);
             } else {
@@ -86,12 +91,17 @@ class Parser {
             }
         }
     }
-    Definitions result() { return std::move(out_); }
+    void endTorn() { fault("the file ends within a line: somebody is writing it"); }
+    Definitions result() {
+        out_.global = std::move(defaultLimits_);
+        return std::move(out_);
+    }
 
  private:
     void takeHeader(std::string_view line);
     void takeOption(std::string_view line);
     void store(const KnownKey& known, std::string text);
+    void storeLimit(std::string_view key, std::string_view written, std::string text);
     void copyFrom(const std::string& name);
     void includeFile(const std::string& file);
     void fault(const std::string& what);
@@ -99,20 +109,22 @@ class Parser {
     const IncludeReader& include_;
     Definitions out_;
     OptionValues defaults_;
+    LimitValues defaultLimits_;
     std::unordered_map<std::string, size_t> byName_;
     size_t current_ = kGlobal;  // lines above every header are global
-    std::string place_;         // of the line at hand
+    Place place_;               // of the line at hand
     int depth_ = 0;
     int included_ = 0;
+    bool tooMany_ = false;
 };
 
 // A section with a line that could have been a restriction is worth nothing, so the fault stays with it.
 void Parser::fault(const std::string& what) {
-    std::string text = place_ + ": " + what;
     if (current_ == kGlobal || current_ == kNowhere) {
-        out_.problems.push_back(std::move(text));
+        out_.problems.push_back({what, place_});
     } else if (out_.sections[current_].fault.empty()) {
-        out_.sections[current_].fault = std::move(text);
+        out_.sections[current_].fault = what;
+        out_.sections[current_].faultPlace = place_;
     }
 }
 
@@ -129,9 +141,19 @@ void Parser::takeHeader(std::string_view line) {
         current_ = kGlobal;
         return;
     }
-    const auto [place, isNew] = byName_.emplace(foldedName(name), out_.sections.size());
-    current_ = place->second;
-    if (isNew) out_.sections.push_back({std::move(name), defaults_, {}});
+    const auto known = byName_.find(foldedName(name));
+    if (known != byName_.end()) {
+        current_ = known->second;
+        return;
+    }
+    if (out_.sections.size() == kMaxSections) {
+        current_ = kNowhere;
+        if (!std::exchange(tooMany_, true)) fault("more than " + std::to_string(kMaxSections) + " sections");
+        return;
+    }
+    current_ = out_.sections.size();
+    byName_.emplace(foldedName(name), current_);
+    out_.sections.push_back({std::move(name), place_, defaults_, defaultLimits_, {}, {}});
 }
 
 void Parser::takeOption(std::string_view line) {
@@ -150,8 +172,20 @@ void Parser::takeOption(std::string_view line) {
     } else {
         const auto* known =
             std::find_if(std::begin(kKeys), std::end(kKeys), [&](const auto& k) { return k.key == key; });
-        if (known != std::end(kKeys)) store(*known, std::move(text));
+        if (known != std::end(kKeys)) {
+            store(*known, std::move(text));
+        } else {
+            storeLimit(key, line.substr(0, equals), std::move(text));
+        }
     }
+}
+
+void Parser::storeLimit(std::string_view key, std::string_view written, std::string text) {
+    const std::string kept = limitKey(key);
+    if (kept.empty()) return;
+    const bool global = current_ == kGlobal;
+    LimitValues& limits = global ? defaultLimits_ : out_.sections[current_].limits;
+    limits[kept] = {limitName(kept, written), std::move(text), place_, !global};
 }
 
 void Parser::store(const KnownKey& known, std::string text) {
@@ -160,7 +194,7 @@ void Parser::store(const KnownKey& known, std::string text) {
         if (const auto says = parseBoolean(text)) text = *says ? "no" : "yes";
     }
     OptionValues& values = current_ == kGlobal ? defaults_ : out_.sections[current_].values;
-    values[static_cast<size_t>(known.option)] = {std::move(text), true, current_ != kGlobal};
+    values[static_cast<size_t>(known.option)] = {std::move(text), true, current_ != kGlobal, place_};
 }
 
 // Everything the other section has, its defaults too, except what this one stated itself.
@@ -174,21 +208,34 @@ void Parser::copyFrom(const std::string& name) {
     const DefinitionSection& from = out_.sections[source->second];
     DefinitionSection& to = out_.sections[current_];
     for (size_t i = 0; i < kShareOptions; ++i) {
-        if (!to.values[i].own) to.values[i] = {from.values[i].text, from.values[i].stated, false};
+        if (!to.values[i].own) to.values[i] = {from.values[i].text, from.values[i].stated, false, from.values[i].place};
+    }
+    std::erase_if(to.limits, [](const auto& limit) { return !limit.second.own; });
+    for (const auto& [key, limit] : from.limits) {
+        to.limits.emplace(key, LimitValue{limit.name, limit.text, limit.place, false});
     }
     if (!from.fault.empty()) fault("copies a section with a fault");
 }
 
 void Parser::includeFile(const std::string& file) {
     const size_t includer = current_;
+    if (file == "registry" || unknownVariable(file, "")) {
+        storeLimit("include", "include", file);
+        if (current_ == kGlobal) fault("include = " + file + " cannot be read here, so shares below are closed");
+        return;
+    }
     if (depth_ == kIncludeDepth || included_ == kIncludedFiles) {
         fault("too many files are included");
         return;
     }
     ++included_;
+    errno = 0;
     const std::optional<std::string> text = include_(file);
     if (!text) {
+        const bool missing = errno == ENOENT;
         fault("the included file cannot be read");
+        // What stands in a file that is there may close the shares below.
+        if (current_ == kGlobal && !missing) storeLimit("include", "include", file);
         return;
     }
     ++depth_;
@@ -200,9 +247,15 @@ void Parser::includeFile(const std::string& file) {
 
 }  // namespace
 
-Definitions parseDefinitions(std::string_view text, const IncludeReader& include) {
+std::string placeText(const Definitions& definitions, const Place& place) {
+    const std::string& file = definitions.files.at(static_cast<size_t>(place.file));
+    return "line " + std::to_string(place.line) + (file.empty() ? "" : " of " + file);
+}
+
+Definitions parseDefinitions(std::string_view text, const IncludeReader& include, bool torn) {
     Parser parser(include);
     parser.parse(text, {});
+    if (torn) parser.endTorn();
     return parser.result();
 }
 

@@ -10,9 +10,11 @@
 #include <string_view>
 #include <vector>
 
+#include "shares/share_limits.h"
+
 namespace vexo {
 
-// The options that mean something here; all others are skipped.
+// The options that mean something here. What others may mean: share_limits.h.
 enum class ShareOption {
     path,
     available,
@@ -29,34 +31,50 @@ enum class ShareOption {
     synced,
     ftp,
     acl,
+    ignore,
 };
-constexpr size_t kShareOptions = static_cast<size_t>(ShareOption::acl) + 1;
+constexpr size_t kShareOptions = static_cast<size_t>(ShareOption::ignore) + 1;
 
 struct OptionValue {
     std::string text;
     bool stated = false;  // there is a value, be it an empty one
     bool own = false;     // stated by the section itself, so that no `copy` replaces it
+    Place place = {};
 };
 using OptionValues = std::array<OptionValue, kShareOptions>;
 
 struct DefinitionSection {
     std::string name;  // as first written
+    Place place;       // of its first header
     OptionValues values;
+    LimitValues limits;
     std::string fault;  // why the section cannot be trusted to mean what its author meant; "" when it can
+    Place faultPlace;
     [[nodiscard]] const OptionValue& value(ShareOption option) const { return values[static_cast<size_t>(option)]; }
+};
+
+struct Problem {
+    std::string text;
+    Place place;
 };
 
 struct Definitions {
     std::vector<DefinitionSection> sections;  // in order of their first header; [global] is not among them
-    std::vector<std::string> problems;        // what is wrong outside every section, one line of text each
+    std::vector<Problem> problems;            // what is wrong outside every section
+    LimitValues global;                       // what [global] says in the end
+    std::vector<std::string> files;           // the names of the included ones, behind "" for the main one
 };
 
-// Gives the text of an included file, or nothing when it cannot be read.
+// "line 3", or "line 3 of users.conf" for an included file.
+[[nodiscard]] std::string placeText(const Definitions& definitions, const Place& place);
+
+// Gives the text of an included file, or nothing when it cannot be read: with errno ENOENT when there is none.
 using IncludeReader = std::function<std::optional<std::string>(const std::string& file)>;
 
 // Sections of one name (without case) are one section. A section starts with what [global] said up to its first
-// header. An included file continues the section that includes it.
-[[nodiscard]] Definitions parseDefinitions(std::string_view text, const IncludeReader& include);
+// header. An included file continues the section that includes it. `torn`: the text ends within a line, as somebody is
+// writing it; its last section is not to be trusted then.
+[[nodiscard]] Definitions parseDefinitions(std::string_view text, const IncludeReader& include, bool torn = false);
 
 // The entries of a list: separated by comma, semicolon and blanks, except inside double quotes. "" is an empty entry.
 [[nodiscard]] std::vector<std::string> splitList(std::string_view text);

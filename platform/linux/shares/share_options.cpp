@@ -1,9 +1,13 @@
 #include "shares/share_options.h"
 
+#include <algorithm>
 #include <charconv>
 #include <climits>
 #include <cstddef>
+#include <iterator>
+#include <utility>
 
+#include "shares/definition_lines.h"
 #include "vexo/share.h"
 
 namespace vexo {
@@ -15,6 +19,24 @@ constexpr size_t kMaxComponent = 255;
 constexpr std::string_view kEverybody = "*";
 // The first component of a path that means the user's own folder, so no share can be reached by it.
 constexpr std::string_view kReservedName = "home";
+constexpr std::string_view kHome = "%H";
+constexpr std::string_view kPathVariables = "SuUDgGH";
+constexpr size_t kMaxPairs = 4096;
+
+bool isHomesName(std::string_view name) {
+    return foldedName(name) == "homes";
+}
+
+std::string withoutBlanks(std::string_view name) {
+    std::string key;
+    std::copy_if(name.begin(), name.end(), std::back_inserter(key), [](char c) { return !isDefinitionBlank(c); });
+    return key;
+}
+
+// A path as far as it is known yet: a home folder at its beginning is absolute.
+std::string templateOf(const std::string& path) {
+    return path.starts_with(kHome) ? "/" + path : path;
+}
 
 bool isShareName(std::string_view name) {
     if (name.empty() || name.size() > kMaxName || name == "." || name == "..") return false;
@@ -56,9 +78,7 @@ class Values {
         if (!number) fault_ = "\"" + value.text + "\" is no number or too large";
         return number.value_or(0);
     }
-    [[nodiscard]] std::vector<std::string> list(ShareOption option) const {
-        return splitList(section_.value(option).text);
-    }
+    [[nodiscard]] const OptionValue& value(ShareOption option) const { return section_.value(option); }
     [[nodiscard]] const std::string& fault() const { return fault_; }
 
  private:
@@ -66,38 +86,143 @@ class Values {
     std::string fault_;
 };
 
+// "" when the section can be a share, as far as its text goes.
 std::string faultOf(const DefinitionSection& section) {
     if (!section.fault.empty()) return section.fault;
     if (!isShareName(section.name)) return "no name for a share";
     for (const OptionValue& value : section.values) {
-        if (value.text.find('\0') != std::string::npos) return "a zero byte in a value";
+        const bool control = std::any_of(value.text.begin(), value.text.end(),
+                                         [](char c) { return c == '\0' || c == kListAnd || c == kListNot; });
+        if (control) return "a zero or control byte in a value";
     }
     const std::string& path = section.value(ShareOption::path).text;
-    if (path.empty()) return "no path";
-    if (!normalRoot(path)) return "the path \"" + path + "\" is not that of a folder below \"/\"";
+    if (path.empty()) return isHomesName(section.name) ? "" : "no path";
+    if (!normalRoot(templateOf(path))) return "the path \"" + path + "\" is not that of a folder below \"/\"";
     return {};
 }
 
-void fillLists(Values& values, bool readOnly, ShareDefinition& share) {
-    share.noAccess = values.list(ShareOption::invalidUsers);
-    share.readWrite = values.list(ShareOption::writeList);
-    share.readOnly = values.list(ShareOption::readList);
-    std::vector<std::string> users = values.list(ShareOption::validUsers);
-    if (users.empty()) users.emplace_back(kEverybody);
-    std::vector<std::string>& theirs = readOnly ? share.readOnly : share.readWrite;
-    theirs.insert(theirs.end(), users.begin(), users.end());
+// Entries that Samba asks NIS about alone; nobody is asked here.
+bool isNetgroup(std::string_view entry) {
+    return entry.starts_with('&') && entry.find_first_of("@+") > entry.find_first_not_of("@+&");
 }
 
-}  // namespace
+// The lists of a section, with what closes it since it cannot be honoured.
+struct Lists {
+    std::vector<std::string> valid, invalid, read, write;
+    std::vector<Closing> closings;
+};
 
-ShareReading readShare(const DefinitionSection& section) {
-    Values values(section);
-    if (!values.boolean(ShareOption::available, true) || values.boolean(ShareOption::printable, false)) return {};
-    std::string fault = faultOf(section);
-    if (!fault.empty()) return {std::nullopt, std::move(fault)};
+Lists listsOf(const DefinitionSection& section, const std::vector<std::string>& ignored) {
+    Lists lists;
+    const struct {
+        ShareOption option;
+        const char* name;
+        std::vector<std::string>& list;
+        bool takesAway;
+    } all[] = {{ShareOption::validUsers, "valid users", lists.valid, false},
+               {ShareOption::invalidUsers, "invalid users", lists.invalid, true},
+               {ShareOption::readList, "read list", lists.read, true},
+               {ShareOption::writeList, "write list", lists.write, false}};
+    for (const auto& [option, name, list, takesAway] : all) {
+        const OptionValue& value = section.value(option);
+        const bool isIgnored = std::find(ignored.begin(), ignored.end(), withoutBlanks(name)) != ignored.end();
+        if (isIgnored) continue;
+        const std::optional<std::string> variable = unknownVariable(value.text, "S");
+        if (variable) {
+            lists.closings.push_back({name, value.text, *variable + " stands for nothing here", value.place});
+        }
+        for (std::string& entry : splitList(value.text)) {
+            if (takesAway && isNetgroup(entry)) {
+                lists.closings.push_back({name, value.text, "netgroups are not asked here", value.place});
+            }
+            list.push_back(isNetgroup(entry) || entry == kEverybody ? std::string() : std::move(entry));
+        }
+    }
+    return lists;
+}
+
+std::string negated(const std::vector<std::string>& entries) {
+    std::string all;
+    for (const std::string& entry : entries) {
+        if (!all.empty()) all += kListAnd;
+        all += kListNot + entry;
+    }
+    return all;
+}
+
+// Those of `some` whom `all` names, too.
+void addBoth(const std::vector<std::string>& some, const std::vector<std::string>& all, std::vector<std::string>& out) {
+    for (const std::string& one : some) {
+        for (const std::string& user : all)
+            out.push_back(user == kEverybody || user == one ? one : one + kListAnd + user);
+    }
+}
+
+// Whom `valid users` names, or everybody without it, may read; whom `write list` names, and without `read only` who is
+// not on `read list`, may write. `valid users` counts for all of them.
+void fillLists(Lists&& lists, bool readOnly, ShareDefinition& share) {
+    share.noAccess = std::move(lists.invalid);
+    std::vector<std::string>& valid = lists.valid;
+    const size_t pairs = (lists.write.size() + lists.read.size()) * valid.size();
+    if (pairs > kMaxPairs) share.noAccess.push_back(negated(std::exchange(valid, {})));
+    if (valid.empty()) valid.emplace_back(kEverybody);
+    addBoth(lists.write, valid, share.readWrite);
+    if (readOnly) {
+        share.readOnly = valid;
+        return;
+    }
+    const std::string except = negated(lists.read);
+    for (const std::string& user : valid) share.readWrite.push_back(except.empty() ? user : user + kListAnd + except);
+    addBoth(lists.read, valid, share.readOnly);
+}
+
+void replaceShare(std::vector<std::string>& list, const std::string& name) {
+    for (std::string& entry : list) {
+        for (size_t at = 0; (at = entry.find("%S", at)) != std::string::npos; at += name.size()) {
+            entry.replace(at, 2, name);
+        }
+    }
+}
+
+void replaceShare(ShareDefinition& share, const std::string& name) {
+    for (auto* list : {&share.noAccess, &share.readWrite, &share.readOnly}) replaceShare(*list, name);
+}
+
+std::vector<std::string> ignoredOptions(const DefinitionSection& section) {
+    std::vector<std::string> keys;
+    std::string_view rest = section.value(ShareOption::ignore).text;
+    while (!rest.empty()) {
+        const std::string_view name = rest.substr(0, rest.find_first_of(",;"));
+        rest.remove_prefix(std::min(name.size() + 1, rest.size()));
+        const std::string key = withoutBlanks(foldedName(name));
+        keys.push_back(limitKey(key).empty() ? key : limitKey(key));
+    }
+    return keys;
+}
+
+// Homes are each user's own, to read and to write; what takes that away closes them.
+void judgeHomes(Values& values, const Place& place, const std::vector<std::string>& ignored, ShareReading& reading) {
+    const bool ignores = std::find(ignored.begin(), ignored.end(), "readonly") != ignored.end();
+    const OptionValue& readOnly = values.value(ShareOption::readOnly);
+    reading.isHomes = true;
+    if (ignores || !values.boolean(ShareOption::readOnly, true)) return;
+    reading.closings.push_back({"read only", readOnly.stated ? readOnly.text : "yes (not stated)",
+                                "a user's home is always to read and write here",
+                                readOnly.stated ? readOnly.place : place});
+}
+
+std::string offReason(const DefinitionSection& section, Values& values) {
+    const std::string key = foldedName(section.name);
+    if (!values.boolean(ShareOption::available, true)) return "available = no";
+    if (values.boolean(ShareOption::printable, false)) return "a printer";
+    return key == "printers" || key == "print$" ? "what belongs to printers" : "";
+}
+
+ShareDefinition takeOptions(Values& values, const DefinitionSection& section) {
     ShareDefinition share;
     share.name = section.name;
-    share.path = *normalRoot(section.value(ShareOption::path).text);
+    const std::string& path = section.value(ShareOption::path).text;
+    share.path = path.empty() ? "%H" : *normalRoot(templateOf(path));
     if (!values.boolean(ShareOption::browseable, true)) share.status |= VEXO_SHARE_HIDDEN;
     if (values.boolean(ShareOption::encrypted, false)) share.status |= VEXO_SHARE_ENCRYPTED;
     share.mask = values.number(ShareOption::restriction, UINT_MAX);
@@ -106,9 +231,43 @@ ShareReading readShare(const DefinitionSection& section) {
     share.synced = values.boolean(ShareOption::synced, false);
     // One index cannot be of as many folders as there are users.
     share.index = values.boolean(ShareOption::index, false) && !hasVariables(share.path);
-    fillLists(values, values.boolean(ShareOption::readOnly, true), share);
-    if (!values.fault().empty()) return {std::nullopt, values.fault()};
-    return {std::move(share), {}};
+    return share;
+}
+
+}  // namespace
+
+ShareReading readShare(const DefinitionSection& section, const LimitValues& global) {
+    ShareReading reading;
+    Values values(section);
+    reading.off = offReason(section, values);
+    if (!reading.off.empty()) return reading;
+    reading.fault = faultOf(section);
+    if (!reading.fault.empty()) return reading;
+
+    ShareDefinition share = takeOptions(values, section);
+    const bool readOnly = values.boolean(ShareOption::readOnly, true);
+    const std::vector<std::string> ignored = ignoredOptions(section);
+    Lists lists = listsOf(section, ignored);
+    reading.closings = closingsOf(section.limits, global, ignored);
+    std::move(lists.closings.begin(), lists.closings.end(), std::back_inserter(reading.closings));
+    const bool ownHomes = isHomesName(section.name) && hasVariables(share.path);
+    if (ownHomes) judgeHomes(values, section.place, ignored, reading);
+    const OptionValue& path = section.value(ShareOption::path);
+    if (const auto variable = unknownVariable(share.path, kPathVariables)) {
+        reading.closings.push_back({"path", path.text, *variable + " stands for nothing here", path.place});
+    }
+    reading.fault = values.fault();
+    if (!reading.fault.empty() || !reading.closings.empty()) return reading;
+    fillLists(std::move(lists), readOnly && !ownHomes, share);
+    if (!ownHomes) replaceShare(share, share.name);
+    reading.share = std::move(share);
+    return reading;
+}
+
+ShareDefinition homesOf(const ShareDefinition& homes, const std::string& user) {
+    ShareDefinition own = homes;
+    replaceShare(own, user);
+    return own;
 }
 
 std::optional<std::string> normalRoot(std::string_view path) {
@@ -131,22 +290,28 @@ bool hasVariables(std::string_view path) {
     return path.find('%') != std::string_view::npos;
 }
 
-std::string replaceVariables(std::string_view path, const PathVariables& variables) {
+std::optional<std::string> replaceVariables(std::string_view path, const PathVariables& variables) {
     std::string out;
     for (size_t i = 0; i < path.size(); ++i) {
         const char letter = path[i] == '%' && i + 1 < path.size() ? path[i + 1] : '\0';
-        const std::string* value = letter == 'S'   ? &variables.share
-                                   : letter == 'u' ? &variables.user
-                                   : letter == 'U' ? &variables.name
-                                   : letter == 'D' ? &variables.domain
-                                   : letter == 'g' ? &variables.group
-                                                   : nullptr;
-        if (value == nullptr) {
+        const std::string* value = letter == 'S'                    ? &variables.share
+                                   : letter == 'u'                  ? &variables.user
+                                   : letter == 'U'                  ? &variables.name
+                                   : letter == 'D'                  ? &variables.domain
+                                   : letter == 'g' || letter == 'G' ? &variables.group
+                                   : letter == 'H'                  ? &variables.home
+                                                                    : nullptr;
+        if (value != nullptr && value->empty()) return std::nullopt;
+        if (letter == '\0') {
             out += path[i];
-        } else {
-            out += *value;
-            ++i;
+            continue;
         }
+        if (value != nullptr) {
+            out += *value;
+        } else {
+            out.append(path, i, 2);  // no variable, and what follows does not begin one
+        }
+        ++i;
     }
     return out;
 }

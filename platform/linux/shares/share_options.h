@@ -27,10 +27,22 @@ struct ShareDefinition {
 
 struct ShareReading {
     std::optional<ShareDefinition> share;
-    std::string fault;  // why the section is malformed; "" without a share: switched off, or a printer
+    // The section [homes] of homes that are in no share: `share` is what each user has, with the variables of its path.
+    bool isHomes = false;
+    std::string fault;              // why the section is malformed
+    std::string off;                // why it is not meant to be a share here: switched off, or a printer
+    std::vector<Closing> closings;  // the options that close it
 };
 
-[[nodiscard]] ShareReading readShare(const DefinitionSection& section);
+// `global` is what [global] says in the end. Without a share one of the reasons is given.
+[[nodiscard]] ShareReading readShare(const DefinitionSection& section, const LimitValues& global = {});
+
+// The definition of homes for one user: what stands for the share's name in its lists is the user's.
+[[nodiscard]] ShareDefinition homesOf(const ShareDefinition& homes, const std::string& user);
+
+// In an entry of a share's lists, between conditions all of which must hold, and in front of one that must not.
+constexpr char kListAnd = '\x1F';
+constexpr char kListNot = '\x1E';
 
 // `path` without repeated and trailing slashes when it is absolute, has a component or more, and neither "." nor ".."
 // is one; else nothing.
@@ -42,12 +54,13 @@ struct PathVariables {
     std::string user;    // %u, the whole name
     std::string name;    // %U, the name without its domain
     std::string domain;  // %D
-    std::string group;   // %g, the primary group
+    std::string group;   // %g and %G, the primary group
+    std::string home;    // %H, the home folder
 };
 
 [[nodiscard]] bool hasVariables(std::string_view path);
-// Other uses of "%" stay as they are.
-[[nodiscard]] std::string replaceVariables(std::string_view path, const PathVariables& variables);
+// Other uses of "%" stay as they are. Nothing when a variable that the path has stands for nothing.
+[[nodiscard]] std::optional<std::string> replaceVariables(std::string_view path, const PathVariables& variables);
 
 }  // namespace vexo
 

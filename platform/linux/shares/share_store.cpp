@@ -57,9 +57,10 @@ struct Origin {
 struct Store {
     std::vector<Origin> origins;  // the main file first
     std::shared_ptr<const ShareTable> table;
+    bool provisional = false;  // made from a text that somebody may still be writing
 
     [[nodiscard]] bool isCurrent(const std::string& path) const {
-        return table != nullptr && origins.front().path == path &&
+        return table != nullptr && !provisional && origins.front().path == path &&
                std::all_of(origins.begin(), origins.end(), [](const Origin& origin) { return origin.isUnchanged(); });
     }
     // True when both were made from files in the same state, read again only because a file was quite new.
@@ -85,45 +86,90 @@ std::string pathOfIncluded(const std::string& file, const std::string& main) {
 
 struct Reading {
     std::vector<ShareDefinition> shares;
+    std::optional<ShareDefinition> homes;
     std::vector<std::string> faults;  // a line for the log each
 };
+
+std::string faultLine(const Definitions& definitions, const DefinitionSection& section, const ShareReading& reading) {
+    const std::string name = "share [" + section.name + "] is ";
+    if (!reading.fault.empty()) {
+        const bool inLine = !section.fault.empty();
+        return name + "left out: " + (inLine ? placeText(definitions, section.faultPlace) + ": " : "") + reading.fault;
+    }
+    const Closing& closing = reading.closings.front();
+    return name + "closed: " + placeText(definitions, closing.place) + ": " + closing.option + " = " + closing.text +
+           ": " + closing.why;
+}
 
 // A malformed section never hides the others.
 Reading readShares(const Definitions& definitions) {
     Reading result;
-    for (const std::string& problem : definitions.problems) result.faults.push_back("share definitions: " + problem);
+    for (const Problem& problem : definitions.problems) {
+        result.faults.push_back("share definitions: " + placeText(definitions, problem.place) + ": " + problem.text);
+    }
     for (const DefinitionSection& section : definitions.sections) {
-        ShareReading reading = readShare(section);
-        if (reading.share) {
+        ShareReading reading = readShare(section, definitions.global);
+        if (!reading.share) {
+            if (reading.off.empty()) result.faults.push_back(faultLine(definitions, section, reading));
+        } else if (reading.isHomes) {
+            result.homes = std::move(*reading.share);
+        } else {
             result.shares.push_back(std::move(*reading.share));
-        } else if (!reading.fault.empty()) {
-            result.faults.push_back("share [" + section.name + "] is left out: " + reading.fault);
         }
     }
     return result;
 }
 
-PathVariables variablesFor(const std::string& share) {
+bool endsWithinLine(const std::string& text) {
+    return !text.empty() && text.back() != '\n';
+}
+
+// Whether the file may be one that somebody is still writing.
+bool isFresh(const Stamp& stamp) {
+    constexpr time_t kQuiet = 2;  // seconds
+    timespec now{};
+    clock_gettime(CLOCK_REALTIME, &now);
+    return stamp.seconds + kQuiet >= now.tv_sec && stamp.seconds <= now.tv_sec + kQuiet;
+}
+
+std::string definitionsPath() {
+    return VEXO::SystemPath(VexoConf::Info().Get("share_definitions", kDefinitions));
+}
+
+PathVariables variablesOf(const Account& account, const std::string& share) {
     PathVariables variables;
+    const AccountName name = splitAccountName(account.name);
     variables.share = share;
+    variables.user = account.name;
+    variables.name = name.name;
+    variables.domain = name.domain;
+    variables.home = account.home;
+    Group group;
+    if (AccountSource::instance().group(account.gid, group) == Lookup::found) variables.group = group.name;
+    return variables;
+}
+
+PathVariables variablesFor(const std::string& share) {
     const char* remote = secure_getenv("REMOTE_USER");
     AccountSource& accounts = AccountSource::instance();
     Account account;
     const bool named = remote != nullptr && *remote != '\0';
     const Lookup found = named ? accounts.user(remote, account) : accounts.user(geteuid(), account);
-    if (found != Lookup::found) return variables;
-    const AccountName name = splitAccountName(account.name);
-    variables.user = account.name;
-    variables.name = name.name;
-    variables.domain = name.domain;
-    Group group;
-    if (accounts.group(account.gid, group) == Lookup::found) variables.group = group.name;
+    if (found == Lookup::found) return variablesOf(account, share);
+    PathVariables variables;
+    variables.share = share;
     return variables;
+}
+
+std::optional<std::string> rootWith(const ShareDefinition& share, const PathVariables& variables) {
+    const std::optional<std::string> path = replaceVariables(share.path, variables);
+    return path ? normalRoot(*path) : std::nullopt;
 }
 
 }  // namespace
 
-ShareTable::ShareTable(std::vector<ShareDefinition> shares) : shares_(std::move(shares)) {
+ShareTable::ShareTable(std::vector<ShareDefinition> shares, std::optional<ShareDefinition> homes)
+    : shares_(std::move(shares)), homes_(std::move(homes)) {
     for (size_t i = 0; i < shares_.size(); ++i) {
         byName_.emplace(foldedName(shares_[i].name), i);
         if (hasVariables(shares_[i].path)) {
@@ -149,7 +195,7 @@ bool ShareTable::isRoot(const std::string& path) const {
 
 std::shared_ptr<const ShareTable> currentShares() {
     static Store& store = *new Store;  // still asked at exit
-    const std::string path = VEXO::SystemPath(VexoConf::Info().Get("share_definitions", kDefinitions));
+    const std::string path = definitionsPath();
     {
         const KeepErrno keep;
         if (store.isCurrent(path)) return store.table;
@@ -158,26 +204,53 @@ std::shared_ptr<const ShareTable> currentShares() {
     const std::optional<std::string> text = fresh.read(path);
     if (!text) return nullptr;
     const KeepErrno keep;
-    Reading reading = readShares(
-        parseDefinitions(*text, [&](const std::string& file) { return fresh.read(pathOfIncluded(file, path)); }));
+    const bool torn = endsWithinLine(*text) && isFresh(fresh.origins.front().stamp);
+    fresh.provisional = torn;
+    Reading reading = readShares(parseDefinitions(
+        *text, [&](const std::string& file) { return fresh.read(pathOfIncluded(file, path)); }, torn));
     if (!fresh.isSameAs(store)) {
         for (const std::string& fault : reading.faults) {
             syslog(LOG_ERR, "%s:%d %s", kSource, __LINE__, orvel::printable(fault).c_str());
         }
     }
-    fresh.table = std::make_shared<const ShareTable>(std::move(reading.shares));
+    fresh.table = std::make_shared<const ShareTable>(std::move(reading.shares), std::move(reading.homes));
     store = std::move(fresh);
     return store.table;
 }
 
 std::optional<std::string> rootOf(const ShareDefinition& share) {
     if (!hasVariables(share.path)) return share.path;
-    std::optional<std::string> root = normalRoot(replaceVariables(share.path, variablesFor(share.name)));
-    // Where a variable is empty the folder above would be everybody's.
-    if (root && std::count(root->begin(), root->end(), '/') != std::count(share.path.begin(), share.path.end(), '/')) {
-        return std::nullopt;
+    return rootWith(share, variablesFor(share.name));
+}
+
+std::optional<std::string> rootFor(const ShareDefinition& share, const Account& account) {
+    return rootWith(share, variablesOf(account, share.name));
+}
+
+std::optional<std::string> homeIn(const ShareDefinition& homes, const Account& account) {
+    return rootWith(homes, variablesOf(account, splitAccountName(account.name).name));
+}
+
+DefinitionsReport reportDefinitions() {
+    DefinitionsReport report;
+    const std::string path = definitionsPath();
+    report.paths.push_back(path);
+    Store fresh;
+    const std::optional<std::string> text = fresh.read(path);
+    if (!text) {
+        report.error = errno;
+        return report;
     }
-    return root;
+    report.definitions = parseDefinitions(
+        *text, [&](const std::string& file) { return fresh.read(pathOfIncluded(file, path)); },
+        endsWithinLine(*text) && isFresh(fresh.origins.front().stamp));
+    for (size_t i = 1; i < report.definitions.files.size(); ++i) {
+        report.paths.push_back(pathOfIncluded(report.definitions.files[i], path));
+    }
+    for (const DefinitionSection& section : report.definitions.sections) {
+        report.readings.push_back(readShare(section, report.definitions.global));
+    }
+    return report;
 }
 
 }  // namespace vexo

@@ -9,20 +9,24 @@
 #include <unordered_map>
 #include <vector>
 
+#include "accounts/account_record.h"
 #include "shares/share_options.h"
 
 namespace vexo {
 
 class ShareTable {
  public:
-    explicit ShareTable(std::vector<ShareDefinition> shares);
+    ShareTable(std::vector<ShareDefinition> shares, std::optional<ShareDefinition> homes);
     [[nodiscard]] const std::vector<ShareDefinition>& all() const { return shares_; }
     [[nodiscard]] const ShareDefinition* find(std::string_view name) const;  // without case
+    // What [homes] says, where homes are in no share; null where they are in one, or there are none.
+    [[nodiscard]] const ShareDefinition* homes() const { return homes_ ? &*homes_ : nullptr; }
     // True when `path` is the root of a share for the user of this request.
     [[nodiscard]] bool isRoot(const std::string& path) const;
 
  private:
     std::vector<ShareDefinition> shares_;  // in the order of the definitions
+    std::optional<ShareDefinition> homes_;
     std::unordered_map<std::string, size_t> byName_;
     std::unordered_map<std::string, size_t> byRoot_;  // those whose root is the same for every user
     std::vector<size_t> withVariables_;
@@ -34,6 +38,22 @@ class ShareTable {
 // The root of a share for the user of this request (REMOTE_USER, else the owner of the effective uid); nothing when
 // the variables of its path make no root for this user.
 [[nodiscard]] std::optional<std::string> rootOf(const ShareDefinition& share);
+
+// The root of a share for one account.
+[[nodiscard]] std::optional<std::string> rootFor(const ShareDefinition& share, const Account& account);
+
+// The home of `account` where homes are in no share; nothing when there is none for this account.
+[[nodiscard]] std::optional<std::string> homeIn(const ShareDefinition& homes, const Account& account);
+
+// What was read, and why a section is no share.
+struct DefinitionsReport {
+    std::vector<std::string> paths;  // of the files, the main one first
+    int error = 0;                   // errno where that cannot be read
+    Definitions definitions;
+    std::vector<ShareReading> readings;  // of the sections, in their order
+};
+// Reads the definitions anew.
+[[nodiscard]] DefinitionsReport reportDefinitions();
 
 }  // namespace vexo
 
