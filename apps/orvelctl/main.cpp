@@ -38,8 +38,12 @@ constexpr Command kCommands[] = {
     {"sharing", orvel::ctl::sharing,
      "sharing set everybody|admin_only|per_user           who may create links; list shows it\n"
      "       sharing set yes|no --user U, sharing get U, sharing list"},
-    {"status", orvel::ctl::status,
-     "status [--json] [--socket PATH]                    what orveld does and has done"},
+    {"status", orvel::ctl::status, "status [--json] [--socket PATH]                    what orveld does and has done"},
+    {"doctor", orvel::ctl::doctor,
+     "doctor [--json]                                     what keeps shares from being there, and what to do about it"},
+    {"volumes", orvel::ctl::volumes,
+     "volumes [--user U]                                  makes the temporary folders of every volume, as the machine\n"
+     "       should at its start; with --user also that user's own"},
     {"demo", orvel::ctl::demo,
      "demo FOLDER [--keep | --remove]                    makes a demo appliance, keeps one that is whole, removes one"},
 };

@@ -1,4 +1,6 @@
 // Shares at any depth, from one end to the other: listed, filled, changed, searched, published and emptied.
+#include <json/reader.h>
+
 #include "apps/task_fixture.h"
 #include "platform/private_mounts.h"
 
@@ -117,6 +119,89 @@ TEST_F(RootsCgi, EverythingWorksAtAnyDepth) {
         useShare("data", "/mnt");
         EXPECT_TRUE(fs::exists("/mnt/@tmp/orvel"));
         refuseTemporaryFolder("/data");
+        return 0;
+    }));
+}
+
+// What the doctor says of a share, and its exit status. The findings of other shares are left out.
+TEST_F(RootsCgi, TheDoctorNamesTheLine) {
+    const auto ask = [](const std::string& share, int status) {
+        const support::Finished finished = support::runProgram({ORVELCTL, "doctor", "--json"});
+        EXPECT_EQ(finished.status, status) << finished.output;
+        Json::Value report;
+        EXPECT_TRUE(Json::Reader().parse(finished.output, report)) << finished.output;
+        EXPECT_EQ(report["problems"].asInt() == 0, status == 0);
+        std::string all;
+        for (const Json::Value& finding : report["findings"]) {
+            if (finding["share"].asString() != share) continue;
+            all += finding["severity"].asString() + "|" + std::to_string(finding["line"].asInt()) + "|" +
+                   finding["text"].asString() + "|" + finding["advice"].asString() + "\n";
+        }
+        return all;
+    };
+    const std::string conf = "/etc/samba/smb.conf";
+    setSetting("share_definitions", conf);
+    EXPECT_NE(ask("", 1).find("there are no share definitions"), std::string::npos);
+    writeRootFile("/etc/samba/more.conf", "\nforce user = x\n");
+    writeRootFile(conf, "[global]\nconfig backend = file\nnonsense\n[good]\npath = " + photo_ +
+                            "\n[closed]\npath = /v/c\nhosts allow = 10.\ninclude = more.conf\n[torn]\nvalid users\n"
+                            "[tmp]\npath = /tmp\nveto files = /@tmp/\n[bare]\npath = /tmp\n[p]\nprintable = yes\n");
+    EXPECT_EQ(ask("good", 1), "good|4|[good] at " + photo_ + "|\n");
+    EXPECT_EQ(ask("closed", 1),
+              "problem|2|[closed] is closed by \"force user = x\": everybody would be that user there|\n"
+              "problem|8|[closed] is closed by \"hosts allow = 10.\": who may enter by network address is not decided "
+              "here|to open it here all the same, add to [closed]: vexo:ignore = force user, hosts allow\n");
+    EXPECT_EQ(
+        ask("torn", 1),
+        "problem|11|[torn] is left out: neither a section nor an option|mend the line; \"testparm -s\" shows what "
+        "Samba makes of it\n");
+    EXPECT_EQ(ask("tmp", 1), "good|12|[tmp] at /tmp|\n");
+    EXPECT_EQ(ask("bare", 1),
+              "good|15|[bare] at /tmp|\nproblem|15|[bare] holds the folder @tmp for temporary files, which "
+              "Samba shows there|add to [bare]: veto files = /@tmp/\n");
+    EXPECT_EQ(ask("p", 1), "note|17|[p] is not a share here: a printer|\n");
+    EXPECT_NE(ask("", 1).find("problem|3|neither a section nor an option"), std::string::npos);
+}
+
+TEST_F(RootsCgi, VolumesHaveTheirTemporaryFolders) {
+    SKIP_WITHOUT_ROOT();
+    writeRootFile("/etc/vexo/shares.conf", "[data]\npath = /mnt\nveto files = /@tmp/\nread only = no\n");
+    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+        EXPECT_EQ(mount("none", "/mnt", "tmpfs", 0, "mode=0777"), 0);
+        const auto run = [](std::vector<std::string> words) {
+            words.insert(words.begin(), ORVELCTL);
+            return support::runProgram(words).status;
+        };
+        const auto modeOf = [](const std::string& path) {
+            struct stat status {};
+            return lstat(path.c_str(), &status) == 0
+                       ? std::to_string(status.st_uid) + " " + std::to_string(status.st_mode & 07777)
+                       : "none";
+        };
+        const std::string everybodys = "0 " + std::to_string(01777), search = "/mnt/@tmp/orvel/PXSearch";
+        EXPECT_EQ(run({"doctor"}), 1);
+        EXPECT_EQ(run({"volumes"}), 0);
+        EXPECT_EQ(run({"doctor"}), 0);
+        for (const std::string& path : {std::string("/mnt/@tmp"), std::string("/mnt/@tmp/orvel"), search}) {
+            EXPECT_EQ(modeOf(path), everybodys) << path;
+        }
+        EXPECT_EQ(chmod("/mnt/@tmp", 0777), 0);
+        support::makeFolder(search + "/alice", 0777);
+        EXPECT_EQ(run({"volumes", "--user", "alice"}), 0);
+        EXPECT_EQ(modeOf("/mnt/@tmp"), everybodys);
+        EXPECT_EQ(modeOf(search + "/alice"), std::to_string(support::kAliceUid) + " " + std::to_string(0700));
+        writeFile("/mnt/x.txt", "");
+        EXPECT_EQ(rows(RootsCgi::search("/data")), "/data/x.txt ") << "results are kept there";
+        EXPECT_EQ(run({"volumes", "--user", "nobody-here"}), 1);
+        // What is not root's is not used, nor is a link followed.
+        fs::remove_all(search);
+        fs::create_directory_symlink("/tmp", search);
+        EXPECT_EQ(run({"volumes"}), 1);
+        fs::remove(search);
+        support::makeFolder(search, 0777);
+        give(search);
+        EXPECT_EQ(run({"volumes"}), 1);
+        EXPECT_EQ(modeOf(search), std::to_string(support::kAliceUid) + " " + std::to_string(0777));
         return 0;
     }));
 }

@@ -1,0 +1,81 @@
+#include "vexo/share_report.h"
+
+#include <cerrno>
+#include <exception>
+#include <string>
+
+#include "failure.h"
+#include "fault_gate.h"
+#include "shares/share_store.h"
+
+namespace vexo {
+namespace {
+
+class Reporter {
+ public:
+    Reporter(const DefinitionsReport& report, void (*take)(const VEXOSHARENOTE*, void*), void* argument)
+        : report_(report), take_(take), argument_(argument) {}
+
+    void problem(const Problem& problem) { give(VEXO_NOTE_PROBLEM, problem.place, "", {.why = problem.text}); }
+
+    void section(const DefinitionSection& section, const ShareReading& reading) {
+        const std::string path = reading.share ? reading.share->path : section.value(ShareOption::path).text;
+        if (reading.share) {
+            const auto veto = section.limits.find("vetofiles");
+            const bool vetoes = veto != section.limits.end();
+            give(reading.isHomes ? VEXO_NOTE_HOMES : VEXO_NOTE_SHARE, section.place, path,
+                 {.share = section.name, .option = "veto files", .text = vetoes ? veto->second.text : ""});
+        } else if (!reading.off.empty()) {
+            give(VEXO_NOTE_OFF, section.place, path, {.share = section.name, .why = reading.off});
+        } else if (!reading.fault.empty()) {
+            const Place& place = section.fault.empty() ? section.place : section.faultPlace;
+            give(VEXO_NOTE_LEFT_OUT, place, path, {.share = section.name, .why = reading.fault});
+        } else {
+            for (const Closing& closing : reading.closings) {
+                give(VEXO_NOTE_CLOSED, closing.place, path,
+                     {.share = section.name, .option = closing.option, .text = closing.text, .why = closing.why});
+            }
+        }
+    }
+
+ private:
+    struct Texts {
+        std::string share = {}, option = {}, text = {}, why = {};
+    };
+    void give(int kind, const Place& place, const std::string& path, const Texts& texts) {
+        const VEXOSHARENOTE note = {.kind = kind,
+                                    .share = texts.share.c_str(),
+                                    .path = path.c_str(),
+                                    .file = report_.paths.at(static_cast<size_t>(place.file)).c_str(),
+                                    .line = place.line,
+                                    .option = texts.option.c_str(),
+                                    .text = texts.text.c_str(),
+                                    .why = texts.why.c_str()};
+        take_(&note, argument_);
+    }
+
+    const DefinitionsReport& report_;
+    void (*take_)(const VEXOSHARENOTE*, void*);
+    void* argument_;
+};
+
+}  // namespace
+}  // namespace vexo
+
+int VEXOShareReport(char* file, int size, void (*take)(const VEXOSHARENOTE*, void*), void* argument) try {
+    VEXO_GATE("VEXOShareReport", -1);
+    if (file == nullptr || size <= 0 || take == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    const vexo::DefinitionsReport report = vexo::reportDefinitions();
+    const std::string& path = report.paths.front();
+    if (path.size() >= static_cast<size_t>(size)) return vexo::fail(VEXO_ERR_GENERAL, ENAMETOOLONG);
+    file[path.copy(file, path.size())] = '\0';
+    if (report.error != 0) return vexo::fail(VEXO_ERR_GENERAL, report.error);
+    vexo::Reporter reporter(report, take, argument);
+    for (const vexo::Problem& problem : report.definitions.problems) reporter.problem(problem);
+    for (size_t i = 0; i < report.readings.size(); ++i) {
+        reporter.section(report.definitions.sections[i], report.readings[i]);
+    }
+    return 0;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
