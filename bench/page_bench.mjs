@@ -25,7 +25,7 @@ async function measure(open) {
   });
   const time = await page.evaluate(open);
   await page.waitForTimeout(300);
-  await page.close();
+  await page.context().close();
   return { requests, bytes, time };
 }
 

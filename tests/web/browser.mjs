@@ -38,32 +38,17 @@ after(async () => {
   rmSync(data, { recursive: true, force: true });
 });
 
-// Of each kind of visitor one, so that the page's files are fetched once. What a page stored there goes before the next.
-const contexts = new Map();
-async function contextOf(user, options) {
-  const kind = JSON.stringify([user, options]);
-  if (!contexts.has(kind)) {
-    const context = await browser.newContext({
-      viewport: { width: 1280, height: 800 },
-      locale: "en-GB",
-      colorScheme: "light",
-      reducedMotion: "reduce",
-      httpCredentials: user && { username: user, password: PASSWORDS[user] },
-      ...options,
-    });
-    contexts.set(kind, context);
-  }
-  return contexts.get(kind);
-}
-
 // A page of `user`. `complaints` is what must be empty at the end: errors on the console or of scripts, failed requests.
 export async function openPage(user, { path = "/", ...options } = {}) {
-  const context = await contextOf(user, options);
+  const context = await browser.newContext({
+    viewport: { width: 1280, height: 800 },
+    locale: "en-GB",
+    colorScheme: "light",
+    reducedMotion: "reduce",
+    httpCredentials: user && { username: user, password: PASSWORDS[user] },
+    ...options,
+  });
   const page = await context.newPage();
-  const session = await context.newCDPSession(page);
-  const { origin } = new URL(URL_OF_PAGE);
-  await session.send("Storage.clearDataForOrigin", { origin, storageTypes: "local_storage,indexeddb" });
-  await session.detach();
   if (SCREENSHOTS) photograph(page);
   page.complaints = [];
   page.on("console", (message) => {
@@ -103,7 +88,7 @@ export async function withPage(user, options, run, expected = []) {
     failure.message += `\nComplaints: ${page.complaints.join("\n")}`;
     throw failure;
   } finally {
-    for (const one of page.context().pages()) await one.close();
+    await page.context().close();
   }
 }
 

@@ -22,6 +22,7 @@ before(() => {
 // No finding of axe-core on what is on screen, or in the part of it that is new.
 async function accessible(page, state, part = "html") {
   await rowsReady(page);
+  await page.waitForSelector(part);
   if (!(await page.evaluate(() => "axe" in globalThis))) await page.evaluate(axe);
   const found = await page.evaluate(async (within) => {
     const { violations } = await globalThis.axe.run(within, { resultTypes: ["violations"] });
