@@ -213,7 +213,8 @@ class Unfinished : public TaskCgi {
         }
         FIINDEXSTATUS status = {};
         const bool indexed = FILEIDXIndexStatus("photo", &status) == 0;
-        tree["index"] = indexed ? std::to_string(status.records) + (status.built > 0 ? " whole" : " unfinished") : "";
+        tree["index"] = !indexed ? "" : status.built > 0 ? "whole" : "unfinished";
+        if (indexed && shared_->error == 0) tree["index"] += std::to_string(status.records);
         const auto isThere = [](const std::string& task) { return KTR::TaskMgr("alice").hasTask(task.c_str()); };
         tree["ended"] = isThere(kEnded) ? "there" : "";
         tree["search"] = !search_.empty() && isThere("Quorvane_Search_" + search_) ? "there" : "";
@@ -258,11 +259,12 @@ class Unfinished : public TaskCgi {
         shared_->target = nth;
         shared_->error = error;
         shared_->changesOnly = error == 0 ? 1 : 0;
+        shared_->work = work_;
         snprintf(shared_->only, sizeof shared_->only, "%s", error == 0 ? "" : only_);
     }
     // Whether it reports success once it and its children have ended.
     bool run(const Work& work, bool struck = false) {
-        if (!struck) order(0, EIO);
+        if (!struck) order(0, shared_->error);
         const support::Finished finished =
             call(work, {{"LD_PRELOAD", TEST_CALLS}, {"ORVEL_CALLS", systemRoot() + "/calls"}});
         while (wait(nullptr) > 0 || errno == EINTR) {
@@ -295,7 +297,8 @@ class Unfinished : public TaskCgi {
         EXPECT_TRUE(data["finished"].asBool()) << "it ended";
         if (data["failed"].asBool() || data["stopped"].asBool()) return false;
         search_ = id;
-        found_ = data["total"].asString();
+        // Whatever cannot be read is passed over, as by an index.
+        found_ = shared_->error == 0 ? data["total"].asString() : "";
         return true;
     }
     // One run with one call struck: what is there then is of before or after, and all of it is there.
@@ -351,12 +354,14 @@ class Unfinished : public TaskCgi {
     void sweep(const Work& work, int error, int few, const char* only = "") {
         SCOPED_TRACE(work.name);
         only_ = only;
+        work_ = &work - kWorks;
+        order(0, error);
         lay(work);
         const Tree before = seen();
         order(0, error);
         EXPECT_TRUE(run(work, true));
         const Tree after = seen();
-        EXPECT_NE(before, after) << "it does something";
+        EXPECT_TRUE(before != after || error != 0) << "it does something";
         const long calls = shared_->count;
         EXPECT_GT(calls, 0) << "no calls were seen";
         const std::vector<unsigned long long> trace(shared_->trace,
@@ -383,6 +388,7 @@ class Unfinished : public TaskCgi {
     static constexpr const char* kEnded = "Quorvane_copy_0";
     Calls* shared_ = nullptr;
     const char* only_ = "";
+    long work_ = 0;
     std::string other_, zip_, links_, index_, link_, search_, found_;
     std::string linkDatabase_ = systemRoot() + VEXO::kLinkDatabase;
     std::set<std::pair<Tree, std::set<std::string>>> met_;

@@ -58,7 +58,10 @@ static int strike(const char* name, const char* about, int changes) {
     if (calls == NULL || (calls->changesOnly && !changes)) return 0;
     if (calls->only[0] != 0 && strcmp(calls->only, name) != 0) return 0;
     const long nth = __atomic_add_fetch(&calls->count, 1, __ATOMIC_SEQ_CST);
-    if (nth < kMostCalls) calls->trace[nth] = mix(mix(calls->trace[nth - 1], name), about);
+    if (nth < kMostCalls) {
+        calls->trace[nth] =
+            mix(mix(calls->trace[nth - 1], name), about) + (changes ? (unsigned long long)calls->work : 0);
+    }
     if (nth != calls->target) return 0;
     snprintf(calls->struck, sizeof calls->struck, "%s %s", name, about != NULL ? about : "");
     if (calls->error == 0) syscall(SYS_kill, syscall(SYS_getpid), SIGKILL);
