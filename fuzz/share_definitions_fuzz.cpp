@@ -16,18 +16,21 @@ void require(bool holds) {
     if (!holds) abort();
 }
 
-void checkShare(const vexo::DefinitionSection& section) {
-    const vexo::ShareReading reading = vexo::readShare(section);
+void checkShare(const vexo::DefinitionSection& section, const vexo::LimitValues& global) {
+    const vexo::ShareReading reading = vexo::readShare(section, global);
+    // There is a share, or a reason why there is none.
+    require(reading.share.has_value() == (reading.fault.empty() && reading.off.empty() && reading.closings.empty()));
     if (!reading.share) return;
-    require(reading.fault.empty() && section.fault.empty());
+    require(section.fault.empty());
     require(vexo::normalRoot(reading.share->path) == reading.share->path);
     require(reading.share->name.find('/') == std::string::npos && !reading.share->name.empty());
     require(!reading.share->readOnly.empty() || !reading.share->readWrite.empty());
-    // Whatever a user is called, the root stays two components below "/".
-    const vexo::PathVariables hostile{"%S/..", "../..", "/", "", "%u"};
-    const std::string replaced = vexo::replaceVariables(reading.share->path, hostile);
-    const auto root = vexo::normalRoot(replaced);
+    // Whatever a user is called, the root goes down from "/".
+    const vexo::PathVariables hostile{"%S/..", "../..", "/", "", "%u", "/.."};
+    const auto replaced = vexo::replaceVariables(reading.share->path, hostile);
+    const auto root = replaced ? vexo::normalRoot(*replaced) : std::nullopt;
     require(!root || (*root + '/').find("/../") == std::string::npos);
+    static_cast<void>(vexo::homesOf(*reading.share, "%S"));
 }
 
 }  // namespace
@@ -46,9 +49,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     bool seen = false;
     for (const vexo::DefinitionSection& section : definitions.sections) {
         seen = seen || vexo::foldedName(section.name) == "last of all";
-        checkShare(section);
+        checkShare(section, definitions.global);
+        static_cast<void>(vexo::placeText(definitions, section.place));
     }
-    require(seen);
+    require(seen || definitions.sections.size() == 10000);
     static_cast<void>(vexo::splitList(input));
     return 0;
 }

@@ -222,7 +222,7 @@ ShareDefinition takeOptions(Values& values, const DefinitionSection& section) {
     ShareDefinition share;
     share.name = section.name;
     const std::string& path = section.value(ShareOption::path).text;
-    share.path = path.empty() ? "%H" : *normalRoot(templateOf(path));
+    share.path = *normalRoot(templateOf(path.empty() ? std::string(kHome) : path));
     if (!values.boolean(ShareOption::browseable, true)) share.status |= VEXO_SHARE_HIDDEN;
     if (values.boolean(ShareOption::encrypted, false)) share.status |= VEXO_SHARE_ENCRYPTED;
     share.mask = values.number(ShareOption::restriction, UINT_MAX);

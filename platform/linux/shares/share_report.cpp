@@ -19,7 +19,10 @@ class Reporter {
     void problem(const Problem& problem) { give(VEXO_NOTE_PROBLEM, problem.place, "", {.why = problem.text}); }
 
     void section(const DefinitionSection& section, const ShareReading& reading) {
-        const std::string path = reading.share ? reading.share->path : section.value(ShareOption::path).text;
+        const std::string& stated = section.value(ShareOption::path).text;
+        const std::string path = reading.isHomes ? (stated.empty() ? "%H" : stated)
+                                 : reading.share ? reading.share->path
+                                                 : stated;
         if (reading.share) {
             const auto veto = section.limits.find("vetofiles");
             const bool vetoes = veto != section.limits.end();
