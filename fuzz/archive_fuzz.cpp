@@ -38,7 +38,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
         orvel::cgi::Unpacker unpacker(progress, {folder,
                                                  "/photo/target",
                                                  orvel::cgi::Conflict::kKeepBoth,
-                                                 {static_cast<uid_t>(-1), static_cast<gid_t>(-1)}});
+                                                 {static_cast<uid_t>(-1), static_cast<gid_t>(-1)},
+                                                 ""});
         const orvel::Descriptor file(fileOf(data, size));
         static_cast<void>(unpacker.run(file.get(), {.bytes = 1 << 20, .members = 100}));
     }
