@@ -145,7 +145,7 @@ std::string negated(const std::vector<std::string>& entries) {
     std::string all;
     for (const std::string& entry : entries) {
         if (!all.empty()) all += kListAnd;
-        all += kListNot + entry;
+        (all += kListNot) += entry;
     }
     return all;
 }
@@ -153,8 +153,10 @@ std::string negated(const std::vector<std::string>& entries) {
 // Those of `some` whom `all` names, too.
 void addBoth(const std::vector<std::string>& some, const std::vector<std::string>& all, std::vector<std::string>& out) {
     for (const std::string& one : some) {
-        for (const std::string& user : all)
-            out.push_back(user == kEverybody || user == one ? one : one + kListAnd + user);
+        for (const std::string& user : all) {
+            std::string& entry = out.emplace_back(one);
+            if (user != kEverybody && user != one) (entry += kListAnd) += user;
+        }
     }
 }
 
@@ -172,7 +174,10 @@ void fillLists(Lists&& lists, bool readOnly, ShareDefinition& share) {
         return;
     }
     const std::string except = negated(lists.read);
-    for (const std::string& user : valid) share.readWrite.push_back(except.empty() ? user : user + kListAnd + except);
+    for (const std::string& user : valid) {
+        std::string& entry = share.readWrite.emplace_back(user);
+        if (!except.empty()) (entry += kListAnd) += except;
+    }
     addBoth(lists.read, valid, share.readOnly);
 }
 
