@@ -313,7 +313,7 @@ class Unfinished : public TaskCgi {
         }
         for (const auto& [path, content] : before) {
             if (content == "folder" || path[0] != '/') continue;
-            const auto holds = [&](const auto& entry) { return entry.second == content; };
+            const auto holds = [&text = content](const auto& entry) { return entry.second == text; };
             if (std::none_of(after.begin(), after.end(), holds)) continue;
             EXPECT_TRUE(std::any_of(now.begin(), now.end(), holds)) << "lost: " << path;
         }
