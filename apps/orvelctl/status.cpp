@@ -12,8 +12,8 @@
 
 #include "arguments.h"
 #include "command.h"
-#include "load_limits.h"
 #include "listener.h"
+#include "load_limits.h"
 #include "scgi.h"
 
 namespace orvel::ctl {
