@@ -27,9 +27,11 @@ namespace orvel::cgi {
 
 // Those of its functions that are used.
 struct ArchiveLibrary {
+    // NOLINTBEGIN(bugprone-macro-parentheses): a member's name takes none
 #define ORVEL_ARCHIVE_MEMBER(name) decltype(&::name) name = nullptr;
     ORVEL_ARCHIVE_FUNCTIONS(ORVEL_ARCHIVE_MEMBER)
 #undef ORVEL_ARCHIVE_MEMBER
+    // NOLINTEND(bugprone-macro-parentheses)
 };
 
 // To be called once loadArchiveLibrary() was true.

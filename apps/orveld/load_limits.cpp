@@ -78,7 +78,7 @@ std::vector<uid_t> users(const char* setting) {
     const pid_t child = fork();
     if (child == 0) reportUids(names, ends[1]);
     close(ends[1]);
-    const std::vector<uid_t> list = child > 0 ? receiveUids(ends[0], names.size()) : std::vector<uid_t>();
+    std::vector<uid_t> list = child > 0 ? receiveUids(ends[0], names.size()) : std::vector<uid_t>();
     close(ends[0]);
     if (child > 0) {
         kill(child, SIGKILL);
