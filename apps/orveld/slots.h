@@ -1,7 +1,7 @@
 // What the children report to the parent: a slot each in memory that both see.
 //
 // The children act as users, so nothing here is trusted: the parent takes numbers only, within bounds, and a child that
-// writes nonsense spoils the figures and its own limits, no more.
+// writes nonsense spoils the figures and its own limits, nothing else.
 #ifndef ORVEL_ORVELD_SLOTS_H
 #define ORVEL_ORVELD_SLOTS_H
 

@@ -15,7 +15,7 @@ inline constexpr const char* kTaskPrefix = "Quorvane_";
 
 // Goes on with `work` in a background process that publishes its progress, and puts the task's identifier into `data`
 // ("taskid") once the record shows that the process lives. What `work` refers to must be copied into it or outlive this
-// call. 0 or a library code, at once also when that process ended before; then there is no record.
+// call. 0 or a library code, at once even if that process ended early; then there is no record.
 int startTask(Operation& operation, const std::string& action, const std::function<void(Progress&)>& work);
 
 }  // namespace orvel::cgi
