@@ -9,6 +9,7 @@
 #include <cstdlib>
 #include <map>
 #include <new>
+#include <stop_token>
 #include <string>
 #include <string_view>
 #include <thread>
@@ -64,6 +65,7 @@ class Connections {
     Database* find(std::string_view path);
     bool close(const std::string& path);
     void commitAll();
+    void endCommitter(std::unique_lock<std::mutex>& lock);
     void stop();
 
  private:
@@ -72,24 +74,26 @@ class Connections {
     Database* use(Entry& entry);
     void makeRoom();
     void startCommitter();
-    void commitOld();
+    void commitOld(const std::stop_token& stop);
 
     std::vector<std::unique_ptr<Entry>> entries_;
     unsigned long long uses_ = 0;
-    std::thread committer_;
-    std::condition_variable changed_;
-    bool stopping_ = false;
+    std::jthread committer_;
+    std::condition_variable_any ended_;
 };
 
 Connections* current = nullptr;
 Connections* inherited = nullptr;  // from the parent process; kept reachable for leak checkers
 
 // SQLite notes for the whole process which locks it holds, and a child would inherit the notes without the locks: so
-// none is held at a fork, and nobody is inside SQLite.
+// none is held at a fork, and nobody is inside SQLite. Nor does the committer run: a thread that is just being started
+// may hold locks of the C++ runtime or of a sanitizer, which nobody would release in the child.
 void prepareFork() {
     if (current == nullptr) return;
-    current->mutex.lock();
+    std::unique_lock<std::mutex> lock(current->mutex);
+    current->endCommitter(lock);
     current->commitAll();
+    lock.release();
 }
 
 void goOnInParent() {
@@ -136,7 +140,6 @@ Entry* Connections::openEntry(const std::string& path, const struct stat& status
     makeRoom();
     entries_.push_back(
         std::make_unique<Entry>(Entry{path, status.st_dev, status.st_ino, std::move(database), isStore, {}, 0}));
-    if (!isStore) startCommitter();
     return entries_.back().get();
 }
 
@@ -147,6 +150,7 @@ Database* Connections::use(Entry& entry) {
         fail(failure.code, failure.systemCode);
         return nullptr;
     }
+    if (!entry.isStore) startCommitter();
     return entry.database.get();
 }
 
@@ -168,19 +172,27 @@ bool Connections::close(const std::string& path) {
 
 // The thread takes no signals: they are for the program, which gets them again even if no thread can be created.
 void Connections::startCommitter() {
-    if (committer_.joinable()) {
-        changed_.notify_one();
-        return;
-    }
+    if (committer_.joinable()) return;
     const NoSignals quiet;
-    committer_ = std::thread([this] { commitOld(); });
+    committer_ = std::jthread([this](const std::stop_token& stop) { commitOld(stop); });
 }
 
-void Connections::commitOld() {
+// The lock is given up while the thread ends; the next one that is started has a stop state of its own.
+void Connections::endCommitter(std::unique_lock<std::mutex>& lock) {
+    while (committer_.joinable()) {
+        std::jthread ending = std::move(committer_);
+        lock.unlock();
+        ending.request_stop();
+        ending.join();
+        lock.lock();
+    }
+}
+
+void Connections::commitOld(const std::stop_token& stop) {
     const QuietFailures quiet;
     std::unique_lock<std::mutex> lock(mutex);
-    while (!stopping_) {
-        changed_.wait_for(lock, kBatchAge / 2);
+    while (!stop.stop_requested()) {
+        ended_.wait_for(lock, stop, kBatchAge / 2, [] { return false; });
         for (const auto& entry : entries_) {
             const auto began = entry->database->batchBegan();
             // The store is reached as root, and the whole process would become that.
@@ -201,14 +213,8 @@ void Connections::commitAll() {
 }
 
 void Connections::stop() {
-    {
-        const std::lock_guard<std::mutex> lock(mutex);
-        stopping_ = true;
-    }
-    changed_.notify_all();
-    if (committer_.joinable()) committer_.join();
-    const std::lock_guard<std::mutex> lock(mutex);
-    stopping_ = false;
+    std::unique_lock<std::mutex> lock(mutex);
+    endCommitter(lock);
     commitAll();
     entries_.clear();
 }
