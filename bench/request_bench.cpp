@@ -214,7 +214,7 @@ void addRequest(std::vector<Contestant>& contestants, const Place& place, const 
 }
 
 void makeAppliance(const Place& place) {
-    outputOf(quoted(place.build + "/apps/orvelctl/orvelctl") + " demo " + quoted(place.root));
+    outputOf(quoted(place.build + "/bin/orvel-demo") + " " + quoted(place.root));
     std::ofstream settings(place.root + "/etc/vexoinfo.conf", std::ios::app);
     settings << "orveld_trusted_logins=\"" << getuid() << "\"\n";
     const std::string shares =
@@ -271,7 +271,6 @@ int main(int count, char** words) {
         kill(server, SIGTERM);
         waitpid(server, nullptr, 0);
     }
-    outputOf(quoted(place.build + "/apps/orvelctl/orvelctl") + " demo " + quoted(place.root) + " --remove; rm -rf " +
-             quoted(work));
+    outputOf(quoted(place.build + "/bin/orvel-demo") + " " + quoted(place.root) + " --remove; rm -rf " + quoted(work));
     return 0;
 }

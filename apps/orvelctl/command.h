@@ -21,7 +21,6 @@ int sharing(const std::vector<std::string>& words);
 int status(const std::vector<std::string>& words);
 int doctor(const std::vector<std::string>& words);
 int volumes(const std::vector<std::string>& words);
-int demo(const std::vector<std::string>& words);
 
 // Takes on the user's identity as a request would. Where this process is not root it stays what it is and says so. 0 or
 // a library code.

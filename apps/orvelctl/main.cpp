@@ -44,8 +44,6 @@ constexpr Command kCommands[] = {
     {"volumes", orvel::ctl::volumes,
      "volumes [--user U]                                  makes the temporary folders of every volume, as the machine\n"
      "       should at its start; with --user also that user's own"},
-    {"demo", orvel::ctl::demo,
-     "demo FOLDER [--keep | --remove]                    makes a demo appliance, keeps one that is whole, removes one"},
 };
 
 int usage(const char* reason) {

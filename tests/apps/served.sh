@@ -18,7 +18,7 @@ pid=
 failures=0
 cleanup() {
     [ -z "$pid" ] || { kill "$pid" 2>/dev/null; wait "$pid" 2>/dev/null; }
-    [ ! -e "$demo" ] || "$build/apps/orvelctl/orvelctl" demo "$demo" --remove >/dev/null
+    [ ! -e "$demo" ] || "$build/bin/orvel-demo" "$demo" --remove >/dev/null
     rm -rf "$work"
 }
 trap cleanup EXIT

@@ -36,10 +36,10 @@ wait "$pid" 2>/dev/null
 pid=
 roots=$(grep -o '/tmp/orvel-demo-[^"]*' "$demo/etc/vexo/demo.json")
 touch "$demo/mine"
-"$build/apps/orvelctl/orvelctl" demo "$demo" --remove >/dev/null 2>&1 || expect "removal" 0 $?
+"$build/bin/orvel-demo" "$demo" --remove >/dev/null 2>&1 || expect "removal" 0 $?
 for root in $roots; do [ ! -e "$root" ] || expect "$root" removed there; done
 expect "what is left" mine "$(ls "$demo")"
-"$build/apps/orvelctl/orvelctl" demo "$demo" >/dev/null 2>&1 && expect "a folder in use" refused "made a demo"
+"$build/bin/orvel-demo" "$demo" >/dev/null 2>&1 && expect "a folder in use" refused "made a demo"
 rm -r "$demo"
 
 finish

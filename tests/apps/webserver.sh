@@ -12,7 +12,7 @@ cleanup() {
     [ -z "$server_pid" ] || kill "$server_pid" 2>/dev/null
     [ "${#pids[@]}" -eq 0 ] || kill "${pids[@]}" 2>/dev/null
     wait 2>/dev/null
-    [ ! -e "$demo" ] || "$build/apps/orvelctl/orvelctl" demo "$demo" --remove >/dev/null 2>&1
+    [ ! -e "$demo" ] || "$build/bin/orvel-demo" "$demo" --remove >/dev/null 2>&1
     rm -rf "$work"
 }
 trap cleanup EXIT
@@ -37,7 +37,7 @@ if [ "$(id -u)" -eq 0 ]; then
     user=www-data
     user_lighttpd='server.username = "www-data"' user_nginx='user www-data;' user_apache=$'User www-data\\\nGroup www-data'
 fi
-accounts=$("$build/apps/orvelctl/orvelctl" demo "$demo") || exit 1
+accounts=$("$build/bin/orvel-demo" "$demo") || exit 1
 password() { awk -v user="$1" '$1 == "user" && $2 == user { print $4 }' <<<"$accounts"; }
 printf 'orveld_web_servers="%s"\norveld_trusted_logins="%s"\n' "$user" "$user" >>"$settings"
 cp -r "$source/apps/web" "$work/web"

@@ -1,11 +1,11 @@
-#include "demo/content.h"
+#include "content.h"
 
 #include <algorithm>
 #include <initializer_list>
 
-#include "demo/picture.h"
+#include "picture.h"
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 namespace {
 
 constexpr time_t kDay = 86400;
@@ -177,4 +177,4 @@ void fillSample(Tree& tree) {
     tree.file("data.bin", 1 << 20, kStart + 3500 * kDay);
 }
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo

@@ -1,13 +1,13 @@
 // The shares of the demo appliance: how they are defined and what lies in them.
-#ifndef ORVEL_ORVELCTL_DEMO_SHARES_H
-#define ORVEL_ORVELCTL_DEMO_SHARES_H
+#ifndef ORVEL_DEMO_SHARES_H
+#define ORVEL_DEMO_SHARES_H
 
 #include <string>
 #include <vector>
 
-#include "demo/identities.h"
+#include "identities.h"
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 
 // The roots of all shares for one tag, "/tmp/orvel-demo-<tag>-<share>": a share root is the second component of its
 // path. In the order of the definitions.
@@ -20,6 +20,6 @@ std::string sharesText(const std::string& tag);
 // Makes every root with its content.
 void makeShares(const std::string& tag, const Identities& ids);
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo
 
 #endif

@@ -1,4 +1,4 @@
-#include "demo/identities.h"
+#include "identities.h"
 
 #include <crypt.h>
 
@@ -6,7 +6,7 @@
 
 #include "base/random.h"
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 namespace {
 
 // Out of the way of a machine's own users, and of each other.
@@ -70,4 +70,4 @@ std::string randomDigits() {
     return digits;
 }
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo

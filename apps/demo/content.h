@@ -1,10 +1,10 @@
 // What lies in each share of the demo appliance.
-#ifndef ORVEL_ORVELCTL_DEMO_CONTENT_H
-#define ORVEL_ORVELCTL_DEMO_CONTENT_H
+#ifndef ORVEL_DEMO_CONTENT_H
+#define ORVEL_DEMO_CONTENT_H
 
-#include "demo/tree.h"
+#include "tree.h"
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 
 void fillPhoto(Tree& tree);      // pages of files of every size and time, folders by year, a recycle bin
 void fillMusic(Tree& tree);      // albums
@@ -14,6 +14,6 @@ void fillWarehouse(Tree& tree);  // one flat folder of 20,000 files
 void fillHomes(Tree& tree);      // nothing: homes are made on first use
 void fillSample(Tree& tree);     // a few files
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo
 
 #endif

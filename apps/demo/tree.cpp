@@ -1,4 +1,4 @@
-#include "demo/tree.h"
+#include "tree.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <system_error>
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 namespace {
 
 [[noreturn]] void fail(const std::string& what) {
@@ -74,4 +74,4 @@ void Tree::own(const std::string& path) const {
     if (fchownat(fd_, path.c_str(), owner_, ids_.users, AT_SYMLINK_NOFOLLOW) != 0) fail(path);
 }
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo

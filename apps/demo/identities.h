@@ -1,13 +1,13 @@
 // The people of the demo appliance.
-#ifndef ORVEL_ORVELCTL_DEMO_IDENTITIES_H
-#define ORVEL_ORVELCTL_DEMO_IDENTITIES_H
+#ifndef ORVEL_DEMO_IDENTITIES_H
+#define ORVEL_DEMO_IDENTITIES_H
 
 #include <sys/types.h>
 
 #include <string>
 #include <vector>
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 
 struct Person {
     std::string name;
@@ -37,6 +37,6 @@ std::string loginText(const std::vector<Person>& people);
 // Twelve random hexadecimal digits.
 std::string randomDigits();
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo
 
 #endif

@@ -1,11 +1,11 @@
-#include "demo/picture.h"
+#include "picture.h"
 
 #include <algorithm>
 #include <cmath>
 #include <cstdint>
 #include <string_view>
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 namespace {
 
 constexpr int kWidth = 480, kHeight = 320;
@@ -100,4 +100,4 @@ std::string landscape(int number) {
            chunk("PLTE", paletteOf(number)) + chunk("IDAT", stored(rows)) + chunk("IEND", "");
 }
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo

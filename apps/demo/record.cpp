@@ -1,4 +1,4 @@
-#include "demo/record.h"
+#include "record.h"
 
 #include <fcntl.h>
 #include <json/reader.h>
@@ -15,11 +15,11 @@
 #include <stdexcept>
 #include <system_error>
 
-#include "demo/shares.h"
+#include "shares.h"
 
 namespace fs = std::filesystem;
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 namespace {
 
 constexpr const char* kRecord = "/etc/vexo/demo.json";
@@ -124,4 +124,4 @@ void removeDemo(const std::string& folder, const Record& record) {
     if (rmdir(folder.c_str()) != 0) fprintf(stderr, "orvelctl: %s holds other files and stays\n", folder.c_str());
 }
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo

@@ -1,14 +1,14 @@
 // What a demo appliance consists of, kept in its own etc/vexo/demo.json: nothing else is ever removed.
-#ifndef ORVEL_ORVELCTL_DEMO_RECORD_H
-#define ORVEL_ORVELCTL_DEMO_RECORD_H
+#ifndef ORVEL_DEMO_RECORD_H
+#define ORVEL_DEMO_RECORD_H
 
 #include <optional>
 #include <string>
 #include <vector>
 
-#include "demo/identities.h"
+#include "identities.h"
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 
 struct Record {
     bool whole = false;              // false while it is being made
@@ -32,6 +32,6 @@ bool isWhole(const Record& record);
 // holds nothing else.
 void removeDemo(const std::string& folder, const Record& record);
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo
 
 #endif

@@ -1,6 +1,6 @@
 // Makes the files of one share root. Until finish() nobody but the maker can enter it.
-#ifndef ORVEL_ORVELCTL_DEMO_TREE_H
-#define ORVEL_ORVELCTL_DEMO_TREE_H
+#ifndef ORVEL_DEMO_TREE_H
+#define ORVEL_DEMO_TREE_H
 
 #include <sys/types.h>
 
@@ -8,9 +8,9 @@
 #include <ctime>
 #include <string>
 
-#include "demo/identities.h"
+#include "identities.h"
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 
 // Throws std::system_error when something cannot be made, even if it is only that it is there already. Modes are exact
 // where the process's umask is 0.
@@ -41,6 +41,6 @@ class Tree {
     int fd_;
 };
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo
 
 #endif

@@ -1,12 +1,12 @@
-#include "demo/shares.h"
+#include "shares.h"
 
 #include <algorithm>
 #include <string_view>
 
-#include "demo/content.h"
-#include "demo/tree.h"
+#include "content.h"
+#include "tree.h"
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 namespace {
 
 struct DemoShare {
@@ -77,4 +77,4 @@ void makeShares(const std::string& tag, const Identities& ids) {
     }
 }
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo

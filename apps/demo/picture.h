@@ -1,14 +1,14 @@
 // Something to look at for the demo appliance.
-#ifndef ORVEL_ORVELCTL_DEMO_PICTURE_H
-#define ORVEL_ORVELCTL_DEMO_PICTURE_H
+#ifndef ORVEL_DEMO_PICTURE_H
+#define ORVEL_DEMO_PICTURE_H
 
 #include <string>
 
-namespace orvel::ctl::appliance {
+namespace orvel::demo {
 
 // The bytes of a PNG file: hills under a sky, another light for each number.
 std::string landscape(int number);
 
-}  // namespace orvel::ctl::appliance
+}  // namespace orvel::demo
 
 #endif
