@@ -1,5 +1,5 @@
 // A browser for the tests: Debian's Chromium through playwright-core, with every complaint of the page collected.
-import { existsSync, mkdtempSync, rmSync } from "node:fs";
+import { existsSync, mkdtempSync, readFileSync, rmSync } from "node:fs";
 import assert from "node:assert/strict";
 import { tmpdir } from "node:os";
 import { basename, join } from "node:path";
@@ -125,6 +125,17 @@ export async function upload(page, command, paths) {
 export async function rowsReady(page) {
   await page.waitForSelector("#view[aria-busy=false], .home, .state");
   await page.waitForFunction(() => !document.querySelector("#view .row.waiting"));
+}
+
+const axe = readFileSync(new URL(import.meta.resolve("axe-core/axe.min.js")), "utf8");
+
+// What axe-core finds on screen, or in the part of it that is new.
+export async function findings(page, part = "html") {
+  if (!(await page.evaluate(() => "axe" in globalThis))) await page.evaluate(axe);
+  return page.evaluate(async (within) => {
+    const { violations } = await globalThis.axe.run(within, { resultTypes: ["violations"] });
+    return violations.flatMap(({ id, nodes }) => nodes.slice(0, 3).map((node) => `${id}: ${node.html.slice(0, 160)}`));
+  }, part);
 }
 
 // What the page was about to draw is drawn.

@@ -1,8 +1,7 @@
 // Public links: made, opened by a visitor who has no account, revoked.
 import assert from "node:assert/strict";
 import { test } from "node:test";
-import { browser, go, row, screenshot, withPage } from "./browser.mjs";
-
+import { browser, findings, go, row, screenshot, withPage } from "./browser.mjs";
 
 async function makeLink(page, name, password) {
   await row(page, name).click();
@@ -52,7 +51,7 @@ test("a folder with a password, opened elsewhere, then revoked", () =>
       await visitor.waitForSelector("text=plan.pdf"); // the page comes back by itself
       await screenshot(visitor, "visitor");
       const download = visitor.waitForEvent("download");
-      await visitor.click("text=plan.pdf");
+      await visitor.click("[aria-label='Download: plan.pdf']");
       assert.equal((await download).suggestedFilename(), "plan.pdf");
       assert.deepEqual(
         wrong.filter((text) => !text.includes("403") && !text.includes("429")),
@@ -68,6 +67,9 @@ test("a folder with a password, opened elsewhere, then revoked", () =>
     await visit(address, async (visitor, status) => {
       assert.equal(status, 404);
       assert.equal(await visitor.locator("text=plan.pdf").count(), 0);
+      await visitor.waitForSelector("h1:has-text('This link is not available.')");
+      assert.deepEqual(await findings(visitor), []);
+      assert.notEqual(await visitor.evaluate(() => getComputedStyle(document.querySelector("main")).borderRadius), "0px");
     });
   }));
 
@@ -82,13 +84,38 @@ test("names of markup reach a visitor as text", () =>
       assert.equal(await visitor.locator("img:not(.picture, .brand img)").count(), 0);
       assert.deepEqual(wrong, []);
     });
+  }));
+
+test("pictures on a phone: tiles, the file itself, sorted, back", () =>
+  withPage("alice", { path: "/" }, async (page) => {
+    await go(page, "/photo");
+    await page.waitForSelector("#view >> text=Landscapes");
+    const address = await makeLink(page, "Landscapes", "");
     const phone = { viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true };
     await visit(
       address,
-      async (visitor) => {
-        await visitor.waitForSelector("h1");
+      async (visitor, status, wrong) => {
+        await visitor.waitForSelector(".tiles img:not(.picture)");
+        assert.equal(await visitor.evaluate(() => document.documentElement.scrollWidth), 390); // not a shrunk page of a desktop
+        assert.deepEqual(await findings(visitor), []);
+        await visitor.tap(".tiles a >> nth=0");
+        const shown = (name) => visitor.waitForSelector(`.preview b:has-text("${name}")`);
+        await shown("After the rain.png");
+        await visitor.waitForFunction(() => document.querySelector(".stage img").naturalWidth > 0);
+        assert.deepEqual(await findings(visitor), []);
+        await visitor.tap(".next");
+        await shown("Blue hour.png");
+        await visitor.reload(); // the address keeps it
+        await shown("Blue hour.png");
+        await visitor.goBack();
+        await visitor.waitForSelector(".preview", { state: "detached" });
+        await visitor.selectOption("select", "name desc");
+        await visitor.waitForSelector(".tiles li:first-child:has-text('North slope.png')");
+        await visitor.tap("[aria-label=List]");
+        await visitor.waitForSelector("tbody tr:first-child:has-text('North slope.png')");
+        assert.deepEqual(await findings(visitor), []);
         await screenshot(visitor, "visitor-phone");
-        assert.equal(await visitor.evaluate(() => innerWidth), 390); // not a shrunk page of a desktop
+        assert.deepEqual(wrong, []);
       },
       phone,
     );

@@ -1,11 +1,10 @@
 // The main states of the page for everybody: assistive technology, forced colours, narrow windows, hands on keys.
 import assert from "node:assert/strict";
-import { chmodSync, mkdirSync, readFileSync, writeFileSync } from "node:fs";
+import { chmodSync, mkdirSync, writeFileSync } from "node:fs";
 import { before, test } from "node:test";
-import { go, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+import { findings, go, row, rowsReady, screenshot, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
-const axe = readFileSync(new URL(import.meta.resolve("axe-core/axe.min.js")), "utf8");
 const DEEP = "a drawer/with a rather long name/and another rather long name/in which there lies/one more/and the last one";
 const phone = { viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true };
 
@@ -23,11 +22,7 @@ before(() => {
 async function accessible(page, state, part = "html") {
   await rowsReady(page);
   await page.waitForSelector(part);
-  if (!(await page.evaluate(() => "axe" in globalThis))) await page.evaluate(axe);
-  const found = await page.evaluate(async (within) => {
-    const { violations } = await globalThis.axe.run(within, { resultTypes: ["violations"] });
-    return violations.flatMap(({ id, nodes }) => nodes.slice(0, 3).map((node) => `${id}: ${node.html.slice(0, 160)}`));
-  }, part);
+  const found = await findings(page, part);
   await screenshot(page, `state-${state.replaceAll(" ", "-")}`);
   assert.deepEqual(found, [], state);
 }

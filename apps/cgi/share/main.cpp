@@ -35,6 +35,7 @@
 #include "share/place.h"
 #include "share/visit.h"
 #include "text.h"
+#include "vexo/language.h"
 
 namespace orvel::cgi {
 namespace {
@@ -49,7 +50,7 @@ constexpr const char* kPageHeaders =
     "X-Content-Type-Options: nosniff\r\n"
     "Referrer-Policy: no-referrer\r\n"
     "Content-Security-Policy: default-src 'none'; script-src 'self' 'unsafe-inline'; style-src 'self'; img-src 'self'; "
-    "connect-src 'self'; form-action 'self'; base-uri 'none'; frame-ancestors 'none'\r\n";
+    "media-src 'self'; connect-src 'self'; form-action 'self'; base-uri 'none'; frame-ancestors 'none'\r\n";
 
 // The prefix goes into the page as it is.
 bool isTunnel(const std::string& prefix) {
@@ -61,20 +62,54 @@ bool isTunnel(const std::string& prefix) {
            (prefix.starts_with('/') && !prefix.starts_with("//") && std::all_of(prefix.begin(), prefix.end(), fits));
 }
 
-void writeNotice(Output& out, const char* status, const char* text) {
-    out.text() += std::string("Status: ") + status + "\r\nContent-Type: text/html; charset=UTF-8\r\n" + kPageHeaders +
-                  "\r\n<!DOCTYPE html><meta charset=\"utf-8\"><title>" + text + "</title><p>" + text + "</p>\n";
+struct Sentence {
+    const char* text;
+    const char* hint;
+};
+
+struct Notice {
+    const char* status;
+    Sentence english;
+    Sentence german;
+};
+
+constexpr Notice kBadAddress = {
+    "400 Bad Request", {"This address is not complete.", ""}, {"Diese Adresse ist nicht vollständig.", ""}};
+constexpr Notice kBlockedNow = {"403 Forbidden",
+                                {"Too many failed attempts.", "Try again later."},
+                                {"Zu viele Fehlversuche.", "Versuchen Sie es später noch einmal."}};
+constexpr Notice kNotThere = {
+    "404 Not Found",
+    {"This link is not available.", "It was withdrawn, or its time is over. Ask whoever sent it for a new one."},
+    {"Dieser Link ist nicht verfügbar.",
+     "Er wurde zurückgezogen oder ist abgelaufen. Bitten Sie die Person, die ihn geschickt hat, um einen neuen."}};
+constexpr Notice kBrokenNow = {"500 Internal Server Error",
+                               {"This link cannot be opened now.", "Try again later."},
+                               {"Dieser Link lässt sich jetzt nicht öffnen.", "Versuchen Sie es später noch einmal."}};
+
+// A page of one sentence, in the style of the others and without a script. `tunnel` is one that fits.
+void writeNotice(Output& out, const Notice& notice, const std::string& tunnel) {
+    const std::string language = VexoCgiSelectDefLang();
+    const Sentence& said = language == "de" ? notice.german : notice.english;
+    out.text() += std::string("Status: ") + notice.status + "\r\nContent-Type: text/html; charset=UTF-8\r\n" +
+                  kPageHeaders + "\r\n<!DOCTYPE html>\n<html lang='" + language + "'>\n<meta charset='utf-8'>\n" +
+                  "<meta name='viewport' content='width=device-width, initial-scale=1'>\n<title>" + said.text +
+                  "</title>\n<link rel='icon' href='" + tunnel + "/favicon.svg'>\n<link rel='stylesheet' href='" +
+                  tunnel + "/visitor/style.css'>\n<div class='brand' role='banner'><img src='" + tunnel +
+                  "/favicon.svg' alt='' width='26' height='26'>Orvel</div>\n<main><div class='notice'><h1>" +
+                  said.text + "</h1><p>" + said.hint + "</p></div></main>\n</html>\n";
 }
 
 void servePage(Output& out, Visit& visit) {
-    if (!isTunnel(visit.web().GetParam("tunnel", ""))) return writeNotice(out, "400 Bad Request", "Bad address.");
+    const std::string tunnel = visit.web().GetParam("tunnel", "");
+    if (!isTunnel(tunnel)) return writeNotice(out, kBadAddress, "");
     switch (visit.availability()) {
         case Availability::kBlocked:
-            return writeNotice(out, "403 Forbidden", "Too many failed attempts. Try again later.");
+            return writeNotice(out, kBlockedNow, tunnel);
         case Availability::kNone:
-            return writeNotice(out, "404 Not Found", "This link is not available.");
+            return writeNotice(out, kNotThere, tunnel);
         case Availability::kBroken:
-            return writeNotice(out, "500 Internal Server Error", "This link cannot be opened now.");
+            return writeNotice(out, kBrokenNow, tunnel);
         case Availability::kOpen:
             break;
     }

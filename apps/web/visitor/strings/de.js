@@ -12,8 +12,20 @@ var visitorTexts = {
   size: "Größe",
   changed: "Geändert",
   folder: "Ordner",
-  downloadAll: "Alles als Zip-Datei herunterladen",
+  downloadAll: "Alles herunterladen",
   download: "Herunterladen",
   more: "Mehr anzeigen",
-  top: "Freigegebener Ordner"
+  top: "Freigegebener Ordner",
+  goneHint: "Er wurde zurückgezogen oder ist abgelaufen. Bitten Sie die Person, die ihn geschickt hat, um einen neuen.",
+  preview: "Vorschau",
+  noPreview: "Von dieser Art Datei gibt es keine Vorschau.",
+  beginning: "Das ist nur der Anfang der Datei.",
+  close: "Schließen",
+  previous: "Vorige Datei",
+  next: "Nächste Datei",
+  list: "Liste",
+  gallery: "Galerie",
+  sort: "Sortieren nach",
+  way: "Übergeordnete Ordner",
+  count: ["{count} Eintrag", "{count} Einträge"]
 };

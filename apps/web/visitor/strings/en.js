@@ -12,8 +12,20 @@ var visitorTexts = {
   size: "Size",
   changed: "Changed",
   folder: "Folder",
-  downloadAll: "Download everything as zip",
+  downloadAll: "Download all",
   download: "Download",
   more: "Show more",
-  top: "Shared folder"
+  top: "Shared folder",
+  goneHint: "It was withdrawn, or its time is over. Ask whoever sent it for a new one.",
+  preview: "Preview",
+  noPreview: "There is no preview of this kind of file.",
+  beginning: "This is only the beginning of the file.",
+  close: "Close",
+  previous: "Previous file",
+  next: "Next file",
+  list: "List",
+  gallery: "Gallery",
+  sort: "Sort by",
+  way: "Folders above",
+  count: ["{count} entry", "{count} entries"]
 };

@@ -1,0 +1,57 @@
+// What is asked of the program.
+
+const { program, pageSize } = window.visitorDefinitions;
+const link = new URLSearchParams(location.search).get("FOLDER_SHARING");
+
+export function address(fields) {
+  const query = new URLSearchParams(fields);
+  if (link !== null) query.set("FOLDER_SHARING", link);
+  return `${window.g_Tunnel}${program}?${query}`;
+}
+
+// A path goes as its bytes, which need not be text.
+export function pathField({ path, path_raw: raw }) {
+  if (raw !== undefined) return { path_raw: raw };
+  return path ? { path } : {};
+}
+
+export function fileAddress(item) {
+  return address({ action: "download", ...pathField(item) });
+}
+
+async function ask(fields, options) {
+  const answer = await fetch(address(fields), { credentials: "same-origin", ...options });
+  return { status: answer.status, json: await answer.json() };
+}
+
+// Without a reply there is nothing to tell apart.
+const FAILED = { status: 500, json: { success: false } };
+
+export function state() {
+  return ask({ action: "state" }).catch(() => FAILED);
+}
+
+export function list(path, offset, { by, direction }) {
+  const shown = { additional: "size,time,icon", limit: pageSize, offset, sort_by: by, sort_direction: direction };
+  return ask({ action: "list", ...shown, ...pathField(path) }).catch(() => FAILED);
+}
+
+// Passwords are judged in turn: whoever is not next is told when to come again, and with which turn.
+export async function logIn(password, tellWait) {
+  let turn = "";
+  for (;;) {
+    const body = new URLSearchParams({ action: "login", password, turn });
+    const answer = await ask({}, { method: "POST", body }).catch(() => FAILED);
+    if (answer.status !== 429) return answer;
+    turn = answer.json.data.turn;
+    await wait(answer.json.data.wait, tellWait);
+  }
+}
+
+async function wait(milliseconds, tell) {
+  const end = Date.now() + milliseconds;
+  for (let left = milliseconds; left > 0; left = end - Date.now()) {
+    if (milliseconds > 1500) tell(Math.ceil(left / 1000));
+    await new Promise((done) => setTimeout(done, Math.min(left, 1000)));
+  }
+}
