@@ -6,6 +6,7 @@
 #include <map>
 
 #include "apps/program.h"
+#include "fault_gate.h"
 #include "index/folder_state.h"
 #include "index/share_files.h"
 #include "support/gate.h"
@@ -164,6 +165,21 @@ TEST_F(Index, NoLinkIsFollowed) {
                                                                         {"link/deep/f", Presence::kGone}}) {
         _tag_VEXOSTAT_ status;
         EXPECT_EQ(files.status(path, status), presence) << path;
+    }
+}
+
+TEST_F(Index, OnlyWhatIsGoneIsPassedOver) {
+    file("/in/f");
+    int stop = 0;
+    const ShareFiles files(root_, &stop);
+    for (const int error : {ENOENT, ENOTDIR, EACCES, EIO}) {
+        vexo::gate::fail("VLIBCFileLStatAt", VEXO_ERR_GENERAL, error);
+        if (error == ENOENT || error == ENOTDIR) {
+            EXPECT_TRUE(files.list("in").empty()) << error;
+        } else {
+            EXPECT_THROW(static_cast<void>(files.list("in")), Unreadable) << error;
+        }
+        vexo::gate::reset();
     }
 }
 

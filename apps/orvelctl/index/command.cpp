@@ -30,7 +30,7 @@ void stopOnSignals() {
 
 using Share = std::unique_ptr<SDK::Share, Releaser<SDK::Share::Release>>;
 
-[[noreturn]] void refuse(const std::string& share, const char* reason) {
+[[noreturn]] void refuse(const std::string& share, const std::string& reason) {
     throw std::runtime_error(terminalText(share) + ": " + reason);
 }
 
@@ -123,13 +123,22 @@ int work(const SDK::Share& share, bool build, bool everything) {
     Work work(share, build ? FI_INDEX_BUILD : FI_INDEX_UPDATE);
     IndexRows rows(root, share.GetName(), work.database());
     IndexCounts counts;
-    {
+    std::string unread;
+    try {
         Indexer indexer(files, rows, &stopRequested);
         if (!(build ? indexer.build() : indexer.update(everything))) {
             refuse(share.GetName(),
                    build ? "broken off; the index is what it was before" : "broken off; the next update goes on");
         }
         counts = indexer.counts();
+        unread = indexer.unread();
+    } catch (const Unreadable& error) {
+        refuse(share.GetName(), terminalText(error.what()) + "; the index is what it was before");
+    }
+    if (!unread.empty()) {
+        print(share, counts);
+        refuse(share.GetName(), terminalText(unread) + (counts.unread > 1 ? ", and more" : "") +
+                                    "; the index of it is what it was, and the next update goes on");
     }
     work.done();
     if (build) return printStatus(share);

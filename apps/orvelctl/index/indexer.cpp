@@ -2,6 +2,8 @@
 
 #include <unistd.h>
 
+#include <cerrno>
+#include <cstring>
 #include <ctime>
 #include <utility>
 
@@ -35,10 +37,21 @@ std::string within(const std::string& folder, const std::string& name) {
 
 }  // namespace
 
-std::vector<Entry> Indexer::list(const std::string& folder) {
-    std::vector<Entry> entries = files_.list(folder);
+void Indexer::noteUnread(const std::string& what) {
+    if (counts_.unread++ == 0) unread_ = what;
+}
+
+// False when an update could not read it; a build must not pass for whole without it.
+bool Indexer::list(const std::string& folder, std::vector<Entry>& entries) {
+    try {
+        entries = files_.list(folder);
+    } catch (const Unreadable& error) {
+        if (!updating_) throw;
+        noteUnread(error.what());
+        return false;
+    }
     progress_.at("/" + folder, entries.size());
-    return entries;
+    return true;
 }
 
 void Indexer::add(const Entry& entry) {
@@ -48,13 +61,15 @@ void Indexer::add(const Entry& entry) {
 
 // The new folder with its files added, its folders not yet.
 Indexer::NewFolder Indexer::read(Entry folder) {
-    NewFolder made = {std::move(folder), kernelClock(), {}};
+    NewFolder made = {std::move(folder), kernelClock(), {}, true};
     if (updating_) {
         Entry begun = made.own;
         --begun.status.st_change;
         rows_.insert(begun);
     }
-    for (Entry& entry : list(made.own.path)) {
+    std::vector<Entry> entries;
+    made.whole = list(made.own.path, entries);
+    for (Entry& entry : entries) {
         if (entry.isFolder()) {
             made.inside.push_back(std::move(entry));
         } else {
@@ -78,7 +93,7 @@ void Indexer::addTree(Entry top) {
             way.push_back(read(std::move(next)));
             continue;
         }
-        if (!last.own.path.empty()) {
+        if (!last.own.path.empty() && last.whole) {
             writeOwnRow(std::move(last.own), last.seen);
             ++counts_.added;
         }
@@ -130,23 +145,25 @@ void Indexer::compareEntry(const Entry& entry, const Row* row) {
     ++counts_.changed;
 }
 
-void Indexer::compare(const std::string& folder) {
+// False when something in it could not be read, so that the folder's own row must not pass for compared.
+bool Indexer::compare(const std::string& folder) {
     std::map<std::string, Row> rows = rows_.in(folder);
-    const std::vector<Entry> entries = list(folder);
+    std::vector<Entry> entries;
+    if (!list(folder, entries)) return false;
     for (const Entry& entry : entries) {
-        if (stopped()) return;
+        if (stopped()) return false;
         const auto row = rows.find(entry.name);
         compareEntry(entry, row != rows.end() ? &row->second : nullptr);
         if (row != rows.end()) rows.erase(row);
     }
-    if (stopped()) return;  // the listing may have been cut short
+    if (stopped()) return false;  // the listing may have been cut short
     for (const auto& [name, row] : rows) {
         const std::string path = within(folder, name);
         _tag_VEXOSTAT_ status;
-        // A folder that could not be read has lost nothing.
         const bool gone = files_.isRemoteMount(path) || files_.status(path, status) == Presence::kGone;
         if (gone) removeTree(path, row.isFolder);
     }
+    return true;
 }
 
 void Indexer::visit(const std::string& folder, const Row& stored, bool everything) {
@@ -155,16 +172,17 @@ void Indexer::visit(const std::string& folder, const Row& stored, bool everythin
     const std::string parent = parentOf(folder);
     Entry own = {folder.substr(parent.empty() ? 0 : parent.size() + 1), folder, {}};
     const int64_t seen = kernelClock();
+    const Presence presence = files_.status(folder, own.status);
+    if (presence == Presence::kUnknown) noteUnread("/" + folder + " cannot be read: " + std::strerror(errno));
     // One that went this moment has changed the folder above, which the next update sees.
-    if (files_.status(folder, own.status) != Presence::kThere || !own.isFolder()) return;
+    if (presence != Presence::kThere || !own.isFolder()) return;
 
     const FolderState state = judgeFolder(stored.times, timesOf(own.status), changed_.contains(parent));
     if (state != FolderState::kSame) changed_.insert(folder);
     if (state == FolderState::kReplaced || replaced_.contains(parent)) replaced_.insert(folder);
     if (state == FolderState::kSame && !replaced_.contains(folder) && !everything) return;
     ++counts_.compared;
-    compare(folder);
-    if (stopped()) return;
+    if (!compare(folder)) return;
     const bool differs = !(rows_.rowOf(own) == stored);
     if (differs) ++counts_.changed;
     if (differs || mayChangeUnseen(timesOf(own.status), seen)) compared_.emplace_back(std::move(own), seen);
@@ -183,8 +201,7 @@ void Indexer::settle() {
             Entry own = {folder.substr(folder.rfind('/') + 1), folder, {}};
             const int64_t seen = kernelClock();
             if (stopped() || files_.status(folder, own.status) != Presence::kThere || !own.isFolder()) continue;
-            compare(folder);
-            if (!stopped()) compared_.emplace_back(std::move(own), seen);
+            if (compare(folder)) compared_.emplace_back(std::move(own), seen);
         }
         writeOwnRows();
     }

@@ -20,6 +20,7 @@ struct IndexCounts {
     unsigned long long added = 0;
     unsigned long long changed = 0;
     unsigned long long removed = 0;
+    unsigned long long unread = 0;  // folders and files that are there and could not be read
 };
 
 // A folder's own row is written behind everything below it, and has a time that is not the folder's as long as the
@@ -29,11 +30,14 @@ class Indexer {
     // A nonzero `*stop` breaks the work off.
     Indexer(const ShareFiles& files, IndexRows& rows, const int* stop) : files_(files), rows_(rows), stop_(stop) {}
 
-    // Fills an empty index. False when it was broken off; throws what IndexRows throws.
+    // Fills an empty index. False when it was broken off; throws what IndexRows throws, and Unreadable.
     bool build();
-    // Looks at every folder of the index and compares those that changed, with `everything` all of them.
+    // Looks at every folder of the index and compares those that changed, with `everything` all of them. What cannot be
+    // read stays in the index as it is, is counted, and is looked at again by the next update.
     bool update(bool everything);
     [[nodiscard]] const IndexCounts& counts() const { return counts_; }
+    // The first that could not be read, and why; "" for none.
+    [[nodiscard]] const std::string& unread() const { return unread_; }
 
  private:
     // A folder that the index does not have yet.
@@ -41,10 +45,12 @@ class Indexer {
         Entry own;
         int64_t seen;               // kernel's clock before it was listed
         std::vector<Entry> inside;  // its folders that are still to be read
+        bool whole = true;          // all of it could be read
     };
 
     [[nodiscard]] bool stopped() const { return *stop_ != 0; }
-    std::vector<Entry> list(const std::string& folder);
+    bool list(const std::string& folder, std::vector<Entry>& entries);
+    void noteUnread(const std::string& what);
     NewFolder read(Entry folder);
     void addTree(Entry top);
     void add(const Entry& entry);
@@ -52,7 +58,7 @@ class Indexer {
     void writeOwnRows();
     void removeTree(const std::string& path, bool isFolder);
     void compareEntry(const Entry& entry, const Row* row);
-    void compare(const std::string& folder);
+    bool compare(const std::string& folder);
     void visit(const std::string& folder, const Row& stored, bool everything);
     void settle();
     void rest();
@@ -63,6 +69,7 @@ class Indexer {
     bool updating_ = false;
     Progress progress_;
     IndexCounts counts_;
+    std::string unread_;
     std::map<std::string, Row> known_;                 // the folders of the index
     std::set<std::string> changed_;                    // folders that did change
     std::set<std::string> replaced_;                   // all folders below these are compared

@@ -5,33 +5,23 @@
 
 #include <cerrno>
 #include <climits>
+#include <cstring>
+#include <utility>
 
 #include "base/beneath.h"
-#include "orvel/directory_walker.h"
+#include "folder_names.h"
 #include "vexo/filesystem.h"
+#include "vexo/share.h"
 
 namespace orvel::ctl {
 namespace {
 
-class Collector final : public OrvDirectoryWalkerCallBack {
- public:
-    // `prefix`: the folder's path within the share, with a "/" behind it.
-    Collector(size_t folderLength, std::string prefix) : folderLength_(folderLength), prefix_(std::move(prefix)) {}
+constexpr unsigned kStatus = VEXO_STAT_BASIC | VEXO_STAT_CREATE_TIME;
 
-    bool operator()(const std::string&, const std::string&, const std::string&, const std::string& name,
-                    _tag_VEXOSTAT_& status, const std::string*) override {
-        const bool kept = S_ISREG(status.st_mode) || S_ISDIR(status.st_mode);
-        const bool fits = folderLength_ + 1 + name.size() < PATH_MAX;
-        if (kept && fits) entries.push_back({name, prefix_ + name, status});
-        return true;
-    }
-
-    std::vector<Entry> entries;
-
- private:
-    size_t folderLength_;  // of its real path
-    std::string prefix_;
-};
+// What was seen a moment ago has another kind, another name or none by now.
+bool isGone(int error) {
+    return error == ENOENT || error == ENOTDIR || error == ELOOP || error == ESTALE;
+}
 
 }  // namespace
 
@@ -45,19 +35,34 @@ ShareFiles::ShareFiles(std::string root, int* stop)
 // The indexer is root and users move their folders while it works: a link that took the place of one must not bring
 // names from elsewhere into the index.
 std::vector<Entry> ShareFiles::list(const std::string& folder) const {
-    Descriptor below;
-    if (!folder.empty()) {
-        below = openBeneath(opened_, folder, LinkPolicy::kNone, O_PATH | O_DIRECTORY);
-        if (!below) return {};
+    const auto unreadable = [](const std::string& path, int error) {
+        return Unreadable("/" + path + " cannot be read: " + std::strerror(error));
+    };
+    const Descriptor opened =
+        openBeneath(opened_, folder.empty() ? "." : folder, LinkPolicy::kNone, O_PATH | O_DIRECTORY);
+    std::vector<std::string> names;
+    if (!opened || !cgi::namesIn(opened.get(), cgi::Hidden::kLeaveOut, names)) {
+        if (!folder.empty() && isGone(errno)) return {};
+        throw unreadable(folder, errno);
     }
-    Collector collector(realPath(folder).size(), folder.empty() ? "" : folder + "/");
-    // As a search does it: what cannot be read is passed over.
-    OrvDirectoryWalker walker(ENUM_IGNORE_ALL_ERR, stop_);
-    walker.Walk_FirstFolder_First(folder, root_, below ? below.path() : root_, collector, nullptr, folder.empty(),
-                                  true);
-    std::erase_if(collector.entries,
-                  [this](const Entry& entry) { return entry.isFolder() && isRemoteMount(entry.path); });
-    return std::move(collector.entries);
+    std::vector<Entry> entries;
+    const std::string prefix = folder.empty() ? "" : folder + "/";
+    for (std::string& name : names) {
+        if (*stop_ != 0) break;
+        Entry entry{std::move(name), {}, {}};
+        entry.path = prefix + entry.name;
+        const std::string real = realPath(entry.path);
+        if (real.size() >= PATH_MAX || (folder.empty() && VEXOShareIsShareRecycle(real.c_str()) == 1)) continue;
+        if (VLIBCFileLStatAt(opened.get(), entry.name.c_str(), kStatus, &entry.status) < 0) {
+            const int error = errno;
+            if (isGone(error) || isRemoteMount(entry.path)) continue;
+            throw unreadable(entry.path, error);
+        }
+        if (S_ISREG(entry.status.st_mode) || (entry.isFolder() && !isRemoteMount(entry.path))) {
+            entries.push_back(std::move(entry));
+        }
+    }
+    return entries;
 }
 
 Presence ShareFiles::status(const std::string& path, _tag_VEXOSTAT_& status) const {
@@ -65,9 +70,8 @@ Presence ShareFiles::status(const std::string& path, _tag_VEXOSTAT_& status) con
     const std::string parent = slash == std::string::npos ? "." : path.substr(0, slash);
     const std::string name = path.empty() ? "." : path.substr(slash + 1);
     const Descriptor folder = openBeneath(opened_, parent, LinkPolicy::kNone, O_PATH | O_DIRECTORY);
-    if (!folder || VLIBCFileLStatAt(folder.get(), name.c_str(), VEXO_STAT_BASIC | VEXO_STAT_CREATE_TIME, &status) < 0) {
-        const bool gone = errno == ENOENT || errno == ENOTDIR || errno == ELOOP;
-        return gone ? Presence::kGone : Presence::kUnknown;
+    if (!folder || VLIBCFileLStatAt(folder.get(), name.c_str(), kStatus, &status) < 0) {
+        return isGone(errno) ? Presence::kGone : Presence::kUnknown;
     }
     return S_ISREG(status.st_mode) || S_ISDIR(status.st_mode) ? Presence::kThere : Presence::kGone;
 }

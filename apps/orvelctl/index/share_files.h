@@ -2,6 +2,7 @@
 #ifndef ORVEL_ORVELCTL_INDEX_SHARE_FILES_H
 #define ORVEL_ORVELCTL_INDEX_SHARE_FILES_H
 
+#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -21,6 +22,12 @@ struct Entry {
 // Whether a file or folder is there.
 enum class Presence { kGone, kThere, kUnknown /* an error keeps from telling */ };
 
+// A folder, or a file's status, that is there and cannot be read; the text says which and why.
+class Unreadable : public std::runtime_error {
+ public:
+    using std::runtime_error::runtime_error;
+};
+
 class ShareFiles {
  public:
     // `root`: real path of the share's root. A nonzero `*stop` ends a listing early.
@@ -32,7 +39,7 @@ class ShareFiles {
     }
 
     // What a walk reports of one folder ("" is the root), without network mounts and without paths too long to be
-    // asked for. Empty when it cannot be read, or is reached through a link.
+    // asked for. Empty when it is gone meanwhile, or is reached through a link. Throws Unreadable.
     [[nodiscard]] std::vector<Entry> list(const std::string& folder) const;
     // The status of a file or folder; one that is reached through a link is gone.
     [[nodiscard]] Presence status(const std::string& path, _tag_VEXOSTAT_& status) const;
