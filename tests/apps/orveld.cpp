@@ -22,6 +22,7 @@
 #include "listener.h"
 #include "scgi.h"
 #include "support/appliance.h"
+#include "support/wait.h"
 #include "vexo/system_root.h"
 
 namespace support {
@@ -185,9 +186,7 @@ std::vector<pid_t> Orveld::readers() const {
 int Orveld::end() {
     if (started_ <= 0) return -1;
     kill(started_, SIGTERM);
-    int status = 0;
-    while (waitpid(started_, &status, 0) < 0 && errno == EINTR) {
-    }
+    const int status = support::waitForEnd(started_, "orveld");
     started_ = -1;
     return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }

@@ -3,18 +3,22 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <json/reader.h>
+#include <poll.h>
 #include <spawn.h>
 #include <sys/mman.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <csignal>
 #include <cstdlib>
 #include <filesystem>
 #include <memory>
 #include <sstream>
 
 #include "apps/orveld.h"
+#include "support/wait.h"
 #include "text.h"
 
 namespace support {
@@ -124,14 +128,19 @@ Finished runProgram(const std::vector<std::string>& words, const Variables& vari
     close(body);
     Finished finished;
     char buffer[65536];
-    for (ssize_t got; failed == 0 && (got = read(ends[0], buffer, sizeof buffer)) > 0;) {
-        finished.output.append(buffer, static_cast<size_t>(got));
+    pollfd output = {.fd = ends[0], .events = POLLIN, .revents = 0};
+    for (ssize_t got = 1; failed == 0 && got > 0;) {
+        if (poll(&output, 1, 120'000) == 0) {
+            ADD_FAILURE() << "waited two minutes in vain for output of " << words[0];
+            kill(child, SIGKILL);
+            break;
+        }
+        got = read(ends[0], buffer, sizeof buffer);
+        finished.output.append(buffer, static_cast<size_t>(std::max<ssize_t>(got, 0)));
     }
     close(ends[0]);
-    int status = 0;
     if (failed != 0) return finished;
-    while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
-    }
+    const int status = support::waitForEnd(child, words[0]);
     finished.status = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
     return finished;
 }

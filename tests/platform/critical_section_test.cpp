@@ -55,9 +55,7 @@ TEST_F(CriticalSection, TheTimeIsKeptAndASweptFolderToo) {
     EXPECT_TRUE(hasOpen(1)) << "the new one";
     writeFile(left, "");
     VexoCgiEndCriticalSection(second);
-    int status = 0;
-    EXPECT_EQ(waitpid(waiter, &status, 0), waiter);
-    EXPECT_EQ(status, 0);
+    EXPECT_EQ(support::waitForEnd(waiter, "the one that waited for the lock"), 0);
     EXPECT_FAILS(VexoCgiBeginCriticalSection("/none/lock", 10), ENOENT, VEXO_ERR_FILE);
 }
 

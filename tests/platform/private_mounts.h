@@ -14,14 +14,15 @@ namespace support {
 constexpr int kNoPrivateMounts = 96;
 
 // Runs `body` in a forked child whose mounts nobody else sees. Its result, or kNoPrivateMounts where the machine does
-// not allow that.
+// not allow that. Whole programs of tests run in here, so the limit is for the longest of them.
 inline int inPrivateMounts(const std::function<int()>& body) {
-    return inChild([&] {
+    const auto whole = [&] {
         if (unshare(CLONE_NEWNS) != 0 || mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) {
             return kNoPrivateMounts;
         }
         return body();
-    });
+    };
+    return inChild(whole, std::chrono::hours(5));
 }
 
 }  // namespace support

@@ -15,6 +15,7 @@
 #include "fault_gate.h"
 #include "support/appliance.h"
 #include "support/fault_sweep.h"
+#include "support/wait.h"
 #include "tasks/task_document.h"
 
 namespace {
@@ -202,8 +203,7 @@ TEST_F(TaskProgress, OnlyAProcessThatIsThereIsStopped) {
         _exit(0);
     }
     EXPECT_TRUE(DoKill(child));
-    int status = 0;
-    EXPECT_EQ(waitpid(child, &status, 0), child);
+    const int status = support::waitForEnd(child, "the killed one");
     EXPECT_TRUE(WIFSIGNALED(status) && WTERMSIG(status) == SIGTERM);
     EXPECT_FALSE(DoKill(child)) << "gone: no message";
     SKIP_WITHOUT_ROOT();

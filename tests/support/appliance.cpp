@@ -24,6 +24,7 @@
 #include "fault_gate.h"
 #include "index/index_connections.h"
 #include "orvel/error_state.h"
+#include "support/wait.h"
 
 namespace fs = std::filesystem;
 
@@ -121,7 +122,7 @@ int openDescriptors() {
     return static_cast<int>(std::distance(fs::directory_iterator("/proc/self/fd"), fs::directory_iterator{}));
 }
 
-int inChild(const std::function<int()>& body) {
+int inChild(const std::function<int()>& body, std::chrono::minutes limit) {
     fflush(nullptr);
     const pid_t child = fork();
     if (child == 0) {
@@ -134,9 +135,7 @@ int inChild(const std::function<int()>& body) {
         fflush(nullptr);
         _exit(::testing::Test::HasFailure() ? 99 : result);
     }
-    int status = 0;
-    while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
-    }
+    const int status = waitForEnd(child, "a child of the test", limit);
     const int result = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
     EXPECT_LT(result, 98) << "the child failed";
     return result;

@@ -6,6 +6,7 @@
 #include <gtest/gtest.h>
 #include <sys/types.h>
 
+#include <chrono>
 #include <functional>
 #include <string>
 #include <type_traits>
@@ -74,7 +75,7 @@ int openDescriptors();
 // exit status below 100); gtest failures inside count as failures of the test. Needs root: see SKIP_WITHOUT_ROOT.
 int asUser(uid_t uid, gid_t gid, const std::function<int()>& body);
 // Runs `body` in a forked child with the caller's ids: for what changes the process for good.
-int inChild(const std::function<int()>& body);
+int inChild(const std::function<int()>& body, std::chrono::minutes limit = std::chrono::minutes(4));
 
 // Bodies without a result of their own: 0.
 template <class Body>

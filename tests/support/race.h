@@ -13,6 +13,8 @@
 #include <functional>
 #include <vector>
 
+#include "support/wait.h"
+
 namespace support {
 
 // Does `step` again and again in a process of its own, as another user where a uid is given.
@@ -43,9 +45,9 @@ inline int countAtOnce(int count, const std::function<bool()>& body) {
         children.push_back(fork());
         if (children.back() == 0) _exit(body() ? 1 : 0);
     }
-    int answered = 0, status = 0;
+    int answered = 0;
     for (const pid_t child : children) {
-        EXPECT_EQ(waitpid(child, &status, 0), child);
+        const int status = waitForEnd(child, "one of many at once");
         EXPECT_TRUE(WIFEXITED(status));
         answered += WEXITSTATUS(status);
     }
@@ -56,8 +58,7 @@ inline int countAtOnce(int count, const std::function<bool()>& body) {
 inline void expectKilled(const std::function<void()>& body) {
     const pid_t child = fork();
     if (child == 0) _exit((body(), 0));
-    int status = 0;
-    EXPECT_EQ(waitpid(child, &status, 0), child);
+    const int status = waitForEnd(child, "the one that is killed");
     EXPECT_TRUE(WIFSIGNALED(status)) << "it lived on";
 }
 
