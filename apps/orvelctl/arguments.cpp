@@ -1,31 +1,31 @@
 #include "arguments.h"
 
-#include <algorithm>
-
+#include "command.h"
 #include "request.h"
 
 namespace orvel::ctl {
 namespace {
 
-bool contains(const std::vector<std::string>& list, const std::string& word) {
-    return std::find(list.begin(), list.end(), word) != list.end();
+const Option& optionOf(std::string_view command, std::string_view form, const std::string& word) {
+    for (const Option& option : findCommand(command)->options) {
+        if (option.name == word && takes(option, form)) return option;
+    }
+    throw UsageError("unknown option " + word);
 }
 
 }  // namespace
 
-Arguments::Arguments(const std::vector<std::string>& words, const std::vector<std::string>& valued,
-                     const std::vector<std::string>& flags, size_t positions, bool orMore) {
+Arguments::Arguments(const std::vector<std::string>& words, std::string_view command, std::string_view form,
+                     size_t positions, bool orMore) {
     for (size_t i = 0; i < words.size(); ++i) {
         if (!words[i].starts_with("--")) {
             positions_.push_back(words[i]);
-        } else if (contains(flags, words[i])) {
+        } else if (*optionOf(command, form, words[i]).value == '\0') {
             options_[words[i]] = "";
-        } else if (contains(valued, words[i])) {
+        } else {
             if (i + 1 == words.size()) throw UsageError(words[i] + " needs a value");
             options_[words[i]] = words[i + 1];
             ++i;
-        } else {
-            throw UsageError("unknown option " + words[i]);
         }
     }
     const bool fits = positions_.size() == positions || (orMore && positions_.size() > positions);

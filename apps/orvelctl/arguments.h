@@ -5,6 +5,7 @@
 #include <map>
 #include <stdexcept>
 #include <string>
+#include <string_view>
 #include <vector>
 
 namespace orvel::ctl {
@@ -17,10 +18,11 @@ class UsageError : public std::runtime_error {
 
 class Arguments {
  public:
-    // `valued` options take the next word ("--user alice"), `flags` none. Throws UsageError for an unknown option, a
-    // missing value, or another number of positions than `positions`; with `orMore` there may be more of them.
-    Arguments(const std::vector<std::string>& words, const std::vector<std::string>& valued,
-              const std::vector<std::string>& flags, size_t positions, bool orMore = false);
+    // The options are those of the command, of its form `form`, in the table (command.h). Throws UsageError for an
+    // unknown option, a missing value, or another number of positions than `positions`; with `orMore` there may be more
+    // of them.
+    Arguments(const std::vector<std::string>& words, std::string_view command, std::string_view form, size_t positions,
+              bool orMore = false);
 
     [[nodiscard]] const std::string& position(size_t index) const { return positions_[index]; }
     [[nodiscard]] const std::vector<std::string>& positions() const { return positions_; }

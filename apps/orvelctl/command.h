@@ -1,4 +1,4 @@
-// The commands of orvelctl, each in a file of its own name.
+// The commands of orvelctl, each in a file of its own name, and the table of them.
 #ifndef ORVEL_ORVELCTL_COMMAND_H
 #define ORVEL_ORVELCTL_COMMAND_H
 
@@ -21,6 +21,46 @@ int sharing(const std::vector<std::string>& words);
 int status(const std::vector<std::string>& words);
 int doctor(const std::vector<std::string>& words);
 int volumes(const std::vector<std::string>& words);
+int help(const std::vector<std::string>& words);
+int completion(const std::vector<std::string>& words);
+
+// The command line of a command, as it is parsed, explained and completed. There is no other list of options.
+struct Option {
+    const char* name;
+    const char* value;       // what stands behind it; "" for a flag. Words with "|" between them are all that it may be
+    const char* text;        // what it means
+    const char* forms = "";  // the forms that take it, separated by blanks; "" for all
+};
+
+struct Form {
+    const char* words;  // what stands behind the command: "create PATH". A first word in lower case is the form's name
+    const char* text = "";
+};
+
+struct Example {
+    const char* line;
+    const char* text;
+};
+
+struct Command {
+    const char* name;
+    int (*run)(const std::vector<std::string>&);
+    const char* summary;
+    std::vector<Form> forms;
+    std::vector<Option> options = {};
+    std::vector<Example> examples = {};
+    const char* notes = "";
+};
+
+const std::vector<Command>& commands();
+// Null when there is no command of that name.
+const Command* findCommand(std::string_view name);
+// The name of a form, "" when it has none.
+std::string nameOf(const Form& form);
+// Whether the form called `form` takes the option.
+bool takes(const Option& option, std::string_view form);
+// Takes the name of a form of the command from the front of `words`. Throws UsageError when it is none of them.
+std::string takeForm(std::string_view command, std::vector<std::string>& words);
 
 // Takes on the user's identity as a request would. Where this process is not root it stays what it is and says so. 0 or
 // a library code.

@@ -51,7 +51,7 @@ Json::Value jsonOf(const char* check, const Finding& finding) {
 }  // namespace
 
 int doctor(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {}, {"--json"}, 0);
+    const Arguments arguments(words, "doctor", "", 0);
     const bool json = arguments.has("--json");
     Json::Value all(Json::arrayValue);
     int problems = 0;

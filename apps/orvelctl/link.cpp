@@ -50,7 +50,7 @@ int broken(const cgi::LinkStore& store) {
 }
 
 int create(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {"--user", "--password", "--from", "--until"}, {"--propose"}, 1);
+    const Arguments arguments(words, "link", "create", 1);
     const std::string proposed = arguments.has("--propose") ? orvel::draw<kProposedBytes>() : "";
     if (arguments.has("--propose") && (proposed.empty() || arguments.has("--password"))) {
         throw UsageError("--propose draws a password, and --password gives one");
@@ -70,7 +70,7 @@ int create(const std::vector<std::string>& words) {
 }
 
 int list(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {"--user"}, {}, 0);
+    const Arguments arguments(words, "link", "list", 0);
     std::vector<cgi::Link> links;
     cgi::LinkStore store;
     if (!store.list(arguments.value("--user", ""), links)) return broken(store);
@@ -83,7 +83,7 @@ int list(const std::vector<std::string>& words) {
 }
 
 int revoke(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {"--user"}, {}, 1);
+    const Arguments arguments(words, "link", "revoke", 1);
     bool removed = false;
     cgi::LinkStore store;
     if (!store.remove(arguments.position(0), arguments.value("--user", ""), removed)) return broken(store);
@@ -94,12 +94,10 @@ int revoke(const std::vector<std::string>& words) {
 }  // namespace
 
 int link(const std::vector<std::string>& words) {
-    if (words.empty()) throw UsageError("link takes create, list or revoke");
-    const std::vector<std::string> rest(words.begin() + 1, words.end());
-    if (words[0] == "create") return create(rest);
-    if (words[0] == "list") return list(rest);
-    if (words[0] == "revoke") return revoke(rest);
-    throw UsageError("link takes create, list or revoke");
+    std::vector<std::string> rest = words;
+    const std::string form = takeForm("link", rest);
+    if (form == "create") return create(rest);
+    return form == "list" ? list(rest) : revoke(rest);
 }
 
 }  // namespace orvel::ctl

@@ -76,8 +76,7 @@ void printRows(const cgi::ListRequest& request, const cgi::Listing& listing, boo
 }  // namespace
 
 int ls(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {"--user", "--sort", "--offset", "--limit", "--additional", "--pattern", "--type"},
-                              {"--json", "--desc"}, 1);
+    const Arguments arguments(words, "ls", "", 1);
     const bool json = arguments.has("--json");
     const cgi::ListRequest request = {
         .user = arguments.required("--user"),

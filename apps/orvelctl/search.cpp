@@ -28,12 +28,6 @@ std::string optionOf(std::string criterion) {
     return "--" + criterion;
 }
 
-std::vector<std::string> valuedOptions() {
-    std::vector<std::string> options = {"--user", "--sort", "--offset", "--limit", "--additional"};
-    for (const std::string& criterion : cgi::criterionNames()) options.push_back(optionOf(criterion));
-    return options;
-}
-
 void takeCriteria(const Arguments& arguments, cgi::Criteria& criteria) {
     std::string culprit;
     const auto valueOf = [&](const std::string& criterion) { return arguments.value(optionOf(criterion), ""); };
@@ -113,7 +107,7 @@ int find(const cgi::ListRequest& request, const std::vector<std::string>& folder
 }  // namespace
 
 int search(const std::vector<std::string>& words) {
-    const Arguments arguments(words, valuedOptions(), {"--flat", "--json", "--desc"}, 1, true);
+    const Arguments arguments(words, "search", "", 1, true);
     const std::string user = arguments.required("--user");
     const cgi::ListRequest request = pageOf(arguments, user);
     cgi::Criteria criteria;

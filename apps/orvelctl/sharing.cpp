@@ -56,7 +56,7 @@ int setForUser(const std::string& user, const std::string& choice) {
 }
 
 int set(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {"--user"}, {}, 1);
+    const Arguments arguments(words, "sharing", "set", 1);
     const std::string& choice = arguments.position(0);
     if (arguments.has("--user")) return setForUser(arguments.required("--user"), choice);
     if (choice != "everybody" && choice != "admin_only" && choice != "per_user") {
@@ -68,12 +68,11 @@ int set(const std::vector<std::string>& words) {
 }  // namespace
 
 int sharing(const std::vector<std::string>& words) {
-    const std::string name = words.empty() ? "" : words[0];
-    const std::vector<std::string> rest(words.empty() ? words.end() : words.begin() + 1, words.end());
-    if (name == "set") return set(rest);
-    if (name == "get") return get(Arguments(rest, {}, {}, 1).position(0));
-    if (name == "list" && rest.empty()) return list();
-    throw UsageError("sharing takes set, get or list");
+    std::vector<std::string> rest = words;
+    const std::string form = takeForm("sharing", rest);
+    if (form == "set") return set(rest);
+    const Arguments arguments(rest, "sharing", form, form == "get" ? 1 : 0);
+    return form == "get" ? get(arguments.position(0)) : list();
 }
 
 }  // namespace orvel::ctl

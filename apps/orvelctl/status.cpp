@@ -65,7 +65,7 @@ void show(const Json::Value& figures) {
 }  // namespace
 
 int status(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {"--socket"}, {"--json"}, 0);
+    const Arguments arguments(words, "status", "", 0);
     const std::string socket = arguments.value("--socket", orveld::defaultSocket());
     std::string body, error;
     Json::Value figures;

@@ -20,7 +20,7 @@ void report(const VEXOVOLUMENOTE* note, void* /*argument*/) {
 }  // namespace
 
 int volumes(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {"--user"}, {}, 0);
+    const Arguments arguments(words, "volumes", "", 0);
     bool reported = false;
     const auto take = [](const VEXOVOLUMENOTE* note, void* flag) {
         *static_cast<bool*>(flag) = true;

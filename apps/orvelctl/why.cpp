@@ -96,7 +96,7 @@ void printReason(const PrivilegeReason& reason, bool mayList) {
 }  // namespace
 
 int why(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {"--user"}, {}, 1);
+    const Arguments arguments(words, "why", "", 1);
     const std::string user = arguments.required("--user");
     const std::string& path = arguments.position(0);
     int code = becomeUser(user, IsDirUserHome(path, nullptr));

@@ -149,17 +149,16 @@ int work(const SDK::Share& share, bool build, bool everything) {
 }  // namespace
 
 int index(const std::vector<std::string>& words) {
-    const Arguments arguments(words, {}, {"--full"}, 2);
-    const std::string& action = arguments.position(0);
-    const bool build = action == "build", update = action == "update";
-    if (!build && !update && action != "drop" && action != "status") throw UsageError("unknown action " + action);
-    if (arguments.has("--full") && !update) throw UsageError("--full goes with update");
+    std::vector<std::string> rest = words;
+    const std::string action = takeForm("index", rest);
+    const Arguments arguments(rest, "index", action, 1);
     if (geteuid() != 0 && action != "status") throw std::runtime_error("only root sees all that an index must hold");
-    const Share share(SDK::Share::LoadShare(arguments.position(1).c_str()));
-    if (share == nullptr) refuse(arguments.position(1), "no such share");
+    const std::string& name = arguments.position(0);
+    const Share share(SDK::Share::LoadShare(name.c_str()));
+    if (share == nullptr) refuse(name, "no such share");
     if (action == "status") return printStatus(*share);
     if (action == "drop") return drop(*share);
-    return work(*share, build, arguments.has("--full"));
+    return work(*share, action == "build", arguments.has("--full"));
 }
 
 }  // namespace orvel::ctl

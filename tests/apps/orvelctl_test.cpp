@@ -1,0 +1,110 @@
+// What the command-line tool says of itself: help, its exit status, completion.
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <sstream>
+
+#include "apps/program.h"
+#include "criteria.h"
+#include "support/testing.h"
+
+namespace {
+
+using Words = std::vector<std::string>;
+
+support::Finished orvelctl(Words words) {
+    words.insert(words.begin(), ORVELCTL);
+    return support::runProgram(words);
+}
+
+std::string helpOf(const std::string& command) {
+    const support::Finished finished = orvelctl({"help", command});
+    EXPECT_EQ(finished.status, 0) << command;
+    return finished.output;
+}
+
+Words commandNames() {
+    Words names;
+    std::istringstream lines(orvelctl({"--help"}).output);
+    for (std::string line; std::getline(lines, line);) {
+        if (line.starts_with("  ") && line[2] != ' ') names.push_back(line.substr(2, line.find(' ', 2) - 2));
+    }
+    return names;
+}
+
+TEST(Orvelctl, ExplainsEveryCommandWithExamplesThatItTakes) {
+    const Words names = commandNames();
+    EXPECT_GE(names.size(), 5U);
+    for (const std::string& name : names) {
+        const std::string help = helpOf(name);
+        EXPECT_EQ(orvelctl({name, "--help"}).output, help);
+        std::istringstream lines(help.substr(0, help.find("For example:")));
+        Words options;
+        for (std::string word; lines >> word;) options.push_back(word);
+        std::istringstream examples(help.substr(std::min(help.find("For example:"), help.size())));
+        for (std::string line; std::getline(examples, line);) {
+            std::istringstream words(line);
+            std::string word, command;
+            words >> word >> command;
+            if (word != "orvelctl" || command != name) continue;
+            while (words >> word) {
+                if (!word.starts_with("--")) continue;
+                EXPECT_NE(std::find(options.begin(), options.end(), word), options.end()) << line;
+            }
+        }
+    }
+}
+
+TEST(Orvelctl, OffersEverySearchCriterion) {
+    const std::string help = helpOf("search");
+    for (std::string name : orvel::cgi::criterionNames()) {
+        std::replace(name.begin(), name.end(), '_', '-');
+        EXPECT_NE(help.find("  --" + name + " "), std::string::npos) << name;
+    }
+}
+
+TEST(Orvelctl, TellsByItsStatusHowItWent) {
+    const struct {
+        Words words;
+        int status;
+    } rows[] = {{{"--version"}, 0},
+                {{}, 2},
+                {{"nonsense"}, 2},
+                {{"help", "nonsense"}, 2},
+                {{"ls"}, 2},
+                {{"ls", "/", "--user"}, 2},
+                {{"ls", "/photo", "--user", "nobody-of-this-name"}, 1},
+                {{"link"}, 2},
+                {{"link", "list", "--propose"}, 2},
+                {{"index", "build", "photo", "--full"}, 2},
+                {{"search", "/photo", "--user", "--help", "--name", "--help"}, 1},
+                {{"search", "/photo", "--help"}, 0}};
+    for (const auto& row : rows)
+        EXPECT_EQ(orvelctl(row.words).status, row.status) << ::testing::PrintToString(row.words);
+}
+
+TEST(Orvelctl, CompletesCommandLines) {
+    const struct {
+        const char* typed;  // words, the last one to be completed
+        const char* offered;
+    } rows[] = {{"orvelctl st", "status"},
+                {"orvelctl --ver", "--version"},
+                {"orvelctl --root / link re", "revoke"},
+                {"orvelctl link create --p", "--password --propose"},
+                {"orvelctl link list --p", ""},
+                {"orvelctl ls --type ", "dir file all"},
+                {"orvelctl search --type d", "dir"},
+                {"orvelctl ls --user link --s", "--sort"},
+                {"orvelctl sharing set per", "per_user"},
+                {"orvelctl help vol", "volumes"},
+                {"orvelctl ls --user roo", "root"},
+                {"orvelctl status --socket /usr/shar", "/usr/share"}};
+    for (const auto& row : rows) {
+        const std::string script = std::string("set -f; . <(") + ORVELCTL + " completion bash); line='" + row.typed +
+                                   "'; COMP_WORDS=($line); [[ $line != *' ' ]] || COMP_WORDS+=(''); set +f; " +
+                                   "COMP_CWORD=$((${#COMP_WORDS[@]} - 1)); _orvelctl; echo -n \"${COMPREPLY[*]}\"";
+        EXPECT_EQ(support::runProgram({"/bin/bash", "-c", script}).output, row.offered) << row.typed;
+    }
+}
+
+}  // namespace
