@@ -20,6 +20,7 @@
 
 #include "contest.h"
 #include "orvel/login_records.h"
+#include "vexo/process.h"
 
 namespace fs = std::filesystem;
 
@@ -71,6 +72,7 @@ void require(bool ok, const char* what) {
 }
 
 void checkByLibrary(int number) {
+    VEXORequestBegin();  // each check is one of a request of its own
     VEXO::WebCGI cgi;
     _tag_confirm_policy policy = {.flags = 15, .keepAccessTime = 0};
     char user[64];

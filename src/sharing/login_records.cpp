@@ -130,17 +130,44 @@ void appendJudged(LoginRecord record, const Check& check, std::string& out) {
     appendLoginRecord(record, out);
 }
 
+// Lines that stay as they are, one behind the other where they were read: appended as a whole.
+class UnchangedRun {
+ public:
+    explicit UnchangedRun(std::string& out) : out_(out) {}
+    void add(std::string_view line) {
+        if (line.data() != run_.data() + run_.size()) end();
+        run_ = run_.empty() ? line : std::string_view(run_.data(), run_.size() + line.size());
+    }
+    void end() {
+        out_ += run_;
+        run_ = {};
+    }
+
+ private:
+    std::string& out_;
+    std::string_view run_;
+};
+
 // What the file shall hold of these lines after the check.
 void sweep(std::string_view lines, const Check& check, int& answer, std::string& out) {
     out.clear();
     out.reserve(lines.size() + 64);
+    UnchangedRun run(out);
     for (LoginRecord record; nextLoginRecord(lines, kLongestCheckedLine, record);) {
-        if (matches(record, check)) {
-            if (judge(record, check, answer)) appendJudged(record, check, out);
-        } else if (!isStale(record, check)) {
+        const bool judged = matches(record, check);
+        if (judged ? !judge(record, check, answer) : isStale(record, check)) continue;
+        if (!judged && !record.line.empty()) {
+            run.add(record.line);
+            continue;
+        }
+        run.end();
+        if (judged) {
+            appendJudged(record, check, out);
+        } else {
             appendLoginRecord(record, out);
         }
     }
+    run.end();
 }
 
 int checkLocked(const Check& check) {
