@@ -15,7 +15,12 @@ export const MISSING = 408;
 
 export const PROGRAMS = "/cgi-bin/";
 
-function encodeParams(params) {
+// Who this page belongs to, "" before that is known, and what asks for the password again when nobody is logged in any
+// more: whether the request is worth sending again.
+export const session = { user: "", renew: async () => false };
+const MOST_RENEWED = 2;
+
+export function encodeParams(params) {
   const text = new URLSearchParams();
   for (const [name, value] of Object.entries(params)) {
     if (value === undefined || value === null) continue;
@@ -38,10 +43,23 @@ export async function post(program, params, signal) {
   return unwrap(await send(PROGRAMS + program, { method: "POST", body: encodeParams(params), signal }));
 }
 
-// The response, whatever its status.
+// The response, whatever its status. When the session has ended it waits for the password.
 export async function send(url, options) {
+  for (let renewed = 0; ; ++renewed) {
+    const response = await sendOnce(url, options);
+    if (response.status !== 401 || renewed === MOST_RENEWED || !(await session.renew())) return response;
+  }
+}
+
+// The server refuses what is meant for somebody else than who is logged in: another window may have changed that.
+export function headersOf() {
+  return session.user === "" ? {} : { "Orvel-User": encodeURIComponent(session.user) };
+}
+
+export async function sendOnce(url, options) {
+  const headers = { ...options?.headers, ...headersOf() };
   try {
-    return await fetch(url, { ...options, cache: "no-store", credentials: "same-origin" });
+    return await fetch(url, { ...options, headers, cache: "no-store", credentials: "same-origin" });
   } catch (failure) {
     if (failure.name === "AbortError") throw failure;
     throw new ApiError({ key: "page:unreachable" });

@@ -1,6 +1,6 @@
 // Where one is: the folder on screen, its listing, what is chosen in it.
 
-import { get, MISSING } from "./api.js";
+import { get, MISSING, session } from "./api.js";
 import { toast, toastFailure } from "./dialogs.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
@@ -38,7 +38,7 @@ let turn = 0;
 
 export async function loadShares() {
   const reply = await get("list", { action: "shares", additional: "perm,volume_status,mount_point_type,sync_share" });
-  browser.user = reply.user ?? "";
+  session.user = browser.user = reply.user ?? "";
   browser.shares = reply.items.map(entryOf);
   emit("shares");
 }

@@ -1,6 +1,7 @@
 // Starts the page.
 
 import { setupAccess } from "./access.js";
+import { setupAccount } from "./account.js";
 import { setupActivity } from "./activity.js";
 import {
   browser,
@@ -28,6 +29,7 @@ import { isSearch, normalisePlace, parentOf } from "./path.js";
 import { setupPathbar } from "./pathbar.js";
 import { setupPointer } from "./pointer.js";
 import { openSearch, searchFor, setupSearch } from "./search.js";
+import { setupSession } from "./session.js";
 import { setupSettings } from "./settings.js";
 import {
   emptyBin,
@@ -238,6 +240,8 @@ async function start() {
   setupFind();
   setupSidebar();
   setupSettings();
+  setupAccount();
+  setupSession();
   setupSearch();
   setupActivity();
   setupDragAndDrop();

@@ -9,7 +9,7 @@ function closeMenu() {
   current?.close();
 }
 
-// items: {label, icon, shortcut, run, disabled, danger, checked} or "-".
+// items: {label, icon, shortcut, run, disabled, danger, checked}, {heading} or "-".
 export function openMenu(items, { x, y, anchor = null }) {
   closeMenu();
   const before = document.activeElement;
@@ -27,7 +27,8 @@ export function openMenu(items, { x, y, anchor = null }) {
     if (!menu.contains(event.target)) close(false);
   };
   for (const item of items.filter((one, i) => one !== "-" || (i > 0 && items[i - 1] !== "-" && i < items.length - 1))) {
-    menu.append(item === "-" ? h("hr") : itemNode(item, close));
+    if (item.heading) menu.append(h("div.menu-heading", { role: "presentation" }, item.heading));
+    else menu.append(item === "-" ? h("hr") : itemNode(item, close));
   }
   menu.addEventListener("keydown", (event) => keydown(event, menu, close));
   menu.addEventListener("contextmenu", (event) => event.preventDefault());

@@ -1,6 +1,6 @@
 // Whether the server can be reached, for what waits until it can.
 
-import { send, urlOf } from "./api.js";
+import { sendOnce, session, urlOf } from "./api.js";
 
 const PAUSES = [1000, 2000, 4000, 8000, 15000];
 const AWAY = new Set(["page:unreachable", "page:upload_broken"]);
@@ -41,7 +41,9 @@ function pause(length) {
 
 async function answers() {
   try {
-    const { status } = await send(urlOf("list", { action: "shares", limit: 1 }));
+    const { status } = await sendOnce(urlOf("list", { action: "shares", limit: 1 }));
+    // A large body is cut off where nobody is logged in, and looks like a connection that broke.
+    if (status === 401) return await session.renew();
     return !GATEWAY.has(status);
   } catch {
     return false;

@@ -41,12 +41,13 @@ export function setupSettings() {
   button.addEventListener("click", () =>
     openMenu(
       [
+        { heading: t("settings.colours") },
         ...THEMES.map((theme) => ({
           label: t(`theme.${theme}`),
           checked: pref("theme", "system") === theme,
           run: () => setTheme(theme),
         })),
-        "-",
+        { heading: t("settings.language") },
         ...Object.entries(LANGUAGES).map(([tag, name]) => ({
           label: name,
           checked: tag === language,

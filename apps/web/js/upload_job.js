@@ -1,6 +1,6 @@
 // One file on its way to the server. A connection that breaks is waited for; nothing is stored twice.
 
-import { ApiError, readReply, urlOf } from "./api.js";
+import { ApiError, headersOf, readReply, session, urlOf } from "./api.js";
 import { askConflict, cannotReplace } from "./conflicts.js";
 import { isUnreachable, untilReachable } from "./network.js";
 import { childOf, encodeName, lastOf, nameOf, parentOf, splitExtension } from "./path.js";
@@ -97,9 +97,10 @@ export class Job {
         // The try before may have arrived whole, and only its answer got lost.
         if (failure.code === EXISTS && tries > 1 && (await this.found()).size === this.file.size) return this.stored();
         inVain = this.loaded > 0 ? 0 : inVain + 1;
-        if (!isUnreachable(failure) || tries === MOST_TRIES || inVain === MOST_IN_VAIN) throw failure;
+        const out = failure.key === "page:logged_out";
+        if (!(out || isUnreachable(failure)) || tries === MOST_TRIES || inVain === MOST_IN_VAIN) throw failure;
         this.loaded = 0;
-        await this.batch.pauseFor(untilReachable());
+        if (!(await this.batch.pauseFor(out ? session.renew() : untilReachable())) && out) throw failure;
         if (this.state === "cancelled") return undefined;
       }
     }
@@ -117,6 +118,7 @@ export class Job {
       this.request = request;
       request.open("PUT", urlOf("upload", { path_raw: this.id, overwrite }));
       request.setRequestHeader("Content-Type", "application/octet-stream");
+      for (const [name, value] of Object.entries(headersOf())) request.setRequestHeader(name, value);
       request.upload.addEventListener("progress", (event) => {
         this.loaded = event.loaded;
         this.batch.paintSoon();

@@ -7,7 +7,7 @@ import { takenNames } from "./conflicts.js";
 import { toastFailure } from "./dialogs.js";
 import { h } from "./dom.js";
 import { describe } from "./errors.js";
-import { emit } from "./events.js";
+import { emit, on } from "./events.js";
 import { formatDuration, formatSize } from "./format.js";
 import { childOf, decode, encodeName } from "./path.js";
 import { labelOf } from "./pathbar.js";
@@ -113,9 +113,10 @@ class Batch {
   async pauseFor(waiting) {
     ++this.paused;
     this.paintSoon();
-    await waiting;
+    const outcome = await waiting;
     --this.paused;
     this.paintSoon();
+    return outcome;
   }
 
   cancel() {
@@ -189,6 +190,13 @@ function failureOf(job) {
   return { id: job.id, path, ...describe(job.failure, path) };
 }
 
+// Somebody else is logged in: what waits is theirs no more than it can be sent.
+let over = false;
+on("start-anew", () => {
+  over = true;
+  for (const job of queue.splice(0)) job.cancel();
+});
+
 export function uploadsRunning() {
-  return running + queue.length > 0;
+  return !over && running + queue.length > 0;
 }
