@@ -192,6 +192,31 @@ TEST_F(UploadCgi, AFormBringsSeveralFiles) {
     for (const std::string& name : namesIn(root + "/sub")) expectOwned(root + "/sub/" + name, kAliceUid, 0644);
 }
 
+TEST_F(UploadCgi, FilesKeepTheirTimes) {
+    const std::string root = shareRoot("photo");
+    const auto modified = [&](const std::string& name) {
+        struct stat status {};
+        EXPECT_EQ(stat((root + "/" + name).c_str(), &status), 0) << name;
+        return status.st_mtime;
+    };
+    const time_t before = time(nullptr);
+    EXPECT_EQ(code(put("alice", "/photo/a", "1", "error&mtime=1000000000")), 0);
+    EXPECT_EQ(modified("a"), 1000000000);
+    EXPECT_EQ(code(put("alice", "/photo/a", "2", "overwrite&mtime=4294967295")), 0);
+    EXPECT_EQ(modified("a"), 4294967295);
+    for (const char* bad : {"4294967296", "-1", "1.5", "x"}) {
+        EXPECT_EQ(put("alice", "/photo/a", "3", std::string("overwrite&mtime=") + bad).status, 400) << bad;
+    }
+    EXPECT_EQ(readFile(root + "/a"), "2");
+    EXPECT_EQ(code(post("alice", "path=/photo",
+                        part("name=mtime", "7") + part("name=f; filename=b", "") + part("name=f; filename=c", "") +
+                            part("name=mtime", "9") + part("name=f; filename=d", "") + "--XX--\r\n")),
+              0);
+    EXPECT_EQ(modified("b"), 7);
+    EXPECT_GE(modified("c"), before) << "a time is that of one file";
+    EXPECT_EQ(modified("d"), 9);
+}
+
 TEST_F(UploadCgi, ABrokenFormKeepsOnlyItsWholeFiles) {
     const std::string root = shareRoot("photo");
     const std::string file = part("name=a; filename=\"one\"", "1");

@@ -7,6 +7,7 @@
 // And for both:
 //   overwrite        "error" (default), "skip" or "overwrite": what an existing file means
 //   taskid           a search whose results shall show the files
+//   mtime            seconds: when the file was modified; in a form a field ahead of each file that has one
 //
 // "data" of the reply is {"files":[{"path","size","skipped"}]}. The first file that cannot be stored ends the request;
 // those before it stay, and are listed in "data" beside the error. Folders that do not exist are made.
@@ -17,6 +18,7 @@
 #include <cerrno>
 #include <cstdint>
 #include <cstdlib>
+#include <ctime>
 #include <memory>
 #include <optional>
 #include <string>
@@ -48,6 +50,15 @@ std::optional<_tag__type_> modeOf(const std::string& word) {
 
 bool isNoneOrTask(const std::string& search) {
     return search.empty() || isTaskId(search);
+}
+
+// The time that was asked for, none for ""; false for what is no time.
+bool modifiedOf(const std::string& text, std::optional<time_t>& modified) {
+    modified.reset();
+    if (text.empty()) return true;
+    const auto number = parseNumber(text);
+    if (number && *number <= UINT32_MAX) modified = static_cast<time_t>(*number);
+    return modified.has_value();
 }
 
 struct Outcome {
@@ -97,11 +108,12 @@ void storeRaw(const User& user, const VEXO::WebCGI& web, long long length, Outco
     const auto path = pathParam(web);
     const auto mode = modeOf(web.GetParam("overwrite", "error"));
     const std::string search = web.GetParam("taskid", "");
-    if (!path || !mode || !isNoneOrTask(search)) {
+    std::optional<time_t> modified;
+    if (!path || !mode || !isNoneOrTask(search) || !modifiedOf(web.GetParam("mtime", ""), modified)) {
         outcome.fail(ORV_ERR_PARAMETER, web.GetParam("path", ""), Status::kBadRequest);
         return;
     }
-    Upload upload(user, *path, *mode, search);
+    Upload upload(user, *path, *mode, search, modified);
     int code = upload.begin();
     bool whole = false;
     if (code == ORV_ERR_NONE) {
@@ -130,10 +142,13 @@ class FormStore final : public PartSink {
         value_.clear();
         if (!header.isFile || header.fileName.empty()) return true;  // a form's file field that was left empty
         const auto mode = modeOf(mode_);
-        const bool usable = folder_ && !folder_->empty() && mode && isNoneOrTask(search_);
+        std::optional<time_t> modified;
+        const bool usable =
+            folder_ && !folder_->empty() && mode && isNoneOrTask(search_) && modifiedOf(mtime_, modified);
         if (!usable) return outcome_.refuse(CGI_UPLOAD_FIELD, folder_.value_or(""));
         const char* separator = folder_->ends_with('/') ? "" : "/";
-        upload_ = std::make_unique<Upload>(user_, *folder_ + separator + header.fileName, *mode, search_);
+        upload_ = std::make_unique<Upload>(user_, *folder_ + separator + header.fileName, *mode, search_, modified);
+        mtime_.clear();
         return proceed(upload_->begin());
     }
 
@@ -156,6 +171,7 @@ class FormStore final : public PartSink {
         if (field_ == "path_raw") folder_ = percentDecode(value_);
         if (field_ == "overwrite") mode_ = value_;
         if (field_ == "taskid") search_ = value_;
+        if (field_ == "mtime") mtime_ = value_;
         return true;
     }
 
@@ -165,6 +181,7 @@ class FormStore final : public PartSink {
     const User& user_;
     std::optional<std::string> folder_;
     std::string mode_, search_;
+    std::string mtime_;  // of the next file
     Outcome& outcome_;
     std::string field_, value_;
     std::unique_ptr<Upload> upload_;

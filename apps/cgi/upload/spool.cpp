@@ -5,6 +5,7 @@
 #include <sys/file.h>
 #include <sys/stat.h>
 
+#include <array>
 #include <cerrno>
 #include <ctime>
 
@@ -103,6 +104,11 @@ int Spool::write(std::string_view data) {
         size_ += written;
     }
     return ORV_ERR_NONE;
+}
+
+bool Spool::setModified(time_t time) const {
+    const std::array<timespec, 2> times = {{{.tv_sec = 0, .tv_nsec = UTIME_OMIT}, {.tv_sec = time, .tv_nsec = 0}}};
+    return futimens(file_->get(), times.data()) == 0;
 }
 
 std::string Spool::publish() {

@@ -2,6 +2,7 @@
 #ifndef ORVEL_CGI_UPLOAD_SPOOL_H
 #define ORVEL_CGI_UPLOAD_SPOOL_H
 
+#include <ctime>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -27,6 +28,8 @@ class Spool {
     int open(const std::string& volumePath);
     // Appends. 0 or a library code.
     int write(std::string_view data);
+    // The finished file's time of modification. False with errno.
+    [[nodiscard]] bool setModified(time_t time) const;
     // A path under which the finished file can be read; "" with errno on failure. It is gone with this object.
     std::string publish();
     [[nodiscard]] long long size() const { return size_; }

@@ -93,6 +93,7 @@ int Upload::write(std::string_view data) {
 // Gives the data its place, as the mode says. Unless an existing file may be replaced, what came into being since
 // begin() is not replaced either.
 int Upload::put(const Target& target) {
+    if (modified_ && !spool_.setModified(*modified_)) return uploadCodeOf(errno);
     const std::string source = spool_.publish(), place = target.folder.path(target.name);
     if (source.empty()) return uploadCodeOf(errno);
     if (mode_ == OVERWRITE_MODE_OVERWRITE) {
@@ -100,6 +101,7 @@ int Upload::put(const Target& target) {
         return MoveFile(user_.name.c_str(), source.c_str(), place.c_str(), isCancelled) ? ORV_ERR_NONE : lastCode();
     }
     VEXOCOPYOPT options = {.uid = 0, .gid = 0, .isCancelled = isCancelled, .switches = VEXO_COPY_TAKE | VEXO_COPY_SYNC};
+    if (modified_) options.switches |= VEXO_COPY_KEEP_TIMES;
     if (VEXOUserGetUGID(user_.name.c_str(), &options.uid, &options.gid) != 0) return ORV_ERR_GENERAL;
     if (VEXOFileCopy(source.c_str(), place.c_str(), &options) == 0) return ORV_ERR_NONE;
     skipped_ = errno == EEXIST && mode_ == OVERWRITE_MODE_SKIP;

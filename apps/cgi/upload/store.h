@@ -2,6 +2,8 @@
 #ifndef ORVEL_CGI_UPLOAD_STORE_H
 #define ORVEL_CGI_UPLOAD_STORE_H
 
+#include <ctime>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -20,9 +22,10 @@ int isCancelled();
 // which the object is only destroyed; nothing is left behind then.
 class Upload {
  public:
-    // `search`: task id of a search whose results shall show the file, "" for none.
-    Upload(const User& user, std::string path, _tag__type_ mode, std::string search)
-        : user_(user), path_(std::move(path)), mode_(mode), search_(std::move(search)) {}
+    // `search`: task id of a search whose results shall show the file, "" for none. `modified`: the file's time of
+    // modification, now without one.
+    Upload(const User& user, std::string path, _tag__type_ mode, std::string search, std::optional<time_t> modified)
+        : user_(user), path_(std::move(path)), mode_(mode), search_(std::move(search)), modified_(modified) {}
 
     // Asks every rule and takes on the user's identity.
     int begin();
@@ -43,6 +46,7 @@ class Upload {
     std::string path_;
     _tag__type_ mode_;
     std::string search_;
+    std::optional<time_t> modified_;
     bool skipped_ = false;
     PathInfo info_;
     Spool spool_;
