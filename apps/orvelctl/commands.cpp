@@ -129,7 +129,8 @@ const std::vector<Command>& table() {
          .run = completion,
          .summary = "prints what a shell needs in order to complete command lines",
          .forms = {{"bash|zsh"}},
-         .examples = {{". <(orvelctl completion bash)", "for this shell; packages install it"}}},
+         .examples = {{". <(orvelctl completion bash)", "for this shell; packages install it for all"},
+                      {". <(orvelctl completion zsh)", "in .zshrc, behind compinit"}}},
     };
     return all;
 }

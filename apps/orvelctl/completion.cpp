@@ -134,8 +134,7 @@ int completion(const std::vector<std::string>& words) {
     const Arguments arguments(words, "completion", "", 1);
     const std::string& shell = arguments.position(0);
     if (shell != "bash" && shell != "zsh") throw UsageError("completion is for bash or zsh");
-    // zsh names its functions by their files: this is to be one called _orvelctl in its function path.
-    if (shell == "zsh") printf("#compdef orvelctl\nautoload -Uz bashcompinit && bashcompinit\n");
+    if (shell == "zsh") printf("autoload -Uz bashcompinit && bashcompinit\n");
     printBash();
     return 0;
 }
