@@ -1,6 +1,6 @@
 // What goes wrong is said with its name, waited for or tried again; what went well leaves.
 import assert from "node:assert/strict";
-import { chmodSync, existsSync, mkdirSync, mkdtempSync, readdirSync, rmSync, writeFileSync } from "node:fs";
+import { chmodSync, existsSync, mkdirSync, mkdtempSync, readFileSync, readdirSync, rmSync, statSync, utimesSync, writeFileSync } from "node:fs";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
@@ -37,10 +37,15 @@ test("a connection that breaks: the queue waits and goes on, the list stays", ()
         if (request.postData()?.includes("action=present")) ++questions;
       });
       await page.route("**/cgi-bin/**", async (route) => {
-        const isFile = route.request().method() === "PUT";
-        if (isFile && ++sent === 4) {
-          // It arrives, and only its answer is lost. What the page sends of a file cannot be seen here.
-          await route.fetch({ postData: /photo \d+/.exec(decodeURIComponent(decodeURIComponent(route.request().url())))[0] });
+        // What comes together in one form arrives, and only its answer is lost. The page's body cannot be seen here.
+        if (route.request().url().includes("/upload") && ++sent === 1) {
+          for (const name of readdirSync(join(files, "trip/a")).filter((one) => one !== "b"))
+            await page.context().request.fetch(`${URL_OF_PAGE}cgi-bin/upload`, {
+              method: "PUT",
+              params: { path: `/projects/trouble/in/trip/a/${name}` },
+              data: readFileSync(join(files, "trip/a", name)),
+              headers: { Origin: new URL(URL_OF_PAGE).origin },
+            });
           away = true;
         }
         return away ? route.abort("connectionreset") : route.continue();
@@ -79,6 +84,22 @@ test("a file that is refused: its name, the advice, once more", () =>
     await failed.locator("text=Try again").click();
     await wentWell(page, "1 file uploaded");
     assert.ok(existsSync(`${projects}/trouble/in/thing`));
+
+    // One of several that go together: the others arrive, with their times.
+    let requests = 0;
+    page.on("request", (request) => {
+      requests += request.url().includes("/upload");
+    });
+    const names = ["a.txt", "b:b.txt", "c.txt", "d.txt"];
+    for (const name of names) writeFileSync(join(files, name), name);
+    utimesSync(join(files, "c.txt"), 1e9, 1e9);
+    await upload(page, "Upload files", names.map((name) => join(files, name)));
+    await failed.locator("text=3 files uploaded").waitFor();
+    assert.equal(requests, 3); // all, the refused one alone, those behind it
+    assert.equal(statSync(`${projects}/trouble/in/c.txt`).mtimeMs, 1e12);
+    await failed.locator("li:has-text('b:b.txt') >> text=Try again").click();
+    await failed.locator("text=3 files uploaded").waitFor();
+    assert.equal(requests, 4);
   }));
 
 test("a file and a folder of one name: neither replaces the other", () =>

@@ -98,12 +98,19 @@ export class Card {
     this.note.textContent = note;
   }
 
-  // list: {id, path, title, hint, why} of each failure; advice that is the same is given once.
+  // list: {id, path, title, hint, why, again} of each failure; advice that is the same is given once.
   showErrors(list, leftOut = 0) {
     this.errors.hidden = list.length === 0;
     const shown = list.slice(0, MOST_ERRORS);
-    const lines = shown.map(({ id, path, title, why }) =>
-      h("li", { title: plainName(path) }, title, why && h("button.link", { type: "button", onclick: () => showWhyOf(id) }, t("why.ask"))),
+    const link = (text, run) => h("button.link", { type: "button", onclick: run }, text);
+    const lines = shown.map(({ id, path, title, why, again }) =>
+      h(
+        "li",
+        { title: plainName(path) },
+        title,
+        why && link(t("why.ask"), () => showWhyOf(id)),
+        again && link(t("state.retry"), again),
+      ),
     );
     const more = leftOut + list.length - shown.length;
     if (more > 0) lines.push(h("li", {}, t("activity.more_errors", { count: more })));

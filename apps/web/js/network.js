@@ -4,12 +4,24 @@ import { sendOnce, session, urlOf } from "./api.js";
 
 const PAUSES = [1000, 2000, 4000, 8000, 15000];
 const AWAY = new Set(["page:unreachable", "page:upload_broken"]);
+const LOGGED_OUT = "page:logged_out";
 const GATEWAY = new Set([502, 503, 504]); // the web server is there, what answers behind it is not
 let waiting = null;
 
 // A failure that passes: nothing is wrong with what was asked.
 export function isUnreachable(failure) {
   return AWAY.has(failure.key) || (failure.key === "page:bad_reply" && GATEWAY.has(failure.code));
+}
+
+// Also where only the log-in is missing. untilServed() resolves with whether it can be asked again.
+export function isPassing(failure) {
+  return failure.key === LOGGED_OUT || isUnreachable(failure);
+}
+
+export async function untilServed({ key }) {
+  if (key !== LOGGED_OUT) await untilReachable();
+  else return session.renew().catch(() => untilReachable().then(() => true));
+  return true;
 }
 
 // Asks from time to time, and at once when the browser has a network again. Everybody waits for the same answer.

@@ -1,10 +1,10 @@
 // One file on its way to the server. A connection that breaks is waited for; nothing is stored twice.
 
-import { ApiError, headersOf, readReply, session, urlOf } from "./api.js";
 import { askConflict, cannotReplace } from "./conflicts.js";
-import { isUnreachable, untilReachable } from "./network.js";
+import { isPassing, isUnreachable, untilServed } from "./network.js";
 import { childOf, encodeName, lastOf, nameOf, parentOf, splitExtension } from "./path.js";
 import { entryAt } from "./sources.js";
+import { modifiedOf, sendFiles } from "./upload_request.js";
 
 const EXISTS = 414;
 const MOST_TRIES = 20;
@@ -16,11 +16,18 @@ export class Job {
     const id = parts.reduce((folder, part) => childOf(folder, encodeName(part)), batch.target);
     Object.assign(this, { batch, file, parts, id, name: lastOf(id) });
     this.meets = null; // what has its name already
+    this.alone = false; // not with others in one request
+    this.sent = false; // it may have arrived before
     this.reset();
   }
 
   reset() {
     Object.assign(this, { state: "waiting", loaded: 0, failure: null });
+  }
+
+  // What went with others comes to the queue again.
+  again() {
+    if (this.state === "running") this.reset();
   }
 
   get pair() {
@@ -95,47 +102,38 @@ export class Job {
         return await this.put(overwrite);
       } catch (failure) {
         // The try before may have arrived whole, and only its answer got lost.
-        if (failure.code === EXISTS && tries > 1 && (await this.found()).size === this.file.size) return this.stored();
+        if (failure.code === EXISTS && this.sent && (await this.found()).size === this.file.size) return this.stored();
         inVain = this.loaded > 0 ? 0 : inVain + 1;
-        const out = failure.key === "page:logged_out";
-        if (!(out || isUnreachable(failure)) || tries === MOST_TRIES || inVain === MOST_IN_VAIN) throw failure;
+        if (!isPassing(failure) || tries === MOST_TRIES || inVain === MOST_IN_VAIN) throw failure;
+        this.sent ||= isUnreachable(failure);
         this.loaded = 0;
-        if (!(await this.batch.pauseFor(out ? session.renew() : untilReachable())) && out) throw failure;
+        if (!(await this.batch.pauseFor(untilServed(failure)))) throw failure;
         if (this.state === "cancelled") return undefined;
       }
     }
   }
 
   stored() {
+    if (this.state === "cancelled") return;
     this.loaded = this.file.size;
     this.state = "done";
   }
 
-  // What fetch() cannot: tell how far the body is.
-  put(overwrite) {
-    return new Promise((resolve, reject) => {
-      const request = new XMLHttpRequest();
-      this.request = request;
-      request.open("PUT", urlOf("upload", { path_raw: this.id, overwrite }));
-      request.setRequestHeader("Content-Type", "application/octet-stream");
-      for (const [name, value] of Object.entries(headersOf())) request.setRequestHeader(name, value);
-      request.upload.addEventListener("progress", (event) => {
-        this.loaded = event.loaded;
+  async put(overwrite) {
+    const reply = await sendFiles({
+      method: "PUT",
+      params: { path_raw: this.id, overwrite, mtime: modifiedOf(this.file) },
+      type: "application/octet-stream",
+      body: this.file,
+      onBegin: (request) => {
+        this.request = request;
+      },
+      onProgress: ({ loaded }) => {
+        this.loaded = loaded;
         this.batch.paintSoon();
-      });
-      request.addEventListener("load", () => {
-        try {
-          readReply(request.status, request.responseText);
-          this.stored();
-          resolve();
-        } catch (failure) {
-          reject(failure);
-        }
-      });
-      request.addEventListener("error", () => reject(new ApiError({ key: "page:upload_broken" })));
-      request.addEventListener("abort", () => resolve());
-      request.send(this.file);
+      },
     });
+    if (reply) this.stored();
   }
 
   cancel() {

@@ -14,6 +14,7 @@ import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
 import { fromInput } from "./upload_files.js";
 import { Job } from "./upload_job.js";
+import { takePack } from "./upload_pack.js";
 
 const AT_ONCE = 3;
 const EXISTS = 414;
@@ -43,12 +44,16 @@ export async function startUpload(found, target) {
 
 function pump() {
   while (running < AT_ONCE && queue.length > 0) {
-    const job = queue.shift();
-    if (job.state !== "waiting") continue;
+    if (queue[0].state !== "waiting") {
+      queue.shift();
+      continue;
+    }
+    const next = takePack(queue) ?? queue.shift();
     ++running;
-    job.run().finally(() => {
+    next.run().then((left = []) => {
       --running;
-      job.batch.paintSoon();
+      queue.unshift(...left);
+      next.batch.paintSoon();
       pump();
     });
   }
@@ -102,21 +107,23 @@ class Batch {
     pump();
   }
 
-  // What failed, once more.
-  retry() {
-    const failed = this.jobs.filter((job) => job.state === "failed");
+  // What failed, once more: one file, or all of them.
+  retry(jobs = this.jobs) {
+    const failed = jobs.filter((job) => job.state === "failed");
     for (const job of failed) job.reset();
-    this.card.begin();
+    if (this.card.finished) this.card.begin();
     this.enqueue(failed);
   }
 
   async pauseFor(waiting) {
     ++this.paused;
     this.paintSoon();
-    const outcome = await waiting;
-    --this.paused;
-    this.paintSoon();
-    return outcome;
+    try {
+      return await waiting;
+    } finally {
+      --this.paused;
+      this.paintSoon();
+    }
   }
 
   cancel() {
@@ -139,7 +146,7 @@ class Batch {
       loaded += ["running", "waiting"].includes(job.state) ? job.loaded : job.file.size;
     }
     const failed = this.jobs.filter((job) => job.state === "failed");
-    this.card.showErrors(failed.map((job) => failureOf(job)));
+    this.card.showErrors(failed.map((job) => this.failureOf(job)));
     if (states.waiting + states.running > 0) this.paintRunning(states, loaded);
     else this.finish(states);
   }
@@ -173,6 +180,12 @@ class Batch {
     this.card.finish(kind, text, actions.filter(Boolean));
   }
 
+  failureOf(job) {
+    const path = decode(job.id);
+    const again = this.jobs.length > 1 ? () => this.retry([job]) : null; // else the card's own button does
+    return { id: job.id, path, ...describe(job.failure, path), again };
+  }
+
   // The list follows, though not at every file.
   changed(wait) {
     if (wait > 0 && this.timer) return;
@@ -183,11 +196,6 @@ class Batch {
       if (browser.id === this.target) refresh();
     }, wait);
   }
-}
-
-function failureOf(job) {
-  const path = decode(job.id);
-  return { id: job.id, path, ...describe(job.failure, path) };
 }
 
 // Somebody else is logged in: what waits is theirs no more than it can be sent.
