@@ -11,20 +11,21 @@
 #include <ctime>
 #include <filesystem>
 #include <fstream>
-#include <random>
 
 #include "contest.h"
+#include "household.h"
 #include "vexo/index.h"
 
 namespace {
 
 using Cond = __tag_FI_SQL_COND;
 using Data = __tag_FI_FILE_INFO_DATA;
+using bench::Files;
+using bench::kShare;
 using Clock = std::chrono::steady_clock;
 
 constexpr int kNames = 1000000;
 constexpr int kMatches = 300000;
-constexpr const char* kShare = "photo";
 
 double since(Clock::time_point start) {
     return std::chrono::duration<double, std::milli>(Clock::now() - start).count();
@@ -39,77 +40,12 @@ void need(bool done, const char* what) {
     if (!done) give(what);
 }
 
-// The files of a household: photographs, documents of several words, music; the same at each run.
-class Files {
- public:
-    Files() {
-        static constexpr std::array<const char*, 24> syllables = {
-            "ba",  "re", "ti",  "mo", "lun", "ker",       "sa",  "vi",  "do", "pha", "gro", "nel",
-            "ist", "ur", "che", "wa", "zo",  "f\xC3\xBC", "jel", "que", "ro", "mi",  "ten", "al"};
-        for (int i = 0; i < 4000; ++i) {
-            std::string word;
-            for (unsigned j = 0; j < 2 + random_() % 3; ++j) word += syllables[random_() % syllables.size()];
-            words_.push_back(word);
-        }
-    }
-    // Calls `take` with `count` records.
-    template <class Take>
-    void make(int count, Take take) {
-        std::string folder;
-        for (int i = 0; i < count; ++i) {
-            if (i % 60 == 0) folder = word() + std::to_string(i / 6000) + "/" + word() + "_" + std::to_string(i / 60);
-            const std::string name = nameOf(i);
-            const std::string path = folder + "/" + name;
-            const std::string extension = name.substr(name.rfind('.') + 1);
-            Data data{};
-            data.szShareRoot = "/volume1/photo";
-            data.szShare = kShare;
-            data.szName = name.c_str();
-            data.szPath = path.c_str();
-            data.szParent = folder.c_str();
-            data.szExtension = extension.c_str();
-            data.szPermission = "rw-r--r--";
-            data.szOwner = "alice";
-            data.szGroup = "users";
-            data.size = static_cast<int64_t>(random_() % 100000000);
-            data.created = data.changed = data.accessed = data.modified =
-                1700000000 + static_cast<int>(random_() % 50000000);
-            data.mode = 0644;
-            data.uid = 20001;
-            data.gid = 20100;
-            take(data);
-        }
-    }
-
- private:
-    const std::string& word() { return words_[random_() % words_.size()]; }
-    std::string nameOf(int i) {
-        switch (random_() % 3) {
-            case 0:
-                return "IMG_" + std::to_string(20080000 + i % 150000) + "_" + std::to_string(i) + ".JPG";
-            case 1:
-                return word() + " " + word() + (random_() % 2 == 0 ? "" : " final") + " " + std::to_string(i % 1000) +
-                       ".pdf";
-            default:
-                return std::to_string(i % 20) + " - " + word() + " " + word() + ".mp3";
-        }
-    }
-    std::mt19937 random_{1};
-    std::vector<std::string> words_;
-};
-
 Cond nameCondition(const std::string& pattern) {
     Cond cond{};
     cond.type = FI_COL_NAME;
     cond.op = FI_OP_WILDCARD;
     snprintf(cond.szValue, sizeof cond.szValue, "%s", pattern.c_str());
     return cond;
-}
-
-void prepareRoot(const std::string& folder) {
-    const std::string root = folder + "/root";
-    std::filesystem::create_directories(root + "/etc/vexo");
-    std::ofstream(root + "/etc/vexo/shares.conf") << "[photo]\npath = /volume1/photo\nvexo:index = yes\n";
 }
 
 // Fills a share's index, a result database and a plain list with the same names.
@@ -283,8 +219,7 @@ int main(int argc, char** argv) {
     if (argc == 5 && strcmp(argv[1], "--") == 0) return runAs(argv[2], argv[3], argv[4]);
     std::string folder = std::string(argc > 1 ? argv[1] : "/tmp") + "/index-bench-XXXXXX";
     need(mkdtemp(folder.data()) != nullptr, "making a folder");
-    prepareRoot(folder);
-    setenv("VEXO_ROOT", (folder + "/root").c_str(), 1);
+    bench::prepareRoot(folder);
     const int rounds = argc > 2 ? static_cast<int>(strtol(argv[2], nullptr, 10)) : 7;
     const std::string self = std::filesystem::read_symlink("/proc/self/exe");
     const std::string results = folder + "/results";

@@ -129,6 +129,22 @@ TEST_F(Index, AnUpdateMakesWhatABuildWouldMake) {
     expectTruth("compared in full");
 }
 
+TEST_F(Index, OneThatCannotBeUsedIsBuiltAnew) {
+    SKIP_WITHOUT_ROOT();
+    file("/in/f");
+    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    const std::string store = systemRoot() + "/var/lib/vexo/index/photo.db";
+    const std::string good = readFile(store);
+    std::string other = good;  // of a version that called a column otherwise
+    other.replace(other.find(",highest "), 9, ",hiqhest ");
+    for (const std::string& bad : {other, std::string("text"), good.substr(0, 8192), std::string()}) {
+        writeFile(store, bad, 0600);
+        expectTruth("walked");
+        EXPECT_NE(run({"index", "update", "photo"}).output.find("is built anew"), std::string::npos) << bad.size();
+        EXPECT_EQ(update(), "compared 1; 0 entries added, 0 changed, 0 removed\n") << bad.size();
+    }
+}
+
 TEST_F(Index, NetworkMountsStayOut) {
     SKIP_WITHOUT_ROOT();
     file("/local/f");

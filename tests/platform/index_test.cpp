@@ -29,7 +29,10 @@ std::vector<Record> manyRecords() {
                                             "nul\xC0\x80in",
                                             "\xED\xA0\x80surrogate",
                                             "*",
-                                            "?x?"};
+                                            "?x?",
+                                            "end.\xED\xA0\x80",
+                                            "two.A.b",
+                                            "dot."};
     std::vector<Record> records;
     unsigned i = 0;
     for (const char* folder : {"", "2012/", "2012/a/", "2012b/", "20_2/", "*/", "\xFF/"}) {
@@ -60,12 +63,13 @@ class Criteria {
         static const std::vector<const char*> operators = {"before", "after", "equal", "less", "more"};
         static const std::vector<const char*> numbers = {
             "0", "500", "1300", "9223372036854775700", "99999999999999999999", "x"};
+        static const std::vector<const char*> extensions = {"jpg,pdf", "txt", "", "JPG,,\xED\xA0\x81,p?f", "a.b,x,b.C"};
         const auto pick = [&](const auto& from) { return from[random() % from.size()]; };
         const auto field = static_cast<FileSearch::_tag_FIND_FIELD_>(random() % 9);
         const char* op = field == FileSearch::FIND_TYPE ? (random() % 2 == 0 ? "dir" : "file") : pick(operators);
         const char* value = pick(numbers);
         if (field == FileSearch::FIND_NAME) value = pick(patterns);
-        if (field == FileSearch::FIND_EXTENSION) value = random() % 2 == 0 ? "jpg,pdf" : "txt";
+        if (field == FileSearch::FIND_EXTENSION) value = pick(extensions);
         if (field == FileSearch::FIND_OWNER) value = random() % 2 == 0 ? "alice" : "bob";
         if (field == FileSearch::FIND_GROUP) value = "users";
         ASSERT_TRUE(FileSearch::FindFactory::createFindOp(field, op, value, list));
@@ -172,6 +176,79 @@ TEST_F(IndexTest, LongPatternsForNames) {
     const Cond ends = node(FI_COL_NAME, FI_OP_WILDCARD, std::string(600, '*') + "x");
     EXPECT_EQ(searched(&ends), (Addresses{"photo:ab", "photo:x"}));
     EXPECT_EQ(select(db_, &ends), Addresses{"photo:x"});
+}
+
+// Alternatives find together what each finds alone.
+TEST_F(IndexTest, AlternativesAreTheSumOfTheirParts) {
+    build(manyRecords());
+    const auto all = [this](const std::vector<Cond>& parts, bool arePaths) {
+        std::vector<Cond> chain = parts;
+        Addresses apart;
+        for (size_t i = 0; i < parts.size(); ++i) {
+            if (i > 0) chain[i].pOrNext = &chain[i - 1];
+            const Addresses found = arePaths ? searched(nullptr, &parts[i]) : searched(&parts[i]);
+            apart.insert(apart.end(), found.begin(), found.end());
+        }
+        apart = sorted(apart);
+        apart.erase(std::unique(apart.begin(), apart.end()), apart.end());
+        EXPECT_FALSE(apart.empty());
+        EXPECT_EQ(arePaths ? searched(nullptr, &chain.back()) : searched(&chain.back()), apart);
+    };
+    std::vector<Cond> below;
+    for (const char* folder : {"/photo/2012", "/photo/*", "/photo/20_2", "/photo/none"}) {
+        below.push_back(node(FI_COL_PATH, FI_OP_BELOW, folder));
+    }
+    std::vector<Cond> folders;
+    folders.push_back(node(FI_COL_PATH, FI_OP_PATH, "/photo/2012", &below[0]));
+    folders.push_back(node(FI_COL_PATH, FI_OP_PATH, "/photo/*", &below[1]));
+    all(folders, true);
+    folders.clear();
+    for (const char* direct : {"/photo", "/photo/2012/a", "/photo/2012b/", "/photo/\xFF"}) {
+        folders.push_back(node(FI_COL_PATH, FI_OP_PATH, direct));
+    }
+    all(folders, true);
+    std::vector<Cond> names;
+    for (const char* pattern : {"*.jpg", "*.A.b", "*.", "*.\xED\xA0\x81", "*.p?f", "*b", "*.\\jpg"}) {
+        names.push_back(node(FI_COL_NAME, FI_OP_WILDCARD, pattern));
+    }
+    all(names, false);
+}
+
+// Whatever way a search takes, records that are written anew while it copies are found once.
+TEST_F(IndexTest, NoRecordIsLostWhenTheIndexChanges) {
+    std::vector<Record> records;
+    for (int i = 0; i < 300; ++i) records.push_back({.path = "img" + std::to_string(i)});
+    build(records);
+    struct Change {
+        const std::vector<Record>& records;
+        int asked;
+    };
+    const auto writeAnew = [](const char*, void* arg) -> BOOL {
+        auto& [all, asked] = *static_cast<Change*>(arg);
+        if (asked++ > 0) return 1;
+        char path[4096];
+        EXPECT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path, sizeof path), 0);
+        for (int i = 299; i >= 100; --i) {
+            const Cond where = node(FI_COL_PATH, FI_OP_EQUAL, all[i].path);
+            EXPECT_EQ(FILEIDXDBDel(path, &where), 0);
+        }
+        EXPECT_EQ(FILEIDXDBFlush(path), 0);
+        for (int i = 299; i >= 100; --i) EXPECT_EQ(insert(path, all[i]), 0);
+        EXPECT_EQ(FILEIDXIndexEnd("photo", 1), 0);
+        return 1;
+    };
+    for (const char* pattern : {"*", "*img*", "*9*"}) {
+        const Cond cond = node(FI_COL_NAME, FI_OP_WILDCARD, pattern);
+        const Addresses before = searched(&cond);
+        const std::string out = folder_ + "/changed";
+        Change change{records, 0};
+        ASSERT_EQ(FILEIDXDBCreate(out.c_str()), 0);
+        ASSERT_EQ(FILEIDXResultGetAndTableGen("photo", nullptr, &cond, out.c_str(), nullptr, nullptr, nullptr,
+                                              writeAnew, &change),
+                  0);
+        EXPECT_EQ(select(out), before) << pattern;
+        unlink(out.c_str());
+    }
 }
 
 // Rows may be older than a move of the share's folder, and change between finding and copying.

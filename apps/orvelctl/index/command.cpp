@@ -1,6 +1,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <csignal>
 #include <cstdio>
 #include <ctime>
@@ -78,14 +79,16 @@ int drop(const SDK::Share& share) {
     return 0;
 }
 
-// The platform's work on the index of a share: given up unless it is done.
+// The platform's work on the index of a share: given up unless it is done. An index that cannot be read is not updated
+// but built anew.
 class Work {
  public:
-    Work(const SDK::Share& share, int mode) : share_(share.GetName()) {
-        char path[4096];
-        if (FILEIDXIndexBegin(share_.c_str(), mode, path, sizeof path) < 0) refuse(share_, platformReason());
-        open_ = true;
-        database_ = path;
+    Work(const SDK::Share& share, bool build) : share_(share.GetName()), builds_(build) {
+        if (begin()) return;
+        if (builds_ || VLIBCErrGet() != VEXO_ERR_GENERAL || errno == EBUSY) refuse(share_, platformReason());
+        printf("%s: its index is damaged or of another version, and is built anew\n", terminalText(share_).c_str());
+        builds_ = true;
+        if (!begin()) refuse(share_, platformReason());
     }
     ~Work() {
         if (open_) FILEIDXIndexEnd(share_.c_str(), 0);
@@ -94,13 +97,22 @@ class Work {
     Work& operator=(const Work&) = delete;
 
     [[nodiscard]] const std::string& database() const { return database_; }
+    [[nodiscard]] bool builds() const { return builds_; }
     void done() {
         open_ = false;
         if (FILEIDXIndexEnd(share_.c_str(), 1) < 0) refuse(share_, platformReason());
     }
 
  private:
+    bool begin() {
+        char path[4096];
+        open_ = FILEIDXIndexBegin(share_.c_str(), builds_ ? FI_INDEX_BUILD : FI_INDEX_UPDATE, path, sizeof path) >= 0;
+        database_ = open_ ? path : "";
+        return open_;
+    }
+
     std::string share_, database_;
+    bool builds_;
     bool open_ = false;
 };
 
@@ -120,15 +132,15 @@ int work(const SDK::Share& share, bool build, bool everything) {
         refuse(share.GetName(), "its folder is not there");
     }
     stopOnSignals();
-    Work work(share, build ? FI_INDEX_BUILD : FI_INDEX_UPDATE);
+    Work work(share, build);
     IndexRows rows(root, share.GetName(), work.database());
     IndexCounts counts;
     std::string unread;
     try {
         Indexer indexer(files, rows, &stopRequested);
-        if (!(build ? indexer.build() : indexer.update(everything))) {
-            refuse(share.GetName(),
-                   build ? "broken off; the index is what it was before" : "broken off; the next update goes on");
+        if (!(work.builds() ? indexer.build() : indexer.update(everything))) {
+            refuse(share.GetName(), work.builds() ? "broken off; the index is what it was before"
+                                                  : "broken off; the next update goes on");
         }
         counts = indexer.counts();
         unread = indexer.unread();
@@ -141,7 +153,7 @@ int work(const SDK::Share& share, bool build, bool everything) {
                                     "; the index of it is what it was, and the next update goes on");
     }
     work.done();
-    if (build) return printStatus(share);
+    if (work.builds()) return printStatus(share);
     print(share, counts);
     return 0;
 }

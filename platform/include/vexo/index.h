@@ -120,7 +120,7 @@ struct FIINDEXSTATUS {
 enum { FI_INDEX_BUILD = 0, FI_INDEX_UPDATE = 1 };
 
 VEXO_BEGIN_C
-// 1 when the share has the option vexo:index and its index exists, else 0.
+// 1 when the share has the option vexo:index and an index that can be read, else 0.
 VEXO_API int FILEIDXIsIndexEnable(const char* share);
 
 // Makes an empty result database, mode 0600; its folder must exist and `path` must not (0x0800).
@@ -158,7 +158,8 @@ VEXO_API int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_C
 
 // The work of an indexer, one at a time for each share, in a process that may become root. Begin gives the path of the
 // database to write with the operations above: a new one for FI_INDEX_BUILD, the share's index for FI_INDEX_UPDATE. <0
-// with 0x1400 no such share, 0x0600 no index to update, 0x0800 another process is at it. End with nonzero `done` makes
+// with 0x1400 no such share, 0x0600 no index to update, 0x0800 another process is at it, 0x8100 the index to update is
+// damaged or of another format and must be built anew. End with nonzero `done` makes
 // a new one the share's index, as a whole, and notes the time; with 0 it removes it, and leaves an updated one as far
 // as it came. A process that dies in between counts as ended with 0.
 VEXO_API int FILEIDXIndexBegin(const char* share, int mode, char* path, int size);

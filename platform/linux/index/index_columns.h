@@ -20,6 +20,7 @@ struct Column {
 // "share,path,..." in the order of bindRecord and readRecord, and as many "?".
 extern const char* const kRecordColumns;
 extern const char* const kRecordMarks;
+constexpr int kRecordWidth = 18;  // how many they are
 
 // Borrows the record's texts until the statement is reset.
 [[nodiscard]] bool bindRecord(Statement& statement, const __tag_FI_FILE_INFO_DATA& record);

@@ -85,35 +85,92 @@ std::optional<std::string> trigramsOf(const orvel::Wildcard& pattern) {
 }
 
 Condition always() {
-    return {"1", {}, {}, {}};
+    return {"1"};
+}
+
+// What stands behind "*." in a pattern that holds no other wildcard, in the form of the comparison. Characters that
+// this form does not tell apart are left to the pattern itself.
+std::optional<std::string> endingOf(std::string_view text, const orvel::Wildcard& pattern) {
+    if (!text.starts_with("*.") || text.find('\\') != std::string_view::npos) return {};
+    std::string rest;
+    orvel::appendComparable(text.substr(1), rest);
+    const std::vector<std::string> literals = pattern.literals();
+    if (literals.size() != 1 || literals.front() != rest || rest.find("\xEF\xBF\xBD") != std::string::npos) return {};
+    return rest.substr(1);
 }
 
 void appendValues(Condition& to, Condition& from) {
     std::move(from.values.begin(), from.values.end(), std::back_inserter(to.values));
 }
 
+// What one of many alternatives asks for, without what it says itself.
+void addHints(Condition& to, Condition& from) {
+    if (to.folders && from.folders) {
+        std::move(from.folders->begin(), from.folders->end(), std::back_inserter(*to.folders));
+    } else {
+        to.folders.reset();
+    }
+    if (to.trigrams && from.trigrams) {
+        *to.trigrams += " OR " + *from.trigrams;
+    } else {
+        to.trigrams.reset();
+    }
+}
+
 Condition either(Condition a, Condition b) {
     a.sql = "(" + a.sql + " OR " + b.sql + ")";
     appendValues(a, b);
-    if (a.folders && b.folders) {
-        std::move(b.folders->begin(), b.folders->end(), std::back_inserter(*a.folders));
-    } else {
-        a.folders.reset();
-    }
-    if (a.trigrams && b.trigrams) {
-        a.trigrams = "(" + *a.trigrams + " OR " + *b.trigrams + ")";
-    } else {
-        a.trigrams.reset();
-    }
+    addHints(a, b);
+    if (a.trigrams) a.trigrams = "(" + *a.trigrams + ")";
+    a.plain.reset();
     return a;
 }
 
+Condition joined(const std::vector<Condition>& parts, bool endings) {
+    auto names = std::make_shared<Endings>();
+    auto folders = std::make_shared<FolderSet>();
+    for (const Condition& part : parts) {
+        if (endings) {
+            names->add(part.plain->text);
+        } else {
+            folders->add(part.plain->text, part.plain->kind == PlainTest::Kind::kBelow);
+        }
+    }
+    if (endings) return {"vexo_ending(?,name)", {Value(EndingList(names))}};
+    return {"vexo_within(?,path)", {Value(FolderList(folders))}};
+}
+
+// Alternatives that one test can ask become one.
+void joinPlain(std::vector<Condition>& parts, bool endings) {
+    const auto isOther = [endings](const Condition& part) {
+        return !part.plain || (part.plain->kind == PlainTest::Kind::kEnding) != endings;
+    };
+    const auto from = std::stable_partition(parts.begin(), parts.end(), isOther);
+    std::vector<Condition> plain(std::make_move_iterator(from), std::make_move_iterator(parts.end()));
+    parts.erase(from, parts.end());
+    if (plain.size() > 1) {
+        Condition all = joined(plain, endings);
+        all.folders = std::move(plain.front().folders);
+        all.trigrams = std::move(plain.front().trigrams);
+        for (size_t i = 1; i < plain.size(); ++i) addHints(all, plain[i]);
+        if (all.trigrams) all.trigrams = "(" + *all.trigrams + ")";
+        plain.assign(1, std::move(all));
+    }
+    std::move(plain.begin(), plain.end(), std::back_inserter(parts));
+}
+
 // Halves, so that a long list of alternatives does not become a deep expression.
-Condition anyOf(std::vector<Condition>& parts, size_t from, size_t to) {
+Condition halved(std::vector<Condition>& parts, size_t from, size_t to) {
     if (to - from == 1) return std::move(parts[from]);
     const size_t middle = from + (to - from) / 2;
-    Condition left = anyOf(parts, from, middle);
-    return either(std::move(left), anyOf(parts, middle, to));
+    Condition left = halved(parts, from, middle);
+    return either(std::move(left), halved(parts, middle, to));
+}
+
+Condition anyOf(std::vector<Condition> parts) {
+    joinPlain(parts, true);
+    joinPlain(parts, false);
+    return halved(parts, 0, parts.size());
 }
 
 class Reader {
@@ -154,7 +211,7 @@ class Reader {
     std::optional<Condition> join(std::vector<Group>& groups, int depth) {
         std::vector<Condition> parts;
         for (Group& group : groups) {
-            Condition members = anyOf(group.members, 0, group.members.size());
+            Condition members = anyOf(std::move(group.members));
             if (group.link != nullptr) {
                 std::optional<Condition> link;
                 if (depth < kDepthLimit) link = chain(group.link, depth + 1);
@@ -163,7 +220,7 @@ class Reader {
             }
             parts.push_back(std::move(members));
         }
-        return anyOf(parts, 0, parts.size());
+        return anyOf(std::move(parts));
     }
 
     // "Directly in V" that is and-linked with "below V" says the latter.
@@ -181,7 +238,7 @@ class Reader {
             return pathTest(node);
         }
         if (!column->isText) return numberTest(node, *column);
-        if (node.op == FI_OP_EQUAL) return Condition{std::string(column->name) + "=?", {valueOf(node)}, {}, {}};
+        if (node.op == FI_OP_EQUAL) return Condition{std::string(column->name) + "=?", {valueOf(node)}};
         if (node.op == FI_OP_WILDCARD) return patternTest(node, *column);
         return {};
     }
@@ -191,8 +248,8 @@ class Reader {
         if (comparison == nullptr) return {};
         // The reserved id matches no owner, as for the criteria.
         const bool isId = node.type == FI_COL_UID || node.type == FI_COL_GID;
-        if (isId && node.op == FI_OP_EQUAL && textOf(node) == kNobody) return Condition{"0", {}, {}, {}};
-        return Condition{std::string(column.name) + comparison + "?", {valueOf(node)}, {}, {}};
+        if (isId && node.op == FI_OP_EQUAL && textOf(node) == kNobody) return Condition{"0"};
+        return Condition{std::string(column.name) + comparison + "?", {valueOf(node)}};
     }
 
     [[nodiscard]] std::optional<Condition> patternTest(const Node& node, const Column& column) const {
@@ -200,8 +257,11 @@ class Reader {
         const bool isCut = isName && reading_.ofCriteria;
         const std::string_view text = textOf(node).substr(0, isCut ? kNamePatternLimit : std::string_view::npos);
         const auto pattern = std::make_shared<const orvel::Wildcard>(text, kEscape);
-        Condition out{std::string("vexo_match(?,") + column.name + ")", {Value(Pattern(pattern))}, {}, {}};
+        Condition out{std::string("vexo_match(?,") + column.name + ")", {Value(Pattern(pattern))}};
         if (isName && reading_.ofCriteria) out.trigrams = trigramsOf(*pattern);
+        if (auto ending = isName ? endingOf(text, *pattern) : std::nullopt) {
+            out.plain = {PlainTest::Kind::kEnding, std::move(*ending)};
+        }
         return out;
     }
 
@@ -214,12 +274,13 @@ class Reader {
             below = true;
         }
         if (folder.empty() && below) return always();
-        Condition out{"parent=?", {Value(folder)}, {{{folder, below}}}, {}};
-        if (folder.empty()) return out;
-        const Condition inRange{"(path>? AND path<?)", {Value(folder + "/"), Value(folder + "0")}, {}, {}};
-        if (!below) return both(inRange, std::move(out));
-        out.sql = inRange.sql;
-        out.values = inRange.values;
+        Condition out{"parent=?", {Value(folder)}, {{{folder, below}}}, {}, {}};
+        if (!folder.empty()) {
+            Condition inRange{"(path>? AND path<?)", {Value(folder + "/"), Value(folder + "0")}};
+            if (below) inRange.folders = std::move(out.folders);
+            out = below ? std::move(inRange) : both(std::move(inRange), std::move(out));
+        }
+        out.plain = {below ? PlainTest::Kind::kBelow : PlainTest::Kind::kDirect, folder};
         return out;
     }
 
@@ -230,6 +291,9 @@ class Reader {
 }  // namespace
 
 Condition both(Condition a, Condition b) {
+    if (a.sql == "1") return b;
+    if (b.sql == "1") return a;
+    a.plain.reset();
     a.sql = "(" + a.sql + " AND " + b.sql + ")";
     appendValues(a, b);
     if (!a.folders) a.folders = std::move(b.folders);

@@ -25,14 +25,23 @@ struct Folder {
     bool below;
 };
 
+// A test of which many alternatives are asked as one.
+struct PlainTest {
+    enum class Kind { kEnding, kDirect, kBelow };
+    Kind kind;
+    std::string text;  // of Endings or FolderSet
+};
+
 // What a tree says. `sql` is one parenthesised expression over the columns of a record; `values` are bound in order.
 struct Condition {
     std::string sql;
-    std::vector<Value> values;
+    std::vector<Value> values = {};
     // Only records of these folders can satisfy the tree; empty: no such limit is known.
-    std::optional<std::vector<Folder>> folders;
+    std::optional<std::vector<Folder>> folders = {};
     // A full-text expression over trigrams of names that every record satisfying the tree fits; empty: none is known.
-    std::optional<std::string> trigrams;
+    std::optional<std::string> trigrams = {};
+    // Set where the tree is this test alone.
+    std::optional<PlainTest> plain = {};
 };
 
 // Null `tree` holds for every record. Nothing, with the slot filled (0x0D00), for columns and comparisons that do not

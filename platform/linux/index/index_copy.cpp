@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <exception>
 #include <memory>
+#include <optional>
 #include <utility>
 #include <vector>
 
@@ -11,7 +12,6 @@
 #include "index/index_columns.h"
 #include "index/index_condition.h"
 #include "index/index_connections.h"
-#include "index/index_reading.h"
 #include "index/index_search.h"
 #include "index/index_store.h"
 #include "shares/share_record.h"
@@ -19,6 +19,9 @@
 
 namespace vexo::fileindex {
 namespace {
+
+constexpr size_t kFirstPart = 128;
+constexpr size_t kPart = 4096;
 
 // What the caller says about single records; see FILEIDXResultGetAndTableGen.
 struct Tests {
@@ -33,28 +36,36 @@ bool holds(const Tests& tests, __tag_FI_FILE_INFO_DATA& record) {
     return tests.access == nullptr || tests.access(&record, tests.accessArgument) != 0;
 }
 
-bool insertInto(const char* out, const std::vector<__tag_FI_FILE_INFO_DATA>& records) {
+bool insertInto(const char* out, const std::vector<__tag_FI_FILE_INFO_DATA>& records, bool atOnce) {
     const Lease lease(out);
-    return lease && std::all_of(records.begin(), records.end(), [&](const auto& r) { return lease->insert(r); });
+    return lease && std::all_of(records.begin(), records.end(), [&](const auto& r) { return lease->insert(r); }) &&
+           (!atOnce || lease->commit());
 }
 
-// The share's root is what it is now: the rows may be older than a move of the share's folder.
-bool copy(Database& index, PartReader reader, const char* root, const char* out, const Tests& tests,
-          const int* cancel) {
-    while (!reader.atEnd() && !isCancelled(cancel)) {
+// The first rows are committed at once, since somebody waits for them. The share's root is what it is now: the rows may
+// be older than a move of the share's folder.
+bool copy(IndexSearch& search, const char* root, const char* out, const Tests& tests, const int* cancel) {
+    size_t most = kFirstPart;
+    bool isFirst = true;
+    while (!search.atEnd() && !isCancelled(cancel)) {
         std::vector<OwnedRecord> part;
         {
             const orvel::RaisedIdentity raised;
-            if (!reader.read(index, part)) return false;
+            if (!search.read(most, part)) return false;
         }
         std::vector<__tag_FI_FILE_INFO_DATA> kept;
+        kept.reserve(part.size());
         for (const OwnedRecord& record : part) {
             if (isCancelled(cancel)) break;
             __tag_FI_FILE_INFO_DATA view = record.view();
             view.szShareRoot = root;
             if (holds(tests, view)) kept.push_back(view);
         }
-        if (!kept.empty() && !insertInto(out, kept)) return false;
+        most = std::min(most * 2, kPart);
+        if (kept.empty()) continue;
+        if (!insertInto(out, kept, isFirst)) return false;
+        isFirst = false;
+        most = kPart;
     }
     const Lease lease(out);
     return lease && lease->commit();
@@ -81,15 +92,16 @@ int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_COND* path
     if (record == nullptr) return -1;
     const Condition asked = shorterFirst(std::move(*where), std::move(*what));
     std::unique_ptr<Database> index;
-    std::vector<int64_t> ids;
-    int64_t version = 0;
+    std::optional<IndexSearch> search;
     {
         const orvel::RaisedIdentity raised;
         index = openIndex(share);
-        if (index == nullptr || !searchIndex(*index, asked, cancel, ids, version)) return -1;
+        if (index == nullptr) return -1;
+        search.emplace(*index, asked, cancel);
+        if (!search->begin()) return -1;
     }
     const Tests tests = {accessTest, accessArg, folderTest, folderArg};
-    return copy(*index, PartReader(ids, asked, version), record->szPath, out, tests, cancel) ? 0 : -1;
+    return copy(*search, record->szPath, out, tests, cancel) ? 0 : -1;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

@@ -28,24 +28,43 @@ constexpr std::array<const char*, 4> kSchema = {
     "extension TEXT,permission TEXT,owner TEXT,group_name TEXT,is_dir INTEGER,size INTEGER,created INTEGER,"
     "changed INTEGER,accessed INTEGER,modified INTEGER,mode INTEGER,uid INTEGER,gid INTEGER)",
     "CREATE UNIQUE INDEX record_address ON record(path,share)",
-    "CREATE TABLE state(records INTEGER,written INTEGER,built INTEGER,updated INTEGER)",
+    "CREATE TABLE state(records INTEGER,written INTEGER,built INTEGER,updated INTEGER,highest INTEGER)",
     "CREATE TABLE ranking(id INTEGER PRIMARY KEY,records BLOB)",
 };
 
+std::string_view bytesOf(sqlite3_value* value) {
+    const auto* text = static_cast<const char*>(sqlite3_value_blob(value));
+    return text == nullptr ? std::string_view() : std::string_view(text, sqlite3_value_bytes(value));
+}
+
+// A test of a text by what a pointer of this kind stands for.
+template <class Test>
+void answer(sqlite3_context* context, sqlite3_value** values, const char* kind,
+            bool (Test::*test)(std::string_view) const) {
+    try {
+        const auto* asked = static_cast<const Test*>(sqlite3_value_pointer(values[0], kind));
+        sqlite3_result_int(context, static_cast<int>(asked != nullptr && (asked->*test)(bytesOf(values[1]))));
+    } catch (...) {
+        sqlite3_result_error_nomem(context);
+    }
+}
+
 void matchFunction(sqlite3_context* context, int, sqlite3_value** values) {
-    const auto* pattern = static_cast<const orvel::Wildcard*>(sqlite3_value_pointer(values[0], "wildcard"));
-    const auto* text = static_cast<const char*>(sqlite3_value_blob(values[1]));
-    const auto length = static_cast<size_t>(sqlite3_value_bytes(values[1]));
-    const std::string_view name = text == nullptr ? std::string_view() : std::string_view(text, length);
-    sqlite3_result_int(context, static_cast<int>(pattern != nullptr && pattern->match(name)));
+    answer(context, values, "wildcard", &orvel::Wildcard::match);
+}
+
+void endingFunction(sqlite3_context* context, int, sqlite3_value** values) {
+    answer(context, values, "endings", &Endings::match);
+}
+
+void withinFunction(sqlite3_context* context, int, sqlite3_value** values) {
+    answer(context, values, "folders", &FolderSet::holds);
 }
 
 void comparableFunction(sqlite3_context* context, int, sqlite3_value** values) {
     try {
-        const auto* text = static_cast<const char*>(sqlite3_value_blob(values[0]));
-        const auto length = static_cast<size_t>(sqlite3_value_bytes(values[0]));
         std::string out;
-        if (text != nullptr) orvel::appendComparable({text, length}, out);
+        orvel::appendComparable(bytesOf(values[0]), out);
         sqlite3_result_text64(context, out.data(), out.size(), SQLITE_TRANSIENT, SQLITE_UTF8);
     } catch (...) {
         sqlite3_result_error_nomem(context);
@@ -54,9 +73,11 @@ void comparableFunction(sqlite3_context* context, int, sqlite3_value** values) {
 
 bool addFunctions(sqlite3* db) {
     constexpr int flags = SQLITE_UTF8 | SQLITE_DETERMINISTIC | SQLITE_INNOCUOUS;
-    return sqlite3_create_function(db, "vexo_match", 2, flags, nullptr, matchFunction, nullptr, nullptr) == SQLITE_OK &&
-           sqlite3_create_function(db, "vexo_comparable", 1, flags, nullptr, comparableFunction, nullptr, nullptr) ==
-               SQLITE_OK;
+    const auto add = [db](const char* name, int arguments, auto function) {
+        return sqlite3_create_function(db, name, arguments, flags, nullptr, function, nullptr, nullptr) == SQLITE_OK;
+    };
+    return add("vexo_match", 2, matchFunction) && add("vexo_ending", 2, endingFunction) &&
+           add("vexo_within", 2, withinFunction) && add("vexo_comparable", 1, comparableFunction);
 }
 
 // A file may be made to harm who opens it; only the central store may say by triggers what is to be done.
@@ -108,7 +129,7 @@ std::unique_ptr<Database> Database::open(const std::string& path, OpenMode mode)
                       (mode.readOnly ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE);
     sqlite3* db = nullptr;
     const int result = sqlite3_open_v2(resolved.c_str(), &db, flags, trustedFileSystem());
-    std::unique_ptr<Database> database(new Database(path, db));
+    std::unique_ptr<Database> database(new Database(path, db, mode.ofShare));
     if (result != SQLITE_OK) {
         failSql(db, result);
         return nullptr;
@@ -133,7 +154,7 @@ bool Database::create(const std::string& path) {
     sqlite3* db = nullptr;
     constexpr int flags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_NOFOLLOW | SQLITE_OPEN_EXRESCODE;
     const int result = sqlite3_open_v2(resolved.c_str(), &db, flags, trustedFileSystem());
-    Database database(resolved, db);
+    Database database(resolved, db, false);
     const bool opened = result == SQLITE_OK || failSql(db, result);
     if (opened && database.configure({}) && database.makeSchema()) return true;
     const KeepErrno keep;
@@ -164,7 +185,7 @@ bool Database::makeSchema() {
     for (const char* sql : kSchema) {
         if (!execute(db_, sql)) return false;
     }
-    return execute(db_, "INSERT INTO state VALUES(0,0,0,0);COMMIT");
+    return execute(db_, "INSERT INTO state VALUES(0,0,0,0,0);COMMIT");
 }
 
 bool Database::hasOurSchema(bool ofShare) {
@@ -215,13 +236,6 @@ bool Database::readState(State& state) {
         return false;
     }
     state = {std::max<int64_t>(statement.number(0), 0), statement.number(1), statement.number(2), statement.number(3)};
-    return true;
-}
-
-bool Database::readVersion(int64_t& version) {
-    Statement statement;
-    if (!statement.prepare(db_, "PRAGMA data_version") || statement.step() != Statement::kRow) return false;
-    version = statement.number(0);
     return true;
 }
 

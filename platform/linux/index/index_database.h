@@ -65,15 +65,14 @@ class Database {
     [[nodiscard]] bool select(const Condition& condition, std::vector<int64_t>& ids);
     [[nodiscard]] bool count(const Condition& condition, int64_t& count);
     [[nodiscard]] bool readState(State& state);
-    // A number that is another one as soon as somebody else has changed the database.
-    [[nodiscard]] bool readVersion(int64_t& version);
 
  private:
-    Database(std::string path, sqlite3* db) : path_(std::move(path)), db_(db) {}
+    Database(std::string path, sqlite3* db, bool ofShare) : path_(std::move(path)), db_(db), ofShare_(ofShare) {}
     [[nodiscard]] bool configure(OpenMode mode);
     [[nodiscard]] bool hasOurSchema(bool ofShare);
     [[nodiscard]] bool makeSchema();
     [[nodiscard]] bool begin();
+    [[nodiscard]] bool readHighest();
     // What a write ends with.
     [[nodiscard]] bool written(bool done);
     [[nodiscard]] bool change(const std::string& sql, const std::vector<Value>& values);
@@ -81,10 +80,14 @@ class Database {
 
     std::string path_;
     sqlite3* db_;
+    bool ofShare_;
     Statement insert_;
     std::optional<Clock::time_point> began_;
     int rows_ = 0;       // written in this batch
     int64_t added_ = 0;  // records more than before this batch
+    // In the index of a share no id is given to a second record, even after the first one is gone: this is the highest
+    // so far. Searches read on behind an id that they have come to.
+    int64_t highest_ = 0;
 };
 
 }  // namespace vexo::fileindex

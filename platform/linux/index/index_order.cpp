@@ -109,7 +109,7 @@ bool writeOrder(Database& database, int64_t row, const std::vector<int64_t>& ids
 // failure.
 bool makeOrder(Database& database, const FIQUERY& query, std::vector<int64_t>& order) {
     if (!execute(database.handle(), "BEGIN")) return false;
-    const bool sorted = sortNow(database, query, {"1", {}, {}, {}}, 0, kAll, order);
+    const bool sorted = sortNow(database, query, {"1"}, 0, kAll, order);
     const KeepErrno keep;
     const QuietFailures quiet;
     const bool fits = sorted && std::all_of(order.begin(), order.end(), [](int64_t id) {

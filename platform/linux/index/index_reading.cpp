@@ -22,18 +22,14 @@ bool PartReader::read(Database& database, std::vector<OwnedRecord>& part) {
 }
 
 bool PartReader::readRecords(Database& database, std::vector<OwnedRecord>& part) {
-    int64_t version = version_;
-    if (condition_ != nullptr && !database.readVersion(version)) return false;
-    const bool asks = version != version_;
-    const std::string sql =
-        std::string("SELECT ") + kRecordColumns + " FROM record WHERE " + (asks ? condition_->sql : "1") + " AND id=?";
     Statement statement;
-    if (!statement.prepare(database.handle(), sql) || (asks && !statement.bind(condition_->values))) return false;
-    const int idAt = asks ? static_cast<int>(condition_->values.size()) + 1 : 1;
+    if (!statement.prepare(database.handle(), std::string("SELECT ") + kRecordColumns + " FROM record WHERE id=?")) {
+        return false;
+    }
     const size_t end = std::min(ids_.size(), next_ + kPart);
     part.reserve(end - next_);
     for (; next_ < end; ++next_) {
-        if (!statement.bind(idAt, ids_[next_])) return false;
+        if (!statement.bind(1, ids_[next_])) return false;
         const Statement::Step step = statement.step();
         if (step == Statement::kFailed) return false;
         if (step == Statement::kRow) part.emplace_back(statement, 0);

@@ -13,10 +13,6 @@ namespace vexo::fileindex {
 class PartReader {
  public:
     explicit PartReader(const std::vector<int64_t>& ids) : ids_(ids) {}
-    // For records that satisfied `condition` in this version of the database. A later one may have given their ids to
-    // other records, so they are asked again there.
-    PartReader(const std::vector<int64_t>& ids, const Condition& condition, int64_t version)
-        : ids_(ids), condition_(&condition), version_(version) {}
     [[nodiscard]] bool atEnd() const { return next_ == ids_.size(); }
     // The next records, in the order of the ids; those that are gone by now are left out. False with the slot filled.
     [[nodiscard]] bool read(Database& database, std::vector<OwnedRecord>& part);
@@ -25,8 +21,6 @@ class PartReader {
     [[nodiscard]] bool readRecords(Database& database, std::vector<OwnedRecord>& part);
 
     const std::vector<int64_t>& ids_;
-    const Condition* condition_ = nullptr;
-    int64_t version_ = 0;
     size_t next_ = 0;
 };
 

@@ -9,9 +9,12 @@ namespace vexo::fileindex {
 namespace {
 
 // Records to look at one by one, each of which costs as much as several in passing. So few are looked at before names
-// are asked; where trigrams do not help, an eighth of all.
+// are asked; where trigrams do not help, a sixteenth of all.
 constexpr int64_t kFewRecords = 4096;
-constexpr int64_t kWorthPart = 8;
+constexpr int64_t kWorthPart = 16;
+// What is looked at in one transaction takes some 20 milliseconds at most: writers wait for it.
+constexpr size_t kLooks = 4096;
+constexpr int64_t kWindow = 65536;
 
 // Appends what the statement gives, `most` at most; `enough` when there is more.
 bool collect(Statement& statement, int64_t most, std::vector<int64_t>& ids, bool& enough) {
@@ -52,50 +55,17 @@ bool byTrigrams(sqlite3* db, const std::string& trigrams, int64_t most, std::vec
     return collect(statement, most, ids, enough);
 }
 
-// Leaves the ids of records that satisfy the condition.
-bool filter(sqlite3* db, const Condition& condition, const int* cancel, std::vector<int64_t>& ids) {
-    Statement statement;
-    if (!statement.prepare(db, "SELECT 1 FROM record WHERE " + condition.sql + " AND id=?") ||
-        !statement.bind(condition.values)) {
-        return false;
-    }
-    const int idAt = static_cast<int>(condition.values.size()) + 1;
-    size_t kept = 0;
-    for (const int64_t id : ids) {
-        if (isCancelled(cancel)) break;
-        if (!statement.bind(idAt, id)) return false;
-        const Statement::Step step = statement.step();
-        if (step == Statement::kFailed) return false;
-        if (step == Statement::kRow) ids[kept++] = id;
-        statement.reset();
-    }
-    ids.resize(kept);
-    return true;
-}
-
-bool search(Database& index, const Condition& condition, const int* cancel, std::vector<int64_t>& ids) {
-    State state{};
-    if (!index.readState(state)) return false;
-    const int64_t worth = std::max(state.records / kWorthPart, kFewRecords);
-    if (condition.folders) {
-        bool enough = false;
-        if (!inFolders(index.handle(), *condition.folders, condition.trigrams ? kFewRecords : worth, ids, enough)) {
-            return false;
-        }
-        if (!enough) return filter(index.handle(), condition, cancel, ids);
-        ids.clear();
-    }
-    if (condition.trigrams) {
-        bool enough = false;
-        if (!byTrigrams(index.handle(), *condition.trigrams, worth, ids, enough)) return false;
-        if (!enough) return filter(index.handle(), condition, cancel, ids);
-        ids.clear();
-    }
-    return index.select(condition, ids);
-}
-
 int progress(void* cancel) {
     return static_cast<int>(isCancelled(static_cast<const int*>(cancel)));
+}
+
+bool highestId(Statement& statement, sqlite3* db, int64_t& id) {
+    if (!statement && !statement.prepare(db, "SELECT max(id) FROM record")) return false;
+    const bool read = statement.step() == Statement::kRow;
+    if (read) id = statement.number(0);
+    const KeepErrno keep;
+    statement.reset();
+    return read;
 }
 
 }  // namespace
@@ -104,17 +74,106 @@ bool isCancelled(const int* cancel) {
     return cancel != nullptr && __atomic_load_n(cancel, __ATOMIC_RELAXED) != 0;
 }
 
-bool searchIndex(Database& index, const Condition& condition, const int* cancel, std::vector<int64_t>& ids,
-                 int64_t& version) {
+IndexSearch::IndexSearch(Database& index, const Condition& condition, const int* cancel)
+    : index_(index), condition_(condition), cancel_(cancel) {
     constexpr int steps = 100000;  // of SQLite's machine, a few milliseconds
-    if (!execute(index.handle(), "BEGIN")) return false;
-    sqlite3_progress_handler(index.handle(), steps, cancel == nullptr ? nullptr : progress, const_cast<int*>(cancel));
-    const bool found = search(index, condition, cancel, ids) && index.readVersion(version);
+    if (cancel != nullptr) sqlite3_progress_handler(index.handle(), steps, progress, const_cast<int*>(cancel));
+}
+
+IndexSearch::~IndexSearch() {
+    sqlite3_progress_handler(index_.handle(), 0, nullptr, nullptr);
+}
+
+// One transaction: locks taken for every record would cost more than the records.
+template <class Work>
+bool IndexSearch::inTransaction(Work work) {
+    const bool done = execute(index_.handle(), "BEGIN") && work();
     const KeepErrno keep;
-    sqlite3_progress_handler(index.handle(), 0, nullptr, nullptr);
-    index.rollBack();
-    if (!isCancelled(cancel)) return found;
-    ids.clear();
+    index_.rollBack();
+    if (!isCancelled(cancel_)) return done;
+    atEnd_ = true;
+    return true;
+}
+
+bool IndexSearch::begin() {
+    return inTransaction([&] { return chooseWay(); });
+}
+
+bool IndexSearch::chooseWay() {
+    State state{};
+    int64_t highest = 0;
+    if (!index_.readState(state) || !highestId(last_, index_.handle(), highest)) return false;
+    const int64_t worth = std::max(state.records / kWorthPart, kFewRecords);
+    bool tooMany = true;
+    if (condition_.folders) {
+        tooMany = false;
+        const int64_t most = condition_.trigrams ? kFewRecords : worth;
+        if (!inFolders(index_.handle(), *condition_.folders, most, chosen_, tooMany)) return false;
+    }
+    if (tooMany && condition_.trigrams) {
+        tooMany = false;
+        chosen_.clear();
+        if (!byTrigrams(index_.handle(), *condition_.trigrams, worth, chosen_, tooMany)) return false;
+    }
+    if (tooMany) {
+        chosen_.clear();
+    } else {
+        after_ = highest;
+    }
+    return true;
+}
+
+bool IndexSearch::prepare(Statement& statement, const char* ids) const {
+    if (statement) return true;
+    return statement.prepare(index_.handle(), std::string("SELECT ") + kRecordColumns + ",id FROM record NOT INDEXED " +
+                                                  "WHERE " + condition_.sql + " AND " + ids) &&
+           statement.bind(condition_.values);
+}
+
+bool IndexSearch::read(size_t most, std::vector<OwnedRecord>& part) {
+    return inTransaction([&] { return next_ < chosen_.size() ? readChosen(most, part) : readAll(most, part); });
+}
+
+bool IndexSearch::readChosen(size_t most, std::vector<OwnedRecord>& part) {
+    if (!prepare(one_, "id=?")) return false;
+    const int idAt = static_cast<int>(condition_.values.size()) + 1;
+    const size_t end = std::min(chosen_.size(), next_ + kLooks);
+    const size_t full = part.size() + most;
+    Statement::Step step = Statement::kDone;
+    while (step != Statement::kFailed && next_ < end && part.size() < full) {
+        if (!one_.bind(idAt, chosen_[next_++])) return false;
+        step = one_.step();
+        if (step == Statement::kRow) part.emplace_back(one_, 0);
+        const KeepErrno keep;
+        one_.reset();
+    }
+    return step != Statement::kFailed;
+}
+
+bool IndexSearch::readAll(size_t most, std::vector<OwnedRecord>& part) {
+    int64_t highest = 0;
+    if (!prepare(some_, "id>? AND id<=? ORDER BY id LIMIT ?") || !highestId(last_, index_.handle(), highest)) {
+        return false;
+    }
+    const int64_t windowEnd = highest - after_ > kWindow ? after_ + kWindow : highest;
+    const int idAt = static_cast<int>(condition_.values.size()) + 1;
+    if (!some_.bind(idAt, after_) || !some_.bind(idAt + 1, windowEnd) ||
+        !some_.bind(idAt + 2, static_cast<int64_t>(most))) {
+        return false;
+    }
+    const size_t before = part.size();
+    Statement::Step step = some_.step();
+    for (; step == Statement::kRow; step = some_.step()) {
+        part.emplace_back(some_, 0);
+        after_ = some_.number(kRecordWidth);
+    }
+    const KeepErrno keep;
+    some_.reset();
+    if (step == Statement::kFailed) return false;
+    if (part.size() - before < most) {
+        after_ = windowEnd;
+        atEnd_ = windowEnd == highest;
+    }
     return true;
 }
 

@@ -1,5 +1,6 @@
 #include "index/index_statement.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <utility>
 
@@ -82,20 +83,15 @@ bool Statement::bindBytes(int at, std::string_view bytes) {
 
 bool Statement::bind(const std::vector<Value>& values) {
     int at = 0;
-    for (const Value& value : values) {
+    return std::all_of(values.begin(), values.end(), [&](const Value& value) {
         ++at;
-        if (const auto* number = std::get_if<int64_t>(&value)) {
-            if (!bind(at, *number)) return false;
-        } else if (const auto* text = std::get_if<std::string>(&value)) {
-            if (!bindText(at, *text)) return false;
-        } else {
-            auto* pattern = const_cast<orvel::Wildcard*>(std::get<Pattern>(value).get());
-            if (sqlite3_bind_pointer(statement_, at, pattern, "wildcard", nullptr) != SQLITE_OK) {
-                return failSql(sqlite3_db_handle(statement_));
-            }
-        }
-    }
-    return true;
+        return std::visit([&](const auto& v) { return bindValue(at, v); }, value);
+    });
+}
+
+bool Statement::bindPointer(int at, const void* pointer, const char* kind) {
+    return sqlite3_bind_pointer(statement_, at, const_cast<void*>(pointer), kind, nullptr) == SQLITE_OK ||
+           failSql(sqlite3_db_handle(statement_));
 }
 
 Statement::Step Statement::step() {

@@ -13,12 +13,16 @@
 #include <vector>
 
 #include "base/wildcard.h"
+#include "index/index_alternatives.h"
 
 namespace vexo::fileindex {
 
+// What vexo_match compares with.
 using Pattern = std::shared_ptr<const orvel::Wildcard>;
-// A value of a statement: a number, a text, or what vexo_match compares with.
-using Value = std::variant<int64_t, std::string, Pattern>;
+// What vexo_ending and vexo_within ask.
+using EndingList = std::shared_ptr<const Endings>;
+using FolderList = std::shared_ptr<const FolderSet>;
+using Value = std::variant<int64_t, std::string, Pattern, EndingList, FolderList>;
 
 // Fills the slot and errno with the last failure of `db`, and gives false.
 bool failSql(sqlite3* db, const char* file = __builtin_FILE(), int line = __builtin_LINE());
@@ -72,6 +76,13 @@ class Statement {
     [[nodiscard]] std::string_view text(int column) const;
 
  private:
+    [[nodiscard]] bool bindPointer(int at, const void* pointer, const char* kind);
+    [[nodiscard]] bool bindValue(int at, int64_t value) { return bind(at, value); }
+    [[nodiscard]] bool bindValue(int at, const std::string& value) { return bindText(at, value); }
+    [[nodiscard]] bool bindValue(int at, const Pattern& value) { return bindPointer(at, value.get(), "wildcard"); }
+    [[nodiscard]] bool bindValue(int at, const EndingList& value) { return bindPointer(at, value.get(), "endings"); }
+    [[nodiscard]] bool bindValue(int at, const FolderList& value) { return bindPointer(at, value.get(), "folders"); }
+
     sqlite3_stmt* statement_ = nullptr;
 };
 

@@ -95,6 +95,7 @@ bool begin(const std::string& share, int mode) {
             fail(VEXO_ERR_MISSING, ENOENT);
             return false;
         }
+        if (Database::open(indexPath(share), {false, true}) == nullptr) return false;
         admitDatabase(indexPath(share), {false, true});
     }
     works()[share] = std::move(work);
@@ -159,7 +160,7 @@ bool readStatus(const std::string& share, FIINDEXSTATUS& status) {
     struct stat file {};
     State state{};
     int64_t folders = 0;
-    if (!database->readState(state) || !database->count({"is_dir=1", {}, {}, {}}, folders)) return false;
+    if (!database->readState(state) || !database->count({"is_dir=1"}, folders)) return false;
     if (lstat(indexPath(share).c_str(), &file) != 0) {
         fail(errorOfErrno(errno));
         return false;
@@ -213,7 +214,7 @@ int FILEIDXIsIndexEnable(const char* share) try {
     if (definition == nullptr || !definition->index) return 0;
     const vexo::KeepErrno keep;
     const orvel::RaisedIdentity raised;
-    return static_cast<int>(vexo::fileindex::indexExists(definition->name));
+    return static_cast<int>(vexo::fileindex::openIndex(definition->name) != nullptr);
 } catch (const std::exception&) {
     vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
     return 0;

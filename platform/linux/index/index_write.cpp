@@ -41,9 +41,24 @@ bool Database::begin() {
         rollBack();
         return false;
     }
+    if (ofShare_ && !readHighest()) {
+        const KeepErrno keep;
+        rollBack();
+        return false;
+    }
     began_ = Clock::now();
     rows_ = 0;
     added_ = 0;
+    return true;
+}
+
+bool Database::readHighest() {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT max(highest,coalesce((SELECT max(id) FROM record),0)) FROM state") ||
+        statement.step() != Statement::kRow) {
+        return false;
+    }
+    highest_ = statement.number(0);
     return true;
 }
 
@@ -63,7 +78,8 @@ bool Database::written(bool done) {
 bool Database::commit() {
     if (!began_) return true;
     const std::string counted = "UPDATE state SET records=records+(" + std::to_string(added_) +
-                                "),written=" + std::to_string(time(nullptr)) + ";COMMIT";
+                                "),written=" + std::to_string(time(nullptr)) +
+                                (ofShare_ ? ",highest=" + std::to_string(highest_) : "") + ";COMMIT";
     const bool done = execute(db_, counted.c_str());
     if (!done) {
         const KeepErrno keep;
@@ -82,11 +98,14 @@ void Database::rollBack() {
 bool Database::insert(const __tag_FI_FILE_INFO_DATA& record) {
     if (!begin()) return false;
     static const std::string sql =
-        std::string("INSERT OR IGNORE INTO record(") + kRecordColumns + ") VALUES(" + kRecordMarks + ")";
+        std::string("INSERT OR IGNORE INTO record(") + kRecordColumns + ",id) VALUES(" + kRecordMarks + ",?)";
     if (!insert_ && !insert_.prepare(db_, sql)) return written(false);
     if (!bindRecord(insert_, record)) return written(false);
+    if (ofShare_ && !insert_.bind(kRecordWidth + 1, highest_ + 1)) return written(false);
     const bool done = insert_.run();
-    if (done) added_ += sqlite3_changes(db_);
+    const int count = done ? sqlite3_changes(db_) : 0;
+    added_ += count;
+    highest_ += count;
     return written(done);
 }
 
