@@ -166,7 +166,7 @@ test("names that programs stumble over", () =>
     await row(page, "break.txt").click();
     await page.keyboard.press("F2");
     await page.keyboard.press("Enter"); // unchanged, though a field holds no line break
-    await page.waitForSelector(".dialog", { state: "detached" });
+    await page.waitForSelector(".in-place", { state: "detached" });
     assert.equal(await page.locator("#view .cell.name[title='line[LF]break.txt']").count(), 1);
     for (const [folder, inside] of [
       [/dossier/, "dedans.txt"],

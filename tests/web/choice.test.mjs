@@ -79,7 +79,7 @@ test("many at once: dragged as one task after one question, renamed far away", (
   withPage("admin", { path: "/projects/chosen" }, async (page) => {
     await row(page, nameOf(0)).click();
     await page.keyboard.press("F2");
-    await page.fill(".dialog .input", "zz far away.dat");
+    await page.fill(".in-place", "zz far away.dat");
     await page.keyboard.press("Enter");
     await page.waitForSelector("#view .row.selected.cursor >> text=zz far away.dat");
     const asked = [];

@@ -118,7 +118,17 @@ test("previews, thumbnails, rename, downloads", () =>
     await page.waitForSelector(".preview img");
     await page.keyboard.press("ArrowRight");
     await page.waitForSelector(".preview-title >> text=view 4.png");
+    await page.reload(); // the address keeps it, and the way back leads out of it
+    await page.waitForSelector(".preview-title >> text=view 4.png");
     await page.keyboard.press(" ");
+    await page.waitForFunction(() => !location.hash.includes("!"));
+    const tab = page.context().waitForEvent("page");
+    await row(page, "view 3").locator("a").click({ button: "middle" });
+    const other = await tab;
+    await other.waitForSelector(".preview-title >> text=view 3.png");
+    await other.close();
+    await page.bringToFront();
+    await row(page, "view 4").click();
     assert.equal(await page.locator(".preview").count(), 0); // and not open again
     await page.keyboard.press(" ");
     await page.waitForSelector(".preview img");
@@ -126,7 +136,10 @@ test("previews, thumbnails, rename, downloads", () =>
     await page.waitForSelector(".preview", { state: "detached" });
     await page.waitForSelector("#view .row.selected >> text=view 4.png"); // still here
     await page.keyboard.press("F2");
-    await page.fill(".dialog .input", "seen <b>here.png");
+    await page.fill(".in-place", "view 5.png");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector(".bubble >> text=“view 5.png” exists already");
+    await page.fill(".in-place", "seen <b>here.png");
     await page.keyboard.press("Enter");
     await page.waitForSelector("#view .row.selected >> text=seen <b>here.png");
     await page.keyboard.press("Control+a");

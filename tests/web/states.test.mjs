@@ -37,7 +37,8 @@ async function visitStates(page) {
   await accessible(page, "chosen");
   for (const [keys, opened, state, part] of [
     ["Shift+F10", ".menu", "context menu", ".menu"],
-    ["F2", ".dialog", "rename"], // with what lies behind a dialog
+    ["F2", ".in-place", "rename"],
+    ["Alt+n", ".dialog", "new folder"], // with what lies behind a dialog
     ["Alt+Enter", ".why li", "properties", ".dialog"],
     ["Control+k", ".dialog", "share a link", ".dialog"],
     ["?", ".dialog", "shortcuts", ".dialog"],

@@ -44,7 +44,7 @@ test("a search: live, sorted, filtered, true after operations", () =>
     await found(page, 3);
     await row(page, "needle & two.txt").click();
     await page.keyboard.press("F2");
-    await page.fill(".dialog .input", "needle & four.txt");
+    await page.fill(".in-place", "needle & four.txt");
     await page.keyboard.press("Enter");
     await page.waitForSelector("#view >> text=needle & four.txt");
     await row(page, "needle 'one'").click();

@@ -1,11 +1,12 @@
 // Where one is: the folder on screen, its listing, what is chosen in it.
 
+import { readAddress } from "./address.js";
 import { get, MISSING, session } from "./api.js";
 import { toast, toastFailure } from "./dialogs.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { emit } from "./events.js";
-import { isSearch, normalisePlace, parentOf } from "./path.js";
+import { isSearch, parentOf } from "./path.js";
 import { pref, setPref } from "./prefs.js";
 import { COLUMNS } from "./rows.js";
 import { Selection } from "./selection.js";
@@ -50,7 +51,7 @@ export function shareEntry(id) {
 
 // Opening goes through the address, so that back and forward work.
 export function go(id) {
-  if (normalisePlace(location.hash.slice(1)) === id) open(id);
+  if (readAddress().place === id) open(id);
   else location.hash = id;
 }
 
@@ -60,6 +61,12 @@ let toChoose = null;
 export function goTo(entry) {
   toChoose = entry.id;
   go(entry.parent);
+}
+
+// What the address says: a place, and in it an entry that is chosen.
+export function openAt(place, id) {
+  toChoose = id;
+  return open(place);
 }
 
 export function goUp() {

@@ -2,6 +2,7 @@
 
 import { setupAccess } from "./access.js";
 import { setupAccount } from "./account.js";
+import { readAddress } from "./address.js";
 import { setupActivity } from "./activity.js";
 import {
   browser,
@@ -9,6 +10,7 @@ import {
   goUp,
   loadShares,
   open,
+  openAt,
   refresh,
   setFilter,
   setKind,
@@ -25,12 +27,14 @@ import { setupKeys } from "./keys.js";
 import "./links.js";
 import { isUnreachable, untilReachable } from "./network.js";
 import { newFolder } from "./operations.js";
-import { isSearch, normalisePlace, parentOf } from "./path.js";
+import { isSearch, parentOf } from "./path.js";
 import { setupPathbar } from "./pathbar.js";
 import { setupPointer } from "./pointer.js";
+import { preview, previewed } from "./preview.js";
 import { openSearch, searchFor, setupSearch } from "./search.js";
 import { setupSession } from "./session.js";
 import { setupSettings } from "./settings.js";
+import { entryAt } from "./sources.js";
 import {
   emptyBin,
   emptyFolder,
@@ -206,6 +210,22 @@ function setupSidebar() {
   });
 }
 
+// Also on the way back and forward: a file that is looked at lies over its folder, which stays as it is.
+let shownFirst = false;
+
+async function followAddress() {
+  const { place, file } = readAddress();
+  if (place !== browser.id || !shownFirst) {
+    shownFirst = true;
+    await (file ? openAt(place, file) : open(place));
+  }
+  if (file === null || previewed() === file || readAddress().file !== file) return;
+  const index = browser.listing?.indexOf(file) ?? -1;
+  if (index >= 0) browser.selection.only(browser.listing.item(index), index);
+  const entry = browser.selection.single?.id === file ? browser.selection.single : await entryAt(file).catch(() => null);
+  if (entry && readAddress().file === file) preview(entry, true);
+}
+
 function fillTexts() {
   for (const node of document.querySelectorAll("[data-text]")) node.textContent = t(node.dataset.text);
   for (const node of document.querySelectorAll("[data-label]")) {
@@ -245,7 +265,7 @@ async function start() {
   setupSearch();
   setupActivity();
   setupDragAndDrop();
-  addEventListener("hashchange", () => open(normalisePlace(location.hash.slice(1))));
+  addEventListener("hashchange", followAddress);
   addEventListener("beforeunload", (event) => {
     if (uploadsRunning()) event.preventDefault();
   });
@@ -260,7 +280,7 @@ async function start() {
   }
   document.body.classList.add("started");
   setupTasks();
-  open(normalisePlace(location.hash.slice(1)));
+  followAddress();
 }
 
 start().catch((failure) => {

@@ -8,6 +8,7 @@ import { extensionOf } from "./entries.js";
 import { emit } from "./events.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
+import { askInPlace } from "./in_place.js";
 import { childOf, decode, encodeName, isSearch, nameOf, parentOf, splitExtension } from "./path.js";
 import { entryAt } from "./sources.js";
 import { t } from "./strings.js";
@@ -52,7 +53,7 @@ export function searchTask() {
 export async function rename(entry) {
   const unchanged = entry.name.replace(/[\r\n]/g, ""); // as a field shows it
   const [stem] = entry.isFolder ? [entry.name] : splitExtension(entry.name);
-  const renamed = await askText({
+  const asked = {
     title: t("rename.title"),
     label: t("name.label"),
     value: entry.name,
@@ -69,7 +70,11 @@ export async function rename(entry) {
       });
       return childOf(entry.parent, encodeName(name));
     },
-  });
+  };
+  const index = browser.listing.indexOf(entry.id);
+  browser.view.reveal(index < 0 ? browser.selection.cursor : index);
+  const row = index < 0 ? null : browser.view.rowAt(index);
+  const renamed = await (row ? askInPlace(row, asked) : askText(asked));
   if (!renamed || renamed === entry.id) return;
   if (entry.isFolder) emit("folders-changed", { ids: [entry.parent] });
   await refresh(renamed);

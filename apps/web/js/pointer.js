@@ -9,6 +9,10 @@ import { contextItems } from "./toolbar.js";
 export function setupPointer() {
   const { root } = browser.view;
   root.addEventListener("click", clicked);
+  // A link in a row takes the keyboard from the list no more than the row does.
+  root.addEventListener("focusin", (event) => {
+    if (event.target.closest("a")) root.focus({ preventScroll: true });
+  });
   root.addEventListener("dblclick", (event) => {
     if (indexOf(event) >= 0 && !event.target.closest("button") && !event.ctrlKey && !event.shiftKey) runCommand("open");
   });
@@ -42,6 +46,7 @@ function indexOf(event) {
 }
 
 function clicked(event) {
+  if (event.target.closest("a")) event.preventDefault();
   const { selection, listing } = browser;
   const sort = event.target.closest("[data-sort]");
   if (sort) return setSort(sort.dataset.sort);

@@ -1,5 +1,6 @@
 // A look at a file: pictures, text, sound and film; of everything else what it is.
 
+import { addressOf, readAddress } from "./address.js";
 import { readReply, send, urlOf } from "./api.js";
 import { browser } from "./browser.js";
 import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
@@ -15,7 +16,14 @@ const TEXT_KINDS = new Set(["text", "code", "misc", "sheet"]);
 
 let shown = null;
 
-export function preview(entry) {
+// The id of the file that is looked at.
+export function previewed() {
+  return shown?.entry.id;
+}
+
+// `there`: the address names it already.
+export function preview(entry, there = false) {
+  if (shown) return fill(entry);
   const node = h("dialog.preview", { "aria-label": t("preview.title") });
   const title = h("div.preview-title");
   const stage = h("div.stage");
@@ -38,6 +46,8 @@ export function preview(entry) {
     if (history.state?.preview) {
       leaving = true;
       history.back();
+    } else if (readAddress().file !== null) {
+      history.replaceState(null, "", addressOf(browser.id));
     }
   });
   node.addEventListener("click", (event) => {
@@ -55,7 +65,8 @@ export function preview(entry) {
   document.body.append(node);
   node.showModal();
   node.focus();
-  if (!leaving) enter();
+  if (!leaving && !there) enter();
+  return undefined;
 }
 
 // The way back leads out of the preview first. A step back takes a while: who opens the next preview meanwhile gets in
@@ -63,14 +74,14 @@ export function preview(entry) {
 let leaving = false;
 
 function enter() {
-  history.pushState({ preview: true }, "");
+  history.pushState({ preview: true }, "", addressOf(browser.id, shown.entry.id));
 }
 
 addEventListener("popstate", (event) => {
   if (leaving) {
     leaving = false;
     if (shown) enter();
-  } else if (!event.state?.preview) {
+  } else if (!event.state?.preview && readAddress().file === null) {
     shown?.node.close();
   }
 });
@@ -85,6 +96,7 @@ function step(by) {
     selection.pick(i);
     view.reveal(i);
     fill(entry);
+    if (!leaving) history.replaceState(history.state, "", addressOf(browser.id, entry.id));
     return;
   }
 }

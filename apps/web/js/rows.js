@@ -1,5 +1,6 @@
 // One row of the list, or one tile of the grid.
 
+import { addressOf } from "./address.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
 import { extensionOf, isLocked, isOffline, shownName } from "./entries.js";
 import { formatFullTime, formatSize, formatTime } from "./format.js";
@@ -86,6 +87,12 @@ function spoken(entry) {
     .join(", ");
 }
 
+// For a new tab, for the address to be copied; whatever else is done with a row the page does itself.
+function link(entry, attributes, ...children) {
+  const href = entry.isFolder ? addressOf(entry.id) : addressOf(entry.parent, entry.id);
+  return h("a.label", { href, tabindex: -1, draggable: "false", ...attributes }, children);
+}
+
 function check() {
   return h("button.check", { type: "button", tabindex: -1, "aria-label": t("select.one") });
 }
@@ -126,7 +133,7 @@ function listCells(entry, columns) {
       "span.cell.name",
       { role: "gridcell", title: plainName(entry.name) },
       picture(entry, "file-icon"),
-      h("span.label", {}, nameNode(shownName(entry)), h("span.sub", {}, sub)),
+      link(entry, {}, nameNode(shownName(entry)), h("span.sub", {}, sub)),
       badges(entry),
     ),
     ...cells.filter(Boolean),
@@ -139,8 +146,8 @@ function tileParts(entry) {
     check(),
     more(),
     h("span.tile-picture", {}, picture(entry, "file-icon large"), badges(entry)),
-    h(
-      "span.label",
+    link(
+      entry,
       { title: plainName(entry.name) },
       nameNode(shownName(entry), false),
       h("span.sub", {}, entry.size === null ? t("type.folder") : formatSize(entry.size)),

@@ -97,7 +97,7 @@ export class View {
       this.canvas.append(row);
     }
     const entry = this.listing.ready ? this.listing.item(index) : undefined;
-    if (row.entry !== entry || !row.filled) fillRow(row, index, entry, this.mode, this.columns);
+    if (!row.editing && (row.entry !== entry || !row.filled)) fillRow(row, index, entry, this.mode, this.columns);
     const y = Math.floor(index / box.across) * box.height - box.top + box.top / box.scale;
     const x = (index % box.across) * box.width;
     row.style.transform = `translate(${x}px, ${y}px)`;
