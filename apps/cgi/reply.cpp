@@ -24,6 +24,8 @@ std::string_view statusLine(Status status) {
             return "Status: 405 Method Not Allowed\r\n";
         case Status::kTooLarge:
             return "Status: 413 Content Too Large\r\n";
+        case Status::kUnsupportedType:
+            return "Status: 415 Unsupported Media Type\r\n";
         case Status::kTooMany:
             return "Status: 429 Too Many Requests\r\n";
         case Status::kBusy:

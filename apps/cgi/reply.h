@@ -25,6 +25,7 @@ enum class Status {
     kNotFound = 404,
     kMethodNotAllowed = 405,
     kTooLarge = 413,
+    kUnsupportedType = 415,
     kTooMany = 429,
     kBroken = 500,
     kBusy = 503

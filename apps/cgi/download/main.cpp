@@ -4,18 +4,14 @@
 //   paths_raw, path_raw, path   what to fetch (see pathParams): several paths, or a folder, come as a zip
 //   name                        of the zip, without ".zip"; default is that of the only folder, else "download"
 // A file answers HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since. Failures are JSON replies.
-#include <fcntl.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <string>
 #include <vector>
 
-#include "confined.h"
 #include "download/sending.h"
 #include "orvel/error_state.h"
-#include "orvel/file_info.h"
-#include "orvel/privilege.h"
 #include "orvel/share_path.h"
 #include "program/program.h"
 #include "reply.h"
@@ -23,37 +19,6 @@
 #include "vexo/web.h"
 
 namespace orvel::cgi {
-namespace {
-
-std::string lastComponent(const std::string& path) {
-    return path.substr(path.rfind('/') + 1);
-}
-
-// The path's last component, unless it cannot be a file name: ".." would lead out of the client's own folder.
-std::string nameOf(const PathInfo& info, const Descriptor& found) {
-    const std::string name = lastComponent(info.path);
-    return name != "." && name != ".." ? name : lastComponent(realPathOf(found));
-}
-
-// Resolves, asks and opens a source as the user. 0 or a library code.
-int openSource(const User& user, Source& source) {
-    PathInfo info;
-    OrvLibSetErr(ORV_ERR_NONE);
-    if (!PathInfoFactory::create(user.name.c_str(), source.asked, info)) return lastCode();
-    OrvLibSetErr(ORV_ERR_NONE);
-    if (!CheckShareDownloadPrivilege(user.name.c_str(), user.sid.c_str(), info.path.c_str())) {
-        return lastCode(ORV_ERR_DENIED);
-    }
-    Descriptor found;
-    const int code = confinedOpen(info, linkPolicyOf(info.shareName), O_PATH, found);
-    if (code != ORV_ERR_NONE) return code;
-    source.path = info.path;
-    source.name = nameOf(info, found);
-    return openFound(found, info.realPath, source);
-}
-
-}  // namespace
-
 void serveDownloadProgram(Request& request, Output& out) {
     const User& user = request.user;
     const VEXO::WebCGI& web = request.web;
@@ -65,7 +30,7 @@ void serveDownloadProgram(Request& request, Output& out) {
         std::any_of(paths->begin(), paths->end(), [](const std::string& path) { return IsDirUserHome(path, nullptr); });
     std::string culprit = paths->front();
     std::vector<Source> sources;
-    const OpenSource open = [&user](Source& source) { return openSource(user, source); };
+    const OpenSource open = [&user](Source& source) { return openToSend(user, source); };
     int code = actAs(user.sid.c_str(), user.name, home);
     if (code == ORV_ERR_NONE) code = findSources(*paths, open, sources, culprit);
     if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), user.cookie, code, culprit);

@@ -17,6 +17,8 @@
 #include "free_names.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
+#include "orvel/privilege.h"
+#include "orvel/share_path.h"
 #include "text.h"
 
 namespace orvel::cgi {
@@ -64,7 +66,33 @@ bool openAgain(Source& source, const std::string& name, const OpenSource& open, 
     return same;
 }
 
+std::string lastComponent(const std::string& path) {
+    return path.substr(path.rfind('/') + 1);
+}
+
+// The path's last component, unless it cannot be a file name: ".." would lead out of the client's own folder.
+std::string nameOf(const PathInfo& info, const Descriptor& found) {
+    const std::string name = lastComponent(info.path);
+    return name != "." && name != ".." ? name : lastComponent(realPathOf(found));
+}
+
 }  // namespace
+
+int openToSend(const User& user, Source& source) {
+    PathInfo info;
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(user.name.c_str(), source.asked, info)) return lastCode();
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!CheckShareDownloadPrivilege(user.name.c_str(), user.sid.c_str(), info.path.c_str())) {
+        return lastCode(ORV_ERR_DENIED);
+    }
+    Descriptor found;
+    const int code = confinedOpen(info, linkPolicyOf(info.shareName), O_PATH, found);
+    if (code != ORV_ERR_NONE) return code;
+    source.path = info.path;
+    source.name = nameOf(info, found);
+    return openFound(found, info.realPath, source);
+}
 
 int openFound(const Descriptor& found, const std::string& realPath, Source& source) {
     if (fstat(found.get(), &source.status) != 0) return refusalCode(errno, realPath);

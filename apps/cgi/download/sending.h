@@ -36,6 +36,10 @@ int findSources(const std::vector<std::string>& paths, const OpenSource& open, s
 // something. 0 or a library code; `realPath` is where it lies.
 int openFound(const Descriptor& found, const std::string& realPath, Source& source);
 
+// Resolves `source.asked`, asks for the privilege to download it, and opens it as the user, whose identity the process
+// has taken on. 0 or a library code.
+int openToSend(const User& user, Source& source);
+
 // A refusal must not be taken for the file: unlike in other programs it shows in the HTTP status.
 Status httpStatusOf(int code);
 

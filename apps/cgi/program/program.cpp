@@ -27,6 +27,7 @@ constexpr Program kPrograms[] = {{"list", kAsking, kForm, Caller::kUser, true, s
                                  {"operation", kAsking, kForm, Caller::kUser, false, serveOperationProgram},
                                  {"search", kAsking, kForm, Caller::kUser, false, serveSearchProgram},
                                  {"share", kAsking, kForm, Caller::kAnybody, false, serveShareProgram},
+                                 {"thumbnail", kAsking, kForm, Caller::kUser, true, serveThumbnailProgram},
                                  {"upload", "POST, PUT", kAnyLength, Caller::kUser, false, serveUploadProgram},
                                  {"why", kAsking, kForm, Caller::kUser, true, serveWhyProgram}};
 

@@ -44,6 +44,7 @@ void serveLinkProgram(Request& request, Output& out);
 void serveOperationProgram(Request& request, Output& out);
 void serveSearchProgram(Request& request, Output& out);
 void serveShareProgram(Request& request, Output& out);
+void serveThumbnailProgram(Request& request, Output& out);
 void serveUploadProgram(Request& request, Output& out);
 void serveWhyProgram(Request& request, Output& out);
 

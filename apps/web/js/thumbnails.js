@@ -3,20 +3,39 @@
 import { urlOf } from "./api.js";
 import { h } from "./dom.js";
 import { canShowImage } from "./icons.js";
+import { splitExtension } from "./path.js";
 
-// The whole file is fetched: larger ones keep their icon.
+// What the appliance draws small.
+const DRAWN = new Set(["jpg", "jpeg", "png", "webp", "gif", "tif", "tiff", "heic", "heif", "avif", "pdf"]);
+const EDGE = 256;
+// Of all else that a browser shows the whole file is fetched: larger ones keep their icon.
 const LARGEST = 4 * 1024 * 1024;
 
+function sourcesOf(entry) {
+  const sources = [];
+  if (DRAWN.has(splitExtension(entry.name)[1].slice(1).toLowerCase())) {
+    const size = window.devicePixelRatio > 1 ? 2 * EDGE : EDGE;
+    // The version makes another address of a file that has changed: what the browser keeps is not shown for it.
+    sources.push(urlOf("thumbnail", { path_raw: entry.id, size, version: `${entry.size}-${entry.mtime}` }));
+  }
+  if (canShowImage(entry.name) && entry.size <= LARGEST) sources.push(urlOf("download", { path_raw: entry.id }));
+  return sources;
+}
+
 export function thumbnailOf(entry, drawn) {
-  if (entry.isFolder || !entry.size || entry.size > LARGEST || !canShowImage(entry.name)) return drawn;
+  const sources = entry.isFolder || !entry.size ? [] : sourcesOf(entry);
+  if (sources.length === 0) return drawn;
   const frame = h("span.thumbnail", {}, drawn);
   const image = h("img", { alt: "", loading: "lazy", decoding: "async", draggable: "false" });
   image.addEventListener("load", () => {
     frame.classList.add("loaded");
     drawn.remove();
   });
-  image.addEventListener("error", () => image.remove());
-  image.src = urlOf("download", { path_raw: entry.id });
+  image.addEventListener("error", () => {
+    if (sources.length === 0) image.remove();
+    else image.src = sources.shift();
+  });
+  image.src = sources.shift();
   frame.append(image);
   return frame;
 }
