@@ -36,6 +36,17 @@ test("sorting keeps folders first, both ways", () =>
     await page.waitForSelector("[aria-sort=descending]");
     await rowsReady(page);
     assert.match((await names(page))[0], /Landscapes/);
+    await page.click(".columns-button");
+    await page.click(".menu >> text=Group");
+    await page.click(".columns-button");
+    await page.click(".menu >> text=Dense");
+    await page.waitForSelector("#view .row .group >> text=users");
+    assert.equal((await row(page, "Landscapes").boundingBox()).height, 28);
+    await page.setViewportSize({ width: 800, height: 800 });
+    await page.waitForSelector("#view .group", { state: "detached" }); // there is no room for it
+    assert.ok((await page.locator("#view .row .cell.name").first().boundingBox()).width >= 200);
+    await page.setViewportSize({ width: 1280, height: 800 });
+    await page.waitForSelector("#view .row .group");
     await page.press("#view", "End");
     await page.waitForSelector("#view .row.cursor .size >> text=/^0 B$/");
     await page.click("[data-sort=name]");

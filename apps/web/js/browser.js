@@ -2,13 +2,13 @@
 
 import { readAddress } from "./address.js";
 import { get, MISSING, session } from "./api.js";
+import { chosenColumns, COLUMNS } from "./columns.js";
 import { toast, toastFailure } from "./dialogs.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { emit } from "./events.js";
 import { isSearch, parentOf } from "./path.js";
 import { pref, setPref } from "./prefs.js";
-import { COLUMNS } from "./rows.js";
 import { Selection } from "./selection.js";
 import { entryAt, folderListing, searchResults } from "./sources.js";
 import { t } from "./strings.js";
@@ -74,13 +74,7 @@ export function goUp() {
 }
 
 function columns() {
-  const { name, folder, size, mtime, type, owner } = COLUMNS;
-  return (isSearch(browser.id) ? [name, folder, size, mtime, type] : [name, size, mtime, type, owner]).map(
-    (column) => ({
-      ...column,
-      sorted: column.sort !== browser.sort.by ? null : browser.sort.ascending ? "ascending" : "descending",
-    }),
-  );
+  return chosenColumns(isSearch(browser.id), browser.sort);
 }
 
 function changed(listing) {

@@ -17,6 +17,7 @@ import {
   setSort,
   shareEntry,
 } from "./browser.js";
+import { applyDensity } from "./columns.js";
 import { context, runCommand } from "./commands.js";
 import { setWhy } from "./dialogs.js";
 import { $, h, keepFocus, loadIcons } from "./dom.js";
@@ -245,12 +246,16 @@ async function start() {
   on("shown", showPlace);
   on("listing", paintListing);
   on("selection", () => browser.listing && browser.view.listing === browser.listing && browser.view.paintSelection());
+  on("columns", () => {
+    if (browser.listing) browser.view.setColumns(columns());
+  });
   on("access", () => {
     if (browser.id !== "/") paintListing();
   });
   on("shares", () => {
     if (browser.id === "/" && homeShown) showPlace();
   });
+  applyDensity();
   setupAccess();
   setupToolbar(setSort);
   setupPathbar();

@@ -9,7 +9,7 @@ function closeMenu() {
   current?.close();
 }
 
-// items: {label, icon, shortcut, run, disabled, danger, checked}, {heading} or "-".
+// items: {label, icon, shortcut, run, disabled, danger, checked}, {heading} or "-"; `several` of a row of ticks.
 export function openMenu(items, { x, y, anchor = null }) {
   closeMenu();
   const before = document.activeElement;
@@ -49,7 +49,7 @@ function itemNode(item, close) {
     "button.menu-item",
     {
       type: "button",
-      role: radio ? "menuitemradio" : "menuitem",
+      role: item.several ? "menuitemcheckbox" : radio ? "menuitemradio" : "menuitem",
       tabindex: -1,
       disabled: item.disabled,
       "aria-checked": radio ? String(item.checked) : null,

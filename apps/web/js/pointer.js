@@ -1,6 +1,7 @@
 // The pointer in the list: choosing, opening, the context menu.
 
 import { browser, go, setSort } from "./browser.js";
+import { openColumnMenu } from "./columns.js";
 import { runCommand } from "./commands.js";
 import { preview } from "./preview.js";
 import { openMenu } from "./menu.js";
@@ -20,6 +21,7 @@ export function setupPointer() {
   root.parentElement.addEventListener("contextmenu", (event) => {
     if (root.hidden) return;
     event.preventDefault();
+    if (event.target.closest(".header")) return openColumnMenu({ x: event.clientX, y: event.clientY });
     if (event.target === root && isFromKeyboard(event)) return menuAtCursor();
     const index = indexOf(event);
     if (index < 0) browser.selection.clear();
@@ -48,6 +50,8 @@ function indexOf(event) {
 function clicked(event) {
   if (event.target.closest("a")) event.preventDefault();
   const { selection, listing } = browser;
+  const choice = event.target.closest("[data-columns]");
+  if (choice) return openColumnMenu({ anchor: choice });
   const sort = event.target.closest("[data-sort]");
   if (sort) return setSort(sort.dataset.sort);
   if (event.target.closest("[data-all]"))

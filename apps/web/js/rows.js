@@ -2,27 +2,11 @@
 
 import { addressOf } from "./address.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
-import { extensionOf, isLocked, isOffline, shownName } from "./entries.js";
-import { formatFullTime, formatSize, formatTime } from "./format.js";
+import { isLocked, isOffline, shownName } from "./entries.js";
+import { formatSize, formatTime } from "./format.js";
 import { iconOf } from "./icons.js";
-import { decode } from "./path.js";
 import { t } from "./strings.js";
 import { thumbnailOf } from "./thumbnails.js";
-
-// id, and how a cell shows it. `sort` is the server's name of the order.
-export const COLUMNS = {
-  name: { id: "name", sort: "name" },
-  folder: { id: "folder", sort: "ppath", text: (entry) => plainName(decode(entry.parent)) },
-  size: { id: "size", sort: "size", text: (entry) => (entry.size === null ? "" : formatSize(entry.size)) },
-  mtime: {
-    id: "mtime",
-    sort: "mtime",
-    text: (entry) => formatTime(entry.mtime),
-    title: (entry) => formatFullTime(entry.mtime),
-  },
-  type: { id: "type", sort: "type", text: (entry) => (entry.isFolder ? t("type.folder") : extensionOf(entry)) },
-  owner: { id: "owner", sort: "user", text: (entry) => entry.owner },
-};
 
 export function makeHeader(columns) {
   return h(
@@ -47,7 +31,15 @@ export function makeHeader(columns) {
             ),
       ),
     ),
-    h("span.more-cell", { role: "columnheader" }, h("span.visually-hidden", {}, t("menu.more"))),
+    h(
+      "span.more-cell",
+      { role: "columnheader" },
+      h(
+        "button.columns-button",
+        { type: "button", "data-columns": "", "aria-label": t("columns.open"), title: t("columns.open"), "aria-haspopup": "menu" },
+        icon("columns"),
+      ),
+    ),
   );
 }
 

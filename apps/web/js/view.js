@@ -1,6 +1,7 @@
 // The rows (or tiles) of a long list: only those in sight are in the document.
 
 import { isCut } from "./clipboard.js";
+import { fitColumns } from "./columns.js";
 import { h, keepFocus, set } from "./dom.js";
 import { makeRow, fillRow, makeHeader } from "./rows.js";
 
@@ -20,21 +21,52 @@ export class View {
     this.mode = "list";
     this.onScrolled = onScrolled;
     root.addEventListener("scroll", () => this.scrolled(), { passive: true });
-    new ResizeObserver(() => this.render()).observe(root);
+    new ResizeObserver(() => {
+      this.fit();
+      this.render();
+    }).observe(root);
   }
 
   show(listing, selection, mode, columns) {
     this.listing = listing;
     this.selection = selection;
     this.mode = mode;
-    this.columns = columns;
+    this.all = columns;
+    this.columns = [];
     this.rows.clear();
     this.canvas.replaceChildren();
-    this.header = mode === "list" ? makeHeader(columns) : null;
-    this.root.className = `view ${mode} ${columns.map((column) => `has-${column.id}`).join(" ")}`;
-    keepFocus(this.root, () => this.root.replaceChildren(...(this.header ? [this.header] : []), this.canvas));
+    this.header = null;
+    if (mode === "list") this.fit();
+    else this.dress();
     this.root.scrollTop = 0;
     this.render();
+  }
+
+  // The columns that there is room for; rows are made anew when these are others.
+  fit() {
+    if (this.mode !== "list" || !this.all) return;
+    const { fitting, template } = fitColumns(this.all, this.root.clientWidth);
+    this.root.style.setProperty("--columns", template);
+    if (this.header && fitting.length === this.columns.length) return;
+    this.columns = fitting;
+    this.header = makeHeader(fitting);
+    for (const row of this.rows.values()) row.filled = false;
+    this.dress();
+  }
+
+  // Others are wanted, or rows of another height.
+  setColumns(columns) {
+    const line = this.measure().top / this.shape.height;
+    this.all = columns;
+    this.header = null;
+    this.fit();
+    this.root.scrollTop = (line * this.shape.height) / this.measure().scale;
+    this.render();
+  }
+
+  dress() {
+    this.root.className = `view ${this.mode} ${this.columns.map((column) => `has-${column.id}`).join(" ")}`;
+    keepFocus(this.root, () => this.root.replaceChildren(...(this.header ? [this.header] : []), this.canvas));
   }
 
   // How many there are per line, how high a line is, how many lines there are.
