@@ -22,6 +22,27 @@ before(() => {
 });
 after(() => rmSync(files, { recursive: true }));
 
+// What a camera held upright makes: a large file whose head holds a small picture of another shape.
+async function photo(page) {
+  const small = await page.evaluate(async () => {
+    const canvas = new OffscreenCanvas(160, 160);
+    canvas.getContext("2d").fillRect(0, 20, 160, 120);
+    return [...new Uint8Array(await (await canvas.convertToBlob({ type: "image/jpeg" })).arrayBuffer())];
+  });
+  const word = (...values) => values.flatMap((value) => [value >> 8, value & 255]);
+  const field = (tag, type, value) => [...word(tag, type), ...word(0, 1), ...(type === 3 ? word(value, 0) : word(0, value))];
+  const tiff = [
+    ...word(0x4d4d, 42, 0, 8),
+    ...[...word(1), ...field(0x0112, 3, 6), ...word(0, 26)],
+    ...[...word(2), ...field(0x0201, 4, 56), ...field(0x0202, 4, small.length), ...word(0, 0)],
+    ...small,
+  ];
+  const exif = [...Buffer.from("Exif\0\0", "latin1"), ...tiff];
+  const frame = [8, ...word(3000, 4000), 1, 1, 0x11, 0];
+  const head = [0xff, 0xd8, 0xff, 0xe1, ...word(exif.length + 2), ...exif, 0xff, 0xc0, ...word(frame.length + 2), ...frame];
+  return Buffer.concat([Buffer.from(head), Buffer.alloc(5 << 20)]);
+}
+
 const card = (page, text) => page.locator(".activity-card", { hasText: text }).first();
 
 test("uploads: files, a folder, a conflict asked about once, cancel", () =>
@@ -47,6 +68,7 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     assert.equal(readFileSync(join(there, "two, three*.txt"), "utf8"), "two, three*.txt, new");
     await upload(page, "Upload files", some);
     await page.waitForSelector(".dialog >> text=The file exists already");
+    await page.check(".dialog >> text=Do the same for the 2 others");
     await page.click(".dialog >> text=Keep both");
     await page.waitForSelector("#view >> text=four (2).txt");
     await wentWell(page, "3 files uploaded");
@@ -59,6 +81,8 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     assert.equal(await page.locator(".dialog").count(), 0); // though three stood in line
     for (const name of some) writeFileSync(name, "newer");
     await upload(page, "Upload files", some);
+    await page.locator(".dialog .compared figure:has-text('To come'):has-text('newer')").waitFor();
+    await page.check(".dialog >> text=Do the same");
     await page.click(".dialog >> text=Replace");
     await wentWell(page, "3 files uploaded");
     assert.equal(readFileSync(join(there, "one.txt"), "utf8"), "newer");
@@ -109,9 +133,14 @@ test("previews, thumbnails, rename, downloads", () =>
     await row(page, "list & more").dblclick();
     await page.waitForSelector(".preview pre >> text=<b>bread</b>");
     await page.keyboard.press("Escape");
+    writeFileSync(join(projects, "incoming “1”/trip/day 1/camera.jpg"), await photo(page));
     await row(page, "day 1").dblclick();
     await page.click(".view-switch button >> nth=1");
     await page.waitForFunction(() => document.querySelectorAll(".thumbnail.loaded img").length === 8);
+    // Of a photo no more than its head is fetched; its small picture is turned, without the bars.
+    await page.waitForFunction(() => document.querySelector(".thumbnail canvas"));
+    const shape = await page.locator(".thumbnail canvas").evaluate(({ width, height }) => [width, height]);
+    assert.deepEqual(shape, [120, 160]);
     await row(page, "view 3").click();
     await page.focus("#view");
     await page.keyboard.press(" ");

@@ -2,11 +2,13 @@
 
 import { MISSING, post } from "./api.js";
 import { dialog } from "./dialogs.js";
-import { h, nameNode } from "./dom.js";
+import { h, icon, nameNode } from "./dom.js";
 import { formatSize, formatTime } from "./format.js";
-import { decode, encodeName, inForms } from "./path.js";
+import { kindOfName } from "./icons.js";
+import { childOf, decode, encodeName, inForms } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
+import { thumbnailOf, thumbnailOfFile } from "./thumbnails.js";
 
 // Which of the names (encoded) the folder has already: name -> {isFolder, size, mtime}.
 export async function takenNames(folder, names) {
@@ -29,8 +31,8 @@ export function cannotReplace({ comes, there }) {
 }
 
 // Asks about one pair of {name, comes, there}, or about many at once. {answer: "skip", "overwrite" or "both", all}; null
-// when it shall not go on. `more`: there are others to decide about.
-export function askConflict({ folder, pairs, more = false }) {
+// when it shall not go on. `more`: there may be others to decide about, `known` of which are certain.
+export function askConflict({ folder, pairs, more = false, known = 0 }) {
   const [first] = pairs;
   const stuck = pairs.filter(cannotReplace).length;
   const kind = pairs.length > 1 ? "many" : stuck > 0 ? "clash" : first.comes.isFolder ? "folder" : "file";
@@ -39,7 +41,7 @@ export function askConflict({ folder, pairs, more = false }) {
   return dialog({
     title: t(`conflict.title.${kind}`, { count: pairs.length }),
     fill: (close) => {
-      const all = h("input", { type: "checkbox", checked: more });
+      const all = h("input", { type: "checkbox" });
       const button = (style, value, key) =>
         h(
           `button.button${style}`,
@@ -53,8 +55,8 @@ export function askConflict({ folder, pairs, more = false }) {
           {},
           pairs.length === 1 && h("p", {}, h("b", {}, nameNode(decode(first.name)))),
           texts.map((text) => h("p.soft", {}, text)),
-          kind === "file" && comparison(first),
-          more && h("label.check-line", {}, all, t("conflict.all")),
+          kind === "file" && comparison(first, folder),
+          more && h("label.check-line", {}, all, known > 0 ? t("conflict.all.known", { count: known }) : t("conflict.all")),
         ),
         h(
           "footer",
@@ -68,11 +70,25 @@ export function askConflict({ folder, pairs, more = false }) {
   });
 }
 
-function comparison({ comes, there }) {
-  const line = (key, { size, mtime }) => [
-    h("dt", {}, t(key)),
-    h("dd", {}, [size !== null && formatSize(size), formatTime(mtime)].filter(Boolean).join(" · ")),
-  ];
+// Both files side by side: picture, size, time.
+function comparison({ name, comes, there }, folder) {
   if (comes.size === undefined || comes.size === null) return null; // chosen by name alone
-  return h("dl.compared", {}, line("conflict.there", there), line("conflict.comes", comes));
+  const shown = decode(name);
+  const drawn = () => icon(`kind-${kindOfName(shown)}`, "file-icon large");
+  const file = (key, { size, mtime }, picture, newer) =>
+    h(
+      "figure",
+      {},
+      h("span.tile-picture", {}, picture),
+      h("figcaption", {}, h("b", {}, t(key)), size !== null && h("span", {}, formatSize(size)), h("span", {}, formatTime(mtime)), newer && h("span.newer", {}, t("conflict.newer"))),
+    );
+  const thumbnail = ({ id, size, mtime }) => thumbnailOf({ id, name: shown, size, mtime, isFolder: false }, drawn());
+  const here = thumbnail({ ...there, id: childOf(folder, name) });
+  const coming = comes.file ? thumbnailOfFile(comes.file, drawn()) : thumbnail(comes);
+  return h(
+    "div.compared",
+    {},
+    file("conflict.there", there, here, there.mtime > comes.mtime),
+    file("conflict.comes", comes, coming, comes.mtime > there.mtime),
+  );
 }

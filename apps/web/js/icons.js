@@ -42,6 +42,11 @@ export function kindOf(item, id, mount) {
   return picture !== undefined && picture !== "folder" ? picture : folderKindOf(id, mount);
 }
 
+// The kind of a file of which only the name is known.
+export function kindOfName(name) {
+  return BY_EXTENSION.get(splitExtension(name)[1].slice(1).toLowerCase().replace(/^tar\./, "")) ?? "misc";
+}
+
 // The kind of a folder of which only the place is known.
 export function folderKindOf(id, mount) {
   if (mount === "remotefail") return "folder-offline";

@@ -32,7 +32,7 @@ export class Job {
 
   get pair() {
     const { size, lastModified } = this.file;
-    return { name: this.name, comes: { isFolder: false, size, mtime: lastModified / 1000 }, there: this.meets };
+    return { name: this.name, comes: { isFolder: false, size, mtime: lastModified / 1000, file: this.file }, there: this.meets };
   }
 
   async run() {
@@ -74,8 +74,9 @@ export class Job {
     if (this.state === "cancelled") return null;
     const kind = cannotReplace(this.pair) ? "clash" : "file";
     if (batch.answers[kind]) return batch.answers[kind];
-    const more = batch.jobs.some((one) => one !== this && ["waiting", "running"].includes(one.state));
-    const said = await askConflict({ folder: parentOf(this.id), pairs: [this.pair], more });
+    const others = batch.jobs.filter((one) => one !== this && ["waiting", "running"].includes(one.state));
+    const known = others.filter((one) => one.meets !== null).length;
+    const said = await askConflict({ folder: parentOf(this.id), pairs: [this.pair], more: others.length > 0, known });
     if (said?.all) batch.answers[kind] = said.answer;
     if (!said) batch.cancel();
     return said?.answer ?? null;
