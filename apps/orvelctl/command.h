@@ -20,6 +20,7 @@ int link(const std::vector<std::string>& words);
 int sharing(const std::vector<std::string>& words);
 int status(const std::vector<std::string>& words);
 int doctor(const std::vector<std::string>& words);
+int sweep(const std::vector<std::string>& words);
 int volumes(const std::vector<std::string>& words);
 int help(const std::vector<std::string>& words);
 int completion(const std::vector<std::string>& words);

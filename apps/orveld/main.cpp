@@ -15,6 +15,7 @@
 #include <string>
 #include <string_view>
 
+#include "base/printable.h"
 #include "child.h"
 #include "descriptors.h"
 #include "listener.h"
@@ -22,6 +23,7 @@
 #include "oom.h"
 #include "server.h"
 #include "vexo/process.h"
+#include "vexo/volume.h"
 
 namespace orvel::orveld {
 namespace {
@@ -46,6 +48,18 @@ bool closeOthers(int listener) {
     return close_range(after, ~0U, 0) == 0;
 }
 
+// In a process of its own: a disk that does not answer must not keep requests waiting, and what is missing is made by
+// who needs it.
+void prepareVolumes() {
+    if (fork() != 0) return;
+    close_range(STDERR_FILENO + 1, ~0U, 0);
+    const auto report = [](const VEXOVOLUMENOTE* note, void*) {
+        if (note->error == 0) return;
+        syslog(LOG_ERR, "orveld: %s: %s", printable(note->folder).c_str(), std::strerror(note->error));
+    };
+    _exit(VEXOVolumesPrepare(report, nullptr) == 0 ? 0 : 1);
+}
+
 int serve(std::string path) {
     int listener = inheritedListener();
     if (!closeOthers(listener)) return 1;
@@ -53,6 +67,7 @@ int serve(std::string path) {
     tzset();
     VEXOWarm();
     closelog();
+    prepareVolumes();
     std::string error;
     const bool own = listener < 0;
     if (own) {

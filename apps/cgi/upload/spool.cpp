@@ -1,6 +1,5 @@
 #include "upload/spool.h"
 
-#include <dirent.h>
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
@@ -8,8 +7,10 @@
 #include <array>
 #include <cerrno>
 #include <ctime>
+#include <vector>
 
 #include "base/random.h"
+#include "folder_names.h"
 #include "orvel/error_state.h"
 #include "orvel/upload_check.h"
 #include "temporary_folder.h"
@@ -20,24 +21,24 @@ namespace {
 constexpr std::string_view kPrefix = "part-";
 constexpr time_t kAbandonedAfter = 3600;  // seconds
 
-// Removes what a killed process left under a name: nobody holds its lock, and it has not been written to for a while
-// (a file is unlocked for a moment after it was made).
-void removeAbandoned(const Descriptor& folder) {
-    const int fd = openat(folder.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    DIR* names = fd < 0 ? nullptr : fdopendir(fd);
-    if (names == nullptr) return;
-    while (const dirent* entry = readdir(names)) {
-        const std::string_view name = entry->d_name;
+}  // namespace
+
+// What nobody holds the lock of and has not been written to for a while (a file is unlocked for a moment after it was
+// made).
+long removeAbandonedUploads(const Descriptor& folder) {
+    std::vector<std::string> names;
+    if (!namesIn(folder.get(), Hidden::kInclude, names)) return -1;
+    long removed = 0;
+    for (const std::string& name : names) {
         if (!name.starts_with(kPrefix) && !isPartName(name)) continue;
-        const Descriptor file(openat(folder.get(), entry->d_name, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+        const Descriptor file(openat(folder.get(), name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
         struct stat status {};
         const bool old = file && fstat(file.get(), &status) == 0 && status.st_mtime < time(nullptr) - kAbandonedAfter;
-        if (old && flock(file.get(), LOCK_EX | LOCK_NB) == 0) unlinkat(folder.get(), entry->d_name, 0);
+        if (!old || flock(file.get(), LOCK_EX | LOCK_NB) != 0) continue;
+        if (unlinkat(folder.get(), name.c_str(), 0) == 0) ++removed;
     }
-    closedir(names);
+    return removed;
 }
-
-}  // namespace
 
 int uploadCodeOf(int error) {
     switch (error) {
@@ -85,7 +86,7 @@ int Spool::openFolder(const std::string& volumePath) {
 int Spool::open(const std::string& volumePath) {
     const int code = openFolder(volumePath);
     if (code != ORV_ERR_NONE) return code;
-    removeAbandoned(folder_);
+    static_cast<void>(removeAbandonedUploads(folder_));
     const std::string drawn = draw<16>();
     if (drawn.empty()) return uploadCodeOf(errno);
     name_ = std::string(kPrefix) + drawn;

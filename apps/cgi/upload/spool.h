@@ -15,6 +15,9 @@ namespace orvel::cgi {
 // The library code for a failure to store what was uploaded, an errno value.
 int uploadCodeOf(int error);
 
+// Removes what killed uploads left in one user's folder of uploads, and counts it; -1 with errno.
+long removeAbandonedUploads(const Descriptor& folder);
+
 // A file without a name where the file system can make one, so that it goes away with the process, however that ends;
 // else one with a name of its own in a folder that only the user can enter.
 class Spool {

@@ -20,6 +20,8 @@ VEXO_API int VEXOAutoBlockResetByIP(const char* address);
 // Counts one failed log-in at the service `tag` (1 to 64 bytes, no control bytes). As many of one address and tag as
 // autoblock_attempts says within autoblock_minutes deny the address. 0 (also while the service is off), or -1.
 VEXO_API int AutoBlockFailLoginSet(const char* address, const char* tag);
+// Forgets what has ended, and counts it; -1 on failure.
+VEXO_API long VEXOAutoBlockSweep(void);
 VEXO_END_C
 
 #endif

@@ -166,6 +166,8 @@ VEXO_API int FILEIDXIndexBegin(const char* share, int mode, char* path, int size
 VEXO_API int FILEIDXIndexEnd(const char* share, int done);
 // Removes the share's index; removing none is 0.
 VEXO_API int FILEIDXIndexDrop(const char* share);
+// Removes what killed builds left, and counts it; -1 on failure.
+VEXO_API long FILEIDXSweep(void);
 // 0, or <0 with 0x0600 when there is none.
 VEXO_API int FILEIDXIndexStatus(const char* share, FIINDEXSTATUS* status);
 VEXO_END_C

@@ -80,6 +80,8 @@ class VEXO_API TaskMgr {
     // Appends the names of all tasks that begin with `prefix` to the array `names`, sorted. False when they cannot be
     // listed, `names` as it was.
     bool getAllTaskId(const char* prefix, Json::Value& names) const;
+    // Appends the names of all users who ever had tasks to the array `users`, sorted. As above.
+    static bool getAllUsers(Json::Value& users);
 
  private:
     struct Impl;

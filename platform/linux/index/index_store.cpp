@@ -1,6 +1,7 @@
 // The store of the shares' indexes: building, replacing, asking about them.
 #include "index/index_store.h"
 
+#include <dirent.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -10,7 +11,10 @@
 #include <ctime>
 #include <exception>
 #include <map>
+#include <memory>
+#include <string_view>
 
+#include "base/owner.h"
 #include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
@@ -28,6 +32,7 @@ namespace {
 
 constexpr const char* kFolder = "/var/lib/vexo/index";
 constexpr const char* kParent = "/var/lib/vexo";
+constexpr std::string_view kNew = ".new";  // of an index while it is built
 
 // What this process is writing of a share.
 struct Work {
@@ -46,7 +51,7 @@ std::string storePath(std::string_view share, const char* suffix) {
 }
 
 std::string newPath(std::string_view share) {
-    return storePath(share, ".new");
+    return storePath(share, kNew.data());
 }
 
 bool makeStore() {
@@ -56,8 +61,8 @@ bool makeStore() {
 }
 
 // The lock that everybody takes who writes the share's index. Empty with the slot filled: 0x0800 somebody has it.
-Descriptor lockIndex(std::string_view share) {
-    Descriptor lock = openFile(storePath(share, ".lock"), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK, 0600);
+Descriptor lockFile(const std::string& path) {
+    Descriptor lock = openFile(path, O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK, 0600);
     int result = lock ? 0 : -1;
     do {
         if (lock) result = flock(lock.get(), LOCK_EX | LOCK_NB);
@@ -65,6 +70,10 @@ Descriptor lockIndex(std::string_view share) {
     if (result == 0) return lock;
     fail(errno == EWOULDBLOCK ? static_cast<int>(VEXO_ERR_EXISTS) : errorOfErrno(errno));
     return Descriptor();
+}
+
+Descriptor lockIndex(std::string_view share) {
+    return lockFile(storePath(share, ".lock"));
 }
 
 bool removeFile(const std::string& path) {
@@ -146,6 +155,22 @@ bool endUpdate(const std::string& share, bool done) {
     if (!done) return true;
     const std::unique_ptr<Database> database = Database::open(indexPath(share), {false, true});
     return database != nullptr && noteTime(database->handle(), false);
+}
+
+// Removes what killed builds left, unless the share's index is being written.
+long removeUnfinished() {
+    const std::string folder = VEXO::SystemPath(kFolder);
+    const std::unique_ptr<DIR, orvel::Releaser<closedir>> names(opendir(folder.c_str()));
+    if (names == nullptr) return errno == ENOENT ? 0 : fail(errorOfErrno(errno));
+    long removed = 0;
+    while (const dirent* entry = readdir(names.get())) {
+        const std::string_view name = entry->d_name;
+        if (!name.ends_with(kNew)) continue;
+        const std::string stem = folder + "/" + std::string(name.substr(0, name.size() - kNew.size()));
+        const Descriptor lock = lockFile(stem + ".lock");
+        if (lock && removeFile(stem + std::string(kNew))) ++removed;
+    }
+    return removed;
 }
 
 // The share's name as it is defined; "" with the slot filled when there is none.
@@ -246,6 +271,14 @@ int FILEIDXIndexEnd(const char* share, int done) try {
                                                            : vexo::fileindex::endUpdate(name, done != 0);
     vexo::fileindex::works().erase(work);
     return ended ? 0 : -1;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+long FILEIDXSweep() try {
+    VEXO_GATE("FILEIDXSweep", -1);
+    const orvel::RaisedIdentity raised;
+    return vexo::fileindex::removeUnfinished();
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

@@ -15,6 +15,7 @@
 #include "filesystem/owner.h"
 #include "io/file_io.h"
 #include "shares/share_store.h"
+#include "vexo/filesystem.h"
 #include "vexo/volume.h"
 
 namespace vexo {
@@ -48,11 +49,20 @@ std::set<std::string> volumesOf(const ShareTable& shares, const Account& account
     return volumes;
 }
 
+// The server of a network mount may be dead, or know no root: who first needs the folders there makes them.
+void leaveOutNetworkMounts(std::set<std::string>& volumes) {
+    std::erase_if(volumes,
+                  [](const std::string& volume) { return VEXOFSIsRemoteFS(VEXOGetFSType(volume.c_str(), 0)) == 1; });
+}
+
 // Opens the folder `name` in `parent`, made where it is missing, and sees to its owner and mode. What is root's is
 // handed over, as a killed process may have left it or the library made it. Empty with errno.
 Descriptor openOwned(const Descriptor& parent, const char* name, uid_t owner, gid_t group, mode_t mode) {
-    if (mkdirat(parent.get(), name, 0700) != 0 && errno != EEXIST) return Descriptor();
     Descriptor folder = openFile(parent.get(), name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
+    if (!folder && errno == ENOENT) {
+        if (mkdirat(parent.get(), name, 0700) != 0 && errno != EEXIST) return Descriptor();
+        folder = openFile(parent.get(), name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
+    }
     struct stat status {};
     if (!folder || fstat(folder.get(), &status) != 0) return Descriptor();
     if (status.st_uid != 0 && status.st_uid != owner) {
@@ -98,9 +108,10 @@ class Preparation {
     int error_ = 0;
 };
 
-int prepareAll(const std::set<std::string>& volumes, const Account* account, Preparation preparation) {
+int prepareAll(std::set<std::string> volumes, const Account* account, Preparation preparation) {
     const orvel::RaisedIdentity raised;
     if (geteuid() != 0) return fail(VEXO_ERR_DENIED, EPERM);
+    leaveOutNetworkMounts(volumes);
     for (const std::string& volume : volumes) preparation.prepare(volume, account);
     return preparation.error() == 0 ? 0 : fail(errorOfErrno(preparation.error()), preparation.error());
 }

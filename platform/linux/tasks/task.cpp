@@ -29,6 +29,20 @@ bool refused(const char* file = __builtin_FILE(), int line = __builtin_LINE()) {
 
 enum class Fate { kRunning, kDone, kFailed };
 
+// Appends what the files of `folder` stand for; where there is no folder, that is nothing.
+bool appendNames(const Descriptor& folder, const char* prefix, Json::Value& names) {
+    std::vector<std::string> files, found;
+    if (!folder && errno == ENOENT) return true;
+    if (!folder || !vexo::listTaskFiles(folder.get(), files)) return failed();
+    for (const std::string& file : files) {
+        const auto name = vexo::taskNameOfFile(file);
+        if (name && name->starts_with(prefix)) found.push_back(*name);
+    }
+    std::sort(found.begin(), found.end());
+    for (const std::string& name : found) names.append(name);
+    return true;
+}
+
 // Runs the body of an operation with root's identity; no exception leaves it.
 template <class Result, class Body>
 Result asStore(Result failure, Body&& body) {
@@ -238,19 +252,13 @@ Task* TaskMgr::createTask(const char* name) {
 bool TaskMgr::getAllTaskId(const char* prefix, Json::Value& names) const {
     VEXO_GATE("KTR::TaskMgr::getAllTaskId", false);
     if (prefix == nullptr || (!names.isArray() && !names.isNull())) return refused();
-    return asStore(false, [&] {
-        std::vector<std::string> files, found;
-        const Descriptor folder = impl_->open(false);
-        if (!folder && errno == ENOENT) return true;
-        if (!folder || !vexo::listTaskFiles(folder.get(), files)) return failed();
-        for (const std::string& file : files) {
-            const auto name = vexo::taskNameOfFile(file);
-            if (name && name->starts_with(prefix)) found.push_back(*name);
-        }
-        std::sort(found.begin(), found.end());
-        for (const std::string& name : found) names.append(name);
-        return true;
-    });
+    return asStore(false, [&] { return appendNames(impl_->open(false), prefix, names); });
+}
+
+bool TaskMgr::getAllUsers(Json::Value& users) {
+    VEXO_GATE("KTR::TaskMgr::getAllUsers", false);
+    if (!users.isArray() && !users.isNull()) return refused();
+    return asStore(false, [&] { return appendNames(vexo::openTaskFolder(".", false), "", users); });
 }
 
 }  // namespace KTR

@@ -180,3 +180,16 @@ int AutoBlockFailLoginSet(const char* address, const char* tag) try {
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }
+
+long VEXOAutoBlockSweep() try {
+    VEXO_GATE("VEXOAutoBlockSweep", -1);
+    const vexo::AutoBlockRules rules = currentRules();
+    const orvel::RaisedIdentity raised;
+    const vexo::Database db = openStore(false);
+    if (!db) return errno == ENOENT ? 0 : failStore();
+    const long long now = time(nullptr);
+    if (!isDone(run(db.get(), kForgetEnded, {now, rules.window, rules.duration}))) return failStore();
+    return sqlite3_changes(db.get());
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}

@@ -12,6 +12,7 @@
 #include "io/file_io.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"
+#include "vexo/volume.h"
 #include "web/session_record.h"
 
 namespace vexo {
@@ -64,20 +65,23 @@ bool writeSession(int store, const std::string& sid, const std::string& record) 
     return false;
 }
 
-// Removes what has ended among the open store's sessions.
-void sweep(const Descriptor& store) {
+// Removes what has ended among the open store's sessions, and counts it.
+long sweep(const Descriptor& store) {
     Descriptor again = openFile(store.get(), ".", O_RDONLY | O_DIRECTORY);
     const Folder folder(again ? fdopendir(again.get()) : nullptr);
-    if (!folder) return;
+    if (!folder) return -1;
     static_cast<void>(again.release());
+    long removed = 0;
     const long long timeout = timeoutSeconds();
     const time_t now = time(nullptr);
     while (const dirent* entry = readdir(folder.get())) {
         struct stat status {};
         if (!isSessionId(entry->d_name)) continue;
         if (fstatat(store.get(), entry->d_name, &status, AT_SYMLINK_NOFOLLOW) != 0) continue;
-        if (!isSessionAlive(status.st_mtime, now, timeout)) unlinkat(store.get(), entry->d_name, 0);
+        if (isSessionAlive(status.st_mtime, now, timeout)) continue;
+        if (unlinkat(store.get(), entry->d_name, 0) == 0) ++removed;
     }
+    return removed;
 }
 
 // The user of a session's file that may be trusted.
@@ -112,6 +116,14 @@ bool findSession(const std::string& sid, const std::string& user, long long time
     return true;
 }
 
+// The user's folders for temporary files. Where they cannot be made, what needs them says so.
+void prepareFolders(const std::string& user) {
+    const KeepErrno keep;
+    const int code = VLIBCErrGet();
+    static_cast<void>(VEXOVolumesPrepareFor(user.c_str(), nullptr, nullptr));
+    VLIBCErrSetEx(code, __FILE__, __LINE__);
+}
+
 }  // namespace
 
 bool isSessionAlive(time_t lastUse, time_t now, long long timeout) {
@@ -134,6 +146,7 @@ std::string createSession(const std::string& user, const std::string& address) {
     }
     // One in 256, so that neither the store grows nor every log-in reads it.
     if (sid.starts_with("00")) sweep(store);
+    prepareFolders(user);
     return sid;
 }
 
@@ -143,10 +156,11 @@ bool useSession(const std::string& sid, const std::string& user) {
     return isSessionId(sid) && findSession(sid, user, timeout);
 }
 
-void sweepSessions() {
+long sweepSessions() {
     const orvel::RaisedIdentity raised;
     const Descriptor store = openStore();
-    if (store) sweep(store);
+    if (!store) return errno == ENOENT ? 0 : -1;
+    return sweep(store);
 }
 
 }  // namespace vexo

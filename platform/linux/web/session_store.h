@@ -19,8 +19,8 @@ std::string createSession(const std::string& user, const std::string& address);
 // True when `sid` is alive and belongs to `user`; counts as a use. The slot stays as it is.
 bool useSession(const std::string& sid, const std::string& user);
 
-// Removes every session that has ended. createSession does so now and then.
-void sweepSessions();
+// Removes every session that has ended, and counts them; -1 with errno. createSession does so now and then.
+long sweepSessions();
 
 }  // namespace vexo
 
