@@ -38,6 +38,9 @@ after(async () => {
   rmSync(data, { recursive: true, force: true });
 });
 
+// Most of the demo's photos hold no picture.
+const isNoPicture = (url) => new URL(url, URL_OF_PAGE).pathname === "/cgi-bin/thumbnail";
+
 // A page of `user`. `complaints` is what must be empty at the end: errors on the console or of scripts, failed requests.
 export async function openPage(user, { path = "/", ...options } = {}) {
   const context = await browser.newContext({
@@ -52,7 +55,7 @@ export async function openPage(user, { path = "/", ...options } = {}) {
   if (SCREENSHOTS) photograph(page);
   page.complaints = [];
   page.on("console", (message) => {
-    if (["error", "warning"].includes(message.type())) page.complaints.push(`console: ${message.text()}`);
+    if (["error", "warning"].includes(message.type()) && !isNoPicture(message.location().url)) page.complaints.push(`console: ${message.text()}`);
   });
   page.on("pageerror", (error) => page.complaints.push(`page: ${error.stack}`));
   page.on("requestfailed", (request) => {
@@ -61,7 +64,7 @@ export async function openPage(user, { path = "/", ...options } = {}) {
       page.complaints.push(`request: ${request.url()} ${request.failure().errorText}`);
   });
   page.on("response", (response) => {
-    if (response.status() >= 400) page.complaints.push(`status ${response.status()}: ${response.url()}`);
+    if (response.status() >= 400 && !(response.status() === 415 && isNoPicture(response.url()))) page.complaints.push(`status ${response.status()}: ${response.url()}`);
   });
   await page.goto(`${URL_OF_PAGE}#${path}`);
   await page.waitForSelector("body.started");

@@ -7,7 +7,7 @@ import { toast, toastFailure } from "./dialogs.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { emit } from "./events.js";
-import { isSearch, parentOf } from "./path.js";
+import { isSearch, parentOf, taskOf } from "./path.js";
 import { pref, setPref } from "./prefs.js";
 import { Selection } from "./selection.js";
 import { entryAt, folderListing, searchResults } from "./sources.js";
@@ -18,7 +18,7 @@ const FIRST_LOOK = 60;
 const PATIENCE = 150;
 
 export const browser = {
-  id: "/", // of the folder, or "?" and the task of a search
+  id: "/", // of the folder, or of a search (see path.js)
   lastFolder: "/",
   shares: [],
   user: "",
@@ -124,7 +124,7 @@ async function openFile(id, mine) {
 // `wanted`: {id, far} of the entry to choose; `far` when it is worth looking for in all of the folder. `keep`: what is
 // chosen stays chosen.
 async function show(id, mine, wanted, keep = false) {
-  const listing = isSearch(id) ? searchResults(id.slice(1), browser, changed) : folderListing(id, browser, changed);
+  const listing = isSearch(id) ? searchResults(taskOf(id), browser, changed) : folderListing(id, browser, changed);
   const saved = remembered.get(id);
   await Promise.race([listing.need(0, FIRST_LOOK), new Promise((resolve) => setTimeout(resolve, PATIENCE))]);
   if (mine !== turn) return listing.cancel();

@@ -125,7 +125,7 @@ addCommand({
   when: ({ single, search }) => single && search,
   run: ({ single }) => goTo(single),
 });
-addCommand({ id: "copyPath", icon: "copy", group: "info", when: one, run: ({ single }) => copyPath(single.id) });
+addCommand({ id: "copyPath", icon: "path", group: "info", when: one, run: ({ single }) => copyPath(single.id) });
 addCommand({
   id: "properties",
   icon: "info",

@@ -32,7 +32,7 @@ import { isSearch, parentOf } from "./path.js";
 import { setupPathbar } from "./pathbar.js";
 import { setupPointer } from "./pointer.js";
 import { preview, previewed } from "./preview.js";
-import { openSearch, searchFor, setupSearch } from "./search.js";
+import { openSearch, searchAgain, searchFor, setupSearch } from "./search.js";
 import { setupSession } from "./session.js";
 import { setupSettings } from "./settings.js";
 import { entryAt } from "./sources.js";
@@ -117,7 +117,7 @@ function paintNotice(listing) {
 function stateOf(listing) {
   if (listing.error && !isStale(listing)) {
     const { id } = browser;
-    if (isSearch(id)) return failedState(listing.error, "", { retry: openSearch, back: goUp });
+    if (isSearch(id)) return failedState(listing.error, "", { retry: searchAgain, back: goUp });
     const back = parentOf(id) === "/" ? null : goUp;
     return failedState(listing.error, undefined, { retry: () => open(id), back, why: () => showWhy(id) });
   }

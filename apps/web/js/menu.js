@@ -66,7 +66,11 @@ function itemNode(item, close) {
   );
 }
 
+const SHEET = matchMedia("(max-width: 600px) and (pointer: coarse)");
+
 function place(menu, x, y, anchor) {
+  // Under a thumb it lies at the foot of the screen.
+  if (SHEET.matches) return menu.classList.add("sheet");
   const box = anchor?.getBoundingClientRect();
   const width = menu.offsetWidth;
   const height = menu.offsetHeight;
@@ -77,6 +81,7 @@ function place(menu, x, y, anchor) {
     top = Math.max(8, box ? box.top - height - 4 : Math.min(y, innerHeight - 8) - height);
   menu.style.left = `${left}px`;
   menu.style.top = `${Math.max(8, top)}px`;
+  return undefined;
 }
 
 function keydown(event, menu, close) {

@@ -30,9 +30,13 @@ function normalisePart(part) {
   );
 }
 
-// A search stands in the address as "?" and its task.
+// A search stands in the address as "?", its task, and behind "&" what was asked for.
 export function isSearch(place) {
   return place.startsWith("?");
+}
+
+export function taskOf(search) {
+  return search.slice(1).split("&", 1)[0];
 }
 
 export function normalisePlace(text) {

@@ -7,12 +7,11 @@ import { toastFailure } from "./dialogs.js";
 import { $, announce, h, iconButton } from "./dom.js";
 import { describe } from "./errors.js";
 import { on } from "./events.js";
-import { isSearch } from "./path.js";
+import { isSearch, normaliseId, taskOf } from "./path.js";
 import { isEmptySearch, paramsOf, searchForm } from "./search_form.js";
 import { t } from "./strings.js";
 
 const POLL = 700;
-const KEPT = "orvel.search";
 let asked = {};
 let timer = null;
 
@@ -21,8 +20,10 @@ export function setupSearch() {
   on("shown", watch);
   on("place", (id) => {
     clearTimeout(timer);
-    if (isSearch(id)) asked = recall(id) ?? asked;
-    else closePanel();
+    if (!isSearch(id)) return closePanel();
+    asked = recall(id) ?? asked;
+    if (asked.folder) browser.lastFolder = normaliseId(asked.folder);
+    return undefined;
   });
   $("panel").addEventListener("keydown", (event) => {
     if (event.key === "Escape") closePanel();
@@ -66,8 +67,7 @@ function closePanel() {
 // By name alone, below the folder on screen.
 export function searchFor(name) {
   asked = { name, where: browser.lastFolder === "/" ? "all" : "below" };
-  openSearch();
-  $("panel").querySelector("form").requestSubmit();
+  searchAgain();
 }
 
 async function start(values) {
@@ -75,14 +75,14 @@ async function start(values) {
   const params = paramsOf(values);
   complaint.textContent = isEmptySearch(params) ? t("search.nothing") : "";
   if (complaint.textContent) return;
-  asked = values;
+  const filled = Object.entries({ ...values, folder: browser.lastFolder }).filter(([, value]) => value !== "");
+  asked = Object.fromEntries(filled);
   const before = isSearch(browser.id) ? browser.id : null;
   try {
     const { taskid } = await post("search", { action: "start", ...params });
-    sessionStorage.setItem(KEPT, JSON.stringify({ taskid, asked }));
     if (matchMedia("(max-width: 760px)").matches) closePanel();
     if (before) clean(before);
-    go(`?${taskid}`);
+    go(`?${taskid}&${new URLSearchParams(asked)}`);
   } catch (failure) {
     const said = describe(failure);
     complaint.textContent = [
@@ -92,13 +92,16 @@ async function start(values) {
   }
 }
 
+// What was asked for stands in the address; nothing in one of a former version.
 function recall(id) {
-  try {
-    const kept = JSON.parse(sessionStorage.getItem(KEPT));
-    return kept?.taskid === id.slice(1) ? kept.asked : null;
-  } catch {
-    return null;
-  }
+  const fields = [...new URLSearchParams(id.slice(taskOf(id).length + 1))];
+  return fields.length > 0 ? Object.fromEntries(fields) : null;
+}
+
+// What the address asks for, once more: the server keeps no results for good.
+export function searchAgain() {
+  openSearch();
+  $("panel").querySelector("form").requestSubmit();
 }
 
 // As long as it runs, what is in sight is asked for again.
@@ -123,12 +126,12 @@ function tell(listing) {
 }
 
 async function stopSearch() {
-  await post("search", { action: "stop", taskid: browser.id.slice(1) }).catch((failure) => toastFailure(failure));
+  await post("search", { action: "stop", taskid: taskOf(browser.id) }).catch((failure) => toastFailure(failure));
   refresh();
 }
 
 function clean(id) {
-  post("search", { action: "clean", taskid: id.slice(1) }).catch(() => {});
+  post("search", { action: "clean", taskid: taskOf(id) }).catch(() => {});
 }
 
 function closeSearch() {

@@ -16,7 +16,6 @@ const KINDS = ["all", "file", "dir"];
 const ON_CHOSEN = [
   "open",
   "showInFolder",
-  "preview",
   "download",
   "share",
   "cut",
@@ -66,9 +65,9 @@ export function contextItems() {
     ];
   }
   return [
-    ...items(ON_CHOSEN.slice(0, 5)),
+    ...items(ON_CHOSEN.slice(0, 4)),
     "-",
-    ...items(ON_CHOSEN.slice(5, 9)),
+    ...items(ON_CHOSEN.slice(4, 8)),
     "-",
     ...items(["rename", "compress", "extract", "restore"]),
     "-",

@@ -181,7 +181,7 @@ addCommand({
   when: ({ canWrite, inBin }) => heldItems() !== null && canWrite && !inBin,
   run: paste,
 });
-addCommand({ id: "copyTo", icon: "copy", group: "change", when: chosen, run: () => to("copy") });
+addCommand({ id: "copyTo", icon: "copy-to", group: "change", when: chosen, run: () => to("copy") });
 addCommand({ id: "moveTo", icon: "move", group: "change", when: changeable, run: () => to("move") });
 addCommand({
   id: "compress",
