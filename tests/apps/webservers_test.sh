@@ -20,6 +20,8 @@ url() { echo "http://127.0.0.1:$port/cgi-bin/$1"; }
 check_requests() {
     expect "nobody" 401 "$(curl -s -o /dev/null -w '%{http_code}' "$(url 'list?action=shares')")"
     expect "the page" 200 "$(code "http://127.0.0.1:$port/")"
+    expect "how the page is kept" "no-store no-cache" "$(for path in '' js/main.js; do
+        ask -o /dev/null -w '%header{cache-control} ' "http://127.0.0.1:$port/$path"; done | sed 's/ $//')"
     expect "a picture for visitors" 200 "$(curl -s -o /dev/null -w '%{http_code}' "http://127.0.0.1:$port/favicon.ico")"
     expect "shares" 1 "$(ask "$(url 'list?action=shares')" | grep -c '"user":"alice"')"
     expect "no program" 404 "$(code "$(url nothing)")"
