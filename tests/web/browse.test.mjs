@@ -18,6 +18,8 @@ test("shares, by user", () =>
       assert.equal(await other.locator(".card", { hasText: "projects" }).count(), 0);
       assert.match(await other.locator(".card", { hasText: "photo" }).textContent(), /Read only/);
     });
+    await page.fill("#find", "MUS");
+    await page.waitForFunction(() => document.querySelectorAll(".cards li:not([hidden])").length === 1);
     await page.click(".card >> text=music");
     await page.waitForFunction(() => document.querySelectorAll("#view .row:not(.header)").length === 3);
     await page.dblclick("#view >> text=Night Trains");

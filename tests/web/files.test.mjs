@@ -6,7 +6,7 @@ import http from "node:http";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
-import { drawn, PASSWORDS, row, upload, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
+import { drawn, go, PASSWORDS, row, upload, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const files = mkdtempSync(join(tmpdir(), "orvel-upload-"));
@@ -115,7 +115,14 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
 test("previews, thumbnails, rename, downloads", () =>
   withPage("alice", { path: "/projects/incoming%20%E2%80%9C1%E2%80%9D/trip" }, async (page) => {
     await row(page, "list & more").dblclick();
-    await page.waitForSelector(".preview pre >> text=<b>bread</b>");
+    await page.waitForSelector(".preview.paper pre >> text=<b>bread</b>");
+    const texts = { "latin.txt": Buffer.from("Café", "latin1"), "wide.txt": Buffer.from("\uFEFFCafé", "utf16le") };
+    for (const [name, bytes] of Object.entries(texts)) writeFileSync(join(projects, "incoming “1”/trip", name), bytes);
+    for (const name of Object.keys(texts)) {
+      await go(page, `/projects/incoming%20%E2%80%9C1%E2%80%9D/trip!${name}`);
+      await page.waitForSelector(`.preview-title >> text=${name}`);
+      await page.waitForSelector(".preview pre >> text=/^.?Café$/");
+    }
     await page.keyboard.press("Escape");
     await row(page, "day 1").dblclick();
     await page.click(".view-switch button >> nth=1");

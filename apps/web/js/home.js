@@ -13,13 +13,21 @@ export function homeNode() {
     "section.home",
     { tabindex: -1, "aria-label": t("place.shares") },
     h("h1", {}, browser.user ? t("home.hello", { user: browser.user }) : t("place.shares")),
-    h("p.lead", {}, t("home.lead", { count: browser.shares.length })),
     h(
       "ul.cards",
       {},
       browser.shares.map((share) => h("li", {}, cardOf(share))),
     ),
+    h("p.lead.nothing", { role: "status", hidden: true }, t("home.none")),
   );
+}
+
+// Leaves those whose name holds the text.
+export function filterHome(node, text) {
+  const wanted = text.toLowerCase();
+  for (const line of node.querySelectorAll("li"))
+    line.hidden = !line.querySelector("b").textContent.toLowerCase().includes(wanted);
+  node.querySelector(".nothing").hidden = node.querySelector("li:not([hidden])") !== null;
 }
 
 function cardOf(share) {
@@ -35,8 +43,10 @@ function cardOf(share) {
 function aboutOf(share) {
   if (isOffline(share)) return h("span.tag.warn", {}, icon("offline"), t("mark.offline"));
   const right = share.id === "/home" ? t("share.mine") : isReadOnlyShare(share) ? t("share.read") : t("share.write");
+  const { freespace, totalspace } = share.volume ?? {};
   return [
     h("span.tag", {}, isReadOnlyShare(share) && icon("read-only"), right),
+    totalspace > 0 && h("span.tag", {}, t("home.free", { free: formatSize(freespace) })),
     share.synced && h("span.tag", { title: t("mark.synced") }, icon("sync"), t("mark.synced.short")),
   ];
 }

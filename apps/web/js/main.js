@@ -23,7 +23,7 @@ import { setWhy } from "./dialogs.js";
 import { $, h, keepFocus, loadIcons } from "./dom.js";
 import { setupDragAndDrop } from "./dragdrop.js";
 import { on } from "./events.js";
-import { homeNode, paintVolume } from "./home.js";
+import { filterHome, homeNode, paintVolume } from "./home.js";
 import { setupKeys } from "./keys.js";
 import "./links.js";
 import { isUnreachable, untilReachable } from "./network.js";
@@ -75,6 +75,7 @@ function showPlace() {
   homeShown = null;
   setState(null);
   const home = browser.id === "/";
+  $("up-button").disabled = home;
   paintNotice(browser.listing);
   $("view").hidden = home;
   if (home) {
@@ -137,6 +138,7 @@ function clearFilter() {
   if (document.activeElement !== $("find")) document.querySelector(".top").classList.remove("finding");
   if (browser.kind !== "all") setKind("all");
   setFilter("");
+  if (homeShown) filterHome(homeShown, "");
 }
 
 // While the list moves, pages are asked for from time to time, with those that come into sight next at this speed.
@@ -164,6 +166,7 @@ function setupFind() {
   input.addEventListener("input", () => {
     clearTimeout(timer);
     if (browser.id !== "/") timer = setTimeout(() => setFilter(input.value.trim()), 180);
+    else if (homeShown) filterHome(homeShown, input.value.trim());
   });
   input.addEventListener("keydown", (event) => {
     if (event.key === "Escape") {

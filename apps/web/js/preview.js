@@ -3,6 +3,7 @@
 import { addressOf, readAddress } from "./address.js";
 import { readReply, send, urlOf } from "./api.js";
 import { browser } from "./browser.js";
+import { command, context, runCommand } from "./commands.js";
 import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { formatSize, formatTime } from "./format.js";
@@ -32,6 +33,9 @@ export function preview(entry, there = false) {
       "header",
       {},
       title,
+      ...["share", "delete"].map((id) =>
+        iconButton(command(id).icon, t(`command.${id}`), () => act(id), { "data-does": id }),
+      ),
       iconButton("download", t("command.download"), () => download([shown.entry])),
       iconButton("close", t("dialog.close"), () => node.close()),
     ),
@@ -111,21 +115,27 @@ async function fill(entry) {
     h("div.grow", {}, h("b", {}, nameNode(entry.name)), h("span", {}, about)),
   );
   shown.stage.replaceChildren(h("div.progress.unknown.slow", {}, h("i")));
-  const { stage } = shown;
-  try {
-    const content = await contentOf(entry, abort.signal);
-    if (!abort.signal.aborted) stage.replaceChildren(content);
-  } catch (failure) {
-    if (!abort.signal.aborted) stage.replaceChildren(message(entry, describe(failure).title));
-  }
+  for (const button of shown.node.querySelectorAll("[data-does]"))
+    button.hidden = browser.selection.single?.id !== entry.id || !command(button.dataset.does).when(context());
+  const content = await contentOf(entry, abort.signal).catch((failure) => message(entry, describe(failure).title));
+  if (abort.signal.aborted) return;
+  shown.stage.replaceChildren(content);
+  // Pictures and films lie on a dark ground, what is read on that of the page.
+  shown.node.classList.toggle("paper", !content.matches("img, video"));
 }
 
-function contentOf(entry, signal) {
+async function contentOf(entry, signal) {
   if (entry.size === 0) return message(entry, t("preview.empty"));
   if (canShowImage(entry.name) && entry.size <= LARGEST_IMAGE) return imageOf(entry);
   if (entry.kind === "audio" || entry.kind === "video") return mediaOf(entry);
   if (TEXT_KINDS.has(entry.kind)) return textOf(entry, signal);
   return message(entry, t("preview.none"));
+}
+
+// What the list does with what is chosen there: the file on screen.
+function act(id) {
+  if (id === "delete") shown.node.close();
+  runCommand(id);
 }
 
 function source(entry) {
@@ -154,11 +164,26 @@ async function textOf(entry, signal) {
   const response = await send(source(entry), { headers: { Range: `bytes=0-${TEXT_START - 1}` }, signal });
   if (!response.ok) readReply(response.status, await response.text());
   const bytes = new Uint8Array(await response.arrayBuffer());
-  if (bytes.subarray(0, 4096).includes(0)) return message(entry, t("preview.none"));
-  const text = h("pre", { tabindex: 0 }, new TextDecoder().decode(bytes));
+  const encoding = encodingOf(bytes, entry.size > bytes.length);
+  if (!encoding) return message(entry, t("preview.none"));
+  const text = h("pre", { tabindex: 0 }, new TextDecoder(encoding).decode(bytes));
   return entry.size > TEXT_START
     ? h("div.text-part", {}, text, h("p.soft", {}, t("preview.start", { size: formatSize(TEXT_START) })))
     : text;
+}
+
+// Nothing for what is no text. `cut`: there is more of it, and the end may lie within a character.
+function encodingOf(bytes, cut) {
+  const [first, second] = bytes;
+  if (first === 0xff && second === 0xfe) return "utf-16le";
+  if (first === 0xfe && second === 0xff) return "utf-16be";
+  if (bytes.subarray(0, 4096).includes(0)) return null;
+  try {
+    new TextDecoder("utf-8", { fatal: true }).decode(bytes, { stream: cut });
+    return "utf-8";
+  } catch {
+    return "windows-1252";
+  }
 }
 
 function message(entry, text) {
