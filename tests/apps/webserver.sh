@@ -54,7 +54,7 @@ fill() { printf 's|@%s@|%s|g\n' "$1" "$(printf '%s' "$2" | sed 's/[|&]/\\&/g')";
 configure() { # template, user line
     sed -f <(fill ADDRESS 127.0.0.1; fill PORT "$port"; fill WEB "$work/web"; fill STATE "$state"; fill LOGINS "$work/logins"
              fill SOCKET "$socket"; fill USER "$2"; fill MODULES /usr/lib/apache2/modules
-             fill COMMON "$source/packaging/lighttpd.common.conf") "$source/packaging/$1" >"$state/$1"
+             fill COMMON "$source/packaging/web/lighttpd.common.conf") "$source/packaging/$1" >"$state/$1"
 }
 start() {
     case "$server" in

@@ -158,11 +158,50 @@ int work(const SDK::Share& share, bool build, bool everything) {
     return 0;
 }
 
+// The shares whose definitions say that they have an index.
+std::vector<std::string> indexedShares() {
+    const std::unique_ptr<VEXOSHAREDB, Releaser<VEXOShareDBClose>> shares(VEXOShareDBOpen());
+    if (shares == nullptr) throw std::runtime_error("the share definitions cannot be read");
+    std::vector<std::string> names;
+    PVEXOSHARE share = nullptr;
+    int state = 0;
+    while ((state = VEXOShareDBCursorGet(shares.get(), &share)) == 0) {
+        if (share->index != 0) names.emplace_back(share->szName);
+    }
+    VEXOShareFree(share);
+    if (state < 0) throw std::runtime_error("the share definitions cannot be read");
+    return names;
+}
+
+// One that fails does not keep the others from being looked after.
+int refresh(bool everything) {
+    int status = 0;
+    for (const std::string& name : indexedShares()) {
+        try {
+            const Share share(SDK::Share::LoadShare(name.c_str()));
+            if (share == nullptr) refuse(name, "no such share");
+            FIINDEXSTATUS found = {};
+            const bool missing = FILEIDXIndexStatus(name.c_str(), &found) < 0 && VLIBCErrGet() == VEXO_ERR_MISSING;
+            status |= work(*share, missing, everything);
+        } catch (const std::exception& error) {
+            fprintf(stderr, "orvelctl: %s\n", error.what());
+            status = 1;
+        }
+        if (stopRequested != 0) return 1;
+    }
+    return status;
+}
+
 }  // namespace
 
 int index(const std::vector<std::string>& words) {
     std::vector<std::string> rest = words;
     const std::string action = takeForm("index", rest);
+    if (action == "refresh") {
+        const Arguments arguments(rest, "index", action, 0);
+        if (geteuid() != 0) throw std::runtime_error("only root sees all that an index must hold");
+        return refresh(arguments.has("--full"));
+    }
     const Arguments arguments(rest, "index", action, 1);
     if (geteuid() != 0 && action != "status") throw std::runtime_error("only root sees all that an index must hold");
     const std::string& name = arguments.position(0);
