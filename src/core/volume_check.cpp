@@ -46,6 +46,7 @@ int makeTmpFolder(const std::string& path) {
     if (reason == EEXIST && stat(path.c_str(), &status) == 0) return 0;  // another process made it meanwhile
     syslog(LOG_ERR, "%s(%d)Failed to mkdir : %s , reason=%s[%d]", source, __LINE__, printable(path).c_str(),
            strerror(reason), reason);
+    errno = reason;  // callers tell a full disk from the rest by it
     return -1;
 }
 

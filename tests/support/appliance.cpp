@@ -267,6 +267,7 @@ void syslog(int priority, const char* format, ...) {
     va_start(args, format);
     support::capture(priority, format, args);
     va_end(args);
+    errno = EXFULL;  // the real ones do not keep it either
 }
 
 __attribute__((format(printf, 3, 4))) void __syslog_chk(int priority, int, const char* format, ...) {
@@ -274,5 +275,6 @@ __attribute__((format(printf, 3, 4))) void __syslog_chk(int priority, int, const
     va_start(args, format);
     support::capture(priority, format, args);
     va_end(args);
+    errno = EXFULL;  // the real ones do not keep it either
 }
 }
