@@ -51,7 +51,11 @@ bool openToEverybody(const std::string& folder) {
 
 void makeFolder(const std::string& folder) {
     if (isThere(folder)) return;
-    if (VLIBCExec("/bin/mkdir", "-p", folder.c_str(), nullptr) == 0 && openToEverybody(folder)) return;
+    // Open from the start: one that this process was killed behind would stay closed, since it is there then.
+    const mode_t mask = umask(0);
+    const int made = VLIBCExec("/bin/mkdir", "-p", folder.c_str(), nullptr);
+    umask(mask);
+    if (made == 0 && openToEverybody(folder)) return;
     syslog(LOG_ERR, "%s:%d Fail to create folder %s", kSource, __LINE__, printable(folder).c_str());
 }
 

@@ -7,6 +7,7 @@
 #include <set>
 
 #include "support/log_texts.h"
+#include "support/race.h"
 #include "support/refuse_calls.h"
 #include "support/testing.h"
 
@@ -118,6 +119,13 @@ TEST_F(SearchTaskTest, FoldersAreMadeAsRootAndTheIdentityComesBack) {
     makeAsBob({}, [] {});
     EXPECT_EQ(statusOf(searches_ + "/bob").st_uid, 0U);
     EXPECT_EQ(modeOf(searches_ + "/bob"), kForEverybody);
+
+    fs::remove_all(searches_);
+    expectKilled([&] {
+        umask(022);
+        if (refuseCalls({{SYS_fchmod, kKilled}})) OrvSearchDBTask::createDBTaskDir(volume_.c_str(), "bob", "1");
+    });
+    EXPECT_EQ(modeOf(searches_), kForEverybody) << "nobody opens a folder that is there";
 
     // A user's link where root would make folders: nothing is made, nothing is opened up behind it.
     const std::string elsewhere = volume_ + "/private";
