@@ -33,7 +33,7 @@ class LockedFile {
     LockedFile() : path_(VEXO::SystemPath(kFile)) {
         do {
             file_ = openOnce();
-        } while (file_ && !lock());
+        } while (file_ && isReplaced());
         // First of all: the platform changes no file that others than its owner may write.
         if (file_) static_cast<void>(makeReadable());
     }
@@ -55,14 +55,19 @@ class LockedFile {
         return Descriptor(fd);
     }
 
-    // False when the file was replaced while its lock was waited for. A lock that the file system refuses is no failure
+    // Waits for the lock; whether the file was replaced meanwhile. Where that cannot be determined it is closed, since
+    // another process may hold the lock of the one that counts. A lock that the file system refuses is no failure
     // (kept).
-    [[nodiscard]] bool lock() const {
+    [[nodiscard]] bool isReplaced() {
         while (flock(file_.get(), LOCK_EX) != 0 && errno == EINTR) {
         }
         struct stat locked = {}, current = {};
-        return fstat(file_.get(), &locked) == 0 && lstat(path_.c_str(), &current) == 0 &&
-               locked.st_dev == current.st_dev && locked.st_ino == current.st_ino;
+        if (fstat(file_.get(), &locked) == 0 && lstat(path_.c_str(), &current) == 0) {
+            return locked.st_dev != current.st_dev || locked.st_ino != current.st_ino;
+        }
+        if (errno == ENOENT) return true;
+        file_.reset();
+        return false;
     }
 
     std::string path_;

@@ -2,6 +2,7 @@
 
 #include <map>
 
+#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 using OrvelSharing::SharingManager;
@@ -80,6 +81,12 @@ TEST_F(SharingSettingsTest, Failures) {
     }
     EXPECT_EQ(readFile(file()), "20001=\"true\"\n");
     vexo::gate::reset();
+    EXPECT_EQ(inChild([&] {
+                  alarm(20);
+                  return refuseCalls({{SYS_newfstatat, EIO}}) && !set() ? 0 : 1;
+              }),
+              0)
+        << "whose lock is held cannot be determined";
     fs::remove(file());
     fs::create_symlink("/etc/passwd", file());
     for (int i = 0; i < 2; ++i) announceLog("Failed to fdLock");
