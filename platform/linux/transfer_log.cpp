@@ -8,6 +8,7 @@
 #include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
+#include "io/append_line.h"
 #include "io/file_io.h"
 #include "transfer_entry.h"
 #include "vexo/filesystem.h"
@@ -23,7 +24,7 @@ constexpr const char* kFile = "/var/log/vexo/xfer.log";
 
 Descriptor openLog() {
     const std::string path = VEXO::SystemPath(kFile);
-    constexpr int flags = O_WRONLY | O_APPEND | O_CREAT | O_NOFOLLOW | O_NONBLOCK;
+    constexpr int flags = O_RDWR | O_APPEND | O_CREAT | O_NOFOLLOW | O_NONBLOCK;
     Descriptor log = vexo::openFile(AT_FDCWD, path.c_str(), flags, 0600);
     if (log || errno != ENOENT) return log;
     constexpr uid_t keep = static_cast<uid_t>(-1);
@@ -48,19 +49,6 @@ bool lock(int log) {
     return result == 0;
 }
 
-// Appends the line by one write under the lock; what a full disk cut short is taken back.
-bool append(int log, const std::string& line) {
-    if (!lock(log)) return false;
-    const off_t end = lseek(log, 0, SEEK_END);
-    if (end < 0) return false;
-    const ssize_t written = write(log, line.data(), line.size());
-    if (written == static_cast<ssize_t>(line.size())) return true;
-    const int failure = written < 0 ? errno : ENOSPC;
-    if (written > 0 && ftruncate(log, end) != 0) return false;
-    errno = failure;
-    return false;
-}
-
 }  // namespace
 
 int VEXOLogKTRFMXferLog(const char* address, const char* user, const char* action, long long size, const char* path,
@@ -73,7 +61,9 @@ int VEXOLogKTRFMXferLog(const char* address, const char* user, const char* actio
     const std::string line = vexo::buildTransferEntry({time(nullptr), address, user, action, size, path, flag});
     const orvel::RaisedIdentity raised;
     const Descriptor log = openLog();
-    if (!log || !isOurs(log.get()) || !append(log.get(), line)) return vexo::fail(vexo::errorOfErrno(errno));
+    if (!log || !isOurs(log.get()) || !lock(log.get()) || !vexo::appendLine(log.get(), line)) {
+        return vexo::fail(vexo::errorOfErrno(errno));
+    }
     errno = before;
     return 0;
 } catch (const std::exception&) {

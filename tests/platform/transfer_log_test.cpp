@@ -71,6 +71,13 @@ TEST_F(TransferLogTest, OnlyALogOfOursIsWrittenAndByASwitchedProgramToo) {
     EXPECT_EQ(log(), 0);
     if (geteuid() == 0) actingForAlice([&] { EXPECT_EQ(log(), 0); });
     EXPECT_EQ(lines(), geteuid() == 0 ? 2 : 1);
+
+    const std::string torn = R"({"time":"2026-01-)";
+    writeFile(log_, torn, 0600);
+    EXPECT_EQ(log(), 0);
+    const std::string text = readFile(log_);
+    EXPECT_EQ(text.substr(0, torn.size() + 1), torn + "\n") << "what a killed writer left takes no other entry along";
+    EXPECT_EQ(parse(text.substr(torn.size() + 1))["path"].asString(), path_);
 }
 
 TEST_F(TransferLogTest, AFullDiskLeavesNoTornLine) {

@@ -12,6 +12,7 @@
 #include "base/raised_identity.h"
 #include "failure.h"
 #include "fault_gate.h"
+#include "io/append_line.h"
 #include "io/file_io.h"
 #include "io/trusted_file.h"
 #include "vexo/system_root.h"
@@ -41,31 +42,6 @@ std::optional<std::string_view> findLine(std::string_view text, std::string_view
 vexo::Descriptor openRecords(const char* file) {
     const orvel::RaisedIdentity raised;
     return vexo::openTrusted(VEXO::SystemPath(file), O_RDONLY);
-}
-
-// Whether the file ends within a line; false with errno when that cannot be determined.
-bool endsWithinLine(int fd, off_t size, bool& within) {
-    char last = '\n';
-    if (size > 0 && pread(fd, &last, 1, size - 1) != 1) return false;
-    within = last != '\n';
-    return true;
-}
-
-// Appends by one write; what a full disk cut short is taken back.
-bool append(int fd, std::string line) {
-    bool within = false;
-    const off_t end = lseek(fd, 0, SEEK_END);
-    if (end < 0 || !endsWithinLine(fd, end, within)) return false;
-    if (within) line.insert(line.begin(), '\n');
-    ssize_t written = 0;
-    do {
-        written = write(fd, line.data(), line.size());
-    } while (written < 0 && errno == EINTR);
-    if (written == static_cast<ssize_t>(line.size())) return true;
-    const int failure = written < 0 ? errno : ENOSPC;
-    if (written > 0 && ftruncate(fd, end) != 0) return false;
-    errno = failure;
-    return false;
 }
 
 }  // namespace
@@ -105,7 +81,7 @@ int VLIBCFileAddLine(const char* file, const char* line, int max) try {
     const int before = errno;
     const orvel::RaisedIdentity raised;
     const orvel::Descriptor fd = vexo::openTrusted(VEXO::SystemPath(file), O_RDWR | O_APPEND | O_CREAT, 0600);
-    if (!fd || !append(fd.get(), std::string(text) + '\n')) return vexo::fail(vexo::errorOfFile(errno));
+    if (!fd || !vexo::appendLine(fd.get(), std::string(text) + '\n')) return vexo::fail(vexo::errorOfFile(errno));
     errno = before;
     return 0;
 } catch (const std::exception&) {
