@@ -9,6 +9,7 @@
 
 #include "platform/trust.h"
 #include "support/race.h"
+#include "support/refuse_calls.h"
 #include "support/wait.h"
 #include "tasks/task_document.h"
 #include "tasks/task_name.h"
@@ -38,9 +39,9 @@ TEST(TaskWorker, IsKnownByNumberStartAndBoot) {
     for (const std::string& line : {std::string(), "12 (z) Z" + rest, std::string("12 (s) S 1 2")})
         EXPECT_FALSE(vexo::startTimeOf(line)) << line;
     const vexo::Worker self = vexo::thisProcess();
-    EXPECT_TRUE(vexo::isRunning(self));
-    EXPECT_FALSE(vexo::isRunning({self.pid, self.start + 1, self.boot}));
-    EXPECT_FALSE(vexo::isRunning({self.pid, self.start, "another"}));
+    EXPECT_EQ(vexo::isRunning(self), true);
+    EXPECT_EQ(vexo::isRunning({self.pid, self.start + 1, self.boot}), false);
+    EXPECT_EQ(vexo::isRunning({self.pid, self.start, "another"}), false);
 }
 
 class Tasks : public ApplianceTest {
@@ -227,6 +228,13 @@ TEST_F(Tasks, AnEndWithoutAWordIsAFailure) {
         EXPECT_EQ(task->hasFailed(), !finishing);
         waitpid(worker, nullptr, 0);
     }
+    const Record running = make("y");
+    ASSERT_TRUE(running != nullptr && running->getWorker() == getpid());
+    inChild([&] {
+        EXPECT_TRUE(refuseCalls({{SYS_openat, EMFILE}}));
+        EXPECT_FALSE(running->isFinished() || running->hasFailed()) << "what cannot be determined is no end";
+        EXPECT_EQ(running->getWorker(), 0) << "nor a process to be killed";
+    });
 }
 
 TEST_F(Tasks, TheStoreIsRootsAndReachedAfterTheSwitch) {

@@ -45,7 +45,8 @@ class VEXO_API Task {
     pid_t getWorker() const;
     // Marks the work as done, for good.
     bool finish();
-    // True when the work was marked as done, or its process ended without doing so (see hasFailed).
+    // True when the work was marked as done, or its process ended without doing so (see hasFailed). A process of which
+    // that cannot be determined counts as running.
     bool isFinished() const;
     // True when the process noted is gone and never marked the work as done.
     bool hasFailed() const;

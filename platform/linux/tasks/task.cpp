@@ -87,14 +87,14 @@ struct Task::Impl {
         return false;
     }
     // Whether the work goes on, by the document and, when that seems not to be so, by the one of this moment: it may
-    // have come to its end since.
+    // have come to its end since. What cannot be determined is no end.
     [[nodiscard]] Fate fate() const {
         if (document.finished) return Fate::kDone;
-        if (lock || vexo::isRunning(document.worker)) return Fate::kRunning;
+        if (lock || vexo::isRunning(document.worker).value_or(true)) return Fate::kRunning;
         TaskDocument now;
-        if (!vexo::readTask(folder.get(), file, now)) return Fate::kFailed;
+        if (!vexo::readTask(folder.get(), file, now)) return errno == ENOENT ? Fate::kFailed : Fate::kRunning;
         if (now.finished) return Fate::kDone;
-        return vexo::isRunning(now.worker) ? Fate::kRunning : Fate::kFailed;
+        return vexo::isRunning(now.worker).value_or(true) ? Fate::kRunning : Fate::kFailed;
     }
     // Makes a change, in an update of its own where none is open.
     template <class Change>
@@ -149,7 +149,7 @@ bool Task::attach() {
 
 pid_t Task::getWorker() const {
     const vexo::Worker& worker = impl_->document.worker;
-    return asStore(pid_t{0}, [&] { return vexo::isRunning(worker) ? worker.pid : 0; });
+    return asStore(pid_t{0}, [&] { return vexo::isRunning(worker).value_or(false) ? worker.pid : 0; });
 }
 
 bool Task::finish() {

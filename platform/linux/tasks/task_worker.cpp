@@ -13,25 +13,27 @@ namespace {
 constexpr int kStartField = 22;  // counted from 1, the process number
 constexpr size_t kLongestLine = 4096;
 
-// "" when it cannot be read.
-std::string contentOf(const std::string& path) {
+// "" for a file that is not there, as of a process that has ended; nothing for one that cannot be read.
+std::optional<std::string> contentOf(const std::string& path) {
     const KeepErrno keep;
     std::string text;
     const Descriptor fd = openFile(path, O_RDONLY);
-    if (!fd || !readAll(fd.get(), text, kLongestLine)) return "";
-    return text;
+    if (fd && readAll(fd.get(), text, kLongestLine)) return text;
+    return errno == ENOENT || errno == ESRCH ? std::optional(std::string()) : std::nullopt;
 }
 
+// "" when the kernel does not say.
 const std::string& bootId() {
-    static const std::string id = [] {
-        const std::string text = contentOf("/proc/sys/kernel/random/boot_id");
-        return text.substr(0, text.find('\n'));
-    }();
+    static std::string id;
+    if (id.empty()) {
+        const std::string text = contentOf("/proc/sys/kernel/random/boot_id").value_or("");
+        id = text.substr(0, text.find('\n'));
+    }
     return id;
 }
 
-std::optional<unsigned long long> startTimeOfProcess(pid_t pid) {
-    return startTimeOf(contentOf("/proc/" + std::to_string(pid) + "/stat"));
+std::string statusPath(pid_t pid) {
+    return "/proc/" + std::to_string(pid) + "/stat";
 }
 
 }  // namespace
@@ -55,14 +57,18 @@ std::optional<unsigned long long> startTimeOf(std::string_view line) {
 }
 
 Worker thisProcess() {
-    const auto start = startTimeOfProcess(getpid());
-    if (!start) return {};
+    const auto start = startTimeOf(contentOf(statusPath(getpid())).value_or(""));
+    if (!start || bootId().empty()) return {};
     return {getpid(), *start, bootId()};
 }
 
-bool isRunning(const Worker& worker) {
-    if (worker.pid < 1 || worker.boot != bootId()) return false;
-    const auto start = startTimeOfProcess(worker.pid);
+std::optional<bool> isRunning(const Worker& worker) {
+    if (worker.pid < 1) return false;
+    if (bootId().empty()) return std::nullopt;
+    if (worker.boot != bootId()) return false;
+    const auto line = contentOf(statusPath(worker.pid));
+    if (!line) return std::nullopt;
+    const auto start = startTimeOf(*line);
     return start && *start == worker.start;
 }
 

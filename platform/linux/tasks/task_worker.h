@@ -19,8 +19,9 @@ struct Worker {
 // The calling process; nobody when the kernel does not say.
 Worker thisProcess();
 
-// True while that process runs; one that waits for its parent to take notice of its end does not.
-bool isRunning(const Worker& worker);
+// True while that process runs; one that waits for its parent to take notice of its end does not. Nothing when that
+// cannot be determined: neither may it be killed then, nor its task be taken for abandoned.
+std::optional<bool> isRunning(const Worker& worker);
 
 // The start time in a line of /proc/<pid>/stat; nothing for a process that has ended and for another text. Pure.
 std::optional<unsigned long long> startTimeOf(std::string_view line);
