@@ -150,6 +150,15 @@ TEST_F(IndexFilesTest, AFullDiskTakesTheBatchBackAndNothingElse) {
         EXPECT_EQ(errno, ENOSPC);
         const Addresses left = select(db);
         EXPECT_EQ(std::count(left.begin(), left.end(), "photo:first"), 1);
+
+        // A batch that nobody asks about before other databases take its place.
+        bool reported = false;
+        for (int i = 0; i < 4000; ++i) reported = insert(db, {.path = "q" + std::to_string(i)}) != 0 || reported;
+        for (int i = 0; i < 9; ++i) {
+            const std::string other = systemRoot() + "/other" + std::to_string(i);
+            EXPECT_TRUE(FILEIDXDBCreate(other.c_str()) == 0 && select(other).empty());
+        }
+        EXPECT_TRUE(FILEIDXDBFlush(db.c_str()) < 0 || reported);
         return 0;
     }));
 }

@@ -154,12 +154,17 @@ Database* Connections::use(Entry& entry) {
     return entry.database.get();
 }
 
+// One whose batch could not be written stays open until its next use has reported that.
 void Connections::makeRoom() {
     if (entries_.size() < kMostOpen) return;
-    const auto oldest = std::min_element(entries_.begin(), entries_.end(),
-                                         [](const auto& a, const auto& b) { return a->used < b->used; });
-    static_cast<void>((*oldest)->database->commit());
-    entries_.erase(oldest);
+    const auto oldest = std::min_element(entries_.begin(), entries_.end(), [](const auto& a, const auto& b) {
+        const bool isBroken = a->failure.code != 0;
+        return isBroken != (b->failure.code != 0) ? !isBroken : a->used < b->used;
+    });
+    Entry& entry = **oldest;
+    const QuietFailures quiet;
+    if (entry.failure.code == 0 && !entry.database->commit()) entry.failure = QuietFailures::last();
+    if (entry.failure.code == 0) entries_.erase(oldest);
 }
 
 bool Connections::close(const std::string& path) {
