@@ -162,6 +162,10 @@ TEST_F(AccountTest, ExpiryIsReadAsRootAfterTheSwitch) {
     actingForAlice([] { EXPECT_TRUE(userOf("alice").ends_with(" 77")); });
     asUser(kBobUid, kUsersGid,
            [] { EXPECT_TRUE(userOf("alice").ends_with(" -1")) << "unknown without the right to look"; });
+    fs::remove(systemRoot() + "/etc/shadow");
+    makeFolder(systemRoot() + "/etc/shadow");
+    EXPECT_EQ(userOf("alice"), kFailed) << "that it has not ended is not known either";
+    EXPECT_TRUE(userOf(kAliceUid).starts_with("alice ")) << "who it is, is";
     const long today = time(nullptr) / 86400;
     for (const long expiry : {-1L, today + 2}) EXPECT_EQ(VEXOUserIsExpired(expiry), 0);
     for (const long expiry : {0L, today}) EXPECT_EQ(VEXOUserIsExpired(expiry), 1);

@@ -18,7 +18,7 @@ struct VEXOUSER {
     char szHome[4096];  // root of the share "homes" + "/" + name ("/@DOMAIN/name" for a domain user); "" without that
                         // share
     int authType;       // AUTH_TYPE
-    long expiry;        // day since the epoch on which the account ends; -1 never
+    long expiry;        // day since the epoch on which the account ends; -1 never, or not for the process to know
 };
 typedef VEXOUSER* PVEXOUSER;
 
@@ -33,8 +33,9 @@ typedef struct VEXOGROUPDB* PVEXOGROUPDB;
 
 VEXO_BEGIN_C
 
-// Fills a new record (the caller's, freed with VEXOUserFree). >=0, or <0 with 0x1D00 unknown, 0x8100 lookup failed and
-// `*out` null. An id that was not found is remembered as missing for the rest of the process.
+// Fills a new record (the caller's, freed with VEXOUserFree). >=0, or <0 with 0x1D00 unknown, 0x8100 lookup failed (of
+// a name also that of its expiry, which is root's to ask) and `*out` null. An id that was not found is remembered as
+// missing for the rest of the process.
 VEXO_API int VEXOUserGet(const char* name, PVEXOUSER* out);
 VEXO_API int VEXOUserGetByUID(uid_t uid, PVEXOUSER* out);
 VEXO_API void VEXOUserFree(PVEXOUSER user);  // null is accepted

@@ -108,20 +108,26 @@ const std::vector<gid_t>& AccountFiles::listing(const std::string& user) const {
     return found == listing_.end() ? none : found->second;
 }
 
-long AccountFiles::expiry(const std::string& shadow, const std::string& user) {
-    const KeepErrno keep;
-    if (!shadowVersion_.isCurrentAt(shadow)) readExpiries(shadow);
+std::optional<long> AccountFiles::expiry(const std::string& shadow, const std::string& user) {
+    const int before = errno;
+    if (!shadowVersion_.isCurrentAt(shadow) && !readExpiries(shadow)) return std::nullopt;
+    errno = before;
     const auto found = expiries_.find(user);
     return found == expiries_.end() ? -1 : found->second;
 }
 
-void AccountFiles::readExpiries(const std::string& path) {
+// No file, and one that is closed to this process, count as one without an end of anybody.
+bool AccountFiles::readExpiries(const std::string& path) {
     expiries_.clear();
     shadowVersion_ = {};
+    FileVersion version;
     const orvel::RaisedIdentity raised;
-    const File file = openRecords(path, shadowVersion_);
-    if (file == nullptr) return;
+    const File file = openRecords(path, version);
+    if (file == nullptr) return errno == ENOENT || errno == ENOTDIR || errno == EACCES;
     while (const spwd* record = fgetspent(file.get())) expiries_.emplace(record->sp_namp, record->sp_expire);
+    if (ferror(file.get()) != 0) return false;
+    shadowVersion_ = version;
+    return true;
 }
 
 }  // namespace vexo

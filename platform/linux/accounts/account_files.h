@@ -2,6 +2,7 @@
 #ifndef VEXO_LINUX_ACCOUNT_FILES_H
 #define VEXO_LINUX_ACCOUNT_FILES_H
 
+#include <optional>
 #include <string>
 #include <unordered_map>
 #include <vector>
@@ -28,13 +29,14 @@ class AccountFiles {
     // The groups that list `user` as a member.
     [[nodiscard]] const std::vector<gid_t>& listing(const std::string& user) const;
 
-    // The day on which the account ends; -1 never or unknown. The file is root's alone, so it is read as root.
-    [[nodiscard]] long expiry(const std::string& shadow, const std::string& user);
+    // The day on which the account ends; -1 never, or not for this process to know. The file is root's alone, so it is
+    // read as root. Nothing, with errno, when it cannot be read.
+    [[nodiscard]] std::optional<long> expiry(const std::string& shadow, const std::string& user);
 
  private:
     [[nodiscard]] bool readUsers(const std::string& path);
     [[nodiscard]] bool readGroups(const std::string& path);
-    void readExpiries(const std::string& path);
+    [[nodiscard]] bool readExpiries(const std::string& path);
 
     FileVersion passwdVersion_;
     FileVersion groupVersion_;

@@ -98,14 +98,16 @@ std::vector<gid_t> groupsOf(const std::string& user, gid_t primary) {
     return gids;
 }
 
-long expiry(const std::string& user) {
-    const KeepErrno keep;
+std::optional<long> expiry(const std::string& user) {
+    const int before = errno;
     const orvel::RaisedIdentity raised;
     spwd record{};
     std::vector<char> buffer;
     const Lookup answer = ask(record, buffer, [&](spwd* out, char* bytes, size_t size, spwd** result) {
         return getspnam_r(user.c_str(), out, bytes, size, result);
     });
+    if (answer == Lookup::failed && errno != EACCES) return std::nullopt;
+    errno = before;
     return answer == Lookup::found ? record.sp_expire : -1;
 }
 

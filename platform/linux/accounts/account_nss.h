@@ -2,6 +2,7 @@
 #ifndef VEXO_LINUX_ACCOUNT_NSS_H
 #define VEXO_LINUX_ACCOUNT_NSS_H
 
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -15,7 +16,8 @@ namespace vexo::nss {
 [[nodiscard]] Lookup group(const std::string& name, Group& out);
 [[nodiscard]] Lookup group(gid_t gid, Group& out);
 [[nodiscard]] std::vector<gid_t> groupsOf(const std::string& user, gid_t primary);
-[[nodiscard]] long expiry(const std::string& user);
+// As AccountSource answers.
+[[nodiscard]] std::optional<long> expiry(const std::string& user);
 [[nodiscard]] bool users(std::vector<Account>& out);
 [[nodiscard]] bool groups(std::vector<Group>& out);
 

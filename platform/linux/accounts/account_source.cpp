@@ -106,13 +106,14 @@ bool AccountSource::groupsOf(const std::string& user, gid_t primary, std::vector
     return true;
 }
 
-long AccountSource::expiry(const std::string& user) {
+std::optional<long> AccountSource::expiry(const std::string& user) {
     const Origin origin = refresh();
     if (origin == Origin::files) return files_.expiry(VEXO::SystemPath("/etc/shadow"), user);
-    if (origin == Origin::unreadable) return -1;
-    auto place = expiryOfUser_.find(user);
-    if (place == expiryOfUser_.end()) place = expiryOfUser_.emplace(user, nss::expiry(user)).first;
-    return place->second;
+    if (origin == Origin::unreadable) return std::nullopt;
+    if (const auto known = expiryOfUser_.find(user); known != expiryOfUser_.end()) return known->second;
+    const std::optional<long> day = nss::expiry(user);
+    if (day) expiryOfUser_.emplace(user, *day);
+    return day;
 }
 
 bool AccountSource::users(std::vector<Account>& out) {

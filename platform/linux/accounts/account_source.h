@@ -33,8 +33,9 @@ class AccountSource {
 
     // Every group of `user`, `primary` in front; false with errno.
     [[nodiscard]] bool groupsOf(const std::string& user, gid_t primary, std::vector<gid_t>& out);
-    // The day on which the account ends; -1 never, or unknown.
-    [[nodiscard]] long expiry(const std::string& user);
+    // The day on which the account ends; -1 never, or not for this process to know (only root may ask). Nothing, with
+    // errno, when it could not be determined.
+    [[nodiscard]] std::optional<long> expiry(const std::string& user);
 
     // All of them in the order of the source; false with errno.
     [[nodiscard]] bool users(std::vector<Account>& out);

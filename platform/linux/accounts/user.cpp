@@ -31,7 +31,7 @@ bool fillRecord(const vexo::Account& account, VEXOUSER& user) {
     user.authType = vexo::splitAccountName(account.name).type;
     if (!vexo::fillField(user.szName, account.name) || !vexo::fillField(user.szHome, vexo::homeOf(account.name)))
         return false;
-    user.expiry = vexo::AccountSource::instance().expiry(account.name);
+    user.expiry = vexo::AccountSource::instance().expiry(account.name).value_or(-1);
     return true;
 }
 
@@ -41,6 +41,13 @@ int failLookup(vexo::Lookup answer) {
 
 vexo::Lookup findUser(const std::string& name, vexo::Account& account) {
     return vexo::isAccountName(name) ? vexo::AccountSource::instance().user(name, account) : vexo::Lookup::missing;
+}
+
+// The same for a record that is asked when the account ends: one that has ended must not pass for one that has not.
+vexo::Lookup findWithExpiry(const std::string& name, vexo::Account& account) {
+    const vexo::Lookup answer = findUser(name, account);
+    if (answer != vexo::Lookup::found || vexo::AccountSource::instance().expiry(name)) return answer;
+    return vexo::Lookup::failed;
 }
 
 int deliver(vexo::Lookup answer, const vexo::Account& account, PVEXOUSER* out) {
@@ -60,7 +67,7 @@ int VEXOUserGet(const char* name, PVEXOUSER* out) try {
     if (name == nullptr || out == nullptr) return vexo::fail(VEXO_ERR_PARAMETER);
     const int before = errno;
     vexo::Account account;
-    const vexo::Lookup answer = vexo::askAgain([&] { return findUser(name, account); },
+    const vexo::Lookup answer = vexo::askAgain([&] { return findWithExpiry(name, account); },
                                                [](vexo::Lookup found) { return found == vexo::Lookup::failed; });
     if (answer != vexo::Lookup::failed) errno = before;
     return deliver(answer, account, out);
