@@ -182,6 +182,10 @@ TEST_F(AccountTest, Administrators) {
         EXPECT_EQ(VEXOGroupIsAdminGroupMem(user), answer) << user;
         EXPECT_TRUE(answer >= 0 || VLIBCErrGet() == VEXO_ERR_USER_MISSING);
     }
+    fs::remove(systemRoot() + "/etc/vexoinfo.conf");
+    makeFolder(systemRoot() + "/etc/vexoinfo.conf");
+    EXPECT_EQ(VEXOGroupIsAdminGroupMem("carol"), -1) << "which group it is cannot be determined";
+    EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_GENERAL);
 }
 
 TEST_F(AccountTest, Lists) {

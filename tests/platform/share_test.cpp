@@ -158,6 +158,9 @@ TEST_F(ShareTest, ChangesAreSeen) {
     EXPECT_STREQ(share->szName, "f");
     VEXOShareFree(share);
     VEXOShareDBClose(db);
+    fs::remove(systemRoot() + "/etc/vexoinfo.conf");
+    makeFolder(systemRoot() + "/etc/vexoinfo.conf");
+    EXPECT_EQ(VEXOShareDBOpen(), nullptr) << "the shares of another file must not stand in for these";
 }
 
 TEST_F(ShareTest, RootsWithVariablesFollowTheUser) {

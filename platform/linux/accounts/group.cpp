@@ -14,7 +14,7 @@
 #include "failure.h"
 #include "fault_gate.h"
 #include "field.h"
-#include "vexo/settings.h"
+#include "settings/appliance_setting.h"
 #include "vexo/user.h"
 
 struct VEXOGROUPDB {
@@ -70,9 +70,10 @@ int isAdministrator(const char* user) {
     if (user == nullptr) return vexo::fail(VEXO_ERR_PARAMETER);
     std::vector<gid_t> gids;
     if (findGroups(user, gids) < 0) return -1;
-    const std::string name = VexoConf::Info().Get("admin_group", "administrators");
+    const auto name = vexo::readSetting("admin_group", "administrators");
+    if (!name) return vexo::fail(VEXO_ERR_GENERAL);
     vexo::Group administrators;
-    const vexo::Lookup answer = vexo::AccountSource::instance().group(name, administrators);
+    const vexo::Lookup answer = vexo::AccountSource::instance().group(*name, administrators);
     if (answer == vexo::Lookup::failed) return vexo::fail(VEXO_ERR_GENERAL);
     const bool member =
         answer == vexo::Lookup::found && std::find(gids.begin(), gids.end(), administrators.gid) != gids.end();

@@ -13,6 +13,7 @@
 #include "failure.h"
 #include "fault_gate.h"
 #include "io/trusted_file.h"
+#include "settings/appliance_setting.h"
 #include "settings/settings_file.h"
 #include "settings/settings_text.h"
 #include "vexo/system_root.h"
@@ -65,6 +66,15 @@ int addAll(const std::vector<vexo::Setting>& settings, PVLIBCSZHASH* hash) {
 }
 
 }  // namespace
+
+std::optional<std::string> vexo::readSetting(std::string_view key, std::string_view otherwise) {
+    const int before = errno;
+    const auto* settings = load(kSettings);
+    if (settings == nullptr && errno != ENOENT && errno != ENOTDIR) return std::nullopt;
+    errno = before;
+    const auto found = settings == nullptr ? std::nullopt : findSetting(*settings, key);
+    return std::string(found.value_or(otherwise));
+}
 
 int VLIBCFileGetKeyValue(const char* file, const char* key, char* value, int size, int flags) try {
     VEXO_GATE("VLIBCFileGetKeyValue", -1);

@@ -14,7 +14,7 @@
 #include "base/printable.h"
 #include "failure.h"
 #include "io/file_io.h"
-#include "vexo/settings.h"
+#include "settings/appliance_setting.h"
 #include "vexo/system_root.h"
 
 namespace vexo {
@@ -132,8 +132,10 @@ bool isFresh(const Stamp& stamp) {
     return stamp.seconds + kQuiet >= now.tv_sec && stamp.seconds <= now.tv_sec + kQuiet;
 }
 
-std::string definitionsPath() {
-    return VEXO::SystemPath(VexoConf::Info().Get("share_definitions", kDefinitions));
+// Nothing, with errno, when the settings cannot be read: the shares of another file must not be served.
+std::optional<std::string> definitionsPath() {
+    const auto file = readSetting("share_definitions", kDefinitions);
+    return file ? std::optional(VEXO::SystemPath(*file)) : std::nullopt;
 }
 
 PathVariables variablesOf(const Account& account, const std::string& share) {
@@ -195,7 +197,9 @@ bool ShareTable::isRoot(const std::string& path) const {
 
 std::shared_ptr<const ShareTable> currentShares() {
     static Store& store = *new Store;  // still asked at exit
-    const std::string path = definitionsPath();
+    const std::optional<std::string> found = definitionsPath();
+    if (!found) return nullptr;
+    const std::string& path = *found;
     {
         const KeepErrno keep;
         if (store.isCurrent(path)) return store.table;
@@ -233,7 +237,13 @@ std::optional<std::string> homeIn(const ShareDefinition& homes, const Account& a
 
 DefinitionsReport reportDefinitions() {
     DefinitionsReport report;
-    const std::string path = definitionsPath();
+    const std::optional<std::string> found = definitionsPath();
+    if (!found) {
+        report.error = errno;
+        report.paths.push_back(VEXO::SystemPath("/etc/vexoinfo.conf"));
+        return report;
+    }
+    const std::string& path = *found;
     report.paths.push_back(path);
     Store fresh;
     const std::optional<std::string> text = fresh.read(path);

@@ -32,7 +32,8 @@ class ShareTable {
     std::vector<size_t> withVariables_;
 };
 
-// The definitions as they are now; null with errno when they cannot be read. A table stays as it is while it is held.
+// The definitions as they are now; null with errno when they, or the settings that say where they are, cannot be read.
+// A table stays as it is while it is held.
 [[nodiscard]] std::shared_ptr<const ShareTable> currentShares();
 
 // The root of a share for the user of this request (REMOTE_USER, else the owner of the effective uid); nothing when
@@ -48,7 +49,7 @@ class ShareTable {
 // What was read, and why a section is no share.
 struct DefinitionsReport {
     std::vector<std::string> paths;  // of the files, the main one first
-    int error = 0;                   // errno where that cannot be read
+    int error = 0;                   // errno where that, or the settings that name it (in its place), cannot be read
     Definitions definitions;
     std::vector<ShareReading> readings;  // of the sections, in their order
 };
