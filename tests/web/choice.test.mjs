@@ -163,3 +163,27 @@ test("many are downloaded as one field, and what the web server refuses says so"
     },
     [/status of (413|502)/, /^status (413|502)/],
   ));
+
+test("a frame drawn beside the names chooses what it touches, in tiles, too", () =>
+  withPage("admin", { path: "/photo" }, async (page) => {
+    const drag = async (from, to) => {
+      await page.mouse.move(...from);
+      await page.mouse.down();
+      await page.mouse.move(...to, { steps: 5 });
+      await page.mouse.up();
+    };
+    const box = async (index) => page.locator(`#row-${index}`).boundingBox();
+    const cell = await page.locator("#row-2 .mtime").boundingBox();
+    await drag([cell.x + 60, cell.y + 8], [cell.x + 90, (await box(5)).y + 10]);
+    await chosenCount(page, 4);
+    await page.click(".view-switch button >> nth=1");
+    await rowsReady(page);
+    const [first, other] = [await box(0), await box(1)];
+    const below = await page.locator("#view .row").evaluateAll((rows) => {
+      const { left, top } = rows[0].getBoundingClientRect();
+      return rows.map((one) => one.getBoundingClientRect()).find((one) => one.left === left && one.top > top).bottom;
+    });
+    await page.keyboard.press("Escape");
+    await drag([first.x - 6, first.y + 4], [other.x + 20, below - 10]);
+    await chosenCount(page, 4); // two of two lines, not all between
+  }));

@@ -175,4 +175,15 @@ test("packed, extracted", () =>
     await page.click(".picker >> text=Extract here");
     await page.waitForSelector(".activity-card.good >> text=Extract");
     assert.ok(existsSync(`${projects}/house/unpacked/notes.md`));
+
+    await row(page, "notes.zip").click();
+    await page.click("#toolbar [data-command=moveTo]");
+    await page.click(".picker >> text=house");
+    await page.click(".picker >> text=Move here");
+    const moved = card(page, "Move “notes.zip” to house");
+    await moved.locator("text=Undo").waitFor();
+    assert.ok(!existsSync(`${projects}/notes.zip`));
+    await moved.locator("text=Undo").click();
+    await wentWell(page, "Move “notes.zip” to projects");
+    assert.ok(existsSync(`${projects}/notes.zip`));
   }));

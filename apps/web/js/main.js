@@ -32,6 +32,7 @@ import { isSearch, parentOf } from "./path.js";
 import { setupPathbar } from "./pathbar.js";
 import { setupPointer } from "./pointer.js";
 import { preview, previewed } from "./preview.js";
+import { setupRubber } from "./rubber.js";
 import { openSearch, searchAgain, searchFor, setupSearch } from "./search.js";
 import { setupSession } from "./session.js";
 import { setupSettings } from "./settings.js";
@@ -264,6 +265,7 @@ async function start() {
   setupPathbar();
   setupTree();
   setupPointer();
+  setupRubber();
   setupKeys();
   setupFind();
   setupSidebar();

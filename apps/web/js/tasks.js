@@ -9,7 +9,7 @@ import { plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { emit } from "./events.js";
 import { formatSize } from "./format.js";
-import { idIn, isWithin, nameOf, parentOf, pathLists } from "./path.js";
+import { childOf, idIn, isWithin, lastOf, nameOf, parentOf, pathLists } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { searchTask } from "./operations.js";
 import { forget, note, noteOf } from "./task_notes.js";
@@ -54,7 +54,7 @@ export async function startTask(action, ids, { params = {}, affected = [], targe
       const asked = { action, paths_raw: lines.join("\n"), ...params, taskid: searchTask() };
       const { taskid } = await post("operation", asked);
       note(taskid, { count: some.length, name: some.length === 1 ? nameOf(some[0]) : undefined, target, bin });
-      show({ taskid, action, state: "running", items_done: 0, progress: 0 }, { ids: some, params, folders });
+      show({ taskid, action, state: "running", items_done: 0, progress: 0 }, { ids: some, params, folders, target });
       tabs.postMessage(taskid);
     } catch (failure) {
       toastFailure(failure, some[0]);
@@ -64,7 +64,7 @@ export async function startTask(action, ids, { params = {}, affected = [], targe
   return true;
 }
 
-// order: {ids, params, folders} of what this page started.
+// order: {ids, params, folders, target} of what this page started.
 function show(task, order = { folders: [] }) {
   const { taskid } = task;
   const card = new Card({
@@ -151,8 +151,16 @@ function finish(task, card, order) {
   ];
   const kind = task.state === "cancelled" ? "stopped" : isGood(task) ? "good" : "failed";
   const again = retryOf(task, order);
+  const back = undoOf(task, order);
   const actions = [
     target && task.items_done > 0 && { label: t("activity.show"), run: () => go(target) },
+    back && {
+      label: t("activity.undo"),
+      run: () => {
+        card.remove();
+        startTask("move", back.ids, back);
+      },
+    },
     again && {
       label: t(isLocked(task) ? "extract.password.ask" : "state.retry"),
       run: async () => {
@@ -167,6 +175,16 @@ function finish(task, card, order) {
   if (!document.hidden) note(task.taskid, { seen: true });
   emit("folders-changed", { ids: [...new Set([...order.folders, browser.id])] });
   refresh();
+}
+
+// The way back of what was moved from one folder, under the names that it had. Where a name could have been another's it
+// has no way back.
+function undoOf(task, { ids = [], params = {}, target }) {
+  if (task.action !== "move" || !isGood(task) || task.items_skipped > 0 || params.conflict !== "error") return null;
+  const [from] = new Set(ids.map(parentOf));
+  if (!ids.every((id) => parentOf(id) === from)) return null;
+  const moved = ids.map((id) => childOf(target, lastOf(id)));
+  return { ids: moved, params: { target_raw: from, conflict: "error" }, affected: [from], target: from };
 }
 
 // Whether what failed is an archive whose password is not known.
