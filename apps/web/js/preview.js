@@ -13,6 +13,7 @@ import { t } from "./strings.js";
 
 const TEXT_START = 256 * 1024;
 const LARGEST_IMAGE = 64 * 1024 * 1024;
+const LARGEST_AHEAD = 16 * 1024 * 1024;
 const TEXT_KINDS = new Set(["text", "code", "misc", "sheet"]);
 
 let shown = null;
@@ -120,8 +121,19 @@ async function fill(entry) {
   const content = await contentOf(entry, abort.signal).catch((failure) => message(entry, describe(failure).title));
   if (abort.signal.aborted) return;
   shown.stage.replaceChildren(content);
+  if (content.matches("img")) fetchBeside();
   // Pictures and films lie on a dark ground, what is read on that of the page.
   shown.node.classList.toggle("paper", !content.matches("img, video"));
+}
+
+// The pictures before and behind this one, so that a step finds them there.
+function fetchBeside() {
+  const { listing, selection } = browser;
+  for (const by of [1, -1]) {
+    const entry = listing?.item(selection.cursor + by);
+    if (!entry || !canShowImage(entry.name) || !(entry.size > 0 && entry.size <= LARGEST_AHEAD)) continue;
+    h("img", { src: source(entry) });
+  }
 }
 
 async function contentOf(entry, signal) {
