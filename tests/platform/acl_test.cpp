@@ -12,6 +12,7 @@
 #include "filesystem/acl_rules.h"
 #include "io/file_io.h"
 #include "platform/private_mounts.h"
+#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 namespace {
@@ -241,6 +242,14 @@ TEST_F(AclTest, FailuresAndOddPaths) {
     ASSERT_EQ(chdir(root_.c_str()), 0);
     EXPECT_NE(byPath("link") & VEXO_ACL_DELETE, 0U);  // the link goes, not its target
     EXPECT_EQ(errno, 0);
+    inChild([&] {
+        const vexo::Descriptor folder = vexo::openFile(root_, O_RDONLY | O_DIRECTORY);
+        unsigned permission = 0;
+        EXPECT_TRUE(refuseCalls({{SYS_statx, EIO}}));
+        EXPECT_FAILS(VEXOACLPermGet("a", &permission), EIO,
+                     VEXO_ERR_GENERAL);  // whether it may be removed is not known
+        EXPECT_EQ(VEXOACLFolderOpen(folder.get()), nullptr);
+    });
 }
 
 TEST_F(AclTest, SupportIsAskedOncePerDevice) {

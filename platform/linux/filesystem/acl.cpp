@@ -64,31 +64,37 @@ bool isPlain(const struct statfs& fileSystem) {
     }
 }
 
-// What removing entries of the folder `path` (relative to `dirfd`) takes; a folder that cannot be examined takes none.
-FolderFacts removalFacts(int dirfd, const char* path) {
-    FolderFacts facts{};
+bool meansDenied(int systemCode) {
+    return systemCode == EACCES || systemCode == EPERM || systemCode == EROFS;
+}
+
+// What removing entries of the folder `path` (relative to `dirfd`) takes; one that is denied takes none. 0, or the
+// errno value for which that could not be determined.
+int readRemovalFacts(int dirfd, const char* path, FolderFacts& facts) {
     _tag_VEXOSTAT_ status;
-    if (faccessat(dirfd, path, W_OK | X_OK, AT_EACCESS) != 0) return facts;
-    if (!vexo::readStatus(dirfd, path, 0, false, status)) return facts;
+    if (faccessat(dirfd, path, W_OK | X_OK, AT_EACCESS) != 0 || !vexo::readStatus(dirfd, path, 0, false, status)) {
+        return meansDenied(errno) ? 0 : errno;
+    }
     facts.removable = (status.st_attributes & VEXO_ATTRIBUTE_APPEND) == 0;
     facts.sticky = (status.st_mode & S_ISVTX) != 0;
     facts.owner = status.st_uid;
-    return facts;
+    return 0;
 }
 
 bool openFolder(int dirfd, VEXOACLFOLDER& folder) {
     struct stat status;
     struct statfs fileSystem;
     if (fstat(dirfd, &status) != 0 || fstatfs(dirfd, &fileSystem) != 0) return false;
-    const vexo::KeepErrno keep;
+    const int before = errno;
     folder.dirfd = dirfd;
     folder.who = currentIdentity();
-    folder.facts = removalFacts(dirfd, ".");
+    const int failure = readRemovalFacts(dirfd, ".", folder.facts);
     folder.facts.device = status.st_dev;
     folder.facts.plain = isPlain(fileSystem);
     folder.facts.readOnly = (fileSystem.f_flags & ST_RDONLY) != 0;
     folder.facts.noExecute = (fileSystem.f_flags & ST_NOEXEC) != 0;
-    return true;
+    errno = failure != 0 ? failure : before;
+    return failure == 0;
 }
 
 // Adds to `granted` the bits that the kernel grants: the likely ones in one question, the rest one by one. 0, or the
@@ -101,8 +107,7 @@ int askKernel(int dirfd, const char* path, int flags, unsigned bits, unsigned li
             granted |= asked;
             return true;
         }
-        const bool denied = errno == EACCES || errno == EPERM || errno == EROFS || errno == ETXTBSY;
-        if (!denied) failure = errno;
+        if (!meansDenied(errno) && errno != ETXTBSY) failure = errno;
         return false;
     };
     if (likely != 0 && allowed(likely)) bits &= ~likely;
@@ -137,18 +142,25 @@ int permissionInFolder(const VEXOACLFOLDER& folder, const char* name, const _tag
 }
 
 // Whether the parent folder of `path` lets the effective identity remove it. The last component decides which entry
-// that is, so a link is judged itself; "/", "." and ".." are never removed under that name.
-bool removableByPath(std::string path) {
+// that is, so a link is judged itself; "/", "." and ".." are never removed under that name. 0, or the errno value for
+// which that could not be determined.
+int judgeRemoval(std::string path, bool& removable) {
     const vexo::KeepErrno keep;
+    removable = false;
     while (path.size() > 1 && path.back() == '/') path.pop_back();
     const size_t slash = path.rfind('/');
     const std::string name = slash == std::string::npos ? path : path.substr(slash + 1);
-    if (name.empty() || name == "." || name == "..") return false;
+    if (name.empty() || name == "." || name == "..") return 0;
     std::string parent = ".";
     if (slash != std::string::npos) parent = slash == 0 ? "/" : path.substr(0, slash);
     _tag_VEXOSTAT_ status;
-    if (!vexo::readStatus(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW, false, status)) return false;
-    return vexo::mayRemove(currentIdentity(), removalFacts(AT_FDCWD, parent.c_str()), status);
+    if (!vexo::readStatus(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW, false, status)) {
+        return meansDenied(errno) ? 0 : errno;
+    }
+    FolderFacts facts{};
+    const int failure = readRemovalFacts(AT_FDCWD, parent.c_str(), facts);
+    removable = failure == 0 && vexo::mayRemove(currentIdentity(), facts, status);
+    return failure;
 }
 
 }  // namespace
@@ -157,9 +169,11 @@ int VEXOACLPermGet(const char* path, unsigned* permission) try {
     VEXO_GATE("VEXOACLPermGet", -1);
     if (path == nullptr || permission == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     unsigned granted = 0;
-    const int failure = askKernel(AT_FDCWD, path, 0, R_OK | W_OK | X_OK, 0, granted);
+    bool removable = false;
+    int failure = askKernel(AT_FDCWD, path, 0, R_OK | W_OK | X_OK, 0, granted);
+    if (failure == 0) failure = judgeRemoval(path, removable);
     if (failure == 0) {
-        *permission = permissionOf(granted, removableByPath(path));
+        *permission = permissionOf(granted, removable);
         return 0;
     }
     _tag_VEXOSTAT_ status;
