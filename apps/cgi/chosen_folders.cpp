@@ -28,6 +28,14 @@ int chooseFolder(const User& user, const std::string& path, PathInfo& info, std:
     return ORV_ERR_NONE;
 }
 
+std::optional<UsedIndex> indexOf(const std::string& share) {
+    UsedIndex index;
+    int live = 0;
+    if (FILEIDXIsIndexEnable(share.c_str()) != 1) return std::nullopt;
+    if (FILEIDXIndexAsOf(share.c_str(), &index.updated, &live) == 0) index.live = live != 0;
+    return index;
+}
+
 }  // namespace
 
 int chooseFolders(const User& user, const std::vector<std::string>& paths, std::vector<std::string>& folders,
@@ -52,19 +60,19 @@ int chooseFolders(const User& user, const std::vector<std::string>& paths, std::
     return ORV_ERR_DENIED;
 }
 
-std::map<std::string, bool> searchedShares(const std::vector<std::string>& folders) {
-    std::map<std::string, bool> shares;
+std::map<std::string, std::optional<UsedIndex>> searchedShares(const std::vector<std::string>& folders) {
+    std::map<std::string, std::optional<UsedIndex>> shares;
     for (const std::string& folder : folders) {
         const bool home = IsDirUserHome(folder, nullptr);
         const std::string share = home ? "homes" : folder.substr(1, folder.find('/', 1) - 1);
-        shares[share] = FILEIDXIsIndexEnable(share.c_str()) == 1;
+        if (shares.find(share) == shares.end()) shares[share] = indexOf(share);
     }
     return shares;
 }
 
 std::vector<std::string> foldersWithoutMounts(const std::string& user, const std::vector<std::string>& folders) {
     std::vector<std::string> found;
-    const std::map<std::string, bool> shares = searchedShares(folders);
+    const auto shares = searchedShares(folders);
     for (const std::string& folder : folders) {
         PathInfo info;
         if (!PathInfoFactory::create(user.c_str(), folder, info)) continue;

@@ -2,7 +2,9 @@
 #ifndef ORVEL_CGI_CHOSEN_FOLDERS_H
 #define ORVEL_CGI_CHOSEN_FOLDERS_H
 
+#include <cstdint>
 #include <map>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -18,8 +20,14 @@ namespace orvel::cgi {
 int chooseFolders(const User& user, const std::vector<std::string>& paths, std::vector<std::string>& folders,
                   std::string& culprit);
 
-// The shares that the folders lie in ("homes" for home folders), and whether the file index answers for them.
-std::map<std::string, bool> searchedShares(const std::vector<std::string>& folders);
+// The index that answers for a share.
+struct UsedIndex {
+    int64_t updated = 0;  // when it was last brought in step with the files
+    bool live = false;    // it is kept in step
+};
+
+// The shares that the folders lie in ("homes" for home folders), and the file index that answers for them, if any.
+std::map<std::string, std::optional<UsedIndex>> searchedShares(const std::vector<std::string>& folders);
 
 // Those of the folders which are answered from an index although network mounts lie below them: no index holds what
 // lies on these.

@@ -5,6 +5,7 @@
 // The socket is the one that the service manager hands over, else PATH, else the setting "orveld_socket". SIGTERM ends
 // it when what is under way is served, SIGHUP makes it read the settings again. docs/orveld.md says the rest.
 #include <fcntl.h>
+#include <sqlite3.h>
 #include <syslog.h>
 #include <unistd.h>
 
@@ -96,6 +97,7 @@ int serve(std::string path) {
 }  // namespace orvel::orveld
 
 int main(int count, char** words) {
+    sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);  // nobody reads the count, which takes a lock for each allocation
     std::string path;
     if (count == 3 && std::string_view(words[1]) == "--socket") {
         path = std::filesystem::absolute(words[2]);

@@ -259,6 +259,35 @@ TEST_F(SearchCgi, ARunningSearchIsReadStoppedKilledAndCleaned) {
     EXPECT_EQ(record("alice", id), nullptr);
 }
 
+TEST_F(SearchCgi, TheReplyThatStartsASearchShowsItsFirstRows) {
+    SKIP_WITHOUT_ROOT();
+    const std::string root = addShare("photo", kIndexed);
+    for (const char* name : {"/b.txt", "/a.txt", "/in/c.txt"}) writeFile(root + name, "");
+    index("build", "photo");
+    const std::string form = "action=start&path=/photo&name=*.txt&limit=2&sort_by=name&sort_direction=desc";
+    Json::Value data;
+    // It does not wait long, and on a busy machine not long enough.
+    waitUntil("rows in the reply", [&] {
+        data = ask("alice", form).json["data"];
+        const std::string id = data["taskid"].asString();
+        const Json::Value all = finished("alice", id).json["data"];
+        EXPECT_TRUE(ask("alice", "action=clean&taskid=" + id).json["success"].asBool());
+        EXPECT_GT(all["indexes"]["photo"]["updated"].asInt64(), 0);
+        EXPECT_EQ(all["indexes"]["photo"]["live"], false);
+        return HasFailure() || data.isMember("first");
+    });
+    EXPECT_EQ(data["first"]["total"], 3);
+    EXPECT_EQ(each(data["first"]["items"], "name"), (Names{"c.txt", "b.txt"}));
+    for (const char* wrong : {"&limit=0", "&limit=x", "&limit=10001", "&limit=2&sort_direction=up"}) {
+        EXPECT_EQ(ask("alice", std::string("action=start&path=/photo&name=a") + wrong).status, 400) << wrong;
+    }
+    Gate gate("FILEIDXResultGetAndTableGen", systemRoot() + "/gate");
+    const std::string id = start("alice", form.substr(form.find("path")), {gate.order()});
+    EXPECT_TRUE(gate.holds()) << "the reply came without a row";
+    gate.open();
+    finished("alice", id);
+}
+
 TEST_F(SearchCgi, SearchesOfTheDayBeforeYesterdayAreSweptAway) {
     SKIP_WITHOUT_ROOT();
     const std::string old = start("alice", "path=/photo&name=a"), recent = start("alice", "path=/photo&name=a");

@@ -64,6 +64,27 @@ test("a search: live, sorted, filtered, true after operations", () =>
     assert.equal(await page.evaluate(() => location.hash), "#/projects/%3Ci%3Eodd");
   }));
 
+test("how old the index is that a search was answered from", () =>
+  withPage("alice", { path: "/projects" }, async (page) => {
+    const asOf = { updated: Math.floor(Date.now() / 1000), live: false };
+    let state = { finished: false };
+    await page.route("**/cgi-bin/search*", async (route) => {
+      const response = await route.fetch();
+      const reply = await response.json();
+      const fake = { shares: { projects: "index" }, indexes: { projects: asOf }, ...state };
+      for (const part of [reply.data, reply.data?.first]) if (part?.items) Object.assign(part, fake);
+      await route.fulfill({ response, json: reply });
+    });
+    await page.fill("#find", "needle*");
+    await page.press("#find", "Enter");
+    await page.waitForSelector("#status >> text=still preliminary");
+    state = { finished: true };
+    await page.waitForSelector("#status >> text=/from the index as of .*:/");
+    asOf.live = true;
+    await page.keyboard.press("Alt+r");
+    await page.waitForSelector("#status >> text=kept up to date");
+  }));
+
 test("a search with every kind of criterion, stopped, closed", () =>
   withPage("alice", { path: "/" }, async (page) => {
     await page.click("#search-button");

@@ -17,8 +17,9 @@ constexpr unsigned long kUsualPage = 100;
 constexpr unsigned long kLongestPage = 10000;
 constexpr size_t kLongestFilter = 1000;
 
-// Nothing when a parameter is not what it should be.
-std::optional<ListRequest> parse(const User& user, const VEXO::WebCGI& web) {
+}  // namespace
+
+std::optional<ListRequest> parsePage(const User& user, const VEXO::WebCGI& web) {
     const auto offset = numberParam(web, "offset", 0);
     const auto limit = numberParam(web, "limit", kUsualPage);
     const auto type = typeParam(web);
@@ -38,6 +39,13 @@ std::optional<ListRequest> parse(const User& user, const VEXO::WebCGI& web) {
                        .type = *type};
 }
 
+namespace {
+
+Json::Value objectOf(const KTR::Task& record, const char* property) {
+    const Json::Value value = record.getProperty(property);
+    return value.isObject() ? value : Json::Value(Json::objectValue);
+}
+
 Json::Value stateOf(const KTR::Task& record) {
     Json::Value state;
     state["finished"] = record.isFinished();
@@ -50,8 +58,8 @@ Json::Value stateOf(const KTR::Task& record) {
         state["failure"]["code"] = code;
         state["failure"]["key"] = OrvParseErrorToKTRString(code, nullptr);
     }
-    const Json::Value shares = record.getProperty(kSharesProperty);
-    state["shares"] = shares.isObject() ? shares : Json::Value(Json::objectValue);
+    state["shares"] = objectOf(record, kSharesProperty);
+    state["indexes"] = objectOf(record, kIndexesProperty);
     const Json::Value leftOut = record.getProperty(kLeftOutProperty);
     if (leftOut.isArray() && !leftOut.empty()) state["left_out"] = leftOut;
     return state;
@@ -59,21 +67,30 @@ Json::Value stateOf(const KTR::Task& record) {
 
 }  // namespace
 
-void listResults(Output& out, const User& user, const VEXO::WebCGI& web, const SearchTask& task) {
-    const auto request = parse(user, web);
-    if (!request) return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, "");
+int readPage(const ListRequest& request, const SearchTask& task, ResultPage& page) {
     // Asked first: what is finished has all its results.
-    const Json::Value state = stateOf(*task.record);
-    Listing listing;
-    const int code = task.results == nullptr ? ORV_ERR_MISSING : readResults(*request, *task.results, listing);
+    page.state = stateOf(*task.record);
+    return task.results == nullptr ? ORV_ERR_MISSING : readResults(request, *task.results, page.listing);
+}
+
+void writeResults(const ListRequest& request, const ResultPage& page, Output& out) {
+    appendJson(page.state, out.text());
+    out.text().back() = ',';
+    writePage(request, page.listing, appendEntry, out);
+    out.text() += '}';
+}
+
+void listResults(Output& out, const User& user, const VEXO::WebCGI& web, const SearchTask& task) {
+    const auto request = parsePage(user, web);
+    if (!request) return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, "");
+    ResultPage page;
+    const int code = readPage(*request, task, page);
     if (code != ORV_ERR_NONE) return replyFailure(out, statusOf(code), user.cookie, code, "");
 
     beginReply(out, Status::kOk, user.cookie);
     out.text() += "{\"success\":true,\"data\":";
-    appendJson(state, out.text());
-    out.text().back() = ',';
-    writePage(*request, listing, appendEntry, out);
-    out.text() += "}}";
+    writeResults(*request, page, out);
+    out.text() += '}';
 }
 
 }  // namespace orvel::cgi

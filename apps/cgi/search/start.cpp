@@ -1,8 +1,11 @@
 #include <json/value.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <memory>
+#include <optional>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "background.h"
@@ -22,6 +25,7 @@ using FileSearch::OrvSearchDBTask;
 using FileSearch::OrvSearchWalker;
 
 constexpr size_t kMostFolders = 500;
+constexpr std::chrono::milliseconds kPatience(50), kNap(2);
 
 struct Search {
     Search(const User& user, const Criteria& asked)
@@ -49,10 +53,17 @@ int run(Search& search, const Begun& begun) {
     return record.endUpdate() ? 0 : 1;
 }
 
-Json::Value waysOf(const std::vector<std::string>& folders) {
+void noteShares(KTR::Task& record, const std::vector<std::string>& folders) {
     Json::Value ways(Json::objectValue);
-    for (const auto& [share, indexed] : searchedShares(folders)) ways[readable(share)] = indexed ? "index" : "walk";
-    return ways;
+    Json::Value indexes(Json::objectValue);
+    for (const auto& [share, index] : searchedShares(folders)) {
+        ways[readable(share)] = index ? "index" : "walk";
+        if (!index) continue;
+        indexes[readable(share)]["updated"] = Json::Int64(index->updated);
+        indexes[readable(share)]["live"] = index->live;
+    }
+    record.setProperty(kSharesProperty, ways);
+    record.setProperty(kIndexesProperty, indexes);
 }
 
 Json::Value leftOut(const std::string& user, const std::vector<std::string>& folders) {
@@ -67,7 +78,7 @@ bool note(Search& search, const std::vector<std::string>& folders, const User& u
     KTR::Task& record = *search.record;
     if (!record.beginUpdate()) return false;
     record.setProperty(kVolumeProperty, search.walker.getDBVol());
-    record.setProperty(kSharesProperty, waysOf(folders));
+    noteShares(record, folders);
     record.setProperty(kLeftOutProperty, leftOut(user.name, folders));
     return record.endUpdate();
 }
@@ -87,12 +98,48 @@ int beginSearch(const User& user, const std::vector<std::string>& folders, bool 
     return code;
 }
 
+// Whether there is something to show, or nothing more will come.
+bool hasRows(const SearchTask& task) {
+    const FIQUERY all{};
+    unsigned long long count = 0;
+    if (FILEIDXCountGet(task.results->getDBTaskFilePath(), &all, &count) == 0 && count > 0) return true;
+    return !task.record->reload() || task.record->isFinished();
+}
+
+// A page of what was found within the time that a reply may wait for it. False when there is none yet.
+bool firstPage(const User& user, const std::string& id, const ListRequest& request, ResultPage& page) {
+    using Clock = std::chrono::steady_clock;
+    SearchTask task;
+    if (findTask(user.name, id, task) != ORV_ERR_NONE || task.results == nullptr) return false;
+    const auto end = Clock::now() + kPatience;
+    while (!hasRows(task)) {
+        if (Clock::now() >= end) return false;
+        std::this_thread::sleep_for(kNap);
+    }
+    return task.record->reload() && readPage(request, task, page) == ORV_ERR_NONE;
+}
+
+void replyStarted(Output& out, const User& user, const std::string& id, const std::optional<ListRequest>& request) {
+    ResultPage page;
+    const bool shows = request && firstPage(user, id, *request, page);
+    beginReply(out, Status::kOk, user.cookie);
+    out.text() += "{\"success\":true,\"data\":{\"taskid\":\"" + id + '"';
+    if (shows) {
+        out.text() += ",\"first\":";
+        writeResults(*request, page, out);
+    }
+    out.text() += "}}";
+}
+
 }  // namespace
 
 void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
     const auto paths = pathParams(web);
     const std::string recursive = web.GetParam("recursive", "true");
-    if (!paths || paths->empty() || paths->size() > kMostFolders || (recursive != "true" && recursive != "false")) {
+    const bool asksPage = !std::string(web.GetParam("limit", "")).empty();
+    const auto page = asksPage ? parsePage(user, web) : std::nullopt;
+    if (!paths || paths->empty() || paths->size() > kMostFolders || (recursive != "true" && recursive != "false") ||
+        asksPage != page.has_value()) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
     Criteria criteria;
@@ -110,7 +157,7 @@ void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
     if (code == ORV_ERR_NONE) {
         std::string id;
         code = beginSearch(user, folders, recursive == "true", criteria, id);
-        if (code == ORV_ERR_NONE) data["taskid"] = id;
+        if (code == ORV_ERR_NONE) return replyStarted(out, user, id, page);
     }
     reply(out, statusOf(code), user.cookie, code, culprit, data);
 }

@@ -5,7 +5,7 @@
 
 import { isAbort } from "./api.js";
 
-const PAGE = 200;
+export const PAGE = 200;
 const AHEAD = 60;
 
 export class Listing {

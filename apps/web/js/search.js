@@ -7,19 +7,23 @@ import { toastFailure } from "./dialogs.js";
 import { $, announce, h, iconButton } from "./dom.js";
 import { describe } from "./errors.js";
 import { on } from "./events.js";
+import { formatTime } from "./format.js";
 import { isSearch, normaliseId, taskOf } from "./path.js";
 import { isEmptySearch, paramsOf, searchForm } from "./search_form.js";
+import { firstPage, keepFirstPage } from "./sources.js";
 import { t } from "./strings.js";
 
-const POLL = 700;
+const POLLS = [100, 200, 400, 700]; // the first rows are few, and more come soon
 let asked = {};
 let timer = null;
+let polls = 0;
 
 export function setupSearch() {
   on("listing", watch);
   on("shown", watch);
   on("place", (id) => {
     clearTimeout(timer);
+    polls = 0;
     if (!isSearch(id)) return closePanel();
     asked = recall(id) ?? asked;
     if (asked.folder) browser.lastFolder = normaliseId(asked.folder);
@@ -79,7 +83,9 @@ async function start(values) {
   asked = Object.fromEntries(filled);
   const before = isSearch(browser.id) ? browser.id : null;
   try {
-    const { taskid } = await post("search", { action: "start", ...params });
+    const page = firstPage(browser.sort);
+    const { taskid, first } = await post("search", { action: "start", ...params, ...page });
+    if (first) keepFirstPage(taskid, page, first);
     if (matchMedia("(max-width: 760px)").matches) closePanel();
     if (before) clean(before);
     go(`?${taskid}&${new URLSearchParams(asked)}`);
@@ -114,9 +120,10 @@ function watch() {
   }
   timer = setTimeout(async () => {
     if (listing !== browser.listing) return;
+    polls += 1;
     await refresh();
     watch();
-  }, POLL);
+  }, POLLS[Math.min(polls, POLLS.length - 1)]);
 }
 
 function tell(listing) {
@@ -140,11 +147,23 @@ function closeSearch() {
   go(browser.lastFolder);
 }
 
-export function searchStatus(listing) {
-  const { finished, stopped, shares = {} } = listing.extra ?? {};
+// What answered, and of when it is.
+function wayOf({ shares = {}, indexes = {} }) {
   const ways = new Set(Object.values(shares));
-  const how = ways.size > 0 ? t(`search.by.${ways.size > 1 ? "both" : [...ways][0]}`) : "";
+  if (ways.size === 0) return "";
+  const old = Object.values(indexes).filter(({ live }) => !live);
+  const part = ways.size > 1 ? "both" : [...ways][0];
+  if (part === "walk") return t("search.by.walk");
+  if (old.length === 0) return t(`search.by.${part}.live`);
+  return t(`search.by.${part}`, { time: formatTime(Math.min(...old.map(({ updated }) => updated))) });
+}
+
+export function searchStatus(listing) {
+  const { finished, stopped } = listing.extra ?? {};
   const found = t("search.found", { count: listing.total });
-  if (!finished) return h("span.running", {}, h("i.spinner"), [t("search.running"), found].join(" "));
-  return h("span", {}, [found, stopped && t("search.stopped"), how].filter(Boolean).join(" · "));
+  if (!finished) {
+    const early = listing.total > 0 && t("search.preliminary");
+    return h("span.running", {}, h("i.spinner"), [t("search.running"), found, early].filter(Boolean).join(" "));
+  }
+  return h("span", {}, [found, stopped && t("search.stopped"), wayOf(listing.extra)].filter(Boolean).join(" · "));
 }

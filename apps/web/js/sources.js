@@ -3,7 +3,7 @@
 import { ApiError, get, MISSING } from "./api.js";
 import { breathe } from "./dom.js";
 import { entryOf } from "./entries.js";
-import { Listing } from "./listing.js";
+import { Listing, PAGE } from "./listing.js";
 import { inBothForms, lastOf, parentOf, patternOf } from "./path.js";
 
 const ADDITIONAL = "size,time,owner,perm,mount_point_type,icon";
@@ -36,14 +36,35 @@ export function folderListing(id, { sort, filter }, onChange) {
   return new Listing(parts, fetchPart, onChange);
 }
 
+// The page that a search's list asks for first, before anything is filtered.
+export function firstPage(sort) {
+  return { filter: undefined, additional: ADDITIONAL, ...orderOf(sort), filetype: "all", offset: 0, limit: PAGE };
+}
+
+// The reply that starts a search may carry that page. It is used once, for what it was asked for.
+let kept = null;
+
+export function keepFirstPage(taskid, asked, reply) {
+  kept = { key: JSON.stringify([taskid, asked]), reply };
+}
+
+function takeFirstPage(taskid, asked) {
+  if (kept?.key !== JSON.stringify([taskid, asked])) return null;
+  const { reply } = kept;
+  kept = null;
+  return reply;
+}
+
 // What a search has found so far; `extra` of the listing tells whether it goes on.
 export function searchResults(taskid, { sort, filter, kind }, onChange) {
-  const asked = { action: "list", taskid, filter: filter || undefined, additional: ADDITIONAL, ...orderOf(sort) };
+  const asked = { filter: filter || undefined, additional: ADDITIONAL, ...orderOf(sort) };
   const fetchPart = async (filetype, { offset, limit, brief, signal }) => {
     const page = { ...asked, filetype, offset, limit: limit || LONGEST_PAGE, ...(brief && BRIEF) };
-    const reply = await get("search", page, signal).catch((failure) => {
-      throw failure.code === MISSING ? new ApiError({ key: "page:search_gone" }) : failure;
-    });
+    const fetchPage = () =>
+      get("search", { action: "list", taskid, ...page }, signal).catch((failure) => {
+        throw failure.code === MISSING ? new ApiError({ key: "page:search_gone" }) : failure;
+      });
+    const reply = takeFirstPage(taskid, page) ?? (await fetchPage());
     return { ...reply, items: await entriesOf(reply.items) };
   };
   return new Listing([kind], fetchPart, onChange, LONGEST_PAGE);

@@ -118,6 +118,8 @@ struct FIINDEXSTATUS {
 };
 
 enum { FI_INDEX_BUILD = 0, FI_INDEX_UPDATE = 1 };
+// What a writer knows of the index: it lags behind the files, it is in step with them, or it is and will be kept so.
+enum { FI_INDEX_BEHIND = 0, FI_INDEX_IN_STEP = 1, FI_INDEX_LIVE = 2 };
 
 VEXO_BEGIN_C
 // 1 when the share has the option vexo:index and an index that can be read, else 0.
@@ -170,6 +172,12 @@ VEXO_API int FILEIDXIndexDrop(const char* share);
 VEXO_API long FILEIDXSweep(void);
 // 0, or <0 with 0x0600 when there is none.
 VEXO_API int FILEIDXIndexStatus(const char* share, FIINDEXSTATUS* status);
+// Of when the share's index is, without looking at its records: `updated` as in its status, `live` 1 while a process
+// keeps it in step with the files. <0 as for the status.
+VEXO_API int FILEIDXIndexAsOf(const char* share, int64_t* updated, int* live);
+// Between FILEIDXIndexBegin for an update and its end, after what was written is committed: what the index is now.
+// FI_INDEX_IN_STEP and FI_INDEX_LIVE note the time. That it is live ends with the process.
+VEXO_API int FILEIDXIndexMark(const char* share, int state);
 VEXO_END_C
 
 #endif

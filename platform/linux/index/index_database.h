@@ -83,8 +83,9 @@ class Database {
     bool ofShare_;
     Statement insert_;
     std::optional<Clock::time_point> began_;
-    int rows_ = 0;       // written in this batch
-    int64_t added_ = 0;  // records more than before this batch
+    bool isFirst_ = true;  // batch of this connection
+    int rows_ = 0;         // written in this batch
+    int64_t added_ = 0;    // records more than before this batch
     // In the index of a share no id is given to a second record, even after the first one is gone: this is the highest
     // so far. Searches read on behind an id that they have come to.
     int64_t highest_ = 0;

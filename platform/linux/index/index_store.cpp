@@ -38,6 +38,7 @@ constexpr std::string_view kNew = ".new";  // of an index while it is built
 struct Work {
     int mode;
     Descriptor lock;
+    Descriptor live;  // locked while the index is in step with the files
 };
 
 // Never destroyed: the locks go with the process.
@@ -93,7 +94,7 @@ bool indexExists(std::string_view share) {
 bool begin(const std::string& share, int mode) {
     const orvel::RaisedIdentity raised;
     if (!makeStore()) return false;
-    Work work{mode, lockIndex(share)};
+    Work work{mode, lockIndex(share), Descriptor()};
     if (!work.lock) return false;
     if (mode == FI_INDEX_BUILD) {
         if (!removeFile(newPath(share)) || !Database::create(newPath(share))) return false;
@@ -177,6 +178,36 @@ long removeUnfinished() {
 std::string definedName(const char* share) {
     const ShareRecord record = loadShare(share);
     return record == nullptr ? std::string() : std::string(record->szName);
+}
+
+// A lock of the file, which whoever asks does not take: it belongs to the writer's open file and ends with it.
+struct flock writeLock() {
+    struct flock lock {};
+    lock.l_type = F_WRLCK;
+    lock.l_whence = SEEK_SET;
+    return lock;
+}
+
+bool isLive(const std::string& share) {
+    const Descriptor file = openFile(storePath(share, ".live"), O_RDONLY | O_NOFOLLOW | O_NONBLOCK);
+    struct flock lock = writeLock();
+    return file && fcntl(file.get(), F_OFD_GETLK, &lock) == 0 && lock.l_type != F_UNLCK;
+}
+
+bool mark(const std::string& share, int state, Work& work) {
+    if (state != FI_INDEX_LIVE) work.live.reset();
+    if (state == FI_INDEX_BEHIND) return true;
+    const std::unique_ptr<Database> database = Database::open(indexPath(share), {false, true});
+    if (database == nullptr || !noteTime(database->handle(), false)) return false;
+    if (state == FI_INDEX_IN_STEP || work.live) return true;
+    struct flock lock = writeLock();
+    Descriptor file = openFile(storePath(share, ".live"), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK, 0600);
+    if (!file || fcntl(file.get(), F_OFD_SETLK, &lock) != 0) {
+        fail(errorOfErrno(errno));
+        return false;
+    }
+    work.live = std::move(file);
+    return true;
 }
 
 bool readStatus(const std::string& share, FIINDEXSTATUS& status) {
@@ -302,6 +333,34 @@ int FILEIDXIndexStatus(const char* share, FIINDEXSTATUS* status) try {
     *status = {};
     const orvel::RaisedIdentity raised;
     return vexo::fileindex::readStatus(share, *status) ? 0 : -1;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int FILEIDXIndexAsOf(const char* share, int64_t* updated, int* live) try {
+    VEXO_GATE("FILEIDXIndexAsOf", -1);
+    if (share == nullptr || updated == nullptr || live == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    const orvel::RaisedIdentity raised;
+    const auto database = vexo::fileindex::openIndex(share);
+    vexo::fileindex::State state{};
+    if (database == nullptr || !database->readState(state)) return -1;
+    *updated = state.updated;
+    *live = static_cast<int>(vexo::fileindex::isLive(share));
+    return 0;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int FILEIDXIndexMark(const char* share, int state) try {
+    VEXO_GATE("FILEIDXIndexMark", -1);
+    const std::string name = share == nullptr ? std::string() : definedName(share);
+    const auto work = vexo::fileindex::works().find(name);
+    const bool known = state >= FI_INDEX_BEHIND && state <= FI_INDEX_LIVE;
+    if (!known || work == vexo::fileindex::works().end() || work->second.mode != FI_INDEX_UPDATE) {
+        return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    }
+    const orvel::RaisedIdentity raised;
+    return vexo::fileindex::mark(name, state, work->second) ? 0 : -1;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

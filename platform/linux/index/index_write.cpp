@@ -15,6 +15,7 @@ using Node = __tag_FI_SQL_COND;
 // In a search that finds much, a batch is this large; in one that finds little, it is this old.
 constexpr int kBatchRows = 50000;
 constexpr std::chrono::milliseconds kBatchAge(300);
+constexpr std::chrono::milliseconds kFirstAge(30);  // somebody waits for the first rows
 constexpr int kSetLimit = FI_COL_GROUP + 1;
 
 std::vector<const Node*> nodesToSet(const Node* set) {
@@ -71,7 +72,7 @@ bool Database::written(bool done) {
     ++rows_;
     const bool large = rows_ >= kBatchRows;
     // The clock is asked seldom: it costs as much as a part of an insert.
-    const bool old = rows_ % 16 == 0 && Clock::now() - *began_ >= kBatchAge;
+    const bool old = rows_ % 16 == 0 && Clock::now() - *began_ >= (isFirst_ ? kFirstAge : kBatchAge);
     return large || old ? commit() : true;
 }
 
@@ -86,6 +87,7 @@ bool Database::commit() {
         rollBack();
     }
     began_.reset();
+    isFirst_ = false;
     return done;
 }
 
