@@ -2,6 +2,7 @@
 #ifndef ORVEL_ORVELCTL_COMMAND_H
 #define ORVEL_ORVELCTL_COMMAND_H
 
+#include <cstdint>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -75,6 +76,8 @@ std::string entryRow(const DIRENTRY_INFO& entry, int additional, bool shares);
 
 // `bytes` for a terminal: readable; what would steer it, or turn the direction of text, as "\xNN" for each byte.
 std::string terminalText(std::string_view bytes);
+// Local time to the minute, or to the second; "?" for what is no time.
+std::string timeText(int64_t seconds, bool exact = false);
 
 }  // namespace orvel::ctl
 

@@ -19,14 +19,6 @@ _tag_dir_entry_type_ typeOf(const std::string& word) {
     throw UsageError("--type takes dir, file or all");
 }
 
-std::string timeText(uint32_t seconds) {
-    const auto time = static_cast<time_t>(seconds);
-    tm parts = {};
-    char text[32];
-    if (localtime_r(&time, &parts) == nullptr || strftime(text, sizeof text, "%Y-%m-%d %H:%M", &parts) == 0) return "?";
-    return text;
-}
-
 std::string nameOrId(const std::string& name, uint32_t id) {
     return name.empty() ? std::to_string(id) : name;
 }

@@ -82,8 +82,11 @@ void print(const cgi::ListRequest& request, const cgi::Listing& listing, bool js
 }
 
 void printWays(const std::string& user, const std::vector<std::string>& folders) {
-    for (const auto& [share, indexed] : cgi::searchedShares(folders)) {
-        fprintf(stderr, "%s: %s\n", terminalText(share).c_str(), indexed ? "found in its index" : "walked");
+    for (const auto& [share, index] : cgi::searchedShares(folders)) {
+        const std::string way = !index        ? "walked"
+                                : index->live ? "found in its index, which is live"
+                                              : "found in its index, last updated " + timeText(index->updated, true);
+        fprintf(stderr, "%s: %s\n", terminalText(share).c_str(), way.c_str());
     }
     for (const std::string& folder : cgi::foldersWithoutMounts(user, folders)) {
         fprintf(stderr, "%s: without what lies on network mounts\n", terminalText(folder).c_str());

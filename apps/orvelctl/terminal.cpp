@@ -2,6 +2,7 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <ctime>
 #include <string_view>
 
 #include "base/hex.h"
@@ -55,6 +56,16 @@ std::string terminalText(std::string_view bytes) {
         }
     }
     return out;
+}
+
+std::string timeText(int64_t seconds, bool exact) {
+    const auto time = static_cast<time_t>(seconds);
+    tm parts = {};
+    char text[32] = "?";
+    if (localtime_r(&time, &parts) == nullptr) return text;
+    const size_t length = exact ? strftime(text, sizeof text, "%Y-%m-%d %H:%M:%S", &parts)
+                                : strftime(text, sizeof text, "%Y-%m-%d %H:%M", &parts);
+    return length == 0 ? "?" : text;
 }
 
 }  // namespace orvel::ctl

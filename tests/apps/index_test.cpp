@@ -3,14 +3,19 @@
 #include <sys/wait.h>
 
 #include <csignal>
+#include <fstream>
 #include <map>
+#include <random>
 
 #include "apps/program.h"
 #include "fault_gate.h"
 #include "index/folder_state.h"
 #include "index/share_files.h"
 #include "support/gate.h"
+#include "support/refuse_calls.h"
 #include "support/testing.h"
+#include "support/wait.h"
+#include "vexo/index.h"
 
 using namespace orvel::ctl;
 
@@ -234,6 +239,170 @@ TEST_F(Index, WorkThatIsBrokenOffLosesNothing) {
     expectTruth("there again");
     EXPECT_EQ(run({"index", "drop", "photo"}).status, 0);
     EXPECT_EQ(run({"index", "status", "photo"}).status, 1);
+}
+
+class WatchedIndex : public Index {
+ protected:
+    ~WatchedIndex() override { end(SIGKILL); }
+    void watch(const std::vector<Refusal>& refusals = {}) {
+        watcher_ = fork();
+        if (watcher_ != 0) return;
+        if (!refusals.empty() && !refuseCalls(refusals)) _exit(3);
+        execl(ORVELCTL, ORVELCTL, "index", "watch", "photo", "--every", "1", nullptr);
+        _exit(127);
+    }
+    void watchUntilLive() {
+        watch();
+        EXPECT_TRUE(waitUntil("a live index", isLive));
+    }
+    int end(int signal) {
+        if (watcher_ <= 0) return 0;
+        kill(watcher_, signal);
+        return waitForEnd(std::exchange(watcher_, 0), "the watcher");
+    }
+    static bool isLive() {
+        int64_t updated = 0;
+        int live = 0;
+        return FILEIDXIndexAsOf("photo", &updated, &live) == 0 && live == 1;
+    }
+    // The index comes to say what a walk says. Walks leave out the index alone, whose search does not say it is live.
+    void expectTruthSoon(const std::string& when) {
+        addShare("photo", "read only = no\n");
+        const std::string walked = search();
+        addShare("photo", "read only = no\nvexo:index = yes\n");
+        std::string indexed;
+        const bool same = waitUntil(when, [&] { return (indexed = search()) == walked; });
+        EXPECT_TRUE(same) << indexed << "\ninstead of\n" << walked;
+    }
+
+ private:
+    pid_t watcher_ = 0;
+};
+
+TEST_F(WatchedIndex, WhateverChangesIsFound) {
+    SKIP_WITHOUT_ROOT();
+    for (const std::string folder : {"/a", "/b", "/in/deep", "/swap1", "/swap2", "/gone"}) {
+        for (const std::string path : {"/sub/f", "/g"}) file(folder + path + folder.substr(1, 1));
+    }
+    const std::string outside = systemRoot() + "/outside";
+    writeFile(outside + "/tree/x/y", "");
+    watchUntilLive();  // builds it as well
+    expectTruthSoon("at its start");
+    EXPECT_EQ(run({"index", "update", "photo"}).status, 1) << "one writer at a time";
+
+    file("/new/tree/of/files");
+    file("/a/sub/new");
+    writeFile(root_ + "/a/ga", "longer than it was");
+    fs::remove_all(root_ + "/gone");
+    move("/b/sub", "/b/renamed");
+    move("/swap1", "/swap");
+    move("/swap2", "/swap1");
+    move("/swap", "/swap2");
+    move("/in/deep", "/a/deep");
+    fs::rename(outside + "/tree", root_ + "/tree");
+    fs::rename(root_ + "/in", outside + "/in");
+    chmod((root_ + "/a/sub").c_str(), 0700);
+    EXPECT_EQ(chown((root_ + "/b/gb").c_str(), kAliceUid, kUsersGid), 0);
+    fs::create_symlink("a", root_ + "/link");
+    file("/@eaDir/hidden/f");
+    for (int i = 0; i < 300; ++i) file("/many/" + std::to_string(i));
+    expectTruthSoon("after changes");
+    EXPECT_TRUE(isLive());
+
+    end(SIGKILL);
+    EXPECT_FALSE(isLive());
+    file("/while/nobody/watched");
+    fs::remove(root_ + "/many/7");
+    watchUntilLive();
+    expectTruthSoon("watched again");
+    fs::rename(root_, root_ + "-away");
+    fs::create_directory(root_);
+    file("/another");
+    EXPECT_TRUE(waitUntil("the watcher's end", [] { return !isLive(); })) << "its folder is another one";
+    EXPECT_NE(end(SIGTERM), 0);
+    fs::remove_all(root_);
+    fs::rename(root_ + "-away", root_);
+    watchUntilLive();
+    expectTruthSoon("there again");
+    EXPECT_EQ(end(SIGTERM), 0);
+    EXPECT_EQ(update(), "compared 1; 0 entries added, 0 changed, 0 removed\n");
+}
+
+// Where the kernel reports nothing.
+TEST_F(WatchedIndex, WithoutEventsItIsUpdatedNowAndThen) {
+    SKIP_WITHOUT_ROOT();
+    file("/f");
+    watch({{SYS_fanotify_init, EPERM}});
+    for (const char* name : {"/g", "/h/i"}) {
+        file(name);
+        expectTruthSoon(name);
+        EXPECT_FALSE(isLive());
+    }
+    EXPECT_EQ(end(SIGTERM), 0);
+}
+
+void changeAtRandom(const std::string& root, unsigned seed, int steps) {
+    std::mt19937 random(seed);
+    const auto path = [&] {
+        std::string made = root;
+        for (unsigned depth = random() % 4;; --depth) {
+            made += "/" + std::string(1, static_cast<char>('a' + random() % 4));
+            if (depth == 0) return made;
+        }
+    };
+    std::error_code ignored;
+    for (int i = 0; i < steps; ++i) {
+        const std::string one = path(), other = path();
+        switch (random() % 8) {
+            case 0:
+            case 1:
+                fs::create_directories(one, ignored);
+                break;
+            case 2:
+            case 3:
+                std::ofstream(one) << std::string(random() % 50, 'x');
+                break;
+            case 4:
+                fs::rename(one, other, ignored);
+                break;
+            case 5:
+                if (random() % 3 == 0) fs::remove_all(one, ignored);
+                break;
+            case 6:
+                fs::remove(one, ignored);
+                break;
+            default:
+                fs::permissions(one, static_cast<fs::perms>(0700 + random() % 0100), ignored);
+        }
+    }
+}
+
+TEST_F(WatchedIndex, ManyAtOnceChangeAtRandom) {
+    SKIP_WITHOUT_ROOT();
+    const bool isLong = getenv("ORVEL_TEST_LONG") != nullptr;
+    for (unsigned seed = 1; seed <= (isLong ? 20 : 2); ++seed) {
+        watchUntilLive();
+        std::vector<pid_t> children;
+        for (unsigned i = 0; i < 8; ++i) {
+            children.push_back(fork());
+            if (children.back() == 0) {
+                changeAtRandom(root_, seed * 100 + i, isLong ? 5000 : 100);
+                _exit(0);
+            }
+        }
+        if (seed % 2 == 0) {
+            end(SIGKILL);
+            watchUntilLive();
+        }
+        for (const pid_t child : children) EXPECT_EQ(waitForEnd(child, "changes at random"), 0);
+        if (seed % 2 == 0) {  // what changed within files meanwhile does not show on their folders
+            end(SIGTERM);
+            update("--full");
+            watchUntilLive();
+        }
+        expectTruthSoon("seed " + std::to_string(seed));
+        EXPECT_EQ(end(SIGTERM), 0);
+    }
 }
 
 }  // namespace

@@ -1,7 +1,5 @@
-#include <sys/stat.h>
 #include <unistd.h>
 
-#include <cerrno>
 #include <csignal>
 #include <cstdio>
 #include <ctime>
@@ -12,52 +10,32 @@
 #include "base/owner.h"
 #include "command.h"
 #include "index/indexer.h"
+#include "index/watch.h"
+#include "index/work.h"
 #include "vexo/error.h"
-#include "vexo/filesystem.h"
 #include "vexo/index.h"
 #include "vexo/share.h"
 
 namespace orvel::ctl {
 namespace {
 
+constexpr unsigned long kUsualPause = 300;
+
 int stopRequested = 0;  // a plain int: the walker reads it as one
+int fullRequested = 0;
+
+void onSignal(int signal, void (*handler)(int)) {
+    struct sigaction action = {};
+    action.sa_handler = handler;
+    sigemptyset(&action.sa_mask);
+    sigaction(signal, &action, nullptr);
+}
 
 void stopOnSignals() {
-    struct sigaction action = {};
-    action.sa_handler = [](int) { stopRequested = 1; };
-    sigemptyset(&action.sa_mask);
-    for (const int signal : {SIGINT, SIGTERM, SIGHUP}) sigaction(signal, &action, nullptr);
+    for (const int signal : {SIGINT, SIGTERM, SIGHUP}) onSignal(signal, [](int) { stopRequested = 1; });
 }
 
 using Share = std::unique_ptr<SDK::Share, Releaser<SDK::Share::Release>>;
-
-[[noreturn]] void refuse(const std::string& share, const std::string& reason) {
-    throw std::runtime_error(terminalText(share) + ": " + reason);
-}
-
-const char* platformReason() {
-    switch (VLIBCErrGet()) {
-        case VEXO_ERR_SHARE_MISSING:
-            return "no such share";
-        case VEXO_ERR_MISSING:
-            return "has no index to update";
-        case VEXO_ERR_EXISTS:
-            return "another process is working on its index";
-        case VEXO_ERR_NO_SPACE:
-            return "no space is left for its index";
-        default:
-            return "its index cannot be used";
-    }
-}
-
-std::string timeText(int64_t seconds) {
-    const auto time = static_cast<time_t>(seconds);
-    tm parts = {};
-    char text[32];
-    if (localtime_r(&time, &parts) == nullptr || strftime(text, sizeof text, "%Y-%m-%d %H:%M:%S", &parts) == 0)
-        return "?";
-    return text;
-}
 
 int printStatus(const SDK::Share& share) {
     FIINDEXSTATUS found = {};
@@ -68,7 +46,8 @@ int printStatus(const SDK::Share& share) {
     }
     printf("%s: %llu entries, %llu of them folders, in %lld KiB; built %s, updated %s\n",
            terminalText(share.GetName()).c_str(), found.records, found.folders,
-           static_cast<long long>(found.bytes / 1024), timeText(found.built).c_str(), timeText(found.updated).c_str());
+           static_cast<long long>(found.bytes / 1024), timeText(found.built, true).c_str(),
+           timeText(found.updated, true).c_str());
     if (FILEIDXIsIndexEnable(share.GetName()) != 1) printf("not used: the share's option vexo:index is off\n");
     return 0;
 }
@@ -79,43 +58,6 @@ int drop(const SDK::Share& share) {
     return 0;
 }
 
-// The platform's work on the index of a share: given up unless it is done. An index that cannot be read is not updated
-// but built anew.
-class Work {
- public:
-    Work(const SDK::Share& share, bool build) : share_(share.GetName()), builds_(build) {
-        if (begin()) return;
-        if (builds_ || VLIBCErrGet() != VEXO_ERR_GENERAL || errno == EBUSY) refuse(share_, platformReason());
-        printf("%s: its index is damaged or of another version, and is built anew\n", terminalText(share_).c_str());
-        builds_ = true;
-        if (!begin()) refuse(share_, platformReason());
-    }
-    ~Work() {
-        if (open_) FILEIDXIndexEnd(share_.c_str(), 0);
-    }
-    Work(const Work&) = delete;
-    Work& operator=(const Work&) = delete;
-
-    [[nodiscard]] const std::string& database() const { return database_; }
-    [[nodiscard]] bool builds() const { return builds_; }
-    void done() {
-        open_ = false;
-        if (FILEIDXIndexEnd(share_.c_str(), 1) < 0) refuse(share_, platformReason());
-    }
-
- private:
-    bool begin() {
-        char path[4096];
-        open_ = FILEIDXIndexBegin(share_.c_str(), builds_ ? FI_INDEX_BUILD : FI_INDEX_UPDATE, path, sizeof path) >= 0;
-        database_ = open_ ? path : "";
-        return open_;
-    }
-
-    std::string share_, database_;
-    bool builds_;
-    bool open_ = false;
-};
-
 void print(const SDK::Share& share, const IndexCounts& counts) {
     printf("%s: looked at %llu folders, compared %llu; %llu entries added, %llu changed, %llu removed\n",
            terminalText(share.GetName()).c_str(), counts.folders, counts.compared, counts.added, counts.changed,
@@ -123,17 +65,10 @@ void print(const SDK::Share& share, const IndexCounts& counts) {
 }
 
 int work(const SDK::Share& share, bool build, bool everything) {
-    const std::string root = share.GetFullPath();
-    if (VEXOFSIsRemoteFS(VEXOGetFSType(root.c_str(), 0)) == 1) refuse(share.GetName(), "lies on a network mount");
-    const ShareFiles files(root, &stopRequested);
-    _tag_VEXOSTAT_ status;
-    // A volume that is not mounted must not empty the index.
-    if (files.status("", status) != Presence::kThere || !S_ISDIR(status.st_mode)) {
-        refuse(share.GetName(), "its folder is not there");
-    }
+    const ShareFiles files = filesOf(share, &stopRequested);
     stopOnSignals();
-    Work work(share, build);
-    IndexRows rows(root, share.GetName(), work.database());
+    IndexWork work(share, build);
+    IndexRows rows(files.root(), share.GetName(), work.database());
     IndexCounts counts;
     std::string unread;
     try {
@@ -180,6 +115,12 @@ int refresh(bool everything) {
         try {
             const Share share(SDK::Share::LoadShare(name.c_str()));
             if (share == nullptr) refuse(name, "no such share");
+            int64_t updated = 0;
+            int live = 0;
+            if (FILEIDXIndexAsOf(name.c_str(), &updated, &live) == 0 && live != 0) {
+                printf("%s: its index is live\n", terminalText(name).c_str());
+                continue;
+            }
             FIINDEXSTATUS found = {};
             const bool missing = FILEIDXIndexStatus(name.c_str(), &found) < 0 && VLIBCErrGet() == VEXO_ERR_MISSING;
             status |= work(*share, missing, everything);
@@ -209,6 +150,11 @@ int index(const std::vector<std::string>& words) {
     if (share == nullptr) refuse(name, "no such share");
     if (action == "status") return printStatus(*share);
     if (action == "drop") return drop(*share);
+    if (action == "watch") {
+        stopOnSignals();
+        onSignal(SIGHUP, [](int) { fullRequested = 1; });
+        return watchIndex(*share, arguments.number("--every", kUsualPause), stopRequested, fullRequested);
+    }
     return work(*share, action == "build", arguments.has("--full"));
 }
 

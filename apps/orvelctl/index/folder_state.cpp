@@ -1,6 +1,7 @@
 #include "index/folder_state.h"
 
 #include <algorithm>
+#include <ctime>
 
 namespace orvel::ctl {
 namespace {
@@ -24,6 +25,12 @@ bool mayChangeUnseen(const FolderTimes& times, int64_t seen) {
     // A time in the far future is not what a change would set.
     const auto isNow = [seen](int64_t time) { return time > seen - kCoarsestTime && time <= seen + kCoarsestTime; };
     return isNow(times.modified) || isNow(times.changed);
+}
+
+int64_t kernelClock() {
+    timespec now = {};
+    clock_gettime(CLOCK_REALTIME_COARSE, &now);
+    return now.tv_sec;
 }
 
 }  // namespace orvel::ctl

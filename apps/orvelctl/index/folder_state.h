@@ -30,6 +30,9 @@ FolderState judgeFolder(const FolderTimes& stored, const FolderTimes& found, boo
 // seconds are all that the index keeps.
 bool mayChangeUnseen(const FolderTimes& times, int64_t seen);
 
+// The clock that times of files are taken from.
+int64_t kernelClock();
+
 }  // namespace orvel::ctl
 
 #endif

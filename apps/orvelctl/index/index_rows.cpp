@@ -82,6 +82,13 @@ std::map<std::string, Row> IndexRows::in(const std::string& folder) {
     return rows;
 }
 
+std::optional<Row> IndexRows::at(const std::string& path) {
+    std::optional<Row> row;
+    select(condition(FI_COL_PATH, FI_OP_EQUAL, path),
+           [&](const __tag_FI_FILE_INFO_DATA& record) { row = rowFrom(record); });
+    return row;
+}
+
 std::map<std::string, Row> IndexRows::folders() {
     std::map<std::string, Row> folders;
     select(condition(FI_COL_IS_DIR, FI_OP_EQUAL, "1"),
@@ -108,6 +115,10 @@ void IndexRows::insert(const Entry& entry) {
 void IndexRows::remove(const std::string& path) {
     const __tag_FI_SQL_COND where = condition(FI_COL_PATH, FI_OP_EQUAL, path);
     require(FILEIDXDBDel(database_.c_str(), &where), "written");
+}
+
+void IndexRows::commit() {
+    require(FILEIDXDBFlush(database_.c_str()), "written");
 }
 
 unsigned long long IndexRows::removeBelow(const std::string& folder) {

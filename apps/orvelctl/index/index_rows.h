@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <functional>
 #include <map>
+#include <optional>
 #include <string>
 
 #include "index/folder_state.h"
@@ -33,6 +34,8 @@ class IndexRows {
 
     // The rows directly in a folder by name; "" is the share's root.
     std::map<std::string, Row> in(const std::string& folder);
+    // The row at a path, if there is one.
+    std::optional<Row> at(const std::string& path);
     // Every folder by its path.
     std::map<std::string, Row> folders();
 
@@ -43,6 +46,8 @@ class IndexRows {
     void remove(const std::string& path);
     // Removes what lies below the folder and reports how much it was.
     unsigned long long removeBelow(const std::string& folder);
+    // What was written so far is there for searches.
+    void commit();
 
  private:
     const __tag_FI_FILE_INFO_DATA& fill(const Entry& entry);

@@ -4,7 +4,6 @@
 
 #include <cerrno>
 #include <cstring>
-#include <ctime>
 #include <utility>
 
 #include "index/folder_state.h"
@@ -14,17 +13,6 @@ namespace {
 
 constexpr int kSettlingRounds = 2;
 constexpr useconds_t kNap = 50000;
-
-// The clock that times of files are taken from.
-int64_t kernelClock() {
-    timespec now = {};
-    clock_gettime(CLOCK_REALTIME_COARSE, &now);
-    return now.tv_sec;
-}
-
-FolderTimes timesOf(const _tag_VEXOSTAT_& status) {
-    return {status.st_modify, status.st_change, status.st_create};
-}
 
 std::string parentOf(const std::string& path) {
     const size_t slash = path.rfind('/');

@@ -8,6 +8,7 @@
 #include <utility>
 #include <vector>
 
+#include "index/file_events.h"
 #include "index/index_rows.h"
 #include "index/progress.h"
 #include "index/share_files.h"
@@ -35,6 +36,11 @@ class Indexer {
     // Looks at every folder of the index and compares those that changed, with `everything` all of them. What cannot be
     // read stays in the index as it is, is counted, and is looked at again by the next update.
     bool update(bool everything);
+    // Compares what was touched, and nothing else: reads first, and writes then, so that the disk is waited for once.
+    void follow(const Touched& touched);
+    // Writes the own rows of folders that have been quiet since they were followed. `asOf`: what changed before that
+    // (kernel's clock) has been followed, or is less than two seconds old.
+    void settleQuiet(int64_t asOf);
     [[nodiscard]] const IndexCounts& counts() const { return counts_; }
     // The first that could not be read, and why; "" for none.
     [[nodiscard]] const std::string& unread() const { return unread_; }
@@ -48,6 +54,22 @@ class Indexer {
         bool whole = true;          // all of it could be read
     };
 
+    // A name as it is, and as the index has it.
+    struct Look {
+        std::string path;
+        std::optional<Entry> now;
+        std::optional<Row> before;
+        bool replaced;
+    };
+
+    [[nodiscard]] bool isLeftOut(const std::string& folder, const std::string& name) const;
+    bool look(const std::string& folder, const std::string& name, bool replaced, std::vector<Look>& looks);
+    bool lookAtAll(const std::string& folder, const std::map<std::string, bool>& names, std::vector<Look>& looks);
+    [[nodiscard]] bool lookAtOwn(const std::string& folder);
+    bool lookInto(const std::string& folder, const std::map<std::string, bool>& names, std::vector<Look>& looks);
+    void forgetOwn(const std::string& folder);
+    void take(Look& look);
+    void postpone();
     [[nodiscard]] bool stopped() const { return *stop_ != 0; }
     bool list(const std::string& folder, std::vector<Entry>& entries);
     void noteUnread(const std::string& what);
@@ -75,6 +97,8 @@ class Indexer {
     std::set<std::string> replaced_;                   // all folders below these are compared
     std::vector<std::pair<Entry, int64_t>> compared_;  // folders whose own rows are to be written, and when seen
     std::set<std::string> unsettled_;                  // folders that may change without showing it
+    std::map<std::string, int64_t> quietFrom_;         // those that were followed, and when they may be quiet
+    std::set<std::string> renewed_;                    // written whole while touched names are followed
 };
 
 }  // namespace orvel::ctl

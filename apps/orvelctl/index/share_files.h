@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/descriptor.h"
+#include "index/folder_state.h"
 #include "vexo/stat.h"
 
 namespace orvel::ctl {
@@ -18,6 +19,10 @@ struct Entry {
 
     [[nodiscard]] bool isFolder() const;
 };
+
+inline FolderTimes timesOf(const _tag_VEXOSTAT_& status) {
+    return {status.st_modify, status.st_change, status.st_create};
+}
 
 // Whether a file or folder is there.
 enum class Presence { kGone, kThere, kUnknown /* an error keeps from telling */ };
@@ -34,6 +39,7 @@ class ShareFiles {
     ShareFiles(std::string root, int* stop);
 
     [[nodiscard]] const std::string& root() const { return root_; }
+    [[nodiscard]] const Descriptor& openedRoot() const { return opened_; }
     [[nodiscard]] std::string realPath(const std::string& path) const {
         return path.empty() ? root_ : root_ + "/" + path;
     }
