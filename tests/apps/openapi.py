@@ -154,6 +154,9 @@ def checkTable():
         named = {follow(s["properties"].get("action", {})).get("const")
                  for method in ("get", "post") for s in requestSchemas(program, method)} - {None, ""}
         expect(actions == named, f"{program}: its actions are {actions}, described are {named}")
+        read = set(re.findall(r'Params?\((?:[\w.]+, )?"(\w+)"', code))
+        taken = {name for schema in (s for m in ("get", "post", "put") for s in requestSchemas(program, m)) for name in schema["properties"]}
+        expect(read <= taken, f"{program}: parameters {read - taken} are not described")
         allowed = send(program, "DELETE", {}, "alice")[1]["Allow"]
         methods = {m.lower() for m in allowed.split(", ")} - {"head"}
         expect(methods == set(described["paths"]["/cgi-bin/" + program]), f"{program}: methods {allowed}")
@@ -168,7 +171,7 @@ def checkRefusals():
         for schema in requestSchemas(program, "post"):
             fields = schema["properties"]
             action = follow(fields.get("action", {})).get("const", "")
-            if not action or program == "share":
+            if program == "share" or (not action and program != "thumbnail"):
                 continue
             usual = {"action": action, "path": "/photo", "target": "/photo/none", "name": "x", "taskid": search, "id": "x"}
             usual = {k: v for k, v in usual.items() if k in fields}
@@ -183,7 +186,7 @@ def checkRefusals():
                     ask(program, "POST", status=400, success=False, whole=False, **{**usual, name: wrong})
                 if "maximum" in field:
                     ask(program, "POST", status=400, success=False, whole=False, **{**usual, name: field["maximum"] + 1})
-            posted = item.get("get") and schema not in list(requestSchemas(program, "get"))
+            posted = action and item.get("get") and schema not in list(requestSchemas(program, "get"))
             if posted:
                 ask(program, "GET", status=400, success=False, whole=False, **usual)
         if program != "share":
@@ -228,7 +231,8 @@ def files():
     ask("upload", "PUT", path="/projects/made/a.txt", body=b"text")
     ask("upload", "PUT", path="/projects/made/a.txt", overwrite="skip", body=b"text")
     ask("upload", "PUT", path="/projects/made/a.txt", body=b"text", success=False)
-    ask("upload", "PUT", path_raw="/projects/made/b%FF.txt", body=b"text")
+    ask("upload", "PUT", path_raw="/projects/made/b%FF.txt", mtime=1000000000, body=b"text")
+    ask("upload", "PUT", path="/projects/x", mtime=4294967296, body=b"text", status=400, success=False, whole=False)
     ask("upload", "PUT", path="/projects/x", overwrite="wrong", body=b"text", status=400, success=False, whole=False)
     form = b'--b\r\nContent-Disposition: form-data; name="file"; filename="c.txt"\r\n\r\ntext\r\n--b--\r\n'
     ask("upload", "POST", path="/projects/made", body=form, headers={"Content-Type": "multipart/form-data; boundary=b"})
@@ -259,6 +263,13 @@ def files():
     ask("download", path="/projects/none", status=404, success=False)
     ask("download", user="bob", path="/projects/made/a.txt", status=403, success=False)
     ask("download", whole=False, status=400, success=False)
+
+    picture = "/photo/Landscapes/Noon.png"
+    ask("thumbnail", path=picture, size=100)
+    ask("thumbnail", path=picture, size=100, status=304, headers={"If-None-Match": "*"})
+    ask("thumbnail", "POST", path="/projects/notes.md", status=415, success=False)
+    ask("thumbnail", path="/projects/none.png", status=404, success=False)
+    ask("thumbnail", user="bob", path="/projects/notes.md", status=403, success=False)
 
     for path in ("/photo", "/home", "/projects/none"):
         ask("why", path=path)
