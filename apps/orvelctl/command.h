@@ -68,6 +68,9 @@ std::string takeForm(std::string_view command, std::vector<std::string>& words);
 // a library code.
 int becomeUser(const std::string& user, bool needsHome);
 
+// What orveld at `socket` says of itself, as JSON. False with `error` when nobody answers, or with a refusal.
+bool askFigures(const std::string& socket, std::string& body, std::string& error);
+
 // Says on standard error why a path was refused. Returns 1.
 int refused(std::string_view path, int code);
 

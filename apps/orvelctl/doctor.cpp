@@ -1,5 +1,6 @@
 #include <json/value.h>
 
+#include <algorithm>
 #include <cstdio>
 
 #include "arguments.h"
@@ -48,16 +49,38 @@ Json::Value jsonOf(const char* check, const Finding& finding) {
     return value;
 }
 
+std::string checkNames() {
+    std::string names;
+    for (const Check& check : kChecks) names += std::string(names.empty() ? "" : ", ") + check.name;
+    return names;
+}
+
+// Those that the command line names, all where it names none.
+std::vector<Check> chosen(const std::vector<std::string>& names) {
+    std::vector<Check> checks;
+    for (const Check& check : kChecks) {
+        if (names.empty() || std::find(names.begin(), names.end(), check.name) != names.end()) checks.push_back(check);
+    }
+    for (const std::string& name : names) {
+        const auto isCalled = [&name](const Check& check) { return check.name == name; };
+        if (std::none_of(checks.begin(), checks.end(), isCalled)) {
+            throw UsageError("there is no check " + name + ", but " + checkNames());
+        }
+    }
+    return checks;
+}
+
 }  // namespace
 
 int doctor(const std::vector<std::string>& words) {
-    const Arguments arguments(words, "doctor", "", 0);
+    const Arguments arguments(words, "doctor", "", 0, true);
     const bool json = arguments.has("--json");
     Json::Value all(Json::arrayValue);
     int problems = 0;
-    for (const Check& check : kChecks) {
+    for (const Check& check : chosen(arguments.positions())) {
         Findings findings;
         check.run(findings);
+        if (findings.empty()) findings.push_back({.severity = Severity::kNote, .text = "nothing to look at"});
         if (!json) printf("%s\n", check.name);
         for (const Finding& finding : findings) {
             if (finding.severity == Severity::kProblem) ++problems;

@@ -21,18 +21,36 @@ struct Finding {
 
 using Findings = std::vector<Finding>;
 
+// A share that is open, as far as its root is one path for everybody.
+struct OpenShare {
+    std::string name;
+    std::string root;
+};
+const std::vector<OpenShare>& openShares();
+// The main file of the share definitions.
+const std::string& definitionsFile();
+
 void checkShares(Findings& findings);
 void checkVolumes(Findings& findings);
+void checkKernel(Findings& findings);
+void checkMounts(Findings& findings);
+void checkFiles(Findings& findings);
+void checkLogIn(Findings& findings);
+void checkCertificate(Findings& findings);
+void checkOrveld(Findings& findings);
+void checkIndexes(Findings& findings);
+void checkSweep(Findings& findings);
 
 struct Check {
     const char* name;
     void (*run)(Findings& findings);
 };
 
-// A further check is a further row.
+// A further check is a further row. The names are also the words of the command line.
 constexpr Check kChecks[] = {
-    {"shares", checkShares},
-    {"temporary folders", checkVolumes},
+    {"kernel", checkKernel},   {"shares", checkShares}, {"mounts", checkMounts}, {"volumes", checkVolumes},
+    {"files", checkFiles},     {"log-in", checkLogIn},  {"orveld", checkOrveld}, {"certificate", checkCertificate},
+    {"indexes", checkIndexes}, {"sweep", checkSweep},
 };
 
 }  // namespace orvel::ctl

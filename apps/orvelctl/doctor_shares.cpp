@@ -20,8 +20,9 @@ struct Report {
     std::string file;  // the main one
     int error = 0;     // errno, 0 when it was read
     Findings findings;
-    std::set<std::string> roots;  // of the shares that are open, variables as they are written
-    std::string closed;           // the closed share at hand, and the options that close it
+    std::set<std::string> roots;    // of the shares that are open, variables as they are written
+    std::vector<OpenShare> shares;  // those without variables
+    std::string closed;             // the closed share at hand, and the options that close it
     std::string closedBy;
 };
 
@@ -61,6 +62,7 @@ void takeShare(const VEXOSHARENOTE& note, Report& report) {
         finding.advice = std::string("make the folder ") + note.path + ", or change the path";
     }
     report.roots.insert(note.path);
+    if (!variable && note.kind == VEXO_NOTE_SHARE) report.shares.push_back({note.share, note.path});
     report.findings.push_back(finding);
     if (note.kind == VEXO_NOTE_SHARE) adviseVeto(note, report.findings);
 }
@@ -133,6 +135,14 @@ Finding unreadable(const Report& report) {
 }
 
 }  // namespace
+
+const std::vector<OpenShare>& openShares() {
+    return shareReport().shares;
+}
+
+const std::string& definitionsFile() {
+    return shareReport().file;
+}
 
 void checkShares(Findings& findings) {
     const Report& report = shareReport();

@@ -17,9 +17,7 @@
 #include "scgi.h"
 
 namespace orvel::ctl {
-namespace {
 
-// False with `error` when nobody answers, or with a refusal.
 bool askFigures(const std::string& socket, std::string& body, std::string& error) {
     const int fd = orveld::connectTo(socket);
     if (fd < 0) {
@@ -41,6 +39,8 @@ bool askFigures(const std::string& socket, std::string& body, std::string& error
     body = reply.substr(end + 4);
     return true;
 }
+
+namespace {
 
 bool parse(const std::string& body, Json::Value& figures) {
     const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());

@@ -126,7 +126,7 @@ TEST_F(RootsCgi, EverythingWorksAtAnyDepth) {
 // What the doctor says of a share, and its exit status. The findings of other shares are left out.
 TEST_F(RootsCgi, TheDoctorNamesTheLine) {
     const auto ask = [](const std::string& share, int status) {
-        const support::Finished finished = support::runProgram({ORVELCTL, "doctor", "--json"});
+        const support::Finished finished = support::runProgram({ORVELCTL, "doctor", "shares", "--json"});
         EXPECT_EQ(finished.status, status) << finished.output;
         Json::Value report;
         EXPECT_TRUE(Json::Reader().parse(finished.output, report)) << finished.output;
@@ -179,9 +179,9 @@ TEST_F(RootsCgi, VolumesHaveTheirTemporaryFolders) {
                        : "none";
         };
         const std::string everybodys = "0 " + std::to_string(01777), search = "/mnt/@tmp/orvel/PXSearch";
-        EXPECT_EQ(run({"doctor"}), 1);
+        EXPECT_EQ(run({"doctor", "shares", "volumes"}), 1);
         EXPECT_EQ(run({"volumes"}), 0);
-        EXPECT_EQ(run({"doctor"}), 0);
+        EXPECT_EQ(run({"doctor", "shares", "volumes"}), 0);
         for (const std::string& path : {std::string("/mnt/@tmp"), std::string("/mnt/@tmp/orvel"), search}) {
             EXPECT_EQ(modeOf(path), everybodys) << path;
         }
