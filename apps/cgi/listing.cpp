@@ -70,8 +70,7 @@ ReturnToFolder::~ReturnToFolder() {
     [[maybe_unused]] const int ignored = start_ ? fchdir(start_.get()) : 0;
 }
 
-int listFolder(const ListRequest& request, Listing& listing) {
-    PathInfo info;
+int openFolderToList(const ListRequest& request, PathInfo& info, Descriptor& folder, std::string& realPath) {
     // The top level is the share listing's; the answer is that of the folder listing, which resolution would pre-empt.
     if (request.path == "/") return ORV_ERR_DENIED;
     OrvLibSetErr(ORV_ERR_NONE);
@@ -80,10 +79,14 @@ int listFolder(const ListRequest& request, Listing& listing) {
     // A refusal sets no code, a look-up that failed does.
     if (!CheckShareListPrivilege(request.user.c_str(), sidOf(request), info.path.c_str()))
         return lastCode(ORV_ERR_DENIED);
+    return confinedFolder(info, linkPolicyOf(info.shareName), folder, realPath);
+}
 
+int listFolder(const ListRequest& request, Listing& listing) {
+    PathInfo info;
     Descriptor folder;
     std::string realPath;
-    const int refusal = confinedFolder(info, linkPolicyOf(info.shareName), folder, realPath);
+    const int refusal = openFolderToList(request, info, folder, realPath);
     return refusal != ORV_ERR_NONE ? refusal : listOpened(request, folder, info.path, realPath, listing);
 }
 

@@ -8,6 +8,7 @@
 
 #include "base/descriptor.h"
 #include "orvel/dir_entry.h"
+#include "orvel/file_info.h"
 #include "output.h"
 
 namespace orvel::cgi {
@@ -52,7 +53,9 @@ class ReturnToFolder {
 // List a folder, or the home folder and the shares of the user. The process has the user's identity. 0 or a library
 // code; what a failure leaves in `listing` is to be thrown away.
 int listFolder(const ListRequest& request, Listing& listing);
-// The first for a folder that is open as a place already: `path` is what it is called, `realPath` where it lies.
+// The two steps of the first. Resolves, asks whether the user may list it, and opens it as a place beneath its share's
+// root; then for a folder that is open so: `path` is what it is called, `realPath` where it lies.
+int openFolderToList(const ListRequest& request, PathInfo& info, Descriptor& folder, std::string& realPath);
 int listOpened(const ListRequest& request, const Descriptor& folder, const std::string& path,
                const std::string& realPath, Listing& listing);
 int listShares(const ListRequest& request, Listing& listing);

@@ -18,6 +18,7 @@
 #include "base/owner.h"
 #include "command.h"
 #include "folder_names.h"
+#include "kept_store.h"
 #include "orvel/login_records.h"
 #include "orvel/task_progress.h"
 #include "search_task.h"
@@ -200,6 +201,14 @@ Part sweepUploads(Sweep& sweep) {
     return part;
 }
 
+Part sweepKept(Sweep& /*sweep*/) {
+    Part part;
+    const cgi::KeptSweep kept = cgi::sweepKeptListings();
+    part.removed = kept.removed;
+    if (kept.error != 0) addError(part, "kept listings", kept.error);
+    return part;
+}
+
 // All that is swept. What grows by itself and is not here: the file of guesses has a fixed size; parts of killed work
 // in users' own folders are hidden and go when the same name is wanted again; logs belong to logrotate.
 constexpr struct {
@@ -215,6 +224,7 @@ constexpr struct {
     {"search results", "without a task", sweepResults},  // behind the tasks
     {"uploads", "left by killed processes", sweepUploads},
     {"indexes", "left by killed builds", sweepIndexes},
+    {"kept listings", "at rest for an hour", sweepKept},
 };
 
 Json::Value jsonOf(const char* name, const Part& part) {

@@ -21,6 +21,7 @@
 #include "descriptors.h"
 #include "listener.h"
 #include "load_limits.h"
+#include "natural_order.h"
 #include "oom.h"
 #include "server.h"
 #include "vexo/process.h"
@@ -67,6 +68,7 @@ int serve(std::string path) {
     prepareChildren();
     tzset();
     VEXOWarm();
+    orvel::cgi::warmNaturalOrder();
     closelog();
     prepareVolumes();
     std::string error;

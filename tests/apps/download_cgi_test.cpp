@@ -208,4 +208,22 @@ TEST_F(DownloadCgi, ManyPathsNeedFewDescriptorsAndEachComesOnce) {
     }
 }
 
+TEST_F(DownloadCgi, RowsOfAKeptListingComeAsTheyWereShown) {
+    const std::string root = shareRoot("photo");
+    for (const char* name : {"/a", "/b", "/c", "/d/e"}) writeFile(root + name, name, 0644);
+    const CgiReply kept = get(PROGRAM_LIST, "alice", "action=folder&keep=1&path=/photo");
+    const std::string rows = "listing=" + kept.json["data"]["listing"].asString() + "&ranges=";
+    fs::remove(root + "/b");
+    writeFile(root + "/came later", "", 0644);
+    const Members members = zip(rows + "0-3");
+    EXPECT_EQ(members, (Members{{"a", "/a"},
+                                {"c", "/c"},
+                                {"d/", ""},
+                                {"d/e", "/d/e"},
+                                {"_not_included.txt", "These could not be included:\nb: missing\n"}}));
+    EXPECT_EQ(RawReply(ask("alice", rows + "1")).body, "/a") << "one file comes as it is";
+    EXPECT_EQ(RawReply(ask("alice", rows + "2")).status, 404);
+    EXPECT_EQ(RawReply(ask("alice", rows + "4")).status, 400);
+}
+
 }  // namespace

@@ -214,6 +214,14 @@ def files():
     ask("list", action="folder", path="/photo", pattern="x" * 491, status=400, success=False)
     ask("list", whole=False, status=400, success=False)
 
+    for path in ("/projects", "/projects/not%FFtext"):
+        kept = ask("list", action="folder", path_raw=path, keep="1", natural="de", folders_first="1", limit=2)["data"]["listing"]
+        ask("list", action="page", listing=kept, offset=0, limit=2, additional="size")
+    ask("list", action="find", listing=kept, prefix="x", **{"from": 1})
+    ask("list", "POST", action="rows", listing=kept, names_raw="a%FF\nb")
+    ask("list", action="renew", listing=kept)
+    ask("list", action="page", listing="none", success=False)
+
     start = ask("search", "POST", action="start", path=["/photo", "/projects"], name="*", type="all", size_greater=1)
     task = start["data"]["taskid"]
     ask("search", action="list", taskid=task, limit=2, additional="size,perm", filter="a", sort_by="ppath")
@@ -249,6 +257,7 @@ def files():
         reply = ask("operation", "POST", action=action, **more)
         done = finished(reply["data"]["taskid"])
         expect(done.get("state") == "done", f"{action}: {done}")
+    rows()
     ask("operation", action="status")
     ask("operation", "POST", action="cancel", taskid=reply["data"]["taskid"])
     ask("operation", "POST", action="clear", taskid=reply["data"]["taskid"])
@@ -275,6 +284,23 @@ def files():
         ask("why", path=path)
     ask("why", "POST", user="bob", path="/projects")
     ask("why", path="/nosuch", success=False)
+
+
+def rows():
+    """What is chosen in a kept listing."""
+    for name in ("one", "two"):
+        ask("upload", "PUT", path=f"/projects/rows/{name}", body=b"text")
+    kept = ask("list", action="folder", path="/projects/rows", keep="1")["data"]["listing"]
+    finished(ask("operation", "POST", action="delete", path="/projects/rows/two", permanent="true")["data"]["taskid"])
+    ask("upload", "PUT", path_raw="/projects/rows/new%FF", body=b"text")
+    other = ask("list", action="folder", path="/projects/rows", keep="1")["data"]["listing"]
+    ask("list", action="page", listing=kept)
+    ask("list", action="carry", listing=kept, ranges="0-1", into=other)
+    ask("operation", "POST", action="present", path="/projects/rows", listing=kept, ranges="0-1")
+    ask("operation", "POST", action="delete", listing=kept, ranges="0-2", status=400, success=False)
+    measured = ask("operation", "POST", action="measure", listing=kept, ranges="0-1", **{"except": "1"})
+    expect(finished(measured["data"]["taskid"]).get("new_count") == 1, "what is new in the folder is not said")
+    ask("download", listing=kept, ranges="0")
 
 
 def links():
@@ -307,7 +333,7 @@ def links():
 
 
 # Of a network mount, an index, or a search that failed: nothing that a demo has.
-UNSEEN = {"mount_type", "failure", "left_out", "share_raw", "current_raw", "code", "key"}
+UNSEEN = {"not_kept", "mount_type", "failure", "left_out", "share_raw", "current_raw", "code", "key"}
 
 
 def checkCoverage():

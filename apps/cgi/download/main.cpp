@@ -2,16 +2,20 @@
 //
 // Parameters, from the query or a form:
 //   paths_raw, path_raw, path   what to fetch (see pathParams): several paths, or a folder, come as a zip
+//   listing, ranges, except     or rows of a kept listing (see chosen_rows.h)
 //   name                        of the zip, without ".zip"; default is that of the only folder, else "download"
 // A file answers HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since. Failures are JSON replies.
+#include <json/value.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <string>
 #include <vector>
 
+#include "chosen_rows.h"
 #include "download/sending.h"
 #include "orvel/error_state.h"
+#include "orvel/privilege.h"
 #include "orvel/share_path.h"
 #include "program/program.h"
 #include "reply.h"
@@ -19,9 +23,43 @@
 #include "vexo/web.h"
 
 namespace orvel::cgi {
+namespace {
+
+std::string lastComponent(const std::string& path) {
+    return path.substr(path.rfind('/') + 1);
+}
+
+void serveRows(const User& user, const VEXO::WebCGI& web, Output& out) {
+    ChosenRows rows;
+    Json::Value data;
+    Source only;
+    int code = actAs(user.sid.c_str(), user.name, false);
+    if (code == ORV_ERR_NONE) code = rows.find(user, web);
+    if (code == ORV_ERR_NONE) code = rows.openFolder(user);
+    std::string culprit = rows.path();
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (code == ORV_ERR_NONE && !CheckShareDownloadPrivilege(user.name.c_str(), user.sid.c_str(), culprit.c_str()))
+        code = lastCode(ORV_ERR_DENIED);
+    KeptRow row;
+    if (code == ORV_ERR_NONE && rows.size() == 1) {
+        code = rows.row(0, row);
+        if (code == ORV_ERR_NONE) code = openRow(rows, row, only);
+        culprit += "/" + row.name;
+    }
+    if (code != ORV_ERR_NONE) {
+        rows.explain(data);
+        return reply(out, httpStatusOf(code), user.cookie, code, culprit, data);
+    }
+    if (rows.size() == 1 && !row.isFolder) return serveFile(out, user, only);
+    serveZip(out, user, rows, web.GetParam("name", rows.size() == 1 ? row.name : lastComponent(culprit)));
+}
+
+}  // namespace
+
 void serveDownloadProgram(Request& request, Output& out) {
     const User& user = request.user;
     const VEXO::WebCGI& web = request.web;
+    if (ChosenRows::isIn(web)) return serveRows(user, web, out);
     const auto paths = pathParams(web);
     if (!paths || paths->empty()) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));

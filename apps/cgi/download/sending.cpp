@@ -76,6 +76,14 @@ std::string nameOf(const PathInfo& info, const Descriptor& found) {
     return name != "." && name != ".." ? name : lastComponent(realPathOf(found));
 }
 
+// False when the head is all that there is to send.
+bool beginZip(Output& out, const User& user, const std::string& name) {
+    putHeader(out, "Status: 200 OK");
+    putCommon(out, user.cookie, name + ".zip", "application/zip");
+    out.text() += "\r\n";
+    return variable("REQUEST_METHOD") != "HEAD" && out.finish();
+}
+
 }  // namespace
 
 int openToSend(const User& user, Source& source) {
@@ -92,6 +100,16 @@ int openToSend(const User& user, Source& source) {
     source.path = info.path;
     source.name = nameOf(info, found);
     return openFound(found, info.realPath, source);
+}
+
+int openRow(const ChosenRows& rows, const KeptRow& row, Source& source) {
+    const OpenedFolder& opened = rows.opened();
+    source.name = row.name;
+    source.path = opened.info.path + "/" + row.name;
+    const int code = rows.look(row, source.status);
+    if (code != ORV_ERR_NONE) return code;
+    const Descriptor found(openat(opened.folder.get(), row.name.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC));
+    return found ? openFound(found, opened.realPath + "/" + row.name, source) : refusalCode(errno, opened.realPath);
 }
 
 int openFound(const Descriptor& found, const std::string& realPath, Source& source) {
@@ -168,10 +186,7 @@ void serveFile(Output& out, const User& user, const Source& source) {
 
 void serveZip(Output& out, const User& user, std::vector<Source>& sources, const std::string& name,
               const OpenSource& open) {
-    putHeader(out, "Status: 200 OK");
-    putCommon(out, user.cookie, name + ".zip", "application/zip");
-    out.text() += "\r\n";
-    if (variable("REQUEST_METHOD") == "HEAD" || !out.finish()) return;
+    if (!beginZip(out, user, name)) return;
     ZipStream zip(STDOUT_FILENO);
     FreeNames names;
     for (Source& source : sources) {
@@ -183,6 +198,27 @@ void serveZip(Output& out, const User& user, std::vector<Source>& sources, const
         source.opened.reset();
         if (!going) return;
         OrvLibDoLog(user.name, source.path, zip.bytes() - before, ORVEL_ACTION_DOWNLOAD, isFolder);
+    }
+    zip.finish();
+}
+
+void serveZip(Output& out, const User& user, ChosenRows& rows, const std::string& name) {
+    if (!beginZip(out, user, name)) return;
+    ZipStream zip(STDOUT_FILENO);
+    FreeNames names;
+    for (size_t i = 0; i < rows.size(); ++i) {
+        KeptRow row;
+        Source source;
+        int code = rows.row(i, row);
+        if (code == ORV_ERR_NONE) code = openRow(rows, row, source);
+        const std::string member = names.take(memberName(row.name), row.isFolder);
+        if (code != ORV_ERR_NONE) {
+            zip.leaveOut(member, reasonOf(code));
+            continue;
+        }
+        const long long before = zip.bytes();
+        if (!zip.add(source.opened, member)) return;
+        OrvLibDoLog(user.name, source.path, zip.bytes() - before, ORVEL_ACTION_DOWNLOAD, row.isFolder);
     }
     zip.finish();
 }

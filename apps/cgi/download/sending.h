@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "base/descriptor.h"
+#include "chosen_rows.h"
 #include "output.h"
 #include "reply.h"
 #include "request.h"
@@ -40,6 +41,9 @@ int openFound(const Descriptor& found, const std::string& realPath, Source& sour
 // has taken on. 0 or a library code.
 int openToSend(const User& user, Source& source);
 
+// Opens a row of a kept listing, whose folder is open. 0 or a library code.
+int openRow(const ChosenRows& rows, const KeptRow& row, Source& source);
+
 // A refusal must not be taken for the file: unlike in other programs it shows in the HTTP status.
 Status httpStatusOf(int code);
 
@@ -49,6 +53,8 @@ Status httpStatusOf(int code);
 void serveFile(Output& out, const User& user, const Source& source);
 void serveZip(Output& out, const User& user, std::vector<Source>& sources, const std::string& name,
               const OpenSource& open);
+// The same of rows whose folder is open: one after the other is opened in it, and has to be what was listed.
+void serveZip(Output& out, const User& user, ChosenRows& rows, const std::string& name);
 
 }  // namespace orvel::cgi
 

@@ -1,7 +1,7 @@
 // CGI program "list": what a folder holds, and which shares there are.
 //
 // Parameters, from the query or a form:
-//   action           "shares" or "folder"
+//   action           "shares", "folder", or one on a kept listing
 //   path, path_raw   the folder (folder only)
 //   sort_by          as for OrvEnum; without it folders come by name, shares with the home folder first
 //   sort_direction   "asc" (default) or "desc"
@@ -9,12 +9,14 @@
 //   additional       words as for additionalBits
 //   pattern          comma-separated name patterns (folder only)
 //   filetype         "dir", "file" or "all" (default; folder only)
+// and those of kept listings: see list/kept.h.
 // "data" of the reply is {"total","offset","items"}; beside that of the shares stands "user", who is logged in.
 #include <json/value.h>
 
 #include <optional>
 #include <string>
 
+#include "list/kept.h"
 #include "listing.h"
 #include "orvel/error_state.h"
 #include "orvel/share_path.h"
@@ -54,9 +56,12 @@ void serveListProgram(Request& request, Output& out) {
     const VEXO::WebCGI& web = request.web;
     const std::string action = web.GetParam("action", "");
     const auto wanted = parse(web, user);
-    if (!wanted || (action != "shares" && action != "folder")) {
+    if (!wanted || (action != "shares" && action != "folder" && !isKeptAction(action))) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
+
+    if (isKeptAction(action)) return serveKept(request, action, *wanted, out);
+    if (action == "folder" && wantsToKeep(web)) return serveKeeping(request, *wanted, out);
 
     const bool shares = action == "shares";
     Listing listing;

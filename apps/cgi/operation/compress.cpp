@@ -17,7 +17,7 @@ namespace orvel::cgi {
 namespace {
 
 struct Job {
-    const Operation& operation;
+    Operation& operation;
     Conflict conflict;
     PathInfo info;  // of the archive
     Target place;
@@ -56,9 +56,10 @@ class Watch : public ZipObserver {
 
 void addAll(const Job& job, ZipStream& zip, Watch& watch, Progress& progress) {
     FreeNames names;
-    for (const std::string& path : job.operation.paths) {
+    Choice& chosen = job.operation.chosen;
+    for (size_t i = 0; i < chosen.size(); ++i) {
         Item item;
-        int code = openItem(job.operation.user, path, {Need::kRead}, item);
+        int code = chosen.open(job.operation.user, i, {Need::kRead}, item);
         if (code == ORV_ERR_NONE && !S_ISREG(item.status.st_mode) && !S_ISDIR(item.status.st_mode)) {
             code = ORV_ERR_DENIED;
         }
@@ -69,8 +70,8 @@ void addAll(const Job& job, ZipStream& zip, Watch& watch, Progress& progress) {
         const bool isFolder = S_ISDIR(item.status.st_mode);
         watch.enter(item.info.path.substr(0, item.info.path.rfind('/')));
         if (code != ORV_ERR_NONE) {
-            progress.failed(path, code);
-            zip.leaveOut(readable(path), reasonOf(code));
+            progress.failed(chosen.path(i), code);
+            zip.leaveOut(readable(chosen.path(i)), reasonOf(code));
         } else if (!zip.add(opened, names.take(memberName(item.place.name), isFolder))) {
             return;
         }
@@ -98,10 +99,11 @@ int codeOf(const ZipStream& zip) {
 }
 
 void run(const Job& job, Progress& progress) {
-    const Operation& operation = job.operation;
-    for (const std::string& path : operation.paths) {
+    Operation& operation = job.operation;
+    operation.chosen.reportNew(operation.user, progress);
+    for (size_t i = 0; i < operation.chosen.size(); ++i) {
         Item item;
-        if (openItem(operation.user, path, {Need::kRead}, item) == ORV_ERR_NONE) {
+        if (operation.chosen.open(operation.user, i, {Need::kRead}, item) == ORV_ERR_NONE) {
             measure(item, progress);
         } else {
             progress.expect(1, 0);

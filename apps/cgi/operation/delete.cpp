@@ -11,9 +11,9 @@ namespace {
 
 // Opens the item and the bin that takes it; none when it is to be removed for good. The bin itself goes only when that
 // is asked for.
-int openItemToDelete(const Operation& operation, const std::string& path, bool permanent, Item& item,
+int openItemToDelete(Operation& operation, size_t position, bool permanent, Item& item,
                      std::optional<RecycleBin>& bin) {
-    int code = openItem(operation.user, path, {Need::kModify}, item);
+    int code = operation.chosen.open(operation.user, position, {Need::kModify}, item);
     if (code != ORV_ERR_NONE || permanent) return code;
     code = RecycleBin::open(item.info, bin);
     if (code != ORV_ERR_NONE || !bin) return code;
@@ -22,11 +22,11 @@ int openItemToDelete(const Operation& operation, const std::string& path, bool p
     return ORV_ERR_NONE;
 }
 
-void expectAll(const Operation& operation, bool permanent, Progress& progress) {
-    for (const std::string& path : operation.paths) {
+void expectAll(Operation& operation, bool permanent, Progress& progress) {
+    for (size_t i = 0; i < operation.chosen.size(); ++i) {
         Item item;
         std::optional<RecycleBin> bin;
-        const bool found = !progress.stopped() && openItemToDelete(operation, path, permanent, item, bin) == 0;
+        const bool found = !progress.stopped() && openItemToDelete(operation, i, permanent, item, bin) == 0;
         if (found && !bin) {
             measure(item, progress);
         } else {
@@ -51,18 +51,19 @@ bool recycle(const RecycleBin& bin, const Item& item, const Owner& owner, Progre
     return gone;
 }
 
-void run(const Operation& operation, bool permanent, Progress& progress) {
+void run(Operation& operation, bool permanent, Progress& progress) {
     const std::string& user = operation.user.name;
     const Owner owner = ownerFor(user);
     ChangeNotices notices(operation);
+    operation.chosen.reportNew(operation.user, progress);
     expectAll(operation, permanent, progress);
-    for (const std::string& path : operation.paths) {
+    for (size_t i = 0; i < operation.chosen.size(); ++i) {
         if (progress.stopped()) return;
         Item item;
         std::optional<RecycleBin> bin;
-        const int code = openItemToDelete(operation, path, permanent, item, bin);
+        const int code = openItemToDelete(operation, i, permanent, item, bin);
         if (code != ORV_ERR_NONE) {
-            progress.failed(path, code);
+            progress.failed(operation.chosen.path(i), code);
             continue;
         }
         const long long before = progress.itemsDone();

@@ -57,7 +57,7 @@ void run(const Operation& operation, const RecycleBin& bin, const PathInfo& info
 int emptyOperation(Operation& operation) {
     PathInfo info;
     OrvLibSetErr(ORV_ERR_NONE);
-    if (!PathInfoFactory::create(operation.user.name.c_str(), operation.paths.front(), info)) return lastCode();
+    if (!PathInfoFactory::create(operation.user.name.c_str(), operation.chosen.path(0), info)) return lastCode();
     int code = judge(operation.user, info.path, Need::kModify);
     std::optional<RecycleBin> bin;
     if (code == ORV_ERR_NONE) code = RecycleBin::open(info, bin);

@@ -15,15 +15,15 @@ namespace {
 constexpr size_t kLongestPassword = 1024;
 
 struct Job {
-    const Operation& operation;
+    Operation& operation;
     Conflict conflict;
     PathInfo info;  // the target folder
     Descriptor folder;
     std::string password;
 };
 
-int openArchive(const Job& job, const std::string& path, Item& item, Descriptor& file) {
-    const int code = openItem(job.operation.user, path, {Need::kRead}, item);
+int openArchive(const Job& job, size_t position, Item& item, Descriptor& file) {
+    const int code = job.operation.chosen.open(job.operation.user, position, {Need::kRead}, item);
     if (code != ORV_ERR_NONE) return code;
     if (!S_ISREG(item.status.st_mode)) return ORV_ERR_ARCHIVE;
     file = Descriptor(
@@ -37,19 +37,19 @@ void failed(const std::string& path, int code, Progress& progress) {
     progress.failed(path, code);
 }
 
-void extractOne(const Job& job, const std::string& path, Progress& progress) {
+void extractOne(const Job& job, size_t position, Progress& progress) {
     const User& user = job.operation.user;
     Item item;
     Descriptor file;
-    int code = openArchive(job, path, item, file);
-    if (code != ORV_ERR_NONE) return failed(path, code, progress);
+    int code = openArchive(job, position, item, file);
+    if (code != ORV_ERR_NONE) return failed(job.operation.chosen.path(position), code, progress);
     Unpacker unpacker(progress, {.folder = job.folder,
                                  .path = job.info.path,
                                  .conflict = job.conflict,
                                  .owner = ownerFor(user.name),
                                  .password = job.password});
     code = unpacker.run(file.get(), UnpackLimits::of(item.status.st_size));
-    if (code != ORV_ERR_NONE) failed(path, code, progress);
+    if (code != ORV_ERR_NONE) failed(item.info.path, code, progress);
     if (unpacker.names().empty()) return;
     // The log knows no kind of its own for it.
     OrvLibDoLog(user.name, item.info.path, unpacker.bytes(), ORVEL_ACTION_COPY, false);
@@ -58,13 +58,13 @@ void extractOne(const Job& job, const std::string& path, Progress& progress) {
 }
 
 void run(const Job& job, Progress& progress) {
-    for (const std::string& path : job.operation.paths) {
+    for (size_t i = 0; i < job.operation.chosen.size(); ++i) {
         Item item;
         Descriptor file;
-        if (openArchive(job, path, item, file) == ORV_ERR_NONE) progress.expect(0, item.status.st_size);
+        if (openArchive(job, i, item, file) == ORV_ERR_NONE) progress.expect(0, item.status.st_size);
     }
-    for (const std::string& path : job.operation.paths) {
-        if (!progress.stopped()) extractOne(job, path, progress);
+    for (size_t i = 0; i < job.operation.chosen.size(); ++i) {
+        if (!progress.stopped()) extractOne(job, i, progress);
     }
 }
 

@@ -40,6 +40,7 @@ constexpr Action kActions[] = {{"mkdir", Takes::kPath, true, Need::kCreate, make
                                {"empty", Takes::kPaths, true, Need::kModify, emptyOperation},
                                {"compress", Takes::kPaths, true, Need::kRead, compressOperation},
                                {"extract", Takes::kPaths, true, Need::kRead, extractOperation},
+                               {"measure", Takes::kPaths, true, Need::kList, measureOperation},
                                {"status", Takes::kTask, false, Need::kList, statusOperation},
                                {"cancel", Takes::kTask, true, Need::kList, cancelOperation},
                                {"clear", Takes::kTask, true, Need::kList, clearOperation}};
@@ -51,6 +52,7 @@ const Action* actionOf(const std::string& name) {
     return nullptr;
 }
 
+// Rows are chosen in place of paths, not beside them.
 bool readPaths(const VEXO::WebCGI& web, Takes takes, std::vector<std::string>& paths) {
     if (takes == Takes::kTask) return true;
     const auto found = takes == Takes::kPaths ? pathParams(web) : std::nullopt;
@@ -58,22 +60,30 @@ bool readPaths(const VEXO::WebCGI& web, Takes takes, std::vector<std::string>& p
     if (found) paths = *found;
     if (one) paths = {*one};
     const std::string search = web.GetParam("taskid", "");
-    return !paths.empty() && (search.empty() || isTaskId(search));
+    const bool rows = takes == Takes::kPaths && ChosenRows::isIn(web);
+    return paths.empty() == rows && (search.empty() || isTaskId(search));
 }
 
-bool isInHome(const Operation& operation) {
+bool isInHome(const VEXO::WebCGI& web, const std::vector<std::string>& paths) {
     const auto isHome = [](const std::string& path) { return IsDirUserHome(path, nullptr); };
-    return std::any_of(operation.paths.begin(), operation.paths.end(), isHome) ||
-           isHome(bytesParam(operation.web, "target").value_or(""));
+    return std::any_of(paths.begin(), paths.end(), isHome) || isHome(bytesParam(web, "target").value_or(""));
 }
 
-int perform(Operation& operation, const Action& action) {
+int performOnMany(Operation& operation, const Action& action) {
+    if (!ChosenRows::isIn(operation.web)) return action.run(operation);
+    const int code = operation.chosen.findRows(operation.user, operation.web, operation.data);
+    operation.culprit = operation.chosen.path(0);
+    return code == ORV_ERR_NONE ? action.run(operation) : code;
+}
+
+int perform(Operation& operation, const Action& action, bool home) {
     const User& user = operation.user;
-    int code = actAs(user.sid.c_str(), user.name, isInHome(operation));
-    if (code != ORV_ERR_NONE || action.takes != Takes::kPath)
-        return code == ORV_ERR_NONE ? action.run(operation) : code;
+    int code = actAs(user.sid.c_str(), user.name, home);
+    if (code != ORV_ERR_NONE) return code;
+    if (action.takes == Takes::kPaths) return performOnMany(operation, action);
+    if (action.takes == Takes::kTask) return action.run(operation);
     OrvLibSetErr(ORV_ERR_NONE);
-    if (!PathInfoFactory::create(user.name.c_str(), operation.paths.front(), operation.info)) return lastCode();
+    if (!PathInfoFactory::create(user.name.c_str(), operation.path, operation.info)) return lastCode();
     code = judge(user, operation.info.path, action.need);
     return code == ORV_ERR_NONE ? action.run(operation) : code;
 }
@@ -84,12 +94,20 @@ void serveOperationProgram(Request& request, Output& out) {
     const User& user = request.user;
     const VEXO::WebCGI& web = request.web;
     const Action* action = actionOf(web.GetParam("action", ""));
-    Operation operation = {.user = user, .web = web, .paths = {}, .info = {}, .culprit = "", .data = {}};
-    if (action == nullptr || (action->changes && !isPosted()) || !readPaths(web, action->takes, operation.paths)) {
+    std::vector<std::string> paths;
+    if (action == nullptr || (action->changes && !isPosted()) || !readPaths(web, action->takes, paths)) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
-    if (!operation.paths.empty()) operation.culprit = operation.paths.front();
-    const int code = perform(operation, *action);
+    const bool home = isInHome(web, paths);
+    const std::string first = paths.empty() ? "" : paths.front();
+    Operation operation = {.user = user,
+                           .web = web,
+                           .path = first,
+                           .info = {},
+                           .chosen = Choice(std::move(paths)),
+                           .culprit = first,
+                           .data = {}};
+    const int code = perform(operation, *action, home);
     reply(out, statusOf(code), user.cookie, code, operation.culprit, operation.data);
 }
 

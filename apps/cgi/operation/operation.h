@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "operation/choice.h"
 #include "orvel/file_info.h"
 #include "request.h"
 #include "vexo/web.h"
@@ -16,9 +17,10 @@ namespace orvel::cgi {
 struct Operation {
     const User& user;
     const VEXO::WebCGI& web;
-    std::vector<std::string> paths;  // share-relative
-    PathInfo info;                   // what the first one resolved to, for an action that takes one
-    std::string culprit;             // path to name when the action is refused
+    std::string path;     // share-relative, for an action that takes one,
+    PathInfo info;        // and what it resolved to
+    Choice chosen;        // for the others
+    std::string culprit;  // path to name when the action is refused
     Json::Value data;
 };
 
@@ -28,12 +30,13 @@ int makeFolderOperation(Operation& operation);
 int renameOperation(Operation& operation);
 // data: {"items":[{"name","path","mtime","mount_type"}]}, the sub-folders by name, "mount_type" only for mount points.
 int subfoldersOperation(Operation& operation);
-// "names_raw": names, percent-encoded, one a line. data: {"items":[{"name","isdir","size","mtime"}]}, those of them
-// that the folder has, each of a link itself.
+// "names_raw": names, percent-encoded, one a line, or rows as below, whose names are meant. data:
+// {"items":[{"name","isdir","size","mtime"}]}, those of them that the folder has, each of a link itself.
 int presentOperation(Operation& operation);
 
-// These go on in the background; data: {"taskid"}. They take several paths, and what goes wrong with one of them shows
-// in the task (see Progress) while the others are worked on.
+// These go on in the background; data: {"taskid"}. They take several paths, or rows of a kept listing ("listing",
+// "ranges", "except"), and what goes wrong with one of them shows in the task (see Progress) while the others are
+// worked on.
 
 // "target" or "target_raw": the folder to copy or move to; "conflict": see conflict.h.
 int copyOperation(Operation& operation);
@@ -48,6 +51,9 @@ int emptyOperation(Operation& operation);
 int compressOperation(Operation& operation);
 // Unpacks the archives at the paths into the folder "target" or "target_raw"; "conflict" as above.
 int extractOperation(Operation& operation);
+
+// Counts what is chosen, with all that lies below it: "items_total" and "bytes_total" of the task that has ended.
+int measureOperation(Operation& operation);
 
 // "taskid" (or without it, all of the user's): data: the task, or {"tasks":[...]}; see taskReply.
 int statusOperation(Operation& operation);

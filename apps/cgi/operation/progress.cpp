@@ -16,6 +16,7 @@ constexpr long long kInterval = 200;  // milliseconds between two writings of th
 // What the paths of the listed errors may come to: written with every byte escaped they still fit into the record.
 constexpr size_t kErrorBytes = size_t{96} * 1024;
 constexpr size_t kErrorOverhead = 64;
+constexpr size_t kMostNew = 10;  // said by name
 
 Progress* atWork = nullptr;
 
@@ -71,6 +72,15 @@ void Progress::failed(const std::string& path, int code) {
     count(itemsFailed_);
 }
 
+void Progress::noteNew(const std::string& path, const std::vector<std::string>& names) {
+    newCount_ = static_cast<Json::Int64>(names.size());
+    for (size_t i = 0; i < std::min(names.size(), kMostNew); ++i) {
+        Json::Value one;
+        putPath(one, "path", path + "/" + names[i]);
+        new_.append(one);
+    }
+}
+
 void Progress::broken(const std::string& path, int code) {
     state_ = "failed";
     failed(path, code);
@@ -118,6 +128,9 @@ Json::Value Progress::data(long long underWay) const {
     putPath(data, "current", current_);
     data["errors"] = errors_;
     data["errors_left_out"] = Json::Int64{errorsLeftOut_};
+    if (newCount_ == 0) return data;
+    data["new"] = new_;
+    data["new_count"] = newCount_;
     return data;
 }
 

@@ -5,6 +5,7 @@
 #include <json/value.h>
 
 #include <string>
+#include <vector>
 
 #include "vexo/task.h"
 
@@ -12,8 +13,8 @@ namespace orvel::cgi {
 
 // The record's "data": {"action", "state": "running", "done", "cancelled" or "failed", "items_done", "items_skipped",
 // "items_failed", "items_total", "bytes_done", "bytes_total", "current", "errors": [{"path","code","key"}],
-// "errors_left_out": how many more there were than the list holds}; paths are share-relative. Totals may grow. At most
-// one of these objects in a process.
+// "errors_left_out": how many more there were than the list holds, "new": [{"path"}] and "new_count": see noteNew};
+// paths are share-relative. Totals may grow. At most one of these objects in a process.
 class Progress {
  public:
     Progress(KTR::Task& task, const std::string& action);
@@ -34,6 +35,8 @@ class Progress {
     void broken(const std::string& path, int code);
     // What the operation was to make lacks something, although it was made.
     void markFailed() { state_ = "failed"; }
+    // These came into the folder at `path` after what was chosen there was listed; the first of them are kept.
+    void noteNew(const std::string& path, const std::vector<std::string>& names);
     // How many items were done so far.
     [[nodiscard]] long long itemsDone() const { return itemsDone_; }
     // Whether the user wants the operation to end. To be asked often.
@@ -60,6 +63,8 @@ class Progress {
     Json::Value errors_{Json::arrayValue};
     size_t errorBytes_ = 0;
     long long errorsLeftOut_ = 0;
+    Json::Value new_{Json::arrayValue};
+    Json::Int64 newCount_ = 0;
     long long publishedAt_ = 0;  // milliseconds
     bool begun_ = false;
 };

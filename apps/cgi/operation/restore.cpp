@@ -23,11 +23,10 @@ int openOrigin(const User& user, const std::string& path, Conflict& conflict, Pa
     return openTarget(info, linkPolicyOf(info.shareName), user.name, Missing::kMake, place);
 }
 
-void restoreOne(const Operation& operation, const std::string& path, Conflict conflict, ChangeNotices& notices,
-                Progress& progress) {
+void restoreOne(Operation& operation, size_t position, Conflict conflict, ChangeNotices& notices, Progress& progress) {
     const User& user = operation.user;
     Item item;
-    int code = openItem(user, path, {Need::kModify}, item);
+    int code = operation.chosen.open(user, position, {Need::kModify}, item);
     std::optional<RecycleBin> bin;
     if (code == ORV_ERR_NONE) code = RecycleBin::open(item.info, bin);
     if (code == ORV_ERR_NONE && (!bin || !bin->holds(item))) code = ORV_ERR_PARAMETER;
@@ -38,7 +37,7 @@ void restoreOne(const Operation& operation, const std::string& path, Conflict co
         removeMadeFolders(place);
         code = ORV_ERR_DENIED;
     }
-    if (code != ORV_ERR_NONE) return progress.failed(path, code);
+    if (code != ORV_ERR_NONE) return progress.failed(operation.chosen.path(position), code);
 
     Transfer transfer(progress, {.conflict = conflict, .move = true, .owner = ownerFor(user.name), .onFat = false});
     Entry to = {place.folder.get(), place.name, info.path};
@@ -56,9 +55,10 @@ int restoreOperation(Operation& operation) {
     if (!conflict) return ORV_ERR_PARAMETER;
     return startTask(operation, "restore", [&](Progress& progress) {
         ChangeNotices notices(operation);
-        progress.expect(static_cast<long long>(operation.paths.size()), 0);
-        for (const std::string& path : operation.paths) {
-            if (!progress.stopped()) restoreOne(operation, path, *conflict, notices, progress);
+        operation.chosen.reportNew(operation.user, progress);
+        progress.expect(static_cast<long long>(operation.chosen.size()), 0);
+        for (size_t i = 0; i < operation.chosen.size(); ++i) {
+            if (!progress.stopped()) restoreOne(operation, i, *conflict, notices, progress);
         }
     });
 }

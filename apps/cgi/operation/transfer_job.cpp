@@ -12,17 +12,18 @@ namespace orvel::cgi {
 namespace {
 
 struct Job {
-    const Operation& operation;
+    Operation& operation;
     bool move;
     Conflict conflict;
     PathInfo info;  // the target folder
     Descriptor folder;
 };
 
-int openSource(const Job& job, const std::string& path, Item& item) {
+int openSource(const Job& job, size_t position, Item& item) {
     const User& user = job.operation.user;
-    return job.move ? openItem(user, path, {Need::kRead, Need::kModify}, item)
-                    : openItem(user, path, {Need::kRead}, item);
+    Choice& chosen = job.operation.chosen;
+    return job.move ? chosen.open(user, position, {Need::kRead, Need::kModify}, item)
+                    : chosen.open(user, position, {Need::kRead}, item);
 }
 
 // Whether the item may get a place in the target folder.
@@ -37,9 +38,9 @@ int checkPlace(const Job& job, const Item& item) {
 }
 
 void expectAll(const Job& job, Progress& progress) {
-    for (const std::string& path : job.operation.paths) {
+    for (size_t i = 0; i < job.operation.chosen.size(); ++i) {
         Item item;
-        if (job.move || progress.stopped() || openSource(job, path, item) != ORV_ERR_NONE) {
+        if (job.move || progress.stopped() || openSource(job, i, item) != ORV_ERR_NONE) {
             progress.expect(1, 0);
         } else {
             measure(item, progress);
@@ -49,18 +50,20 @@ void expectAll(const Job& job, Progress& progress) {
 
 void run(const Job& job, Progress& progress) {
     ChangeNotices notices(job.operation);
+    job.operation.chosen.reportNew(job.operation.user, progress);
     expectAll(job, progress);
     Transfer transfer(progress, {.conflict = job.conflict,
                                  .move = job.move,
                                  .owner = ownerFor(job.operation.user.name),
                                  .onFat = isOnFat(job.folder)});
-    for (const std::string& path : job.operation.paths) {
+    Choice& chosen = job.operation.chosen;
+    for (size_t i = 0; i < chosen.size(); ++i) {
         if (progress.stopped()) return;
         Item item;
-        int code = openSource(job, path, item);
+        int code = openSource(job, i, item);
         if (code == ORV_ERR_NONE) code = checkPlace(job, item);
         if (code != ORV_ERR_NONE) {
-            progress.failed(path, code);
+            progress.failed(chosen.path(i), code);
             continue;
         }
         Entry to = {job.folder.get(), item.place.name, job.info.path + "/" + item.place.name};

@@ -1,0 +1,45 @@
+// Where kept listings lie: a folder of each user's own, /var/lib/vexo/listings/<uid> below the system root.
+//
+// The time of a file is when its listing was last shown. One that was at rest for an hour is gone; a user has at most
+// eight, of 64 MiB together: the one that was at rest longest makes room. Whoever works with one holds it (a shared
+// lock), and it stays as long.
+#ifndef ORVEL_CGI_KEPT_STORE_H
+#define ORVEL_CGI_KEPT_STORE_H
+
+#include <string>
+#include <string_view>
+
+#include "base/descriptor.h"
+
+namespace orvel::cgi {
+
+inline constexpr int kMostKept = 8;
+inline constexpr long long kMostKeptBytes = 64LL * 1024 * 1024;
+inline constexpr long long kKeptSeconds = 3600;
+
+// An id as they are drawn: it can name nothing else in the folder.
+[[nodiscard]] bool isKeptId(std::string_view text);
+
+enum class KeptResult { kDone, kFull, kFailed };
+
+// Keeps the bytes of a listing of `user` under a new `id`. kFull when they are too many, or when what makes no room is
+// held. The process has the user's identity.
+[[nodiscard]] KeptResult keepBytes(const std::string& user, std::string_view bytes, std::string& id);
+
+// Opens and holds one, which is shown now: its hour begins anew. Null with errno when the user has none of that id.
+[[nodiscard]] Descriptor openKept(const std::string& user, const std::string& id);
+
+// Removes one that is of no use; one that is held stays.
+void dropKept(const std::string& user, const std::string& id);
+
+struct KeptSweep {
+    long removed = 0;
+    int error = 0;  // errno of the first failure; the rest was swept all the same
+};
+// Removes what was at rest for an hour, of all users, and is not held; and what a killed process left. As root. Where
+// there is no store there is nothing to do.
+[[nodiscard]] KeptSweep sweepKeptListings();
+
+}  // namespace orvel::cgi
+
+#endif
