@@ -4,13 +4,14 @@ import { readAddress } from "./address.js";
 import { get, MISSING, session } from "./api.js";
 import { chosenColumns, COLUMNS } from "./columns.js";
 import { toast, toastFailure } from "./dialogs.js";
+import { heldItems } from "./clipboard.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { emit } from "./events.js";
-import { isSearch, parentOf, taskOf } from "./path.js";
+import { isSearch, lastOf, parentOf, taskOf } from "./path.js";
 import { pref, setPref } from "./prefs.js";
 import { Selection } from "./selection.js";
-import { entryAt, folderListing, searchResults } from "./sources.js";
+import { entryAt, folderListing, renewKept, rowsOfNames, searchResults } from "./sources.js";
 import { t } from "./strings.js";
 
 const FIRST_LOOK = 60;
@@ -125,7 +126,9 @@ async function openFile(id, mine) {
 // chosen stays chosen.
 async function show(id, mine, wanted, keep = false) {
   const listing = isSearch(id) ? searchResults(taskOf(id), browser, changed) : folderListing(id, browser, changed);
+  listing.onGone = (kept) => browser.selection.lose(kept) && toast({ text: t("chosen.lost"), kind: "failed" });
   const saved = remembered.get(id);
+  renewKept([heldItems()?.choice.rows?.listing]);
   await Promise.race([listing.need(0, FIRST_LOOK), new Promise((resolve) => setTimeout(resolve, PATIENCE))]);
   if (mine !== turn) return listing.cancel();
   browser.listing = listing;
@@ -149,7 +152,11 @@ function restore({ top, cursor }) {
 async function choose(listing, id, far) {
   let index = listing.indexOf(id);
   let entry = listing.item(index);
-  if (index < 0 && far) {
+  if (index < 0 && far && listing.kept) {
+    [index] = await rowsOfNames(listing, [lastOf(id)]).catch(() => [-1]);
+    entry = index < 0 ? undefined : await listing.at(index);
+    if (entry?.id !== id) return;
+  } else if (index < 0 && far) {
     const all = await listing.names(0, Infinity).catch(() => []);
     index = all.findIndex((one) => one.id === id);
     entry = all[index];
@@ -162,16 +169,42 @@ async function choose(listing, id, far) {
 // What is chosen but no longer in the list leaves the choice, and that is said.
 async function checkChosen(listing, words) {
   const { selection } = browser;
-  const chosen = await selection.entries();
+  if (selection.rows) return carryChosen(listing, words);
+  const chosen = (await selection.choice()).entries;
   if (chosen.length === 0) return;
   const idsOf = (entries) => new Set(entries.map((entry) => entry.id));
   let here = idsOf(listing.fresh());
-  if (!chosen.every((entry) => here.has(entry.id))) here = idsOf(await listing.names(0, Infinity).catch(() => chosen));
+  const asked = chosen.filter((entry) => !here.has(entry.id));
+  if (asked.length > 0 && listing.kept) {
+    const rows = await rowsOfNames(listing, asked.map((entry) => lastOf(entry.id))).catch(() => asked);
+    asked.forEach((entry, i) => rows[i] !== -1 && here.add(entry.id));
+  } else if (asked.length > 0) here = idsOf(await listing.names(0, Infinity).catch(() => chosen));
   const left = chosen.filter((entry) => !here.has(entry.id) && selection.chosen.has(entry.id));
   if (left.length === 0 || listing !== browser.listing) return;
   selection.remove(left.map((entry) => entry.id));
   toast({ text: t(words, { count: left.length, name: left[0].name }) });
 }
+
+// The same for rows of a list that the server keeps.
+async function carryChosen(listing, words) {
+  const { selection } = browser;
+  const left = await selection.carry().catch((failure) => {
+    toastFailure(failure, browser.id);
+    return { count: 0 };
+  });
+  if (listing !== browser.listing) return;
+  if (left === null) toast({ text: t("chosen.lost"), kind: "failed" });
+  else if (left.count > 0) toast({ text: t(words, left) });
+}
+
+const RENEW = 10 * 60 * 1000; // a list that the server keeps is gone after an hour at rest
+
+// What is on screen, and what is to be pasted, stays.
+function renew() {
+  renewKept([browser.listing?.kept, heldItems()?.choice.rows?.listing, browser.selection.rows?.kept]);
+}
+
+setInterval(renew, RENEW);
 
 export function setMode(mode) {
   browser.mode = mode;
@@ -214,7 +247,8 @@ export async function refresh(chooseId = null) {
   const { listing, selection, view } = browser;
   if (!listing) return undefined;
   const cursorId = listing.item(selection.cursor)?.id;
-  await listing.refresh(...(view.inSight ?? [0, FIRST_LOOK]));
+  // Only by name an order holds as long as the names do.
+  await listing.refresh(...(view.inSight ?? [0, FIRST_LOOK]), browser.sort.by !== COLUMNS.name.sort);
   if (listing !== browser.listing || listing.error) return undefined;
   if (chooseId) return choose(listing, chooseId, true);
   const cursor = listing.indexOf(cursorId);
@@ -224,8 +258,8 @@ export async function refresh(chooseId = null) {
   return checkChosen(listing, "chosen.gone");
 }
 
-export function selectedEntries() {
-  return browser.selection.entries();
+export function chosenItems() {
+  return browser.selection.choice();
 }
 
 export { columns };

@@ -1,11 +1,13 @@
 // What was copied or cut, until it is pasted.
 
 import { emit } from "./events.js";
+import { holds, parse } from "./ranges.js";
 
-let held = null; // {entries: Map by id, cut}
+let held = null; // {choice, ids, ranges, cut}
 
-export function hold(entries, cut) {
-  held = { entries: new Map(entries.map((entry) => [entry.id, entry])), cut };
+export function hold(choice, cut) {
+  const ids = new Set(choice.entries.map((entry) => entry.id));
+  held = { choice, ids, ranges: choice.rows ? parse(choice.rows.ranges) : [], cut };
   emit("selection");
 }
 
@@ -18,6 +20,8 @@ export function heldItems() {
   return held;
 }
 
-export function isCut(id) {
-  return held !== null && held.cut && held.entries.has(id);
+// A row of a listing.
+export function isCut(id, listing, index) {
+  if (held === null || !held.cut) return false;
+  return held.ids.has(id) || (held.choice.rows?.listing === listing.kept && holds(held.ranges, index));
 }

@@ -1,7 +1,7 @@
 // Everything that can be done, once: for the toolbar, the menus, the keyboard and the list of shortcuts.
 
 import { mayDownload, mayModify, mayWriteIn } from "./access.js";
-import { browser, go, goTo, goUp, refresh, selectedEntries, setMode, shareEntry } from "./browser.js";
+import { browser, chosenItems, go, goTo, goUp, refresh, setMode, shareEntry } from "./browser.js";
 import { isInBin, isReadOnlyShare } from "./entries.js";
 import { download } from "./download.js";
 import { copyPath, newFolder, rename, showProperties } from "./operations.js";
@@ -40,7 +40,7 @@ export function context() {
   const share = shareEntry(browser.id);
   const folder = browser.id !== "/" && Boolean(listing?.ready);
   const search = isSearch(browser.id);
-  const { first } = selection;
+  const first = selection.first ?? (selection.rows && listing.item(selection.cursor));
   const onRow = listing?.item(selection.cursor);
   const home = search && first ? shareEntry(first.id) : share;
   const lies = search && first ? first.id : browser.id;
@@ -108,7 +108,7 @@ addCommand({
   keys: ["Mod+s"],
   group: "open",
   when: ({ canDownload }) => canDownload,
-  run: async () => download(await selectedEntries()),
+  run: async () => download(await chosenItems()),
 });
 addCommand({
   id: "rename",

@@ -5,24 +5,34 @@ import { dialog } from "./dialogs.js";
 import { h, icon, nameNode } from "./dom.js";
 import { formatSize, formatTime } from "./format.js";
 import { kindOfName } from "./icons.js";
-import { childOf, decode, encodeName, inForms } from "./path.js";
+import { childOf, decode, encodeName, inForms, lastOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";
 import { thumbnailOf, thumbnailOfFile } from "./thumbnails.js";
 
 // Which of the names (encoded) the folder has already: name -> {isFolder, size, mtime}.
-export async function takenNames(folder, names) {
-  const taken = new Map();
-  for (const lines of inForms(names)) {
-    const asked = { action: "present", path_raw: folder, names_raw: lines.join("\n") };
+export function takenNames(folder, names) {
+  return taken(folder, inForms(names).map((lines) => ({ names_raw: lines.join("\n") })));
+}
+
+// The same for the names of what is chosen.
+export function takenOf(folder, choice) {
+  if (choice.rows) return taken(folder, [choice.portions()[0].params]);
+  return takenNames(folder, choice.entries.map(({ id }) => lastOf(id)));
+}
+
+async function taken(folder, questions) {
+  const found = new Map();
+  for (const question of questions) {
+    const asked = { action: "present", path_raw: folder, ...question };
     const { items } = await post("operation", asked).catch((failure) => {
-      if (failure.code === MISSING) return { items: [] }; // is yet to be made
+      if (failure.code === MISSING && !failure.data?.listing) return { items: [] }; // is yet to be made
       throw failure;
     });
     for (const { name, name_raw, isdir, size, mtime } of items)
-      taken.set(name_raw ?? encodeName(name), { isFolder: isdir, size, mtime });
+      found.set(name_raw ?? encodeName(name), { isFolder: isdir, size, mtime });
   }
-  return taken;
+  return found;
 }
 
 // Pairs of what comes and what is there, of which one is a folder and the other is not: nothing can replace those.

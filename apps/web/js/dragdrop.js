@@ -6,7 +6,7 @@ import { toast, toastFailure } from "./dialogs.js";
 import { $, h, icon, plainName } from "./dom.js";
 import { isInBin, isReadOnlyShare } from "./entries.js";
 import { iconOf } from "./icons.js";
-import { decode, parentOf } from "./path.js";
+import { decode } from "./path.js";
 import { crumbId, labelOf } from "./pathbar.js";
 import { transfer } from "./transfer.js";
 import { treeId } from "./tree.js";
@@ -19,7 +19,7 @@ const MOST_AS_TEXT = 1000; // paths for other programs
 let veil = null;
 let marked = null;
 let depth = 0;
-let dragged = null; // entries
+let dragged = null; // a choice
 
 // What is chosen goes along when a chosen row is dragged.
 function begin(event) {
@@ -27,20 +27,21 @@ function begin(event) {
   if (index < 0) return;
   const { selection, view } = browser;
   if (!selection.has(index)) selection.pick(index);
-  if (selection.pending) {
+  const choice = selection.now;
+  if (!choice) {
     toast({ text: t("chosen.wait"), kind: "failed" });
     return event.preventDefault();
   }
-  const entries = [...selection.chosen.values()];
-  dragged = entries;
+  dragged = choice;
+  const { entries } = choice;
   const paths = entries.slice(0, MOST_AS_TEXT).map((entry) => decode(entry.id));
   event.dataTransfer.setData("text/plain", paths.join("\n"));
   event.dataTransfer.effectAllowed = "copyMove";
   const ghost = h(
     "div.ghost",
     {},
-    icon(iconOf(entries[0]), "file-icon"),
-    entries.length === 1 ? plainName(entries[0].name) : t("select.count", { count: entries.length }),
+    icon(iconOf(entries[0] ?? view.listing.item(index)), "file-icon"),
+    choice.single ? plainName(choice.single.name) : t("select.count", { count: choice.count }),
   );
   document.body.append(ghost);
   event.dataTransfer.setDragImage(ghost, -8, -8);
@@ -54,12 +55,18 @@ function overWithin(event) {
   const fits =
     target &&
     target.node &&
-    !dragged.some(({ id }) => id === target.id) &&
-    (copies(event) || dragged.some(({ id }) => parentOf(id) !== target.id));
+    !isDragged(target) &&
+    (copies(event) || dragged.folders.some((folder) => folder !== target.id));
   mark(fits ? target.node : null);
   if (!fits) return;
   event.preventDefault();
   event.dataTransfer.dropEffect = copies(event) ? "copy" : "move";
+}
+
+// A row that is chosen moves itself.
+function isDragged({ id, node }) {
+  if (dragged.rows) return browser.selection.has(node.index ?? -1);
+  return dragged.entries.some((entry) => entry.id === id);
 }
 
 // Nothing can be taken away from where one may only read.

@@ -13,6 +13,7 @@ export function entryOf(item) {
     encodedName: item.name_raw ?? encodeName(item.name),
     parent: parentOf(id),
     isFolder: item.isdir,
+    gone: item.gone === true, // since it was listed
     kind: kindOf(item, id, more.mount_point_type ?? ""),
     size: item.isdir ? null : (more.size ?? null),
     mtime: more.time?.mtime ?? 0,

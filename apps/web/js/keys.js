@@ -3,6 +3,7 @@
 import { browser } from "./browser.js";
 import { allCommands, context, keysOf, runCommand } from "./commands.js";
 import { $ } from "./dom.js";
+import { rowBeginning } from "./sources.js";
 import { t } from "./strings.js";
 
 const TYPING_PAUSE = 900; // after which a letter begins a new word
@@ -110,9 +111,26 @@ function showTyped(text, words = "jump.to") {
 
 let jumps = 0;
 
+// The list that the server keeps is asked: no browser compares names as the server does.
+async function jumpInKept(text, start, mine) {
+  const { listing, selection, view } = browser;
+  await new Promise((resolve) => setTimeout(resolve, TYPING_GAP / 2));
+  if (mine !== jumps) return;
+  showTyped(text, "jump.looking");
+  clearTimeout(shownTimer);
+  const row = await rowBeginning(listing, text, start % Math.max(1, listing.total)).catch(() => -1);
+  const entry = row < 0 ? undefined : await listing.at(row);
+  if (mine !== jumps || listing !== browser.listing) return;
+  showTyped(text, entry ? "jump.to" : "jump.none");
+  if (!entry) return;
+  selection.only(entry, row);
+  view.reveal(row, "center");
+}
+
 async function jump(text, start) {
   const mine = ++jumps;
   const { listing, selection, view } = browser;
+  if (listing.kept) return jumpInKept(text, start, mine);
   const wanted = text.toLowerCase();
   const begins = (entry) => entry.name.toLowerCase().startsWith(wanted);
   let index = listing.find(begins, start % Math.max(1, listing.total));

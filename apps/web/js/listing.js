@@ -18,6 +18,14 @@ export class Listing {
     this.error = null;
     this.extra = null;
     this.all = null;
+    this.kept = null; // the id of the list that the server keeps
+    this.onGone = () => {};
+  }
+
+  // Whether a row shows as it is in this list, and not as it was before the last refresh.
+  isFresh(index) {
+    const place = this.place(index);
+    return place !== null && place.one.pages.has(Math.floor(place.offset / PAGE));
   }
 
   get ready() {
@@ -63,6 +71,7 @@ export class Listing {
 
   // The rows first..last are in sight. Fetches what is missing around them, cancels what has been passed by.
   need(first, last) {
+    this.seen = [first, last];
     const wanted = new Set();
     // How many there are is known from the first page.
     for (const one of this.parts) {
@@ -115,6 +124,7 @@ export class Listing {
       if (!signal.aborted) this.take(one, page, reply);
     } catch (failure) {
       if (isAbort(failure) || signal.aborted) return;
+      if (failure.data?.listing && this.kept !== null) return this.beginAgain(true);
       this.error = failure;
       this.onChange(this);
     }
@@ -124,6 +134,7 @@ export class Listing {
     this.error = null;
     this.count(one, reply.total);
     one.pages.set(page, reply.items);
+    one.stale?.delete(page);
     this.extra = reply;
     this.onChange(this);
   }
@@ -138,8 +149,36 @@ export class Listing {
     one.total = total;
   }
 
-  // Fetches again what is in sight; until it comes, what is there stays.
-  refresh(first, last) {
+  // Another list takes the place of the one that the server kept; until it comes, what is there stays.
+  async beginAgain(gone = false) {
+    const { kept } = this;
+    this.kept = null;
+    if (gone) this.onGone(kept);
+    await this.fetchAgain(...this.seen);
+  }
+
+  // Fetches again what is in sight; until it comes, what is there stays. `anew`: in the order that it has by now, even
+  // when no name has changed.
+  async refresh(first, last, anew = false) {
+    if (this.kept !== null && (anew || (await this.hasChanged()))) {
+      this.kept = null;
+      first = Math.min(first, Math.max(0, this.total - 1));
+    }
+    return this.fetchAgain(first, last);
+  }
+
+  // Whether the folder has other names by now than when it was listed.
+  async hasChanged() {
+    try {
+      return (await this.fetchPart(this.parts[0].part, { offset: 0, limit: 1, brief: true })).changed;
+    } catch (failure) {
+      if (!failure.data?.listing) return false; // what is fetched next says it
+      this.onGone(this.kept);
+      return true;
+    }
+  }
+
+  fetchAgain(first, last) {
     this.cancel();
     this.all = null;
     for (const one of this.parts) {
@@ -147,6 +186,15 @@ export class Listing {
       one.pages = new Map();
     }
     return this.need(first, last);
+  }
+
+  // What cannot be kept is asked for as it is at each moment.
+  become(parts, fetchPart) {
+    this.cancel();
+    this.parts = parts.map((part) => ({ part, total: null, pages: new Map(), stale: null }));
+    this.fetchPart = fetchPart;
+    this.kept = null;
+    return this.need(...this.seen);
   }
 
   cancel() {

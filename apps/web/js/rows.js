@@ -53,6 +53,7 @@ export function fillRow(row, index, entry, mode, columns) {
   row.entry = entry;
   row.filled = true;
   row.classList.toggle("waiting", !entry);
+  row.classList.toggle("gone", entry?.gone === true);
   row.classList.toggle("locked", Boolean(entry && isLocked(entry)));
   row.draggable = Boolean(entry);
   if (!entry) {

@@ -1,10 +1,11 @@
 // Where the rows of a list come from: a folder, or a search.
 
-import { ApiError, get, MISSING } from "./api.js";
+import { ApiError, get, MISSING, post } from "./api.js";
 import { breathe } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { Listing, PAGE } from "./listing.js";
-import { inBothForms, lastOf, parentOf, patternOf } from "./path.js";
+import { encodeName, inBothForms, inForms, lastOf, parentOf, patternOf } from "./path.js";
+import { language } from "./strings.js";
 
 const ADDITIONAL = "size,time,owner,perm,mount_point_type,icon";
 const BRIEF = { additional: undefined };
@@ -33,7 +34,64 @@ export function folderListing(id, { sort, filter }, onChange) {
     const reply = await get("list", { ...asked, filetype, offset, limit, ...(brief && BRIEF) }, signal);
     return { total: reply.total, items: await entriesOf(reply.items) };
   };
-  return new Listing(parts, fetchPart, onChange);
+  const listing = new Listing(["all"], null, onChange);
+  listing.fetchPart = keptPages(listing, asked, () => listing.become(parts, fetchPart));
+  listing.folder = id;
+  return listing;
+}
+
+// Pages of a list that the server keeps from the first one on. `unkept`: it cannot.
+function keptPages(listing, asked, unkept) {
+  let keeping = null;
+  const keep = async (page, signal) => {
+    const order = { keep: 1, natural: language, folders_first: 1 };
+    const reply = await get("list", { ...asked, ...order, ...page }, signal);
+    if (!reply.listing) {
+      await unkept();
+      return listing.fetchPart(listing.parts[0].part, page);
+    }
+    listing.kept = reply.listing;
+    return { ...reply, items: await entriesOf(reply.items) };
+  };
+  return async (_part, { offset, limit, brief, signal }) => {
+    while (listing.kept === null) {
+      if (keeping !== null) {
+        await keeping.catch(() => {});
+        continue;
+      }
+      keeping = keep({ offset, limit, ...(brief && BRIEF) }, signal);
+      try {
+        return await keeping;
+      } finally {
+        keeping = null;
+      }
+    }
+    const page = { action: "page", listing: listing.kept, offset, limit, additional: brief ? undefined : ADDITIONAL };
+    const reply = await get("list", page, signal);
+    return { ...reply, items: await entriesOf(reply.items) };
+  };
+}
+
+// The row of a name (encoded) in a list that is kept; -1 when it has none.
+export async function rowsOfNames(listing, names) {
+  const rows = [];
+  for (const lines of inForms(names)) {
+    const asked = { action: "rows", listing: listing.kept, names_raw: lines.join("\n") };
+    rows.push(...(await post("list", asked)).rows);
+  }
+  return rows;
+}
+
+// The first row from `from` on, and round, whose name begins so; -1.
+export async function rowBeginning(listing, text, from) {
+  const asked = { action: "find", listing: listing.kept, prefix_raw: encodeName(text), from };
+  return (await get("list", asked)).row;
+}
+
+// What somebody may come back to is not let go.
+export async function renewKept(known) {
+  const ids = [...new Set(known.filter(Boolean))];
+  if (ids.length > 0) await get("list", { action: "renew", listing: ids.join(",") }).catch(() => {});
 }
 
 // The page that a search's list asks for first, before anything is filtered.

@@ -4,12 +4,13 @@
 import { get, post } from "./api.js";
 import { Card } from "./activity.js";
 import { browser, go, refresh } from "./browser.js";
-import { askText, toastFailure } from "./dialogs.js";
+import { Choice } from "./choice.js";
+import { askText, toast, toastFailure } from "./dialogs.js";
 import { plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { emit } from "./events.js";
 import { formatSize } from "./format.js";
-import { childOf, idIn, isWithin, lastOf, nameOf, parentOf, pathLists } from "./path.js";
+import { childOf, idIn, isWithin, lastOf, nameOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { searchTask } from "./operations.js";
 import { forget, note, noteOf } from "./task_notes.js";
@@ -42,29 +43,29 @@ export async function setupTasks() {
   }
 }
 
-// Starts `action` on the paths (ids). `params` go with it. `affected`: folders whose content it changes; `target`: where
+// Starts `action` on entries or a choice. `params` go with it. `affected`: folders whose content it changes; `target`: where
 // what comes of it can be seen. Whether it began.
-export async function startTask(action, ids, { params = {}, affected = [], target = null, bin = false } = {}) {
-  const folders = [...new Set([...affected, ...ids.map(parentOf)])];
-  let rest = ids;
-  for (const lines of pathLists(ids)) {
-    const some = rest.slice(0, lines.length);
-    rest = rest.slice(lines.length);
+export async function startTask(action, what, { params = {}, affected = [], target = null, bin = false } = {}) {
+  const choice = Choice.of(what);
+  const folders = [...new Set([...affected, ...choice.folders])];
+  for (const { params: chosen, count, entries } of choice.portions()) {
+    const some = choice.rows ? choice : new Choice(entries);
     try {
-      const asked = { action, paths_raw: lines.join("\n"), ...params, taskid: searchTask() };
+      const asked = { action, ...chosen, ...params, taskid: searchTask() };
       const { taskid } = await post("operation", asked);
-      note(taskid, { count: some.length, name: some.length === 1 ? nameOf(some[0]) : undefined, target, bin });
-      show({ taskid, action, state: "running", items_done: 0, progress: 0 }, { ids: some, params, folders, target });
+      note(taskid, { count, name: some.single && nameOf(some.single.id), target, bin });
+      show({ taskid, action, state: "running", items_done: 0, progress: 0 }, { choice: some, params, folders, target });
       tabs.postMessage(taskid);
     } catch (failure) {
-      toastFailure(failure, some[0]);
+      if (failure.data?.listing) toast({ text: t("chosen.lost"), kind: "failed" });
+      else toastFailure(failure, some.single?.id ?? choice.folders[0]);
       return false;
     }
   }
   return true;
 }
 
-// order: {ids, params, folders, target} of what this page started.
+// order: {choice, params, folders, target} of what this page started.
 function show(task, order = { folders: [] }) {
   const { taskid } = task;
   const card = new Card({
@@ -148,6 +149,7 @@ function finish(task, card, order) {
     task.items_skipped > 0 && t("upload.skipped", { count: task.items_skipped }),
     task.items_failed > 0 && t("upload.failed", { count: task.items_failed }),
     bin && task.items_done > 0 && t("task.binned"),
+    task.new_count > 0 && t("task.new", { count: task.new_count, name: nameOf(idIn(task.new[0])) }),
   ];
   const kind = task.state === "cancelled" ? "stopped" : isGood(task) ? "good" : "failed";
   const again = retryOf(task, order);
@@ -158,16 +160,16 @@ function finish(task, card, order) {
       label: t("activity.undo"),
       run: () => {
         card.remove();
-        startTask("move", back.ids, back);
+        startTask("move", back.choice, back);
       },
     },
     again && {
       label: t(isLocked(task) ? "extract.password.ask" : "state.retry"),
       run: async () => {
-        const password = isLocked(task) ? await askPassword(again.ids[0]) : undefined;
+        const password = isLocked(task) ? await askPassword(again.choice.samples[0]) : undefined;
         if (password === null) return;
         card.remove();
-        startTask(task.action, again.ids, { ...again, params: { ...again.params, password }, target, bin });
+        startTask(task.action, again.choice, { ...again, params: { ...again.params, password }, target, bin });
       },
     },
   ];
@@ -178,13 +180,13 @@ function finish(task, card, order) {
 }
 
 // The way back of what was moved from one folder, under the names that it had. Where a name could have been another's it
-// has no way back.
-function undoOf(task, { ids = [], params = {}, target }) {
+// has no way back, nor have rows of a list, whose names the page does not know.
+function undoOf(task, { choice, params = {}, target }) {
   if (task.action !== "move" || !isGood(task) || task.items_skipped > 0 || params.conflict !== "error") return null;
-  const [from] = new Set(ids.map(parentOf));
-  if (!ids.every((id) => parentOf(id) === from)) return null;
-  const moved = ids.map((id) => childOf(target, lastOf(id)));
-  return { ids: moved, params: { target_raw: from, conflict: "error" }, affected: [from], target: from };
+  if (!choice || choice.rows || choice.folders.length > 1) return null;
+  const [from] = choice.folders;
+  const moved = new Choice(choice.entries.map(({ id }) => ({ id: childOf(target, lastOf(id)) })));
+  return { choice: moved, params: { target_raw: from, conflict: "error" }, affected: [from], target: from };
 }
 
 // Whether what failed is an archive whose password is not known.
@@ -201,16 +203,25 @@ function askPassword(id) {
   });
 }
 
+// Of rows, of which the names are known only here: the ones that lie in their folder.
+function failedOf(choice, failed, isOne) {
+  if (!choice.rows) return choice.only(({ id }) => isOne(id));
+  const depth = choice.samples[0].split("/").length;
+  const ids = failed.filter((id) => isWithin(id, choice.rows.folder)).map((id) => id.split("/").slice(0, depth).join("/"));
+  return new Choice([...new Set(ids)].map((id) => ({ id })));
+}
+
 // What of a task that did not end well can be tried again, and how: nothing that is done already is done twice. Folders
 // that were copied beside others would come a second time, so only what failed as a whole is tried then.
-function retryOf(task, { ids = [], params, folders }) {
-  if (isGood(task) || ids.length === 0) return null;
+function retryOf(task, { choice, params, folders }) {
+  if (isGood(task) || !choice) return null;
   const failed = (task.errors ?? []).map((one) => idIn(one));
   const beside = params.conflict === "keep_both" && task.action !== "restore";
   const all = !beside && (task.state === "cancelled" || task.errors_left_out > 0);
-  const some = all ? ids : ids.filter((id) => failed.some((one) => (beside ? one === id : isWithin(one, id))));
-  if (some.length === 0 || task.action === "compress") return null;
+  const isOne = (id) => failed.some((one) => (beside ? one === id : isWithin(one, id)));
+  const some = all ? choice : failedOf(choice, failed, isOne);
+  if (some.count === 0 || task.action === "compress") return null;
   const goesOn = { error: "skip", keep_both: beside ? "keep_both" : "skip" };
   const conflict = params.conflict && (goesOn[params.conflict] ?? params.conflict);
-  return { ids: some, params: { ...params, conflict }, affected: folders };
+  return { choice: some, params: { ...params, conflict }, affected: folders };
 }

@@ -224,7 +224,7 @@ function filterChip() {
 
 function sizeOfChosen() {
   const { selection } = browser;
-  if (selection.pending) return "";
+  if (selection.pending || selection.rows) return "";
   let sum = 0;
   for (const { size } of selection.chosen.values()) {
     if (size === null) return "";

@@ -1,9 +1,10 @@
 // Copying, moving, deleting, packing: what the user says, as tasks.
 
-import { browser, selectedEntries } from "./browser.js";
+import { browser, chosenItems } from "./browser.js";
+import { Choice } from "./choice.js";
 import { heldItems, hold, letGo } from "./clipboard.js";
 import { addCommand } from "./commands.js";
-import { askConflict, takenNames } from "./conflicts.js";
+import { askConflict, takenOf } from "./conflicts.js";
 import { askText, confirm, dismissToasts, toast, toastFailure } from "./dialogs.js";
 import { isInBin, isRecycleBin } from "./entries.js";
 import { checkName } from "./operations.js";
@@ -17,25 +18,27 @@ const ARCHIVE = /\.(zip|tar|tar\.gz|tgz|tar\.bz2|tbz2?|tar\.xz|txz)$/i;
 const EXISTS = { skip: "skip", overwrite: "overwrite", both: "keep_both" };
 
 // Copies or moves entries into a folder; what stands in the way is asked about before anything happens. Whether it began.
-export async function transfer(action, entries, target) {
-  const into = entries.find(({ id }) => isWithin(target, id));
+export async function transfer(action, choice, target) {
+  const into = choice.entries.find(({ id }) => isWithin(target, id));
   if (into) {
     toastFailure({ code: 1005, key: "error:error_select_conflict", path: `/${nameOf(into.id)}` });
     return false;
   }
-  const moving = action === "move" ? entries.filter(({ id }) => parentOf(id) !== target) : entries;
-  if (moving.length === 0) return false;
+  const isThere = choice.samples.every((id) => parentOf(id) === target);
+  if (choice.count === 0 || (action === "move" && isThere)) return false;
+  const moving = action === "move" ? choice.only(({ id }) => parentOf(id) !== target) : choice;
   try {
-    const beside = action === "copy" && moving.every(({ id }) => parentOf(id) === target);
+    const beside = action === "copy" && isThere;
     const conflict = beside ? "keep_both" : await conflictFor(target, moving);
     if (!conflict) return false;
-    const ids = moving.map(({ id }) => id);
-    const begun = await startTask(action, ids, {
+    const begun = await startTask(action, moving, {
       params: { target_raw: target, conflict },
       affected: [target],
       target,
     });
-    if (begun && action === "move") browser.selection.remove(ids); // they leave, and are known to
+    // They leave, and are known to.
+    if (begun && action === "move" && moving.rows) browser.selection.lose(moving.rows.listing);
+    else if (begun && action === "move") browser.selection.remove(moving.entries.map(({ id }) => id));
     return begun;
   } catch (failure) {
     toastFailure(failure, target);
@@ -43,44 +46,40 @@ export async function transfer(action, entries, target) {
   }
 }
 
-// entries: {id, isFolder, size, mtime}
-async function conflictFor(target, entries) {
-  const byName = new Map(entries.map((entry) => [lastOf(entry.id), entry]));
-  const taken = await takenNames(target, [...byName.keys()]);
+async function conflictFor(target, choice) {
+  const byName = new Map(choice.entries.map((entry) => [lastOf(entry.id), entry]));
+  const taken = await takenOf(target, choice);
   if (taken.size === 0) return "error";
-  const pairs = [...taken].map(([name, there]) => ({ name, there, comes: byName.get(name) }));
+  // Of rows nothing is known but their names: whether a folder meets a file shows when they are worked on.
+  const comesAs = (name, { isFolder }) => byName.get(name) ?? { isFolder, size: null };
+  const pairs = [...taken].map(([name, there]) => ({ name, there, comes: comesAs(name, there) }));
   const said = await askConflict({ folder: target, pairs });
   return said ? EXISTS[said.answer] : null;
 }
 
 async function to(action) {
-  const entries = await selectedEntries();
-  if (entries.length === 0) return;
+  const choice = await chosenItems();
+  if (choice.count === 0) return;
   const target = await pickFolder({
-    title: t(`${action}.title`, { count: entries.length }),
+    title: t(`${action}.title`, { count: choice.count }),
     action: t(`${action}.action`),
-    start: parentOf(entries[0].id),
+    start: choice.folders[0],
   });
-  if (target) transfer(action, entries, target);
+  if (target) transfer(action, choice, target);
 }
 
 async function take(cut) {
-  const entries = await selectedEntries();
-  if (entries.length === 0) return;
-  hold(entries, cut);
-  toast({ text: t(cut ? "held.cut" : "held.copy", { count: entries.length }) });
+  const choice = await chosenItems();
+  if (choice.count === 0) return;
+  hold(choice, cut);
+  toast({ text: t(cut ? "held.cut" : "held.copy", { count: choice.count }) });
 }
 
 async function paste() {
-  const { entries, cut } = heldItems();
+  const { choice, cut } = heldItems();
   dismissToasts();
-  const begun = await transfer(cut ? "move" : "copy", [...entries.values()], browser.id);
+  const begun = await transfer(cut ? "move" : "copy", choice, browser.id);
   if (begun && cut) letGo();
-}
-
-// Nothing when the names of what was chosen could not be had: that has been said.
-async function chosenIds() {
-  return (await selectedEntries()).map((entry) => entry.id);
 }
 
 const bins = new Map(); // share -> whether it has a recycle bin
@@ -99,12 +98,13 @@ async function hasBin(share) {
 }
 
 async function remove(forGood) {
-  const entries = await selectedEntries();
-  const ids = entries.map((entry) => entry.id);
-  if (ids.length === 0) return;
-  const inBin = ids.every(isInBin);
-  const kept = !forGood && !inBin && (await Promise.all([...new Set(ids.map(shareOf))].map(hasBin))).every(Boolean);
-  const what = { count: ids.length, name: entries.length === 1 ? entries[0].name : "" };
+  const choice = await chosenItems();
+  const { samples, count } = choice;
+  if (count === 0) return;
+  const shares = [...new Set(samples.map(shareOf))];
+  const inBin = samples.every(isInBin);
+  const kept = !forGood && !inBin && (await Promise.all(shares.map(hasBin))).every(Boolean);
+  const what = { count, name: choice.single?.name ?? "" };
   if (
     !kept &&
     !(await confirm({
@@ -116,8 +116,8 @@ async function remove(forGood) {
   )
     return;
   browser.selection.clear();
-  const binsOf = [...new Set(ids.map((id) => `${shareOf(id)}/%23recycle`))];
-  await startTask("delete", ids, {
+  const binsOf = shares.map((share) => `${share}/%23recycle`);
+  await startTask("delete", choice, {
     params: { permanent: kept ? undefined : "true" },
     affected: kept ? binsOf : [],
     target: kept ? binsOf[0] : null,
@@ -126,29 +126,30 @@ async function remove(forGood) {
 }
 
 async function restore() {
-  const ids = await chosenIds();
-  if (ids.length === 0) return;
+  const choice = await chosenItems();
+  if (choice.count === 0) return;
+  const share = shareOf(choice.samples[0]);
   browser.selection.clear();
-  await startTask("restore", ids, {
+  await startTask("restore", choice, {
     params: { conflict: "keep_both" },
-    affected: [shareOf(ids[0])],
-    target: ids.length === 1 ? parentOf(ids[0]).replace("/%23recycle", "") : shareOf(ids[0]),
+    affected: [share],
+    target: choice.single ? parentOf(choice.single.id).replace("/%23recycle", "") : share,
   });
 }
 
 async function emptyBin() {
   if (await confirm({ title: t("bin.title"), text: t("bin.text"), action: t("command.emptyBin"), kind: "danger" })) {
-    await startTask("empty", [`${shareOf(browser.id)}/%23recycle`], { affected: [browser.id] });
+    await startTask("empty", [{ id: `${shareOf(browser.id)}/%23recycle` }], { affected: [browser.id] });
   }
 }
 
 async function compress() {
-  const ids = await chosenIds();
-  if (ids.length === 0) return;
-  const folder = parentOf(ids[0]);
-  const stem = ids.length === 1 ? splitExtension(nameOf(ids[0]))[0] : nameOf(folder);
+  const choice = await chosenItems();
+  if (choice.count === 0) return;
+  const [folder] = choice.folders;
+  const stem = choice.single ? splitExtension(nameOf(choice.single.id))[0] : nameOf(folder);
   const name = await askText({
-    title: t("compress.title", { count: ids.length }),
+    title: t("compress.title", { count: choice.count }),
     label: t("name.label"),
     value: `${stem}.zip`,
     selectTo: stem.length,
@@ -158,15 +159,15 @@ async function compress() {
   });
   if (!name) return;
   const target = childOf(folder, encodeName(name));
-  const conflict = await conflictFor(folder, [{ id: target, isFolder: false }]);
-  if (conflict) await startTask("compress", ids, { params: { target_raw: target, conflict }, affected: [folder] });
+  const conflict = await conflictFor(folder, new Choice([{ id: target, isFolder: false }]));
+  if (conflict) await startTask("compress", choice, { params: { target_raw: target, conflict }, affected: [folder] });
 }
 
 async function extract({ single }) {
   const target = await pickFolder({ title: t("extract.title"), action: t("extract.action"), start: single.parent });
   if (!target) return;
   const params = { target_raw: target, conflict: "keep_both" };
-  await startTask("extract", [single.id], { params, affected: [target], target });
+  await startTask("extract", [single], { params, affected: [target], target });
 }
 
 const chosen = ({ count }) => count > 0;

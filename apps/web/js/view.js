@@ -145,7 +145,7 @@ export class View {
         row.setAttribute("aria-selected", String(chosen));
       }
       row.classList.toggle("cursor", cursor);
-      row.classList.toggle("cut", row.entry !== undefined && isCut(row.entry.id));
+      row.classList.toggle("cut", row.entry !== undefined && isCut(row.entry.id, this.listing, index));
       row.classList.toggle("above-selected", chosen && this.selection.has(index + 1));
       row.classList.toggle("below-selected", chosen && this.selection.has(index - 1));
     }
