@@ -50,7 +50,7 @@ struct Feature {
 constexpr Feature kFeatures[] = {
     {"openat2", openBeneathFolder, true, "paths are confined to their share by it: nothing can be opened without"},
     {"pidfd_open", openOwnProcess, true, "searches are ended through it: they could not be stopped without"},
-    {"fanotify", openFanotify, false, "nothing here needs it: indexes are kept by comparing folders"},
+    {"fanotify", openFanotify, false, "\"orvelctl index watch\" cannot work"},
 };
 
 void judge(const Feature& feature, Findings& findings) {

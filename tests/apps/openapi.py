@@ -176,7 +176,7 @@ def checkRefusals():
             usual = {"action": action, "path": "/photo", "target": "/photo/none", "name": "x", "taskid": search, "id": "x"}
             usual = {k: v for k, v in usual.items() if k in fields}
             if schema is schemas["SearchStart"]:
-                usual["name"] = "*"
+                usual |= {"name": "*", "limit": 1}  # the parameters of a page count where one is asked for
             if program == "operation" and fields.get("taskid") != {"$ref": "#/components/schemas/OperationId"}:
                 usual.pop("taskid")
             for name, field in fields.items():
