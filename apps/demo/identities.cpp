@@ -54,7 +54,7 @@ std::string groupText(const Identities& ids, const std::vector<Person>& people) 
 
 std::string shadowText(const std::vector<Person>& people) {
     std::string text;
-    for (const Person& person : people) text += person.name + ":*:19000:0:99999:7:::\n";
+    for (const Person& person : people) text += person.name + ":" + hashed(person.password) + ":19000:0:99999:7:::\n";
     return text;
 }
 

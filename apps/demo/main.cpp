@@ -40,7 +40,9 @@ void writeSystem(const std::string& folder, const std::string& tag, const Record
     writeNew(folder + "/etc/vexo/users.htpasswd", loginText(record.people), 0600);
     writeNew(folder + "/etc/vexo/shares.conf", sharesText(tag), 0644);
     writeNew(folder + "/etc/vexoinfo.conf",
-             "userhome_enable=\"yes\"\nadmin_group=\"administrators\"\nsession_timeout=\"60\"\n", 0644);
+             "userhome_enable=\"yes\"\nadmin_group=\"administrators\"\nsession_timeout=\"60\"\n"
+             "trusted_log_in=\"yes\"\n",
+             0644);
     writeNew(folder + "/etc.defaults/vexoinfo.conf", "support_s2s=\"yes\"\n", 0644);
     for (const char* made : {"/run", "/tmp", "/var/lib/vexo", "/usr/vexo/etc/pexlander", "/usr/vexo/vexoman/webman"}) {
         fs::create_directories(folder + made);

@@ -44,7 +44,7 @@ cp -r "$source/apps/web" "$work/web"
 cp "$demo/etc/vexo/users.htpasswd" "$work/logins"
 chmod -R a+rX "$work/web" "$work/logins"
 socket=$work/orveld.socket
-VEXO_ROOT=$demo "$build/bin/orveld-keeper" "$socket" "$build/bin/orveld" 2>"$work/orveld.log" &
+VEXO_ROOT=$demo VEXO_LOGIN_PROGRAM=$build/bin/vexo-login "$build/bin/orveld-keeper" "$socket" "$build/bin/orveld" 2>"$work/orveld.log" &
 pids+=($!)
 status() { "$build/apps/orvelctl/orvelctl" --root "$demo" status --socket "$socket" --json; }
 server=orveld

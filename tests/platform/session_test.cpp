@@ -7,24 +7,35 @@
 
 namespace {
 
+vexo::SessionRecord recordOf(const std::string& user) {
+    return {user, "", 1, false, 0, "", ""};
+}
+
 TEST(SessionFormat, WhatIsWrittenIsReadAndNothingElse) {
     for (const std::string user : {"alice", "DOM\\al \"quoted\" ice", "a=b", "\xC3\xA9@ldap"}) {
-        const auto record =
-            vexo::parseSessionRecord(vexo::buildSessionRecord({user, "192.0.2.7", 1700000000}).value_or(""));
+        const auto record = vexo::parseSessionRecord(
+            vexo::buildSessionRecord({user, "192.0.2.7", 1700000000, true, 20001, "n", "B\n\"1\""}).value_or(""));
         ASSERT_TRUE(record) << user;
         EXPECT_EQ(record->user + record->address + std::to_string(record->time), user + "192.0.2.71700000000");
+        EXPECT_TRUE(record->loggedIn && record->uid == 20001);
+        EXPECT_EQ(record->name + record->browser, "nB \"1\"");
     }
-    for (const char* user : {"", "a\nuser=\"root\"", "a\x7F"}) EXPECT_FALSE(vexo::buildSessionRecord({user, "", 1}));
-    EXPECT_FALSE(vexo::buildSessionRecord({"a", "1\n2", 1}));
-    for (const char* text : {"", "time=\"1\"\n", "user=\"\"\ntime=\"1\"\n", "user=\"a\"\n", "user=\"a\"\ntime=\"1x\"\n",
-                             "user=\"a\"\ntime=\"99999999999999999999\"\n"}) {
-        EXPECT_FALSE(vexo::parseSessionRecord(text)) << text;
+    for (const char* user : {"", "a\nuser=\"root\"", "a\x7F"}) EXPECT_FALSE(vexo::buildSessionRecord(recordOf(user)));
+    EXPECT_FALSE(vexo::buildSessionRecord({"a", "1\n2", 1, false, 0, "", ""}));
+    EXPECT_TRUE(vexo::parseSessionRecord("version=\"2\"\nuser=\"a\"\ntime=\"1\"\n"));
+    for (const char* text :
+         {"", "time=\"1\"\n", "user=\"\"\ntime=\"1\"\n", "user=\"a\"\n", "user=\"a\"\ntime=\"1x\"\n",
+          "user=\"a\"\ntime=\"99999999999999999999\"\n", "user=\"a\"\ntime=\"1\"\nby=\"log-in\"\nuid=\"\"\n"}) {
+        EXPECT_FALSE(vexo::parseSessionRecord(std::string("version=\"2\"\n") + text)) << text;
     }
+    EXPECT_FALSE(vexo::parseSessionRecord("user=\"a\"\ntime=\"1\"\n")) << "of a former version";
     const std::string good = "0123456789abcdef0123456789abcdef";
     EXPECT_TRUE(vexo::isSessionId(good));
     for (const char* bad : {"", "A", "g", "aa", "/"}) EXPECT_FALSE(vexo::isSessionId(bad + good.substr(1))) << bad;
-    EXPECT_TRUE(vexo::isSessionAlive(1000, 1000 + 900 + 60, 900));
-    EXPECT_FALSE(vexo::isSessionAlive(1000, 1000 + 900 + 61, 900));
+    EXPECT_TRUE(vexo::isSessionAlive(1000, 1000, 1000 + 900 + 60, {900, 2000}));
+    EXPECT_FALSE(vexo::isSessionAlive(1000, 1000, 1000 + 900 + 61, {900, 2000}));
+    EXPECT_TRUE(vexo::isSessionAlive(3000, 1000, 3000, {900, 2000}));
+    EXPECT_FALSE(vexo::isSessionAlive(3001, 1000, 3001, {900, 2000}));
 }
 
 class Session : public ApplianceTest {
@@ -135,9 +146,36 @@ TEST_F(Session, WhatOthersCouldHaveMadeIsNoSession) {
     EXPECT_FALSE(request("alice", good).authorized);
 }
 
+TEST_F(Session, AWebServersWordCountsWhereTheSettingSaysSo) {
+    const std::string sid = request("alice").sid;
+    setSetting("trusted_log_in", "no");
+    EXPECT_FALSE(request("alice").authorized);
+    EXPECT_FALSE(request("alice", sid).authorized) << "nor does a session that such a word made";
+    EXPECT_TRUE(fs::exists(fileOf(sid)));
+    vexo::SessionRecord record = recordOf("alice");
+    record.loggedIn = true;
+    record.uid = kAliceUid;
+    const std::string own = vexo::createSession(record);
+    EXPECT_EQ(request("", own).user, "alice");
+    EXPECT_EQ(request("bob", own).user, "alice");
+    // A user has 32 at most.
+    setLastUse(own, 100);
+    for (int i = 0; i < 31; ++i) vexo::createSession(record);
+    EXPECT_TRUE(fs::exists(fileOf(own)));
+    vexo::createSession(record);
+    EXPECT_FALSE(fs::exists(fileOf(own)));
+    EXPECT_EQ(vexo::sessionsOf("alice").size(), 32U);
+    setSetting("session_lifetime", "1");
+    writeFile(fileOf(own),
+              "version=\"2\"\nuser=\"alice\"\ntime=\"" + std::to_string(time(nullptr) - 61) +
+                  "\"\nby=\"log-in\"\nuid=\"20001\"\n",
+              0600);
+    EXPECT_FALSE(request("", own).authorized) << "its time is over";
+}
+
 TEST_F(Session, IdsAreGivenForTheSessionsOwnUser) {
     const std::string sid = request("alice").sid;
-    const std::string ghosts = vexo::createSession("ghost", "");
+    const std::string ghosts = vexo::createSession(recordOf("ghost"));
     const std::string unknown(32, '0');
     constexpr uid_t kNoId = 0xFFFFFFFF;
     for (const auto& [id, user, uid, code] :
@@ -161,7 +199,7 @@ TEST_F(Session, TheStoreIsReachedAfterTheSwitchAndOnlyWithTheSavedIdentity) {
     actingForAlice([&] {
         EXPECT_EQ(VexoCgiUIDGet(sid.c_str(), "alice"), uid_t{kAliceUid});
         EXPECT_EQ(VexoCgiUIDGet(std::string(32, '0').c_str(), "alice"), 0xFFFFFFFF);
-        EXPECT_EQ(vexo::createSession("alice", "").size(), 32U);
+        EXPECT_EQ(vexo::createSession(recordOf("alice")).size(), 32U);
     });
     for (const auto& entry : fs::directory_iterator(store())) {
         EXPECT_EQ(statusOf(entry.path()).st_uid + statusOf(entry.path()).st_gid, 0U);

@@ -159,7 +159,7 @@ std::string ApplianceTest::shareRoot(const std::string& name) {
 void ApplianceTest::SetUp() {
     passwd_ = "root:x:0:0::/root:/bin/sh\n";
     group_ = "root:x:0:\n";
-    settings_ = "userhome_enable=\"yes\"\n";
+    settings_ = "userhome_enable=\"yes\"\ntrusted_log_in=\"yes\"\n";
     defaults_.clear();
     mounts_ = "/dev/root / ext4 rw 0 0\n";
     shares_.clear();

@@ -15,6 +15,8 @@
 VEXO_BEGIN_C
 // 1 when the address is denied, 0 when not (always while the service is off), -1 on failure.
 VEXO_API int VexoCgiIsDeniedIP(const char* address);
+// For how many seconds more the address is denied: 0 not at all, a day where it is for good; -1 on failure.
+VEXO_API int VEXOAutoBlockWait(const char* address);
 // Forgets the address: its failures and its denial. 0, or -1.
 VEXO_API int VEXOAutoBlockResetByIP(const char* address);
 // Counts one failed log-in at the service `tag` (1 to 64 bytes, no control bytes). As many of one address and tag as

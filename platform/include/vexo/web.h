@@ -30,7 +30,7 @@ class VEXO_API WebCGI {
     std::vector<std::string> GetParams(const std::string& name) const;
     bool HasParam(const std::string& name) const;
     bool BodyRefused() const;
-    // The value of the first cookie of that name, `def` when absent.
+    // The value of the first cookie of that name, `def` when absent ("id" answers for "__Host-id" by HTTPS).
     std::string GetCookie(const std::string& name, const std::string& def) const;
     // Keeps a Set-Cookie header for WriteHeader ("name=value; Path=...; HttpOnly; SameSite=Lax", and "; Secure" in a
     // request by HTTPS). False, and nothing kept, for a name that is no cookie token or a value

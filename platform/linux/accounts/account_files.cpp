@@ -108,23 +108,25 @@ const std::vector<gid_t>& AccountFiles::listing(const std::string& user) const {
     return found == listing_.end() ? none : found->second;
 }
 
-std::optional<long> AccountFiles::expiry(const std::string& shadow, const std::string& user) {
+std::optional<Validity> AccountFiles::validity(const std::string& shadow, const std::string& user) {
     const int before = errno;
-    if (!shadowVersion_.isCurrentAt(shadow) && !readExpiries(shadow)) return std::nullopt;
+    if (!shadowVersion_.isCurrentAt(shadow) && !readValidities(shadow)) return std::nullopt;
     errno = before;
-    const auto found = expiries_.find(user);
-    return found == expiries_.end() ? -1 : found->second;
+    const auto found = validities_.find(user);
+    return found == validities_.end() ? Validity() : found->second;
 }
 
 // No file, and one that is closed to this process, count as one without an end of anybody.
-bool AccountFiles::readExpiries(const std::string& path) {
-    expiries_.clear();
+bool AccountFiles::readValidities(const std::string& path) {
+    validities_.clear();
     shadowVersion_ = {};
     FileVersion version;
     const orvel::RaisedIdentity raised;
     const File file = openRecords(path, version);
     if (file == nullptr) return errno == ENOENT || errno == ENOTDIR || errno == EACCES;
-    while (const spwd* record = fgetspent(file.get())) expiries_.emplace(record->sp_namp, record->sp_expire);
+    while (const spwd* record = fgetspent(file.get())) {
+        validities_.emplace(record->sp_namp, Validity{record->sp_expire, isLockedPassword(record->sp_pwdp)});
+    }
     if (ferror(file.get()) != 0) return false;
     shadowVersion_ = version;
     return true;

@@ -31,12 +31,12 @@ class AccountFiles {
 
     // The day on which the account ends; -1 never, or not for this process to know. The file is root's alone, so it is
     // read as root. Nothing, with errno, when it cannot be read.
-    [[nodiscard]] std::optional<long> expiry(const std::string& shadow, const std::string& user);
+    [[nodiscard]] std::optional<Validity> validity(const std::string& shadow, const std::string& user);
 
  private:
     [[nodiscard]] bool readUsers(const std::string& path);
     [[nodiscard]] bool readGroups(const std::string& path);
-    [[nodiscard]] bool readExpiries(const std::string& path);
+    [[nodiscard]] bool readValidities(const std::string& path);
 
     FileVersion passwdVersion_;
     FileVersion groupVersion_;
@@ -51,7 +51,7 @@ class AccountFiles {
     std::unordered_map<std::string, size_t> groupByName_;
     std::unordered_map<gid_t, size_t> groupByGid_;
     std::unordered_map<std::string, std::vector<gid_t>> listing_;
-    std::unordered_map<std::string, long> expiries_;
+    std::unordered_map<std::string, Validity> validities_;
 };
 
 }  // namespace vexo

@@ -98,7 +98,7 @@ std::vector<gid_t> groupsOf(const std::string& user, gid_t primary) {
     return gids;
 }
 
-std::optional<long> expiry(const std::string& user) {
+std::optional<Validity> validity(const std::string& user) {
     const int before = errno;
     const orvel::RaisedIdentity raised;
     spwd record{};
@@ -108,7 +108,7 @@ std::optional<long> expiry(const std::string& user) {
     });
     if (answer == Lookup::failed && errno != EACCES) return std::nullopt;
     errno = before;
-    return answer == Lookup::found ? record.sp_expire : -1;
+    return answer == Lookup::found ? Validity{record.sp_expire, isLockedPassword(record.sp_pwdp)} : Validity();
 }
 
 bool users(std::vector<Account>& out) {

@@ -17,7 +17,7 @@ namespace vexo::nss {
 [[nodiscard]] Lookup group(gid_t gid, Group& out);
 [[nodiscard]] std::vector<gid_t> groupsOf(const std::string& user, gid_t primary);
 // As AccountSource answers.
-[[nodiscard]] std::optional<long> expiry(const std::string& user);
+[[nodiscard]] std::optional<Validity> validity(const std::string& user);
 [[nodiscard]] bool users(std::vector<Account>& out);
 [[nodiscard]] bool groups(std::vector<Group>& out);
 

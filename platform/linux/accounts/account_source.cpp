@@ -106,14 +106,14 @@ bool AccountSource::groupsOf(const std::string& user, gid_t primary, std::vector
     return true;
 }
 
-std::optional<long> AccountSource::expiry(const std::string& user) {
+std::optional<Validity> AccountSource::validity(const std::string& user) {
     const Origin origin = refresh();
-    if (origin == Origin::files) return files_.expiry(VEXO::SystemPath("/etc/shadow"), user);
+    if (origin == Origin::files) return files_.validity(VEXO::SystemPath("/etc/shadow"), user);
     if (origin == Origin::unreadable) return std::nullopt;
-    if (const auto known = expiryOfUser_.find(user); known != expiryOfUser_.end()) return known->second;
-    const std::optional<long> day = nss::expiry(user);
-    if (day) expiryOfUser_.emplace(user, *day);
-    return day;
+    if (const auto known = validityOfUser_.find(user); known != validityOfUser_.end()) return known->second;
+    const std::optional<Validity> found = nss::validity(user);
+    if (found) validityOfUser_.emplace(user, *found);
+    return found;
 }
 
 bool AccountSource::users(std::vector<Account>& out) {

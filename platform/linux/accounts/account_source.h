@@ -35,7 +35,7 @@ class AccountSource {
     [[nodiscard]] bool groupsOf(const std::string& user, gid_t primary, std::vector<gid_t>& out);
     // The day on which the account ends; -1 never, or not for this process to know (only root may ask). Nothing, with
     // errno, when it could not be determined.
-    [[nodiscard]] std::optional<long> expiry(const std::string& user);
+    [[nodiscard]] std::optional<Validity> validity(const std::string& user);
 
     // All of them in the order of the source; false with errno.
     [[nodiscard]] bool users(std::vector<Account>& out);
@@ -65,7 +65,7 @@ class AccountSource {
     Memory<std::string, Group> groupByName_;
     Memory<gid_t, Group> groupByGid_;
     std::unordered_map<std::string, std::vector<gid_t>> groupsOfUser_;
-    std::unordered_map<std::string, long> expiryOfUser_;
+    std::unordered_map<std::string, Validity> validityOfUser_;
 };
 
 }  // namespace vexo

@@ -31,7 +31,7 @@ bool fillRecord(const vexo::Account& account, VEXOUSER& user) {
     user.authType = vexo::splitAccountName(account.name).type;
     if (!vexo::fillField(user.szName, account.name) || !vexo::fillField(user.szHome, vexo::homeOf(account.name)))
         return false;
-    user.expiry = vexo::AccountSource::instance().expiry(account.name).value_or(-1);
+    user.expiry = vexo::AccountSource::instance().validity(account.name).value_or(vexo::Validity()).expiry;
     return true;
 }
 
@@ -46,7 +46,7 @@ vexo::Lookup findUser(const std::string& name, vexo::Account& account) {
 // The same for a record that is asked when the account ends: one that has ended must not pass for one that has not.
 vexo::Lookup findWithExpiry(const std::string& name, vexo::Account& account) {
     const vexo::Lookup answer = findUser(name, account);
-    if (answer != vexo::Lookup::found || vexo::AccountSource::instance().expiry(name)) return answer;
+    if (answer != vexo::Lookup::found || vexo::AccountSource::instance().validity(name)) return answer;
     return vexo::Lookup::failed;
 }
 

@@ -26,6 +26,8 @@ constexpr const char* kStore = "/var/lib/vexo/autoblock.db";
 constexpr int kPatience = 8000;  // milliseconds for the locks of others
 constexpr size_t kMaxTag = 64;
 constexpr int kMaxRows = 10000;
+constexpr long long kForGood =
+    24LL * 60 * 60;  // seconds after which asking again is worth it, for who is denied for good
 
 // `since` is the first failure of the window, `denied` the time of the denial or 0.
 constexpr const char* kSchema =
@@ -43,8 +45,10 @@ constexpr const char* kDeny =
 constexpr const char* kBound =
     "DELETE FROM failures WHERE (address, tag) IN (SELECT address, tag FROM failures ORDER BY denied, since"
     " LIMIT max(0, (SELECT count(*) FROM failures) - ?1))";
+// For how many seconds more.
 constexpr const char* kAsk =
-    "SELECT 1 FROM failures WHERE address = ?1 AND denied <> 0 AND (?3 = 0 OR abs(?2 - denied) < ?3) LIMIT 1";
+    "SELECT CASE WHEN ?3 = 0 THEN ?4 ELSE ?3 - abs(?2 - denied) END FROM failures"
+    " WHERE address = ?1 AND denied <> 0 AND (?3 = 0 OR abs(?2 - denied) < ?3) ORDER BY 1 DESC LIMIT 1";
 constexpr const char* kReset = "DELETE FROM failures WHERE address = ?1";
 
 struct Value {
@@ -64,8 +68,9 @@ vexo::AutoBlockRules currentRules() {
                                      settings.Get("autoblock_expire_minutes", ""));
 }
 
-// Runs one statement. SQLITE_ROW when it has a row, SQLITE_DONE when not, else what went wrong, with errno.
-int run(sqlite3* db, const char* sql, std::initializer_list<Value> values) {
+// Runs one statement. SQLITE_ROW when it has a row, whose first number `found` takes, SQLITE_DONE when not, else what
+// went wrong, with errno.
+int run(sqlite3* db, const char* sql, std::initializer_list<Value> values, int* found = nullptr) {
     const vexo::Statement statement = vexo::prepare(db, sql);
     if (!statement) return sqlite3_errcode(db);
     int index = 0;
@@ -79,6 +84,7 @@ int run(sqlite3* db, const char* sql, std::initializer_list<Value> values) {
         }
     }
     const int result = sqlite3_step(statement.get());
+    if (result == SQLITE_ROW && found != nullptr) *found = sqlite3_column_int(statement.get(), 0);
     if (result != SQLITE_ROW && result != SQLITE_DONE) errno = vexo::errnoOfSqlite(result);
     return result;
 }
@@ -130,8 +136,7 @@ int failStore() {
 
 }  // namespace
 
-int VexoCgiIsDeniedIP(const char* address) try {
-    VEXO_GATE("VexoCgiIsDeniedIP", -1);
+int VEXOAutoBlockWait(const char* address) try {
     const auto normal = address == nullptr ? std::nullopt : vexo::normaliseAddress(address);
     if (!normal) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
     const int before = errno;
@@ -140,14 +145,20 @@ int VexoCgiIsDeniedIP(const char* address) try {
     const orvel::RaisedIdentity raised;
     const vexo::Database db = openStore(false);
     if (!db && errno != ENOENT) return failStore();
-    const int answer =
-        db ? run(db.get(), kAsk, {std::string_view(*normal), static_cast<long long>(time(nullptr)), rules.duration})
-           : SQLITE_DONE;
-    if (!isDone(answer)) return failStore();
+    int wait = 0;
+    const long long now = time(nullptr);
+    if (db && !isDone(run(db.get(), kAsk, {std::string_view(*normal), now, rules.duration, kForGood}, &wait))) {
+        return failStore();
+    }
     errno = before;
-    return static_cast<int>(answer == SQLITE_ROW);
+    return wait;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int VexoCgiIsDeniedIP(const char* address) {
+    VEXO_GATE("VexoCgiIsDeniedIP", -1);
+    return std::min(VEXOAutoBlockWait(address), 1);
 }
 
 int VEXOAutoBlockResetByIP(const char* address) try {

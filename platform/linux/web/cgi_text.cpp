@@ -1,6 +1,7 @@
 #include "web/cgi_text.h"
 
 #include <algorithm>
+#include <cstdlib>
 
 namespace vexo {
 namespace {
@@ -73,6 +74,19 @@ std::vector<std::pair<std::string, std::string>> parseCookies(std::string_view h
         cookies.emplace_back(name, trimBlanks(value));
     }
     return cookies;
+}
+
+bool isSecureRequest() {
+    const char* https = getenv("HTTPS");
+    return https != nullptr && std::string_view(https) == "on";
+}
+
+std::string sessionCookieName() {
+    return isSecureRequest() ? "__Host-id" : "id";
+}
+
+std::string cookieNameOf(const std::string& name) {
+    return name == "id" ? sessionCookieName() : name;
 }
 
 std::optional<std::string> findCookie(std::string_view header, std::string_view name) {

@@ -1,4 +1,4 @@
-// The texts of a web request: forms and cookies. Pure.
+// The texts of a web request: forms and cookies. Pure but for what asks the environment.
 #ifndef VEXO_LINUX_CGI_TEXT_H
 #define VEXO_LINUX_CGI_TEXT_H
 
@@ -26,6 +26,14 @@ void parseForm(std::string_view text, FormFields& fields);
 
 // The cookies of a Cookie header, names and values as they stand, in their order.
 std::vector<std::pair<std::string, std::string>> parseCookies(std::string_view header);
+
+// Whether the request came by HTTPS, as the environment says.
+bool isSecureRequest();
+// How the browser calls the cookie "id" of a session. By HTTPS it is one that no other host, and nobody who speaks to
+// the browser without HTTPS, can set.
+std::string sessionCookieName();
+// Whatever is asked for as "id" is called sessionCookieName() in the header.
+std::string cookieNameOf(const std::string& name);
 
 // The value of the first cookie of that name in a Cookie header.
 std::optional<std::string> findCookie(std::string_view header, std::string_view name);

@@ -3,57 +3,37 @@
 #include <dirent.h>
 #include <sys/stat.h>
 
+#include <algorithm>
+#include <charconv>
 #include <memory>
-#include <optional>
 
+#include "base/owner.h"
 #include "base/raised_identity.h"
 #include "base/random.h"
 #include "failure.h"
 #include "io/file_io.h"
 #include "vexo/settings.h"
-#include "vexo/system_root.h"
 #include "vexo/volume.h"
-#include "web/session_record.h"
+#include "web/run_folder.h"
 
 namespace vexo {
 namespace {
 
-constexpr const char* kRunFolder = "/run";
-constexpr const char* kPlatformFolder = "/run/vexo";
-constexpr const char* kStoreFolder = "/run/vexo/sessions";
-constexpr int kDefaultTimeout = 15;  // minutes, as for the records of sharing sessions
+constexpr const char* kStore = "sessions";
+constexpr int kDefaultTimeout = 15;        // minutes, as for the records of sharing sessions
+constexpr int kDefaultLifetime = 24 * 60;  // minutes
+constexpr int kLongestLifetime = 366 * 24 * 60;
 constexpr time_t kNoteInterval = 60;
 constexpr size_t kMaxRecord = 4096;
+constexpr size_t kMostOfUser = 32;
+using Folder = std::unique_ptr<DIR, orvel::Releaser<closedir>>;
 
-struct CloseFolder {
-    void operator()(DIR* folder) const {
-        const KeepErrno keep;
-        closedir(folder);
-    }
-};
-using Folder = std::unique_ptr<DIR, CloseFolder>;
-
-long long timeoutSeconds() {
-    const int minutes = VLIBCConfGetKTRTimeout();
-    return 60LL * (minutes < 0 ? kDefaultTimeout : minutes);
-}
-
-bool makeFolder(const char* path, mode_t mode) {
-    return mkdir(VEXO::SystemPath(path).c_str(), mode) == 0 || errno == EEXIST;
-}
-
-bool makeStore() {
-    return makeFolder(kRunFolder, 0755) && makeFolder(kPlatformFolder, 0755) && makeFolder(kStoreFolder, 0700);
-}
-
-Descriptor openStore() {
-    Descriptor store = openFile(VEXO::SystemPath(kStoreFolder), O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
-    struct stat status {};
-    if (store && (fstat(store.get(), &status) != 0 || !isTrusted(status, S_IFDIR))) {
-        errno = EACCES;
-        return Descriptor();
-    }
-    return store;
+int lifetimeMinutes() {
+    const std::string text = VexoConf::Info().Get("session_lifetime", "");
+    int minutes = 0;
+    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), minutes);
+    const bool whole = error == std::errc() && end == text.data() + text.size();
+    return whole && minutes > 0 && minutes <= kLongestLifetime ? minutes : kDefaultLifetime;
 }
 
 bool writeSession(int store, const std::string& sid, const std::string& record) {
@@ -65,32 +45,39 @@ bool writeSession(int store, const std::string& sid, const std::string& record) 
     return false;
 }
 
-// Removes what has ended among the open store's sessions, and counts it.
-long sweep(const Descriptor& store) {
+// The names of all session files of the open store. False with errno when it cannot be read.
+bool readNames(const Descriptor& store, std::vector<std::string>& list) {
     Descriptor again = openFile(store.get(), ".", O_RDONLY | O_DIRECTORY);
     const Folder folder(again ? fdopendir(again.get()) : nullptr);
-    if (!folder) return -1;
+    if (!folder) return false;
     static_cast<void>(again.release());
-    long removed = 0;
-    const long long timeout = timeoutSeconds();
-    const time_t now = time(nullptr);
     while (const dirent* entry = readdir(folder.get())) {
+        if (isSessionId(entry->d_name)) list.emplace_back(entry->d_name);
+    }
+    return true;
+}
+
+// Removes what has ended for want of use among the open store's sessions, and counts it.
+long sweep(const Descriptor& store) {
+    std::vector<std::string> names;
+    if (!readNames(store, names)) return -1;
+    long removed = 0;
+    const SessionLimits limits = sessionLimits();
+    const time_t now = time(nullptr);
+    for (const std::string& sid : names) {
         struct stat status {};
-        if (!isSessionId(entry->d_name)) continue;
-        if (fstatat(store.get(), entry->d_name, &status, AT_SYMLINK_NOFOLLOW) != 0) continue;
-        if (isSessionAlive(status.st_mtime, now, timeout)) continue;
-        if (unlinkat(store.get(), entry->d_name, 0) == 0) ++removed;
+        if (fstatat(store.get(), sid.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) continue;
+        if (isSessionAlive(status.st_mtime, now, now, limits)) continue;
+        if (unlinkat(store.get(), sid.c_str(), 0) == 0) ++removed;
     }
     return removed;
 }
 
-// The user of a session's file that may be trusted.
-std::optional<std::string> readUser(int fd, struct stat& status) {
+// The record of a session's file that may be trusted.
+std::optional<SessionRecord> readRecord(int fd, struct stat& status) {
     std::string text;
     if (fstat(fd, &status) != 0 || !isTrusted(status, S_IFREG) || !readAll(fd, text, kMaxRecord)) return {};
-    auto record = parseSessionRecord(text);
-    if (!record) return {};
-    return std::move(record->user);
+    return parseSessionRecord(text);
 }
 
 // Notes the use, but writes seldom: a listing page asks for many things within a second.
@@ -101,19 +88,38 @@ void noteUse(int fd, time_t lastUse, time_t now) {
     static_cast<void>(futimens(fd, times));
 }
 
-bool findSession(const std::string& sid, const std::string& user, long long timeout) {
-    const Descriptor store = openStore();
-    if (!store) return false;
-    const Descriptor fd = openFile(store.get(), sid.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK);
+// A session of the open store that is alive; one that has ended goes.
+std::optional<KeptSession> findSession(int store, const std::string& sid, const SessionLimits& limits, bool isUse) {
+    const Descriptor fd = openFile(store, sid.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK);
     struct stat status {};
-    if (!fd || readUser(fd.get(), status) != user) return false;
+    auto record = fd ? readRecord(fd.get(), status) : std::nullopt;
+    if (!record) return {};
     const time_t now = time(nullptr);
-    if (!isSessionAlive(status.st_mtime, now, timeout)) {
-        unlinkat(store.get(), sid.c_str(), 0);
-        return false;
+    if (!isSessionAlive(status.st_mtime, record->time, now, limits)) {
+        unlinkat(store, sid.c_str(), 0);
+        return {};
     }
-    noteUse(fd.get(), status.st_mtime, now);
-    return true;
+    if (isUse) noteUse(fd.get(), status.st_mtime, now);
+    return KeptSession{sid, std::move(*record), status.st_mtime};
+}
+
+std::vector<KeptSession> find(const Descriptor& store, const std::string& user) {
+    const SessionLimits limits = sessionLimits();
+    std::vector<KeptSession> list;
+    std::vector<std::string> names;
+    static_cast<void>(readNames(store, names));  // what cannot be read is not there
+    for (const std::string& sid : names) {
+        auto found = findSession(store.get(), sid, limits, false);
+        if (found && found->record.loggedIn && found->record.user == user) list.push_back(std::move(*found));
+    }
+    std::sort(list.begin(), list.end(), [](const auto& a, const auto& b) { return a.lastUse > b.lastUse; });
+    return list;
+}
+
+// Makes room for one more session of a user: who has the password must not fill the machine's memory with them.
+void makeRoom(const Descriptor& store, const std::string& user) {
+    const auto kept = find(store, user);
+    for (size_t i = kMostOfUser - 1; i < kept.size(); ++i) unlinkat(store.get(), kept[i].sid.c_str(), 0);
 }
 
 // The user's folders for temporary files. Where they cannot be made, what needs them says so.
@@ -126,39 +132,68 @@ void prepareFolders(const std::string& user) {
 
 }  // namespace
 
-bool isSessionAlive(time_t lastUse, time_t now, long long timeout) {
-    // A use in the future is a clock that was set back; the next use puts it right.
-    return lastUse >= now || now - lastUse <= timeout + kNoteInterval;
+SessionLimits sessionLimits() {
+    const int minutes = VLIBCConfGetKTRTimeout();
+    return {60LL * (minutes < 0 ? kDefaultTimeout : minutes), 60LL * lifetimeMinutes()};
 }
 
-std::string createSession(const std::string& user, const std::string& address) {
-    const auto record = buildSessionRecord({user, address, time(nullptr)});
-    if (!record) {
+bool isSessionAlive(time_t lastUse, time_t begun, time_t now, const SessionLimits& limits) {
+    // A time in the future is a clock that was set back; the next use puts it right.
+    const bool used = lastUse >= now || now - lastUse <= limits.idle + kNoteInterval;
+    return used && (begun >= now || now - begun <= limits.whole);
+}
+
+std::string createSession(SessionRecord record) {
+    record.time = time(nullptr);
+    record.name = orvel::draw<8>();
+    const auto text = buildSessionRecord(record);
+    if (!text) {
         fail(VEXO_ERR_PARAMETER, EINVAL);
         return {};
     }
-    std::string sid = orvel::draw<16>();
+    std::string sid = record.name.empty() ? "" : orvel::draw<16>();
     const orvel::RaisedIdentity raised;
-    const Descriptor store = !sid.empty() && makeStore() ? openStore() : Descriptor();
-    if (!store || !writeSession(store.get(), sid, *record)) {
+    const Descriptor store = !sid.empty() && makeRunFolder(kStore) ? openRunFolder(kStore) : Descriptor();
+    if (store && record.loggedIn) makeRoom(store, record.user);
+    if (!store || !writeSession(store.get(), sid, *text)) {
         fail(errorOfErrno(errno));
         return {};
     }
     // One in 256, so that neither the store grows nor every log-in reads it.
     if (sid.starts_with("00")) sweep(store);
-    prepareFolders(user);
+    prepareFolders(record.user);
     return sid;
 }
 
-bool useSession(const std::string& sid, const std::string& user) {
-    const long long timeout = timeoutSeconds();
+std::optional<SessionRecord> useSession(const std::string& sid) {
+    const SessionLimits limits = sessionLimits();
     const orvel::RaisedIdentity raised;
-    return isSessionId(sid) && findSession(sid, user, timeout);
+    const Descriptor store = isSessionId(sid) ? openRunFolder(kStore) : Descriptor();
+    auto found = store ? findSession(store.get(), sid, limits, true) : std::nullopt;
+    return found ? std::optional(std::move(found->record)) : std::nullopt;
+}
+
+bool useSession(const std::string& sid, const std::string& user) {
+    const auto record = useSession(sid);
+    return record && record->user == user;
+}
+
+std::vector<KeptSession> sessionsOf(const std::string& user) {
+    const orvel::RaisedIdentity raised;
+    const Descriptor store = openRunFolder(kStore);
+    return store ? find(store, user) : std::vector<KeptSession>();
+}
+
+bool endSession(const std::string& sid) {
+    const KeepErrno keep;
+    const orvel::RaisedIdentity raised;
+    const Descriptor store = isSessionId(sid) ? openRunFolder(kStore) : Descriptor();
+    return store && unlinkat(store.get(), sid.c_str(), 0) == 0;
 }
 
 long sweepSessions() {
     const orvel::RaisedIdentity raised;
-    const Descriptor store = openStore();
+    const Descriptor store = openRunFolder(kStore);
     if (!store) return errno == ENOENT ? 0 : -1;
     return sweep(store);
 }

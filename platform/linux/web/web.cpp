@@ -111,17 +111,17 @@ bool WebCGI::BodyRefused() const {
 }
 
 std::string WebCGI::GetCookie(const std::string& name, const std::string& def) const {
-    return vexo::findCookie(impl_->cookies, name).value_or(def);
+    return vexo::findCookie(impl_->cookies, vexo::cookieNameOf(name)).value_or(def);
 }
 
 bool WebCGI::AddCookieToHeader(const std::string& path, const std::string& name, const std::string& value) {
     VEXO_GATE("VEXO::WebCGI::AddCookieToHeader", false);
     if (!vexo::isCookieName(name) || !vexo::isCookieText(value) || !vexo::isCookieText(path)) return false;
     // No script reads it, and no other site's page sends it along but by a link.
-    const char* https = getenv("HTTPS");
-    const bool secure = https != nullptr && std::string_view(https) == "on";
-    impl_->newCookies.push_back("Set-Cookie: " + name + "=" + value + (path.empty() ? "" : "; Path=" + path) +
-                                "; HttpOnly; SameSite=Lax" + (secure ? "; Secure" : ""));
+    const bool secure = vexo::isSecureRequest();
+    impl_->newCookies.push_back("Set-Cookie: " + vexo::cookieNameOf(name) + "=" + value +
+                                (path.empty() ? "" : "; Path=" + path) + "; HttpOnly; SameSite=Lax" +
+                                (secure ? "; Secure" : ""));
     return true;
 }
 

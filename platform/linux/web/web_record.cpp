@@ -27,8 +27,9 @@ int VexoCgiInit(_tag_VexoCgi* request) try {
 const char* VexoCgiGetInCookies(_tag_VexoCgi* request, const char* name) {
     VEXO_GATE("VexoCgiGetInCookies", nullptr);
     if (request == nullptr || name == nullptr) return nullptr;
+    const std::string called = vexo::cookieNameOf(name);
     for (const auto& [cookie, value] : request->cookies) {
-        if (cookie == name) return value.c_str();
+        if (cookie == called) return value.c_str();
     }
     return nullptr;
 }
