@@ -36,6 +36,14 @@ std::string_view statusLine(Status status) {
     return "Status: 500 Internal Server Error\r\n";
 }
 
+Json::Value errorOf(int code, const char* key, std::string_view path) {
+    Json::Value error;
+    error["code"] = code;
+    error["key"] = key;
+    putPath(error, "path", path);
+    return error;
+}
+
 }  // namespace
 
 void beginReply(Output& out, Status status, const std::string& cookie) {
@@ -68,12 +76,17 @@ void reply(Output& out, Status status, const std::string& cookie, int code, std:
     Json::Value whole;
     whole["success"] = code == ORV_ERR_NONE;
     if (!data.isNull()) whole["data"] = data;
-    if (code != ORV_ERR_NONE) {
-        Json::Value& error = whole["error"];
-        error["code"] = code;
-        error["key"] = OrvParseErrorToKTRString(code, nullptr);
-        putPath(error, "path", path);
-    }
+    if (code != ORV_ERR_NONE) whole["error"] = errorOf(code, OrvParseErrorToKTRString(code, nullptr), path);
+    beginReply(out, status, cookie);
+    appendJson(whole, out.text());
+}
+
+void replyOwnFailure(Output& out, Status status, const std::string& cookie, int code, const char* key,
+                     const Json::Value& data) {
+    Json::Value whole;
+    whole["success"] = false;
+    if (!data.isNull()) whole["data"] = data;
+    whole["error"] = errorOf(code, key, "");
     beginReply(out, status, cookie);
     appendJson(whole, out.text());
 }

@@ -40,6 +40,10 @@ void reply(Output& out, Status status, const std::string& cookie, int code, std:
            const Json::Value& data);
 void replyFailure(Output& out, Status status, const std::string& cookie, int code, std::string_view path);
 
+// The same for a failure that is a program's own: `key` names its text.
+void replyOwnFailure(Output& out, Status status, const std::string& cookie, int code, const char* key,
+                     const Json::Value& data);
+
 // The library code of the failure just met, `fallback` where it set none (store 0 before the call).
 int lastCode(int fallback = ORV_ERR_GENERAL);
 

@@ -44,17 +44,6 @@ void makeHome(const std::string& user) {
     if (VEXOServiceUserHomeIsEnabled(record->authType, record->uid) == 1) OrvUserHomeFullPathGet(home, user);
 }
 
-// Whether a page of another site sends the request. Browsers add the log-in by themselves, whoever makes them ask, but
-// say whose page it was where something could be changed.
-bool isForeign() {
-    const char* origin = getenv("HTTP_ORIGIN");
-    const char* host = getenv("HTTP_HOST");
-    if (origin == nullptr || host == nullptr) return false;
-    const std::string_view from = origin;
-    const size_t scheme = from.find("://");
-    return scheme == std::string_view::npos || from.substr(scheme + 3) != host;
-}
-
 // Appends the paths of a list; see pathParams. False when a line cannot be one.
 bool addList(const std::vector<std::string>& lines, std::vector<std::string>& paths) {
     for (const std::string& line : lines) {
@@ -78,9 +67,32 @@ void settleClientAddress() {
     std::string address;
     if (trusted && forwarded != nullptr) address = clientBehind(forwarded, peer, proxies);
     if (trusted && forwarded == nullptr && client != nullptr) address = canonicalAddress(client);
+    const char* scheme = getenv("HTTP_X_FORWARDED_PROTO");
+    if (trusted && scheme != nullptr && std::string_view(scheme) == "https") setenv("HTTPS", "on", 1);
     unsetenv("HTTP_CLIENT_IP");
     unsetenv("HTTP_X_FORWARDED_FOR");
     if (!address.empty()) setenv("HTTP_X_FORWARDED_FOR", address.c_str(), 1);
+}
+
+std::string clientAddress() {
+    for (const char* name : {"HTTP_X_FORWARDED_FOR", "REMOTE_ADDR"}) {
+        if (const char* value = getenv(name)) return value;
+    }
+    return "";
+}
+
+bool isForeign() {
+    const char* origin = getenv("HTTP_ORIGIN");
+    const char* host = getenv("HTTP_HOST");
+    if (origin == nullptr || host == nullptr) return false;
+    const std::string_view from = origin;
+    const size_t scheme = from.find("://");
+    return scheme == std::string_view::npos || from.substr(scheme + 3) != host;
+}
+
+bool isMeantForAnother(const std::string& user) {
+    const char* meant = getenv("HTTP_ORVEL_USER");
+    return meant != nullptr && percentDecode(meant) != readable(user);
 }
 
 Status admit(User& user) {
@@ -89,7 +101,7 @@ Status admit(User& user) {
     user.name = session.GetLoginUserName();
     user.sid = session.GetSessionId();
     user.cookie = session.GetNewCookie();
-    if (authorized) return Status::kOk;
+    if (authorized) return isMeantForAnother(user.name) ? Status::kNotLoggedIn : Status::kOk;
     return user.name.empty() ? Status::kNotLoggedIn : Status::kForbidden;
 }
 

@@ -28,8 +28,20 @@ struct Request {
 
 // Leaves the client's address, where trusted proxies handed the request on, as the only text of the environment
 // variable HTTP_X_FORWARDED_FOR, and removes it, and HTTP_CLIENT_IP, elsewhere: anybody can send such headers. The
-// setting "trusted_proxies" lists the addresses of proxies whose word counts, comma-separated.
+// setting "trusted_proxies" lists the addresses of proxies whose word counts, comma-separated; that the client came to
+// them by HTTPS (X-Forwarded-Proto) makes HTTPS "on".
 void settleClientAddress();
+
+// The client's address, once that was called; "" where nobody says.
+std::string clientAddress();
+
+// Whether a page of another site sends the request. Browsers add the log-in by themselves, whoever makes them ask, but
+// say whose page it was where something could be changed.
+bool isForeign();
+
+// Whether the request says that it is meant for another user than `user`: the header Orvel-User names one, as a page
+// does that must not act for whoever has logged in by now.
+bool isMeantForAnother(const std::string& user);
 
 // Logs the request in through the platform's session and asks for the file manager's application privilege. kOk with
 // `user` filled, kNotLoggedIn or kForbidden.

@@ -98,12 +98,6 @@ std::string variable(const char* name) {
     return value == nullptr ? "" : value;
 }
 
-std::string clientAddress() {
-    cgi::settleClientAddress();
-    const std::string forwarded = variable("HTTP_X_FORWARDED_FOR");
-    return forwarded.empty() ? variable("REMOTE_ADDR") : forwarded;
-}
-
 int finish(cgi::Output& out) {
     replyBegins();
     return out.finish() ? 0 : 1;
@@ -138,7 +132,8 @@ int serve(const Handover& given) {
     const cgi::Program* program = cgi::findProgram(path.substr(path.rfind('/') + 1));
     if (program == nullptr) return refuse(cgi::Status::kNotFound, ORV_ERR_MISSING);
     ownSlot->program = static_cast<std::uint32_t>(program - cgi::programs().data()) + 1;
-    if (!given.slots.admit(given.slot, clientAddress(), given.limits.perAddress)) {
+    cgi::settleClientAddress();
+    if (!given.slots.admit(given.slot, cgi::clientAddress(), given.limits.perAddress)) {
         return refuse(cgi::Status::kBusy, ORV_ERR_BUSY);
     }
     if (!isIn(given.limits.trusted, given.peer)) unsetenv("REMOTE_USER");

@@ -108,7 +108,8 @@ def ask(program, method="GET", user="alice", status=200, success=True, body=None
     expect(got == status, f"{what}: status {got}, not {status}: {text[:200]}")
     operation = described["paths"]["/cgi-bin/" + program].get(method.lower())
     if operation is None:
-        operation = described["paths"]["/cgi-bin/" + program]["post"]
+        item = described["paths"]["/cgi-bin/" + program]
+        operation = item.get("post", item.get("get"))
     response = follow(operation["responses"].get(str(got)))
     if response is None:
         failures.append(f"{what}: status {got} is not described")
@@ -189,7 +190,7 @@ def checkRefusals():
             posted = action and item.get("get") and schema not in list(requestSchemas(program, "get"))
             if posted:
                 ask(program, "GET", status=400, success=False, whole=False, **usual)
-        if program != "share":
+        if program not in ("share", "sessions"):
             method = "PUT" if program == "upload" else "POST"
             ask(program, method, status=403, success=False, whole=False, headers={"Origin": "http://elsewhere"})
 
@@ -332,6 +333,21 @@ def links():
     ask("link", "POST", action="revoke", id=word, success=False)
 
 
+def logIns():
+    word = os.environ["ORVEL_TEST_ALICE"]
+    ask("login", user="bob")
+    ask("login", "POST", action="begin", user="alice", password=word)
+    cookie = send("login", "POST", {"action": "begin", "user": "alice"}, "alice")[1]["Set-Cookie"].split(";")[0]
+    ask("login", "POST", action="answer", text=word, headers={"Cookie": cookie})
+    ask("login", "POST", action="begin", user="alice")
+    ask("login", "POST", action="cancel")
+    ask("login", "POST", action="answer", text="x", status=403, success=False)
+    ask("login", "POST", action="begin", user="nobody-here", password="x", status=403, success=False)
+    ask("sessions")
+    ask("logout", "POST", scope="others")
+    ask("logout", "POST")
+
+
 # Of a network mount, an index, or a search that failed: nothing that a demo has.
 UNSEEN = {"not_kept", "mount_type", "failure", "left_out", "share_raw", "current_raw", "code", "key"}
 
@@ -361,6 +377,7 @@ checkText(described)
 checkTable()
 files()
 links()
+logIns()
 checkRefusals()
 checkCoverage()
 for failure in failures:

@@ -38,6 +38,9 @@ void answer(const Program& program, Output& out);
 int serveRequest(const Program& program, void (*beginning)() = nullptr);
 
 // What stands in the table, each in the folder of its name.
+void serveLogInProgram(Request& request, Output& out);
+void serveLogOutProgram(Request& request, Output& out);
+void serveSessionsProgram(Request& request, Output& out);
 void serveListProgram(Request& request, Output& out);
 void serveDownloadProgram(Request& request, Output& out);
 void serveLinkProgram(Request& request, Output& out);

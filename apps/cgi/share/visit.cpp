@@ -9,6 +9,7 @@
 #include <optional>
 #include <string_view>
 
+#include "request.h"
 #include "vexo/auto_block.h"
 #include "vexo/error.h"
 #include "vexo/system_root.h"
@@ -24,16 +25,6 @@ constexpr size_t kLongestUser = 63;
 std::string linkIdOf(const VEXO::WebCGI& web) {
     const char* header = getenv("HTTP_FOLDER_SHARING");
     return header != nullptr ? header : web.GetParam("FOLDER_SHARING", "");
-}
-
-std::string clientAddress() {
-    for (const char* name : {"HTTP_X_FORWARDED_FOR", "HTTP_CLIENT_IP", "REMOTE_ADDR"}) {
-        const char* value = getenv(name);
-        if (value == nullptr) continue;
-        const std::string_view address = value;
-        return std::string(address.substr(0, address.find(',')));
-    }
-    return "";
 }
 
 // The page's text is fixed and escapes nothing for HTML: what could end its title or its script becomes "_" there. The
