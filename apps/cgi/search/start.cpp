@@ -136,12 +136,12 @@ void replyStarted(Output& out, const User& user, const std::string& id, const st
 void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
     const auto paths = pathParams(web);
     const std::string recursive = web.GetParam("recursive", "true");
-    const bool asksPage = !std::string(web.GetParam("limit", "")).empty();
-    const auto page = asksPage ? parsePage(user, web) : std::nullopt;
+    auto page = parsePage(user, web);
     if (!paths || paths->empty() || paths->size() > kMostFolders || (recursive != "true" && recursive != "false") ||
-        asksPage != page.has_value()) {
+        !page) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
+    if (std::string(web.GetParam("limit", "")).empty()) page.reset();
     Criteria criteria;
     Json::Value data;
     std::string culprit;
