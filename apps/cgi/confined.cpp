@@ -13,6 +13,7 @@
 #include "vexo/filesystem.h"
 #include "vexo/settings.h"
 #include "vexo/share.h"
+#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
@@ -52,6 +53,7 @@ LinkPolicy linkPolicyOf(const std::string& shareName) {
 bool isHiddenPlace(const Descriptor& root, const Descriptor& opened) {
     const auto within = pathBetween(root, opened);
     if (!within) return false;  // moved away since
+    VEXOShareNamesOf(opened.get());
     std::string_view rest = *within;
     while (!rest.empty()) {
         const size_t end = std::min(rest.find('/'), rest.size());

@@ -9,6 +9,7 @@
 #include <memory>
 
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
@@ -28,6 +29,7 @@ bool namesIn(int folder, Hidden hidden, std::vector<std::string>& names) {
     const int fd = openat(folder, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     const std::unique_ptr<DIR, CloseDirectory> directory(fd < 0 ? nullptr : fdopendir(fd));
     if (directory == nullptr) return false;
+    VEXOShareNamesOf(fd);
     for (;;) {
         errno = 0;
         const dirent* entry = readdir(directory.get());

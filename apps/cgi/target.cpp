@@ -14,6 +14,7 @@
 #include "orvel/name_check.h"
 #include "reply.h"
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 #include "vexo/user.h"
 
 namespace orvel::cgi {
@@ -38,12 +39,13 @@ std::string joined(const std::vector<std::string>& components, size_t count) {
     return path;
 }
 
-// An administrator's process is root: what it makes is handed to the administrator's own account.
-void handOver(const Descriptor& made, const std::string& user) {
-    uid_t uid = 0;
-    gid_t gid = 0;
-    if (VEXOUserGetUGID(user.c_str(), &uid, &gid) != 0) return;
-    [[maybe_unused]] const int ignored = fchownat(made.get(), "", uid, gid, AT_EMPTY_PATH);  // FAT keeps no owners
+// What the share says of new folders. An administrator's process is root: what it makes is handed to the
+// administrator's own account.
+bool giveNew(const Descriptor& folder, const Descriptor& made, const std::string& user) {
+    uid_t uid = static_cast<uid_t>(-1);
+    gid_t gid = static_cast<gid_t>(-1);
+    if (geteuid() == 0 && VEXOUserGetUGID(user.c_str(), &uid, &gid) != 0) uid = gid = static_cast<uid_t>(-1);
+    return VEXOShareGiveNew(folder.get(), made.get(), kFolderMode, 0, uid, gid) == 0;
 }
 
 // Removes what did not become of a folder; the code for errno.
@@ -58,7 +60,7 @@ int makeFolderFor(const std::string& user, const Descriptor& folder, const std::
     std::string part;
     made = makeFolderPart(folder.get(), name, kFolderMode, part);
     if (!made) return OrvParseErrnoToError(errno, nullptr, nullptr);
-    handOver(made, user);
+    if (!giveNew(folder, made, user)) return takeBack(folder, part);
     if (renameNew(folder.get(), part, folder.get(), name)) return ORV_ERR_NONE;
     made.reset();
     return takeBack(folder, part);
@@ -93,6 +95,7 @@ int enter(const PathInfo& info, LinkPolicy policy, Way& way, Target& target) {
 }  // namespace
 
 int checkNewName(const Descriptor& folder, const std::string& name) {
+    VEXOShareNamesOf(folder.get());
     if (VEXOEAIsHiddenFile(name.c_str()) != 0) return ORV_ERR_RESERVED_NAME;
     OrvLibSetErr(ORV_ERR_NONE);
     return OrvCheckFileName(realPathOf(folder).c_str(), name.c_str()) == 0 ? ORV_ERR_NONE : lastCode();
@@ -104,7 +107,7 @@ int makeFolder(const Descriptor& folder, const std::string& name, const std::str
     if (geteuid() == 0) return makeFolderFor(user, folder, name, made);
     if (mkdirat(folder.get(), name.c_str(), kFolderMode) != 0) return OrvParseErrnoToError(errno, nullptr, nullptr);
     made = Descriptor(openat(folder.get(), name.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-    return made ? static_cast<int>(ORV_ERR_NONE) : takeBack(folder, name);
+    return made && giveNew(folder, made, user) ? static_cast<int>(ORV_ERR_NONE) : takeBack(folder, name);
 }
 
 int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target) {
@@ -133,7 +136,10 @@ int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user,
 
 int openPresent(const PathInfo& info, const std::string& user, Target& target) {
     const int code = openTarget(info, linkPolicyOf(info.shareName), user, Missing::kRefuse, target);
-    if (code == ORV_ERR_NONE) return VEXOEAIsHiddenFile(target.name.c_str()) == 0 ? ORV_ERR_NONE : ORV_ERR_MISSING;
+    if (code == ORV_ERR_NONE) {
+        VEXOShareNamesOf(target.folder.get());
+        return VEXOEAIsHiddenFile(target.name.c_str()) == 0 ? ORV_ERR_NONE : ORV_ERR_MISSING;
+    }
     return code == ORV_ERR_RESERVED_NAME && target.folder ? static_cast<int>(ORV_ERR_MISSING) : code;
 }
 

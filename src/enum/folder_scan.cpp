@@ -13,6 +13,7 @@
 #include "enum/entry_fill.h"
 #include "enum/folder_reader.h"
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 
 namespace orvel {
 namespace {
@@ -57,6 +58,7 @@ class Scan {
 
     bool run() {
         bool failed = false;
+        VEXOShareNamesAt(request_.realPath);
         const int systemCode = FolderReader().forEach(folder_, [&](const char* name, unsigned char dType) {
             if (VEXOEAIsHiddenFile(name) == 1 || !acceptedBy(request_.criteria, name)) return true;
             failed = !take(name, dType);

@@ -14,6 +14,7 @@
 #include "orvel/directory_walker.h"
 #include "orvel/error_state.h"
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 #include "vexo/text.h"
 
 namespace {
@@ -55,6 +56,7 @@ bool enumerate(const orvel::GivenFolder& given, SubDirs& subDirs) {
 
     SubDirs found;
     const int folder = entered.folder.get();
+    VEXOShareNamesAt(given.text().c_str());
     const int error = orvel::FolderReader().forEach(folder, [&](const char* name, unsigned char type) {
         const bool maybeFolder = type == DT_DIR || type == DT_UNKNOWN;
         if (maybeFolder && VEXOEAIsHiddenFile(name) == 0) appendIfFolder(found, folder, given.text(), name);

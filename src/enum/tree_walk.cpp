@@ -11,6 +11,7 @@
 #include "vexo/error.h"
 #include "vexo/filesystem.h"
 #include "vexo/share.h"
+#include "vexo/share_files.h"
 
 namespace orvel {
 namespace {
@@ -92,6 +93,7 @@ bool TreeWalk::descend() {
 // Makes the folder at the current paths the deepest level and reads its names.
 void TreeWalk::push(Descriptor folder) {
     const std::size_t begin = names_.size();
+    VEXOShareNamesAt(real_.c_str());
     const int readError = reader_.forEach(folder.get(), [&](const char* name, unsigned char) {
         if (aborted()) return false;
         if (VEXOEAIsHiddenFile(name) == 0) names_.append(name, strlen(name) + 1);

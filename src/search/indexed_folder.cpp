@@ -9,6 +9,7 @@
 #include "vexo/filesystem.h"
 #include "vexo/index.h"
 #include "vexo/share.h"
+#include "vexo/share_files.h"
 
 namespace orvel {
 namespace {
@@ -33,6 +34,7 @@ bool isLeftOut(const std::string& shareRoot, std::string_view within) {
     const std::string top = below(shareRoot, within.substr(0, within.find('/')));
     if (VEXOShareIsShareRecycle(top.c_str()) == 1) return true;
     std::string at = shareRoot;
+    VEXOShareNamesAt(shareRoot.c_str());
     while (!within.empty()) {
         const std::size_t end = std::min(within.find('/'), within.size());
         const std::string name(within.substr(0, end));

@@ -189,6 +189,21 @@ TEST_F(Index, NoLinkIsFollowed) {
     }
 }
 
+// An index that was built before holds names that are kept out now.
+TEST_F(Index, NamesThatAreKeptOutAreNotFound) {
+    SKIP_WITHOUT_ROOT();
+    file("/a/x.no");
+    file("/a/y");
+    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    EXPECT_NE(search().find("x.no"), std::string::npos);
+    addShare("photo", "read only = no\nvexo:index = yes\nveto files = /*.NO/\n");
+    EXPECT_EQ(search().find("x.no"), std::string::npos);
+    EXPECT_EQ(run({"index", "update", "photo"}).status, 0);
+    const std::string found = search();
+    EXPECT_EQ(found.find("x.no"), std::string::npos);
+    EXPECT_NE(found.find("/photo/a/y"), std::string::npos);
+}
+
 TEST_F(Index, OnlyWhatIsGoneIsPassedOver) {
     file("/in/f");
     int stop = 0;

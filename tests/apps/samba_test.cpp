@@ -62,11 +62,32 @@ const ShareRow kShareRows[] = {
     {"forced", "read only = no\nforce user = erin\n", kClosed},
     {"guestonly", "guest ok = yes\nguest only = yes\nread only = no\n", kClosed},
     {"unreadable", "read only = no\nhide unreadable = yes\n", kClosed},
-    {"vetoed", "read only = no\nveto files = /f.txt/\n", kClosed},
+    {"vetoed", "read only = no\nveto files = /F.T?T/*.no/\n"},
     {"nolinks", "read only = no\nfollow symlinks = no\n", kClosed},
     {"asks", "read only = no\nroot preexec = /bin/false\nroot preexec close = yes\n"},
     {"encrypted", "read only = no\nsmb encrypt = mandatory\n", kClosed},
     {"unknown", "read only = no\nsome new option = yes\n", kClosed},
+};
+
+// Shares in which files and folders are made, by smbclient and by the programs; `parent` is the mode of the share's
+// root.
+struct ModeRow {
+    const char* name;
+    const char* options;
+    mode_t parent = 0777;
+};
+const ModeRow kModeRows[] = {
+    {"m-plain", ""},
+    {"m-masks", "create mask = 0664\ndirectory mask = 0770\n"},
+    {"m-closed", "create mode = 0600\ndirectory mode = 0700\n"},
+    {"m-forced", "force create mode = 0660\nforce directory mode = 0070\n"},
+    {"m-both", "create mask = 0640\nforce create mode = 0020\ndirectory mask = 0750\nforce directory mode = 02000\n"},
+    {"m-group", "force group = team\ncreate mask = 0660\ndirectory mask = 0770\n"},
+    {"m-plus", "force group = +team\n"},
+    {"m-setgid", "create mask = 0664\ndirectory mask = 0775\n", 02777},
+    {"m-setgidgroup", "force group = team\n", 02777},
+    {"m-inherit", "inherit permissions = yes\ncreate mask = 0600\n", 0775},
+    {"m-inheritall", "inherit permissions = yes\n", 02777},
 };
 const char* const kUserNames[] = {"alice", "bob", "carol", "dave", "erin", "frank", "gina", "hugo", "ivan", "judy"};
 
@@ -119,15 +140,16 @@ class Smbd {
             "[global]\nnetbios name = ORACLE\nserver role = standalone server\ninterfaces = 127.0.0.1/8\n"
             "bind interfaces only = yes\nload printers = no\nprinting = bsd\ndisable spoolss = yes\n"
             "map to guest = never\nsmb ports = " +
-            port_ + "\npassdb backend = smbpasswd:" + state_ + "/smbpasswd\nlog file = " + state_ + "/log\n";
+            port_ + "\nmap archive = no\npassdb backend = smbpasswd:" + state_ + "/smbpasswd\nlog file = " + state_ +
+            "/log\n";
         for (const char* key :
              {"private dir", "lock directory", "state directory", "cache directory", "pid directory", "ncalrpc dir"}) {
             text += std::string(key) + " = " + state_ + "\n";
         }
         return text;
     }
-    void start() {
-        for (const char* user : kUserNames) {
+    void start(const std::vector<std::string>& users) {
+        for (const std::string& user : users) {
             const Finished added = runProgram(
                 {"/usr/bin/timeout", "60", "/usr/bin/smbpasswd", "-c", config_, "-a", "-s", user}, {}, "pw\npw\n");
             EXPECT_EQ(added.status, 0) << user << added.output;
@@ -142,6 +164,10 @@ class Smbd {
             _exit(127);
         }
         waitUntil("smbd on port " + port_, [&] { return ask("alice", "plain", "ls").status == 0 || HasFailure(); });
+    }
+    // The reply to commands of `user` in one connection.
+    std::string say(const std::string& user, const std::string& share, const std::string& commands) const {
+        return ask(user, share, commands).output;
     }
     [[nodiscard]] May may(const std::string& user, const std::string& share, const std::string& file) const {
         const std::string text = ask(user, share, "ls f.txt; get f.txt /dev/null; put " + file + " by-" + user).output;
@@ -175,6 +201,23 @@ class SambaOracle : public ApplianceTest {
         addGroup("team", 20110, {"alice", "dave", "gina"});
         addGroup("readers", 20111, {"bob", "gina", "hugo"});
     }
+    // Runs `body` beside an smbd that knows these users.
+    void serve(const std::vector<std::string>& users,
+               const std::function<void(const Smbd& smbd, const std::string& root, const std::string& file)>& body) {
+        SKIP_WITHOUT_ROOT();
+        ASSERT_EQ(access("/usr/sbin/smbd", X_OK) + access("/usr/bin/smbclient", X_OK), 0)
+            << "script/packages names them";
+        EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
+            Smbd smbd(systemRoot(), systemRoot() + "/etc/passwd", systemRoot() + "/etc/group");
+            writeRootFile("/etc/samba/smb.conf", smbd.global() + makeShares(shareRoot("photo")));
+            setSetting("share_definitions", "/etc/samba/smb.conf");
+            writeRootFile("/file", "x");
+            smbd.start(users);
+            body(smbd, shareRoot("photo"), systemRoot() + "/file");
+            takeLog();
+            return 0;
+        }));
+    }
     // The text of the shares, and their folders: everybody's by their Unix permissions, but those of one.
     static std::string makeShares(const std::string& root) {
         std::string text;
@@ -186,6 +229,17 @@ class SambaOracle : public ApplianceTest {
             text += std::string("[") + row.name + "]\npath = " + root + "/" + row.name + "\n" + options;
             fill(root + "/" + row.name);
         }
+        for (const ModeRow& row : kModeRows) {
+            const std::string folder = root + "/" + row.name;
+            text += std::string("[") + row.name + "]\npath = " + folder + "\nread only = no\n" + row.options;
+            fill(folder, row.parent);
+            EXPECT_EQ(chown(folder.c_str(), 20012, 20111), 0);  // erin's, and the readers'
+            chmod(folder.c_str(), row.parent);
+        }
+        fill(root + "/bin");
+        text += "[bin]\npath = " + root +
+                "/bin\nread only = no\nvfs objects = recycle\nrecycle:repository = .bin/%U\n"
+                "recycle:keeptree = yes\n";
         for (const char* user : {"alice", "bob"}) fill(root + "/each/" + user);
         fill(root + "/shut", 0755);
         return text;
@@ -205,16 +259,108 @@ class SambaOracle : public ApplianceTest {
     }
 };
 
+// "MODE OWNER GROUP".
+std::string lookOf(const std::string& path) {
+    struct stat status {};
+    if (lstat(path.c_str(), &status) != 0) return "none";
+    char text[64];
+    snprintf(text, sizeof text, "%o %u %u", status.st_mode & 07777, status.st_uid, status.st_gid);
+    return text;
+}
+
+std::string operate(const std::string& user, const std::string& form) {
+    const CgiReply reply(
+        runCgi(PROGRAM_OPERATION, user, "POST", "", form, {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
+    const std::string id = reply.json["data"]["taskid"].asString();
+    if (id.empty()) return reply.json["success"].asBool() ? "" : reply.body;
+    Json::Value data;
+    waitUntil("the end of " + id, [&] {
+        data = CgiReply(runCgi(PROGRAM_OPERATION, user, "GET", "action=status&taskid=" + id)).json["data"];
+        return data["finished"].asBool();
+    });
+    return data["errors"].empty() ? "" : data.toStyledString();
+}
+
+// What smbclient and the programs make looks alike.
+int compareModes(const Smbd& smbd, const std::string& root, const std::string& file) {
+    int cells = 0;
+    for (const ModeRow& row : kModeRows) {
+        for (const std::string user : {"alice", "bob"}) {
+            const std::string share = row.name, at = root + "/" + share + "/";
+            smbd.say(user, share,
+                     "put " + file + " s-" + user + "; mkdir sd-" + user + "; put " + file + " sd-" + user + "/f");
+            const std::string in = "/" + share + "/";
+            runCgi(PROGRAM_UPLOAD, user, "PUT", "path=" + percentEncode(in + "o-" + user), "x");
+            operate(user, "action=mkdir&path=" + percentEncode(in + "od-" + user));
+            runCgi(PROGRAM_UPLOAD, user, "PUT", "path=" + percentEncode(in + "od-" + user + "/f"), "x");
+            for (const std::string& name : {"-" + user, "d-" + user, "d-" + user + "/f"}) {
+                ++cells;
+                EXPECT_EQ(lookOf(at + "o" + name), lookOf(at + "s" + name)) << share << " " << user << " " << name;
+            }
+        }
+    }
+    return cells;
+}
+
+// Names that a share keeps out: never seen, opened or made, by any way.
+int compareVeto(const Smbd& smbd, const std::string& root, const std::string& file) {
+    const std::string at = root + "/vetoed/";
+    for (const char* name : {"x.no", "sub/y.NO", "sub/z", "dir.no/in"}) writeFile(at + name, name, 0666);
+    for (const char* folder : {"sub", "dir.no"}) chmod((at + folder).c_str(), 0777);
+    const std::string theirs = smbd.say("alice", "vetoed",
+                                        "ls; ls sub/*; get x.no /dev/null; get dir.no/in /dev/null; put " + file +
+                                            " new.no; mkdir made.no; rename sub/z z.no; del sub/y.NO");
+    for (const char* name : {"new.no", "made.no", "z.no"}) EXPECT_EQ(lookOf(at + name), "none") << theirs;
+    EXPECT_EQ(theirs.find("getting file"), std::string::npos) << theirs;
+    EXPECT_EQ(theirs.find("x.no  "), std::string::npos) << theirs;
+
+    const auto body = [](const char* program, const std::string& query) {
+        return runCgi(program, "alice", "GET", query);
+    };
+    const std::string top = body(PROGRAM_LIST, "action=folder&path=/vetoed"),
+                      sub = body(PROGRAM_LIST, "action=folder&path=/vetoed/sub");
+    for (const char* name : {"x.no", "f.txt", "dir.no", "y.NO"}) {
+        EXPECT_EQ((top + sub).find(name), std::string::npos) << name;
+    }
+    EXPECT_NE(sub.find("/vetoed/sub/z"), std::string::npos) << sub;
+    EXPECT_EQ(RawReply(body(PROGRAM_DOWNLOAD, "path=/vetoed/x.no")).status, 404);
+    EXPECT_EQ(RawReply(body(PROGRAM_DOWNLOAD, "path=/vetoed/dir.no/in")).status, 404);
+    EXPECT_EQ(body(PROGRAM_LIST, "action=folder&path=/vetoed/dir.no").find("/in"), std::string::npos);
+    const CgiReply put(runCgi(PROGRAM_UPLOAD, "alice", "PUT", "path=/vetoed/new.no", "x"));
+    EXPECT_FALSE(put.json["success"].asBool());
+    for (const char* form :
+         {"action=mkdir&path=/vetoed/made.no", "action=rename&path=/vetoed/sub/z&name=z.no",
+          "action=copy&path=/plain/c.no&target=/vetoed", "action=copy&path=/plain/tree&target=/vetoed",
+          "action=delete&permanent=true&path=/vetoed/sub"}) {
+        writeFile(root + "/plain/c.no", "", 0666);
+        writeFile(root + "/plain/tree/d.no", "", 0666);
+        EXPECT_NE(operate("alice", form), "") << form;
+    }
+    for (const char* name : {"new.no", "made.no", "z.no", "c.no", "tree/d.no"}) EXPECT_EQ(lookOf(at + name), "none");
+    EXPECT_NE(lookOf(at + "sub/y.NO"), "none") << "what is not shown is not removed";
+    // Searches, by a walk and by an index that was built before.
+    const std::string found = runProgram({ORVELCTL, "search", "/vetoed", "--user", "alice", "--name", "*"}).output;
+    EXPECT_EQ(found.find(".no"), std::string::npos) << found;
+    return 1;
+}
+
+// One bin: what either deletes the other finds.
+int compareBins(const Smbd& smbd, const std::string& root) {
+    const std::string at = root + "/bin/";
+    for (const char* name : {"a/one", "a/two"}) writeFile(at + name, name, 0666);
+    chmod((at + "a").c_str(), 0777);
+    smbd.say("alice", "bin", "del a/one");
+    EXPECT_EQ(operate("alice", "action=delete&path=/bin/a/two"), "");
+    for (const char* name : {"one", "two"}) EXPECT_EQ(readFile(at + ".bin/alice/a/" + name), std::string("a/") + name);
+    EXPECT_EQ(lookOf(at + "#recycle"), "none");
+    EXPECT_EQ(operate("alice", "action=restore&path=/bin/.bin/alice/a/one"), "");
+    EXPECT_EQ(readFile(at + "a/one"), "a/one");
+    return 1;
+}
+
 TEST_F(SambaOracle, NobodyMayMoreThanInSamba) {
-    SKIP_WITHOUT_ROOT();
-    ASSERT_EQ(access("/usr/sbin/smbd", X_OK) + access("/usr/bin/smbclient", X_OK), 0) << "script/packages names them";
-    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
-        const std::string root = shareRoot("photo"), file = systemRoot() + "/file";
-        Smbd smbd(systemRoot(), systemRoot() + "/etc/passwd", systemRoot() + "/etc/group");
-        writeRootFile("/etc/samba/smb.conf", smbd.global() + makeShares(root));
-        setSetting("share_definitions", "/etc/samba/smb.conf");
-        writeRootFile("/file", "x");
-        smbd.start();
+    const std::vector<std::string> users(std::begin(kUserNames), std::end(kUserNames));
+    serve(users, [](const Smbd& smbd, const std::string&, const std::string& file) {
         int cells = 0;
         for (const ShareRow& row : kShareRows) {
             if (::testing::Test::HasFatalFailure()) break;
@@ -231,9 +377,15 @@ TEST_F(SambaOracle, NobodyMayMoreThanInSamba) {
             EXPECT_EQ(anyLess, *row.narrower != '\0') << row.name << " is named as narrower without need";
         }
         std::cout << cells << " cells\n";
-        takeLog();
-        return 0;
-    }));
+    });
+}
+
+TEST_F(SambaOracle, FilesAreAsSambaMakesThem) {
+    serve({"alice", "bob"}, [](const Smbd& smbd, const std::string& root, const std::string& file) {
+        std::cout << compareModes(smbd, root, file) << " cells\n";
+        compareVeto(smbd, root, file);
+        compareBins(smbd, root);
+    });
 }
 
 }  // namespace

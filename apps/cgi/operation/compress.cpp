@@ -12,6 +12,7 @@
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 #include "text.h"
+#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
@@ -81,8 +82,9 @@ void addAll(const Job& job, ZipStream& zip, Watch& watch, Progress& progress) {
 // Gives the archive its name. 0 with the name, or a library code.
 int publish(const Job& job, NewFile& file, std::string& name) {
     const Owner owner = ownerFor(job.operation.user.name);
-    [[maybe_unused]] int ignored = fchown(file.get(), owner.uid, owner.gid);  // FAT keeps neither
-    ignored = fchmod(file.get(), 0644);
+    if (VEXOShareGiveNew(job.place.folder.get(), file.get(), 0666, 0, owner.uid, owner.gid) != 0) {
+        return OrvParseErrnoToError(errno, nullptr, nullptr);
+    }
     const std::string wanted = job.place.name;
     name = wanted;
     bool published = file.publish(name, job.conflict == Conflict::kOverwrite);

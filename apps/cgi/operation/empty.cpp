@@ -23,7 +23,7 @@ std::vector<Item> itemsIn(const RecycleBin& bin, const PathInfo& info, Progress&
     for (size_t i = 0; i < names.size(); ++i) {
         items[i].info = info;
         items[i].info.path = bin.sharePath() + "/" + names[i];
-        items[i].info.realPath = info.shareRoot + "/#recycle/" + names[i];
+        items[i].info.realPath = info.shareRoot + "/" + bin.name() + "/" + names[i];
         items[i].place.name = names[i];
     }
     return items;

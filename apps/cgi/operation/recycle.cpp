@@ -6,15 +6,17 @@
 #include <algorithm>
 #include <cctype>
 #include <cerrno>
+#include <climits>
 #include <string_view>
+#include <utility>
 
 #include "base/keep_errno.h"
 #include "orvel/error_state.h"
+#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
 
-constexpr const char* kBin = "#recycle";
 constexpr int kOpenFolder = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 constexpr int kMostNumbers = 9999;
 
@@ -73,6 +75,22 @@ Descriptor enter(const Descriptor& folder, const std::string& name, const Descri
     return Descriptor();
 }
 
+// As Samba's module makes them: the owner's alone. Our own bin is there where the administrator made it.
+Descriptor openBin(const Descriptor& root, std::string_view path) {
+    const bool make = path != "#recycle";
+    Descriptor folder(openat(root.get(), ".", kOpenFolder));
+    while (folder && !path.empty()) {
+        const std::string name(path.substr(0, path.find('/')));
+        path.remove_prefix(std::min(name.size() + 1, path.size()));
+        Descriptor next(openat(folder.get(), name.c_str(), kOpenFolder));
+        if (!next && errno == ENOENT && make && mkdirat(folder.get(), name.c_str(), 0700) == 0) {
+            next = Descriptor(openat(folder.get(), name.c_str(), kOpenFolder));
+        }
+        folder = std::move(next);
+    }
+    return folder;
+}
+
 // The components between the real path `top` and the item's own name.
 std::vector<std::string> foldersOf(const Item& item, const std::string& top) {
     std::vector<std::string> folders;
@@ -108,7 +126,12 @@ int RecycleBin::open(const PathInfo& info, std::optional<RecycleBin>& bin) {
     RecycleBin found;
     found.root_ = Descriptor(::open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
     if (!found.root_) return refusalCode(errno, info.shareRoot);
-    found.folder_ = Descriptor(openat(found.root_.get(), kBin, kOpenFolder));
+    char path[PATH_MAX];
+    if (VEXOShareRecyclePath(info.shareRoot.c_str(), path, sizeof path) != 0) {
+        return OrvParseErrnoToError(errno, nullptr, nullptr);
+    }
+    found.name_ = path;
+    found.folder_ = openBin(found.root_, found.name_);
     const bool none = !found.folder_ && (errno == ENOENT || errno == ENOTDIR || errno == ELOOP);
     if (!found.folder_) return none ? static_cast<int>(ORV_ERR_NONE) : refusalCode(errno, info.shareRoot);
     found.shareName_ = info.shareName;

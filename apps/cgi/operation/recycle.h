@@ -1,4 +1,5 @@
-// A share's recycle bin: the folder "#recycle" at its root, where that exists.
+// A share's recycle bin: the folder "#recycle" at its root, or the one of Samba's module where the share has that (then
+// it is made when something is deleted), where it exists.
 //
 // What is deleted goes below it to the path that it had in the share, so that it can be put back. Where that name is
 // taken in the bin it is marked, "name (#2).ext"; a name that would itself look marked is marked with 1. A folder above
@@ -38,12 +39,15 @@ class RecycleBin {
     void prune(const Item& item) const;
 
     [[nodiscard]] const Descriptor& folder() const { return folder_; }
+    // Its path below the share's root.
+    [[nodiscard]] const std::string& name() const { return name_; }
     // Its path as people know it.
-    [[nodiscard]] std::string sharePath() const { return "/" + shareName_ + "/#recycle"; }
+    [[nodiscard]] std::string sharePath() const { return "/" + shareName_ + "/" + name_; }
 
  private:
     Descriptor root_, folder_;                 // opened O_PATH
-    std::string shareName_, rootPath_, path_;  // real paths
+    std::string shareName_, name_;             // its path in the share
+    std::string rootPath_, path_;              // real paths
 };
 
 }  // namespace orvel::cgi

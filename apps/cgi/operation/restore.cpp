@@ -7,6 +7,7 @@
 #include "operation/transfer_job.h"
 #include "orvel/error_state.h"
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
@@ -19,6 +20,7 @@ int openOrigin(const User& user, const std::string& path, Conflict& conflict, Pa
     if (code != ORV_ERR_NONE) return code;
     // A name that was marked by hand may lead to any.
     const std::string name = info.path.substr(info.path.rfind('/') + 1);
+    VEXOShareNamesAt(info.realPath.c_str());
     if (VEXOEAIsHiddenFile(name.c_str()) != 0) return ORV_ERR_RESERVED_NAME;
     return openTarget(info, linkPolicyOf(info.shareName), user.name, Missing::kMake, place);
 }

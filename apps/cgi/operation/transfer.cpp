@@ -15,6 +15,7 @@
 #include "vexo/copy.h"
 #include "vexo/error.h"
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 #include "vexo/text.h"
 
 namespace orvel::cgi {
@@ -210,11 +211,10 @@ Transfer::Result Transfer::makeFolder(const Entry& from, const struct stat& stat
 }
 
 // What a new folder takes over from its source once it is filled.
-void Transfer::makeAlike(const Descriptor& folder, const struct stat& status) {
-    struct stat now {};
-    const mode_t group = fstat(folder.get(), &now) == 0 ? now.st_mode & S_ISGID : 0;
+void Transfer::makeAlike(const Entry& to, const Descriptor& folder, const struct stat& status) const {
     const std::array<timespec, 2> times = {status.st_atim, status.st_mtim};
-    [[maybe_unused]] const int ignored = fchmod(folder.get(), (status.st_mode & 0777) | group);  // FAT keeps none
+    VEXOShareGiveNew(to.folder, folder.get(), status.st_mode & 0777, VEXO_NEW_OWN_MODE, rules_.owner.uid,
+                     rules_.owner.gid);
     futimens(folder.get(), times.data());
 }
 
@@ -236,7 +236,7 @@ Transfer::Result Transfer::fill(const Entry& from, const struct stat& status, co
         [[maybe_unused]] const int ignored = fchown(target.get(), rules_.owner.uid, rules_.owner.gid);
     }
     const bool all = fillWhole(from, source, to, target);
-    if (made) makeAlike(target, status);
+    if (made) makeAlike(to, target, status);
     if (progress_.stopped()) return Result::kFailed;
     if (!all && rules_.move) {
         progress_.skipped();  // it stays, with what stayed in it
@@ -262,6 +262,7 @@ bool Transfer::fillFrom(const Entry& from, const Descriptor& source, const Entry
     std::vector<std::string> names;
     bool all = namesIn(source.get(), rules_.move ? Hidden::kInclude : Hidden::kLeaveOut, names);
     if (!all) failedWith(from, errno);
+    VEXOShareNamesOf(source.get());
     if (renaming_ && !hidden_) progress_.expect(std::count_if(names.begin(), names.end(), isShown), 0);
     Names taken;
     const bool hidden = hidden_;
@@ -274,7 +275,14 @@ bool Transfer::fillFrom(const Entry& from, const Descriptor& source, const Entry
         const Entry child = from.child(source.get(), name);
         Entry childTo = to.child(target.get(), name);
         struct stat status {};
+        VEXOShareNamesOf(source.get());
         hidden_ = hidden || !isShown(name);
+        VEXOShareNamesOf(target.get());
+        if (VEXOShareVetoes(name.c_str()) != 0) {
+            if (!hidden_) failed(child, ORV_ERR_RESERVED_NAME);
+            all = false;
+            continue;
+        }
         if (fstatat(child.folder, child.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
             failedWith(child, errno);
             all = false;
@@ -316,6 +324,7 @@ bool Transfer::removeCopied(const Entry& from, const Descriptor& source, const D
     const bool hidden = hidden_;
     bool all = safe.size() == copied.size();
     for (const Copied* one : safe) {
+        VEXOShareNamesOf(source.get());
         hidden_ = hidden || !isShown(one->name);
         const bool removed = removeSource(from.child(source.get(), one->name), one->status) == Result::kDone;
         if (removed) static_cast<void>(done());

@@ -65,7 +65,7 @@ class Transfer {
     Result arrived(const Entry& from, const struct stat& status, const Entry& to);
     bool removeCopied(const Entry& from, const Descriptor& source, const Descriptor& target);
     static bool isOnDisk(const Copied& copied, const Descriptor& target);
-    static void makeAlike(const Descriptor& folder, const struct stat& status);
+    void makeAlike(const Entry& to, const Descriptor& folder, const struct stat& status) const;
     Result removeSource(const Entry& from, const struct stat& status);
     Result failed(const Entry& entry, int code);
     Result failedWith(const Entry& entry, int error);

@@ -8,6 +8,7 @@
 #include "folder_names.h"
 #include "orvel/error_state.h"
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
@@ -44,15 +45,20 @@ bool emptyFolder(const Entry& entry, dev_t device, int depth, Progress& progress
     }
     if (!namesIn(folder.get(), Hidden::kInclude, names)) return failed(entry, progress, errno);
     bool all = true;
+    bool vetoed = false;
     for (const std::string& name : names) {
         if (progress.stopped()) return false;
-        if (VEXOEAIsHiddenFile(name.c_str()) != 0) {
+        VEXOShareNamesOf(folder.get());
+        if (VEXOShareVetoes(name.c_str()) != 0) {
+            vetoed = true;
+        } else if (VEXOEAIsHiddenFile(name.c_str()) != 0) {
             removeQuietly(folder.get(), name, device, depth);
         } else {
             all = removeIn(entry.child(folder.get(), name), device, depth + 1, progress) && all;
         }
     }
-    if (!all) progress.skipped();  // it stays, with what stayed in it
+    if (vetoed) return failed(entry, progress, ENOTEMPTY);  // what is kept out stays, and the folder with it
+    if (!all) progress.skipped();                           // it stays, with what stayed in it
     return all;
 }
 

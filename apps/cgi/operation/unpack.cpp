@@ -18,6 +18,7 @@
 #include "orvel/error_state.h"
 #include "vexo/filesystem.h"
 #include "vexo/settings.h"
+#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
@@ -194,6 +195,7 @@ int Unpacker::enter(const std::vector<std::string>& folders, Descriptor& folder)
     constexpr int flags = O_PATH | O_DIRECTORY;
     // The system's own folders are refused even if they exist.
     const auto isHidden = [](const std::string& name) { return VEXOEAIsHiddenFile(name.c_str()) != 0; };
+    VEXOShareNamesOf(target_.folder.get());
     if (std::any_of(folders.begin(), folders.end(), isHidden)) return ORV_ERR_RESERVED_NAME;
     folder = openBeneath(target_.folder, joined(folders), LinkPolicy::kNone, flags);
     if (folder) return ORV_ERR_NONE;
@@ -208,8 +210,10 @@ int Unpacker::enter(const std::vector<std::string>& folders, Descriptor& folder)
             if (exceeded_) return ORV_ERR_FILE_TOO_BIG;
             if (mkdirat(folder.get(), name.c_str(), 0755) != 0) return codeOf(errno);
             next = openBeneath(folder, name, LinkPolicy::kNone, flags);
-            [[maybe_unused]] const int ignored =
-                fchownat(next.get(), "", target_.owner.uid, target_.owner.gid, AT_EMPTY_PATH);  // FAT keeps none
+            if (next &&
+                VEXOShareGiveNew(folder.get(), next.get(), 0777, 0, target_.owner.uid, target_.owner.gid) != 0) {
+                return codeOf(errno);
+            }
         }
         if (!next) return refusalCode(errno, "");
         folder = std::move(next);
@@ -269,8 +273,10 @@ int Unpacker::makeFile(archive* source, Member& member) {
     const int code = fill(source, member, file.get());
     if (code != ORV_ERR_NONE) return code;
     // A file that its owner could not read or write would be of no use to him.
-    [[maybe_unused]] int ignored = fchown(file.get(), target_.owner.uid, target_.owner.gid);  // FAT keeps neither
-    ignored = fchmod(file.get(), (member.mode() & 0755) | 0600);
+    if (VEXOShareGiveNew(member.folder.get(), file.get(), (member.mode() & 0755) | 0600, VEXO_NEW_OWN_MODE,
+                         target_.owner.uid, target_.owner.gid) != 0) {
+        return codeOf(errno);
+    }
     const std::array<timespec, 2> when = {timespec{0, UTIME_NOW}, member.modified()};
     futimens(file.get(), when.data());
     struct stat made {};
@@ -367,7 +373,11 @@ void Unpacker::finishFolders() {
         const Descriptor opened =
             openBeneath(target_.folder, folder->path, LinkPolicy::kNone, O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
         if (!opened) continue;
-        [[maybe_unused]] const int ignored = fchmod(opened.get(), (folder->mode & 0755) | 0700);
+        const Descriptor above(openat(opened.get(), "..", O_PATH | O_DIRECTORY | O_CLOEXEC));
+        constexpr uid_t keep = static_cast<uid_t>(-1);
+        if (above) {
+            VEXOShareGiveNew(above.get(), opened.get(), (folder->mode & 0755) | 0700, VEXO_NEW_OWN_MODE, keep, keep);
+        }
         const std::array<timespec, 2> when = {timespec{0, UTIME_NOW}, folder->modified};
         futimens(opened.get(), when.data());
     }

@@ -46,7 +46,8 @@ ShareFiles filesOf(const SDK::Share& share, int* stop) {
 IndexWork::IndexWork(const SDK::Share& share, bool build) : share_(share.GetName()), builds_(build) {
     if (begin()) return;
     if (builds_ || VLIBCErrGet() != VEXO_ERR_GENERAL || errno == EBUSY) refuse(share_, platformReason());
-    printf("%s: its index is damaged or of another version, and is built anew\n", terminalText(share_).c_str());
+    printf("%s: its index is damaged, of another version or of other veto files, and is built anew\n",
+           terminalText(share_).c_str());
     builds_ = true;
     if (!begin()) refuse(share_, platformReason());
 }

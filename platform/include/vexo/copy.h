@@ -27,8 +27,8 @@ VEXO_BEGIN_C
 //
 // The target appears whole or not at all: the data goes to a file beside it, nameless or hidden (VEXOEAIsHiddenFile),
 // which takes its place in one step. What replaces a file is on the disk before that; whether the name is, the caller
-// sees to. A new file has the mode 0644, or what the folder's default ACL says (see KEEP_MODE, which does not bear on
-// TAKE); one that replaces another takes over that one's permissions (its ACL too), not its owner. Holes of the source
+// sees to. A new file gets what VEXOShareGiveNew gives (with KEEP_MODE, which does not bear on TAKE, the source's mode is
+// wanted), or what the folder's default ACL says; one that replaces another takes over that one's permissions (its ACL too), not its owner. Holes of the source
 // stay holes; data is shared with the source where the file system can. With TAKE, a source that the caller owns, that
 // has one name and lies on the target's file system is not copied but becomes the target, and its old name is gone; any
 // other source is copied and stays. A failure may leave a source that was to be taken with the target's owner and

@@ -41,7 +41,8 @@ VEXO_API void VEXOShareDBClose(PVEXOSHAREDB db);
 
 // 1 when the share is replicated to another appliance (option vexo:synced), else 0.
 VEXO_API int VEXOS2SIsSyncedShare(const char* name);
-// 1 when `realPath` is a share's root + "/#recycle", 0 when not, <0 on failure.
+// 1 when `realPath` is the recycle bin in a share's root, "#recycle" or what VEXOShareRecyclePath says (its first
+// component), 0 when not, <0 on failure.
 VEXO_API int VEXOShareIsShareRecycle(const char* realPath);
 
 // The privilege (0 none, 1 read, 2 read-write) of a domain or directory user on a share, from the share's lists and the

@@ -67,7 +67,9 @@ VEXO_API int VEXOGroupInfoGetgroupList(const char* user, PVLIBCSZLIST* gids, int
 VEXO_API int VEXOGroupIsAdminGroupMem(const char* user);
 VEXO_API int VEXOGroupIsAdminGroupMemEx(const char* user, int flags);
 
-// Nonzero when `user` is in the list: names, "@group", "+group", "&group" and "*" (everybody), compared without case.
+// Nonzero when `user` is in the list: names, "@group", "+group", "&group" and "*" (everybody). Names of users compare
+// without case; a group is the one that bears the name as it is spelled, and only where there is none, and the name is
+// one of a domain, does case not count.
 VEXO_API int BlSDKUserIsInList(const char* user, PVLIBCSZLIST list);
 
 // Exactly 1 when `user` may use the application `appId`, else 0: file /etc/vexo/applications, lines

@@ -18,6 +18,7 @@
 #include "io/file_io.h"
 #include "vexo/copy.h"
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 
 namespace {
 
@@ -90,11 +91,19 @@ bool keepsMode(const Copy& copy) {
     return (copy.options.switches & VEXO_COPY_KEEP_MODE) != 0 && !copy.exists;
 }
 
+// What a file that replaces none gets.
+bool giveNew(const Copy& copy, int file) {
+    const bool keeps = keepsMode(copy);
+    const mode_t mode = keeps ? copy.sourceStatus.st_mode & 0777 : kNewFile;
+    return VEXOShareGiveNew(copy.folder.get(), file, mode, keeps ? VEXO_NEW_OWN_MODE : 0, copy.options.uid,
+                            copy.options.gid) == 0;
+}
+
 bool create(const Copy& copy, orvel::NewFile& part) {
     // A part is closed to others until it has the permissions of another file.
     const vexo::Umask mask(kUmask);
     return part.create(copy.name, copy.exists || keepsMode(copy) ? 0600 : kNewFile) &&
-           vexo::setOwner(part.get(), copy.options.uid, copy.options.gid);
+           (!copy.exists || vexo::setOwner(part.get(), copy.options.uid, copy.options.gid));
 }
 
 // What a network file system could not write yet is reported when a descriptor closes.
@@ -113,7 +122,7 @@ bool fill(const Copy& copy, int part) {
     const struct stat& from = copy.sourceStatus;
     if (!vexo::copyData(copy.source.get(), part, from.st_size, options.isCancelled)) return false;
     if (copy.exists && !takeOverPermissions(copy, part)) return false;
-    if (keepsMode(copy) && !vexo::setMode(part, from.st_mode & 0777)) return false;
+    if (!copy.exists && !giveNew(copy, part)) return false;
     if ((options.switches & VEXO_COPY_KEEP_TIMES) != 0) {
         const std::array<timespec, 2> times = {from.st_atim, from.st_mtim};
         if (futimens(part, times.data()) != 0) return false;
@@ -166,8 +175,9 @@ void dropName(const char* source, const Copy& copy) {
 // Makes the source the target. False with errno; nothing has changed then but the source's owner and permissions.
 bool take(const char* source, const Copy& copy) {
     const int file = copy.source.get();
-    const bool permitted = copy.exists ? takeOverPermissions(copy, file) : vexo::setMode(file, kNewFile & ~kUmask);
-    if (!permitted || !vexo::setOwner(file, copy.options.uid, copy.options.gid)) return false;
+    if (!copy.exists && !giveNew(copy, file)) return false;
+    if (copy.exists && !takeOverPermissions(copy, file)) return false;
+    if (copy.exists && !vexo::setOwner(file, copy.options.uid, copy.options.gid)) return false;
     if (!isSynced(copy, file)) return false;
     if (copy.options.isCancelled != nullptr && copy.options.isCancelled() != 0) {
         errno = ECANCELED;

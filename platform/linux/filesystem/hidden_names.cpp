@@ -3,6 +3,7 @@
 
 #include "base/new_file.h"
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 
 static_assert(orvel::kPartPrefix == VEXO_PART_PREFIX);
 
@@ -14,5 +15,6 @@ int VEXOEAIsHiddenFile(const char* name) {
     if (name == nullptr) return 0;
     if (strcmp(name, ".") == 0 || strcmp(name, "..") == 0) return 1;
     if (orvel::isPartName(name)) return 1;
-    return VEXOEAIsHiddenDir(name) == 1 || strcmp(name, "@tmp") == 0 ? 1 : 0;
+    if (VEXOEAIsHiddenDir(name) == 1 || strcmp(name, "@tmp") == 0) return 1;
+    return VEXOShareVetoes(name);
 }

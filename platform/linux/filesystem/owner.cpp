@@ -1,11 +1,13 @@
 #include "filesystem/owner.h"
 
+#include <fcntl.h>
 #include <linux/magic.h>
 #include <sys/stat.h>
 #include <sys/vfs.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <string>
 
 namespace vexo {
 namespace {
@@ -40,11 +42,14 @@ bool forgiven(int fd, int result) {
 
 bool setOwner(int fd, uid_t uid, gid_t gid) {
     if (uid == static_cast<uid_t>(-1) && gid == static_cast<gid_t>(-1)) return true;
-    return forgiven(fd, fchown(fd, uid, gid));
+    return forgiven(fd, fchownat(fd, "", uid, gid, AT_EMPTY_PATH));
 }
 
 bool setMode(int fd, mode_t mode) {
-    return forgiven(fd, fchmod(fd, mode));
+    const int done = fchmod(fd, mode);
+    // Open for its path only.
+    const bool again = done != 0 && errno == EBADF;
+    return forgiven(fd, again ? chmod(("/proc/self/fd/" + std::to_string(fd)).c_str(), mode) : done);
 }
 
 }  // namespace vexo

@@ -38,7 +38,8 @@ constexpr std::string_view kNew = ".new";  // of an index while it is built
 struct Work {
     int mode;
     Descriptor lock;
-    Descriptor live;  // locked while the index is in step with the files
+    Descriptor live;   // locked while the index is in step with the files
+    std::string veto;  // what the share keeps out while it is listed
 };
 
 // Never destroyed: the locks go with the process.
@@ -91,10 +92,49 @@ bool indexExists(std::string_view share) {
     return lstat(indexPath(share).c_str(), &status) == 0 && isTrusted(status, S_IFREG);
 }
 
+// The names that the share keeps out are not in its index. What they were when it was built stands beside it: with
+// others the index would show what is kept out now.
+std::string vetoPath(std::string_view share) {
+    return storePath(share, ".veto");
+}
+
+std::string vetoOf(const ShareDefinition& share) {
+    std::string text;
+    for (const std::string& pattern : share.veto) text += pattern + "/";
+    return text;
+}
+
+// No share's: while the index and its note are replaced, neither may pass for the other's.
+constexpr const char* kNoVeto = "/";
+
+std::string vetoOf(const std::string& share) {
+    const auto shares = currentShares();
+    const ShareDefinition* definition = shares == nullptr ? nullptr : shares->find(share);
+    return definition == nullptr ? std::string() : vetoOf(*definition);
+}
+
+bool noteVeto(const std::string& share, const std::string& text) {
+    if (unlink(vetoPath(share).c_str()) != 0 && errno != ENOENT) return false;
+    if (text.empty()) return true;
+    const Descriptor file = openFile(vetoPath(share), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
+    return file && writeAll(file.get(), text);
+}
+
+bool isOfThisVeto(const std::string& share) {
+    std::string text;
+    FileVersion version;
+    constexpr size_t kMost = size_t{1} << 20;
+    if (!readRegularFile(vetoPath(share), kMost, text, version)) {
+        if (errno != ENOENT) return false;
+        text.clear();
+    }
+    return text == vetoOf(share);
+}
+
 bool begin(const std::string& share, int mode) {
     const orvel::RaisedIdentity raised;
     if (!makeStore()) return false;
-    Work work{mode, lockIndex(share), Descriptor()};
+    Work work{mode, lockIndex(share), Descriptor(), vetoOf(share)};
     if (!work.lock) return false;
     if (mode == FI_INDEX_BUILD) {
         if (!removeFile(newPath(share)) || !Database::create(newPath(share))) return false;
@@ -103,6 +143,10 @@ bool begin(const std::string& share, int mode) {
     } else {
         if (!indexExists(share)) {
             fail(VEXO_ERR_MISSING, ENOENT);
+            return false;
+        }
+        if (!isOfThisVeto(share)) {
+            fail(VEXO_ERR_GENERAL, ESTALE);
             return false;
         }
         if (Database::open(indexPath(share), {false, true}) == nullptr) return false;
@@ -146,7 +190,10 @@ bool replaceIndex(std::string_view share) {
 bool endBuild(const std::string& share, bool done) {
     const std::string path = newPath(share);
     const bool written = dismissDatabase(path);
-    if (done && written && complete(path) && replaceIndex(share)) return true;
+    if (done && written && complete(path) && noteVeto(share, kNoVeto) && replaceIndex(share) &&
+        noteVeto(share, works()[share].veto)) {
+        return true;
+    }
     const KeepErrno keep;
     return removeFile(path) && !done;
 }
@@ -270,6 +317,7 @@ int FILEIDXIsIndexEnable(const char* share) try {
     if (definition == nullptr || !definition->index) return 0;
     const vexo::KeepErrno keep;
     const orvel::RaisedIdentity raised;
+    if (!vexo::fileindex::isOfThisVeto(definition->name)) return 0;
     return static_cast<int>(vexo::fileindex::openIndex(definition->name) != nullptr);
 } catch (const std::exception&) {
     vexo::fail(VEXO_ERR_GENERAL, ENOMEM);

@@ -4,7 +4,6 @@
 #include <exception>
 #include <memory>
 #include <string>
-#include <string_view>
 
 #include "failure.h"
 #include "fault_gate.h"
@@ -15,12 +14,6 @@ struct VEXOSHAREDB {
     std::shared_ptr<const vexo::ShareTable> table;
     size_t next = 0;
 };
-
-namespace {
-
-constexpr std::string_view kRecycle = "/#recycle";
-
-}  // namespace
 
 int VEXOShareGet(const char* name, PVEXOSHARE* out) try {
     if (out != nullptr) *out = nullptr;
@@ -89,13 +82,9 @@ int VEXOS2SIsSyncedShare(const char* name) try {
 int VEXOShareIsShareRecycle(const char* realPath) try {
     VEXO_GATE("VEXOShareIsShareRecycle", -1);
     if (realPath == nullptr) return vexo::fail(VEXO_ERR_PARAMETER);
-    // A walk asks this for every entry: nearly all of them are decided by their name alone.
-    std::string_view path = realPath;
-    if (!path.ends_with(kRecycle)) return 0;
-    path.remove_suffix(kRecycle.size());
     const auto shares = vexo::currentShares();
     if (shares == nullptr) return vexo::fail(VEXO_ERR_GENERAL);
-    return static_cast<int>(shares->isRoot(std::string(path)));
+    return static_cast<int>(shares->isRecycle(realPath));
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

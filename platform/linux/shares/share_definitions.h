@@ -31,6 +31,14 @@ enum class ShareOption {
     synced,
     ftp,
     acl,
+    createMask,
+    forceCreateMode,
+    directoryMask,
+    forceDirectoryMode,
+    forceGroup,
+    inheritPermissions,
+    vetoFiles,
+    recycleRepository,
     ignore,
 };
 constexpr size_t kShareOptions = static_cast<size_t>(ShareOption::ignore) + 1;

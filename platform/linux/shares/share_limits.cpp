@@ -7,7 +7,6 @@
 
 #include "shares/definition_lines.h"
 #include "shares/share_definitions.h"
-#include "vexo/filesystem.h"
 
 namespace vexo {
 namespace {
@@ -21,28 +20,28 @@ constexpr std::string_view kHarmless =
     "administrativeshare adminusers afstokenlifetime afsusernamemap aiomaxthreads aioreadsize aiowritebehind "
     "aiowritesize algorithmicridbase allocationroundupsize allowdcerpcauthlevelconnect allowdnsupdates "
     "allowinsecurewidelinks allownt4crypto allowtrusteddomains allowunsafeclusterupgrade announceas announceversion "
-    "applygrouppolicies asyncdnstimeout asyncsmbechohandler autheventnotification authmethods autoservices binddnsdir "
-    "binddnsdirectory bindinterfacesonly blockinglocks blocksize browselist cachedirectory casesensitive casesignames "
-    "changenotify changesharecommand checkparentdirectorydeleteonclose checkpasswordscript cldapport "
+    "applygrouppolicies asyncdnstimeout asyncsmbechohandler autheventnotification authmethods autoservices "
+    "binddnsdir binddnsdirectory bindinterfacesonly blockinglocks blocksize browselist cachedirectory casesensitive "
+    "casesignames changenotify changesharecommand checkparentdirectorydeleteonclose checkpasswordscript cldapport "
     "clientipcmaxprotocol clientipcminprotocol clientipcsigning clientlanmanauth clientldapsaslwrapping "
     "clientmaxprotocol clientminprotocol clientntlmv2auth clientplaintextauth clientprotection clientschannel "
     "clientsigning clientsmb3encryptionalgorithms clientsmb3signingalgorithms clientsmbencrypt clientusekerberos "
-    "clientusespnego clientusespnegoprincipal clusteraddresses clustering comment createkrb5conf createmask "
-    "createmode cscpolicy ctdbdsocket ctdblocktimewarnthreshold ctdbtimeout cupsconnectiontimeout cupsencrypt "
-    "cupsoptions cupsserver dcerpcendpointservers deadtime debugclass debugencryption debughirestimestamp debuglevel "
-    "debugpid debugprefixtimestamp debugsyslogformat debugtimestamp debuguid dedicatedkeytabfile default defaultcase "
+    "clientusespnego clientusespnegoprincipal clusteraddresses clustering comment createkrb5conf cscpolicy "
+    "ctdbdsocket ctdblocktimewarnthreshold ctdbtimeout cupsconnectiontimeout cupsencrypt cupsoptions cupsserver "
+    "dcerpcendpointservers deadtime debugclass debugencryption debughirestimestamp debuglevel debugpid "
+    "debugprefixtimestamp debugsyslogformat debugtimestamp debuguid dedicatedkeytabfile default defaultcase "
     "defaultdevmode defaultservice defersharingviolations deletegroupscript deleteprintercommand deletereadonly "
     "deletesharecommand deleteuserfromgroupscript deleteuserscript deletevetofiles dfreecachetime dfreecommand "
-    "dgramport directorymask directorymode directorynamecachesize directorysecuritymask disablenetbios disablespoolss "
-    "dmapisupport dnsforwarder dnsport dnsproxy dnsupdatecommand dnszonescavenging dnszonetransferclientsallow "
-    "dnszonetransferclientsdeny domainlogons domainmaster doscharset dosfilemode dosfiletimeresolution dosfiletimes "
-    "dsdbeventnotification dsdbgroupchangenotification dsdbpasswordeventnotification durablehandles easupport "
-    "enableasusupport enablecorefiles enableprivileges enablespoolss encryptpasswords enhancedbrowsing "
-    "enumportscommand eventloglist exec fakedirectorycreatetimes fakeoplocks forcecreatemode forcedirectorymode "
-    "forcedirectorysecuritymode forcegroup forceprintername forcesecuritymode forceunknownacluser fstype "
-    "getquotacommand getwdcache gpoupdatecommand group guestaccount guestok hidedotfiles hidefiles hidespecialfiles "
-    "homedirmap honorchangenotifyprivilege hostmsdfs hostnamelookups idmapbackend idmapcachetime idmapdomains "
-    "idmapgid idmapnegativecachetime idmapuid includesystemkrb5conf inheritacls inheritowner inheritpermissions "
+    "dgramport directorynamecachesize directorysecuritymask disablenetbios disablespoolss dmapisupport dnsforwarder "
+    "dnsport dnsproxy dnsupdatecommand dnszonescavenging dnszonetransferclientsallow dnszonetransferclientsdeny "
+    "domainlogons domainmaster doscharset dosfilemode dosfiletimeresolution dosfiletimes dsdbeventnotification "
+    "dsdbgroupchangenotification dsdbpasswordeventnotification durablehandles easupport enableasusupport "
+    "enablecorefiles enableprivileges enablespoolss encryptpasswords enhancedbrowsing enumportscommand eventloglist "
+    "exec fakedirectorycreatetimes fakeoplocks forcedirectorysecuritymode forceprintername forcesecuritymode "
+    "forceunknownacluser fstype getquotacommand getwdcache gpoupdatecommand guestaccount guestok hidedotfiles "
+    "hidefiles hidespecialfiles homedirmap honorchangenotifyprivilege hostmsdfs hostnamelookups idmapbackend "
+    "idmapcachetime idmapdomains idmapgid idmapnegativecachetime idmapuid includesystemkrb5conf inheritacls "
+    "inheritowner "
     "initlogondelay initlogondelayedhosts interfaces iprintserver kdcdefaultdomainsupportedenctypes kdcenablefast "
     "kdcforceenablerc4weaksessionkeys kdcsupportedenctypes keepalive kerberosencryptiontypes kerberosmethod "
     "kernelchangenotify kerneloplocks kernelsharemodes kpasswdport krb5port lanmanauth largereadwrite ldapadmindn "
@@ -51,39 +50,40 @@ constexpr std::string_view kHarmless =
     "ldapmaxsearchrequestsize ldappagesize ldappasswdsync ldappasswordsync ldapreplicationsleep "
     "ldapserverrequirestrongauth ldapssl ldapsuffix ldaptimeout ldapuser ldapusersuffix level2oplocks lmannounce "
     "lminterval loadprinters localmaster lockdir lockdirectory locking lockspintime logfile logging loglevel "
-    "lognttokencommand logondrive logonhome logonpath logonscript logwriteablefilesonexit lppausecommand lpqcachetime "
-    "lpqcommand lpresumecommand lprmcommand lsaovernetlogon machinepasswordtimeout magicoutput magicscript "
-    "manglednames mangleprefix manglingchar manglingmethod mapaclinherit maparchive maphidden mapreadonly mapsystem "
-    "maptoguest maxconnections maxdisksize maxlogsize maxmux maxopenfiles maxprintjobs maxprotocol "
-    "maxreportedprintjobs maxsmbdprocesses maxstatcachesize maxttl maxwinbindchildren maxwinsttl maxxmit mdnsname "
-    "messagecommand mindomainuid minpasswordlength minprintspace minprotocol minreceivefilesize minwinsttl "
+    "lognttokencommand logondrive logonhome logonpath logonscript logwriteablefilesonexit lppausecommand "
+    "lpqcachetime lpqcommand lpresumecommand lprmcommand lsaovernetlogon machinepasswordtimeout magicoutput "
+    "magicscript manglednames mangleprefix manglingchar manglingmethod mapaclinherit maparchive maphidden "
+    "mapreadonly mapsystem maptoguest maxconnections maxdisksize maxlogsize maxmux maxopenfiles maxprintjobs "
+    "maxprotocol maxreportedprintjobs maxsmbdprocesses maxstatcachesize maxttl maxwinbindchildren maxwinsttl maxxmit "
+    "mdnsname messagecommand mindomainuid minpasswordlength minprintspace minprotocol minreceivefilesize minwinsttl "
     "mitkdccommand msdfsroot msdfsshufflereferrals multicastdnsregister namecachetimeout nameresolveorder "
     "nbtclientsocketaddress nbtport ncalrpcdir netbiosaliases netbiosname netbiosscope neutralizent4emulation "
     "nishomedir nmbdbindexplicitbroadcast nsupdatecommand ntaclsupport nthashstore ntlmauth ntpipesupport "
     "ntpsigndsocketdirectory ntstatussupport nullpasswords obeypamrestrictions oldpasswordallowedperiod "
     "oplockbreakwaittime oplockcontentionlimit oplocks os2drivermap oslevel pampasswordchange panicaction "
     "paranoidserversecurity passdbbackend passdbexpandexplicit passwdchat passwdchatdebug passwdchattimeout "
-    "passwdprogram passwordhashgpgkeyids passwordhashuserpasswordschemes passwordlevel passwordserver perfcountmodule "
-    "piddirectory posixlocking postexec preexec preferedmaster preferredmaster preforkbackoffincrement "
-    "preforkchildren preforkmaximumbackoff preload preloadmodules preservecase printcap printcapcachetime "
-    "printcapname printcommand printer printername printing printjobusername printnotifybackchannel privatedir "
-    "privatedirectory profileacls protocol public queuepausecommand queueresumecommand rawntlmv2auth readraw realm "
-    "registryshares rejectmd5clients rejectmd5servers remoteannounce remotebrowsesync renameuserscript "
-    "requirestrongkey resetonzerovc restrictanonymous rootpostexec rootpreexec rpcbigendian rpcserverdynamicportrange "
-    "rpcserverport rpcstartondemandhelpers sambakcccommand security securitymask servermaxprotocol serverminprotocol "
-    "servermultichannelsupport serverschannel serverschannelrequireseal serverservices serversigning "
-    "serversmb3encryptionalgorithms serversmb3signingalgorithms serverstring setprimarygroupscript setquotacommand "
-    "sharemodes shortpreservecase showaddprinterwizard shutdownscript smb1unixextensions "
-    "smb2disablelocksequencechecking smb2disableoplockbreakretry smb2leases smb2maxcredits smb2maxread smb2maxtrans "
-    "smb2maxwrite smbdasyncdosmode smbdforceprocesslocks smbdgetinfoasksharemode smbdmaxasyncdosmode smbdmaxxattrsize "
-    "smbdprofilinglevel smbdsearchasksharemode smbpasswdfile smbports socketaddress socketoptions spnupdatecommand "
-    "spotlight spotlightbackend statcache statedirectory storedosattributes strictallocate strictlocking strictrename "
+    "passwdprogram passwordhashgpgkeyids passwordhashuserpasswordschemes passwordlevel passwordserver "
+    "perfcountmodule piddirectory posixlocking postexec preexec preferedmaster preferredmaster "
+    "preforkbackoffincrement preforkchildren preforkmaximumbackoff preload preloadmodules preservecase printcap "
+    "printcapcachetime printcapname printcommand printer printername printing printjobusername "
+    "printnotifybackchannel privatedir privatedirectory profileacls protocol public queuepausecommand "
+    "queueresumecommand rawntlmv2auth readraw realm registryshares rejectmd5clients rejectmd5servers remoteannounce "
+    "remotebrowsesync renameuserscript requirestrongkey resetonzerovc restrictanonymous rootpostexec rootpreexec "
+    "rpcbigendian rpcserverdynamicportrange rpcserverport rpcstartondemandhelpers sambakcccommand security "
+    "securitymask servermaxprotocol serverminprotocol servermultichannelsupport serverschannel "
+    "serverschannelrequireseal serverservices serversigning serversmb3encryptionalgorithms "
+    "serversmb3signingalgorithms serverstring setprimarygroupscript setquotacommand sharemodes shortpreservecase "
+    "showaddprinterwizard shutdownscript smb1unixextensions smb2disablelocksequencechecking "
+    "smb2disableoplockbreakretry smb2leases smb2maxcredits smb2maxread smb2maxtrans smb2maxwrite smbdasyncdosmode "
+    "smbdforceprocesslocks smbdgetinfoasksharemode smbdmaxasyncdosmode smbdmaxxattrsize smbdprofilinglevel "
+    "smbdsearchasksharemode smbpasswdfile smbports socketaddress socketoptions spnupdatecommand spotlight "
+    "spotlightbackend statcache statedirectory storedosattributes strictallocate strictlocking strictrename "
     "strictsync svcctllist syncalways syslog syslogonly templatehomedir templateshell timeoffset timeserver "
     "timestamplogs tlscafile tlscertfile tlscrlfile tlsdhparamsfile tlsenabled tlskeyfile tlspriority tlsverifypeer "
     "unicode unixcharset unixextensions unixpasswordsync updateencrypted useclientdriver usemmap usernamelevel "
     "usernamemap usernamemapcachetime usernamemapscript usershareallowguests usersharemaxshares usershareowneronly "
-    "usersharepath usershareprefixallowlist usershareprefixdenylist usersharetemplateshare usesendfile usespnego utmp "
-    "utmpdirectory vetooplockfiles volume volumeserialnumber widelinks winbindcachetime winbinddebugtraceid "
+    "usersharepath usershareprefixallowlist usershareprefixdenylist usersharetemplateshare usesendfile usespnego "
+    "utmp utmpdirectory vetooplockfiles volume volumeserialnumber widelinks winbindcachetime winbinddebugtraceid "
     "winbinddsocketdirectory winbindenumgroups winbindenumusers winbindexpandgroups winbindgid winbindmaxclients "
     "winbindmaxdomainconnections winbindnestedgroups winbindnormalizenames winbindnssinfo winbindofflinelogon "
     "winbindreconnectdelay winbindrefreshtickets winbindrequesttimeout winbindrpconly winbindscantrusteddomains "
@@ -154,18 +154,6 @@ bool namesHosts(const std::string& text) {
     return isSet(text) && !is(text, {"all", "0.0.0.0/0"});
 }
 
-// Names that are never shown here need no veto.
-bool vetoesShown(const std::string& text) {
-    std::string_view rest = text;
-    while (!rest.empty()) {
-        const std::string name(rest.substr(0, rest.find('/')));
-        rest.remove_prefix(std::min(name.size() + 1, rest.size()));
-        const bool isBlank = name.find_first_not_of(' ') == std::string::npos;
-        if (!isBlank && VEXOEAIsHiddenFile(name.c_str()) != 1) return true;
-    }
-    return false;
-}
-
 bool loadsLimitingModule(const std::string& text) {
     const std::vector<std::string> modules = splitList(text);
     return std::any_of(modules.begin(), modules.end(), [](const std::string& module) {
@@ -208,7 +196,6 @@ constexpr Limit kLimits[] = {
     {"hide unreadable", saysYes, "names that a user cannot read would show"},
     {"hide unwriteable files", saysYes, "names that a user cannot write would show"},
     {"hide new files timeout", isNotZero, "new files would show at once"},
-    {"veto files", vetoesShown, "the names in it would show"},
     {"dont descend", isSet, "the folders in it would show what they hold"},
     {"follow symlinks", saysNo, "links inside the share are followed; the setting link_policy_... changes that"},
     {"preexec close", saysYes, "a program decides who may enter"},

@@ -20,6 +20,7 @@ constexpr std::string_view kEverybody = "*";
 // The first component of a path that means the user's own folder, so no share can be reached by it.
 constexpr std::string_view kReservedName = "home";
 constexpr std::string_view kHome = "%H";
+constexpr std::string_view kSambasBin = ".recycle";
 constexpr std::string_view kPathVariables = "SuUDgGH";
 constexpr size_t kMaxPairs = 4096;
 
@@ -77,6 +78,16 @@ class Values {
         const std::optional<unsigned> number = parseNumber(value.text, limit);
         if (!number) fault_ = "\"" + value.text + "\" is no number or too large";
         return number.value_or(0);
+    }
+    // The bits of a mode, in octal digits; nothing when there are none.
+    std::optional<unsigned> mode(ShareOption option) {
+        const std::string& text = section_.value(option).text;
+        if (text.empty()) return std::nullopt;
+        unsigned value = 0;
+        const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value, 8);
+        if (error == std::errc() && end == text.data() + text.size() && value <= 07777) return value;
+        fault_ = "\"" + text + "\" is no mode";
+        return std::nullopt;
     }
     [[nodiscard]] const OptionValue& value(ShareOption option) const { return section_.value(option); }
     [[nodiscard]] const std::string& fault() const { return fault_; }
@@ -216,6 +227,42 @@ void judgeHomes(Values& values, const Place& place, const std::vector<std::strin
                                 readOnly.stated ? readOnly.place : place});
 }
 
+// The entries stand between slashes; names that are never shown here need none.
+std::vector<std::string> vetoOf(std::string_view text) {
+    std::vector<std::string> patterns;
+    while (!text.empty()) {
+        const std::string_view name = text.substr(0, text.find('/'));
+        text.remove_prefix(std::min(name.size() + 1, text.size()));
+        if (!trimmed(name).empty() && name != "@tmp") patterns.emplace_back(name);
+    }
+    return patterns;
+}
+
+NewFiles newFilesOf(Values& values) {
+    NewFiles files;
+    files.createMask = values.mode(ShareOption::createMask);
+    files.directoryMask = values.mode(ShareOption::directoryMask);
+    files.forceCreateMode = values.mode(ShareOption::forceCreateMode).value_or(0);
+    files.forceDirectoryMode = values.mode(ShareOption::forceDirectoryMode).value_or(0);
+    files.inheritPermissions = values.boolean(ShareOption::inheritPermissions, false);
+    files.group = values.value(ShareOption::forceGroup).text;
+    return files;
+}
+
+// Where the share has Samba's module, as a path within the share.
+std::string recycleOf(const DefinitionSection& section) {
+    const auto objects = section.limits.find("vfsobjects");
+    if (objects == section.limits.end()) return {};
+    const std::vector<std::string> modules = splitList(objects->second.text);
+    const bool loaded = std::any_of(modules.begin(), modules.end(), [](const std::string& module) {
+        return std::string_view(module).substr(0, module.find(':')) == "recycle";
+    });
+    const OptionValue& repository = section.value(ShareOption::recycleRepository);
+    if (!loaded) return {};
+    const auto path = normalRoot("/" + (repository.stated ? repository.text : std::string(kSambasBin)));
+    return path ? path->substr(1) : std::string();
+}
+
 std::string offReason(const DefinitionSection& section, Values& values) {
     const std::string key = foldedName(section.name);
     if (!values.boolean(ShareOption::available, true)) return "available = no";
@@ -233,6 +280,8 @@ ShareDefinition takeOptions(Values& values, const DefinitionSection& section) {
     share.mask = values.number(ShareOption::restriction, UINT_MAX);
     share.ftp = static_cast<int>(values.number(ShareOption::ftp, INT_MAX));
     share.acl = values.boolean(ShareOption::acl, false);
+    share.newFiles = newFilesOf(values);
+    share.recycle = recycleOf(section);
     share.synced = values.boolean(ShareOption::synced, false);
     // One index cannot be of as many folders as there are users.
     share.index = values.boolean(ShareOption::index, false) && !hasVariables(share.path);
@@ -257,6 +306,11 @@ ShareReading readShare(const DefinitionSection& section, const LimitValues& glob
     std::move(lists.closings.begin(), lists.closings.end(), std::back_inserter(reading.closings));
     const bool ownHomes = isHomesName(section.name) && hasVariables(share.path);
     if (ownHomes) judgeHomes(values, section.place, ignored, reading);
+    const OptionValue& veto = section.value(ShareOption::vetoFiles);
+    if (std::find(ignored.begin(), ignored.end(), "vetofiles") == ignored.end()) share.veto = vetoOf(veto.text);
+    if (const auto variable = unknownVariable(veto.text, ""); variable && !share.veto.empty()) {
+        reading.closings.push_back({"veto files", veto.text, *variable + " stands for nothing here", veto.place});
+    }
     const OptionValue& path = section.value(ShareOption::path);
     if (const auto variable = unknownVariable(share.path, kPathVariables)) {
         reading.closings.push_back({"path", path.text, *variable + " stands for nothing here", path.place});

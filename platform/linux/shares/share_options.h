@@ -11,6 +11,15 @@
 
 namespace vexo {
 
+// What new files and folders of a share get. A mask that is not stated is Samba's own.
+struct NewFiles {
+    std::optional<unsigned> createMask, directoryMask;
+    unsigned forceCreateMode = 0;
+    unsigned forceDirectoryMode = 0;
+    bool inheritPermissions = false;
+    std::string group;  // "" for none; behind "+" for its members alone
+};
+
 struct ShareDefinition {
     std::string name;
     std::string path;     // absolute, possibly with variables
@@ -23,6 +32,9 @@ struct ShareDefinition {
     std::vector<std::string> noAccess;
     std::vector<std::string> readWrite;
     std::vector<std::string> readOnly;
+    NewFiles newFiles;
+    std::vector<std::string> veto;  // patterns of names that it keeps out
+    std::string recycle;            // where Samba's recycle bin lies in it, possibly with variables; "" without one
 };
 
 struct ShareReading {

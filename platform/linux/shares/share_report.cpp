@@ -24,10 +24,8 @@ class Reporter {
                                  : reading.share ? reading.share->path
                                                  : stated;
         if (reading.share) {
-            const auto veto = section.limits.find("vetofiles");
-            const bool vetoes = veto != section.limits.end();
             give(reading.isHomes ? VEXO_NOTE_HOMES : VEXO_NOTE_SHARE, section.place, path,
-                 {.share = section.name, .option = "veto files", .text = vetoes ? veto->second.text : ""});
+                 {.share = section.name, .option = "veto files", .text = section.value(ShareOption::vetoFiles).text});
         } else if (!reading.off.empty()) {
             give(VEXO_NOTE_OFF, section.place, path, {.share = section.name, .why = reading.off});
         } else if (!reading.fault.empty()) {
@@ -75,6 +73,10 @@ int VEXOShareReport(char* file, int size, void (*take)(const VEXOSHARENOTE*, voi
     if (report.error != 0) return vexo::fail(VEXO_ERR_GENERAL, report.error);
     vexo::Reporter reporter(report, take, argument);
     for (const vexo::Problem& problem : report.definitions.problems) reporter.problem(problem);
+    // Also where no section stands below it: the shares are elsewhere then.
+    for (const vexo::Closing& closing : vexo::closingsOf({}, report.definitions.global, {})) {
+        reporter.problem({closing.option + " = " + closing.text + ": " + closing.why, closing.place});
+    }
     for (size_t i = 0; i < report.readings.size(); ++i) {
         reporter.section(report.definitions.sections[i], report.readings[i]);
     }

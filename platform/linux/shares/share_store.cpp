@@ -23,6 +23,7 @@ namespace {
 constexpr const char* kSource = "share_store";
 constexpr const char* kDefinitions = "/etc/vexo/shares.conf";
 constexpr size_t kMaxFile = size_t{1} << 20;
+constexpr const char* kRecycle = "#recycle";
 
 // What distinguishes one state of a file from another.
 struct Stamp {
@@ -152,12 +153,8 @@ PathVariables variablesOf(const Account& account, const std::string& share) {
 }
 
 PathVariables variablesFor(const std::string& share) {
-    const char* remote = secure_getenv("REMOTE_USER");
-    AccountSource& accounts = AccountSource::instance();
     Account account;
-    const bool named = remote != nullptr && *remote != '\0';
-    const Lookup found = named ? accounts.user(remote, account) : accounts.user(geteuid(), account);
-    if (found == Lookup::found) return variablesOf(account, share);
+    if (requestAccount(account) == Lookup::found) return variablesOf(account, share);
     PathVariables variables;
     variables.share = share;
     return variables;
@@ -179,7 +176,10 @@ ShareTable::ShareTable(std::vector<ShareDefinition> shares, std::optional<ShareD
         } else {
             byRoot_.emplace(shares_[i].path, i);
         }
+        vetoes_ = vetoes_ || !shares_[i].veto.empty();
+        recycles_ = recycles_ || !shares_[i].recycle.empty();
     }
+    vetoes_ = vetoes_ || (homes_ && !homes_->veto.empty());
 }
 
 const ShareDefinition* ShareTable::find(std::string_view name) const {
@@ -193,6 +193,56 @@ bool ShareTable::isRoot(const std::string& path) const {
         if (rootOf(shares_[i]) == path) return true;
     }
     return false;
+}
+
+std::vector<const ShareDefinition*> ShareTable::holding(const std::string& path) const {
+    std::vector<std::pair<std::string, const ShareDefinition*>> found;
+    for (size_t end = path.size(); end != 0 && end != std::string::npos; end = path.rfind('/', end - 1)) {
+        const std::string root = path.substr(0, end);
+        std::vector<size_t> same;
+        for (auto [at, last] = byRoot_.equal_range(root); at != last; ++at) same.push_back(at->second);
+        std::sort(same.begin(), same.end());
+        for (const size_t i : same) found.emplace_back(root, &shares_[i]);
+    }
+    const auto add = [&](const ShareDefinition& share, const std::optional<std::string>& root) {
+        if (root && path.starts_with(*root) && (path.size() == root->size() || path[root->size()] == '/')) {
+            found.emplace_back(*root, &share);
+        }
+    };
+    for (const size_t i : withVariables_) add(shares_[i], rootOf(shares_[i]));
+    Account account;
+    if (homes_ && requestAccount(account) == Lookup::found) add(*homes_, homeIn(*homes_, account));
+    std::stable_sort(found.begin(), found.end(),
+                     [](const auto& a, const auto& b) { return a.first.size() > b.first.size(); });
+    std::vector<const ShareDefinition*> shares;
+    for (const auto& [root, share] : found) shares.push_back(share);
+    return shares;
+}
+
+std::string ShareTable::recycleIn(const std::string& root) const {
+    const std::vector<const ShareDefinition*> shares = holding(root);
+    if (shares.empty() || shares.front()->recycle.empty()) return kRecycle;
+    const auto path = replaceVariables(shares.front()->recycle, variablesFor(shares.front()->name));
+    return path.value_or(kRecycle);
+}
+
+bool ShareTable::isRecycle(const std::string& path) const {
+    const size_t slash = path.rfind('/');
+    // A walk asks this for every entry: nearly all of them are decided by their name alone.
+    if (slash == std::string::npos || (!recycles_ && path.compare(slash + 1, std::string::npos, kRecycle) != 0)) {
+        return false;
+    }
+    const std::string root = path.substr(0, slash);
+    if (!isRoot(root)) return false;
+    const std::string bin = recycleIn(root);
+    return bin.compare(0, bin.find('/'), path, slash + 1, std::string::npos) == 0;
+}
+
+Lookup requestAccount(Account& account) {
+    const char* remote = secure_getenv("REMOTE_USER");
+    AccountSource& accounts = AccountSource::instance();
+    const bool named = remote != nullptr && *remote != '\0';
+    return named ? accounts.user(remote, account) : accounts.user(geteuid(), account);
 }
 
 std::shared_ptr<const ShareTable> currentShares() {

@@ -23,13 +23,23 @@ class ShareTable {
     [[nodiscard]] const ShareDefinition* homes() const { return homes_ ? &*homes_ : nullptr; }
     // True when `path` is the root of a share for the user of this request.
     [[nodiscard]] bool isRoot(const std::string& path) const;
+    // The shares, and the homes, that the real path `path` lies in for the user of this request, the innermost first.
+    [[nodiscard]] std::vector<const ShareDefinition*> holding(const std::string& path) const;
+    // Whether any share keeps names out.
+    [[nodiscard]] bool vetoes() const { return vetoes_; }
+    // The path of the recycle bin in the share of this root, for the user of this request.
+    [[nodiscard]] std::string recycleIn(const std::string& root) const;
+    // Whether `path` is the recycle bin of a share, or the folder of the share that holds it.
+    [[nodiscard]] bool isRecycle(const std::string& path) const;
 
  private:
     std::vector<ShareDefinition> shares_;  // in the order of the definitions
     std::optional<ShareDefinition> homes_;
     std::unordered_map<std::string, size_t> byName_;
-    std::unordered_map<std::string, size_t> byRoot_;  // those whose root is the same for every user
+    std::unordered_multimap<std::string, size_t> byRoot_;  // those whose root is the same for every user
     std::vector<size_t> withVariables_;
+    bool vetoes_ = false;
+    bool recycles_ = false;  // any share has a bin of its own name
 };
 
 // The definitions as they are now; null with errno when they, or the settings that say where they are, cannot be read.
@@ -42,6 +52,9 @@ class ShareTable {
 
 // The root of a share for one account.
 [[nodiscard]] std::optional<std::string> rootFor(const ShareDefinition& share, const Account& account);
+
+// The account of the user of this request.
+[[nodiscard]] Lookup requestAccount(Account& account);
 
 // The home of `account` where homes are in no share; nothing when there is none for this account.
 [[nodiscard]] std::optional<std::string> homeIn(const ShareDefinition& homes, const Account& account);

@@ -1,0 +1,32 @@
+// The files of a share as smb.conf wants them: which names it keeps out, what new ones get, where its recycle bin is.
+#ifndef VEXO_SHARE_FILES_H
+#define VEXO_SHARE_FILES_H
+
+#include <sys/types.h>
+
+#include "vexo/export.h"
+
+VEXO_BEGIN_C
+// Says in which folder, open (O_PATH will do) or by its real path, the names lie that VEXOEAIsHiddenFile is asked about
+// next: it hides the veto files of every share that this folder lies in, too. Costs nothing where no share has any.
+VEXO_API void VEXOShareNamesOf(int folder);
+VEXO_API void VEXOShareNamesAt(const char* realPath);
+// 1 for a name that the share keeps out there, 0 for one that is hidden for another reason or not at all.
+VEXO_API int VEXOShareVetoes(const char* name);
+
+enum {
+    VEXO_NEW_OWN_MODE = 0x1,  // the mode is that of something else, so that only what the share states changes it
+};
+// Gives `made`, a file or folder that this process just made in the open folder `folder`, its owner, group and mode, as
+// the innermost share that holds the folder says (create mask and directory mask, their force modes, force group,
+// inherit permissions; a folder's default ACL and set-group bit before them). Either may be open for its
+// path only. `mode`: what is wanted; new things of an unnamed share get 0644 and 0755 at most. `uid`, `gid`: -1 keeps
+// them. File systems without owners and modes are none of a failure. 0, or -1 with errno and the slot.
+VEXO_API int VEXOShareGiveNew(int folder, int made, mode_t mode, unsigned switches, uid_t uid, gid_t gid);
+
+// The path of the recycle bin within the share whose root is `root`: "#recycle", or where the share has Samba's module
+// of that name what recycle:repository says for the user of this request. 0, or -1 with errno and the slot.
+VEXO_API int VEXOShareRecyclePath(const char* root, char* path, int size);
+VEXO_END_C
+
+#endif
