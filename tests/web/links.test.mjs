@@ -58,7 +58,7 @@ test("a folder with a password, opened elsewhere, then revoked", () =>
         [],
       );
     });
-    await page.click("#settings-button");
+    await page.click("#account-button");
     await page.click(".menu >> text=My public links");
     await page.waitForSelector(".link-list >> text=with password");
     await page.click(".link-list [aria-label=Revoke]");

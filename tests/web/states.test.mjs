@@ -52,6 +52,8 @@ async function visitStates(page) {
   }
   await page.click("#settings-button");
   await accessible(page, "settings", ".menu");
+  await press("Escape");
+  await page.click("#account-button");
   await page.click(".menu >> text=/public links|Öffentliche/");
   await accessible(page, "links", ".dialog");
   await press("Escape");

@@ -83,7 +83,9 @@ class LogIn {
     const text = this.answer.value;
     this.busy(true);
     try {
-      const reply = await say(this.asked ? { action: "answer", text } : { action: "begin", user: this.name.value, password: text });
+      // Whoever leaves the password empty is asked by the machine itself, in its own words.
+      const begin = { action: "begin", user: this.name.value, password: text || undefined };
+      const reply = await say(this.asked ? { action: "answer", text } : begin);
       this.said.textContent = "";
       if (reply.step === "done") this.onDone(reply.user);
       else this.ask(reply);

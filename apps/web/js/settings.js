@@ -1,6 +1,6 @@
 // Choices: light or dark, language; and the list of shortcuts.
 
-import { addCommand, allCommands, keysOf, runCommand, shortcutText } from "./commands.js";
+import { addCommand, allCommands, keysOf, shortcutText } from "./commands.js";
 import { dialog } from "./dialogs.js";
 import { $, h } from "./dom.js";
 import { openMenu } from "./menu.js";
@@ -54,7 +54,6 @@ export function setupSettings() {
           run: () => changeLanguage(tag),
         })),
         "-",
-        { label: t("command.links"), icon: "link", run: () => runCommand("links") },
         { label: t("command.help"), icon: "help", shortcut: "?", run: showHelp },
       ],
       { anchor: button },
