@@ -93,8 +93,10 @@ def send(program, method, parameters, user, body=None, headers=None):
         return error.code, error.headers, error.read()
 
 
-def ask(program, method="GET", user="alice", status=200, success=True, body=None, headers=None, whole=True, **parameters):
-    """Sends a request that the description allows (unless not `whole`), and holds the reply against it."""
+def ask(program, method="GET", user="alice", status=200, success=True, body=None, headers=None, whole=True, who=None, **parameters):
+    """Sends a request that the description allows (unless not `whole`), and holds the reply against it. `user` asks; `who`
+    is the parameter `user` of a log-in."""
+    parameters |= {"user": who} if who else {}
     what = f"{method} {program} {parameters}"
     schema = schemaOf(program, parameters)
     if schema is None:
@@ -340,13 +342,13 @@ def links():
 def logIns():
     word = os.environ["ORVEL_TEST_ALICE"]
     ask("login", user="bob")
-    ask("login", "POST", action="begin", user="alice", password=word)
+    ask("login", "POST", action="begin", who="alice", password=word)
     cookie = send("login", "POST", {"action": "begin", "user": "alice"}, "alice")[1]["Set-Cookie"].split(";")[0]
     ask("login", "POST", action="answer", text=word, headers={"Cookie": cookie})
-    ask("login", "POST", action="begin", user="alice")
+    ask("login", "POST", action="begin", who="alice")
     ask("login", "POST", action="cancel")
     ask("login", "POST", action="answer", text="x", status=403, success=False)
-    ask("login", "POST", action="begin", user="nobody-here", password="x", status=403, success=False)
+    ask("login", "POST", action="begin", who="nobody-here", password="x", status=403, success=False)
     ask("sessions")
     ask("logout", "POST", scope="others")
     ask("logout", "POST")
