@@ -149,7 +149,8 @@ while read -r address; do
     cat "$work/part" >>"$work/parts"
 done <"$work/named"
 expect "German" 1 "$(grep -c 'Größe' "$work/parts")"
-expect "the view" 1 "$(grep -c 'function askPassword' "$work/parts")"
+view=$(grep -oE 'import\(g_Tunnel \+ "[^"]*"' "$work/parts" | cut -d'"' -f2)
+expect "the view" 1 "$(curl -s "$site$view" | grep -c 'export function start')"
 for address in / /cgi-bin/list /cgi-bin/link /visitor/../index.html /visitor/..%2fcgi-bin/list /cgi-bin/share/../list; do
     expect "$address" 401 "$(curl -s --path-as-is -o /dev/null -w '%{http_code}' "$site$address")"
 done

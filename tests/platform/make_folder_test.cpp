@@ -123,7 +123,7 @@ TEST_F(MakeFolderTest, FirstRequestsAtOnceAllFindTheirHome) {
 TEST_F(MakeFolderTest, WhatAKilledProcessLeftIsEndedByTheNext) {
     SKIP_WITHOUT_ROOT();
     const std::string homes = shareRoot("homes"), home = homes + "/@CORP/eve";
-    for (const long call : {SYS_flock, SYS_newfstatat, SYS_getdents64, SYS_fchown, SYS_fchmod, SYS_renameat2}) {
+    for (const long call : {SYS_flock, SYS_newfstatat, SYS_getdents64, SYS_fchownat, SYS_fchmod, SYS_renameat2}) {
         SCOPED_TRACE(call);
         fs::remove_all(homes + "/@CORP");
         makeFolder(homes + "/@CORP");

@@ -67,13 +67,16 @@ void lookAt(const std::string& folder, std::shared_ptr<const ShareTable> table) 
     now.texts = std::move(texts);
 }
 
-// Null where no share vetoes anything.
+// Null where no share vetoes anything. While the definitions cannot be read, those last known count.
 std::shared_ptr<const ShareTable> vetoingShares() {
     const KeepErrno keep;
     const int code = VLIBCErrGet();
     auto table = currentShares();
-    if (table == nullptr) VLIBCErrSetEx(code, __FILE__, __LINE__);
-    const bool vetoes = table != nullptr && table->vetoes();
+    if (table == nullptr) {
+        VLIBCErrSetEx(code, __FILE__, __LINE__);
+        return veto().table;
+    }
+    const bool vetoes = table->vetoes();
     if (!vetoes && !veto().patterns.empty()) veto() = {};
     return vetoes ? table : nullptr;
 }

@@ -156,9 +156,11 @@ int VEXOAutoBlockWait(const char* address) try {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }
 
-int VexoCgiIsDeniedIP(const char* address) {
+int VexoCgiIsDeniedIP(const char* address) try {
     VEXO_GATE("VexoCgiIsDeniedIP", -1);
     return std::min(VEXOAutoBlockWait(address), 1);
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }
 
 int VEXOAutoBlockResetByIP(const char* address) try {
