@@ -162,7 +162,8 @@ TEST_F(RootsCgi, TheDoctorNamesTheLine) {
     EXPECT_EQ(ask("p", 1), "note|17|[p] is not a share here: a printer|\n");
     EXPECT_NE(ask("", 1).find("problem|3|neither a section nor an option"), std::string::npos);
     writeRootFile(conf, "[global]\nconfig backend = registry\n");
-    EXPECT_NE(ask("", 1).find("problem|2|config backend = registry: Samba reads its shares elsewhere"), std::string::npos);
+    EXPECT_NE(ask("", 1).find("problem|2|config backend = registry: Samba reads its shares elsewhere"),
+              std::string::npos);
 }
 
 TEST_F(RootsCgi, VolumesHaveTheirTemporaryFolders) {

@@ -45,9 +45,9 @@ class RecycleBin {
     [[nodiscard]] std::string sharePath() const { return "/" + shareName_ + "/" + name_; }
 
  private:
-    Descriptor root_, folder_;                 // opened O_PATH
-    std::string shareName_, name_;             // its path in the share
-    std::string rootPath_, path_;              // real paths
+    Descriptor root_, folder_;      // opened O_PATH
+    std::string shareName_, name_;  // its path in the share
+    std::string rootPath_, path_;   // real paths
 };
 
 }  // namespace orvel::cgi

@@ -206,12 +206,12 @@ bool setDescriptors(int input, int output) {
     char* environment[] = {blocked, threads, arenas, locale, home, nullptr};
     sigset_t none;
     sigemptyset(&none);
-    const bool confined =
-        prctl(PR_SET_PDEATHSIG, SIGKILL) == 0 && sigprocmask(SIG_SETMASK, &none, nullptr) == 0 &&
-        std::signal(SIGPIPE, SIG_DFL) != SIG_ERR && chdir("/") == 0 && setDescriptors(input, output) &&
-        giveUpIdentity() && prctl(PR_SET_PDEATHSIG, SIGKILL) == 0 &&  // a change of identity took it away
-        prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0 && confineFiles() && confineCalls() &&
-        setLimits(limits);  // last: this process may have more memory already
+    const bool confined = prctl(PR_SET_PDEATHSIG, SIGKILL) == 0 && sigprocmask(SIG_SETMASK, &none, nullptr) == 0 &&
+                          std::signal(SIGPIPE, SIG_DFL) != SIG_ERR && chdir("/") == 0 &&
+                          setDescriptors(input, output) && giveUpIdentity() &&
+                          prctl(PR_SET_PDEATHSIG, SIGKILL) == 0 &&  // a change of identity took it away
+                          prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0 && confineFiles() && confineCalls() &&
+                          setLimits(limits);  // last: this process may have more memory already
     if (!confined) _exit(kNotConfined);
     execve(words[0], words.data(), environment);
     _exit(kNotStarted);

@@ -27,12 +27,12 @@ VEXO_BEGIN_C
 //
 // The target appears whole or not at all: the data goes to a file beside it, nameless or hidden (VEXOEAIsHiddenFile),
 // which takes its place in one step. What replaces a file is on the disk before that; whether the name is, the caller
-// sees to. A new file gets what VEXOShareGiveNew gives (with KEEP_MODE, which does not bear on TAKE, the source's mode is
-// wanted), or what the folder's default ACL says; one that replaces another takes over that one's permissions (its ACL too), not its owner. Holes of the source
-// stay holes; data is shared with the source where the file system can. With TAKE, a source that the caller owns, that
-// has one name and lies on the target's file system is not copied but becomes the target, and its old name is gone; any
-// other source is copied and stays. A failure may leave a source that was to be taken with the target's owner and
-// permissions.
+// sees to. A new file gets what VEXOShareGiveNew gives (with KEEP_MODE, which does not bear on TAKE, the source's mode
+// is wanted), or what the folder's default ACL says; one that replaces another takes over that one's permissions (its
+// ACL too), not its owner. Holes of the source stay holes; data is shared with the source where the file system can.
+// With TAKE, a source that the caller owns, that has one name and lies on the target's file system is not copied but
+// becomes the target, and its old name is gone; any other source is copied and stays. A failure may leave a source that
+// was to be taken with the target's owner and permissions.
 //
 // 0, or -1 with errno and the slot, the target as it was and nothing beside it: 0x0600 the source or the target's
 // folder is missing, 0x0700 a path is no path of a file (the source is a folder, link, pipe...; the target has no
