@@ -34,13 +34,13 @@ char lower(char c) {
 // 1 and up; 0 for what is no printable ASCII.
 std::array<char, 128> makeRanks() {
     std::array<char, 128> ranks{};
-    for (size_t i = 0; i < kPunctuation.size(); ++i)
-        ranks[static_cast<size_t>(kPunctuation[i])] = static_cast<char>(i + 1);
+    const auto rank = [&ranks](char c) -> char& { return ranks[static_cast<unsigned char>(c)]; };
+    for (size_t i = 0; i < kPunctuation.size(); ++i) rank(kPunctuation[i]) = static_cast<char>(i + 1);
     for (char c = 'a'; c <= 'z'; ++c) {
-        ranks[static_cast<size_t>(c)] = static_cast<char>(kLetterRank + (c - 'a'));
-        ranks[static_cast<size_t>(c - 'a' + 'A')] = ranks[static_cast<size_t>(c)];
+        rank(c) = static_cast<char>(kLetterRank + (c - 'a'));
+        rank(static_cast<char>(c - 'a' + 'A')) = rank(c);
     }
-    for (char c = '0'; c <= '9'; ++c) ranks[static_cast<size_t>(c)] = kDigitRank;
+    for (char c = '0'; c <= '9'; ++c) rank(c) = kDigitRank;
     return ranks;
 }
 

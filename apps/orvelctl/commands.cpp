@@ -184,7 +184,7 @@ bool takes(const Option& option, std::string_view form) {
 std::string takeForm(std::string_view command, std::vector<std::string>& words) {
     std::string known;
     for (const Form& form : findCommand(command)->forms) {
-        const std::string name = nameOf(form);
+        std::string name = nameOf(form);
         if (!words.empty() && words.front() == name) {
             words.erase(words.begin());
             return name;

@@ -160,7 +160,7 @@ void forEachFolder(const Sweep& sweep, const std::string& name, Part& part, Each
         const Descriptor folder = openBeneath(top, name, LinkPolicy::kNone, O_RDONLY | O_DIRECTORY);
         std::vector<std::string> names;
         if (!folder || !cgi::namesIn(folder.get(), cgi::Hidden::kInclude, names)) {
-            addError(part, volume + "/" + name, errno);
+            addError(part, std::string(volume).append("/").append(name), errno);
             continue;
         }
         for (const std::string& one : names) {

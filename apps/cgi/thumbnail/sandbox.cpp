@@ -139,10 +139,11 @@ bool confineCalls() {
         if (!allow(seccomp, filter, name)) return false;
     }
     // Threads, but no processes; the C library falls back to clone() where clone3() is not there.
-    const scmp_arg_cmp thread = SCMP_A0_64(SCMP_CMP_MASKED_EQ, CLONE_THREAD, CLONE_THREAD);
-    const scmp_arg_cmp named = SCMP_A0_64(SCMP_CMP_EQ, PR_SET_NAME);
-    return seccomp.add(filter, SCMP_ACT_ALLOW, SCMP_SYS(clone), 1, &thread) == 0 &&
-           seccomp.add(filter, SCMP_ACT_ALLOW, SCMP_SYS(prctl), 1, &named) == 0 &&
+    constexpr scmp_arg_cmp kThread = {
+        .arg = 0, .op = SCMP_CMP_MASKED_EQ, .datum_a = CLONE_THREAD, .datum_b = CLONE_THREAD};
+    constexpr scmp_arg_cmp kNamed = {.arg = 0, .op = SCMP_CMP_EQ, .datum_a = PR_SET_NAME, .datum_b = 0};
+    return seccomp.add(filter, SCMP_ACT_ALLOW, SCMP_SYS(clone), 1, &kThread) == 0 &&
+           seccomp.add(filter, SCMP_ACT_ALLOW, SCMP_SYS(prctl), 1, &kNamed) == 0 &&
            seccomp.add(filter, SCMP_ACT_ERRNO(ENOSYS), SCMP_SYS(clone3), 0, nullptr) == 0 && seccomp.load(filter) == 0;
 }
 

@@ -83,7 +83,8 @@ class Connections {
 };
 
 Connections* current = nullptr;
-Connections* inherited = nullptr;  // from the parent process; kept reachable for leak checkers
+// From the parent process; never read, but reachable for leak checkers.
+[[gnu::used]] Connections* inherited = nullptr;
 
 // SQLite notes for the whole process which locks it holds, and a child would inherit the notes without the locks: so
 // none is held at a fork, and nobody is inside SQLite. Nor does the committer run: a thread that is just being started
