@@ -23,7 +23,7 @@ constexpr int kDeepest = 16;
 // "" where there is none.
 std::string fileOf(const std::string& service) {
     for (const char* folder : kFolders) {
-        const std::string path = service.starts_with('/') ? service : VEXO::SystemPath(folder + service);
+        std::string path = service.starts_with('/') ? service : VEXO::SystemPath(folder + service);
         if (access(path.c_str(), F_OK) == 0) return path;
     }
     return "";
@@ -49,8 +49,10 @@ class Service {
         std::ifstream file(path);
         std::string line, rest;
         for (int number = 1; std::getline(file, line); ++number, rest.clear()) {
-            while (line.ends_with('\\') && std::getline(file, rest))
-                line = line.substr(0, line.size() - 1) + " " + rest;
+            while (line.ends_with('\\') && std::getline(file, rest)) {
+                line.back() = ' ';
+                line += rest;
+            }
             judge(line.substr(0, line.find('#')), path, number, depth);
         }
     }

@@ -192,9 +192,9 @@ async function carryChosen(listing, words) {
     toastFailure(failure, browser.id);
     return { count: 0 };
   });
-  if (listing !== browser.listing) return;
+  // What is lost is said whatever is shown by now; what only left, for the list that it left.
   if (left === null) toast({ text: t("chosen.lost"), kind: "failed" });
-  else if (left.count > 0) toast({ text: t(words, left) });
+  else if (left.count > 0 && listing === browser.listing) toast({ text: t(words, left) });
 }
 
 const RENEW = 10 * 60 * 1000; // a list that the server keeps is gone after an hour at rest

@@ -154,7 +154,8 @@ void joinPlain(std::vector<Condition>& parts, bool endings) {
         all.trigrams = std::move(plain.front().trigrams);
         for (size_t i = 1; i < plain.size(); ++i) addHints(all, plain[i]);
         if (all.trigrams) all.trigrams = "(" + *all.trigrams + ")";
-        plain.assign(1, std::move(all));
+        plain.clear();
+        plain.push_back(std::move(all));
     }
     std::move(plain.begin(), plain.end(), std::back_inserter(parts));
 }

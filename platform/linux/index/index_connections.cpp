@@ -186,7 +186,8 @@ void Connections::startCommitter() {
 // The lock is given up while the thread ends; the next one that is started has a stop state of its own.
 void Connections::endCommitter(std::unique_lock<std::mutex>& lock) {
     while (committer_.joinable()) {
-        std::jthread ending = std::move(committer_);
+        std::jthread ending;
+        ending.swap(committer_);
         lock.unlock();
         ending.request_stop();
         ending.join();

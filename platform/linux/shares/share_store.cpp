@@ -215,6 +215,7 @@ std::vector<const ShareDefinition*> ShareTable::holding(const std::string& path)
     std::stable_sort(found.begin(), found.end(),
                      [](const auto& a, const auto& b) { return a.first.size() > b.first.size(); });
     std::vector<const ShareDefinition*> shares;
+    shares.reserve(found.size());
     for (const auto& [root, share] : found) shares.push_back(share);
     return shares;
 }
