@@ -2,7 +2,7 @@
 import assert from "node:assert/strict";
 import { existsSync, mkdirSync, readdirSync, renameSync, rmSync, writeFileSync } from "node:fs";
 import { beforeEach, test } from "node:test";
-import { row, rowsReady, wentWell, withPage } from "./browser.mjs";
+import { drawn, row, rowsReady, wentWell, withPage } from "./browser.mjs";
 
 const folder = `${process.env.ORVEL_TEST_PROJECTS}/chosen`;
 const MANY = 1500; // of which the middle is never on screen
@@ -119,8 +119,11 @@ test("a list that is gone: what was chosen by name stays, all must be chosen aga
     };
     await row(page, nameOf(4)).click();
     forget();
+    const refreshed = page.waitForResponse("**/cgi-bin/list?action=folder*");
     await page.keyboard.press("Alt+r");
+    await (await refreshed).finished(); // until then everything would be chosen by its names
     await rowsReady(page);
+    await drawn(page);
     await page.waitForSelector("#view .row.selected >> text=item-00004.dat");
     await page.press("#view", "Control+a");
     await chosenCount(page, MANY);
