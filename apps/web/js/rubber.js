@@ -113,7 +113,7 @@ function end() {
   if (band.row) band.row.draggable = true;
   if (band.node) {
     band.node.remove();
-    // The click that follows is none.
+    // The click that follows does not count as one.
     const swallow = (event) => event.stopPropagation();
     addEventListener("click", swallow, { capture: true, once: true });
     setTimeout(() => removeEventListener("click", swallow, { capture: true }));

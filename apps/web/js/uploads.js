@@ -198,7 +198,7 @@ class Batch {
   }
 }
 
-// Somebody else is logged in: what waits is theirs no more than it can be sent.
+// Somebody else is logged in: what waits is not theirs, and cannot be sent.
 let over = false;
 on("start-anew", () => {
   over = true;

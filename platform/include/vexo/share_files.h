@@ -21,7 +21,7 @@ enum {
 // the innermost share that holds the folder says (create mask and directory mask, their force modes, force group,
 // inherit permissions; a folder's default ACL and set-group bit before them). Either may be open for its
 // path only. `mode`: what is wanted; new things of an unnamed share get 0644 and 0755 at most. `uid`, `gid`: -1 keeps
-// them. File systems without owners and modes are none of a failure. 0, or -1 with errno and the slot.
+// them. File systems without owners and modes are not a failure. 0, or -1 with errno and the slot.
 VEXO_API int VEXOShareGiveNew(int folder, int made, mode_t mode, unsigned switches, uid_t uid, gid_t gid);
 
 // The path of the recycle bin within the share whose root is `root`: "#recycle", or where the share has Samba's module
