@@ -198,7 +198,7 @@ def checkRefusals():
 
 
 def finished(task):
-    for _ in range(300):
+    for _ in range(1200):
         reply = ask("operation", action="status", taskid=task)
         if reply["data"]["finished"]:
             return reply["data"]
