@@ -1,7 +1,6 @@
 #include "kept_store.h"
 
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -9,6 +8,7 @@
 #include <ctime>
 #include <vector>
 
+#include "base/file.h"
 #include "base/new_file.h"
 #include "base/raised_identity.h"
 #include "base/random.h"
@@ -36,14 +36,6 @@ bool isOlder(const Kept& a, const Kept& b) {
 
 bool isOver(const struct stat& status) {
     return time(nullptr) - status.st_mtim.tv_sec > kKeptSeconds;
-}
-
-bool lock(int fd, int how) {
-    int result = 0;
-    do {
-        result = flock(fd, how);
-    } while (result != 0 && errno == EINTR);
-    return result == 0;
 }
 
 bool makeFolder(const std::string& path, uid_t uid, gid_t gid) {
@@ -80,7 +72,7 @@ Descriptor openFile(const Descriptor& folder, const std::string& id) {
 // False when somebody works with it.
 bool removeUnheld(const Descriptor& folder, const std::string& name) {
     const Descriptor file = openFile(folder, name);
-    if (file && !lock(file.get(), LOCK_EX | LOCK_NB) && errno == EWOULDBLOCK) return false;
+    if (file && !lockFile(file.get(), LOCK_EX | LOCK_NB) && errno == EWOULDBLOCK) return false;
     return unlinkat(folder.get(), name.c_str(), 0) == 0 || errno == ENOENT;
 }
 
@@ -112,16 +104,6 @@ bool makeRoom(const Descriptor& folder, long long bytes) {
     return count < kMostKept && sum <= kMostKeptBytes;
 }
 
-bool writeAll(int fd, std::string_view bytes) {
-    while (!bytes.empty()) {
-        const ssize_t written = write(fd, bytes.data(), bytes.size());
-        if (written < 0 && errno == EINTR) continue;
-        if (written <= 0) return false;
-        bytes.remove_prefix(static_cast<size_t>(written));
-    }
-    return true;
-}
-
 void note(KeptSweep& sweep) {
     if (sweep.error == 0) sweep.error = errno;
 }
@@ -151,7 +133,7 @@ KeptResult keepBytes(const std::string& user, std::string_view bytes, std::strin
     NewFile file(folder.get());
     if (!file.create(id, 0600) || !writeAll(file.get(), bytes)) return KeptResult::kFailed;
     // What comes at the same time is counted, too.
-    if (!lock(folder.get(), LOCK_EX)) return KeptResult::kFailed;
+    if (!lockFile(folder.get(), LOCK_EX)) return KeptResult::kFailed;
     if (!makeRoom(folder, size)) return KeptResult::kFull;
     return file.publish(id, false) ? KeptResult::kDone : KeptResult::kFailed;
 }
@@ -162,7 +144,8 @@ Descriptor openKept(const std::string& user, const std::string& id) {
     Descriptor file = folder ? openFile(folder, id) : Descriptor();
     struct stat status {};
     const bool there = file && fstat(file.get(), &status) == 0 && S_ISREG(status.st_mode) && !isOver(status) &&
-                       lock(file.get(), LOCK_SH | LOCK_NB) && fstat(file.get(), &status) == 0 && status.st_nlink > 0;
+                       lockFile(file.get(), LOCK_SH | LOCK_NB) && fstat(file.get(), &status) == 0 &&
+                       status.st_nlink > 0;
     if (!there || futimens(file.get(), nullptr) != 0) return Descriptor();
     return file;
 }

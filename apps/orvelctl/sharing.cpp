@@ -1,11 +1,10 @@
 #include <fcntl.h>
-#include <sys/file.h>
 
 #include <cstdio>
 #include <memory>
 
 #include "arguments.h"
-#include "base/descriptor.h"
+#include "base/file.h"
 #include "base/owner.h"
 #include "command.h"
 #include "orvel/sharing_settings.h"
@@ -41,7 +40,7 @@ int list() {
 // For everybody: the setting of the appliance, locked as every change of it is.
 int setForAll(const std::string& choice) {
     const Descriptor file(open(VEXO::SystemPath(kSettings).c_str(), O_RDWR | O_CLOEXEC | O_NOFOLLOW));
-    if (file) flock(file.get(), LOCK_EX);
+    if (file) static_cast<void>(lockFile(file.get(), LOCK_EX));
     const int done = choice == "everybody" ? VLIBCFileRemoveKey(kSettings, kChoice)
                                            : VLIBCFileSetKeyValue(kSettings, kChoice, choice.c_str(), nullptr);
     if (done != 0) fprintf(stderr, "orvelctl: %s could not be changed: %m\n", kSettings);

@@ -1,4 +1,3 @@
-#include <sys/file.h>
 
 #include <cerrno>
 #include <ctime>
@@ -41,14 +40,6 @@ bool isOurs(int log) {
     return false;
 }
 
-bool lock(int log) {
-    int result = 0;
-    do {
-        result = flock(log, LOCK_EX);
-    } while (result != 0 && errno == EINTR);
-    return result == 0;
-}
-
 }  // namespace
 
 int VEXOLogKTRFMXferLog(const char* address, const char* user, const char* action, long long size, const char* path,
@@ -61,7 +52,7 @@ int VEXOLogKTRFMXferLog(const char* address, const char* user, const char* actio
     const std::string line = vexo::buildTransferEntry({time(nullptr), address, user, action, size, path, flag});
     const orvel::RaisedIdentity raised;
     const Descriptor log = openLog();
-    if (!log || !isOurs(log.get()) || !lock(log.get()) || !vexo::appendLine(log.get(), line)) {
+    if (!log || !isOurs(log.get()) || !vexo::lockFile(log.get(), LOCK_EX) || !vexo::appendLine(log.get(), line)) {
         return vexo::fail(vexo::errorOfErrno(errno));
     }
     errno = before;

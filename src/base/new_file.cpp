@@ -1,9 +1,6 @@
 #include "base/new_file.h"
 
-#include <fcntl.h>
 #include <linux/fs.h>
-#include <sys/file.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -11,6 +8,7 @@
 #include <cstdio>
 #include <ctime>
 
+#include "base/file.h"
 #include "base/hex.h"
 #include "base/keep_errno.h"
 #include "base/random.h"
@@ -21,22 +19,6 @@ namespace {
 constexpr size_t kDigits = 16;
 constexpr int kAttempts = 100;
 constexpr time_t kLinkAbandonedAfter = 60;  // seconds
-
-Descriptor openIn(int folder, const char* name, int flags, mode_t mode = 0) {
-    int fd = -1;
-    do {
-        fd = openat(folder, name, flags | O_CLOEXEC, mode);
-    } while (fd < 0 && errno == EINTR);
-    return Descriptor(fd);
-}
-
-bool lock(int fd, int how) {
-    int result = 0;
-    do {
-        result = flock(fd, how);
-    } while (result != 0 && errno == EINTR);
-    return result == 0;
-}
 
 // The hidden name for what will be called `name`: always the same (FNV-1a), so that a later attempt meets it.
 std::string partOf(const std::string& name) {
@@ -59,10 +41,6 @@ std::string makePart(int folder, const std::string& name, Make make) {
         if (attempt > 0 || !removeAbandonedPart(folder, part)) part = drawPartName();
     }
     return "";
-}
-
-bool isSameFile(const struct stat& a, const struct stat& b) {
-    return a.st_dev == b.st_dev && a.st_ino == b.st_ino;
 }
 
 void removeIfStill(int folder, const std::string& name, const struct stat& status) {
@@ -94,7 +72,7 @@ bool renameOntoClaim(int fromFolder, const std::string& from, int toFolder, cons
         if (mkdirat(toFolder, to.c_str(), 0700) != 0) return false;
         if (fstatat(toFolder, to.c_str(), &claimed, AT_SYMLINK_NOFOLLOW) != 0) return false;
     } else {
-        const Descriptor claim = openIn(toFolder, to.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
+        const Descriptor claim = openFile(toFolder, to.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
         if (!claim || fstat(claim.get(), &claimed) != 0) return false;
     }
     if (renameat(fromFolder, from.c_str(), toFolder, to.c_str()) == 0) return true;
@@ -129,8 +107,8 @@ bool removeAbandonedPart(int folder, const std::string& name) {
     bool abandoned = S_ISLNK(status.st_mode) && status.st_ctim.tv_sec < time(nullptr) - kLinkAbandonedAfter;
     const bool isFolder = S_ISDIR(status.st_mode);
     if (S_ISREG(status.st_mode) || isFolder) {
-        file = openIn(folder, name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
-        abandoned = file && lock(file.get(), LOCK_EX | LOCK_NB);
+        file = openFile(folder, name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
+        abandoned = file && lockFile(file.get(), LOCK_EX | LOCK_NB);
     }
     return abandoned && unlinkat(folder, name.c_str(), isFolder ? AT_REMOVEDIR : 0) == 0;
 }
@@ -140,9 +118,9 @@ Descriptor makeFolderPart(int folder, const std::string& name, mode_t mode, std:
         part =
             makePart(folder, name, [&](const std::string& drawn) { return mkdirat(folder, drawn.c_str(), mode) == 0; });
         if (part.empty()) return Descriptor();
-        Descriptor made = openIn(folder, part.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
+        Descriptor made = openFile(folder, part.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
         // Until it was locked it looked abandoned. A file system without locks knows nothing abandoned.
-        const bool ours = made && (lock(made.get(), LOCK_EX | LOCK_NB) || errno != EWOULDBLOCK);
+        const bool ours = made && (lockFile(made.get(), LOCK_EX | LOCK_NB) || errno != EWOULDBLOCK);
         struct stat status = {};
         if (ours && fstat(made.get(), &status) == 0 && status.st_nlink > 0) return made;
         if (made || errno == ENOENT) continue;  // taken for abandoned
@@ -175,8 +153,10 @@ bool putLink(int folder, const std::string& name, const char* text, bool replace
 
 bool putHardLink(int fromFolder, const std::string& from, int folder, const std::string& name, bool replace) {
     if (!replace) return linkat(fromFolder, from.c_str(), folder, name.c_str(), 0) == 0;
-    const Descriptor file = openIn(fromFolder, from.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
-    if (file) lock(file.get(), LOCK_SH | LOCK_NB);  // see removeAbandonedPart; at worst the name has to be made again
+    const Descriptor file = openFile(fromFolder, from.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
+    if (file)
+        static_cast<void>(lockFile(
+            file.get(), LOCK_SH | LOCK_NB));  // see removeAbandonedPart; at worst the name has to be made again
     const std::string part = makePart(folder, name, [&](const std::string& drawn) {
         return linkat(fromFolder, from.c_str(), folder, drawn.c_str(), 0) == 0;
     });
@@ -186,9 +166,9 @@ bool putHardLink(int fromFolder, const std::string& from, int folder, const std:
 }
 
 bool syncName(int folder, const std::string& name) {
-    Descriptor waiting = openIn(folder, ".", O_RDONLY | O_DIRECTORY);
+    Descriptor waiting = openFile(folder, ".", O_RDONLY | O_DIRECTORY);
     if (!waiting && errno == EACCES) {
-        waiting = openIn(folder, name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
+        waiting = openFile(folder, name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
         if (!waiting && (errno == EACCES || errno == ELOOP)) return true;
     }
     if (!waiting) return false;
@@ -196,7 +176,7 @@ bool syncName(int folder, const std::string& name) {
 }
 
 bool NewFile::create(const std::string& name, mode_t mode) {
-    fd_ = openIn(folder_, ".", O_TMPFILE | O_RDWR, mode);
+    fd_ = openFile(folder_, ".", O_TMPFILE | O_RDWR, mode);
     if (fd_) return true;
     // What file systems answer that know no nameless files, and kernels that take the flag for O_DIRECTORY.
     if (errno != EOPNOTSUPP && errno != EISDIR && errno != EINVAL) return false;
@@ -206,13 +186,13 @@ bool NewFile::create(const std::string& name, mode_t mode) {
 bool NewFile::createNamed(const std::string& name, mode_t mode) {
     for (int attempt = 0; attempt < kAttempts; ++attempt) {
         part_ = makePart(folder_, name, [&](const std::string& drawn) {
-            fd_ = openIn(folder_, drawn.c_str(), O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW, mode);
+            fd_ = openFile(folder_, drawn.c_str(), O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW, mode);
             return static_cast<bool>(fd_);
         });
         if (part_.empty()) return false;
         // Until it was locked it looked abandoned. A file system without locks knows nothing abandoned.
         struct stat status = {};
-        const bool ours = lock(fd_.get(), LOCK_EX | LOCK_NB) || errno != EWOULDBLOCK;
+        const bool ours = lockFile(fd_.get(), LOCK_EX | LOCK_NB) || errno != EWOULDBLOCK;
         if (fstat(fd_.get(), &status) != 0) return false;
         if (ours && status.st_nlink > 0) return true;
         removePart();
@@ -231,7 +211,7 @@ bool NewFile::giveName(const std::string& name) {
 }
 
 bool NewFile::takePart(const std::string& name) {
-    lock(fd_.get(), LOCK_EX | LOCK_NB);
+    static_cast<void>(lockFile(fd_.get(), LOCK_EX | LOCK_NB));
     part_ = makePart(folder_, name, [&](const std::string& drawn) { return giveName(drawn); });
     return !part_.empty();
 }

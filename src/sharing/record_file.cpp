@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <cstddef>
 
+#include "base/file.h"
 #include "vexo/line_file.h"
 #include "vexo/system_root.h"
 
@@ -18,35 +19,15 @@ bool isOurs(const struct stat& status) {
            (status.st_mode & (S_IWGRP | S_IWOTH)) == 0;
 }
 
-Descriptor openFile(const std::string& path, int flags, mode_t mode = 0) {
-    int fd = -1;
-    do {
-        fd = open(path.c_str(), flags | O_NOFOLLOW | O_CLOEXEC, mode);
-    } while (fd < 0 && errno == EINTR);
-    return Descriptor(fd);
-}
-
 // Opens the file for reading once it is known to be ours; empty with errno.
 Descriptor openRecord(const char* name, struct stat& status) {
-    Descriptor file = openFile(VEXO::SystemPath(name), O_RDONLY | O_NONBLOCK | O_NOCTTY);
+    Descriptor file = openFile(VEXO::SystemPath(name), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
     if (!file || fstat(file.get(), &status) != 0) return Descriptor();
     if (!isOurs(status)) {
         errno = EACCES;
         return Descriptor();
     }
     return file;
-}
-
-bool writeAll(int fd, std::string_view text) {
-    while (!text.empty()) {
-        const ssize_t written = ::write(fd, text.data(), text.size());
-        if (written >= 0) {
-            text.remove_prefix(static_cast<std::size_t>(written));
-        } else if (errno != EINTR) {
-            return false;
-        }
-    }
-    return true;
 }
 
 }  // namespace

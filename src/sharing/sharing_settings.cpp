@@ -9,6 +9,7 @@
 #include <cerrno>
 #include <cstdlib>
 
+#include "base/file.h"
 #include "base/printable.h"
 #include "core/boundary.h"
 #include "core/owned.h"
@@ -32,7 +33,7 @@ class LockedFile {
  public:
     LockedFile() : path_(VEXO::SystemPath(kFile)) {
         do {
-            file_ = openOnce();
+            file_ = openFile(path_, O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY, 0644);
         } while (file_ && isReplaced());
         // First of all: the platform changes no file that others than its owner may write.
         if (file_) static_cast<void>(makeReadable());
@@ -47,23 +48,14 @@ class LockedFile {
     [[nodiscard]] bool makeReadable() const { return fchmod(file_.get(), 0644) == 0; }
 
  private:
-    [[nodiscard]] Descriptor openOnce() const {
-        int fd = -1;
-        do {
-            fd = open(path_.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY, 0644);
-        } while (fd < 0 && errno == EINTR);
-        return Descriptor(fd);
-    }
-
     // Waits for the lock; whether the file was replaced meanwhile. Where that cannot be determined it is closed, since
     // another process may hold the lock of the one that counts. A lock that the file system refuses is no failure
     // (kept).
     [[nodiscard]] bool isReplaced() {
-        while (flock(file_.get(), LOCK_EX) != 0 && errno == EINTR) {
-        }
+        static_cast<void>(lockFile(file_.get(), LOCK_EX));
         struct stat locked = {}, current = {};
         if (fstat(file_.get(), &locked) == 0 && lstat(path_.c_str(), &current) == 0) {
-            return locked.st_dev != current.st_dev || locked.st_ino != current.st_ino;
+            return !isSameFile(locked, current);
         }
         if (errno == ENOENT) return true;
         file_.reset();

@@ -9,6 +9,7 @@
 #include <climits>
 #include <utility>
 
+#include "base/file.h"
 #include "base/new_file.h"
 #include "folder_names.h"
 #include "orvel/error_state.h"
@@ -43,13 +44,9 @@ bool isShown(const std::string& name) {
     return VEXOEAIsHiddenFile(name.c_str()) == 0;
 }
 
-bool isSame(const struct stat& a, const struct stat& b) {
-    return a.st_dev == b.st_dev && a.st_ino == b.st_ino;
-}
-
 // Whether a file is as it was when it was looked at.
 bool isUnchanged(const struct stat& before, const struct stat& now) {
-    return isSame(before, now) && before.st_size == now.st_size && before.st_mtim.tv_sec == now.st_mtim.tv_sec &&
+    return isSameFile(before, now) && before.st_size == now.st_size && before.st_mtim.tv_sec == now.st_mtim.tv_sec &&
            before.st_mtim.tv_nsec == now.st_mtim.tv_nsec;
 }
 
@@ -110,7 +107,7 @@ Transfer::Result Transfer::resolve(const Entry& from, const struct stat& status,
         return Result::kFailed;
     }
     if (rules_.conflict == Conflict::kError || !sameKind) return failed(from, ORV_ERR_EXISTS);
-    if (isSame(status, there)) return failed(from, ORV_ERR_SELECT_CONFLICT);
+    if (isSameFile(status, there)) return failed(from, ORV_ERR_SELECT_CONFLICT);
     return make(from, status, to, true);
 }
 
@@ -231,7 +228,7 @@ Transfer::Result Transfer::fill(const Entry& from, const struct stat& status, co
     }
     if (!topTarget_) topTarget_ = inside;
     // The tree may lie in itself by way of a mount.
-    if (isSame(status, *topTarget_)) return failed(from, ORV_ERR_SELECT_CONFLICT);
+    if (isSameFile(status, *topTarget_)) return failed(from, ORV_ERR_SELECT_CONFLICT);
     if (made) {
         [[maybe_unused]] const int ignored = fchown(target.get(), rules_.owner.uid, rules_.owner.gid);
     }

@@ -2,7 +2,6 @@
 
 #include <dirent.h>
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/statfs.h>
 #include <unistd.h>
@@ -18,6 +17,7 @@
 #include <memory>
 #include <vector>
 
+#include "base/file.h"
 #include "base/hex.h"
 #include "base/new_file.h"
 #include "base/raised_identity.h"
@@ -93,17 +93,6 @@ void tidyShelf(int shelf) {
     }
 }
 
-bool readWhole(int file, off_t size, std::string& text) {
-    text.resize(static_cast<size_t>(size));
-    for (size_t at = 0; at < text.size();) {
-        const ssize_t got = read(file, text.data() + at, text.size() - at);
-        if (got < 0 && errno == EINTR) continue;
-        if (got <= 0) return false;
-        at += static_cast<size_t>(got);
-    }
-    return true;
-}
-
 }  // namespace
 
 std::string thumbnailKey(int source, unsigned edge) {
@@ -146,7 +135,7 @@ std::optional<std::string> ThumbnailCache::get(const std::string& key) const {
     struct stat status {};
     std::string picture;
     if (!file || fstat(file.get(), &status) != 0 || status.st_size > kLargestKept ||
-        !readWhole(file.get(), status.st_size, picture)) {
+        !readAll(file.get(), picture, static_cast<size_t>(status.st_size))) {
         return std::nullopt;
     }
     if (time(nullptr) - status.st_mtim.tv_sec > kDay) futimens(file.get(), nullptr);
@@ -159,12 +148,7 @@ void ThumbnailCache::put(const std::string& key, std::string_view picture) const
     if (!shelf) return;
     NewFile file(shelf.get());
     if (!file.create(key, 0600)) return;
-    while (!picture.empty()) {
-        const ssize_t written = write(file.get(), picture.data(), picture.size());
-        if (written < 0 && errno == EINTR) continue;
-        if (written <= 0) return;
-        picture.remove_prefix(static_cast<size_t>(written));
-    }
+    if (!writeAll(file.get(), picture)) return;
     static_cast<void>(file.publish(key, false));
     const std::string drawn = draw<1>();
     if (!drawn.empty() && strtoul(drawn.c_str(), nullptr, 16) % kPutsBetweenLooks == 0) tidyShelf(shelf.get());
@@ -179,7 +163,7 @@ Descriptor ThumbnailCache::takeSeat(int patience) const {
             const RaisedIdentity root;
             const std::string name = "seat" + std::to_string(number);
             Descriptor seat(openat(root_.get(), name.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_CLOEXEC, 0600));
-            if (seat && flock(seat.get(), LOCK_EX | LOCK_NB) == 0) return seat;
+            if (seat && lockFile(seat.get(), LOCK_EX | LOCK_NB)) return seat;
         }
         if (waited >= patience) return Descriptor();
         usleep(kStep * 1000);

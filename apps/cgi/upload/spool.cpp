@@ -1,7 +1,6 @@
 #include "upload/spool.h"
 
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 
 #include <array>
@@ -9,6 +8,7 @@
 #include <ctime>
 #include <vector>
 
+#include "base/file.h"
 #include "base/random.h"
 #include "folder_names.h"
 #include "orvel/error_state.h"
@@ -34,7 +34,7 @@ long removeAbandonedUploads(const Descriptor& folder) {
         const Descriptor file(openat(folder.get(), name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
         struct stat status {};
         const bool old = file && fstat(file.get(), &status) == 0 && status.st_mtime < time(nullptr) - kAbandonedAfter;
-        if (!old || flock(file.get(), LOCK_EX | LOCK_NB) != 0) continue;
+        if (!old || !lockFile(file.get(), LOCK_EX | LOCK_NB)) continue;
         if (unlinkat(folder.get(), name.c_str(), 0) == 0) ++removed;
     }
     return removed;
@@ -92,18 +92,14 @@ int Spool::open(const std::string& volumePath) {
     name_ = std::string(kPrefix) + drawn;
     file_.emplace(folder_.get());
     if (!file_->create(name_, 0600)) return uploadCodeOf(errno);
-    flock(file_->get(), LOCK_EX | LOCK_NB);  // see removeAbandoned; where locks are unknown, age alone decides
+    static_cast<void>(
+        lockFile(file_->get(), LOCK_EX | LOCK_NB));  // see removeAbandoned; where locks are unknown, age alone decides
     return ORV_ERR_NONE;
 }
 
 int Spool::write(std::string_view data) {
-    while (!data.empty()) {
-        const ssize_t written = ::write(file_->get(), data.data(), data.size());
-        if (written < 0 && errno == EINTR) continue;
-        if (written <= 0) return uploadCodeOf(written < 0 ? errno : ENOSPC);
-        data.remove_prefix(static_cast<size_t>(written));
-        size_ += written;
-    }
+    if (!writeAll(file_->get(), data)) return uploadCodeOf(errno);
+    size_ += static_cast<off_t>(data.size());
     return ORV_ERR_NONE;
 }
 

@@ -17,6 +17,7 @@
 #include <thread>
 #include <utility>
 
+#include "base/file.h"
 #include "command.h"
 #include "index/indexer.h"
 #include "index/work.h"
@@ -195,7 +196,7 @@ class Watch {
         struct stat opened {};
         struct stat found {};
         if (stat(files_.openedRoot().path().c_str(), &opened) != 0 || stat(files_.root().c_str(), &found) != 0 ||
-            opened.st_dev != found.st_dev || opened.st_ino != found.st_ino) {
+            !isSameFile(opened, found)) {
             refuse(share_, "its folder is no longer there");
         }
     }

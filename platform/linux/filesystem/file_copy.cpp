@@ -75,7 +75,7 @@ int checkTarget(const char* path, Copy& copy) {
     }
     copy.exists = true;
     const struct stat& old = copy.oldStatus;
-    if (old.st_dev == copy.sourceStatus.st_dev && old.st_ino == copy.sourceStatus.st_ino) {
+    if (vexo::isSameFile(old, copy.sourceStatus)) {
         return vexo::fail(VEXO_ERR_EXISTS, EEXIST);
     }
     if (!S_ISREG(old.st_mode)) return vexo::fail(VEXO_ERR_TARGET_EXISTS_OTHER, EEXIST);
@@ -167,7 +167,7 @@ bool mayTake(const Copy& copy) {
 // Removes the source's name, unless somebody put another file there: the target was made through the descriptor.
 void dropName(const char* source, const Copy& copy) {
     struct stat now {};
-    if (lstat(source, &now) == 0 && now.st_dev == copy.sourceStatus.st_dev && now.st_ino == copy.sourceStatus.st_ino) {
+    if (lstat(source, &now) == 0 && vexo::isSameFile(now, copy.sourceStatus)) {
         unlink(source);
     }
 }

@@ -1,7 +1,6 @@
 // Making a folder with its missing parents, by descriptors, so that nobody can lead it elsewhere half-way. Each is made
 // under a hidden name, handed to its owner, and only then given its own.
 #include <dirent.h>
-#include <sys/file.h>
 
 #include <climits>
 #include <cstdio>
@@ -69,8 +68,7 @@ Descriptor openPart(int parent, const char* part) {
     if (mkdirat(parent, part, kModeUntilOwned) != 0 && errno != EEXIST) return Descriptor();
     Descriptor fd = vexo::openFile(parent, part, O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
     // Where folders cannot be locked it goes without: every step may be done twice.
-    while (fd && flock(fd.get(), LOCK_EX) != 0 && errno == EINTR) {
-    }
+    if (fd) static_cast<void>(vexo::lockFile(fd.get(), LOCK_EX));
     return fd;
 }
 
@@ -90,7 +88,7 @@ bool isNamed(int fd, int parent, const char* name) {
     struct stat open;
     struct stat named;
     return fstat(fd, &open) == 0 && fstatat(parent, name, &named, AT_SYMLINK_NOFOLLOW) == 0 &&
-           open.st_ino == named.st_ino && open.st_dev == named.st_dev;
+           vexo::isSameFile(open, named);
 }
 
 // Gives the part folder `fd` to its owner and then its name.

@@ -2,7 +2,6 @@
 #include "index/index_store.h"
 
 #include <dirent.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -63,19 +62,15 @@ bool makeStore() {
 }
 
 // The lock that everybody takes who writes the share's index. Empty with the slot filled: 0x0800 somebody has it.
-Descriptor lockFile(const std::string& path) {
+Descriptor openLocked(const std::string& path) {
     Descriptor lock = openFile(path, O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK, 0600);
-    int result = lock ? 0 : -1;
-    do {
-        if (lock) result = flock(lock.get(), LOCK_EX | LOCK_NB);
-    } while (result != 0 && errno == EINTR);
-    if (result == 0) return lock;
+    if (lock && lockFile(lock.get(), LOCK_EX | LOCK_NB)) return lock;
     fail(errno == EWOULDBLOCK ? static_cast<int>(VEXO_ERR_EXISTS) : errorOfErrno(errno));
     return Descriptor();
 }
 
 Descriptor lockIndex(std::string_view share) {
-    return lockFile(storePath(share, ".lock"));
+    return openLocked(storePath(share, ".lock"));
 }
 
 bool removeFile(const std::string& path) {
@@ -215,7 +210,7 @@ long removeUnfinished() {
         const std::string_view name = entry->d_name;
         if (!name.ends_with(kNew)) continue;
         const std::string stem = folder + "/" + std::string(name.substr(0, name.size() - kNew.size()));
-        const Descriptor lock = lockFile(stem + ".lock");
+        const Descriptor lock = openLocked(stem + ".lock");
         if (lock && removeFile(stem + std::string(kNew))) ++removed;
     }
     return removed;

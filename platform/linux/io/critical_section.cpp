@@ -38,8 +38,7 @@ orvel::Descriptor openLock(const std::string& path) {
 bool isStillThere(int lock, const std::string& path) {
     struct stat mine {};
     struct stat there {};
-    return fstat(lock, &mine) == 0 && lstat(path.c_str(), &there) == 0 && mine.st_dev == there.st_dev &&
-           mine.st_ino == there.st_ino;
+    return fstat(lock, &mine) == 0 && lstat(path.c_str(), &there) == 0 && orvel::isSameFile(mine, there);
 }
 
 Attempt tryToEnter(orvel::Descriptor& lock, const std::string& path) {

@@ -21,45 +21,6 @@ bool isBefore(const timespec& a, const timespec& b) {
 
 }  // namespace
 
-Descriptor openFile(int folder, const char* path, int flags, mode_t mode) {
-    int fd = -1;
-    do {
-        fd = openat(folder, path, flags | O_CLOEXEC, mode);
-    } while (fd < 0 && errno == EINTR);
-    return Descriptor(fd);
-}
-
-bool readAll(int fd, std::string& out, size_t limit) {
-    char buffer[65536];
-    size_t total = 0;
-    while (true) {
-        const ssize_t got = read(fd, buffer, sizeof buffer);
-        if (got == 0) return true;
-        if (got < 0) {
-            if (errno == EINTR) continue;
-            return false;
-        }
-        total += static_cast<size_t>(got);
-        if (total > limit) {
-            errno = EFBIG;
-            return false;
-        }
-        out.append(buffer, static_cast<size_t>(got));
-    }
-}
-
-bool writeAll(int fd, std::string_view text) {
-    while (!text.empty()) {
-        const ssize_t written = write(fd, text.data(), text.size());
-        if (written >= 0) {
-            text.remove_prefix(static_cast<size_t>(written));
-        } else if (errno != EINTR) {
-            return false;
-        }
-    }
-    return true;
-}
-
 bool readRegularFile(const std::string& path, size_t limit, std::string& text, FileVersion& version) {
     const Descriptor fd = openFile(path, O_RDONLY | O_NONBLOCK | O_NOCTTY);
     struct stat status {};

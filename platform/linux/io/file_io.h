@@ -1,5 +1,5 @@
-// Files as the platform reads and writes them: owned descriptors, interrupted calls repeated, whole writes. Functions
-// that return bool leave errno on failure.
+// Files as the platform reads them: which version was read, and which may be trusted. Functions that return bool leave
+// errno on failure.
 #ifndef VEXO_LINUX_FILE_IO_H
 #define VEXO_LINUX_FILE_IO_H
 
@@ -14,21 +14,16 @@
 #include <string>
 #include <string_view>
 
-#include "base/descriptor.h"
+#include "base/file.h"
 
 namespace vexo {
 
 using orvel::Descriptor;
-
-// openat, close-on-exec and repeated when interrupted. Empty with errno on failure.
-[[nodiscard]] Descriptor openFile(int folder, const char* path, int flags, mode_t mode = 0);
-[[nodiscard]] inline Descriptor openFile(const std::string& path, int flags, mode_t mode = 0) {
-    return openFile(AT_FDCWD, path.c_str(), flags, mode);
-}
-
-// Appends what is left of `fd` to `out`; EFBIG when that is more than `limit` bytes.
-[[nodiscard]] bool readAll(int fd, std::string& out, size_t limit);
-[[nodiscard]] bool writeAll(int fd, std::string_view text);
+using orvel::isSameFile;
+using orvel::lockFile;
+using orvel::openFile;
+using orvel::readAll;
+using orvel::writeAll;
 
 // When something was found unchanged: while it is recent nobody needs to look again. Never in a process that does not
 // serve a request.

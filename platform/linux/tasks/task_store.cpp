@@ -1,7 +1,6 @@
 #include "tasks/task_store.h"
 
 #include <dirent.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 
 #include <memory>
@@ -60,18 +59,9 @@ Descriptor openTask(int folder, const std::string& file, struct stat& status) {
     return Descriptor();
 }
 
-bool lockFile(int fd) {
-    int result = 0;
-    do {
-        result = flock(fd, LOCK_EX);
-    } while (result != 0 && errno == EINTR);
-    return result == 0;
-}
-
 bool stillNamed(int folder, const std::string& file, const struct stat& locked) {
     struct stat now {};
-    return fstatat(folder, file.c_str(), &now, AT_SYMLINK_NOFOLLOW) == 0 && now.st_dev == locked.st_dev &&
-           now.st_ino == locked.st_ino;
+    return fstatat(folder, file.c_str(), &now, AT_SYMLINK_NOFOLLOW) == 0 && isSameFile(now, locked);
 }
 
 // Written, but not brought to the disk: after a power cut no task runs any more, and a torn document says so, too.
@@ -124,7 +114,7 @@ Descriptor lockTask(int folder, const std::string& file) {
     for (int attempt = 0; attempt < kAttempts; ++attempt) {
         struct stat status {};
         Descriptor fd = openTask(folder, file, status);
-        if (!fd || !lockFile(fd.get())) return Descriptor();
+        if (!fd || !lockFile(fd.get(), LOCK_EX)) return Descriptor();
         if (stillNamed(folder, file, status)) return fd;
     }
     errno = EAGAIN;

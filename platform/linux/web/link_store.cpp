@@ -1,6 +1,5 @@
 #include "vexo/link_store.h"
 
-#include <sys/file.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -90,12 +89,7 @@ bool makeDatabase(const std::string& path) {
     const std::string folder = path.substr(0, path.rfind('/')), part = path + ".new";
     if (VEXOFSMkdirP(folder.c_str(), nullptr, 1, keep, keep, 0755) != 0) return false;
     const vexo::Descriptor lock = vexo::openFile(folder, O_RDONLY | O_DIRECTORY);
-    if (!lock) return false;
-    int locked = 0;
-    do {
-        locked = flock(lock.get(), LOCK_EX);
-    } while (locked != 0 && errno == EINTR);
-    if (locked != 0) return false;
+    if (!lock || !vexo::lockFile(lock.get(), LOCK_EX)) return false;
     if (isThere(path)) return true;  // another process was faster
     if (makeTable(part) && rename(part.c_str(), path.c_str()) == 0) return fsync(lock.get()) == 0;
     const vexo::KeepErrno keepErrno;

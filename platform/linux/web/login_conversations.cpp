@@ -1,7 +1,6 @@
 #include "web/login_conversations.h"
 
 #include <dirent.h>
-#include <sys/file.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <sys/wait.h>
@@ -62,7 +61,7 @@ bool countHeld(int store, const std::string& client, Held& held) {
         if (!isSessionId(entry->d_name)) continue;
         const Descriptor file = openFile(store, entry->d_name, O_RDONLY | O_NOFOLLOW | O_NONBLOCK);
         std::string of;
-        if (!file || flock(file.get(), LOCK_SH | LOCK_NB) == 0) {
+        if (!file || lockFile(file.get(), LOCK_SH | LOCK_NB)) {
             unlinkat(store, entry->d_name, 0);
             unlinkat(store, (std::string(entry->d_name) + kSocketSuffix).c_str(), 0);
         } else if (readAll(file.get(), of, kLongestClient)) {
@@ -98,7 +97,7 @@ Conversation startConversation(const std::string& client, std::string& id, Descr
     const orvel::RaisedIdentity raised;
     const Descriptor store = makeRunFolder(kLogIns) ? openRunFolder(kLogIns) : Descriptor();
     const Descriptor lock = store ? openFile(store.get(), kLock, O_RDWR | O_CREAT | O_NOFOLLOW, 0600) : Descriptor();
-    if (!lock || flock(lock.get(), LOCK_EX) != 0) return Conversation::kFailed;
+    if (!lock || !lockFile(lock.get(), LOCK_EX)) return Conversation::kFailed;
     Held held;
     if (!countHeld(store.get(), client, held)) return Conversation::kFailed;
     if (held.all >= kMost || held.ofClient >= kMostOfClient) return Conversation::kTooMany;
@@ -107,7 +106,7 @@ Conversation startConversation(const std::string& client, std::string& id, Descr
     if (id.empty()) return Conversation::kFailed;
     const Descriptor record = openFile(store.get(), id.c_str(), O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
     int ends[2];
-    if (!record || flock(record.get(), LOCK_EX | LOCK_NB) != 0 || !writeAll(record.get(), client) ||
+    if (!record || !lockFile(record.get(), LOCK_EX | LOCK_NB) || !writeAll(record.get(), client) ||
         socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends) != 0) {
         return Conversation::kFailed;
     }
