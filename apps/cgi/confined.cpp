@@ -53,13 +53,16 @@ LinkPolicy linkPolicyOf(const std::string& shareName) {
 bool isHiddenPlace(const Descriptor& root, const Descriptor& opened) {
     const auto within = pathBetween(root, opened);
     if (!within) return false;  // moved away since
-    VEXOShareNamesOf(opened.get());
-    std::string_view rest = *within;
-    while (!rest.empty()) {
-        const size_t end = std::min(rest.find('/'), rest.size());
-        if (VEXOEAIsHiddenFile(std::string(rest.substr(0, end)).c_str()) != 0) return true;
-        rest.remove_prefix(std::min(end + 1, rest.size()));
+    std::string folder = realPathOf(root);
+    for (std::string_view rest = *within; !rest.empty();) {
+        rest.remove_prefix(1);
+        const std::string name(rest.substr(0, rest.find('/')));
+        VEXOShareNamesAt(folder.c_str());
+        if (VEXOEAIsHiddenFile(name.c_str()) != 0) return true;
+        folder += "/" + name;
+        rest.remove_prefix(name.size());
     }
+    VEXOShareNamesOf(opened.get());  // it is asked about what it holds next
     return false;
 }
 

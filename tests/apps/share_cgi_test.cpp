@@ -25,11 +25,12 @@ class ShareCgi : public CgiTest {
         free_ = addLink("alice", kAliceUid, "");
         guarded_ = addLink("alice", kAliceUid, kPassword);
     }
-    static std::string addLink(const std::string& owner, uid_t uid, const std::string& password) {
+    static std::string addLink(const std::string& owner, uid_t uid, const std::string& password,
+                               const std::string& path = "/photo/shared") {
         Link link;
         link.owner = owner;
         link.uid = uid;
-        link.path = "/photo/shared";
+        link.path = path;
         if (!password.empty()) link.passwordHash = orvel::cgi::hashPassword(password);
         LinkStore store;
         EXPECT_TRUE(store.add(link)) << store.error();
@@ -156,6 +157,27 @@ TEST_F(ShareCgi, LinksOfOwnersWhoCannotShowThemAreMissing) {
     EXPECT_EQ(status(free_, "state"), 500) << "could not be determined";
     fs::remove(systemRoot() + applications);
     EXPECT_EQ(status(free_, "state"), 200);
+}
+
+TEST_F(ShareCgi, WhatWasDeletedIsNotShown) {
+    for (const char* folder : {"/#recycle", "/shared/#recycle"}) {
+        makeFolder(shareRoot("photo") + folder, 0777);
+        writeFile(shareRoot("photo") + folder + "/gone.txt", "deleted");
+    }
+    const std::string whole = addLink("alice", kAliceUid, "", "/photo");
+    const std::string listing = ask(whole, "action=list");
+    EXPECT_EQ(listing.find("recycle"), std::string::npos) << listing;
+    EXPECT_NE(listing.find("\"total\":1,"), std::string::npos) << listing;
+    for (const auto& [link, query, packed] : Rows<std::string, const char*, int>{
+             row(whole, "", 1), row(whole, "&path=/%23recycle", 0), row(whole, "&path=/%23recycle/gone.txt", 0),
+             row(whole, "&path=/shared/%23recycle", 1),  // a folder that is only called so
+             row(addLink("alice", kAliceUid, "", "/photo/#recycle"), "", 0)}) {
+        const std::string reply = ask(link, std::string("action=download") + query);
+        EXPECT_EQ(RawReply(reply).status, packed != 0 ? 200 : 404) << query;
+        int members = 0;  // each stands twice, the second time in the zip's own list
+        for (size_t at = 0; (at = reply.find("gone.txt", at)) != std::string::npos; ++at) ++members;
+        EXPECT_EQ(packed != 0 ? members : 0, 2 * packed) << query;
+    }
 }
 
 TEST_F(ShareCgi, APathNamedAgainAndAgainIsPackedOnce) {

@@ -12,6 +12,7 @@
 #include "orvel/file_info.h"
 #include "orvel/privilege.h"
 #include "reply.h"
+#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
@@ -33,6 +34,9 @@ int findPlace(const std::string& owner, const std::string& sharedPath, const std
     if (!PathInfoFactory::create(owner.c_str(), sharedPath, info)) return lastCode();
     OrvLibSetErr(ORV_ERR_NONE);
     if (!CheckShareDownloadPrivilege(owner.c_str(), nullptr, info.path.c_str())) return lastCode(ORV_ERR_DENIED);
+
+    // What was deleted was taken back from visitors, too.
+    if (VEXOShareHideBin(info.shareRoot.c_str()) != 0) return refusalCode(errno, info.realPath);
 
     // The path was free of links when it was published; one that took a place in it since would show something else.
     Descriptor shared;

@@ -13,6 +13,9 @@ VEXO_API void VEXOShareNamesOf(int folder);
 VEXO_API void VEXOShareNamesAt(const char* realPath);
 // 1 for a name that the share keeps out there, 0 for one that is hidden for another reason or not at all.
 VEXO_API int VEXOShareVetoes(const char* name);
+// To this process's end the recycle bin of the share or home with this root is hidden with them: for whoever is to see
+// what it holds, but not what was deleted from it. 0, or -1 with errno and the slot, and nothing is hidden.
+VEXO_API int VEXOShareHideBin(const char* root);
 
 enum {
     VEXO_NEW_OWN_MODE = 0x1,  // the mode is that of something else, so that only what the share states changes it

@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "accounts/account_source.h"
+#include "base/file.h"
 #include "base/raised_identity.h"
 #include "base/wildcard.h"
 #include "failure.h"
@@ -36,6 +37,17 @@ std::string pathOf(int fd) {
     char path[PATH_MAX];
     const ssize_t size = readlink(("/proc/self/fd/" + std::to_string(fd)).c_str(), path, sizeof path);
     return size > 0 && size < ssize_t{sizeof path} ? std::string(path, static_cast<size_t>(size)) : std::string();
+}
+
+// A bin that is hidden in this process: where it lies, free of links, and what it is called.
+struct HiddenBin {
+    std::string folder;
+    std::string name;
+};
+
+HiddenBin& hiddenBin() {
+    static auto& value = *new HiddenBin;
+    return value;
 }
 
 // What the names that are asked about are compared with.
@@ -67,7 +79,7 @@ void lookAt(const std::string& folder, std::shared_ptr<const ShareTable> table) 
     now.texts = std::move(texts);
 }
 
-// Null where no share vetoes anything. While the definitions cannot be read, those last known count.
+// Null where nothing is kept out. While the definitions cannot be read, those last known count.
 std::shared_ptr<const ShareTable> vetoingShares() {
     const KeepErrno keep;
     const int code = VLIBCErrGet();
@@ -76,7 +88,7 @@ std::shared_ptr<const ShareTable> vetoingShares() {
         VLIBCErrSetEx(code, __FILE__, __LINE__);
         return veto().table;
     }
-    const bool vetoes = table->vetoes();
+    const bool vetoes = table->vetoes() || !hiddenBin().name.empty();
     if (!vetoes && !veto().patterns.empty()) veto() = {};
     return vetoes ? table : nullptr;
 }
@@ -158,7 +170,8 @@ bool giveNew(int folder, int made, mode_t mode, bool own, uid_t uid, gid_t gid) 
 
 bool isVetoed(const char* name) {
     const std::vector<orvel::Wildcard>& patterns = veto().patterns;
-    return std::any_of(patterns.begin(), patterns.end(), [name](const auto& pattern) { return pattern.match(name); });
+    return (veto().folder == hiddenBin().folder && hiddenBin().name == name) ||
+           std::any_of(patterns.begin(), patterns.end(), [name](const auto& pattern) { return pattern.match(name); });
 }
 
 }  // namespace vexo
@@ -177,6 +190,21 @@ void VEXOShareNamesOf(int folder) try {
     vexo::lookAt(vexo::pathOf(folder), std::move(table));
 } catch (const std::exception&) {
     abort();
+}
+
+int VEXOShareHideBin(const char* root) try {
+    VEXO_GATE("VEXOShareHideBin", -1);
+    if (root == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    auto table = vexo::currentShares();
+    if (table == nullptr) return vexo::fail(VEXO_ERR_GENERAL);
+    const orvel::Descriptor opened = orvel::openFile(root, O_PATH | O_DIRECTORY);
+    if (!opened) return vexo::fail(vexo::errorOfErrno(errno));
+    const std::string bin = table->recycleIn(root);
+    vexo::hiddenBin() = {vexo::pathOf(opened.get()), bin.substr(0, bin.find('/'))};
+    vexo::lookAt(vexo::hiddenBin().folder, std::move(table));  // known, should the definitions be unreadable later
+    return 0;
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }
 
 int VEXOShareVetoes(const char* name) {
