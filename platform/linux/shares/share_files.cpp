@@ -169,8 +169,10 @@ bool giveNew(int folder, int made, mode_t mode, bool own, uid_t uid, gid_t gid) 
 }
 
 bool isVetoed(const char* name) {
+    const HiddenBin& bin = hiddenBin();
+    const bool isBin = !bin.name.empty() && bin.name == name && bin.folder == veto().folder;
     const std::vector<orvel::Wildcard>& patterns = veto().patterns;
-    return (veto().folder == hiddenBin().folder && hiddenBin().name == name) ||
+    return isBin ||
            std::any_of(patterns.begin(), patterns.end(), [name](const auto& pattern) { return pattern.match(name); });
 }
 
