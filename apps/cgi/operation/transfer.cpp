@@ -113,7 +113,10 @@ Transfer::Result Transfer::resolve(const Entry& from, const struct stat& status,
 
 Transfer::Result Transfer::keepBoth(const Entry& from, const struct stat& status, Entry& to) {
     const std::string name = to.name, folder = to.path.substr(0, to.path.rfind('/') + 1);
-    for (int number = 2; number <= kMostNumbers; ++number) {
+    int inThisFolder = 1;
+    // Thousands of one name, from as many folders, do not each ask for all numbers again.
+    int& number = depth_ == 0 ? numbers_.try_emplace(to.path, 1).first->second : inThisFolder;
+    while (++number <= kMostNumbers) {
         to.name = rules_.nextName(name, number, S_ISDIR(status.st_mode));
         to.path = folder + to.name;
         const Result result = make(from, status, to, false);

@@ -5,6 +5,7 @@
 #include <optional>
 #include <set>
 #include <string>
+#include <unordered_map>
 #include <vector>
 
 #include "free_names.h"
@@ -73,12 +74,13 @@ class Transfer {
 
     Progress& progress_;
     Rules rules_;
-    Names taken_;                           // at the top of the target
-    const Item* top_ = nullptr;             // of the run
-    std::optional<struct stat> topTarget_;  // the folder that it becomes
-    bool renaming_ = false;                 // no rename of this run met another file system yet
-    bool hidden_ = false;                   // what is at work is never shown, nor counted
-    std::vector<Copied> copied_;            // in the folder at work
+    Names taken_;                                   // at the top of the target
+    std::unordered_map<std::string, int> numbers_;  // by path: the last that keepBoth gave a name at the top
+    const Item* top_ = nullptr;                     // of the run
+    std::optional<struct stat> topTarget_;          // the folder that it becomes
+    bool renaming_ = false;                         // no rename of this run met another file system yet
+    bool hidden_ = false;                           // what is at work is never shown, nor counted
+    std::vector<Copied> copied_;                    // in the folder at work
     int depth_ = 0;
     long long bytes_ = 0;
 };

@@ -252,12 +252,13 @@ int Unpacker::nameIt(Member& member, Give give) {
         case Conflict::kKeepBoth:
             break;
     }
-    for (int number = 2; !given && number <= kMostNumbers; ++number) {
-        member.name = numberedName(wanted, number, false);
+    Numbered& last = numbered_[joined(member.folders) + "/" + wanted];
+    while (!given && last.number < kMostNumbers) {
+        member.name = numberedName(wanted, ++last.number, false);
         given = give(member.name, false);
         if (!given && errno != EEXIST) break;
     }
-    if (given) numbered_[joined(member.folders) + "/" + wanted] = member.name;
+    if (given) last.name = member.name;
     return given ? static_cast<int>(ORV_ERR_NONE) : codeOf(errno);
 }
 
@@ -339,7 +340,7 @@ bool Unpacker::findUnpacked(std::vector<std::string> components, Descriptor& fol
                             int& code) const {
     const auto numbered = numbered_.find(joined(components));
     std::vector<std::string> names = {components.back()};
-    if (numbered != numbered_.end()) names.push_back(numbered->second);
+    if (numbered != numbered_.end()) names.push_back(numbered->second.name);
     components.pop_back();
     folder = openBeneath(target_.folder, joined(components), LinkPolicy::kNone, O_PATH | O_DIRECTORY);
     code = folder ? static_cast<int>(ORV_ERR_MISSING) : refusalCode(errno, "");

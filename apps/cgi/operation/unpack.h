@@ -52,6 +52,11 @@ class Unpacker {
 
  private:
     struct Member;
+    // What members of one path get instead of it: thousands of them do not each ask for all numbers again.
+    struct Numbered {
+        std::string name;  // that the last one got
+        int number = 1;
+    };
     struct MadeFolder {
         std::string path;  // below the target
         mode_t mode;
@@ -77,8 +82,8 @@ class Unpacker {
     Target target_;
     UnpackLimits limits_{};
     std::set<std::string> names_;
-    std::set<std::pair<dev_t, ino_t>> unpacked_;   // files, for their further names
-    std::map<std::string, std::string> numbered_;  // by path below the target: the name that a member got instead
+    std::set<std::pair<dev_t, ino_t>> unpacked_;  // files, for their further names
+    std::map<std::string, Numbered> numbered_;    // by path below the target
     std::vector<MadeFolder> madeFolders_;
     long long bytes_ = 0, members_ = 0, folders_ = 0, consumed_ = 0;
     bool exceeded_ = false, torn_ = false;
