@@ -24,7 +24,7 @@ while taken "$port" || taken "$((port + 1))" || taken "$((port + 2))"; do port=$
 export VEXO_ROOT=$work ORVEL_SHARE=$work/share ORVEL_WEB_USER=nobody
 mkdir -p "$work/etc/orvel" "$work/share" "$work/run" "$work/var/lib" "$work/var/cache"
 cp -r "$source/packaging/web" "$work/share/lighttpd"
-cp -r "$source/apps/web" "$work/share/web"
+"$source/packaging/web/make-page" "$source/apps/web" "$work/share/web"
 settings=$work/etc/orvel/web.conf
 settings() {
     printf 'address="127.0.0.1"\nhttps_port="%s"\nhttp_port="%s"\nproxy_port="%s"\n' "$port" $((port + 1)) $((port + 2)) >"$settings"
@@ -79,7 +79,10 @@ for _ in $(seq 100); do taken "$port" && break; sleep 0.1; done
 expect "the page" 200 "$(ask -o /dev/null -w '%{http_code}' "https://localhost:$port/")"
 expect "plain HTTP" "307 https://localhost:$port/a?b" "$(ask -o /dev/null -w '%{http_code} %{redirect_url}' "http://localhost:$((port + 1))/a?b")"
 expect "a proxy" 200 "$(ask -o /dev/null -w '%{http_code}' "http://127.0.0.1:$((port + 2))/")"
-expect "packed" 1 "$(ask -D - -o /dev/null -H 'Accept-Encoding: gzip' "https://localhost:$port/js/main.js" | grep -ci '^content-encoding: gzip')"
+expect "packed and kept" "cache-control: immutable
+cache-control: max-age=31536000
+content-encoding: br" "$(ask -D - -o /dev/null -H 'Accept-Encoding: gzip, br' "https://localhost:$port/page/$(ls "$work/share/web/page")/js/main.js" |
+    tr -d '\r' | grep -i '^cache-control\|^content-encoding' | sort)"
 expect "a year of HTTPS" 0 "$(ask -D - -o /dev/null "https://localhost:$port/" | grep -ci '^strict-transport')"
 expect "a taken port" 1 "$("$prepare" start 2>&1 | grep -c "cannot listen on 127.0.0.1:$port")"
 [ "$failures" -eq 0 ] || cat "$work/log"

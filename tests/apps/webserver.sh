@@ -40,7 +40,7 @@ fi
 accounts=$("$build/bin/orvel-demo" "$demo") || exit 1
 password() { awk -v user="$1" '$1 == "user" && $2 == user { print $4 }' <<<"$accounts"; }
 printf 'orveld_web_servers="%s"\norveld_trusted_logins="%s"\n' "$user" "$user" >>"$settings"
-cp -r "$source/apps/web" "$work/web"
+"$source/packaging/web/make-page" "$source/apps/web" "$work/web"
 cp "$demo/etc/vexo/users.htpasswd" "$work/logins"
 chmod -R a+rX "$work/web" "$work/logins"
 socket=$work/orveld.socket

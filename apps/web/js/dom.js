@@ -24,7 +24,7 @@ export function set(node, attributes) {
 
 // The icons become part of the document: drawn at once, asked for once.
 export async function loadIcons() {
-  const text = await (await fetch("icons.svg")).text();
+  const text = await (await fetch(new URL("../icons.svg", import.meta.url))).text();
   const sprite = new DOMParser().parseFromString(text, "image/svg+xml").documentElement;
   sprite.setAttribute("class", "sprite");
   sprite.setAttribute("aria-hidden", "true");

@@ -14,7 +14,7 @@ export async function loadStrings() {
   const wanted =
     pref("language", null) ?? navigator.languages.map((tag) => tag.slice(0, 2)).find((tag) => tag in LANGUAGES);
   language = wanted in LANGUAGES ? wanted : "en";
-  const load = async (name) => (await fetch(`strings/${name}.json`)).json();
+  const load = async (name) => (await fetch(new URL(`../strings/${name}.json`, import.meta.url))).json();
   [fallback, table] = await Promise.all([load("en"), language === "en" ? {} : load(language)]);
   // Dates and numbers as the browser's own region writes them, where it speaks the language.
   locale = navigator.languages.find((tag) => tag.startsWith(language)) ?? language;

@@ -129,7 +129,7 @@ function showFolder() {
 
 export function start() {
   view = make("main");
-  const mark = make("img", { src: `${window.g_Tunnel}/favicon.svg`, alt: "", width: "26", height: "26" });
+  const mark = make("img", { src: new URL("../favicon.svg", import.meta.url), alt: "", width: "26", height: "26" });
   document.body.append(make("div.brand", { role: "banner" }, mark, "Orvel"), view);
   addEventListener("hashchange", open);
   open();

@@ -71,5 +71,5 @@ const GENERAL = ["misc.png", "folder.png", "recycle_bin.png", "isomountpoint.png
 
 export function picture(icon) {
   const file = GENERAL.includes(icon) ? icon : `files_ext/${encodeURIComponent(icon)}`;
-  return make("img.picture", { src: `${window.g_Tunnel}/images/${file}`, alt: "" });
+  return make("img.picture", { src: new URL(`../images/${file}`, import.meta.url), alt: "" });
 }
