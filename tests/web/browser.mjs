@@ -19,20 +19,23 @@ if (!existsSync(PROGRAM)) throw new Error(`${PROGRAM} is not installed: script/b
 if (!URL_OF_PAGE) throw new Error("ORVEL_TEST_URL is not set: run tests/web/run.sh");
 
 const data = mkdtempSync(join(tmpdir(), "orvel-chromium-"));
-export const browser = await chromium.launch({
-  executablePath: PROGRAM,
-  args: [
-    "--headless",
-    "--no-sandbox",
-    "--disable-gpu",
-    "--disable-quic",
-    "--no-first-run",
-    "--disable-background-networking",
-    "--disable-component-update",
-    "--disable-sync",
-    `--disk-cache-dir=${data}`,
-  ],
-});
+const ARGUMENTS = [
+  "--headless",
+  "--no-sandbox",
+  "--disable-gpu",
+  "--disable-quic",
+  "--no-first-run",
+  "--disable-background-networking",
+  "--disable-component-update",
+  "--disable-sync",
+  `--disk-cache-dir=${data}`,
+];
+export const browser = await launch();
+
+export function launch(...args) {
+  return chromium.launch({ executablePath: PROGRAM, args: [...ARGUMENTS, ...args] });
+}
+
 after(async () => {
   await browser.close();
   rmSync(data, { recursive: true, force: true });

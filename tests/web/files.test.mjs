@@ -90,7 +90,7 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     assert.equal(readFileSync(join(there, "trip/from outside.txt"), "utf8"), "dropped");
 
     await page.evaluate(async (id) => {
-      const { startUpload } = await import("/js/uploads.js");
+      const { startUpload } = await import(new URL("uploads.js", document.querySelector("script[type=module]").src));
       startUpload([{ parts: ["nothing in it"] }], id);
     }, await page.evaluate(() => location.hash.slice(1)));
     await card(page, "1 folder to").filter({ hasText: "1 done" }).waitFor();

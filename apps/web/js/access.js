@@ -1,7 +1,7 @@
 // What the server would refuse here, asked beforehand: what cannot work is not offered.
 
 import { get } from "./api.js";
-import { emit, on } from "./events.js";
+import { arrived, emit, on } from "./events.js";
 import { isSearch, shareOf } from "./path.js";
 
 const asked = new Map(); // id -> what the program "why" answered, or null while it has not
@@ -16,6 +16,7 @@ export function setupAccess() {
 
 async function ask(id) {
   asked.set(id, null);
+  await arrived;
   const answer = await get("why", { path_raw: id }).catch(() => null);
   if (!asked.has(id)) return;
   asked.set(id, answer);

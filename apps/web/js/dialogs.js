@@ -182,6 +182,11 @@ export function dismissToasts() {
   rack.replaceChildren();
 }
 
+// A module that nobody needs before somebody asks for it; nothing, and said so, when it does not come.
+export function loaded(module) {
+  return module.catch(() => toastFailure({ key: "page:unreachable" }));
+}
+
 // `id` is what the failure was about, for asking why.
 export function toastFailure(failure, id = null) {
   const { title, hint, why } = describe(failure);

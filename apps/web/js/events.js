@@ -8,6 +8,9 @@ export function on(name, listener) {
   return () => listeners.get(name).delete(listener);
 }
 
+// The first place is there. What is asked beside it waits for this.
+export const arrived = new Promise((resolve) => on("arrived", resolve));
+
 export function emit(name, detail) {
   for (const listener of listeners.get(name) ?? []) listener(detail);
 }

@@ -22,7 +22,7 @@ import { context, runCommand } from "./commands.js";
 import { setWhy } from "./dialogs.js";
 import { $, h, keepFocus, loadIcons } from "./dom.js";
 import { setupDragAndDrop } from "./dragdrop.js";
-import { on } from "./events.js";
+import { emit, on } from "./events.js";
 import { filterHome, homeNode, paintVolume } from "./home.js";
 import { setupKeys } from "./keys.js";
 import "./links.js";
@@ -290,7 +290,7 @@ async function start() {
   }
   document.body.classList.add("started");
   setupTasks();
-  followAddress();
+  followAddress().finally(() => emit("arrived"));
 }
 
 start().catch((failure) => {

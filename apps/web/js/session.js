@@ -3,7 +3,6 @@
 
 import { get, post, readReply, sendOnce, session, urlOf } from "./api.js";
 import { emit } from "./events.js";
-import { logInHere, logInPage } from "./login.js";
 
 const windows = new BroadcastChannel("orvel.session");
 let renewing = null;
@@ -34,12 +33,14 @@ async function renew() {
   if (!now) return false;
   if (session.user === "") {
     if (now.user !== "") return false; // logged in, and refused for another reason
+    const { logInPage } = await import("./login.js");
     await logInPage(now.machine);
     windows.postMessage("in");
     return true;
   }
   if (now.user === session.user) return true;
   if (now.user !== "") return startAnew();
+  const { logInHere } = await import("./login.js");
   const over = new AbortController();
   const user = await Promise.race([logInHere(session.user, startAnew), elsewhere(over.signal)]);
   over.abort();

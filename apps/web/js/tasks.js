@@ -8,7 +8,7 @@ import { Choice } from "./choice.js";
 import { askText, toast, toastFailure } from "./dialogs.js";
 import { plainName } from "./dom.js";
 import { describe } from "./errors.js";
-import { emit } from "./events.js";
+import { arrived, emit } from "./events.js";
 import { formatSize } from "./format.js";
 import { childOf, idIn, isWithin, lastOf, nameOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
@@ -35,6 +35,7 @@ let timer = null;
 export async function setupTasks() {
   tabs.addEventListener("message", look);
   addEventListener("focus", look);
+  await arrived;
   const { tasks } = await get("operation", { action: "status" }).catch(() => ({ tasks: [] }));
   for (const task of tasks) {
     // What ended well while nobody looked needs no word any more, nor what somebody has seen already.

@@ -5,11 +5,10 @@ import { Choice } from "./choice.js";
 import { heldItems, hold, letGo } from "./clipboard.js";
 import { addCommand } from "./commands.js";
 import { askConflict, takenOf } from "./conflicts.js";
-import { askText, confirm, dismissToasts, toast, toastFailure } from "./dialogs.js";
+import { askText, confirm, dismissToasts, loaded, toast, toastFailure } from "./dialogs.js";
 import { isInBin, isRecycleBin } from "./entries.js";
 import { checkName } from "./operations.js";
 import { childOf, encodeName, isWithin, lastOf, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
-import { pickFolder } from "./picker.js";
 import { get } from "./api.js";
 import { startTask } from "./tasks.js";
 import { t } from "./strings.js";
@@ -55,6 +54,11 @@ async function conflictFor(target, choice) {
   const pairs = [...taken].map(([name, there]) => ({ name, there, comes: comesAs(name, there) }));
   const said = await askConflict({ folder: target, pairs });
   return said ? EXISTS[said.answer] : null;
+}
+
+async function pickFolder(asked) {
+  const picker = await loaded(import("./picker.js"));
+  return picker?.pickFolder(asked);
 }
 
 async function to(action) {

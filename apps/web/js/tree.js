@@ -4,7 +4,7 @@ import { get } from "./api.js";
 import { browser, go } from "./browser.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
 import { isOffline, isReadOnlyShare } from "./entries.js";
-import { on } from "./events.js";
+import { arrived, on } from "./events.js";
 import { folderKindOf } from "./icons.js";
 import { ancestry, idIn, parentOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
@@ -122,6 +122,7 @@ function collapse(id) {
 async function follow(id) {
   current = id;
   paintCurrent();
+  await arrived;
   for (const one of ancestry(parentOf(id))) {
     if (!nodes.has(one) || current !== id) break;
     await expand(one);
