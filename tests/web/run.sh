@@ -10,6 +10,7 @@ for program in node npm; do # Node.js 20 or later
     command -v "$program" >/dev/null || { echo "FAILED: $program is not installed"; exit 1; }
 done
 [ -x "${ORVEL_TEST_CHROMIUM:-/usr/bin/chromium}" ] || { echo "FAILED: chromium is not installed"; exit 1; }
+[ -x "${ORVEL_TEST_FIREFOX:-/usr/bin/firefox-esr}" ] || { echo "FAILED: firefox-esr is not installed"; exit 1; }
 cmp -s "$here/package-lock.json" "$here/node_modules/.installed" ||
     { (cd "$here" && npm ci --no-audit --no-fund --loglevel=error) && cp "$here/package-lock.json" "$here/node_modules/.installed"; } ||
     { echo "FAILED: npm ci"; exit 1; }
@@ -21,5 +22,5 @@ ORVEL_TEST_PHOTO=$(root_of photo) ORVEL_TEST_PROJECTS=$(root_of projects)
 export ORVEL_TEST_PHOTO ORVEL_TEST_PROJECTS
 tests=("$@")
 [ "${#tests[@]}" -gt 0 ] || tests=("$here"/*.test.mjs)
-node --test --test-concurrency=1 --test-reporter=spec "${tests[@]}" || failures=$((failures + 1))
+node --experimental-websocket --test --test-concurrency=1 --test-reporter=spec "${tests[@]}" || failures=$((failures + 1))
 finish

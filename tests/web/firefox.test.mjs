@@ -1,0 +1,72 @@
+// The ways that people go most, in Firefox.
+import assert from "node:assert/strict";
+import { existsSync, mkdtempSync, readFileSync, rmSync, writeFileSync } from "node:fs";
+import { tmpdir } from "node:os";
+import { join } from "node:path";
+import { after, before, test } from "node:test";
+import { Firefox } from "./firefox.mjs";
+
+const SITE = process.env.ORVEL_TEST_URL.replace("127.0.0.1", "localhost"); // where the page asks for the password
+const there = join(process.env.ORVEL_TEST_PROJECTS, "house");
+const files = mkdtempSync(join(tmpdir(), "orvel-firefox-"));
+let firefox;
+
+before(async () => {
+  for (const name of ["letter.txt", "list.txt"]) writeFileSync(join(files, name), `This is ${name}.`);
+  firefox = await Firefox.start();
+});
+after(async () => {
+  await firefox?.close();
+  rmSync(files, { recursive: true });
+});
+
+test("in, upload, preview, rename, delete, link, out", async () => {
+  const row = ["#view .row:not(.header) .name"];
+  await firefox.open(`${SITE}#/projects`);
+  await firefox.fill(".login [name=user]", "alice");
+  await firefox.fill(".login [name=password]", process.env.ORVEL_TEST_ALICE);
+  await firefox.type("Enter");
+  await firefox.click(...row, "house", 2);
+  await firefox.find("#view[aria-busy=false]");
+  firefox.complaints.length = 0; // that nobody was logged in
+
+  await firefox.click("#toolbar button", "Upload");
+  await firefox.choose([join(files, "letter.txt"), join(files, "list.txt")], () => firefox.click(".menu button", "Upload files"));
+  await firefox.find(...row, "list.txt");
+  assert.equal(readFileSync(join(there, "letter.txt"), "utf8"), "This is letter.txt.");
+
+  await firefox.click(...row, "letter.txt", 2);
+  await firefox.find(".preview pre", "This is letter.txt.");
+  await firefox.type("Escape");
+  await firefox.gone(".preview");
+
+  await firefox.click(...row, "letter.txt");
+  await firefox.type("F2");
+  await firefox.fill(".in-place", "note");
+  await firefox.type("Enter");
+  await firefox.find("#view .row.selected", "note");
+  await firefox.gone("#view .row", "letter.txt");
+
+  await firefox.type("Delete");
+  await firefox.gone("#view .row", "note");
+  assert.ok(!existsSync(join(there, "note")));
+
+  await firefox.click(...row, "plan.pdf");
+  await firefox.click("#toolbar button", "Share a link");
+  await firefox.fill(".dialog [name=password]", "let me in");
+  await firefox.click(".dialog button", "Create link");
+  await firefox.find(".dialog .address");
+  const { value: link } = await firefox.call("() => document.querySelector('.dialog .address').value");
+  await firefox.type("Escape");
+  assert.deepEqual(firefox.complaints, []);
+  await firefox.click("#account-button", "");
+  await firefox.click(".menu button", "Log out");
+  await firefox.find(".login [name=user]");
+  firefox.complaints.length = 0;
+
+  await firefox.goto(link.replace(/^https?:\/\/[^/]+\//, SITE));
+  await firefox.fill("input[type=password]", "let me in");
+  await firefox.type("Enter");
+  await firefox.find(".single h1", "plan.pdf");
+  assert.deepEqual(firefox.complaints, []);
+});
