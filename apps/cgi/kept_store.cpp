@@ -10,12 +10,10 @@
 
 #include "base/file.h"
 #include "base/new_file.h"
-#include "base/raised_identity.h"
 #include "base/random.h"
 #include "folder_names.h"
-#include "vexo/filesystem.h"
+#include "user_folder.h"
 #include "vexo/system_root.h"
-#include "vexo/user.h"
 
 namespace orvel::cgi {
 namespace {
@@ -36,33 +34,6 @@ bool isOlder(const Kept& a, const Kept& b) {
 
 bool isOver(const struct stat& status) {
     return time(nullptr) - status.st_mtim.tv_sec > kKeptSeconds;
-}
-
-bool makeFolder(const std::string& path, uid_t uid, gid_t gid) {
-    const RaisedIdentity root;
-    constexpr uid_t keep = static_cast<uid_t>(-1);
-    return VEXOFSMkdirP(VEXO::SystemPath(kStore).c_str(), nullptr, 1, keep, keep, 0755) == 0 &&
-           VEXOFSMkdirP(path.c_str(), nullptr, 0, geteuid() == 0 ? uid : keep, geteuid() == 0 ? gid : keep, 0700) == 0;
-}
-
-// The user's folder, which nobody else can write to. Null with errno.
-Descriptor openOwn(const std::string& user, bool make) {
-    uid_t uid = 0;
-    gid_t gid = 0;
-    if (VEXOUserGetUGID(user.c_str(), &uid, &gid) != 0) {
-        errno = ENOENT;
-        return Descriptor();
-    }
-    const std::string path = VEXO::SystemPath(kStore) + "/" + std::to_string(uid);
-    Descriptor folder(open(path.c_str(), kOpenFolder));
-    if (!folder && errno == ENOENT && make && makeFolder(path, uid, gid))
-        folder = Descriptor(open(path.c_str(), kOpenFolder));
-    struct stat status {};
-    if (!folder || fstat(folder.get(), &status) != 0) return Descriptor();
-    const bool own = (status.st_uid == uid || status.st_uid == geteuid()) && (status.st_mode & 0077) == 0;
-    if (own) return folder;
-    errno = EACCES;
-    return Descriptor();
 }
 
 Descriptor openFile(const Descriptor& folder, const std::string& id) {
@@ -127,7 +98,7 @@ bool isKeptId(std::string_view text) {
 KeptResult keepBytes(const std::string& user, std::string_view bytes, std::string& id) {
     const auto size = static_cast<long long>(bytes.size());
     if (size > kMostKeptBytes) return KeptResult::kFull;
-    const Descriptor folder = openOwn(user, true);
+    const Descriptor folder = openUserFolder(kStore, user, true);
     id = draw<kIdLength / 2>();
     if (!folder || id.empty()) return KeptResult::kFailed;
     NewFile file(folder.get());
@@ -140,7 +111,7 @@ KeptResult keepBytes(const std::string& user, std::string_view bytes, std::strin
 
 Descriptor openKept(const std::string& user, const std::string& id) {
     errno = ENOENT;
-    const Descriptor folder = isKeptId(id) ? openOwn(user, false) : Descriptor();
+    const Descriptor folder = isKeptId(id) ? openUserFolder(kStore, user, false) : Descriptor();
     Descriptor file = folder ? openFile(folder, id) : Descriptor();
     struct stat status {};
     const bool there = file && fstat(file.get(), &status) == 0 && S_ISREG(status.st_mode) && !isOver(status) &&
@@ -151,7 +122,7 @@ Descriptor openKept(const std::string& user, const std::string& id) {
 }
 
 void dropKept(const std::string& user, const std::string& id) {
-    const Descriptor folder = isKeptId(id) ? openOwn(user, false) : Descriptor();
+    const Descriptor folder = isKeptId(id) ? openUserFolder(kStore, user, false) : Descriptor();
     if (folder) static_cast<void>(removeUnheld(folder, id));
 }
 

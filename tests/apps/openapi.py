@@ -315,6 +315,9 @@ def links():
     free = ask("link", "POST", action="create", path="/projects")["data"]["id"]
     word = ask("link", "POST", action="create", path="/projects/made/a.txt", password="word")["data"]["id"]
     ask("link", action="list")
+    ask("preferences", "POST", action="set", values='{"mode":"grid","gone":null}')
+    ask("preferences", action="get")
+    ask("preferences", "POST", action="set", values="[]", status=400, success=False)
     ask("link", "POST", action="create", path="/projects/none", success=False)
     ask("link", "POST", action="create", path="/photo", available=9, status=400, success=False)
 

@@ -19,7 +19,8 @@ namespace {
 constexpr std::int64_t kForm = std::int64_t{1} << 20;
 constexpr std::int64_t kLongForm = std::int64_t{16} << 20;  // a hundred thousand paths
 constexpr std::int64_t kAnyLength = std::numeric_limits<std::int64_t>::max();
-constexpr std::int64_t kSmallForm = std::int64_t{64} << 10;  // a name, and a password of any length that is one
+constexpr std::int64_t kSmallForm = std::int64_t{64} << 10;     // a name, and a password of any length that is one
+constexpr std::int64_t kPreferences = std::int64_t{256} << 10;  // percent-encoded up to three times as long
 constexpr std::string_view kAsking = "GET, HEAD, POST";
 
 constexpr Program kPrograms[] = {{"list", kAsking, kForm, Caller::kUser, true, serveListProgram},
@@ -28,6 +29,7 @@ constexpr Program kPrograms[] = {{"list", kAsking, kForm, Caller::kUser, true, s
                                  {"login", kAsking, kSmallForm, Caller::kAnybody, false, serveLogInProgram},
                                  {"logout", "POST", kSmallForm, Caller::kAnybody, false, serveLogOutProgram},
                                  {"operation", kAsking, kForm, Caller::kUser, false, serveOperationProgram},
+                                 {"preferences", kAsking, kPreferences, Caller::kUser, false, servePreferencesProgram},
                                  {"search", kAsking, kForm, Caller::kUser, false, serveSearchProgram},
                                  {"sessions", "GET, HEAD", kForm, Caller::kAnybody, true, serveSessionsProgram},
                                  {"share", kAsking, kForm, Caller::kAnybody, false, serveShareProgram},

@@ -45,6 +45,7 @@ void serveListProgram(Request& request, Output& out);
 void serveDownloadProgram(Request& request, Output& out);
 void serveLinkProgram(Request& request, Output& out);
 void serveOperationProgram(Request& request, Output& out);
+void servePreferencesProgram(Request& request, Output& out);
 void serveSearchProgram(Request& request, Output& out);
 void serveShareProgram(Request& request, Output& out);
 void serveThumbnailProgram(Request& request, Output& out);
