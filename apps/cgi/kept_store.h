@@ -1,4 +1,4 @@
-// Where kept listings lie: a folder of each user's own, /var/lib/vexo/listings/<uid> below the system root.
+// Where kept listings lie: /var/lib/vexo/listings/<uid> below the system root, see own_store.h.
 //
 // The time of a file is when its listing was last shown. One that was at rest for an hour is gone; a user has at most
 // eight, of 64 MiB together: the one that was at rest longest makes room. Whoever works with one holds it (a shared
@@ -10,6 +10,7 @@
 #include <string_view>
 
 #include "base/descriptor.h"
+#include "own_store.h"
 
 namespace orvel::cgi {
 
@@ -32,13 +33,8 @@ enum class KeptResult { kDone, kFull, kFailed };
 // Removes one that is of no use; one that is held stays.
 void dropKept(const std::string& user, const std::string& id);
 
-struct KeptSweep {
-    long removed = 0;
-    int error = 0;  // errno of the first failure; the rest was swept all the same
-};
-// Removes what was at rest for an hour, of all users, and is not held; and what a killed process left. As root. Where
-// there is no store there is nothing to do.
-[[nodiscard]] KeptSweep sweepKeptListings();
+// Removes what was at rest for an hour, of all users, and is not held.
+[[nodiscard]] OwnSweep sweepKeptListings();
 
 }  // namespace orvel::cgi
 

@@ -19,6 +19,7 @@
 #include "command.h"
 #include "folder_names.h"
 #include "kept_store.h"
+#include "operation/undo_record.h"
 #include "orvel/login_records.h"
 #include "orvel/task_progress.h"
 #include "search_task.h"
@@ -203,9 +204,17 @@ Part sweepUploads(Sweep& sweep) {
 
 Part sweepKept(Sweep& /*sweep*/) {
     Part part;
-    const cgi::KeptSweep kept = cgi::sweepKeptListings();
+    const cgi::OwnSweep kept = cgi::sweepKeptListings();
     part.removed = kept.removed;
     if (kept.error != 0) addError(part, "kept listings", kept.error);
+    return part;
+}
+
+Part sweepUndo(Sweep& /*sweep*/) {
+    Part part;
+    const cgi::OwnSweep swept = cgi::sweepUndoRecords();
+    part.removed = swept.removed;
+    if (swept.error != 0) addError(part, "undo records", swept.error);
     return part;
 }
 
@@ -225,6 +234,7 @@ constexpr struct {
     {"uploads", "left by killed processes", sweepUploads},
     {"indexes", "left by killed builds", sweepIndexes},
     {"kept listings", "at rest for an hour", sweepKept},
+    {"undo records", "older than two days", sweepUndo},
 };
 
 Json::Value jsonOf(const char* name, const Part& part) {

@@ -181,7 +181,7 @@ TEST_F(KeptCgi, ATaskHoldsWhatItWorksOn) {
     const std::string task = start("alice", "action=copy&target=/video" + rows(id, "0-3"), {gate.order()});
     ASSERT_TRUE(gate.holds());
     for (const std::string& one : {id, idle}) rest(one, 3605);
-    const orvel::cgi::KeptSweep sweep = orvel::cgi::sweepKeptListings();
+    const orvel::cgi::OwnSweep sweep = orvel::cgi::sweepKeptListings();
     EXPECT_EQ(sweep.removed, 1);
     EXPECT_EQ(sweep.error, 0);
     EXPECT_TRUE(fs::exists(fileOf(id)));

@@ -239,8 +239,12 @@ def files():
     ask("search", "POST", action="start", path="/photo", status=400, success=False)
 
     ask("operation", "POST", action="mkdir", path="/projects/made/below", parents="true")
+    renamed = ask("operation", "POST", action="rename", path="/projects/made/below", name_raw="below too")["data"]["undo"]
+    expect(finished(ask("operation", "POST", action="undo", taskid=renamed)["data"]["taskid"])["items_done"] == 1, "undone")
+    ask("operation", "POST", action="undo", taskid=renamed, success=False)
     ask("operation", "POST", action="rename", path="/projects/made/below", name_raw="under%FF")
     ask("operation", "POST", action="mkdir", path="/projects/made", success=False)
+    ask("operation", "POST", action="mkdir", path_raw="/projects/made%FF")
     ask("operation", action="subfolders", path="/projects/made")
     ask("operation", "POST", action="present", path="/projects/made", names_raw="under%FF\nnone")
     ask("upload", "PUT", path="/projects/made/a.txt", body=b"text")

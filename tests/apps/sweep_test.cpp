@@ -67,6 +67,8 @@ TEST_F(Sweep, RemovesWhatIsOverAndNothingElse) {
         support::makeFolder(tasks, 0700);
         support::makeFolder(systemRoot() + "/var/lib/vexo/index", 0700);
         support::makeFolder(upload, 0700);
+        const std::string undo = systemRoot() + "/var/lib/vexo/undo/20001/";
+        support::makeFolder(undo, 0700);
         support::makeFolder(std::string(kResults) + "/alice", 0700);
         support::makeFolder("/mnt/elsewhere");
         fs::create_directory_symlink("/mnt/elsewhere", std::string(kResults) + "/bob");
@@ -80,6 +82,7 @@ TEST_F(Sweep, RemovesWhatIsOverAndNothingElse) {
             file(results + "0CD-journal", true),
             file(upload + "part-1", true),
             file(systemRoot() + "/var/lib/vexo/index/photo.new", false),
+            file(undo + "Quorvane_move_0123456789abcdef", true),
         };
         const std::string now = std::to_string(time(nullptr));
         const std::vector<std::string> kept = {
@@ -90,6 +93,7 @@ TEST_F(Sweep, RemovesWhatIsOverAndNothingElse) {
             file(results + "other", true),
             file("/mnt/elsewhere/0AA", true),
             file(upload + "part-2", false),
+            file(undo + "Quorvane_move_0123456789abcde0", false),
         };
         writeRootFile("/tmp/foldersharing.current.users", "10.0.0.5,alice,s1,1,1,1,0,L\n10.0.0.5,alice,s2,1,1,1,1,L\n");
         chmod((systemRoot() + "/tmp/foldersharing.current.users").c_str(), 0600);
@@ -103,7 +107,8 @@ TEST_F(Sweep, RemovesWhatIsOverAndNothingElse) {
         EXPECT_EQ(VEXOSweepLast(&last), 1);
         EXPECT_EQ(last.failures, 2);
 
-        EXPECT_EQ(counts(), "sessions 1\nlink sessions 1\ntasks 2\nsearch results 2\nuploads 1\nindexes 1\n");
+        EXPECT_EQ(counts(),
+                  "sessions 1\nlink sessions 1\ntasks 2\nsearch results 2\nuploads 1\nindexes 1\nundo records 1\n");
         for (const std::string& path : gone) EXPECT_FALSE(fs::exists(path)) << path;
         for (const std::string& path : kept) EXPECT_TRUE(fs::exists(path)) << path;
         EXPECT_EQ(run({"--quiet"}).output, "");

@@ -87,7 +87,7 @@ class TaskCgi : public support::CgiTest {
     static void writeFiles(const std::string& root, const Names& paths, const std::string& text = "") {
         for (const std::string& path : paths) {
             writeFile(root + path, text.empty() ? path : text, 0666);
-            for (fs::path at = root + path; at != root; at = at.parent_path()) give(at);
+            for (fs::path at = path; at.has_relative_path(); at = at.parent_path()) give(root + at.string());
         }
     }
     std::string photo_, video_;

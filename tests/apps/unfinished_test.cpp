@@ -33,10 +33,10 @@ namespace {
 // Path and content of what users see; and what else there is, by a name without "/".
 using Tree = std::map<std::string, std::string>;
 
-enum Given : unsigned { kNothing = 0, kLink = 1, kIndex = 2, kSearch = 4 };
+enum Given : unsigned { kNothing = 0, kLink = 1, kIndex = 2, kSearch = 4, kDeleted = 8 };
 
-// What is done. "LINK" and "SEARCH" stand for the ids of the link and the search that are there; orvelctl has no
-// method.
+// What is done. "LINK", "SEARCH" and "DELETED" stand for the ids of the link, the search and the deletion that are
+// there; orvelctl has no method.
 struct Work {
     const char *name, *program, *user, *method, *query, *body;
     unsigned given = kNothing;
@@ -69,6 +69,7 @@ const Work kWorks[] = {
      false},
     {"restore", PROGRAM_OPERATION, "alice", "POST", "", "action=restore&path=/photo/%23recycle/gone/f", kNothing,
      false},
+    {"undo", PROGRAM_OPERATION, "alice", "POST", "", "action=undo&taskid=DELETED", kDeleted},
     {"empty", PROGRAM_OPERATION, "alice", "POST", "", "action=empty&path=/photo", kNothing, false},
     {"compress", PROGRAM_OPERATION, "alice", "POST", "", "action=compress&path=/photo/d&target=/video/d.zip"},
     {"extract", PROGRAM_OPERATION, "alice", "POST", "", "action=extract&conflict=skip&path=/photo/a.zip&target=/video"},
@@ -176,6 +177,12 @@ class Unfinished : public TaskCgi {
         EXPECT_TRUE(task != nullptr && task->finish());
         search_.clear();
         found_.clear();
+        if ((given & kDeleted) != 0) {
+            run({"", PROGRAM_OPERATION, "alice", "POST", "", "action=delete&path=/photo/d&path=/photo/old"});
+            Json::Value names(Json::arrayValue);
+            EXPECT_TRUE(KTR::TaskMgr("alice").getAllTaskId("Quorvane_delete_", names) && names.size() == 1);
+            deleted_ = names[0].asString();
+        }
         if ((given & kSearch) != 0)
             run({"", PROGRAM_SEARCH, "alice", "POST", "", "action=start&path=/photo/d&type=file"});
     }
@@ -236,7 +243,8 @@ class Unfinished : public TaskCgi {
     }
     [[nodiscard]] support::Finished call(const Work& work, support::Variables variables) {
         const auto filled = [&](std::string text) {
-            for (const auto& [word, id] : {std::pair("LINK", &link_), std::pair("SEARCH", &search_)}) {
+            for (const auto& [word, id] :
+                 {std::pair("LINK", &link_), std::pair("SEARCH", &search_), std::pair("DELETED", &deleted_)}) {
                 const size_t at = text.find(word);
                 if (at != std::string::npos) text.replace(at, strlen(word), *id);
             }
@@ -389,7 +397,7 @@ class Unfinished : public TaskCgi {
     Calls* shared_ = nullptr;
     const char* only_ = "";
     long work_ = 0;
-    std::string other_, zip_, links_, index_, link_, search_, found_;
+    std::string other_, zip_, links_, index_, link_, search_, found_, deleted_;
     std::string linkDatabase_ = systemRoot() + VEXO::kLinkDatabase;
     std::set<std::pair<Tree, std::set<std::string>>> met_;
     std::set<std::string> stays_;

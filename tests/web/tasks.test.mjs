@@ -1,6 +1,6 @@
 // What goes on behind the page: searches and background operations.
 import assert from "node:assert/strict";
-import { existsSync, mkdirSync, readdirSync, readFileSync, writeFileSync } from "node:fs";
+import { chmodSync, existsSync, mkdirSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
 import { before, test } from "node:test";
 import { go, row, rowsReady, wentWell, withPage } from "./browser.mjs";
 import { Gate } from "./gate.mjs";
@@ -15,6 +15,9 @@ const LOCKED =
 before(() => {
   mkdirSync(`${projects}/many/target`, { recursive: true });
   mkdirSync(`${projects}/locked`);
+  mkdirSync(`${projects}/undone`);
+  chmodSync(`${projects}/undone`, 0o777);
+  writeFileSync(`${projects}/undone/one.txt`, "first");
   writeFileSync(`${projects}/locked/locked.zip`, LOCKED, "base64");
   for (let i = 0; i < MANY; ++i) writeFileSync(`${projects}/many/part ${i}.dat`, "x");
   mkdirSync(`${projects}/<i>odd`, { mode: 0o777 });
@@ -205,6 +208,31 @@ test("packed, extracted", () =>
     await moved.locator("text=Undo").waitFor();
     assert.ok(!existsSync(`${projects}/notes.zip`));
     await moved.locator("text=Undo").click();
-    await wentWell(page, "Move “notes.zip” to projects");
+    await wentWell(page, "Undo: Move “notes.zip” to house");
     assert.ok(existsSync(`${projects}/notes.zip`));
+  }));
+
+test("undone by a key: a rename, a deletion; what stands in the way is named", () =>
+  withPage("alice", { path: "/projects/undone" }, async (page) => {
+    const file = `${projects}/undone/one.txt`;
+    await row(page, "one.txt").click();
+    await page.keyboard.press("F2");
+    await page.fill(".in-place", "two.txt");
+    await page.keyboard.press("Enter");
+    await page.waitForSelector(".toast >> text=“one.txt” is now “two.txt”");
+    await page.keyboard.press("Control+z");
+    await wentWell(page, "Undo: “one.txt” is now “two.txt”");
+    await row(page, "one.txt").click();
+    await page.keyboard.press("Delete");
+    await card(page, "Delete “one.txt”").locator("text=Undo").waitFor();
+    writeFileSync(file, "in its place");
+    await page.fill("#find", "o");
+    await page.press("#find", "Control+z"); // what is typed is the field's own
+    await page.fill("#find", "");
+    await page.press("#view", "Control+z");
+    await page.waitForSelector(".activity-card.failed >> text=“one.txt” exists already");
+    rmSync(file);
+    await page.click(".activity-card.failed >> text=Try again");
+    await wentWell(page, "Undo: Delete “one.txt”");
+    assert.equal(readFileSync(file, "utf8"), "first");
   }));

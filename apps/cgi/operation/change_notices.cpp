@@ -4,8 +4,8 @@
 
 namespace orvel::cgi {
 
-ChangeNotices::ChangeNotices(const Operation& operation)
-    : user_(operation.user.name), search_(user_, operation.web.GetParam("taskid", "")) {}
+ChangeNotices::ChangeNotices(const Operation& operation, const char* search)
+    : user_(operation.user.name), search_(user_, operation.web.GetParam(search, "")) {}
 
 void ChangeNotices::deleted(const std::string& path, const ChangedFile& file, bool isFolder, bool whole) {
     OrvLibDoLog(user_, path, 0, ORVEL_ACTION_DELETE, isFolder);

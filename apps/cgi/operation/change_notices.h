@@ -13,7 +13,8 @@ namespace orvel::cgi {
 // `whole`: false when some of the item failed, or was not reached, but not all of it.
 class ChangeNotices {
  public:
-    explicit ChangeNotices(const Operation& operation);
+    // `search`: the parameter that names the search.
+    explicit ChangeNotices(const Operation& operation, const char* search = "taskid");
 
     // `path`: the share-relative path of `file`; `isFolder`: what it was.
     void deleted(const std::string& path, const ChangedFile& file, bool isFolder, bool whole);

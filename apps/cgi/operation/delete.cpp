@@ -67,6 +67,7 @@ void run(Operation& operation, bool permanent, Progress& progress) {
             continue;
         }
         const long long before = progress.itemsDone();
+        if (!bin) progress.undo().leaveOut();
         const bool gone = bin ? recycle(*bin, item, owner, progress) : removeTree(item.entry(), progress);
         if (gone || progress.itemsDone() != before) {
             notices.deleted(item.info.path, item.changed(), S_ISDIR(item.status.st_mode), gone);

@@ -41,6 +41,7 @@ constexpr Action kActions[] = {{"mkdir", Takes::kPath, true, Need::kCreate, make
                                {"compress", Takes::kPaths, true, Need::kRead, compressOperation},
                                {"extract", Takes::kPaths, true, Need::kRead, extractOperation},
                                {"measure", Takes::kPaths, true, Need::kList, measureOperation},
+                               {"undo", Takes::kTask, true, Need::kModify, undoOperation},
                                {"status", Takes::kTask, false, Need::kList, statusOperation},
                                {"cancel", Takes::kTask, true, Need::kList, cancelOperation},
                                {"clear", Takes::kTask, true, Need::kList, clearOperation}};

@@ -26,7 +26,8 @@ struct Operation {
 
 // "parents" = "true": missing folders above are made, too. data: {"path"}.
 int makeFolderOperation(Operation& operation);
-// "name" or "name_raw": the new name, in the same folder. data: {"path"}, the new one.
+// "name" or "name_raw": the new name, in the same folder. data: {"path"}, the new one, and "undo", an id for
+// undoOperation.
 int renameOperation(Operation& operation);
 // data: {"items":[{"name","path","mtime","mount_type"}]}, the sub-folders by name, "mount_type" only for mount points.
 int subfoldersOperation(Operation& operation);
@@ -51,6 +52,10 @@ int emptyOperation(Operation& operation);
 int compressOperation(Operation& operation);
 // Unpacks the archives at the paths into the folder "target" or "target_raw"; "conflict" as above.
 int extractOperation(Operation& operation);
+
+// Undoes what the operation "taskid" did, item by item: a copy, move, rename, deletion into the bin, restoring. What is
+// not as the operation left it stays, and so does what would not find its old place. "search": as "taskid" above.
+int undoOperation(Operation& operation);
 
 // Counts what is chosen, with all that lies below it: "items_total" and "bytes_total" of the task that has ended.
 int measureOperation(Operation& operation);

@@ -28,7 +28,8 @@ long long now() {
 
 }  // namespace
 
-Progress::Progress(KTR::Task& task, const std::string& action) : task_(task), action_(action) {
+Progress::Progress(KTR::Task& task, const std::string& user, const std::string& action)
+    : task_(task), undo_(user, task.getName()), action_(action) {
     atWork = this;
 }
 
@@ -59,13 +60,17 @@ void Progress::count(long long& items) {
 }
 
 void Progress::failed(const std::string& path, int code) {
+    failed(path, code, OrvParseErrorToKTRString(code, nullptr));
+}
+
+void Progress::failed(const std::string& path, int code, const char* key) {
     if (errorBytes_ + path.size() + kErrorOverhead > kErrorBytes) {
         ++errorsLeftOut_;
     } else {
         Json::Value error;
         putPath(error, "path", path);
         error["code"] = code;
-        error["key"] = OrvParseErrorToKTRString(code, nullptr);
+        error["key"] = key;
         errors_.append(error);
         errorBytes_ += path.size() + kErrorOverhead;
     }
@@ -128,6 +133,10 @@ Json::Value Progress::data(long long underWay) const {
     putPath(data, "current", current_);
     data["errors"] = errors_;
     data["errors_left_out"] = Json::Int64{errorsLeftOut_};
+    if (undo_.count() + undo_.leftOut() > 0) {
+        data["undo_count"] = Json::Int64{undo_.count()};
+        data["undo_left_out"] = Json::Int64{undo_.leftOut()};
+    }
     if (newCount_ == 0) return data;
     data["new"] = new_;
     data["new_count"] = newCount_;

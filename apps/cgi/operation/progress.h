@@ -7,17 +7,19 @@
 #include <string>
 #include <vector>
 
+#include "operation/undo_record.h"
 #include "vexo/task.h"
 
 namespace orvel::cgi {
 
 // The record's "data": {"action", "state": "running", "done", "cancelled" or "failed", "items_done", "items_skipped",
 // "items_failed", "items_total", "bytes_done", "bytes_total", "current", "errors": [{"path","code","key"}],
-// "errors_left_out": how many more there were than the list holds, "new": [{"path"}] and "new_count": see noteNew};
-// paths are share-relative. Totals may grow. At most one of these objects in a process.
+// "errors_left_out": how many more there were than the list holds, "new": [{"path"}] and "new_count": see noteNew,
+// "undo_count" and "undo_left_out": see undo}; paths are share-relative. Totals may grow. At most one of these objects
+// in a process.
 class Progress {
  public:
-    Progress(KTR::Task& task, const std::string& action);
+    Progress(KTR::Task& task, const std::string& user, const std::string& action);
     ~Progress();
     Progress(const Progress&) = delete;
     Progress& operator=(const Progress&) = delete;
@@ -31,12 +33,16 @@ class Progress {
     void done() { count(itemsDone_); }
     void skipped() { count(itemsSkipped_); }
     void failed(const std::string& path, int code);
+    // The same with a code and a key that the library does not have.
+    void failed(const std::string& path, int code, const char* key);
     // The whole operation failed.
     void broken(const std::string& path, int code);
     // What the operation was to make lacks something, although it was made.
     void markFailed() { state_ = "failed"; }
     // These came into the folder at `path` after what was chosen there was listed; the first of them are kept.
     void noteNew(const std::string& path, const std::vector<std::string>& names);
+    // Where it is written down how to undo what was done.
+    [[nodiscard]] UndoRecord& undo() { return undo_; }
     // How many items were done so far.
     [[nodiscard]] long long itemsDone() const { return itemsDone_; }
     // Whether the user wants the operation to end. To be asked often.
@@ -57,6 +63,7 @@ class Progress {
     [[nodiscard]] float fraction(long long underWay) const;
 
     KTR::Task& task_;
+    UndoRecord undo_;
     std::string action_, current_, state_ = "running";
     long long itemsDone_ = 0, itemsSkipped_ = 0, itemsFailed_ = 0, itemsTotal_ = 0;
     long long bytesDone_ = 0, bytesTotal_ = 0;

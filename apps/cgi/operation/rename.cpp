@@ -5,6 +5,8 @@
 
 #include "base/new_file.h"
 #include "operation/operation.h"
+#include "operation/task_start.h"
+#include "operation/undo_record.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 #include "reply.h"
@@ -34,6 +36,9 @@ int renameOperation(Operation& operation) {
     ShownSearch(operation.user.name, operation.web.GetParam("taskid", ""))
         .moved({info, target.folder, target.name}, {info, target.folder, *name});
     putPath(operation.data, "path", renamed);
+    UndoRecord undo(operation.user.name, newTaskId("rename"));
+    undo.moved(target.folder.get(), *name, renamed, info.path, status);
+    if (undo.count() > 0) operation.data["undo"] = undo.id();
     return ORV_ERR_NONE;
 }
 

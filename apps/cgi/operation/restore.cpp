@@ -6,23 +6,21 @@
 #include "operation/transfer.h"
 #include "operation/transfer_job.h"
 #include "orvel/error_state.h"
-#include "vexo/filesystem.h"
-#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
 
-// Opens the place where the item once was; folders that are gone are made again. 0 or a library code.
-int openOrigin(const User& user, const std::string& path, Conflict& conflict, PathInfo& info, Target& place) {
-    OrvLibSetErr(ORV_ERR_NONE);
-    if (!PathInfoFactory::create(user.name.c_str(), path, info)) return lastCode();
-    const int code = judgeTarget(user, info, conflict);
-    if (code != ORV_ERR_NONE) return code;
-    // A name that was marked by hand may lead to any.
-    const std::string name = info.path.substr(info.path.rfind('/') + 1);
-    VEXOShareNamesAt(info.realPath.c_str());
-    if (VEXOEAIsHiddenFile(name.c_str()) != 0) return ORV_ERR_RESERVED_NAME;
-    return openTarget(info, linkPolicyOf(info.shareName), user.name, Missing::kMake, place);
+// The folders above `path` that were made for it, the topmost first.
+void noteMade(const Target& place, std::string path, UndoRecord& undo) {
+    std::vector<std::string> paths;
+    for (size_t i = 0; i < place.made.size(); ++i) {
+        path.resize(path.rfind('/'));
+        paths.push_back(path);
+    }
+    for (const MadeFolder& made : place.made) {
+        undo.made(made.parent.get(), made.name, paths.back());
+        paths.pop_back();
+    }
 }
 
 void restoreOne(Operation& operation, size_t position, Conflict conflict, ChangeNotices& notices, Progress& progress) {
@@ -34,13 +32,14 @@ void restoreOne(Operation& operation, size_t position, Conflict conflict, Change
     if (code == ORV_ERR_NONE && (!bin || !bin->holds(item))) code = ORV_ERR_PARAMETER;
     PathInfo info;
     Target place;
-    if (code == ORV_ERR_NONE) code = openOrigin(user, bin->originOf(item), conflict, info, place);
+    if (code == ORV_ERR_NONE) code = openOrigin(user, bin->originOf(item), Missing::kMake, conflict, info, place);
     if (code == ORV_ERR_NONE && !linksStayInside(item, info, place.folder)) {
         removeMadeFolders(place);
         code = ORV_ERR_DENIED;
     }
     if (code != ORV_ERR_NONE) return progress.failed(operation.chosen.path(position), code);
 
+    noteMade(place, info.path, progress.undo());
     Transfer transfer(progress, {.conflict = conflict, .move = true, .owner = ownerFor(user.name), .onFat = false});
     Entry to = {place.folder.get(), place.name, info.path};
     const long long before = progress.itemsDone();

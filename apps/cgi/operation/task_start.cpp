@@ -17,12 +17,6 @@ namespace {
 
 constexpr rlim_t kMostDescriptors = 16384;  // two for each level of a tree
 
-// "" with errno when the kernel gives no random bytes.
-std::string newTaskId(const std::string& action) {
-    const std::string drawn = draw<8>();
-    return drawn.empty() ? "" : kTaskPrefix + action + "_" + drawn;
-}
-
 void allowDeepTrees() {
     rlimit limit{};
     if (getrlimit(RLIMIT_NOFILE, &limit) != 0) return;
@@ -31,9 +25,9 @@ void allowDeepTrees() {
 }
 
 // The process of the work: it begins once its record shows it and who asked for it knows.
-int runInBackground(KTR::Task& task, const std::string& action, const std::function<void(Progress&)>& work,
-                    const Begun& begun) {
-    Progress progress(task, action);
+int runInBackground(KTR::Task& task, const std::string& user, const std::string& action,
+                    const std::function<void(Progress&)>& work, const Begun& begun) {
+    Progress progress(task, user, action);
     const bool recorded = task.attach() && progress.publish();
     const bool heard = begun(recorded ? ORV_ERR_NONE : platformCode());
     if (!heard) task.remove();  // nobody waits for it, nobody would look for it
@@ -46,6 +40,11 @@ int runInBackground(KTR::Task& task, const std::string& action, const std::funct
 
 }  // namespace
 
+std::string newTaskId(const std::string& action) {
+    const std::string drawn = draw<8>();
+    return drawn.empty() ? "" : kTaskPrefix + action + "_" + drawn;
+}
+
 int startTask(Operation& operation, const std::string& action, const std::function<void(Progress&)>& work) {
     const char* user = operation.user.name.c_str();
     const int code = makeRoomForTask(user);
@@ -55,7 +54,7 @@ int startTask(Operation& operation, const std::string& action, const std::functi
     const std::unique_ptr<KTR::Task> task(id.empty() ? nullptr : manager.createTask(id.c_str()));
     if (task == nullptr) return OrvParseVexoErrToError(VLIBCErrGet(), nullptr);
     const int failure =
-        startBackground([&](const Begun& begun) { return runInBackground(*task, action, work, begun); });
+        startBackground([&](const Begun& begun) { return runInBackground(*task, user, action, work, begun); });
     if (failure != ORV_ERR_NONE) {
         task->remove();
         return failure;

@@ -72,6 +72,23 @@ Transfer::Result Transfer::done() {
     return Result::kDone;
 }
 
+void Transfer::noteMoved(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
+    if (made_ > 0 || hidden_) return;
+    if (replace) {
+        progress_.undo().leaveOut();
+    } else {
+        progress_.undo().moved(to.folder, to.name, to.path, from.path, status);
+    }
+}
+
+void Transfer::noteCopied(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
+    if (replace) {
+        progress_.undo().leaveOut();
+    } else {
+        progress_.undo().copied(to.folder, to.name, to.path, from.path, status);
+    }
+}
+
 bool Transfer::run(const Item& from, Entry& to) {
     top_ = &from;
     topTarget_.reset();
@@ -134,6 +151,7 @@ Transfer::Result Transfer::rename(const Entry& from, const struct stat& status, 
     if (replace && S_ISDIR(status.st_mode)) return fill(from, status, to, false);
     const bool renamed = replace ? renameat(from.folder, from.name.c_str(), to.folder, to.name.c_str()) == 0
                                  : renameNew(from.folder, from.name, to.folder, to.name);
+    if (renamed) noteMoved(from, status, to, replace);
     if (renamed) return done();
     if (errno == EXDEV) {
         renaming_ = false;
@@ -155,19 +173,24 @@ Transfer::Result Transfer::copy(const Entry& from, const struct stat& status, co
     } else {
         return failed(from, ORV_ERR_GENERAL);
     }
-    return result == Result::kDone ? arrived(from, status, to) : result;
+    return result == Result::kDone ? arrived(from, status, to, replace) : result;
 }
 
 // A file or link is copied. Of a move it is still to be removed: those in a folder together, as waiting for the disk
 // takes long.
-Transfer::Result Transfer::arrived(const Entry& from, const struct stat& status, const Entry& to) {
-    if (!rules_.move) return done();
+Transfer::Result Transfer::arrived(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
+    if (!rules_.move) {
+        noteCopied(from, status, to, replace);
+        return done();
+    }
     if (depth_ > 0) {
-        copied_.push_back({from.name, to.name, status});
+        copied_.push_back({from.name, to.name, status, replace});
         return Result::kDone;
     }
     if (!syncName(to.folder, to.name)) return failedWith(from, errno);
-    return removeSource(from, status) == Result::kDone ? done() : Result::kFailed;
+    if (removeSource(from, status) != Result::kDone) return Result::kFailed;
+    noteMoved(from, status, to, replace);
+    return done();
 }
 
 Transfer::Result Transfer::copyFile(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
@@ -203,8 +226,19 @@ Transfer::Result Transfer::makeFolder(const Entry& from, const struct stat& stat
     if (mkdirat(to.folder, to.name.c_str(), kUntilFilled) != 0) {
         return errno == EEXIST ? Result::kExists : failedWith(from, errno);
     }
+    if (!rules_.move) {
+        progress_.undo().made(to.folder, to.name, to.path);
+        return fill(from, status, to, true);
+    }
     // What is removed for the sake of a copy in it must not be lost with it.
-    if (!rules_.move || syncName(to.folder, to.name)) return fill(from, status, to, true);
+    if (syncName(to.folder, to.name)) {
+        ++made_;
+        const Result result = fill(from, status, to, true);
+        --made_;
+        if (result == Result::kDone) noteMoved(from, status, to, false);
+        if (result != Result::kDone && made_ == 0) progress_.undo().leaveOut();
+        return result;
+    }
     const int error = errno;
     unlinkat(to.folder, to.name.c_str(), AT_REMOVEDIR);
     return failedWith(from, error);
@@ -243,6 +277,7 @@ Transfer::Result Transfer::fill(const Entry& from, const struct stat& status, co
         return Result::kFailed;
     }
     if (rules_.move && removeSource(from, status) != Result::kDone) return Result::kFailed;
+    if (rules_.move && !made && made_ == 0 && !hidden_) progress_.undo().removed(from.path, status);
     static_cast<void>(done());
     return all ? Result::kDone : Result::kFailed;
 }
@@ -252,7 +287,7 @@ bool Transfer::fillWhole(const Entry& from, const Descriptor& source, const Entr
     std::vector<Copied> above = std::exchange(copied_, {});
     ++depth_;
     bool all = fillFrom(from, source, to, target);
-    all = removeCopied(from, source, target) && all;
+    all = removeCopied(from, source, to, target) && all;
     --depth_;
     copied_ = std::move(above);
     return all;
@@ -290,7 +325,7 @@ bool Transfer::fillFrom(const Entry& from, const Descriptor& source, const Entry
             all = place(child, status, childTo, taken) == Result::kDone && all;
         }
         hidden_ = hidden;
-        if (copied_.size() >= kMostCopied) all = removeCopied(from, source, target) && all;
+        if (copied_.size() >= kMostCopied) all = removeCopied(from, source, to, target) && all;
     }
     return all;
 }
@@ -304,7 +339,7 @@ bool Transfer::isOnDisk(const Copied& copied, const Descriptor& target) {
 }
 
 // Removes from the folder `from` what was copied out of it, once that is on the disk. True when all of it is gone.
-bool Transfer::removeCopied(const Entry& from, const Descriptor& source, const Descriptor& target) {
+bool Transfer::removeCopied(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target) {
     const std::vector<Copied> copied = std::exchange(copied_, {});
     if (copied.empty()) return true;
     // All at once: each file's own waiting, which alone some file systems know, is short then.
@@ -326,7 +361,9 @@ bool Transfer::removeCopied(const Entry& from, const Descriptor& source, const D
     for (const Copied* one : safe) {
         VEXOShareNamesOf(source.get());
         hidden_ = hidden || !isShown(one->name);
-        const bool removed = removeSource(from.child(source.get(), one->name), one->status) == Result::kDone;
+        const Entry child = from.child(source.get(), one->name);
+        const bool removed = removeSource(child, one->status) == Result::kDone;
+        if (removed) noteMoved(child, one->status, to.child(target.get(), one->copy), one->replaced);
         if (removed) static_cast<void>(done());
         all = removed && all;
     }

@@ -17,7 +17,8 @@ namespace orvel::cgi {
 
 // Files appear under their names whole or not at all, with the permissions and times of the source; a new folder gets
 // them once it is filled. Links are copied as they are. What fails is reported, each item for itself, and the rest goes
-// on; so does what is neither a file, a folder nor a link. A copy passes hidden names over.
+// on; so does what is neither a file, a folder nor a link. A copy passes hidden names over. The progress learns how to
+// undo it, except what replaced something else, which would not come back.
 //
 // A move is a rename; where that is not possible, on another file system, it is a copy, hidden names included, after
 // which the source is removed: once the copy is on the disk, and nothing but what was copied.
@@ -49,6 +50,7 @@ class Transfer {
     struct Copied {
         std::string name, copy;
         struct stat status;
+        bool replaced;
     };
 
     Result place(const Entry& from, const struct stat& status, Entry& to, Names& taken);
@@ -63,11 +65,13 @@ class Transfer {
     Result fill(const Entry& from, const struct stat& status, const Entry& to, bool made);
     bool fillWhole(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target);
     bool fillFrom(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target);
-    Result arrived(const Entry& from, const struct stat& status, const Entry& to);
-    bool removeCopied(const Entry& from, const Descriptor& source, const Descriptor& target);
+    Result arrived(const Entry& from, const struct stat& status, const Entry& to, bool replace);
+    bool removeCopied(const Entry& from, const Descriptor& source, const Entry& to, const Descriptor& target);
     static bool isOnDisk(const Copied& copied, const Descriptor& target);
     void makeAlike(const Entry& to, const Descriptor& folder, const struct stat& status) const;
     Result removeSource(const Entry& from, const struct stat& status);
+    void noteMoved(const Entry& from, const struct stat& status, const Entry& to, bool replace);
+    void noteCopied(const Entry& from, const struct stat& status, const Entry& to, bool replace);
     Result failed(const Entry& entry, int code);
     Result failedWith(const Entry& entry, int error);
     Result done();
@@ -82,6 +86,7 @@ class Transfer {
     bool hidden_ = false;                           // what is at work is never shown, nor counted
     std::vector<Copied> copied_;                    // in the folder at work
     int depth_ = 0;
+    int made_ = 0;  // folders above what is at work that were made for a move: they are undone as a whole
     long long bytes_ = 0;
 };
 

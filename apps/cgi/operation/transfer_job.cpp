@@ -6,7 +6,9 @@
 #include "operation/transfer.h"
 #include "orvel/error_state.h"
 #include "orvel/privilege.h"
+#include "reply.h"
 #include "vexo/filesystem.h"
+#include "vexo/share_files.h"
 
 namespace orvel::cgi {
 namespace {
@@ -92,6 +94,19 @@ int judgeTarget(const User& user, const PathInfo& info, Conflict& conflict) {
     if (!CheckShareUploadPrivilege(user.name.c_str(), user.sid.c_str(), info.path.c_str(), mode)) return lastCode();
     if (conflict == Conflict::kOverwrite && mode != OVERWRITE_MODE_OVERWRITE) conflict = Conflict::kSkip;
     return ORV_ERR_NONE;
+}
+
+int openOrigin(const User& user, const std::string& path, Missing missing, Conflict& conflict, PathInfo& info,
+               Target& place) {
+    OrvLibSetErr(ORV_ERR_NONE);
+    if (!PathInfoFactory::create(user.name.c_str(), path, info)) return lastCode();
+    const int code = judgeTarget(user, info, conflict);
+    if (code != ORV_ERR_NONE) return code;
+    // Who names the place may have named any.
+    const std::string name = info.path.substr(info.path.rfind('/') + 1);
+    VEXOShareNamesAt(info.realPath.c_str());
+    if (VEXOEAIsHiddenFile(name.c_str()) != 0) return ORV_ERR_RESERVED_NAME;
+    return openTarget(info, linkPolicyOf(info.shareName), user.name, missing, place);
 }
 
 int startTransfer(Operation& operation, bool move) {

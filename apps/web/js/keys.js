@@ -28,12 +28,12 @@ function shortcut(event) {
   const writing = event.target.closest?.("input:not([type=checkbox]), textarea, select, [contenteditable]");
   const found = allCommands().find((command) => keysOf(command).some((keys) => matches(event, keys)));
   if (!found || (writing && !event.ctrlKey && !event.metaKey && !event.altKey)) return;
-  if (writing && ["selectAll", "copy", "cut", "paste"].includes(found.id)) return;
+  if (writing && ["selectAll", "copy", "cut", "paste", "undo"].includes(found.id)) return;
   // A plain key on a button or a link is that button's.
   const onControl = event.target.closest?.("button, a, [role=treeitem]");
   if (onControl && ["Enter", " "].includes(event.key)) return;
   // What is chosen in the list is not what the keyboard stands on in the tree.
-  if (found.group === "change" && event.target.closest?.("[role=tree]")) return;
+  if (found.group === "change" && found.id !== "undo" && event.target.closest?.("[role=tree]")) return;
   if (!found.when(context())) return;
   event.preventDefault();
   runCommand(found.id);

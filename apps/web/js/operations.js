@@ -51,6 +51,7 @@ export function searchTask() {
 }
 
 export async function rename(entry) {
+  let undo;
   const unchanged = entry.name.replace(/[\r\n]/g, ""); // as a field shows it
   const [stem] = entry.isFolder ? [entry.name] : splitExtension(entry.name);
   const asked = {
@@ -62,12 +63,12 @@ export async function rename(entry) {
     check: (text) => (text === unchanged ? "" : checkName(text)),
     submit: async (name) => {
       if (name === unchanged) return entry.id;
-      await post("operation", {
+      ({ undo } = await post("operation", {
         action: "rename",
         path_raw: entry.id,
         name_raw: encodeName(name),
         taskid: searchTask(),
-      });
+      }));
       return childOf(entry.parent, encodeName(name));
     },
   };
@@ -77,6 +78,8 @@ export async function rename(entry) {
   const renamed = await (row ? askInPlace(row, asked) : askText(asked));
   if (!renamed || renamed === entry.id) return;
   if (entry.isFolder) emit("folders-changed", { ids: [entry.parent] });
+  const folders = entry.isFolder ? [entry.parent] : [];
+  if (undo) emit("renamed", { id: undo, title: t("rename.done", { from: entry.name, to: nameOf(renamed) }), folders });
   await refresh(renamed);
 }
 

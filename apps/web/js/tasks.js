@@ -1,23 +1,26 @@
 // Work that goes on in the background of the server: copy, move, delete, restore, compress, extract. It outlives the
 // page; what runs is shown again after a reload, and in every tab.
 
-import { get, post } from "./api.js";
+import { get, MISSING, post } from "./api.js";
 import { Card } from "./activity.js";
 import { browser, go, refresh } from "./browser.js";
+import { addCommand } from "./commands.js";
 import { Choice } from "./choice.js";
 import { askText, toast, toastFailure } from "./dialogs.js";
 import { plainName } from "./dom.js";
 import { describe } from "./errors.js";
-import { arrived, emit } from "./events.js";
+import { arrived, emit, on } from "./events.js";
 import { formatSize } from "./format.js";
-import { childOf, idIn, isWithin, lastOf, nameOf } from "./path.js";
+import { idIn, isWithin, nameOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { searchTask } from "./operations.js";
 import { forget, note, noteOf } from "./task_notes.js";
 import { t } from "./strings.js";
+import { canUndo, isUndone, lastDone } from "./undo.js";
 
 const POLL = 600;
 const LOCKED = 1403;
+const BUSY = 420;
 const ICONS = {
   copy: "copy",
   move: "move",
@@ -26,6 +29,7 @@ const ICONS = {
   empty: "trash",
   compress: "archive",
   extract: "extract",
+  undo: "restore",
 };
 
 const cards = new Map(); // task -> {card, order}
@@ -35,6 +39,10 @@ let timer = null;
 export async function setupTasks() {
   tabs.addEventListener("message", look);
   addEventListener("focus", look);
+  on("renamed", (what) => {
+    canUndo(what);
+    toast({ text: what.title, actions: [{ label: t("activity.undo"), run: () => undo(what) }] });
+  });
   await arrived;
   const { tasks } = await get("operation", { action: "status" }).catch(() => ({ tasks: [] }));
   for (const task of tasks) {
@@ -84,7 +92,8 @@ function show(task, order = { folders: [] }) {
 }
 
 function titleOf(task) {
-  const { count = task.items_total ?? 0, name, target } = noteOf(task.taskid);
+  const { count = task.items_total ?? 0, name, target, undone = "" } = noteOf(task.taskid);
+  if (task.action === "undo") return t("task.of.undo", { what: undone });
   const what = name === undefined ? t("task.items.some", { count }) : t("task.item", { name });
   const key = target && ["copy", "move", "extract"].includes(task.action) ? "to" : "of";
   return t(`task.${key}.${task.action}`, { what, folder: target ? labelOf(target) : "" });
@@ -150,18 +159,20 @@ function finish(task, card, order) {
     task.items_skipped > 0 && t("upload.skipped", { count: task.items_skipped }),
     task.items_failed > 0 && t("upload.failed", { count: task.items_failed }),
     bin && task.items_done > 0 && t("task.binned"),
+    order.back?.leftOut > 0 && t("undo.left_out", { count: order.back.leftOut }),
     task.new_count > 0 && t("task.new", { count: task.new_count, name: nameOf(idIn(task.new[0])) }),
   ];
   const kind = task.state === "cancelled" ? "stopped" : isGood(task) ? "good" : "failed";
   const again = retryOf(task, order);
-  const back = undoOf(task, order);
+  const back = order.back ?? { id: task.taskid, title: titleOf(task), folders: order.folders, leftOut: task.undo_left_out };
+  if (task.undo_count > 0 && order.choice) canUndo(back);
   const actions = [
     target && task.items_done > 0 && { label: t("activity.show"), run: () => go(target) },
-    back && {
-      label: t("activity.undo"),
+    (task.undo_count > 0 || (order.back && !isGood(task))) && {
+      label: t(order.back ? "state.retry" : "activity.undo"),
       run: () => {
         card.remove();
-        startTask("move", back.choice, back);
+        undo(back);
       },
     },
     again && {
@@ -180,14 +191,22 @@ function finish(task, card, order) {
   refresh();
 }
 
-// The way back of what was moved from one folder, under the names that it had. Where a name could have been another's it
-// has no way back, nor have rows of a list, whose names the page does not know.
-function undoOf(task, { choice, params = {}, target }) {
-  if (task.action !== "move" || !isGood(task) || task.items_skipped > 0 || params.conflict !== "error") return null;
-  if (!choice || choice.rows || choice.folders.length > 1) return null;
-  const [from] = choice.folders;
-  const moved = new Choice(choice.entries.map(({ id }) => ({ id: childOf(target, lastOf(id)) })));
-  return { choice: moved, params: { target_raw: from, conflict: "error" }, affected: [from], target: from };
+// Undoes what was done, item by item; what has changed since stays, and is named. {id, title, folders, leftOut}
+export async function undo(what) {
+  const { id, title, folders } = what;
+  isUndone(id);
+  cards.get(id)?.card.remove();
+  try {
+    const { taskid } = await post("operation", { action: "undo", taskid: id, search: searchTask() });
+    note(taskid, { undone: title });
+    show({ taskid, action: "undo", state: "running", items_done: 0, progress: 0 }, { folders, back: what });
+    tabs.postMessage(taskid);
+  } catch (failure) {
+    if (failure.code === MISSING) return toast({ text: t("undo.gone"), kind: "failed" });
+    canUndo(what);
+    toastFailure(failure.code === BUSY ? { key: "page:undo_busy" } : failure);
+  }
+  return undefined;
 }
 
 // Whether what failed is an archive whose password is not known.
@@ -226,3 +245,12 @@ function retryOf(task, { choice, params, folders }) {
   const conflict = params.conflict && (goesOn[params.conflict] ?? params.conflict);
   return { choice: some, params: { ...params, conflict }, affected: folders };
 }
+
+addCommand({
+  id: "undo",
+  icon: "restore",
+  keys: ["Mod+z"],
+  group: "change",
+  when: () => lastDone() !== undefined,
+  run: () => undo(lastDone()),
+});

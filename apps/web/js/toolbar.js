@@ -59,7 +59,7 @@ export function contextItems() {
     return [
       ...items(["newFolder", "upload", "uploadFolder"]),
       "-",
-      ...items(["paste", "selectAll", "refresh"]),
+      ...items(["undo", "paste", "selectAll", "refresh"]),
       "-",
       ...items(["emptyBin", "properties"]),
     ];
