@@ -9,7 +9,6 @@ shift 2
 for program in node npm; do # Node.js 20 or later
     command -v "$program" >/dev/null || { echo "FAILED: $program is not installed"; exit 1; }
 done
-[ -x "${ORVEL_TEST_CHROMIUM:-/usr/bin/chromium}" ] || { echo "FAILED: chromium is not installed"; exit 1; }
 [ -x "${ORVEL_TEST_FIREFOX:-/usr/bin/firefox-esr}" ] || { echo "FAILED: firefox-esr is not installed"; exit 1; }
 cmp -s "$here/package-lock.json" "$here/node_modules/.installed" ||
     { (cd "$here" && npm ci --no-audit --no-fund --loglevel=error) && cp "$here/package-lock.json" "$here/node_modules/.installed"; } ||
