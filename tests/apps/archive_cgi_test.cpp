@@ -4,7 +4,6 @@
 #include <sys/sysmacros.h>
 
 #include "apps/task_fixture.h"
-#include "support/testing.h"
 
 namespace {
 

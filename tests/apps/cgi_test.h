@@ -2,10 +2,6 @@
 #ifndef ORVEL_TESTS_APPS_CGI_TEST_H
 #define ORVEL_TESTS_APPS_CGI_TEST_H
 
-#include <algorithm>
-#include <string>
-#include <vector>
-
 #include "apps/program.h"
 #include "support/testing.h"
 #include "text.h"
@@ -32,6 +28,15 @@ class CgiTest : public ApplianceTest {
         Names texts;
         for (const Json::Value& item : items) texts.push_back(item[member].asString());
         return texts;
+    }
+    // What a search found, once it has ended.
+    static Json::Value searched(const std::string& user, const std::string& id) {
+        Json::Value data;
+        waitUntil("the end of search " + id, [&] {
+            data = get(PROGRAM_SEARCH, user, "action=list&taskid=" + id).json["data"];
+            return data["finished"].asBool() || HasFailure();
+        });
+        return data;
     }
     static Names namesIn(const std::string& folder) {
         Names names;

@@ -1,9 +1,7 @@
 // What the doctor says of an appliance in which one thing is not as it should be.
-#include <gtest/gtest.h>
 #include <json/reader.h>
 
 #include "apps/orveld.h"
-#include "apps/program.h"
 #include "support/testing.h"
 
 namespace {

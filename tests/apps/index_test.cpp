@@ -1,20 +1,15 @@
 // orvelctl index: what an update makes of an index, and what breaks one off.
 #include <spawn.h>
-#include <sys/wait.h>
 
-#include <csignal>
 #include <fstream>
-#include <map>
 #include <random>
 
 #include "apps/program.h"
-#include "fault_gate.h"
 #include "index/folder_state.h"
 #include "index/share_files.h"
 #include "support/gate.h"
 #include "support/refuse_calls.h"
 #include "support/testing.h"
-#include "support/wait.h"
 #include "vexo/index.h"
 
 using namespace orvel::ctl;

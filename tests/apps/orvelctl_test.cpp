@@ -1,8 +1,4 @@
 // What the command-line tool says of itself: help, its exit status, completion.
-#include <gtest/gtest.h>
-#include <unistd.h>
-
-#include <sstream>
 
 #include "apps/program.h"
 #include "criteria.h"

@@ -8,15 +8,11 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
-#include <chrono>
 #include <csignal>
 #include <cstring>
-#include <functional>
 #include <memory>
 #include <sstream>
-#include <thread>
 #include <utility>
 
 #include "listener.h"
@@ -79,15 +75,6 @@ std::string freeSocket() {
 
 }  // namespace
 
-bool waitFor(const char* what, const std::function<bool()>& holds) {
-    for (int waited = 0; waited < kPatience; waited += 10) {
-        if (holds()) return true;
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    }
-    ADD_FAILURE() << "waited in vain: " << what;
-    return false;
-}
-
 Connection::Connection(const std::string& socket) : fd_(orvel::orveld::connectTo(socket)) {
     EXPECT_GE(fd_, 0) << socket << " " << strerror(errno);
 }
@@ -136,7 +123,7 @@ Orveld::Orveld(const Variables& settings, const Variables& environment, bool kep
     const std::vector<std::string> alone = {ORVELD, "--socket", socket_}, through = {ORVELD_KEEPER, socket_, ORVELD};
     started_ = spawn(kept ? through : alone, environment);
     EXPECT_GT(started_, 0);
-    waitFor("orveld to listen", [&] { return !figures().isNull(); });
+    waitUntil("orveld to listen", [&] { return !figures().isNull(); });
     if (!kept) writeFile(file, before);
 }
 

@@ -5,7 +5,6 @@
 #include <json/value.h>
 #include <sys/types.h>
 
-#include <functional>
 #include <string>
 #include <vector>
 
@@ -66,9 +65,6 @@ class Orveld {
 std::string blockOf(const Variables& variables);
 Variables requestOf(const std::string& program, const std::string& user, const std::string& query,
                     const std::string& method = "GET", const Variables& more = {});
-
-// Waits until `holds`, at most half a minute; a failure of the test that names `what` otherwise.
-bool waitFor(const char* what, const std::function<bool()>& holds);
 
 }  // namespace support
 

@@ -3,9 +3,7 @@
 //
 // ORVEL_RACE_SECONDS: how long each race lasts, 200 rounds without it.
 #include <linux/fs.h>
-#include <sys/syscall.h>
 
-#include <csignal>
 #include <iostream>
 
 #include "chosen_folders.h"

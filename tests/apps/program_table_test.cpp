@@ -1,7 +1,4 @@
 // What the table of programs decides before a program sees the request.
-#include <gtest/gtest.h>
-
-#include <string>
 
 #include "apps/program.h"
 #include "program/program.h"

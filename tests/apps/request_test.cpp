@@ -1,11 +1,8 @@
 #include "request.h"
 
 #include <grp.h>
-#include <sys/syscall.h>
 
 #include <optional>
-#include <string>
-#include <vector>
 
 #include "client_address.h"
 #include "support/refuse_calls.h"

@@ -8,16 +8,10 @@ namespace {
 
 class RootsCgi : public TaskCgi {
  protected:
-    static CgiReply get(const char* program, const std::string& query) {
-        return CgiReply(support::runCgi(program, "alice", "GET", query));
-    }
-    static CgiReply post(const char* program, const std::string& form) {
-        return CgiReply(support::runCgi(program, "alice", "POST", "", form,
-                                        {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}));
-    }
+    static CgiReply get(const char* program, const std::string& query) { return CgiTest::get(program, "alice", query); }
+    static CgiReply post(const char* program, const std::string& form) { return CgiTest::post(program, "alice", form); }
     static std::string pathsIn(const Json::Value& data) {
-        std::vector<std::string> paths;
-        for (const Json::Value& item : data["items"]) paths.push_back(item["path"].asString());
+        Names paths = each(data["items"], "path");
         std::sort(paths.begin(), paths.end());
         std::string all;
         for (const std::string& path : paths) all += path + " ";
@@ -32,14 +26,7 @@ class RootsCgi : public TaskCgi {
         EXPECT_TRUE(reply.json["success"].asBool()) << reply.body;
         return reply.json["data"]["taskid"].asString();
     }
-    static std::string rows(const std::string& id) {
-        Json::Value data;
-        support::waitUntil("the end of search " + id, [&] {
-            data = get(PROGRAM_SEARCH, "action=list&taskid=" + id).json["data"];
-            return data["finished"].asBool() || HasFailure();
-        });
-        return pathsIn(data);
-    }
+    static std::string rows(const std::string& id) { return pathsIn(searched("alice", id)); }
     static int upload(const std::string& path) {
         return code(CgiReply(support::runCgi(PROGRAM_UPLOAD, "alice", "PUT", "path=" + percentEncode(path), "data")));
     }
@@ -59,6 +46,9 @@ void RootsCgi::useShare(const std::string& name, const std::string& root) {
 
     const std::string id = search(top), shown = "&taskid=" + id;
     EXPECT_EQ(rows(id), top + "/a/b/one.txt " + top + "/two.txt ");
+    EXPECT_EQ(support::runProgram({ORVELCTL, "index", "build", name}).status, 0);
+    EXPECT_EQ(rows(search(top)), top + "/a/b/one.txt " + top + "/two.txt ") << "from the index";
+    EXPECT_EQ(support::runProgram({ORVELCTL, "index", "drop", name}).status, 0);
     EXPECT_EQ(code(ask("alice", "action=rename&name=c&path=" + top + "/a/b" + shown)), 0);
     EXPECT_EQ(rows(id), top + "/a/c/one.txt " + top + "/two.txt ");
     EXPECT_EQ(errors(perform("alice", "action=move" + shown + about({top + "/a/c"}, top))), "");
@@ -108,7 +98,7 @@ void RootsCgi::refuseTemporaryFolder(const std::string& top) {
 
 TEST_F(RootsCgi, EverythingWorksAtAnyDepth) {
     SKIP_WITHOUT_ROOT();
-    const std::string deep = photo_ + "/srv/samba/team", options = "read only = no\nvalid users = alice\npath = ";
+    const std::string deep = photo_ + "/srv/samba/team", options = "read only = no\nvexo:index = yes\npath = ";
     addShare("team", options + deep + "\n");
     addShare("data", options + "/mnt\n");
     support::makeFolder(systemRoot() + "/usr/vexo/etc/pexlander");

@@ -1,10 +1,5 @@
 // The program search, run as a web server runs it, and what it finds by walking and from indexes.
-#include <json/value.h>
 #include <sys/resource.h>
-
-#include <csignal>
-#include <map>
-#include <set>
 
 #include "apps/cgi_test.h"
 #include "support/gate.h"
@@ -327,7 +322,7 @@ TEST_F(SearchCgi, SearchesOfTheDayBeforeYesterdayAreSweptAway) {
 
 TEST_F(SearchCgi, ASearchThatCouldNotStoreAllHasFailed) {
     SKIP_WITHOUT_ROOT();
-    for (int i = 0; i < 3000; ++i) writeFile(shareRoot("photo") + "/" + std::to_string(i), "");
+    for (int i = 0; i < 1000; ++i) writeFile(shareRoot("photo") + "/" + std::to_string(i), "");
     for (const bool indexed : {false, true}) {
         addShare("photo", indexed ? kIndexed : "read only = no\n");
         if (indexed) index("build", "photo");
@@ -337,7 +332,7 @@ TEST_F(SearchCgi, ASearchThatCouldNotStoreAllHasFailed) {
             const std::string id = start("carol", "path=/photo&type=file");
             const Json::Value data = finished("carol", id).json["data"];
             EXPECT_TRUE(data["failed"].asBool()) << data.toStyledString().substr(0, 500);
-            EXPECT_LT(data["total"].asInt(), 3000);
+            EXPECT_LT(data["total"].asInt(), 1000);
             EXPECT_TRUE(ask("carol", "action=clean&taskid=" + id).json["success"].asBool());
             return 0;
         });
@@ -361,21 +356,19 @@ TEST_F(SearchCgi, WhatAnIndexCannotHoldIsSaid) {
 
 TEST_F(SearchCgi, ResultsFollowTheOperations) {
     SKIP_WITHOUT_ROOT();
-    const std::string root = addShare("photo", "read only = no\n"), folder = root + "/_50%*'\"",
-                      twin = root + "/x50%*'\"";
+    const std::string root = addShare("photo", "read only = no\n");
     fs::create_directory_symlink("_50%*'\"", root + "/link");
-    for (int i = 0; i < 1000; ++i) writeFile(folder + "/deep/" + std::to_string(i) + ".txt", "abc");
-    writeFile(twin + "/deep/stays.txt", "abc");
+    for (const char* file : {"/_50%*'\"/deep/7.txt", "/_50%*'\"/deep/8.txt", "/x50%*'\"/deep/stays.txt"})
+        writeFile(root + file, "abc");
     EXPECT_EQ(runProgram({"/bin/chown", "-R", "20001:20100", root}).status, 0);
     const std::string id = start("alice", "path=/photo&extension=txt");
-    EXPECT_EQ(finished("alice", id).json["data"]["total"].asUInt(), 1001U);
+    EXPECT_EQ(finished("alice", id).json["data"]["total"].asUInt(), 3U);
     const auto operation = [&](const std::string& form) {
         EXPECT_EQ(code(post(PROGRAM_OPERATION, "alice", form + "&taskid=" + id)), 0) << form;
     };
     // Through a link, as a page may show it: the rows have the paths without.
     operation("action=rename&path=/photo/link/deep&name=new%20place");
     operation("action=rename&path=/photo/" + percentEncode("_50%*'\"") + "&name=" + percentEncode("%_ renamed"));
-    operation("action=rename&path=/photo/" + percentEncode("%_ renamed") + "/new%20place/7.txt&name=zzz.TXT");
     operation("action=mkdir&path=/photo/made.txt");
     for (const std::string size : {"12345", "1234567"}) {
         const std::string query = "overwrite=overwrite&path=/photo/up.txt&taskid=" + id;
@@ -383,17 +376,11 @@ TEST_F(SearchCgi, ResultsFollowTheOperations) {
     }
     const Json::Value data = list("alice", id, "additional=size&sort_by=name&sort_direction=desc").json["data"];
     const std::string moved = "/photo/%_ renamed/new place/";
-    EXPECT_EQ(data["total"].asUInt(), 1003U);
-    EXPECT_EQ(data["items"][0]["path"], moved + "zzz.TXT");
-    EXPECT_EQ(data["items"][1]["path"], "/photo/up.txt");
-    EXPECT_EQ(data["items"][1]["additional"]["size"], 7.0);
-    EXPECT_EQ(data["items"][2]["path"], "/photo/x50%*'\"/deep/stays.txt");
-    EXPECT_EQ(data["items"][3]["path"], "/photo/made.txt");
-    for (Json::ArrayIndex i = 4; i < data["items"].size(); ++i) {
-        EXPECT_TRUE(data["items"][i]["path"].asString().starts_with(moved)) << data["items"][i];
-    }
+    EXPECT_EQ(each(data["items"], "path"), (Names{"/photo/up.txt", "/photo/x50%*'\"/deep/stays.txt", "/photo/made.txt",
+                                                  moved + "8.txt", moved + "7.txt"}));
+    EXPECT_EQ(data["items"][0]["additional"]["size"], 7.0);
     EXPECT_EQ(list("alice", id, "filetype=dir").json["data"]["items"][0]["name"], "made.txt");
-    EXPECT_EQ(list("alice", id, "filter=ZZ").json["data"]["total"].asUInt(), 1U);
+    EXPECT_EQ(list("alice", id, "filter=8.T").json["data"]["total"].asUInt(), 1U);
     EXPECT_EQ(list("alice", id, "limit=0").status, 400);
     EXPECT_EQ(post(PROGRAM_OPERATION, "alice", "action=mkdir&path=/photo/q&taskid=../x").status, 400);
 }

@@ -1,7 +1,4 @@
 // Background operations as whoever started them sees them: progress, cancelling, lists, the search on screen.
-#include <chrono>
-#include <csignal>
-#include <thread>
 
 #include "apps/task_fixture.h"
 #include "support/gate.h"
@@ -116,13 +113,8 @@ TEST_F(TaskCgi, TheSearchOnScreenFollows) {
     const std::string id =
         post(PROGRAM_SEARCH, "alice", "action=start&path=/photo&name=found").json["data"]["taskid"].asString();
     const auto found = [&] {
-        Json::Value page;
-        waitUntil("the end of the search", [&] {
-            page = get(PROGRAM_SEARCH, "alice", "action=list&taskid=" + id).json["data"];
-            return page["finished"].asBool();
-        });
         std::string all;
-        for (const std::string& path : each(page["items"], "path")) all += path + " ";
+        for (const std::string& path : each(searched("alice", id)["items"], "path")) all += path + " ";
         return all;
     };
     std::string mine = "/photo/m/found6 /photo/m/roots/found7 ";

@@ -3,7 +3,6 @@
 #define ORVEL_TESTS_APPS_TASK_FIXTURE_H
 
 #include "apps/cgi_test.h"
-#include "support/wait.h"
 #include "vexo/task.h"
 
 // "path=..&path=.." of these paths, and a target unless it is empty.

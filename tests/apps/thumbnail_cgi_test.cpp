@@ -1,5 +1,4 @@
 // The program thumbnail with real pictures, and the place in which foreign decoders run.
-#include <fcntl.h>
 #include <sys/file.h>
 #include <sys/mman.h>
 
@@ -26,7 +25,7 @@ class ThumbnailCgi : public CgiTest {
     void SetUp() override {
         CgiTest::SetUp();
         makeFolder(shareRoot("photo"), 0755);
-        vips({"black", at("a.png"), "800", "400", "--bands", "3"});
+        vips({"black", at("a.png"), "320", "160", "--bands", "3"});
         chmod(at("a.png").c_str(), 0644);
     }
     static std::string at(const std::string& name) { return shareRoot("photo") + "/" + name; }
@@ -37,13 +36,13 @@ class ThumbnailCgi : public CgiTest {
     static RawReply fetch(const std::string& name, const std::string& more = "", const Variables& variables = {}) {
         return RawReply(runCgi(PROGRAM_THUMBNAIL, "alice", "GET", "path=/photo/" + name + more, "", variables));
     }
-    // Width and height.
+    // "WIDTHxHEIGHT".
     std::string extentOf(const std::string& picture) {
         const std::string file = systemRoot() + "/tmp/drawn";
         writeFile(file, picture, 0600);
+        std::istringstream words(runProgram({"/usr/bin/vipsheader", file}).output);  // behind the name
         std::string extent;
-        for (const char* field : {"width", "height"})
-            extent += runProgram({"/usr/bin/vipsheader", "-f", field, file}).output;
+        words >> extent >> extent;
         return extent;
     }
     // All the seats of those who make pictures.
@@ -59,25 +58,25 @@ class ThumbnailCgi : public CgiTest {
 };
 
 TEST_F(ThumbnailCgi, EachKindIsDrawnSmallAndUpright) {
-    for (const char* ending : {"jpg", "webp", "gif", "tif", "heic", "avif"}) {
+    for (const char* ending : {"jpg", "gif", "tif", "heic", "avif"}) {
         vips({"copy", at("a.png"), at(std::string("a.") + ending)});
     }
+    vips({"black", at("a.webp"), "800", "400", "--bands", "3"});
     const std::string camera = readFile(at("a.jpg"));
     writeFile(at("turned.jpg"), camera.substr(0, 2) + kTurned + camera.substr(2), 0644);
     writeFile(at("a.pdf"), kDocument, 0644);
-    vips({"copy", at("a.png"), at("named.txt.png")});
-    fs::rename(at("named.txt.png"), at("named.txt"));
+    fs::copy_file(at("a.png"), at("named.txt"));
     for (const auto& [name, more, type, extent] :
-         Rows<std::string, std::string, std::string, std::string>{{"a.png", "", "image/webp", "256\n128\n"},
-                                                                  {"a.jpg", "&size=100", "image/webp", "128\n64\n"},
-                                                                  {"a.webp", "&size=512", "image/webp", "512\n256\n"},
-                                                                  {"a.gif", "&size=1024", "image/webp", "800\n400\n"},
-                                                                  {"a.tif", "", "image/webp", "256\n128\n"},
-                                                                  {"a.heic", "", "image/webp", "256\n128\n"},
-                                                                  {"a.avif", "", "image/webp", "256\n128\n"},
-                                                                  {"named.txt", "", "image/webp", "256\n128\n"},
-                                                                  {"turned.jpg", "", "image/webp", "128\n256\n"},
-                                                                  {"a.pdf", "", "image/png", "256\n128\n"}}) {
+         Rows<std::string, std::string, std::string, std::string>{{"a.png", "", "image/webp", "256x128"},
+                                                                  {"a.jpg", "&size=100", "image/webp", "128x64"},
+                                                                  {"a.webp", "&size=512", "image/webp", "512x256"},
+                                                                  {"a.gif", "&size=1024", "image/webp", "320x160"},
+                                                                  {"a.tif", "", "image/webp", "256x128"},
+                                                                  {"a.heic", "", "image/webp", "256x128"},
+                                                                  {"a.avif", "", "image/webp", "256x128"},
+                                                                  {"named.txt", "", "image/webp", "256x128"},
+                                                                  {"turned.jpg", "", "image/webp", "128x256"},
+                                                                  {"a.pdf", "", "image/png", "256x128"}}) {
         SCOPED_TRACE(name);
         const RawReply reply = fetch(name, more);
         ASSERT_EQ(reply.status, 200) << reply.body;

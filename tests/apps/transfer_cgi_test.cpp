@@ -1,7 +1,4 @@
 // Copies and moves.
-#include <sys/mount.h>
-
-#include <map>
 
 #include "apps/task_fixture.h"
 #include "platform/private_mounts.h"

@@ -1,14 +1,10 @@
 // The program upload, run as a web server runs it.
 #include <sched.h>
 #include <sys/mount.h>
+#include <sys/resource.h>
 #include <sys/sysmacros.h>
 
-#include <fstream>
-#include <thread>
-
 #include "apps/cgi_test.h"
-#include "support/refuse_calls.h"
-#include "vexo/filesystem.h"
 
 namespace {
 
@@ -23,31 +19,12 @@ class UploadCgi : public CgiTest {
         const std::string query = "path=" + percentEncode(path) + "&overwrite=" + mode;
         return CgiReply(runCgi(PROGRAM_UPLOAD, user, "PUT", query, body, more));
     }
-    // The same where the kernel refuses these calls, or kills the process before them; "" then.
-    static std::string putRefused(const std::vector<Refusal>& refusals, const std::string& path,
-                                  const std::string& body, const std::string& mode) {
-        const std::string kept = systemRoot() + "/reply";
-        fs::remove(kept);
-        inChild([&] {
-            if (!refuseCalls(refusals)) return 97;
-            const Finished finished = runProgram({PROGRAM_UPLOAD}, variables(path, body, mode), body);
-            std::ofstream(kept) << finished.output;
-            return 0;
-        });
-        return readFile(kept);
-    }
     static Variables variables(const std::string& path, const std::string& body, const std::string& mode) {
         return {{"REQUEST_METHOD", "PUT"},
                 {"REMOTE_ADDR", "127.0.0.1"},
                 {"REMOTE_USER", "alice"},
                 {"CONTENT_LENGTH", std::to_string(body.size())},
                 {"QUERY_STRING", "path=" + percentEncode(path) + "&overwrite=" + mode}};
-    }
-    // What a user sees in a folder.
-    static Names shownIn(const std::string& folder) {
-        Names names = namesIn(folder);
-        std::erase_if(names, [](const std::string& name) { return VEXOEAIsHiddenFile(name.c_str()) == 1; });
-        return names;
     }
     static std::string part(const std::string& disposition, const std::string& data) {
         return "--XX\r\nContent-Disposition: form-data; " + disposition + "\r\n\r\n" + data + "\r\n";
@@ -295,40 +272,29 @@ TEST_F(UploadCgi, WhatAKilledUploadLeftIsRemovedByALaterOne) {
     fs::remove_all(folder);
 }
 
-// What happens at each call that puts an upload in its place: the file is there whole or not at all, and the next one
-// ends as its mode says.
-TEST_F(UploadCgi, KilledOrFailingItLeavesTheNameToTheNext) {
-    const std::string file = shareRoot("photo") + "/f";
-    put("alice", "/photo/first", "makes the temporary folders");
-    ASSERT_TRUE(fs::remove(shareRoot("photo") + "/first"));
-    const Refusal noNameless{SYS_openat, EOPNOTSUPP, 2, O_TMPFILE & ~O_DIRECTORY};
-    const Refusal noExclusiveRename{SYS_renameat2, EINVAL, 4, 1};
-    const std::vector<Refusal> ways[] = {{}, {noNameless}, {noNameless, noExclusiveRename}};
-    for (const int what : {kKilled, EIO, ENOSPC}) {
-        for (const long call : {SYS_fchmod, SYS_fchown, SYS_fsync, SYS_fdatasync, SYS_linkat, SYS_renameat,
-                                SYS_renameat2, SYS_unlink, SYS_unlinkat}) {
-            for (const std::string mode : {"error", "skip", "overwrite"}) {
-                const auto& way = ways[(call + mode.size()) % 3];
-                SCOPED_TRACE(mode + " " + std::to_string(call) + (what == kKilled ? " killed" : " refused"));
-                for (const bool there : {false, true}) {
-                    if (there) writeFile(file, "old", 0666);
-                    std::vector<Refusal> refusals = way;
-                    refusals.insert(refusals.begin(), Refusal{call, what});
-                    const std::string reply = putRefused(refusals, "/photo/f", "new", mode);
-                    const bool acknowledged = reply.find("\"success\":true") != std::string::npos;
-                    const std::string found = fs::exists(file) ? readFile(file) : "";
-                    const std::string stored = mode == "overwrite" || !there ? "new" : "old";
-                    EXPECT_TRUE(found == stored || (!acknowledged && found == (there ? "old" : ""))) << found;
-                    EXPECT_EQ(shownIn(shareRoot("photo")), found.empty() ? Names{} : Names{"f"});
-                    const int next = code(put("alice", "/photo/f", "next", mode));
-                    EXPECT_EQ(next, mode == "error" && !found.empty() ? 414 : 0);
-                    EXPECT_EQ(readFile(file), mode == "overwrite" || found.empty() ? "next" : found);
-                    EXPECT_EQ(namesIn(shareRoot("photo")), Names{"f"}) << "nor is anything hidden left";
-                    fs::remove(file);
-                }
-            }
-        }
-    }
+// Of any size, on its way in and out.
+TEST_F(UploadCgi, AFileTakesNoMemory) {
+    const std::string body = systemRoot() + "/body";
+    const auto peakOf = [&](off_t size) {
+        writeFile(body, "");
+        EXPECT_EQ(truncate(body.c_str(), size), 0);
+        Variables request = variables("/photo/" + std::to_string(size), "", "error");
+        request["CONTENT_LENGTH"] = std::to_string(size);
+        const std::string stored = runProgram({"/bin/sh", "-c", PROGRAM_UPLOAD " <" + body + "; true"}, request).output;
+        EXPECT_NE(stored.find("\"success\":true"), std::string::npos) << stored;
+        request["REQUEST_METHOD"] = "GET";
+        request["CONTENT_LENGTH"] = "";
+        const std::string fetched = runProgram({"/bin/sh", "-c", PROGRAM_DOWNLOAD " | wc -c"}, request).output;
+        EXPECT_GT(std::stoll(fetched), size);
+        rusage most{};
+        getrusage(RUSAGE_CHILDREN, &most);
+        return most.ru_maxrss;
+    };
+    inChild([&] {
+        const long small = peakOf(1);
+        EXPECT_LT(peakOf(96 << 20) - small, 32 << 10) << "KiB";
+        return 0;
+    });
 }
 
 TEST_F(UploadCgi, TwoAtOnceEndAsTheirModesSay) {

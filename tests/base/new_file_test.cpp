@@ -1,11 +1,6 @@
 // Names that appear whole or not at all, whatever the file system can do and whenever the process is killed.
 #include "base/new_file.h"
 
-#include <sys/syscall.h>
-
-#include <csignal>
-#include <set>
-
 #include "base/descriptor.h"
 #include "support/race.h"
 #include "support/refuse_calls.h"

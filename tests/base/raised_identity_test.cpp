@@ -1,8 +1,6 @@
 // Root for a moment: there and back, and never half.
 #include "base/raised_identity.h"
 
-#include <sys/syscall.h>
-
 #include "base/random.h"
 #include "support/refuse_calls.h"
 #include "support/testing.h"

@@ -1,6 +1,5 @@
 #include "base/wildcard.h"
 
-#include <chrono>
 #include <random>
 
 #include "base/wildcard_model.h"

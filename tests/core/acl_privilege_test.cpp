@@ -1,6 +1,5 @@
 #include "base/descriptor.h"
 #include "orvel/privilege.h"
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {

@@ -1,5 +1,4 @@
 #include "orvel/share_path.h"
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {

@@ -2,7 +2,6 @@
 
 #include <grp.h>
 
-#include "support/log_texts.h"
 #include "support/testing.h"
 #include "vexo/session.h"
 

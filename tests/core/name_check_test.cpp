@@ -1,6 +1,5 @@
 #include "orvel/name_check.h"
 
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {

@@ -2,7 +2,6 @@
 
 #include "orvel/privilege_reason.h"
 #include "support/fault_sweep.h"
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {

@@ -1,6 +1,5 @@
 #include "orvel/privilege.h"
 #include "support/fault_sweep.h"
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {

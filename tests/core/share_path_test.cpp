@@ -2,7 +2,6 @@
 
 #include <climits>
 
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {

@@ -1,6 +1,5 @@
 #include "orvel/upload_check.h"
 
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {

@@ -6,7 +6,6 @@
 #include <stdexcept>
 
 #include "base/descriptor.h"
-#include "support/log_texts.h"
 #include "support/system_faults.h"
 #include "support/testing.h"
 

@@ -91,50 +91,42 @@ TEST(FileInfo, WhatTheCallerPutThere) {
     }
 }
 
-void expectSameText(int bits, const DIRENTRY_INFO& info) {
-    Json::Value object;
-    DumpFileInfo(bits, info, object);
-    std::string text = "before,";
-    AppendFileInfoText(bits, info, text);
-    EXPECT_EQ(text, "before," + compact(object)) << bits;
-}
-
-TEST(FileInfoText, EqualsTheObjectsTextForEveryBitSet) {
-    for (int bits = 0; bits < 0x200; ++bits) expectSameText(bits, sample());
-    expectSameText(-1, DIRENTRY_INFO());
-}
-
-// What jsoncpp does with bytes that are no UTF-8 is to pass them on: the result is no UTF-8 either, which is why
-// callers look at names first.
-TEST(FileInfoText, EqualsTheObjectsTextForEveryName) {
+// With every set of bits, in every field, of every size. Bytes that are no UTF-8 pass, as jsoncpp passes them.
+TEST(FileInfo, TheTextIsTheObjects) {
+    const auto expectSame = [](int bits, const DIRENTRY_INFO& info) {
+        Json::Value object;
+        DumpFileInfo(bits, info, object);
+        std::string text = "before,";
+        AppendFileInfoText(bits, info, text);
+        EXPECT_EQ(text, "before," + compact(object)) << bits;
+    };
+    for (int bits = 0; bits < 0x200; ++bits) expectSame(bits, sample());
+    expectSame(-1, DIRENTRY_INFO());
+    DIRENTRY_INFO info = sample();
     std::string everyByte;
     for (int byte = 0; byte < 256; ++byte) everyByte += static_cast<char>(byte);
     for (const std::string& name : {std::string(), everyByte, std::string(5000, '\1')}) {
-        DIRENTRY_INFO info = sample();
         for (std::string* field :
              {&info.name, &info.path, &info.realPath, &info.type, &info.owner, &info.group, &info.mountPointType}) {
             *field = name;
         }
-        expectSameText(0xFF, info);
+        expectSame(0xFF, info);
     }
-}
-
-TEST(FileInfoText, EqualsTheObjectsTextForEverySize) {
+    info = sample();
     std::vector<int64_t> sizes = {-1, INT64_MIN, INT64_MIN + 1};
     for (const int64_t edge : {int64_t{1} << 53, int64_t{99999999999999999}}) {  // exact as a double, seventeen digits
         for (int64_t beside = -8; beside <= 3; ++beside) sizes.push_back(edge + beside);
     }
     for (int shift = 0; shift < 64; ++shift) {
-        const uint64_t power = uint64_t{1} << shift;
-        sizes.insert(sizes.end(), {static_cast<int64_t>(power - 1), static_cast<int64_t>(power)});
+        const auto power = static_cast<int64_t>(uint64_t{1} << shift);
+        sizes.insert(sizes.end(), {static_cast<int64_t>((uint64_t{1} << shift) - 1), power});
     }
     for (const int64_t size : sizes) {
-        DIRENTRY_INFO info = sample();
         info.size = size;
         info.freeSpace = static_cast<uint64_t>(size);
         info.totalSpace = static_cast<uint64_t>(size) / 3;
         info.mode = info.aclPrivilege = static_cast<uint32_t>(size);
-        expectSameText(0xFF, info);
+        expectSame(0xFF, info);
     }
 }
 

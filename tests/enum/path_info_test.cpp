@@ -1,7 +1,6 @@
 #include <json/value.h>
 
 #include "orvel/file_info.h"
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {

@@ -1,6 +1,5 @@
 #include "base/descriptor.h"
 #include "orvel/directory_walker.h"
-#include "support/log_texts.h"
 #include "support/system_faults.h"
 #include "support/testing.h"
 

@@ -3,7 +3,6 @@
 #include "core/owned.h"
 #include "enum/group_ids.h"
 #include "orvel/listing.h"
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace {

@@ -6,7 +6,6 @@
 #include <linux/capability.h>
 #include <linux/fs.h>
 #include <sys/ioctl.h>
-#include <sys/syscall.h>
 #include <sys/xattr.h>
 
 #include "filesystem/acl_rules.h"

@@ -4,7 +4,6 @@
 #include <sys/xattr.h>
 
 #include <random>
-#include <set>
 
 #include "support/refuse_calls.h"
 #include "support/testing.h"

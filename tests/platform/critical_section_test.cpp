@@ -1,13 +1,8 @@
 // The critical section, fought for by real processes.
 #include "vexo/critical_section.h"
 
-#include <sys/wait.h>
-
-#include <chrono>
-
 #include "support/race.h"
 #include "support/testing.h"
-#include "support/wait.h"
 
 namespace {
 

@@ -2,12 +2,8 @@
 #include "vexo/database.h"
 
 #include <sqlite3.h>
-#include <sys/wait.h>
-
-#include <csignal>
 
 #include "platform/trust.h"
-#include "support/wait.h"
 
 namespace {
 

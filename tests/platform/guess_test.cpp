@@ -2,10 +2,6 @@
 //   ORVEL_TEST_GUESSERS: how many addresses fill the table, 9,000 without it.
 #include "vexo/guess.h"
 
-#include <sys/wait.h>
-
-#include <csignal>
-#include <map>
 #include <queue>
 #include <random>
 

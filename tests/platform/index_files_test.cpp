@@ -1,13 +1,10 @@
 // The files of the index: what others put in their place, writers that die, and the central store.
-#include <sys/mount.h>
-#include <sys/wait.h>
 
 #include <random>
 
 #include "platform/index_fixture.h"
 #include "platform/private_mounts.h"
 #include "platform/trust.h"
-#include "support/wait.h"
 
 namespace {
 

@@ -1,5 +1,4 @@
 // What the index finds, keeps and orders, held against the criteria and against plain sorting.
-#include "vexo/index.h"
 
 #include <random>
 
@@ -176,42 +175,6 @@ TEST_F(IndexTest, LongPatternsForNames) {
     const Cond ends = node(FI_COL_NAME, FI_OP_WILDCARD, std::string(600, '*') + "x");
     EXPECT_EQ(searched(&ends), (Addresses{"photo:ab", "photo:x"}));
     EXPECT_EQ(select(db_, &ends), Addresses{"photo:x"});
-}
-
-// Alternatives find together what each finds alone.
-TEST_F(IndexTest, AlternativesAreTheSumOfTheirParts) {
-    build(manyRecords());
-    const auto all = [this](const std::vector<Cond>& parts, bool arePaths) {
-        std::vector<Cond> chain = parts;
-        Addresses apart;
-        for (size_t i = 0; i < parts.size(); ++i) {
-            if (i > 0) chain[i].pOrNext = &chain[i - 1];
-            const Addresses found = arePaths ? searched(nullptr, &parts[i]) : searched(&parts[i]);
-            apart.insert(apart.end(), found.begin(), found.end());
-        }
-        apart = sorted(apart);
-        apart.erase(std::unique(apart.begin(), apart.end()), apart.end());
-        EXPECT_FALSE(apart.empty());
-        EXPECT_EQ(arePaths ? searched(nullptr, &chain.back()) : searched(&chain.back()), apart);
-    };
-    std::vector<Cond> below;
-    for (const char* folder : {"/photo/2012", "/photo/*", "/photo/20_2", "/photo/none"}) {
-        below.push_back(node(FI_COL_PATH, FI_OP_BELOW, folder));
-    }
-    std::vector<Cond> folders;
-    folders.push_back(node(FI_COL_PATH, FI_OP_PATH, "/photo/2012", &below[0]));
-    folders.push_back(node(FI_COL_PATH, FI_OP_PATH, "/photo/*", &below[1]));
-    all(folders, true);
-    folders.clear();
-    for (const char* direct : {"/photo", "/photo/2012/a", "/photo/2012b/", "/photo/\xFF"}) {
-        folders.push_back(node(FI_COL_PATH, FI_OP_PATH, direct));
-    }
-    all(folders, true);
-    std::vector<Cond> names;
-    for (const char* pattern : {"*.jpg", "*.A.b", "*.", "*.\xED\xA0\x81", "*.p?f", "*b", "*.\\jpg"}) {
-        names.push_back(node(FI_COL_NAME, FI_OP_WILDCARD, pattern));
-    }
-    all(names, false);
 }
 
 // Whatever way a search takes, records that are written anew while it copies are found once.

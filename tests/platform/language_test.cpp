@@ -1,8 +1,6 @@
 // Languages, tables of texts, salts.
 #include "vexo/language.h"
 
-#include <set>
-
 #include "settings/language_choice.h"
 #include "support/testing.h"
 #include "vexo/user.h"

@@ -1,8 +1,6 @@
 // Record files: finding lines, adding them, what others may have put in their place.
 #include "vexo/line_file.h"
 
-#include <sys/mount.h>
-
 #include "platform/private_mounts.h"
 #include "platform/trust.h"
 #include "support/race.h"

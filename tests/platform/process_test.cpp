@@ -1,8 +1,6 @@
 // Programs that the platform runs.
 #include "vexo/process.h"
 
-#include <csignal>
-
 #include "support/testing.h"
 
 namespace {

@@ -1,6 +1,4 @@
 // A process that serves one request looks at central files less often.
-#include <chrono>
-#include <filesystem>
 
 #include "support/testing.h"
 #include "vexo/process.h"

@@ -1,6 +1,4 @@
 // Changing settings files: the texts, the file, and processes that are killed while they write.
-#include <sys/mount.h>
-#include <sys/syscall.h>
 
 #include "platform/private_mounts.h"
 #include "platform/trust.h"

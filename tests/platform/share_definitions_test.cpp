@@ -1,9 +1,6 @@
 // The grammar of share definitions, also held against Samba's own reader, and what sections mean.
 #include "shares/share_definitions.h"
 
-#include <map>
-#include <set>
-
 #include "shares/share_options.h"
 #include "support/testing.h"
 #include "vexo/share.h"

@@ -2,15 +2,12 @@
 #include "vexo/task.h"
 
 #include <json/writer.h>
-#include <sys/wait.h>
 
 #include <cmath>
-#include <csignal>
 
 #include "platform/trust.h"
 #include "support/race.h"
 #include "support/refuse_calls.h"
-#include "support/wait.h"
 #include "tasks/task_document.h"
 #include "tasks/task_name.h"
 #include "tasks/task_worker.h"

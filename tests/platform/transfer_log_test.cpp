@@ -1,8 +1,5 @@
 // The transfer log: its lines and its file.
 #include <json/reader.h>
-#include <sys/mount.h>
-
-#include <sstream>
 
 #include "platform/private_mounts.h"
 #include "platform/trust.h"

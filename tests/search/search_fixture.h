@@ -2,15 +2,12 @@
 #ifndef ORVEL_TESTS_SEARCH_FIXTURE_H
 #define ORVEL_TESTS_SEARCH_FIXTURE_H
 
-#include <map>
-
 #include "orvel/directory_walker.h"
 #include "orvel/file_record.h"
 #include "orvel/identity.h"
 #include "orvel/search_criteria.h"
 #include "orvel/search_task.h"
 #include "orvel/search_walker.h"
-#include "support/log_texts.h"
 #include "support/testing.h"
 
 namespace support {

@@ -2,11 +2,7 @@
 #include "orvel/search_task.h"
 
 #include <sys/resource.h>
-#include <sys/syscall.h>
 
-#include <set>
-
-#include "support/log_texts.h"
 #include "support/race.h"
 #include "support/refuse_calls.h"
 #include "support/testing.h"

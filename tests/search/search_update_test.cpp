@@ -1,5 +1,4 @@
 // Results that stay true: updates after file operations, and pages of them.
-#include "platform/private_mounts.h"
 #include "search/search_fixture.h"
 
 using namespace FileSearch;
@@ -114,55 +113,6 @@ TEST_F(SearchUpdateTest, AfterEachOperationTheResultsAreThoseOfANewSearch) {
         EXPECT_TRUE(screen_->delRecs("docs", photo + "/dx")) << "another share";
         EXPECT_EQ(rowsOf(*screen_), before) << "what is not among the results stays out of them";
     });
-}
-
-// Walk, index and updates cut paths behind the share's own root: of many components or of one, and one share inside
-// another.
-TEST_F(SearchUpdateTest, RootsOfAnyDepth) {
-    SKIP_WITHOUT_ROOT();
-    const std::string outer = shareRoot("photo") + "/srv/samba", inner = outer + "/a/team",
-                      options = "read only = no\n";
-    addShare("photo", options + "path = " + outer + "\nvexo:index = yes\n");
-    addShare("team", options + "path = " + inner + "\n");
-    addShare("docs", options + "path = /mnt\nvexo:index = yes\n");
-    addShare("homes", options + "path = " + shareRoot("homes") + "/of/all\n");
-    makeFile(inner + "/b/f.txt");
-    makeFile(shareRoot("homes") + "/of/all/alice/d/mine.txt");
-    EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
-        EXPECT_EQ(mount("none", "/mnt", "tmpfs", 0, ""), 0);
-        makeFile("/mnt/b/g.txt");
-        const Query all{{"/photo/a", "/team", "/docs", "/home"}, {{0, nullptr, "*.txt"}}};
-        const Found walked = search("alice", all);
-        EXPECT_EQ(keysOf(walked), (std::vector<std::string>{"docs/b/g.txt", "homes/alice/d/mine.txt",
-                                                            "photo/a/team/b/f.txt", "team/b/f.txt"}));
-        Indexer("photo", outer);
-        Indexer("docs", "/mnt");
-        EXPECT_EQ(search("alice", all), walked) << "from the index";
-        const Criteria criteria(all.asks);
-        OneSearch run("alice", all.folders, criteria.all);
-        EXPECT_TRUE(run.walker.Walk({}));
-        screen_ = &run.task;
-        const std::string home = shareRoot("homes") + "/of/all/alice/d/";
-        for (const auto& [share, from, to] :
-             Rows<std::string, std::string, std::string>{{"team", inner + "/b/f.txt", inner + "/b/h.txt"},
-                                                         {"docs", "/mnt/b/g.txt", "/mnt/b/h.txt"},
-                                                         {"home", home + "mine.txt", home + "h.txt"}}) {
-            fs::rename(from, to);
-            auto status = recordOf(to);
-            EXPECT_TRUE(screen_->updateFile(share, from, share, to, status));
-        }
-        fs::rename("/mnt/b", "/mnt/c");
-        EXPECT_TRUE(screen_->updateFileInFolder("docs", "/mnt/b", "docs", "/mnt/c"));
-        EXPECT_TRUE(screen_->delRecs("photo", outer + "/a/team/b"));
-        EXPECT_EQ(keysOf(rowsOf(*screen_)),
-                  (std::vector<std::string>{"docs/c/h.txt", "homes/alice/d/h.txt", "team/b/h.txt"}));
-        // The root by itself names no record, not even one that is called as its last component.
-        EXPECT_FALSE(screen_->delRecs("team", inner) || screen_->delRecs("docs", "/mnt"));
-        EXPECT_EQ(takeLogTexts(),
-                  (std::vector<std::string>{"orvelsearch:# Fail to find the path name " + inner,
-                                            "orvelsearch:# Fail to find the share name docs from /mnt"}));
-        return 0;
-    }));
 }
 
 TEST_F(SearchUpdateTest, BadPathsAndFailingDatabases) {

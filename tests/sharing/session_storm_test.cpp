@@ -1,12 +1,7 @@
 // Many visitors at once, and processes that are killed.
 //   ORVEL_TEST_STORM_SECONDS: how long processes are killed, 3 without it.
-#include <sys/wait.h>
 
-#include <chrono>
-#include <csignal>
 #include <random>
-#include <sstream>
-#include <thread>
 
 #include "sharing/login_add.h"
 #include "sharing/login_record.h"

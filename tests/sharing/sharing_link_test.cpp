@@ -5,7 +5,6 @@
 
 #include "sharing/link_lookup.h"
 #include "sharing/visitor_fixture.h"
-#include "support/log_texts.h"
 #include "vexo/auto_block.h"
 
 using OrvelLogin::FolderSharingLoginManager;

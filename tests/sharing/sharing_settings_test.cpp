@@ -1,7 +1,5 @@
 #include "orvel/sharing_settings.h"
 
-#include <map>
-
 #include "support/refuse_calls.h"
 #include "support/testing.h"
 

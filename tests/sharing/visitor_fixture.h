@@ -3,8 +3,6 @@
 #ifndef ORVEL_TESTS_SHARING_VISITOR_FIXTURE_H
 #define ORVEL_TESTS_SHARING_VISITOR_FIXTURE_H
 
-#include <string>
-
 #include "orvel/login_records.h"
 #include "sharing/record_file.h"
 #include "support/testing.h"

@@ -14,7 +14,10 @@
 #include <ctime>
 #include <filesystem>
 #include <functional>
+#include <map>
 #include <memory>
+#include <set>
+#include <sstream>
 #include <string>
 #include <tuple>
 #include <utility>
@@ -23,6 +26,8 @@
 #include "fault_gate.h"
 #include "orvel/error_state.h"
 #include "support/appliance.h"
+#include "support/log_texts.h"
+#include "support/wait.h"
 #include "vexo/error.h"
 #include "vexo/list.h"
 

@@ -3,8 +3,6 @@
 #include <json/json.h>
 #include <syslog.h>
 
-#include <sstream>
-
 #include "support/testing.h"
 
 namespace {

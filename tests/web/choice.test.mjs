@@ -141,17 +141,6 @@ test("a list that is gone: what was chosen by name stays, all must be chosen aga
     assert.equal(readdirSync(folder).length, MANY);
   }));
 
-test("typing finds the next name that begins so, in either form, however far away", () =>
-  withPage("admin", { path: "/projects/chosen" }, async (page) => {
-    writeFileSync(`${folder}/item-00700 cafe\u0301.dat`, "");
-    await page.keyboard.press("Alt+r");
-    await page.waitForSelector("#status >> text=1,501 items");
-    await page.focus("#view");
-    await page.keyboard.type("ITEM-00700 CAF\u00c9");
-    await page.waitForSelector("#view .row.selected.cursor >> text=item-00700 cafe");
-    await page.keyboard.press("Escape");
-  }));
-
 test("many at once: dragged as one task after one question, renamed far away", () =>
   withPage("admin", { path: "/projects/chosen" }, async (page) => {
     await row(page, nameOf(0)).click();

@@ -1,12 +1,10 @@
 // Files that come and go: uploads, conflicts, downloads, new folders, names, previews.
 import assert from "node:assert/strict";
-import { once } from "node:events";
 import { copyFileSync, existsSync, mkdirSync, mkdtempSync, readdirSync, readFileSync, rmSync, statSync, writeFileSync } from "node:fs";
-import http from "node:http";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
-import { drawn, go, PASSWORDS, row, upload, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
+import { drawn, go, row, upload, wentWell, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const files = mkdtempSync(join(tmpdir(), "orvel-upload-"));
@@ -168,26 +166,6 @@ test("previews, thumbnails, rename, downloads", () =>
       "PK",
     );
   }));
-
-test("another site's page changes nothing", async () => {
-  const authorization = `Basic ${Buffer.from(`alice:${PASSWORDS.alice}`).toString("base64")}`;
-  for (const [origin, status] of [
-    ["http://elsewhere.example", 403],
-    ["null", 403],
-    [new URL(URL_OF_PAGE).origin, 200],
-  ]) {
-    const request = http.request(`${URL_OF_PAGE}cgi-bin/operation`, {
-      method: "POST",
-      headers: { authorization, origin, "Content-Type": "application/x-www-form-urlencoded" },
-    });
-    const answered = once(request, "response");
-    request.end("action=mkdir&path=/projects/by another site");
-    const [response] = await answered;
-    response.resume();
-    assert.equal(response.statusCode, status, origin);
-    assert.equal(existsSync(join(projects, "by another site")), status === 200);
-  }
-});
 
 test("a refused download says so in words", () =>
   withPage(

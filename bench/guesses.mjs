@@ -1,4 +1,4 @@
-// Strangers who try passwords of a link, and visitors who know theirs. See guesses_test.sh.
+// Strangers who try passwords of a link, and visitors who know theirs. See guesses.sh.
 import assert from "node:assert/strict";
 import http from "node:http";
 import { setTimeout as sleep } from "node:timers/promises";

@@ -1,13 +1,13 @@
 #!/usr/bin/env bash
 # A visitor who knows the password of a link while strangers try passwords, all of them through a trusted proxy's header.
-#   guesses_test.sh SERVER BUILD
-#   ORVEL_TEST_GUESSERS: how many addresses try, 6 without it; ORVEL_TEST_GUESSES: at least so many requests, 40
+#   guesses.sh script/server BUILD
+#   ORVEL_TEST_GUESSERS: how many addresses try, 1,000 without it; ORVEL_TEST_GUESSES: at least so many requests, 10,000
 set -uo pipefail
-. "$(dirname "$0")/served.sh"
+. "$(dirname "$0")/../tests/apps/served.sh"
 command -v node >/dev/null || { echo "FAILED: node is not installed"; exit 1; }
 
-addresses=${ORVEL_TEST_GUESSERS:-6}
-guesses=${ORVEL_TEST_GUESSES:-40}
+addresses=${ORVEL_TEST_GUESSERS:-1000}
+guesses=${ORVEL_TEST_GUESSES:-10000}
 photo=$(root_of photo)
 mkdir -p "$photo/shared"
 echo one >"$photo/shared/one.txt"
