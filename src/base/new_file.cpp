@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <csignal>
 #include <cstdint>
 #include <cstdio>
 #include <ctime>
@@ -91,6 +92,26 @@ bool renameInSteps(int fromFolder, const std::string& from, int toFolder, const 
     if (unlinkat(fromFolder, from.c_str(), 0) == 0) return true;
     removeIfStill(toFolder, to, status);
     return false;
+}
+
+// Whether somebody has the file open for writing: then no lease for reading is to be had. One that another opening
+// breaks meanwhile is announced by a signal that nobody minds. What the file system or the owner does not allow to ask
+// counts as no.
+bool isBeingWritten(int folder, const std::string& name) {
+    const Descriptor file = openFile(folder, name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
+    if (!file || fcntl(file.get(), F_SETSIG, SIGURG) != 0) return false;
+    return fcntl(file.get(), F_SETLEASE, F_RDLCK) != 0 && errno == EAGAIN;
+}
+
+// 0 for the file that is to be replaced, else the errno value. Asked about again once it is known that nobody writes.
+int judgeReplaced(int folder, const std::string& name, const NewFile::IsExpected& isExpected) {
+    for (const bool first : {true, false}) {
+        struct stat status = {};
+        if (fstatat(folder, name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) return errno == ENOENT ? ESTALE : errno;
+        if (!S_ISREG(status.st_mode) || !isExpected(status)) return ESTALE;
+        if (first && isBeingWritten(folder, name)) return ETXTBSY;
+    }
+    return 0;
 }
 
 }  // namespace
@@ -227,6 +248,54 @@ bool NewFile::publish(const std::string& name, bool replace) {
     }
     if (named) part_.clear();
     return named;
+}
+
+// A name that nobody else comes to and takes for abandoned.
+bool NewFile::takeDrawnPart() {
+    const std::string drawn = drawPartName();
+    if (drawn.empty()) return false;
+    const bool taken = part_.empty() ? giveName(drawn) : renameNew(folder_, part_, folder_, drawn);
+    if (taken) part_ = drawn;
+    return taken;
+}
+
+// Gives the file under the hidden name its name again. Whoever took that meanwhile replaced what was put there last,
+// and comes after it: what they put there goes back in its turn.
+void NewFile::putBack(const std::string& name) {
+    struct stat last = {}, hidden = {}, out = {};
+    if (fstat(fd_.get(), &last) != 0) return part_.clear();
+    for (int attempt = 0; attempt < kAttempts; ++attempt) {
+        if (fstatat(folder_, part_.c_str(), &hidden, AT_SYMLINK_NOFOLLOW) != 0) break;
+        if (renameat2(folder_, part_.c_str(), folder_, name.c_str(), RENAME_EXCHANGE) != 0) {
+            if (errno == ENOENT) return removePart();  // removed meanwhile: it is there no more either way
+            break;
+        }
+        if (fstatat(folder_, part_.c_str(), &out, AT_SYMLINK_NOFOLLOW) != 0) break;
+        if (isSameFile(out, last)) return removePart();
+        last = hidden;
+    }
+    part_.clear();  // somebody's file: better left than lost
+}
+
+bool NewFile::publishInPlaceOf(const std::string& name, const IsExpected& isExpected) {
+    if (fdatasync(fd_.get()) != 0) return false;
+    errno = judgeReplaced(folder_, name, isExpected);
+    if (errno != 0 || !takeDrawnPart()) return false;
+    if (renameat2(folder_, part_.c_str(), folder_, name.c_str(), RENAME_EXCHANGE) != 0) {
+        if (errno == ENOENT) errno = ESTALE;
+        if (errno != EINVAL && errno != ENOSYS) return false;
+        if (renameat(folder_, part_.c_str(), folder_, name.c_str()) != 0) return false;
+        part_.clear();
+        return true;
+    }
+    const int refusal = judgeReplaced(folder_, part_, isExpected);
+    if (refusal == 0) {
+        removePart();
+        return true;
+    }
+    putBack(name);
+    errno = refusal;
+    return false;
 }
 
 void NewFile::removePart() {

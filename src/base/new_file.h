@@ -6,8 +6,10 @@
 #ifndef ORVEL_BASE_NEW_FILE_H
 #define ORVEL_BASE_NEW_FILE_H
 
+#include <sys/stat.h>
 #include <sys/types.h>
 
+#include <functional>
 #include <string>
 #include <string_view>
 
@@ -72,11 +74,20 @@ class NewFile {
     // Gives it its name, in the place of the file of that name when `replace` (once it is on the disk: a power cut must
     // leave the old content or the new one); else EEXIST when there is something. It can be tried again.
     [[nodiscard]] bool publish(const std::string& name, bool replace);
+    // The same in the place of a file that `isExpected` accepts, and of no other: ESTALE when the file of that name is
+    // another one, or none; ETXTBSY when somebody has it open for writing, as far as the file system says so (leases,
+    // of one's own files). It is asked of what was there once nobody finds it under the name any more, which then gets
+    // it back: what somebody else puts there or writes meanwhile stays. A file system that cannot exchange two names
+    // leaves a moment between the question and the replacing.
+    using IsExpected = std::function<bool(const struct stat&)>;
+    [[nodiscard]] bool publishInPlaceOf(const std::string& name, const IsExpected& isExpected);
 
  private:
     [[nodiscard]] bool createNamed(const std::string& name, mode_t mode);
     [[nodiscard]] bool giveName(const std::string& name);
     [[nodiscard]] bool takePart(const std::string& name);
+    [[nodiscard]] bool takeDrawnPart();
+    void putBack(const std::string& name);
     void removePart();
 
     int folder_;

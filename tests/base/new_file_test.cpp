@@ -1,6 +1,8 @@
 // Names that appear whole or not at all, whatever the file system can do and whenever the process is killed.
 #include "base/new_file.h"
 
+#include <optional>
+
 #include "base/descriptor.h"
 #include "support/race.h"
 #include "support/refuse_calls.h"
@@ -136,6 +138,60 @@ TEST_F(NewFileTest, FilesAndLinksTakeTheirPlaceWhole) {
         EXPECT_EQ(readFile("n"), "");
         EXPECT_TRUE(orvel::syncName(folder, "n"));
     });
+}
+
+TEST_F(NewFileTest, OnlyTheExpectedFileIsReplaced) {
+    const auto replaceByRename = [](const char* text) {
+        writeFile("./other", text);
+        EXPECT_EQ(rename("other", "a"), 0);
+    };
+    const std::function<void()> nothing = [] {};
+    const std::function<void()> replaced = [&] { replaceByRename("of another"); };
+    const std::function<void()> written = [] { writeFile("./a", "longer than before"); };
+    const std::function<void()> removed = [] { unlink("a"); };
+    // The two questions before the names are exchanged, and the two after that.
+    for (const auto& [question, event, found] : Rows<int, std::function<void()>, std::string>{
+             row(0, nothing, "new"), row(1, replaced, "of another"), row(2, replaced, "of another"),
+             row(2, written, "longer than before"), row(2, removed, ""), row(4, nothing, "new")}) {
+        SCOPED_TRACE(std::to_string(question) + found);
+        writeFile("./a", "old");
+        const struct stat known = statusOf("a");
+        int asked = 0;
+        std::optional<orvel::NewFile> file(folder_.get());
+        ASSERT_TRUE(file->create("a", 0644) && write(file->get(), "new", 3) == 3);
+        const bool stored = file->publishInPlaceOf("a", [&, question = question, event = event](const struct stat& now) {
+            const bool same = now.st_ino == known.st_ino && now.st_size == known.st_size;
+            if (++asked == question) event();
+            return same;
+        });
+        EXPECT_EQ(stored ? 0 : errno, found == "new" ? 0 : ESTALE);
+        file.reset();
+        EXPECT_EQ(entries(), found.empty() ? Entries{} : Entries{"a=" + found});
+        unlink("a");
+    }
+}
+
+// What was taken out goes back, and gives way to whatever was put in the place of ours meanwhile.
+TEST_F(NewFileTest, WhoComesLastStays) {
+    for (const bool isRemoved : {false, true}) {
+        writeFile("./a", "old");
+        int asked = 0;
+        orvel::NewFile file(folder_.get());
+        ASSERT_TRUE(file.create("a", 0644) && write(file.get(), "new", 3) == 3);
+        EXPECT_FALSE(file.publishInPlaceOf("a", [&](const struct stat&) {
+            if (++asked < 3) return true;
+            EXPECT_EQ(readFile("a"), "new");
+            if (isRemoved) {
+                EXPECT_EQ(unlink("a"), 0);
+            } else {
+                writeFile("./last", "the last");
+                EXPECT_EQ(rename("last", "a"), 0);
+            }
+            return false;
+        }));
+        EXPECT_EQ(errno, ESTALE);
+        EXPECT_EQ(entries(), isRemoved ? Entries{} : Entries{"a=the last"});
+    }
 }
 
 TEST_F(NewFileTest, WhatAKilledProcessLeftIsHiddenAndGoesWithTheNextOne) {

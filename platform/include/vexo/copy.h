@@ -2,6 +2,7 @@
 #ifndef VEXO_COPY_H
 #define VEXO_COPY_H
 
+#include <sys/stat.h>
 #include <sys/types.h>
 
 #include "vexo/export.h"
@@ -41,6 +42,17 @@ VEXO_BEGIN_C
 // is FAT and cannot hold the name, 0xA300 nor a file of this size, 0x2900 no space, 0x2400 quota, 0x8400 read-only file
 // system, 0xA400 cancelled, 0x0D00 a null or empty path, 0x8100 else (the source shrank or could not be read).
 VEXO_API int VEXOFileCopy(const char* source, const char* target, const struct VEXOCOPYOPT* options);
+
+// Copies in the place of the file that `isExpected` accepts, and of no other: `old` is what is at the target, `fresh`
+// what replaces it, `of` what was handed in. It is asked before, and once more of what the copy took the place of when
+// nobody finds that under its name any more: if that is another file, or was written meanwhile, it gets its name back,
+// so that nobody's change is lost. On a file system that cannot exchange two names it is asked right before the
+// replacing.
+//
+// As above with OVERWRITE, and with 0xA000 when the target is not that file: errno is ESTALE for another one or none,
+// ETXTBSY where somebody has it open for writing (known of the caller's own files, where the file system says so).
+VEXO_API int VEXOFileReplace(const char* source, const char* target, const struct VEXOCOPYOPT* options,
+                             int (*isExpected)(const struct stat* old, const struct stat* fresh, void* of), void* of);
 
 // The bytes of the source that the copy under way has behind it, holes included: for isCancelled to report how far it
 // is. After the copy, what it came to.

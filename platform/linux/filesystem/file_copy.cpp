@@ -37,6 +37,8 @@ struct Copy {
     bool exists = false;
     struct stat oldStatus {};  // what is at the target, when it exists
     VEXOCOPYOPT options{};
+    int (*isExpected)(const struct stat*, const struct stat*, void*) = nullptr;  // of the file to be replaced
+    void* of = nullptr;
 };
 
 int openSource(const char* path, Copy& copy) {
@@ -134,7 +136,15 @@ bool fill(const Copy& copy, int part) {
     return false;
 }
 
+bool publishIfExpected(const Copy& copy, orvel::NewFile& part) {
+    struct stat fresh {};
+    if (fstat(part.get(), &fresh) != 0) return false;
+    return part.publishInPlaceOf(copy.name,
+                                 [&](const struct stat& old) { return copy.isExpected(&old, &fresh, copy.of) != 0; });
+}
+
 bool publish(const Copy& copy, orvel::NewFile& part) {
+    if (copy.isExpected != nullptr) return publishIfExpected(copy, part);
     if (part.publish(copy.name, copy.exists)) return true;
     // Put there since the target was looked at.
     const bool mayReplace = (copy.options.switches & VEXO_COPY_OVERWRITE) != 0;
@@ -144,6 +154,8 @@ bool publish(const Copy& copy, orvel::NewFile& part) {
 int errorOfPublishing(int systemCode) {
     switch (systemCode) {
         case EEXIST:
+        case ESTALE:
+        case ETXTBSY:
             return VEXO_ERR_TARGET_EXISTS;
         case EISDIR:
             return VEXO_ERR_TARGET_EXISTS_OTHER;
@@ -189,17 +201,10 @@ bool take(const char* source, const Copy& copy) {
     return true;
 }
 
-}  // namespace
-
-int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* options) try {
-    VEXO_GATE("VEXOFileCopy", -1);
-    if (source == nullptr || target == nullptr || *source == '\0' || *target == '\0') {
-        return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
-    }
+int run(const char* source, const char* target, Copy& copy) {
     const int before = errno;
-    Copy copy;
-    copy.options = options != nullptr ? *options : VEXOCOPYOPT{kKeepUser, kKeepGroup, nullptr, 0};
     if (openSource(source, copy) != 0 || openTarget(target, copy) != 0 || checkTarget(target, copy) != 0) return -1;
+    if (copy.isExpected != nullptr && !copy.exists) return vexo::fail(VEXO_ERR_TARGET_EXISTS, ESTALE);
     if (mayTake(copy)) {
         if (take(source, copy)) {
             errno = before;
@@ -207,7 +212,9 @@ int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* opti
         }
         if (errno == ECANCELED) return vexo::fail(VEXO_ERR_CANCELLED);
         // Put there meanwhile: a copy would not get the name either.
-        if (errno == EEXIST || errno == EISDIR) return vexo::fail(errorOfPublishing(errno));
+        if (errno == EEXIST || errno == EISDIR || errno == ESTALE || errno == ETXTBSY) {
+            return vexo::fail(errorOfPublishing(errno));
+        }
         // A file system that cannot: copied like any other.
     }
     orvel::NewFile part(copy.folder.get());
@@ -215,6 +222,34 @@ int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* opti
     if (!publish(copy, part)) return vexo::fail(errorOfPublishing(errno));
     errno = before;
     return 0;
+}
+
+bool areUsable(const char* source, const char* target) {
+    return source != nullptr && target != nullptr && *source != '\0' && *target != '\0';
+}
+
+}  // namespace
+
+int VEXOFileCopy(const char* source, const char* target, const VEXOCOPYOPT* options) try {
+    VEXO_GATE("VEXOFileCopy", -1);
+    if (!areUsable(source, target)) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    Copy copy;
+    copy.options = options != nullptr ? *options : VEXOCOPYOPT{kKeepUser, kKeepGroup, nullptr, 0};
+    return run(source, target, copy);
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int VEXOFileReplace(const char* source, const char* target, const VEXOCOPYOPT* options,
+                    int (*isExpected)(const struct stat*, const struct stat*, void*), void* of) try {
+    VEXO_GATE("VEXOFileReplace", -1);
+    if (!areUsable(source, target) || isExpected == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    Copy copy;
+    copy.options = options != nullptr ? *options : VEXOCOPYOPT{kKeepUser, kKeepGroup, nullptr, 0};
+    copy.options.switches |= VEXO_COPY_OVERWRITE;
+    copy.isExpected = isExpected;
+    copy.of = of;
+    return run(source, target, copy);
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }
