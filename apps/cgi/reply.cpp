@@ -22,6 +22,8 @@ std::string_view statusLine(Status status) {
             return "Status: 404 Not Found\r\n";
         case Status::kMethodNotAllowed:
             return "Status: 405 Method Not Allowed\r\n";
+        case Status::kChanged:
+            return "Status: 412 Precondition Failed\r\n";
         case Status::kTooLarge:
             return "Status: 413 Content Too Large\r\n";
         case Status::kUnsupportedType:
@@ -82,11 +84,11 @@ void reply(Output& out, Status status, const std::string& cookie, int code, std:
 }
 
 void replyOwnFailure(Output& out, Status status, const std::string& cookie, int code, const char* key,
-                     const Json::Value& data) {
+                     std::string_view path, const Json::Value& data) {
     Json::Value whole;
     whole["success"] = false;
     if (!data.isNull()) whole["data"] = data;
-    whole["error"] = errorOf(code, key, "");
+    whole["error"] = errorOf(code, key, path);
     beginReply(out, status, cookie);
     appendJson(whole, out.text());
 }

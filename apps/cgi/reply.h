@@ -24,6 +24,7 @@ enum class Status {
     kForbidden = 403,
     kNotFound = 404,
     kMethodNotAllowed = 405,
+    kChanged = 412,
     kTooLarge = 413,
     kUnsupportedType = 415,
     kTooMany = 429,
@@ -42,7 +43,7 @@ void replyFailure(Output& out, Status status, const std::string& cookie, int cod
 
 // The same for a failure that is a program's own: `key` names its text.
 void replyOwnFailure(Output& out, Status status, const std::string& cookie, int code, const char* key,
-                     const Json::Value& data);
+                     std::string_view path, const Json::Value& data);
 
 // The library code of the failure just met, `fallback` where it set none (store 0 before the call).
 int lastCode(int fallback = ORV_ERR_GENERAL);

@@ -26,11 +26,14 @@ std::string_view trimmed(std::string_view text) {
     return text.substr(first, text.find_last_not_of(" \t") - first + 1);
 }
 
-bool anyTagIs(std::string_view list, std::string_view tag) {
+// A tag marked as weak says that the bytes may differ.
+enum class Weak { kCounts, kDiffers };
+
+bool anyTagIs(std::string_view list, std::string_view tag, Weak weak) {
     while (!list.empty()) {
         const size_t end = std::min(list.find(','), list.size());
         std::string_view one = trimmed(list.substr(0, end));
-        if (one.starts_with("W/")) one.remove_prefix(2);
+        if (weak == Weak::kCounts && one.starts_with("W/")) one.remove_prefix(2);
         if (one == tag || one == "*") return true;
         list.remove_prefix(std::min(end + 1, list.size()));
     }
@@ -71,9 +74,13 @@ std::string entityTag(std::uint64_t inode, std::int64_t size, std::int64_t secon
 
 bool isCurrent(std::string_view ifNoneMatch, std::string_view ifModifiedSince, std::string_view tag,
                std::int64_t modified) {
-    if (!ifNoneMatch.empty()) return anyTagIs(ifNoneMatch, tag);
+    if (!ifNoneMatch.empty()) return anyTagIs(ifNoneMatch, tag, Weak::kCounts);
     const std::int64_t since = parseHttpDate(ifModifiedSince);
     return since >= 0 && modified <= since;
+}
+
+bool namesTag(std::string_view ifMatch, std::string_view tag) {
+    return anyTagIs(ifMatch, tag, Weak::kDiffers);
 }
 
 bool rangeCounts(std::string_view ifRange, std::string_view tag, std::int64_t modified) {

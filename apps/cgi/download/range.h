@@ -28,6 +28,9 @@ std::string entityTag(std::uint64_t inode, std::int64_t size, std::int64_t secon
 bool isCurrent(std::string_view ifNoneMatch, std::string_view ifModifiedSince, std::string_view tag,
                std::int64_t modified);
 
+// Whether an If-Match header names this tag; "*" names any.
+bool namesTag(std::string_view ifMatch, std::string_view tag);
+
 // Whether a Range header counts: If-Range is absent, this tag, or this very date.
 bool rangeCounts(std::string_view ifRange, std::string_view tag, std::int64_t modified);
 

@@ -90,7 +90,7 @@ void replyRefusal(Output& out, const VEXOLOGIN& step) {
         data["wait"] = step.wait;
         out.text() += "Retry-After: " + std::to_string(step.wait) + "\r\n";
     }
-    replyOwnFailure(out, refusal.status, "", refusal.code, refusal.key, data);
+    replyOwnFailure(out, refusal.status, "", refusal.code, refusal.key, "", data);
 }
 
 void replyDone(Output& out, const VEXOLOGIN& step) {

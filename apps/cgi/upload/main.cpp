@@ -7,6 +7,8 @@
 // And for both:
 //   overwrite        "error" (default), "skip" or "overwrite": what an existing file means
 //   taskid           a search whose results shall show the files
+//   If-Match         (header, of a raw body) stores the file only in the place of the one with this tag of download
+//   If-None-Match    "*" (the same): only where there is no file
 //   mtime            seconds: when the file was modified; in a form a field ahead of each file that has one
 //
 // "data" of the reply is {"files":[{"path","size","skipped"}]}. The first file that cannot be stored ends the request;
@@ -76,11 +78,16 @@ struct Outcome {
     bool refuse(_tag_cgi_upload_errno_ error, const std::string& where) {
         return fail(ConvUploadErrnoToAPIErr(error), where, Status::kBadRequest);
     }
+    // A condition that is not met is no failure of the library's.
+    [[nodiscard]] const char* ownKey() const {
+        return code == kUploadChanged ? "upload_changed" : code == kUploadInUse ? "upload_in_use" : nullptr;
+    }
     bool stored(const Upload& upload) {
         Json::Value file;
         putPath(file, "path", upload.path());
         file["size"] = static_cast<Json::Int64>(upload.size());
         file["skipped"] = upload.skipped();
+        if (!upload.tag().empty()) file["etag"] = upload.tag();
         files.push_back(file);
         return true;
     }
@@ -104,16 +111,35 @@ bool readBody(long long length, bool& whole, Take take) {
     return true;
 }
 
+std::string variable(const char* name) {
+    const char* value = getenv(name);
+    return value == nullptr ? "" : value;
+}
+
+bool isConditional() {
+    return !variable("HTTP_IF_MATCH").empty() || !variable("HTTP_IF_NONE_MATCH").empty();
+}
+
+// Nothing for conditions that an upload does not know.
+std::optional<Condition> readCondition() {
+    const std::string none = variable("HTTP_IF_NONE_MATCH");
+    Condition condition = {.match = variable("HTTP_IF_MATCH"), .mustBeNew = none == "*"};
+    if ((!none.empty() && !condition.mustBeNew) || (condition.mustBeNew && !condition.match.empty()))
+        return std::nullopt;
+    return condition;
+}
+
 void storeRaw(const User& user, const VEXO::WebCGI& web, long long length, Outcome& outcome) {
     const auto path = pathParam(web);
     const auto mode = modeOf(web.GetParam("overwrite", "error"));
     const std::string search = web.GetParam("taskid", "");
+    const auto condition = readCondition();
     std::optional<time_t> modified;
-    if (!path || !mode || !isNoneOrTask(search) || !modifiedOf(web.GetParam("mtime", ""), modified)) {
+    if (!path || !mode || !condition || !isNoneOrTask(search) || !modifiedOf(web.GetParam("mtime", ""), modified)) {
         outcome.fail(ORV_ERR_PARAMETER, web.GetParam("path", ""), Status::kBadRequest);
         return;
     }
-    Upload upload(user, *path, *mode, search, modified);
+    Upload upload(user, *path, *mode, search, modified, *condition);
     int code = upload.begin();
     bool whole = false;
     if (code == ORV_ERR_NONE) {
@@ -201,11 +227,6 @@ void storeForm(const User& user, const VEXO::WebCGI& web, const std::string& bou
     if (reader.status() == MultipartReader::Status::kMore) outcome.refuse(CGI_UPLOAD_TORN_FORM, "");
 }
 
-std::string variable(const char* name) {
-    const char* value = getenv(name);
-    return value == nullptr ? "" : value;
-}
-
 // Nothing for a length that is missing, no number or more than a file can have.
 std::optional<long long> bodyLength() {
     const auto length = parseNumber(variable("CONTENT_LENGTH"));
@@ -217,7 +238,7 @@ void receive(const User& user, const VEXO::WebCGI& web, Outcome& outcome) {
     const std::string method = variable("REQUEST_METHOD"), type = variable("CONTENT_TYPE");
     const auto length = bodyLength();
     const bool posted = method == "POST";
-    if (!posted && method != "PUT") {
+    if ((!posted && method != "PUT") || (posted && isConditional() && type.starts_with("multipart/"))) {
         outcome.fail(ORV_ERR_PARAMETER, "", Status::kBadRequest);
     } else if (!length) {
         outcome.refuse(CGI_UPLOAD_SIZE, "");
@@ -241,6 +262,8 @@ void serveUploadProgram(Request& request, Output& out) {
     Json::Value data;
     data["files"] = Json::Value(Json::arrayValue);
     for (const Json::Value& file : outcome.files) data["files"].append(file);
+    if (const char* key = outcome.ownKey(); key != nullptr)
+        return replyOwnFailure(out, Status::kChanged, user.cookie, outcome.code, key, outcome.path, data);
     reply(out, outcome.status, user.cookie, outcome.code, outcome.path, data);
 }
 

@@ -8,6 +8,7 @@
 #include <csignal>
 
 #include "base/new_file.h"
+#include "download/range.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 #include "orvel/file_info.h"
@@ -17,13 +18,16 @@
 #include "reply.h"
 #include "shown_search.h"
 #include "temporary_folder.h"
-#include "vexo/copy.h"
 #include "vexo/user.h"
 
 namespace orvel::cgi {
 namespace {
 
 volatile std::sig_atomic_t terminated = 0;
+
+std::string tagOf(const struct stat& status) {
+    return entityTag(status.st_ino, status.st_size, status.st_mtim.tv_sec, status.st_mtim.tv_nsec);
+}
 
 // The volume's temporary folder is made while the process still may; where it cannot be, the spool says so.
 void prepareVolume(std::string volumePath) {
@@ -66,6 +70,16 @@ int Upload::begin() {
     return inspect();
 }
 
+// Whether what is at the path may be replaced, before the data comes.
+int Upload::judge(const Target& target, bool& there) const {
+    struct stat status {};
+    there = target.folder && fstatat(target.folder.get(), target.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
+    if (there && condition_.mustBeNew) return kUploadChanged;
+    if (there && !S_ISREG(status.st_mode)) return ORV_ERR_EXISTS;
+    const bool known = condition_.match.empty() || (there && namesTag(condition_.match, tagOf(status)));
+    return known ? static_cast<int>(ORV_ERR_NONE) : kUploadChanged;
+}
+
 // What the path leads to, as the user. CheckFile takes a link for no folder, so it is asked about where the links in
 // the path lead, which is within the share.
 int Upload::inspect() {
@@ -74,13 +88,14 @@ int Upload::inspect() {
     int code = previewTarget(info_, linkPolicyOf(info_.shareName), target, within);
     if (code == ORV_ERR_PARAMETER && mode_ == OVERWRITE_MODE_ERROR) return ORV_ERR_EXISTS;  // a share's root
     if (code != ORV_ERR_NONE) return code;
-    struct stat status {};
-    const bool there =
-        target.folder && fstatat(target.folder.get(), target.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
-    if (there && !S_ISREG(status.st_mode)) return ORV_ERR_EXISTS;
+    bool there = false;
+    code = judge(target, there);
+    if (code != ORV_ERR_NONE) return code;
     const std::string share = path_.substr(0, path_.size() - (info_.realPath.size() - info_.shareRoot.size()));
     code = CheckFile(share + within, user_.name.c_str(), user_.sid.c_str(), mode_);
     if (code != ORV_ERR_NONE) return code;
+    // The share may have made "skip" of it: files that are there stay.
+    if (mode_ == OVERWRITE_MODE_SKIP && !condition_.match.empty()) return ORV_ERR_DENIED;
     skipped_ = there && mode_ == OVERWRITE_MODE_SKIP;
     return skipped_ ? ORV_ERR_NONE : spool_.open(info_.volumePath);
 }
@@ -96,16 +111,31 @@ int Upload::put(const Target& target) {
     if (modified_ && !spool_.setModified(*modified_)) return uploadCodeOf(errno);
     const std::string source = spool_.publish(), place = target.folder.path(target.name);
     if (source.empty()) return uploadCodeOf(errno);
-    if (mode_ == OVERWRITE_MODE_OVERWRITE) {
+    if (mode_ == OVERWRITE_MODE_OVERWRITE && condition_.match.empty()) {
         OrvLibSetErr(ORV_ERR_NONE);
         return MoveFile(user_.name.c_str(), source.c_str(), place.c_str(), isCancelled) ? ORV_ERR_NONE : lastCode();
     }
     VEXOCOPYOPT options = {.uid = 0, .gid = 0, .isCancelled = isCancelled, .switches = VEXO_COPY_TAKE | VEXO_COPY_SYNC};
     if (modified_) options.switches |= VEXO_COPY_KEEP_TIMES;
     if (VEXOUserGetUGID(user_.name.c_str(), &options.uid, &options.gid) != 0) return ORV_ERR_GENERAL;
+    if (!condition_.match.empty()) return replace(source, place, options);
     if (VEXOFileCopy(source.c_str(), place.c_str(), &options) == 0) return ORV_ERR_NONE;
+    if (errno == EEXIST && condition_.mustBeNew) return kUploadChanged;
     skipped_ = errno == EEXIST && mode_ == OVERWRITE_MODE_SKIP;
     return skipped_ ? ORV_ERR_NONE : uploadCodeOf(errno);
+}
+
+int Upload::isExpected(const struct stat* old, const struct stat* fresh, void* upload) {
+    auto& self = *static_cast<Upload*>(upload);
+    self.tag_ = tagOf(*fresh);
+    return namesTag(self.condition_.match, tagOf(*old)) ? 1 : 0;
+}
+
+// In the place of the file that the client knew, whatever happens to the name meanwhile.
+int Upload::replace(const std::string& source, const std::string& place, const VEXOCOPYOPT& options) {
+    if (VEXOFileReplace(source.c_str(), place.c_str(), &options, isExpected, this) == 0) return ORV_ERR_NONE;
+    if (errno == ESTALE) return kUploadChanged;
+    return errno == ETXTBSY ? kUploadInUse : uploadCodeOf(errno);
 }
 
 int Upload::finish() {

@@ -2,6 +2,8 @@
 #ifndef ORVEL_CGI_UPLOAD_STORE_H
 #define ORVEL_CGI_UPLOAD_STORE_H
 
+#include <sys/stat.h>
+
 #include <ctime>
 #include <optional>
 #include <string>
@@ -11,6 +13,7 @@
 #include "request.h"
 #include "target.h"
 #include "upload/spool.h"
+#include "vexo/copy.h"
 
 namespace orvel::cgi {
 
@@ -18,14 +21,33 @@ namespace orvel::cgi {
 // begins to watch for it.
 int isCancelled();
 
+// What a client knew of the file when it decided to store its own: the headers If-Match and If-None-Match.
+struct Condition {
+    std::string match;       // tags of download, of which the file must have one; "" for none
+    bool mustBeNew = false;  // "*": no file
+};
+
+// Failures of a condition: the file is another one by now, or (of If-Match) somebody has it open for writing.
+inline constexpr int kUploadChanged = 1806;
+inline constexpr int kUploadInUse = 1807;
+
 // One file on its way to one path: begin, write as the data comes, finish. Each answers 0 or a library code, after
 // which the object is only destroyed; nothing is left behind then.
 class Upload {
  public:
     // `search`: task id of a search whose results shall show the file, "" for none. `modified`: the file's time of
     // modification, now without one.
-    Upload(const User& user, std::string path, _tag__type_ mode, std::string search, std::optional<time_t> modified)
-        : user_(user), path_(std::move(path)), mode_(mode), search_(std::move(search)), modified_(modified) {}
+    Upload(const User& user, std::string path, _tag__type_ mode, std::string search, std::optional<time_t> modified,
+           Condition condition = {})
+        : user_(user),
+          path_(std::move(path)),
+          mode_(mode),
+          search_(std::move(search)),
+          modified_(modified),
+          condition_(std::move(condition)) {
+        if (!condition_.match.empty()) mode_ = OVERWRITE_MODE_OVERWRITE;
+        if (condition_.mustBeNew) mode_ = OVERWRITE_MODE_ERROR;
+    }
 
     // Asks every rule and takes on the user's identity.
     int begin();
@@ -35,18 +57,25 @@ class Upload {
 
     // An existing file was left as it is, as asked for; what is written is not kept. Known after begin().
     [[nodiscard]] bool skipped() const { return skipped_; }
+    // Of what was stored under If-Match, "" otherwise: the tag that the next If-Match names.
+    [[nodiscard]] const std::string& tag() const { return tag_; }
     [[nodiscard]] const std::string& path() const { return path_; }
     [[nodiscard]] long long size() const { return spool_.size(); }
 
  private:
     int inspect();
+    int judge(const Target& target, bool& there) const;
     int put(const Target& target);
+    int replace(const std::string& source, const std::string& place, const VEXOCOPYOPT& options);
+    static int isExpected(const struct stat* old, const struct stat* fresh, void* upload);
 
     const User& user_;
     std::string path_;
     _tag__type_ mode_;
     std::string search_;
     std::optional<time_t> modified_;
+    Condition condition_;
+    std::string tag_;
     bool skipped_ = false;
     PathInfo info_;
     Spool spool_;
