@@ -2,9 +2,9 @@
 
 import { mayDownload, mayModify, mayWriteIn } from "./access.js";
 import { browser, chosenItems, go, goTo, goUp, refresh, setMode, shareEntry } from "./browser.js";
-import { isInBin, isReadOnlyShare } from "./entries.js";
+import { isInBin, isReadOnlyShare, mayBeText } from "./entries.js";
 import { download } from "./download.js";
-import { copyPath, newFolder, rename, showProperties } from "./operations.js";
+import { copyPath, newFolder, newText, rename, showProperties } from "./operations.js";
 import { isSearch } from "./path.js";
 import { editPath } from "./pathbar.js";
 import { preview } from "./preview.js";
@@ -103,6 +103,14 @@ addCommand({
   run: ({ single }) => preview(single),
 });
 addCommand({
+  id: "edit",
+  icon: "rename",
+  keys: ["F4"],
+  group: "change",
+  when: ({ single, canChange, canDownload, inBin }) => single && mayBeText(single) && canChange && canDownload && !inBin,
+  run: async ({ single }) => (await import("./editor.js")).edit(single),
+});
+addCommand({
   id: "download",
   icon: "download",
   keys: ["Mod+s"],
@@ -156,6 +164,14 @@ addCommand({
   group: "new",
   when: ({ canWrite, inBin }) => canWrite && !inBin,
   run: () => newFolder(),
+});
+addCommand({
+  id: "newText",
+  icon: "new-text",
+  keys: ["Alt+t"],
+  group: "new",
+  when: ({ canWrite, inBin }) => canWrite && !inBin,
+  run: () => newText(),
 });
 addCommand({
   id: "selectAll",

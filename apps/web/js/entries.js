@@ -45,6 +45,13 @@ export function extensionOf(entry) {
   return entry.isFolder ? "" : splitExtension(entry.name)[1].slice(1).toUpperCase();
 }
 
+const TEXT_KINDS = new Set(["text", "code", "misc", "sheet"]);
+
+// What is worth reading as a text, as far as the name says.
+export function mayBeText(entry) {
+  return !entry.isFolder && TEXT_KINDS.has(entry.kind);
+}
+
 // The recycle bin of a share has a name that says so.
 export function shownName(entry) {
   return entry.kind === "recycle" ? t("place.recycle") : entry.name;

@@ -45,6 +45,30 @@ export async function newFolder() {
   if (made && browser.id === folder) await refresh(made);
 }
 
+// An empty file, in the editor.
+export async function newText() {
+  const folder = browser.id;
+  const name = await askText({
+    title: t("newText.title"),
+    label: t("name.label"),
+    value: t("newText.name"),
+    selectTo: splitExtension(t("newText.name"))[0].length,
+    action: t("newFolder.action"),
+    check: checkName,
+    submit: async (text) => {
+      const { store } = await import("./editor.js");
+      await store(childOf(folder, encodeName(text)), new Uint8Array(), { "If-None-Match": "*" }).catch((failure) => {
+        throw failure.code === 1806 ? { ...failure, code: 414, path: text } : failure;
+      });
+    },
+  });
+  if (!name) return;
+  const id = childOf(folder, encodeName(name));
+  if (browser.id === folder) await refresh(id);
+  const { edit } = await import("./editor.js");
+  await edit({ id, name, parent: folder, kind: "text" });
+}
+
 // The search on screen, whose results follow what is done to them.
 export function searchTask() {
   return isSearch(browser.id) ? taskOf(browser.id) : undefined;

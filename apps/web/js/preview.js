@@ -6,15 +6,16 @@ import { browser } from "./browser.js";
 import { command, context, runCommand } from "./commands.js";
 import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { describe } from "./errors.js";
+import { mayBeText } from "./entries.js";
 import { formatSize, formatTime } from "./format.js";
 import { canShowImage, iconOf } from "./icons.js";
 import { download } from "./download.js";
 import { t } from "./strings.js";
+import { detect } from "./text_codec.js";
 
 const TEXT_START = 256 * 1024;
 const LARGEST_IMAGE = 64 * 1024 * 1024;
 const LARGEST_AHEAD = 16 * 1024 * 1024;
-const TEXT_KINDS = new Set(["text", "code", "misc", "sheet"]);
 
 let shown = null;
 
@@ -34,7 +35,7 @@ export function preview(entry, there = false) {
       "header",
       {},
       title,
-      ...["share", "delete"].map((id) =>
+      ...["edit", "share", "delete"].map((id) =>
         iconButton(command(id).icon, t(`command.${id}`), () => act(id), { "data-does": id }),
       ),
       iconButton("download", t("command.download"), () => download([shown.entry])),
@@ -140,14 +141,17 @@ async function contentOf(entry, signal) {
   if (entry.size === 0) return message(entry, t("preview.empty"));
   if (canShowImage(entry.name) && entry.size <= LARGEST_IMAGE) return imageOf(entry);
   if (entry.kind === "audio" || entry.kind === "video") return mediaOf(entry);
-  if (TEXT_KINDS.has(entry.kind)) return textOf(entry, signal);
+  if (mayBeText(entry)) return textOf(entry, signal);
   return message(entry, t("preview.none"));
 }
 
 // What the list does with what is chosen there: the file on screen.
-function act(id) {
+async function act(id) {
   if (id === "delete") shown.node.close();
-  runCommand(id);
+  if (id !== "edit") return runCommand(id);
+  const { entry } = shown;
+  await (await import("./editor.js")).edit(entry);
+  if (shown?.entry === entry) fill(browser.listing?.item(browser.listing.indexOf(entry.id)) ?? entry);
 }
 
 function source(entry) {
@@ -176,26 +180,12 @@ async function textOf(entry, signal) {
   const response = await send(source(entry), { headers: { Range: `bytes=0-${TEXT_START - 1}` }, signal });
   if (!response.ok) readReply(response.status, await response.text());
   const bytes = new Uint8Array(await response.arrayBuffer());
-  const encoding = encodingOf(bytes, entry.size > bytes.length);
+  const encoding = detect(bytes, entry.size > bytes.length);
   if (!encoding) return message(entry, t("preview.none"));
   const text = h("pre", { tabindex: 0 }, new TextDecoder(encoding).decode(bytes));
   return entry.size > TEXT_START
     ? h("div.text-part", {}, text, h("p.soft", {}, t("preview.start", { size: formatSize(TEXT_START) })))
     : text;
-}
-
-// Nothing for what is no text. `cut`: there is more of it, and the end may lie within a character.
-function encodingOf(bytes, cut) {
-  const [first, second] = bytes;
-  if (first === 0xff && second === 0xfe) return "utf-16le";
-  if (first === 0xfe && second === 0xff) return "utf-16be";
-  if (bytes.subarray(0, 4096).includes(0)) return null;
-  try {
-    new TextDecoder("utf-8", { fatal: true }).decode(bytes, { stream: cut });
-    return "utf-8";
-  } catch {
-    return "windows-1252";
-  }
 }
 
 function message(entry, text) {

@@ -15,6 +15,7 @@ const SORTS_OF_RESULTS = ["name", "ppath", "size", "mtime", "type"];
 const KINDS = ["all", "file", "dir"];
 const ON_CHOSEN = [
   "open",
+  "edit",
   "showInFolder",
   "download",
   "share",
@@ -57,7 +58,7 @@ export function contextItems() {
   const items = (ids) => ids.map(menuItem).filter(Boolean);
   if (context().count === 0) {
     return [
-      ...items(["newFolder", "upload", "uploadFolder"]),
+      ...items(["newFolder", "newText", "upload", "uploadFolder"]),
       "-",
       ...items(["undo", "paste", "selectAll", "refresh"]),
       "-",
@@ -65,9 +66,9 @@ export function contextItems() {
     ];
   }
   return [
-    ...items(ON_CHOSEN.slice(0, 4)),
+    ...items(ON_CHOSEN.slice(0, 5)),
     "-",
-    ...items(ON_CHOSEN.slice(4, 8)),
+    ...items(ON_CHOSEN.slice(5, 9)),
     "-",
     ...items(["rename", "compress", "extract", "restore"]),
     "-",
@@ -130,7 +131,7 @@ function paintToolbar(setSort) {
           ]
         : now.search
           ? [button("stopSearch"), button("search"), kindButton(), button("closeSearch")]
-          : [uploadButton(now), button("newFolder"), button("paste"), button("emptyBin")];
+          : [uploadButton(now), button("newFolder"), button("newText"), button("paste"), button("emptyBin")];
     const right = [
       sortButton(setSort),
       h(

@@ -1,0 +1,1 @@
+import{a,b,c,d,e}from"./OAP5JBPI.js";import"./5E2W5VT4.js";import"./DIWCGUSV.js";import"./ULE27ZYI.js";import"./JTCXYPTH.js";import"./NYMLT67K.js";import"./LRJEAXZW.js";export{e as autoCloseTags,d as html,a as htmlCompletionSource,b as htmlCompletionSourceWith,c as htmlLanguage};
