@@ -250,6 +250,8 @@ def files():
     ask("upload", "PUT", path="/projects/made/a.txt", body=b"text")
     ask("upload", "PUT", path="/projects/made/a.txt", overwrite="skip", body=b"text")
     ask("upload", "PUT", path="/projects/made/a.txt", body=b"text", success=False)
+    ask("upload", "PUT", path="/projects/made/a.txt", body=b"text", headers={"If-Match": "*"})
+    ask("upload", "PUT", path="/projects/made/a.txt", body=b"text", status=412, success=False, headers={"If-None-Match": "*"})
     ask("upload", "PUT", path_raw="/projects/made/b%FF.txt", mtime=1000000000, body=b"text")
     ask("upload", "PUT", path="/projects/x", mtime=4294967296, body=b"text", status=400, success=False, whole=False)
     ask("upload", "PUT", path="/projects/x", overwrite="wrong", body=b"text", status=400, success=False, whole=False)
