@@ -1,17 +1,11 @@
 // The parts of kept listings: ranges of rows, the file, the natural order.
-#include <fcntl.h>
-#include <gtest/gtest.h>
-#include <unistd.h>
-
-#include <algorithm>
 #include <fstream>
 #include <random>
-#include <string>
-#include <vector>
 
 #include "kept_file.h"
 #include "natural_order.h"
 #include "row_ranges.h"
+#include "support/testing.h"
 
 namespace {
 

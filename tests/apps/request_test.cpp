@@ -49,10 +49,12 @@ class ActAs : public ApplianceTest {};
 
 TEST_F(ActAs, NothingOfRootsIsLeft) {
     SKIP_WITHOUT_ROOT();
+    addUser("toor", 0, 0);
     constexpr int kAsUser = 0, kRefused = 1;
     for (const auto& [user, refused, outcome] : Rows<const char*, std::vector<Refusal>, int>{
              {"alice", {}, kAsUser},
              {"carol", {}, kAsUser},  // an administrator stays root
+             {"toor", {}, kRefused},  // nobody else does
              {"alice", {{SYS_setresuid, EPERM}}, kRefused},
              {"alice", {{SYS_setresgid, EPERM}}, kRefused},
              {"alice", {{SYS_setgroups, EPERM}}, kRefused},

@@ -1,12 +1,8 @@
 // Names that operations choose, and names that they refuse.
-#include <gtest/gtest.h>
-
-#include <string>
-#include <vector>
-
 #include "free_names.h"
 #include "operation/member_path.h"
 #include "operation/recycle.h"
+#include "support/testing.h"
 #include "text.h"
 
 namespace {

@@ -3,19 +3,12 @@
 
 #include <json/value.h>
 #include <json/writer.h>
-#include <sys/wait.h>
 #include <syslog.h>
-#include <unistd.h>
 
 #include <cmath>
-#include <csignal>
-#include <functional>
-#include <memory>
 
-#include "fault_gate.h"
-#include "support/appliance.h"
 #include "support/fault_sweep.h"
-#include "support/wait.h"
+#include "support/testing.h"
 #include "tasks/task_document.h"
 
 namespace {
