@@ -95,15 +95,6 @@ TEST_F(DownloadCgi, AFileComesWholeOrInPart) {
     EXPECT_EQ(fetch("/photo/f.html", {{"HTTP_IF_NONE_MATCH", tag}}).status, 200);
 }
 
-TEST_F(DownloadCgi, NamesOfAnyBytes) {
-    const std::string name = "\xE9 \"\n;.txt";
-    writeFile(shareRoot("photo") + "/" + name, "x", 0644);
-    const RawReply reply(ask("alice", "path_raw=" + percentEncode("/photo/" + percentEncode(name))));
-    EXPECT_EQ(reply.body, "x");
-    EXPECT_EQ(reply.headers.at("Content-Disposition"),
-              "attachment; filename=\"___ __;.txt\"; filename*=UTF-8''%EF%BF%BD%20%22%0A%3B.txt");
-}
-
 TEST_F(DownloadCgi, RefusalsShowInTheStatus) {
     const std::string root = shareRoot("photo");
     addShare("preview", "read only = no\nvalid users = alice\nvexo:restriction = 4\n");

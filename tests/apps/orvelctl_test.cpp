@@ -1,5 +1,4 @@
 // What the command-line tool says of itself: help, its exit status, completion.
-
 #include "apps/program.h"
 #include "criteria.h"
 #include "support/testing.h"

@@ -1,5 +1,4 @@
 // What the table of programs decides before a program sees the request.
-
 #include "apps/program.h"
 #include "program/program.h"
 #include "support/testing.h"

@@ -1,6 +1,5 @@
 // The program share as a web server runs it: who is let in, whose password is judged when. The time of guesses stands
 // where a test puts it.
-
 #include "apps/cgi_test.h"
 #include "public_link.h"
 #include "vexo/guess.h"

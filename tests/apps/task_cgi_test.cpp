@@ -1,5 +1,4 @@
 // Background operations as whoever started them sees them: progress, cancelling, lists, the search on screen.
-
 #include "apps/task_fixture.h"
 #include "support/gate.h"
 

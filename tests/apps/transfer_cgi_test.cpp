@@ -1,5 +1,4 @@
 // Copies and moves.
-
 #include "apps/task_fixture.h"
 #include "platform/private_mounts.h"
 #include "support/refuse_calls.h"

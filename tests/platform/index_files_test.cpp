@@ -1,5 +1,4 @@
 // The files of the index: what others put in their place, writers that die, and the central store.
-
 #include <random>
 
 #include "platform/index_fixture.h"

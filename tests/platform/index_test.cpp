@@ -1,5 +1,4 @@
 // What the index finds, keeps and orders, held against the criteria and against plain sorting.
-
 #include <random>
 
 #include "orvel/search_criteria.h"

@@ -1,6 +1,5 @@
 // Folders made with their parents.
 //   ORVEL_TEST_STORM_SECONDS: how long homes are made by many at once; without it a hundred are.
-
 #include "support/race.h"
 #include "support/refuse_calls.h"
 #include "support/testing.h"

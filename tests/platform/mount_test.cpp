@@ -1,5 +1,4 @@
 // The mount table and what is told from it.
-
 #include "filesystem/mount_table.h"
 #include "platform/private_mounts.h"
 #include "support/testing.h"

@@ -1,5 +1,4 @@
 // A process that serves one request looks at central files less often.
-
 #include "support/testing.h"
 #include "vexo/process.h"
 #include "vexo/settings.h"

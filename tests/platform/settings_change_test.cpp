@@ -1,5 +1,4 @@
 // Changing settings files: the texts, the file, and processes that are killed while they write.
-
 #include "platform/private_mounts.h"
 #include "platform/trust.h"
 #include "settings/settings_file.h"
