@@ -386,6 +386,28 @@ test("the keyboard alone is never lost", () =>
     assert.equal(await held(), "search-button");
   }));
 
+test("what was chosen is there in another browser, too", async () => {
+  const favourites = "section[aria-label=Favourites]";
+  await withPage("alice", { path: "/photo", kept: true }, async (page) => {
+    const sent = page.waitForResponse((response) => (response.request().postData() ?? "").includes("favourites"));
+    await page.click("[data-sort=mtime]");
+    await row(page, "Landscapes").click({ button: "right" });
+    await page.click(".menu >> text=Add to favourites");
+    assert.equal((await sent).status(), 200);
+  });
+  await withPage("alice", { kept: true }, async (page) => {
+    await page.click(`${favourites} >> text=Landscapes`);
+    await page.waitForSelector("#view >> text=Dusk.png");
+    await page.waitForSelector("[aria-sort=ascending] [data-sort=name]");
+    await page.goto(`${process.env.ORVEL_TEST_URL}#/photo`);
+    await page.waitForSelector("[aria-sort=ascending] [data-sort=mtime]");
+    await page.goto(`${process.env.ORVEL_TEST_URL}#/`);
+    await page.click("[aria-label='Remove Landscapes from favourites']");
+    await page.waitForSelector(favourites, { state: "detached" });
+    await page.waitForSelector("section[aria-label='Recent folders'] >> text=photo");
+  });
+});
+
 test("every module that a start needs is fetched at once", async () => {
   const web = new URL("../../apps/web/", import.meta.url);
   const listed = [...readFileSync(new URL("index.html", web), "utf8").matchAll(/(?:href|src)="js\/([\w.]+)"/g)].map(

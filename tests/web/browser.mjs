@@ -42,7 +42,8 @@ after(() => browser.close());
 const isNoPicture = (url) => new URL(url, URL_OF_PAGE).pathname === "/cgi-bin/thumbnail";
 
 // A page of `user`. `complaints` is what must be empty at the end: errors on the console or of scripts, failed requests.
-export async function openPage(user, { path = "/", ...options } = {}) {
+// What users choose in it reaches no other page, unless `kept`.
+export async function openPage(user, { path = "/", kept = false, ...options } = {}) {
   const context = await browser.newContext({
     viewport: { width: 1280, height: 800 },
     locale: "en-GB",
@@ -52,6 +53,7 @@ export async function openPage(user, { path = "/", ...options } = {}) {
     ...options,
   });
   const page = await context.newPage();
+  if (!kept) await page.route("**/cgi-bin/preferences*", (route) => route.fulfill({ json: { success: true, data: { values: {} } } }));
   if (SCREENSHOTS) photograph(page);
   page.complaints = [];
   page.on("console", (message) => {

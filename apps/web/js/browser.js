@@ -7,7 +7,7 @@ import { toast, toastFailure } from "./dialogs.js";
 import { heldItems } from "./clipboard.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
-import { emit } from "./events.js";
+import { emit, on } from "./events.js";
 import { isSearch, lastOf, parentOf, taskOf } from "./path.js";
 import { pref, setPref } from "./prefs.js";
 import { Selection } from "./selection.js";
@@ -17,6 +17,9 @@ import { t } from "./strings.js";
 const FIRST_LOOK = 60;
 // Most folders are there within this; only slower ones show that something is going on.
 const PATIENCE = 150;
+
+const USUAL_ORDER = { by: "name", ascending: true };
+const MOST_ORDERS = 100;
 
 export const browser = {
   id: "/", // of the folder, or of a search (see path.js)
@@ -29,7 +32,7 @@ export const browser = {
     onFailure: (failure) => (failure ? toastFailure(failure, browser.id) : toast({ text: t("chosen.again"), kind: "failed" })),
   }),
   mode: pref("mode", "list"),
-  sort: pref("sort", { by: "name", ascending: true }),
+  sort: pref("sort", USUAL_ORDER),
   filter: "",
   kind: "all", // of what a search shows: "file", "dir"
   view: null,
@@ -96,9 +99,10 @@ export async function open(id) {
   browser.filter = "";
   browser.kind = "all";
   browser.id = id;
-  if (!isSearch(id)) browser.lastFolder = id;
-  // A folder has no column of folders.
-  if (!isSearch(id) && browser.sort.by === COLUMNS.folder.sort) browser.sort = { by: "name", ascending: true };
+  if (!isSearch(id)) {
+    browser.lastFolder = id;
+    browser.sort = orderOf(id);
+  }
   const choice = toChoose ? { id: toChoose, far: true } : parentOf(from) === id ? { id: from } : null;
   toChoose = null;
   emit("place", id);
@@ -217,9 +221,36 @@ export function setMode(mode) {
 export function setSort(by) {
   const ascending = browser.sort.by === by ? !browser.sort.ascending : true;
   browser.sort = { by, ascending };
-  setPref("sort", browser.sort);
+  keepOrder(browser.id);
   reopen();
 }
+
+// A folder keeps its own order; results of a search have none to keep.
+function orderOf(id) {
+  return pref("orders", {})[id] ?? pref("sort", USUAL_ORDER);
+}
+
+function keepOrder(id) {
+  if (isSearch(id)) return;
+  const { [id]: _, ...others } = pref("orders", {});
+  setPref("orders", Object.fromEntries([...Object.entries(others), [id, browser.sort]].slice(-MOST_ORDERS)));
+}
+
+// The order on screen is that of all folders from now on.
+export function sortEverywhere() {
+  setPref("sort", browser.sort);
+  setPref("orders", {});
+}
+
+// What was chosen in another browser.
+on("prefs", (names) => {
+  if (names.includes("mode")) setMode(pref("mode", browser.mode));
+  if (isSearch(browser.id) || browser.id === "/") return;
+  const { by, ascending } = orderOf(browser.id);
+  if (by === browser.sort.by && ascending === browser.sort.ascending) return;
+  browser.sort = { by, ascending };
+  reopen();
+});
 
 export function setKind(kind) {
   browser.kind = kind;

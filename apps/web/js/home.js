@@ -1,11 +1,13 @@
 // The first thing one sees: the shares.
 
 import { browser } from "./browser.js";
-import { h, icon, nameNode } from "./dom.js";
+import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { isOffline, isReadOnlyShare } from "./entries.js";
 import { formatSize } from "./format.js";
-import { iconOf } from "./icons.js";
+import { folderKindOf, iconOf } from "./icons.js";
+import { decode, parentOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
+import { dropFavourite, favourites, recentPlaces } from "./places.js";
 import { t } from "./strings.js";
 
 export function homeNode() {
@@ -19,6 +21,8 @@ export function homeNode() {
       browser.shares.map((share) => h("li", {}, cardOf(share))),
     ),
     h("p.lead.nothing", { role: "status", hidden: true }, t("home.none")),
+    placesNode("home.favourites", favourites(), true),
+    placesNode("home.recent", recentPlaces(), false),
   );
 }
 
@@ -28,6 +32,31 @@ export function filterHome(node, text) {
   for (const line of node.querySelectorAll("li"))
     line.hidden = !line.querySelector("b").textContent.toLowerCase().includes(wanted);
   node.querySelector(".nothing").hidden = node.querySelector("li:not([hidden])") !== null;
+}
+
+function placesNode(title, ids, removable) {
+  if (ids.length === 0) return null;
+  const list = h("ul.places", {});
+  const section = h("section", { "aria-label": t(title) }, h("h2", {}, t(title)), list);
+  for (const id of ids) {
+    const link = h(
+      "a.place-link",
+      { href: `#${id}`, title: plainName(decode(id)) },
+      icon(`kind-${folderKindOf(id)}`, "file-icon"),
+      h("b", {}, nameNode(labelOf(id))),
+      h("span.about", {}, parentOf(id) === "/" ? "" : plainName(decode(parentOf(id)))),
+    );
+    const remove = () => {
+      dropFavourite(id);
+      const next = line.nextElementSibling ?? line.previousElementSibling;
+      line.remove();
+      if (next) next.querySelector("button").focus();
+      else section.remove();
+    };
+    const line = h("li", {}, link, removable && iconButton("close", t("home.drop", { name: plainName(labelOf(id)) }), remove));
+    list.append(line);
+  }
+  return section;
 }
 
 function cardOf(share) {

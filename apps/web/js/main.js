@@ -30,7 +30,9 @@ import { isUnreachable, untilReachable } from "./network.js";
 import { newFolder } from "./operations.js";
 import { isSearch, parentOf } from "./path.js";
 import { setupPathbar } from "./pathbar.js";
+import { setupPlaces } from "./places.js";
 import { setupPointer } from "./pointer.js";
+import { setupPrefs } from "./prefs.js";
 import { preview, previewed } from "./preview.js";
 import { setupRubber } from "./rubber.js";
 import { openSearch, searchAgain, searchFor, setupSearch } from "./search.js";
@@ -256,8 +258,13 @@ async function start() {
   on("access", () => {
     if (browser.id !== "/") paintListing();
   });
-  on("shares", () => {
-    if (browser.id === "/" && homeShown) showPlace();
+  for (const name of ["shares", "prefs", "places"])
+    on(name, () => {
+      if (browser.id === "/" && homeShown) showPlace();
+    });
+  on("prefs", () => {
+    applyDensity();
+    emit("columns");
   });
   applyDensity();
   setupAccess();
@@ -275,6 +282,7 @@ async function start() {
   setupSearch();
   setupActivity();
   setupDragAndDrop();
+  setupPlaces();
   addEventListener("hashchange", followAddress);
   addEventListener("beforeunload", (event) => {
     if (uploadsRunning()) event.preventDefault();
@@ -288,6 +296,7 @@ async function start() {
     setState(failedState(failure, undefined, { retry: () => location.reload() }));
     return;
   }
+  setupPrefs(browser.user);
   document.body.classList.add("started");
   setupTasks();
   followAddress().finally(() => emit("arrived"));

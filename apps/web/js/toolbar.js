@@ -1,6 +1,6 @@
 // The bar above the list: what can be done here, or with what is chosen.
 
-import { browser, setKind } from "./browser.js";
+import { browser, setKind, sortEverywhere } from "./browser.js";
 import { heldItems } from "./clipboard.js";
 import { command, context, keysOf, runCommand, shortcutText } from "./commands.js";
 import { $, h, icon, iconButton, keepFocus } from "./dom.js";
@@ -62,7 +62,7 @@ export function contextItems() {
       "-",
       ...items(["undo", "paste", "selectAll", "refresh"]),
       "-",
-      ...items(["emptyBin", "properties"]),
+      ...items(["favour", "unfavour", "emptyBin", "properties"]),
     ];
   }
   return [
@@ -74,7 +74,7 @@ export function contextItems() {
     "-",
     ...items(["delete", "deleteForever"]),
     "-",
-    ...items(["copyPath", "properties"]),
+    ...items(["favour", "unfavour", "copyPath", "properties"]),
   ];
 }
 
@@ -195,11 +195,15 @@ function sortButton(setSort) {
     t("sort.by", { column: t(`sort.${browser.sort.by}`) }),
     (event) =>
       openMenu(
-        (context().search ? SORTS_OF_RESULTS : SORTS).map((by) => ({
-          label: t(`sort.${by}`),
-          checked: browser.sort.by === by,
-          run: () => setSort(by),
-        })),
+        [
+          ...(context().search ? SORTS_OF_RESULTS : SORTS).map((by) => ({
+            label: t(`sort.${by}`),
+            checked: browser.sort.by === by,
+            run: () => setSort(by),
+          })),
+          "-",
+          !context().search && { label: t("sort.everywhere"), run: sortEverywhere },
+        ].filter(Boolean),
         { anchor: event.currentTarget },
       ),
     { id: "sort-button", "aria-haspopup": "menu" },
