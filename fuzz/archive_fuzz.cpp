@@ -33,7 +33,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const fs::path work = fs::path(fuzz::folder()) / "work", target = work / "target";
     fs::create_directories(target);
     {
-        orvel::cgi::Progress progress(task(), "extract");
+        orvel::cgi::Progress progress(task(), "alice", "extract");
         const orvel::Descriptor folder(open(target.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
         orvel::cgi::Unpacker unpacker(progress, {folder,
                                                  "/photo/target",
