@@ -12,6 +12,7 @@
 #include "command.h"
 #include "doctor_checks.h"
 #include "load_limits.h"
+#include "request.h"
 #include "vexo/error.h"
 #include "vexo/index.h"
 #include "vexo/settings.h"
@@ -29,6 +30,16 @@ std::string ageText(long long seconds) {
     if (seconds < 2 * kHour) return std::to_string(std::max(seconds / 60, 0LL)) + " minutes ago";
     if (seconds < 2 * kDay) return std::to_string(seconds / kHour) + " hours ago";
     return std::to_string(seconds / kDay) + " days ago";
+}
+
+// What is no number keeps a recycle bin to nothing.
+void judgeBinLimit(const std::string& setting, Findings& findings) {
+    const std::string text = VexoConf::Info().Get(setting, "");
+    if (text.empty() || cgi::parseNumber(text)) return;
+    findings.push_back({.severity = Severity::kProblem,
+                        .text = "the setting " + setting + " is no number: nothing goes by it",
+                        .advice = "write digits alone: " + setting + "=\"30\"",
+                        .file = "/etc/vexoinfo.conf"});
 }
 
 // A name that is not known is passed over by orveld, and the web server is turned away.
@@ -117,6 +128,11 @@ void checkSweep(Findings& findings) {
         finding.advice = "\"orvelctl sweep\" says which";
     }
     findings.push_back(finding);
+    std::vector<std::string> names = {"", "_home"};
+    for (const OpenShare& share : openShares()) names.push_back("_" + share.name);
+    for (const std::string& name : names) {
+        for (const char* setting : {"recycle_days", "recycle_mib"}) judgeBinLimit(setting + name, findings);
+    }
 }
 
 }  // namespace orvel::ctl

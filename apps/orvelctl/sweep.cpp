@@ -19,6 +19,7 @@
 #include "command.h"
 #include "folder_names.h"
 #include "kept_store.h"
+#include "operation/expiry.h"
 #include "operation/undo_record.h"
 #include "orvel/login_records.h"
 #include "orvel/task_progress.h"
@@ -218,6 +219,11 @@ Part sweepUndo(Sweep& /*sweep*/) {
     return part;
 }
 
+Part sweepBins(Sweep& sweep) {
+    cgi::Expiry expiry = cgi::expireBins([&sweep] { return sweep.isOver(); });
+    return {expiry.removed, std::move(expiry.error)};
+}
+
 // All that is swept. What grows by itself and is not here: the file of guesses has a fixed size; parts of killed work
 // in users' own folders are hidden and go when the same name is wanted again; logs belong to logrotate.
 constexpr struct {
@@ -235,6 +241,7 @@ constexpr struct {
     {"indexes", "left by killed builds", sweepIndexes},
     {"kept listings", "at rest for an hour", sweepKept},
     {"undo records", "older than two days", sweepUndo},
+    {"recycle bins", "beyond their days or size", sweepBins},  // last: it may take long
 };
 
 Json::Value jsonOf(const char* name, const Part& part) {

@@ -94,6 +94,7 @@ TEST_F(Doctor, NamesWhatIsWrong) {
          "names nobody-of-this-name, who is no user here"},
         {"sweep", "true", "problem", "nothing was ever swept"},
         {"sweep", std::string(ORVELCTL) + " sweep", "good", "swept 0 minutes ago"},
+        {"sweep", "echo 'recycle_days=\"a week\"' >>etc/vexoinfo.conf", "problem", "recycle_days is no number"},
         {"sweep", "sed -i 's/time=.*/time=\"1000\"/' var/lib/vexo/sweep", "problem", "days ago"},
         {"indexes", "true", "good", "no share has an index"},
     };

@@ -216,6 +216,9 @@ def files():
     ask("list", action="folder", path="/nosuch", success=False)
     ask("list", action="folder", path="/photo", pattern="x" * 491, status=400, success=False)
     ask("list", whole=False, status=400, success=False)
+    ask("upload", "PUT", path_raw="/projects/b%FFin/g%FFone", body=b"text")
+    finished(ask("operation", "POST", action="delete", path_raw="/projects/b%FFin/g%FFone")["data"]["taskid"])
+    ask("list", action="deleted", sort_by="from", sort_direction="asc", pattern="g*", limit=5, offset=0, filetype="file")
 
     for path in ("/projects", "/projects/not%FFtext"):
         kept = ask("list", action="folder", path_raw=path, keep="1", natural="de", folders_first="1", limit=2)["data"]["listing"]

@@ -236,3 +236,38 @@ test("undone by a key: a rename, a deletion; what stands in the way is named", (
     await wentWell(page, "Undo: Delete “one.txt”");
     assert.equal(readFileSync(file, "utf8"), "first");
   }));
+
+test("deleted files: one list of all bins, sorted, searched, restored, emptied", () =>
+  withPage("alice", { path: "/projects/undone" }, async (page) => {
+    mkdirSync(`${projects}/#recycle/samba`, { recursive: true });
+    chmodSync(`${projects}/#recycle/samba`, 0o777);
+    writeFileSync(`${projects}/#recycle/samba/unknown.txt`, "by Samba");
+    writeFileSync(`${projects}/undone/gone.txt`, "gone");
+    await page.keyboard.press("Alt+r");
+    await row(page, "gone.txt").click();
+    await page.keyboard.press("Delete");
+    await wentWell(page, "Delete “gone.txt”");
+    await page.click("#deleted-link");
+    await page.waitForSelector("#deleted-link[aria-current]");
+    await rowsReady(page);
+    assert.match(await row(page, "gone.txt").innerText(), /\/projects\/undone.*alice/s);
+    assert.match(await row(page, "unknown.txt").innerText(), /\/projects\/samba.*around.*not known/s);
+    await page.click("[data-sort=name]");
+    await page.waitForSelector("[aria-sort=ascending]");
+    await page.fill("#find", "gone");
+    await page.waitForSelector("#status >> text=1 item");
+    assert.equal(await page.locator("#toolbar [data-command=emptyBin]").count(), 0); // it would empty more than is shown
+    await row(page, "gone.txt").click();
+    await page.click("#toolbar [data-command=restore]");
+    await wentWell(page, "Restore “gone.txt”");
+    assert.equal(readFileSync(`${projects}/undone/gone.txt`, "utf8"), "gone");
+    await page.fill("#find", "");
+    await row(page, "unknown.txt").waitFor();
+    assert.equal(await row(page, "gone.txt").count(), 0);
+    await page.click("#toolbar [data-command=emptyBin]");
+    await page.click(".dialog >> text=Empty recycle bin");
+    await wentWell(page, "Empty recycle bin");
+    await page.waitForSelector(".state >> text=The recycle bin is empty");
+    await go(page, "/projects");
+    await page.waitForSelector("#deleted-link:not([aria-current])");
+  }));

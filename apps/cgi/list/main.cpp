@@ -1,7 +1,7 @@
 // CGI program "list": what a folder holds, and which shares there are.
 //
 // Parameters, from the query or a form:
-//   action           "shares", "folder", or one on a kept listing
+//   action           "shares", "folder", "deleted" (see list/deleted.h), or one on a kept listing
 //   path, path_raw   the folder (folder only)
 //   sort_by          as for OrvEnum; without it folders come by name, shares with the home folder first
 //   sort_direction   "asc" (default) or "desc"
@@ -16,6 +16,7 @@
 #include <optional>
 #include <string>
 
+#include "list/deleted.h"
 #include "list/kept.h"
 #include "listing.h"
 #include "orvel/error_state.h"
@@ -56,10 +57,12 @@ void serveListProgram(Request& request, Output& out) {
     const VEXO::WebCGI& web = request.web;
     const std::string action = web.GetParam("action", "");
     const auto wanted = parse(web, user);
-    if (!wanted || (action != "shares" && action != "folder" && !isKeptAction(action))) {
+    const bool known = action == "shares" || action == "folder" || action == "deleted" || isKeptAction(action);
+    if (!wanted || !known) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
 
+    if (action == "deleted") return serveDeleted(request, *wanted, out);
     if (isKeptAction(action)) return serveKept(request, action, *wanted, out);
     if (action == "folder" && wantsToKeep(web)) return serveKeeping(request, *wanted, out);
 

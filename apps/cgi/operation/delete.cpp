@@ -1,8 +1,7 @@
 #include "operation/change_notices.h"
 #include "operation/operation.h"
-#include "operation/recycle.h"
+#include "operation/recycle_item.h"
 #include "operation/task_start.h"
-#include "operation/transfer.h"
 #include "operation/tree_remove.h"
 #include "orvel/error_state.h"
 
@@ -35,25 +34,7 @@ void expectAll(Operation& operation, bool permanent, Progress& progress) {
     }
 }
 
-bool recycle(const RecycleBin& bin, const Item& item, const Owner& owner, Progress& progress) {
-    Target folder;
-    Entry place{};
-    const int code = bin.placeFor(item, owner, folder, place);
-    if (code != ORV_ERR_NONE) {
-        progress.failed(item.info.path, code);
-        return false;
-    }
-    Transfer transfer(
-        progress,
-        {.conflict = Conflict::kKeepBoth, .move = true, .owner = owner, .onFat = false, .nextName = nextBinName});
-    const bool gone = transfer.run(item, place);
-    if (!gone) removeMadeFolders(folder);  // as far as nothing arrived
-    return gone;
-}
-
 void run(Operation& operation, bool permanent, Progress& progress) {
-    const std::string& user = operation.user.name;
-    const Owner owner = ownerFor(user);
     ChangeNotices notices(operation);
     operation.chosen.reportNew(operation.user, progress);
     expectAll(operation, permanent, progress);
@@ -68,7 +49,7 @@ void run(Operation& operation, bool permanent, Progress& progress) {
         }
         const long long before = progress.itemsDone();
         if (!bin) progress.undo().leaveOut();
-        const bool gone = bin ? recycle(*bin, item, owner, progress) : removeTree(item.entry(), progress);
+        const bool gone = bin ? recycleItem(*bin, item, operation.user, progress) : removeTree(item.entry(), progress);
         if (gone || progress.itemsDone() != before) {
             notices.deleted(item.info.path, item.changed(), S_ISDIR(item.status.st_mode), gone);
         }

@@ -76,8 +76,8 @@ Descriptor enter(const Descriptor& folder, const std::string& name, const Descri
 }
 
 // As Samba's module makes them: the owner's alone. Our own bin is there where the administrator made it.
-Descriptor openBin(const Descriptor& root, std::string_view path) {
-    const bool make = path != "#recycle";
+Descriptor openBin(const Descriptor& root, std::string_view path, bool make) {
+    make = make && path != "#recycle";
     Descriptor folder(openat(root.get(), ".", kOpenFolder));
     while (folder && !path.empty()) {
         const std::string name(path.substr(0, path.find('/')));
@@ -123,6 +123,14 @@ std::string nextBinName(const std::string& name, int number, bool /*isFolder*/) 
 }
 
 int RecycleBin::open(const PathInfo& info, std::optional<RecycleBin>& bin) {
+    return open(info, true, bin);
+}
+
+int RecycleBin::openPresent(const PathInfo& info, std::optional<RecycleBin>& bin) {
+    return open(info, false, bin);
+}
+
+int RecycleBin::open(const PathInfo& info, bool make, std::optional<RecycleBin>& bin) {
     RecycleBin found;
     found.root_ = Descriptor(::open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
     if (!found.root_) return refusalCode(errno, info.shareRoot);
@@ -131,7 +139,7 @@ int RecycleBin::open(const PathInfo& info, std::optional<RecycleBin>& bin) {
         return OrvParseErrnoToError(errno, nullptr, nullptr);
     }
     found.name_ = path;
-    found.folder_ = openBin(found.root_, found.name_);
+    found.folder_ = openBin(found.root_, found.name_, make);
     const bool none = !found.folder_ && (errno == ENOENT || errno == ENOTDIR || errno == ELOOP);
     if (!found.folder_) return none ? static_cast<int>(ORV_ERR_NONE) : refusalCode(errno, info.shareRoot);
     found.shareName_ = info.shareName;
@@ -163,9 +171,16 @@ int RecycleBin::placeFor(const Item& item, const Owner& owner, Target& target, E
 }
 
 std::string RecycleBin::originOf(const Item& item) const {
-    std::string path = "/" + shareName_;
-    for (const std::string& name : foldersOf(item, path_)) path += "/" + originalName(name);
-    return path + "/" + originalName(item.place.name);
+    return originOf(item.realPath().substr(path_.size() + 1));
+}
+
+std::string RecycleBin::originOf(const std::string& path) const {
+    std::string origin = "/" + shareName_;
+    for (size_t begin = 0, end = 0; end != path.size(); begin = end + 1) {
+        end = std::min(path.find('/', begin), path.size());
+        origin += "/" + originalName(path.substr(begin, end - begin));
+    }
+    return origin;
 }
 
 void RecycleBin::prune(const Item& item) const {

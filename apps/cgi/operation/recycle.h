@@ -10,6 +10,7 @@
 #include <optional>
 #include <string>
 
+#include "deleted_log.h"
 #include "operation/item.h"
 
 namespace orvel::cgi {
@@ -25,6 +26,8 @@ class RecycleBin {
     // The bin of the share of `info`; nothing where it has none (or a link in its place). 0, or a library code when
     // that could not be determined: what is deleted must then not be deleted permanently.
     static int open(const PathInfo& info, std::optional<RecycleBin>& bin);
+    // The same, and nothing is made.
+    static int openPresent(const PathInfo& info, std::optional<RecycleBin>& bin);
 
     // Whether the item is the bin itself, and whether it lies in it.
     [[nodiscard]] bool is(const Item& item) const { return item.realPath() == path_; }
@@ -35,6 +38,8 @@ class RecycleBin {
     int placeFor(const Item& item, const Owner& owner, Target& target, Entry& place) const;
     // Where the item, which the bin holds, once was: a share-relative path.
     [[nodiscard]] std::string originOf(const Item& item) const;
+    // The same of a path in the bin.
+    [[nodiscard]] std::string originOf(const std::string& path) const;
     // Removes the folders above the item as far as they are empty.
     void prune(const Item& item) const;
 
@@ -44,7 +49,12 @@ class RecycleBin {
     // Its path as people know it.
     [[nodiscard]] std::string sharePath() const { return "/" + shareName_ + "/" + name_; }
 
+    // What records of its deletions are found by.
+    [[nodiscard]] RecordedBin recorded() const { return {definedShareName(shareName_), path_}; }
+
  private:
+    static int open(const PathInfo& info, bool make, std::optional<RecycleBin>& bin);
+
     Descriptor root_, folder_;      // opened O_PATH
     std::string shareName_, name_;  // its path in the share
     std::string rootPath_, path_;   // real paths

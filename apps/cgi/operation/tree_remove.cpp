@@ -80,6 +80,11 @@ bool removeIn(const Entry& entry, dev_t device, int depth, Progress& progress) {
 
 }  // namespace
 
+void removeTreeQuietly(int folder, const std::string& name) {
+    struct stat status {};
+    if (fstat(folder, &status) == 0) removeQuietly(folder, name, status.st_dev, 0);
+}
+
 bool removeTree(const Entry& entry, Progress& progress) {
     struct stat status {};
     // Its folder's, since the entry itself may be where another file system is mounted.

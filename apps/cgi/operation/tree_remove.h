@@ -11,6 +11,8 @@ namespace orvel::cgi {
 // is reported, each item for itself, and the rest goes on; another file system that is mounted in the tree stays. True
 // when all of it is gone.
 bool removeTree(const Entry& entry, Progress& progress);
+// The same without a word, and in the system's name: nothing is kept out.
+void removeTreeQuietly(int folder, const std::string& name);
 
 }  // namespace orvel::cgi
 

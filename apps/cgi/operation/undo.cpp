@@ -9,7 +9,7 @@
 #include "operation/change_notices.h"
 #include "operation/moved_links.h"
 #include "operation/operation.h"
-#include "operation/recycle.h"
+#include "operation/recycle_item.h"
 #include "operation/task_reply.h"
 #include "operation/task_start.h"
 #include "operation/transfer.h"
@@ -143,16 +143,7 @@ bool Undo::moveTo(const Item& item, const PathInfo& info, Target& place, Transfe
 }
 
 bool Undo::recycle(const Item& item, const RecycleBin& bin) {
-    Target folder;
-    Entry place{};
-    const Owner owner = ownerFor(user_.name);
-    const int code = bin.placeFor(item, owner, folder, place);
-    if (code != ORV_ERR_NONE) return failed(item.info.path, code);
-    Transfer transfer(
-        progress_,
-        {.conflict = Conflict::kKeepBoth, .move = true, .owner = owner, .onFat = false, .nextName = nextBinName});
-    const bool gone = transfer.run(item, place);
-    if (!gone) removeMadeFolders(folder);
+    const bool gone = recycleItem(bin, item, user_, progress_);
     if (gone) notices_.deleted(item.info.path, item.changed(), S_ISDIR(item.status.st_mode), true);
     return gone;
 }

@@ -8,10 +8,10 @@ import { heldItems } from "./clipboard.js";
 import { announce } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { emit, on } from "./events.js";
-import { isSearch, lastOf, parentOf, taskOf } from "./path.js";
+import { isDeleted, isSearch, lastOf, parentOf, taskOf } from "./path.js";
 import { pref, setPref } from "./prefs.js";
 import { Selection } from "./selection.js";
-import { entryAt, folderListing, renewKept, rowsOfNames, searchResults } from "./sources.js";
+import { deletedListing, entryAt, folderListing, renewKept, rowsOfNames, searchResults } from "./sources.js";
 import { t } from "./strings.js";
 
 const FIRST_LOOK = 60;
@@ -20,6 +20,7 @@ const PATIENCE = 150;
 
 const USUAL_ORDER = { by: "name", ascending: true };
 const MOST_ORDERS = 100;
+const LAST_DELETED = { by: "deleted", ascending: false };
 
 export const browser = {
   id: "/", // of the folder, or of a search (see path.js)
@@ -78,7 +79,7 @@ export function goUp() {
 }
 
 function columns() {
-  return chosenColumns(isSearch(browser.id), browser.sort);
+  return chosenColumns(isSearch(browser.id), browser.sort, isDeleted(browser.id));
 }
 
 function changed(listing) {
@@ -103,6 +104,8 @@ export async function open(id) {
     browser.lastFolder = id;
     browser.sort = orderOf(id);
   }
+  if (isDeleted(id) && !isDeleted(from)) browser.sort = LAST_DELETED;
+  else if (isDeleted(from) && isSearch(id) && !isDeleted(id)) browser.sort = pref("sort", USUAL_ORDER);
   const choice = toChoose ? { id: toChoose, far: true } : parentOf(from) === id ? { id: from } : null;
   toChoose = null;
   emit("place", id);
@@ -126,10 +129,15 @@ async function openFile(id, mine) {
   location.replace(`#${entry.parent}`);
 }
 
+function listingOf(id) {
+  if (isDeleted(id)) return deletedListing(browser, changed);
+  return isSearch(id) ? searchResults(taskOf(id), browser, changed) : folderListing(id, browser, changed);
+}
+
 // `wanted`: {id, far} of the entry to choose; `far` when it is worth looking for in all of the folder. `keep`: what is
 // chosen stays chosen.
 async function show(id, mine, wanted, keep = false) {
-  const listing = isSearch(id) ? searchResults(taskOf(id), browser, changed) : folderListing(id, browser, changed);
+  const listing = listingOf(id);
   listing.onGone = (kept) => browser.selection.lose(kept) && toast({ text: t("chosen.lost"), kind: "failed" });
   const saved = remembered.get(id);
   renewKept([heldItems()?.choice.rows?.listing]);

@@ -24,6 +24,23 @@ export const COLUMNS = {
   crtime: timeColumn("crtime", (entry) => entry.time?.crtime),
   posix: { id: "posix", sort: "posix", width: 100, grows: 0, text: (entry) => (entry.perm ? formatMode(entry.perm.posix) : "") },
 };
+// Of what was deleted. Where nobody recorded it the date is the best that is known, and nobody is named.
+const about = (text) => (entry) => (entry.deleted ? text(entry.deleted) : "");
+Object.assign(COLUMNS, {
+  from: { id: "from", sort: "from", width: 180, grows: 3, text: about(({ from }) => plainName(decode(from))) },
+  deleted: {
+    id: "deleted",
+    sort: "deleted",
+    width: 150,
+    grows: 0.4,
+    text: about(({ time, recorded }) => (recorded ? formatTime(time) : t("deleted.about", { time: formatTime(time) }))),
+    title: about(({ time, recorded }) => (recorded ? formatFullTime(time) : t("deleted.about.hint"))),
+  },
+  by: { id: "by", sort: "deleter", width: 96, grows: 0.6, text: about(({ by, recorded }) => (recorded ? by : t("deleted.unknown"))) },
+});
+const OF_DELETED = ["name", "from", "deleted", "by", "size"];
+export const DELETED_SORTS = ["deleted", "name", "from", "deleter", "size"];
+
 // The ones to the right go first where there is no room.
 const OPTIONAL = ["size", "mtime", "type", "owner", "group", "crtime", "posix"];
 const USUAL = ["size", "mtime", "type", "owner"];
@@ -52,8 +69,8 @@ function wanted() {
 }
 
 // Those of a folder, or of a search, which says where each entry lies.
-export function chosenColumns(search, sort) {
-  const ids = search ? ["name", "folder", ...wanted().filter((id) => id !== "owner")] : ["name", ...wanted()];
+export function chosenColumns(search, sort, deleted = false) {
+  const ids = deleted ? OF_DELETED : search ? ["name", "folder", ...wanted().filter((id) => id !== "owner")] : ["name", ...wanted()];
   return ids.map((id) => ({
     ...COLUMNS[id],
     sorted: COLUMNS[id].sort !== sort.by ? null : sort.ascending ? "ascending" : "descending",
@@ -64,7 +81,7 @@ export function chosenColumns(search, sort) {
 export function fitColumns(columns, room) {
   const fitting = [...columns];
   const taken = () => BESIDE + NAME_LEAST + fitting.reduce((sum, { width = 0 }) => sum + width, 0);
-  const least = columns.some(({ id }) => id === "folder") ? 2 : 1; // where a found entry lies is always said
+  const least = columns.some(({ id }) => id === "folder" || id === "from") ? 2 : 1; // where a found entry lies is always said
   while (fitting.length > least && taken() > room) fitting.pop();
   const template = fitting.map(({ id, width, grows }) =>
     id === "name" ? "minmax(0, 4fr)" : grows > 0 ? `minmax(${width}px, ${grows}fr)` : `${width}px`,

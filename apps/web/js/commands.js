@@ -5,7 +5,7 @@ import { browser, chosenItems, go, goTo, goUp, refresh, setMode, shareEntry } fr
 import { isInBin, isReadOnlyShare, mayBeText } from "./entries.js";
 import { download } from "./download.js";
 import { copyPath, newFolder, newText, rename, showProperties } from "./operations.js";
-import { isSearch } from "./path.js";
+import { isDeleted, isSearch } from "./path.js";
 import { editPath } from "./pathbar.js";
 import { preview } from "./preview.js";
 import { t } from "./strings.js";
@@ -39,12 +39,13 @@ export function context() {
   const count = listing?.ready ? selection.count : 0;
   const share = shareEntry(browser.id);
   const folder = browser.id !== "/" && Boolean(listing?.ready);
-  const search = isSearch(browser.id);
+  const deleted = isDeleted(browser.id);
+  const search = isSearch(browser.id) && !deleted;
   const first = selection.first ?? (selection.rows && listing.item(selection.cursor));
   const onRow = listing?.item(selection.cursor);
-  const home = search && first ? shareEntry(first.id) : share;
-  const lies = search && first ? first.id : browser.id;
-  const writable = search || mayWriteIn(browser.id);
+  const home = (search || deleted) && first ? shareEntry(first.id) : share;
+  const lies = (search || deleted) && first ? first.id : browser.id;
+  const writable = search || deleted || mayWriteIn(browser.id);
   return {
     folder,
     search,
@@ -54,7 +55,8 @@ export function context() {
     // What is chosen by name alone has its properties in its row.
     single: selection.single && selection.single.id === onRow?.id ? onRow : selection.single,
     canWrite: folder && share !== undefined && !isReadOnlyShare(share) && writable,
-    inBin: isInBin(browser.id),
+    inBin: deleted || isInBin(browser.id),
+    deleted,
   };
 }
 

@@ -24,6 +24,7 @@ export function entryOf(item) {
     perm: more.perm,
     right: more.perm?.share_right,
     volume: more.volume_status,
+    deleted: item.deleted && { ...item.deleted, from: idIn(item.deleted, "from") },
     synced: more.sync_share ?? false,
   };
 }

@@ -28,7 +28,7 @@ import { setupKeys } from "./keys.js";
 import "./links.js";
 import { isUnreachable, untilReachable } from "./network.js";
 import { newFolder } from "./operations.js";
-import { isSearch, parentOf } from "./path.js";
+import { isDeleted, isSearch, parentOf } from "./path.js";
 import { setupPathbar } from "./pathbar.js";
 import { setupPlaces } from "./places.js";
 import { setupPointer } from "./pointer.js";
@@ -121,11 +121,13 @@ function paintNotice(listing) {
 function stateOf(listing) {
   if (listing.error && !isStale(listing)) {
     const { id } = browser;
+    if (isDeleted(id)) return failedState(listing.error, "", { retry: () => open(id), back: goUp });
     if (isSearch(id)) return failedState(listing.error, "", { retry: searchAgain, back: goUp });
     const back = parentOf(id) === "/" ? null : goUp;
     return failedState(listing.error, undefined, { retry: () => open(id), back, why: () => showWhy(id) });
   }
   if (!listing.ready || listing.total > 0) return null;
+  if (isDeleted(browser.id) && browser.filter === "") return emptyBin();
   if (isSearch(browser.id) && browser.filter === "" && browser.kind === "all")
     return listing.extra.finished ? nothingMatches(openSearch) : stillSearching();
   if (browser.filter !== "" || browser.kind !== "all") {
@@ -178,7 +180,7 @@ function setupFind() {
     }
     if (event.key === "ArrowDown") $("view").focus();
     // Here is only what lies in this folder: Enter looks below it, and from the start in all shares.
-    if (event.key === "Enter" && input.value.trim() !== "") {
+    if (event.key === "Enter" && input.value.trim() !== "" && !isDeleted(browser.id)) {
       clearTimeout(timer);
       searchFor(input.value.trim());
     }
@@ -211,7 +213,11 @@ function setupSidebar() {
     button.setAttribute("aria-expanded", "true");
     $("tree").querySelector("[tabindex='0']")?.focus();
   });
-  on("place", close);
+  on("place", (id) => {
+    close();
+    if (isDeleted(id)) $("deleted-link").setAttribute("aria-current", "page");
+    else $("deleted-link").removeAttribute("aria-current");
+  });
   addEventListener("keydown", (event) => {
     if (event.key === "Escape") close();
   });

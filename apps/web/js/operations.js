@@ -9,7 +9,7 @@ import { emit } from "./events.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
 import { askInPlace } from "./in_place.js";
-import { childOf, decode, encodeName, isSearch, nameOf, parentOf, splitExtension, taskOf } from "./path.js";
+import { childOf, decode, encodeName, isDeleted, isSearch, nameOf, parentOf, splitExtension, taskOf } from "./path.js";
 import { entryAt } from "./sources.js";
 import { t } from "./strings.js";
 import { whyNode } from "./why.js";
@@ -71,7 +71,7 @@ export async function newText() {
 
 // The search on screen, whose results follow what is done to them.
 export function searchTask() {
-  return isSearch(browser.id) ? taskOf(browser.id) : undefined;
+  return isSearch(browser.id) && !isDeleted(browser.id) ? taskOf(browser.id) : undefined;
 }
 
 export async function rename(entry) {

@@ -35,6 +35,13 @@ export function isSearch(place) {
   return place.startsWith("?");
 }
 
+// All recycle bins as one list: among the places a search, of which the answer is there at once.
+export const DELETED = "?deleted";
+
+export function isDeleted(place) {
+  return place === DELETED;
+}
+
 export function taskOf(search) {
   return search.slice(1).split("&", 1)[0];
 }

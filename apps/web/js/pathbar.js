@@ -2,7 +2,7 @@
 
 import { $, h, icon, iconButton, nameNode, plainName, set } from "./dom.js";
 import { browser, go } from "./browser.js";
-import { ancestry, decode, encodePath, isSearch, nameOf, normaliseId } from "./path.js";
+import { ancestry, decode, encodePath, isDeleted, isSearch, nameOf, normaliseId } from "./path.js";
 import { isRecycleBin } from "./entries.js";
 import { on } from "./events.js";
 import { openMenu } from "./menu.js";
@@ -12,6 +12,7 @@ const bar = document.getElementById("pathbar");
 
 export function labelOf(id) {
   if (id === "/") return t("place.shares");
+  if (isDeleted(id)) return t("place.deleted");
   if (isSearch(id)) return t("place.search");
   if (id === "/home") return t("place.home");
   return isRecycleBin(id) ? t("place.recycle") : nameOf(id);

@@ -8,7 +8,7 @@ import { $, announce, h, iconButton } from "./dom.js";
 import { describe } from "./errors.js";
 import { on } from "./events.js";
 import { formatTime } from "./format.js";
-import { isSearch, normaliseId, taskOf } from "./path.js";
+import { isDeleted, isSearch, normaliseId, taskOf } from "./path.js";
 import { isEmptySearch, paramsOf, searchForm } from "./search_form.js";
 import { firstPage, keepFirstPage } from "./sources.js";
 import { t } from "./strings.js";
@@ -24,7 +24,7 @@ export function setupSearch() {
   on("place", (id) => {
     clearTimeout(timer);
     polls = 0;
-    if (!isSearch(id)) return closePanel();
+    if (!isSearch(id) || isDeleted(id)) return closePanel();
     asked = recall(id) ?? asked;
     if (asked.folder) browser.lastFolder = normaliseId(asked.folder);
     return undefined;
@@ -81,7 +81,7 @@ async function start(values) {
   if (complaint.textContent) return;
   const filled = Object.entries({ ...values, folder: browser.lastFolder }).filter(([, value]) => value !== "");
   asked = Object.fromEntries(filled);
-  const before = isSearch(browser.id) ? browser.id : null;
+  const before = isSearch(browser.id) && !isDeleted(browser.id) ? browser.id : null;
   try {
     const page = firstPage(browser.sort);
     const { taskid, first } = await post("search", { action: "start", ...params, ...page });

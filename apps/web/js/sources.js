@@ -4,7 +4,7 @@ import { ApiError, get, MISSING, post } from "./api.js";
 import { breathe } from "./dom.js";
 import { entryOf } from "./entries.js";
 import { Listing, PAGE } from "./listing.js";
-import { encodeName, inBothForms, inForms, lastOf, parentOf, patternOf } from "./path.js";
+import { encodeName, inBothForms, inForms, lastOf, parentOf, patternOf, splitExtension } from "./path.js";
 import { language } from "./strings.js";
 
 const ADDITIONAL = "size,time,owner,perm,mount_point_type,icon";
@@ -126,6 +126,19 @@ export function searchResults(taskid, { sort, filter, kind }, onChange) {
     return { ...reply, items: await entriesOf(reply.items) };
   };
   return new Listing([kind], fetchPart, onChange, LONGEST_PAGE);
+}
+
+// What lies in the recycle bins of all shares.
+export function deletedListing({ sort, filter }, onChange) {
+  const pattern = filter === "" ? undefined : inBothForms(`*${filter.replace(/[,\\]/g, "?")}*`);
+  const asked = { action: "deleted", pattern, ...orderOf(sort) };
+  const fetchPart = async (filetype, { offset, limit, signal }) => {
+    const reply = await get("list", { ...asked, filetype, offset, limit: limit || LONGEST_PAGE }, signal);
+    const iconOf = ({ name }) => `${splitExtension(name)[1].slice(1).toLowerCase()}.png`;
+    const items = reply.items.map((item) => (item.isdir ? item : { ...item, icon: iconOf(item) }));
+    return { ...reply, items: await entriesOf(items), finished: true };
+  };
+  return new Listing(["all"], fetchPart, onChange, LONGEST_PAGE);
 }
 
 // One entry of a folder; nothing when there is none.

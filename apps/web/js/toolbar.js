@@ -2,6 +2,7 @@
 
 import { browser, setKind, sortEverywhere } from "./browser.js";
 import { heldItems } from "./clipboard.js";
+import { DELETED_SORTS } from "./columns.js";
 import { command, context, keysOf, runCommand, shortcutText } from "./commands.js";
 import { $, h, icon, iconButton, keepFocus } from "./dom.js";
 import { emit, on } from "./events.js";
@@ -106,6 +107,7 @@ function paintToolbar(setSort) {
     now.canDownload,
     heldItems() !== null,
     now.inBin,
+    now.deleted && [browser.filter !== "", browser.listing?.total > 0],
     now.count > 0,
     now.count === 1,
     now.search && browser.listing?.extra?.finished,
@@ -196,13 +198,13 @@ function sortButton(setSort) {
     (event) =>
       openMenu(
         [
-          ...(context().search ? SORTS_OF_RESULTS : SORTS).map((by) => ({
+          ...(context().deleted ? DELETED_SORTS : context().search ? SORTS_OF_RESULTS : SORTS).map((by) => ({
             label: t(`sort.${by}`),
             checked: browser.sort.by === by,
             run: () => setSort(by),
           })),
           "-",
-          !context().search && { label: t("sort.everywhere"), run: sortEverywhere },
+          !context().search && !context().deleted && { label: t("sort.everywhere"), run: sortEverywhere },
         ].filter(Boolean),
         { anchor: event.currentTarget },
       ),
@@ -217,6 +219,8 @@ function paintStatus(now) {
   if (folder) {
     parts.push(now.search ? searchStatus(listing) : h("span", {}, t("status.items", { count: listing.total })));
     if (count > 0) parts.push(h("span", {}, [t("select.count", { count }), sizeOfChosen()].filter(Boolean).join(", ")));
+    if (listing.extra?.cut) parts.push(h("span", {}, t("deleted.cut")));
+    if (listing.extra?.failed?.length > 0) parts.push(h("span", {}, t("deleted.failed", { names: listing.extra.failed.join(", ") })));
     if (browser.filter) parts.push(filterChip());
   }
   keepFocus($("status"), () => $("status").replaceChildren(...parts));

@@ -1,14 +1,14 @@
 // Copying, moving, deleting, packing: what the user says, as tasks.
 
-import { browser, chosenItems } from "./browser.js";
+import { browser, chosenItems, shareEntry } from "./browser.js";
 import { Choice } from "./choice.js";
 import { heldItems, hold, letGo } from "./clipboard.js";
 import { addCommand } from "./commands.js";
 import { askConflict, takenOf } from "./conflicts.js";
 import { askText, confirm, dismissToasts, loaded, toast, toastFailure } from "./dialogs.js";
-import { isInBin, isRecycleBin } from "./entries.js";
+import { isInBin, isReadOnlyShare, isRecycleBin } from "./entries.js";
 import { checkName } from "./operations.js";
-import { childOf, encodeName, isWithin, lastOf, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
+import { childOf, encodeName, isDeleted, isWithin, lastOf, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
 import { get } from "./api.js";
 import { startTask } from "./tasks.js";
 import { t } from "./strings.js";
@@ -106,7 +106,7 @@ async function remove(forGood) {
   const { samples, count } = choice;
   if (count === 0) return;
   const shares = [...new Set(samples.map(shareOf))];
-  const inBin = samples.every(isInBin);
+  const inBin = isDeleted(browser.id) || samples.every(isInBin);
   const kept = !forGood && !inBin && (await Promise.all(shares.map(hasBin))).every(Boolean);
   const what = { count, name: choice.single?.name ?? "" };
   if (
@@ -132,18 +132,23 @@ async function remove(forGood) {
 async function restore() {
   const choice = await chosenItems();
   if (choice.count === 0) return;
-  const share = shareOf(choice.samples[0]);
+  const shares = [...new Set(choice.samples.map(shareOf))];
+  const from = choice.single?.deleted?.from;
   browser.selection.clear();
   await startTask("restore", choice, {
     params: { conflict: "keep_both" },
-    affected: [share],
-    target: choice.single ? parentOf(choice.single.id).replace("/%23recycle", "") : share,
+    affected: shares,
+    target: from ?? (choice.single ? parentOf(choice.single.id).replace("/%23recycle", "") : shares[0]),
   });
 }
 
 async function emptyBin() {
-  if (await confirm({ title: t("bin.title"), text: t("bin.text"), action: t("command.emptyBin"), kind: "danger" })) {
-    await startTask("empty", [{ id: `${shareOf(browser.id)}/%23recycle` }], { affected: [browser.id] });
+  const all = isDeleted(browser.id);
+  const found = all ? (await browser.listing.allNames()).map(({ id }) => shareOf(id)) : [shareOf(browser.id)];
+  const shares = [...new Set(found)].filter((share) => !isReadOnlyShare(shareEntry(share)));
+  const text = t(all ? "deleted.empty" : "bin.text");
+  if (await confirm({ title: t("bin.title"), text, action: t("command.emptyBin"), kind: "danger" })) {
+    for (const share of shares) await startTask("empty", [{ id: share }], { affected: [browser.id] });
   }
 }
 
@@ -233,6 +238,6 @@ addCommand({
   icon: "trash",
   group: "change",
   danger: true,
-  when: ({ folder, canWrite }) => folder && canWrite && isRecycleBin(browser.id),
+  when: ({ folder, canWrite, deleted }) => folder && (deleted ? browser.listing.total > 0 && browser.filter === "" : canWrite && isRecycleBin(browser.id)),
   run: emptyBin,
 });
