@@ -19,21 +19,6 @@ class OperationCgi : public CgiTest {
     }
 };
 
-TEST_F(OperationCgi, RequestsAreTakenStrictly) {
-    EXPECT_EQ(ask("", "action=mkdir&path=/photo/x").status, 401);
-    for (const char* form : {"", "action=burn&path=/photo/x", "action=mkdir&path_raw=/photo/%25zz"}) {
-        EXPECT_EQ(ask("alice", form).status, 400) << form;
-    }
-    EXPECT_EQ(look("alice", "action=mkdir&path=/photo/x").status, 400) << "a link must change nothing";
-    EXPECT_FALSE(fs::exists(shareRoot("photo") + "/x"));
-    // However late a parameter shows to be wrong.
-    for (const char* form :
-         {"action=mkdir&path=", "action=rename&path=/photo", "action=copy&path=/photo/x&target=/photo&conflict=x"}) {
-        const CgiReply reply = ask("alice", form);
-        EXPECT_TRUE(reply.status == 400 && code(reply) == 400) << form;
-    }
-}
-
 TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
     SKIP_WITHOUT_ROOT();
     const std::string root = addShare("photo", "read only = no\nvalid users = alice, bob, carol\nread list = bob\n");

@@ -14,9 +14,10 @@ class ProgramTable : public ApplianceTest {
         return !method.empty() && method.find(',') == std::string::npos &&
                methods.find(" " + method + ",") != std::string::npos;
     }
-    static RawReply ask(const Program& program, const std::string& method, const Variables& more = {}) {
+    static RawReply ask(const Program& program, const std::string& method, const Variables& more = {},
+                        const std::string& user = "alice") {
         const std::string folder = std::string(PROGRAM_LIST).substr(0, std::string(PROGRAM_LIST).rfind('/') + 1);
-        return RawReply(runCgi(folder + std::string(program.name), "alice", method, "", "", more));
+        return RawReply(runCgi(folder + std::string(program.name), user, method, "", "", more));
     }
 };
 
@@ -30,6 +31,15 @@ TEST_F(ProgramTable, EveryProgramTakesItsMethodsAlone) {
             EXPECT_EQ(reply.headers["Allow"], program.methods);
             EXPECT_NE(reply.body.find("\"code\":400"), std::string::npos) << reply.body;
         }
+    }
+}
+
+TEST_F(ProgramTable, NobodyIsServedButByThoseForAll) {
+    const std::set<std::string> forAll = {"share", "login", "logout"};
+    for (const Program& program : orvel::cgi::programs()) {
+        const std::string methods(program.methods);
+        const RawReply reply = ask(program, methods.substr(0, methods.find(',')), {}, "");
+        EXPECT_EQ(reply.status == 401, forAll.count(std::string(program.name)) == 0) << program.name << reply.body;
     }
 }
 

@@ -232,17 +232,6 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
                                              nullptr, nullptr, addToPage, &page, &count));
             EXPECT_TRUE(page.columns.size() == 66 && std::is_sorted(page.columns.begin(), page.columns.end()));
         }
-        for (const auto& [type, name, expected] :
-             Rows<_tag_dir_entry_type_, const char*, size_t>{{DIR_ENTRY_TYPE_DIR, "", 6},
-                                                             {DIR_ENTRY_TYPE_FILE, nullptr, 60},
-                                                             {DIR_ENTRY_TYPE_DIR, "F1", 2},
-                                                             {DIR_ENTRY_TYPE_FILE, "f1/", 0},
-                                                             {DIR_ENTRY_TYPE_ALL, ".4", 12}}) {
-            Page page{text(&Data::szName), {}, {}};
-            EXPECT_TRUE(screen_->queryResult(1, 99, nullptr, nullptr, &type, name, addToPage, &page, &count));
-            EXPECT_EQ(count, expected) << type;
-            EXPECT_EQ(page.columns.size() + (expected == 0 ? 0 : 1), expected);
-        }
         vexo::gate::reset();
         const auto query = [&](unsigned long limit, unsigned long long* out) {
             return screen_->queryResult(0, limit, nullptr, nullptr, nullptr, nullptr, addToPage, nullptr, out);
