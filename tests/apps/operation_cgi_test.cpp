@@ -19,6 +19,16 @@ class OperationCgi : public CgiTest {
     }
 };
 
+TEST_F(OperationCgi, RequestsAreTakenStrictly) {
+    EXPECT_EQ(look("alice", "action=mkdir&path=/photo/x").status, 400) << "a link must change nothing";
+    EXPECT_FALSE(fs::exists(shareRoot("photo") + "/x"));
+    for (const char* form : {"", "action=burn&path=/photo/x", "action=mkdir&path_raw=/photo/%25zz",
+                             "action=mkdir&path=", "action=rename&path=/photo"}) {
+        const CgiReply reply = ask("alice", form);
+        EXPECT_TRUE(reply.status == 400 && code(reply) == 400) << form;
+    }
+}
+
 TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
     SKIP_WITHOUT_ROOT();
     const std::string root = addShare("photo", "read only = no\nvalid users = alice, bob, carol\nread list = bob\n");
