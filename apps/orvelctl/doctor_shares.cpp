@@ -15,6 +15,7 @@ namespace orvel::ctl {
 namespace {
 
 constexpr const char* kSambas = "/etc/samba/smb.conf";
+constexpr const char* kMend = "mend the line; \"testparm -s\" shows what Samba makes of it";
 
 struct Report {
     std::string file;  // the main one
@@ -56,6 +57,7 @@ void takeShare(const VEXOSHARENOTE& note, Report& report) {
     const bool variable = strchr(note.path, '%') != nullptr;
     finding.text += note.kind == VEXO_NOTE_HOMES ? "each user's home at " : "at ";
     finding.text += note.path;
+    if (*note.why != '\0') finding.text += std::string(", which the user ") + note.why + " shares";
     if (!variable && (stat(note.path, &status) != 0 || !S_ISDIR(status.st_mode))) {
         finding.severity = Severity::kProblem;
         finding.text += ", which is not there";
@@ -96,10 +98,11 @@ void takeNote(const VEXOSHARENOTE* note, void* argument) {
             break;
         case VEXO_NOTE_LEFT_OUT:
             finding.text += std::string("is left out: ") + note->why;
-            finding.advice = "mend the line; \"testparm -s\" shows what Samba makes of it";
+            finding.advice = kMend;
             break;
         default:
             finding.text = note->why;
+            finding.advice = kMend;
             break;
     }
     report.findings.push_back(finding);
@@ -129,7 +132,9 @@ Finding unreadable(const Report& report) {
         finding.advice =
             std::string("to offer what Samba serves, add to /etc/vexoinfo.conf: share_definitions=\"") + kSambas + "\"";
     } else if (missing) {
-        finding.advice = "write the file, a section a share: [photo], path = /srv/photo, read only = no";
+        const bool isSambas = report.file == VEXO::SystemPath(kSambas);
+        finding.advice = std::string(isSambas ? "install Samba, or " : "") +
+                         "write the file, a section a share: [photo], path = /srv/photo, read only = no";
     }
     return finding;
 }
@@ -152,8 +157,10 @@ void checkShares(Findings& findings) {
     }
     findings = report.findings;
     if (!report.roots.empty()) return;
-    findings.push_back(
-        {.severity = Severity::kProblem, .text = "no section is a share, so there are no shares", .file = report.file});
+    findings.push_back({.severity = Severity::kProblem,
+                        .text = "no section is a share, so there are no shares",
+                        .advice = "write a section a share: [photo], path = /srv/photo, read only = no",
+                        .file = report.file});
 }
 
 // The system makes these folders when it starts; uploads and searches need them.

@@ -4,6 +4,7 @@
 
 #include "arguments.h"
 #include "command.h"
+#include "vexo/error.h"
 #include "vexo/volume.h"
 
 namespace orvel::ctl {
@@ -15,6 +16,16 @@ void report(const VEXOVOLUMENOTE* note, void* /*argument*/) {
     } else {
         fprintf(stderr, "orvelctl: %s: %s\n", terminalText(note->folder).c_str(), strerror(note->error));
     }
+}
+
+// Why not even a first volume was looked at.
+void explain(int error) {
+    if (error == ENOENT && VLIBCErrGet() == VEXO_ERR_GENERAL) {
+        fputs("orvelctl: there are no share definitions, so there are no volumes to prepare\n", stderr);
+    } else {
+        fprintf(stderr, "orvelctl: the volumes could not be prepared: %s\n", strerror(error));
+    }
+    if (error != EPERM) fputs("      \"orvelctl doctor shares\" says what to do\n", stderr);
 }
 
 }  // namespace
@@ -29,7 +40,7 @@ int volumes(const std::vector<std::string>& words) {
     const int done = arguments.has("--user")
                          ? VEXOVolumesPrepareFor(arguments.required("--user").c_str(), take, &reported)
                          : VEXOVolumesPrepare(take, &reported);
-    if (done != 0 && !reported) fprintf(stderr, "orvelctl: the volumes could not be prepared: %m\n");
+    if (done != 0 && !reported) explain(errno);
     return done == 0 ? 0 : 1;
 }
 

@@ -97,6 +97,16 @@ TEST_F(Doctor, NamesWhatIsWrong) {
         {"sweep", "echo 'recycle_days=\"a week\"' >>etc/vexoinfo.conf", "problem", "recycle_days is no number"},
         {"sweep", "sed -i 's/time=.*/time=\"1000\"/' var/lib/vexo/sweep", "problem", "days ago"},
         {"indexes", "true", "good", "no share has an index"},
+        {"shares",
+         "mkdir -p users pub; chmod 1770 users; printf \"#VERSION "
+         "2\\npath=$PWD/pub\\ncomment=\\nusershare_acl=S-1-1-0:F"
+         "\\nguest_ok=n\\n\" >users/pub; chown 20001 users/pub pub; printf '[global]\\nusershare path = /users\\n' "
+         ">etc/vexo/shares.conf",
+         "good", ", which the user alice shares"},
+        {"shares", "chown 20002 pub", "problem", "belongs to another user"},
+        {"shares", "chmod 1777 users", "problem", "in which not everybody may write"},
+        {"shares", "rm etc/vexo/shares.conf; rm -r users pub", "problem", "there are no share definitions"},
+        {"volumes", "! " ORVELCTL " volumes 2>said; grep -q 'doctor shares' said; rm said", "note", ""},
     };
     for (const auto& row : rows) {
         shell(row.breaks);

@@ -116,6 +116,8 @@ TEST_F(LogInCgi, OneReplyForAllThatIsWrongAndOneSessionForWhatIsRight) {
                                                               {"", "right"},
                                                               {"alice ", "right"},
                                                               {"alice\nroot", "right"},
+                                                              {std::string("alice\0", 6), "right"},
+                                                              {std::string("alice\0root", 10), "right"},
                                                               {longName, "right"},
                                                               {"../alice", "right"},
                                                               {"alice", std::string(4096, 'x')},
@@ -327,6 +329,35 @@ TEST_F(PamCgi, TheMachinesOwnUsersLogInWithTheirPasswords) {
         }
         EXPECT_EQ(step.json["data"]["user"], "bob") << step.body;
         EXPECT_EQ(browser().logIn("bob", "Xy7-new-pass-9").status, 200);
+    }));
+}
+
+TEST_F(PamCgi, WhomSambaHasDisabledIsRefused) {
+    SKIP_WITHOUT_ROOT();
+    ASSERT_EQ(access("/usr/bin/smbpasswd", X_OK), 0) << "script/packages names it";
+    EXPECT_WITH_PRIVATE_MOUNTS(onMachine([](const auto& serve) {
+        serve(kUnix);
+        makeFolder("/run/samba");
+        std::string config = "[global]\npassdb backend = tdbsam\nlog file = /run/samba/log\n";
+        for (const char* key :
+             {"private dir", "lock directory", "state directory", "cache directory", "pid directory"}) {
+            config += std::string(key) + " = /run/samba\n";
+        }
+        writeFile("/etc/samba/smb.conf", config);
+        const auto change = [](std::vector<std::string> words) {
+            words.insert(words.begin(), {"/usr/bin/timeout", "60", "/usr/bin/smbpasswd"});
+            const Finished done = support::runProgram(words, {}, "right\nright\n");
+            EXPECT_EQ(done.status, 0) << words[3] << done.output;
+        };
+        change({"-a", "-s", "alice"});
+        EXPECT_EQ(browser().logIn("alice", "right").status, 200);
+        change({"-d", "alice"});
+        EXPECT_EQ(codeOf(browser().logIn("alice", "right")), 2003);
+        EXPECT_EQ(codeOf(browser("198.51.100.9").logIn("alice", "wrong")), 2001) << "nobody else learns of it";
+        change({"-e", "alice"});
+        EXPECT_EQ(browser().logIn("alice", "right").status, 200);
+        change({"-x", "alice"});
+        EXPECT_EQ(browser().logIn("alice", "right").status, 200) << "whom Samba does not know";
     }));
 }
 

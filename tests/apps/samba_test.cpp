@@ -63,7 +63,45 @@ const ShareRow kShareRows[] = {
     {"asks", "read only = no\nroot preexec = /bin/false\nroot preexec close = yes\n"},
     {"encrypted", "read only = no\nsmb encrypt = mandatory\n", kClosed},
     {"unknown", "read only = no\nsome new option = yes\n", kClosed},
+    {"marked", "read only = no\nhide dot files = yes\nhide files = /*.hid/\n"},
+    {"owned", "read only = no\ninherit owner = unix only\n", kClosed},
+    {"notowned", "read only = no\ninherit owner = no\n"},
 };
+
+// Shares that users define, a file each, made after [like]; %PATH% is a folder of the row's `owner`.
+struct UserShareRow {
+    const char* name;
+    uid_t file, owner;
+    const char* text;
+    mode_t mode = 0644;
+};
+constexpr uid_t kAlice = 20001, kBob = 20002;
+constexpr const char* kLike = "[like]\n-valid = no\npath = /tmp\nread only = yes\ninvalid users = judy\n";
+#define USER_SHARE "#VERSION 2\npath=%PATH%\ncomment=c\n"
+const UserShareRow kUserShareRows[] = {
+    {"u-all", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\nsharename=U-All\n"},
+    {"u-comma", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F,\nguest_ok=n\n"},
+    {"u-read", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:R\nguest_ok=y\n"},
+    {"u-one", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-22-1-20002:F,S-1-1-0:R\nguest_ok=n\n"},
+    {"u-denied", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-22-1-20002:D,S-1-1-0:F\nguest_ok=n\n"},
+    {"u-late", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F,S-1-22-1-20002:D\nguest_ok=n\n"},
+    {"u-group", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-22-2-20110:f\nguest_ok=n\n"},
+    {"u-nobody", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-5-21-1-2-3-1000:F\nguest_ok=n\n"},
+    {"u-blank", kAlice, kAlice, USER_SHARE "usershare_acl=\nguest_ok=n\n"},
+    {"u-one-line", kAlice, kAlice, "#VERSION 1\npath=%PATH%\ncomment=\nusershare_acl=S-1-1-0:F\n"},
+    {"u-root", 0, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n"},
+    {"u-anothers", kAlice, kBob, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n"},
+    {"u-open", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n", 0646},
+    {"u-torn", kAlice, kAlice, USER_SHARE "usershare_a"},
+    {"u-badlist", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:X\nguest_ok=n\n"},
+    {"u-version", kAlice, kAlice, "#VERSION 3\npath=%PATH%\ncomment=c\nusershare_acl=S-1-1-0:F\nguest_ok=n\n"},
+    {"u-renamed", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\nsharename=another\n"},
+    {"u-missing", kAlice, kAlice, "#VERSION 2\npath=/nowhere\ncomment=\nusershare_acl=S-1-1-0:F\nguest_ok=n\n"},
+    {"u-relative", kAlice, kAlice, "#VERSION 2\npath=tmp\ncomment=\nusershare_acl=S-1-1-0:F\nguest_ok=n\n"},
+    {"u-prefix", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n"},
+    {"reading", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n"},
+};
+#undef USER_SHARE
 
 // Shares in which files and folders are made, by smbclient and by the programs; `parent` is the mode of the share's
 // root.
@@ -71,6 +109,7 @@ struct ModeRow {
     const char* name;
     const char* options;
     mode_t parent = 0777;
+    const char* acl = "";  // entries of the root's default ACL
 };
 const ModeRow kModeRows[] = {
     {"m-plain", ""},
@@ -84,6 +123,10 @@ const ModeRow kModeRows[] = {
     {"m-setgidgroup", "force group = team\n", 02777},
     {"m-inherit", "inherit permissions = yes\ncreate mask = 0600\n", 0775},
     {"m-inheritall", "inherit permissions = yes\n", 02777},
+    {"m-acl", "inherit acls = yes\n", 0777, "u::rwx,g::r-x,o::---,u:20011:rwx,m::rwx"},
+    {"m-aclmasks", "inherit acls = yes\ncreate mask = 0600\ndirectory mask = 0700\n", 0777, "u::rwx,g::rwx,o::r-x"},
+    {"m-aclalone", "create mask = 0640\n", 0777, "u::rwx,g::rwx,o::rwx,u:20011:rwx,m::rwx"},
+    {"m-filemode", "dos filemode = yes\ncreate mask = 0660\n"},
 };
 const char* const kUserNames[] = {"alice", "bob", "carol", "dave", "erin", "frank", "gina", "hugo", "ivan", "judy"};
 
@@ -135,7 +178,7 @@ class Smbd {
         std::string text =
             "[global]\nnetbios name = ORACLE\nserver role = standalone server\ninterfaces = 127.0.0.1/8\n"
             "bind interfaces only = yes\nload printers = no\nprinting = bsd\ndisable spoolss = yes\n"
-            "map to guest = never\nsmb ports = " +
+            "map to guest = never\nusershare template share = like\nsmb ports = " +
             port_ + "\nmap archive = no\npassdb backend = smbpasswd:" + state_ + "/smbpasswd\nlog file = " + state_ +
             "/log\n";
         for (const char* key :
@@ -166,20 +209,21 @@ class Smbd {
         return ask(user, share, commands).output;
     }
     // In each share, all of them in one connection.
-    [[nodiscard]] std::map<std::string, May> may(const std::string& user, const std::string& file) const {
+    [[nodiscard]] std::map<std::string, May> may(const std::string& user, const std::string& file,
+                                                 const std::vector<std::string>& shares) const {
         std::string commands;
-        for (const ShareRow& row : kShareRows) {
-            const std::string name = ownFile(row.name);
-            commands += std::string("tcon ") + row.name + "; ls " + name + "; get " + name + " /dev/null; put " + file +
-                        " by-" + user + "-" + row.name + "; ";
+        for (const std::string& share : shares) {
+            const std::string name = ownFile(share);
+            commands += "tcon " + share + "; ls " + name + "; get " + name + " /dev/null; put " + file + " by-" + user +
+                        "-" + share + "; ";
         }
         const std::string text = ask(user, "plain", commands).output;
         const auto said = [&](const std::string& words) { return text.find(words) != std::string::npos; };
         std::map<std::string, May> all;
-        for (const ShareRow& row : kShareRows) {
-            const std::string name = ownFile(row.name);
-            all[row.name] = {said("  " + name + " "), said("getting file \\" + name),
-                             said(" as \\by-" + user + "-" + row.name + " ")};
+        for (const std::string& share : shares) {
+            const std::string name = ownFile(share);
+            all[share] = {said("  " + name + " "), said("getting file \\" + name),
+                          said(" as \\by-" + user + "-" + share + " ")};
         }
         return all;
     }
@@ -220,7 +264,10 @@ class SambaOracle : public ApplianceTest {
             << "script/packages names them";
         EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
             Smbd smbd(systemRoot(), systemRoot() + "/etc/passwd", systemRoot() + "/etc/group");
-            writeRootFile("/etc/samba/smb.conf", smbd.global() + makeShares(shareRoot("photo")));
+            const std::string root = shareRoot("photo");
+            writeRootFile("/etc/samba/smb.conf", smbd.global() + "usershare prefix deny list = " + root + "/u-pre\n" +
+                                                     kLike + makeShares(root));
+            makeUserShares(root);
             setSetting("share_definitions", "/etc/samba/smb.conf");
             writeRootFile("/file", "x");
             smbd.start(users);
@@ -246,18 +293,45 @@ class SambaOracle : public ApplianceTest {
             fill(folder, row.parent);
             EXPECT_EQ(chown(folder.c_str(), 20012, 20111), 0);  // erin's, and the readers'
             chmod(folder.c_str(), row.parent);
+            if (*row.acl == '\0') continue;
+            EXPECT_EQ(runProgram({"/usr/bin/setfacl", "-d", "-m", row.acl, folder}).status, 0) << row.name;
         }
         fill(root + "/bin");
         text += "[bin]\npath = " + root +
                 "/bin\nread only = no\nvfs objects = recycle\nrecycle:repository = .bin/%U\n"
                 "recycle:keeptree = yes\n";
         for (const char* user : {"alice", "bob"}) fill(root + "/each/" + user);
+        for (const char* user : kUserNames) {
+            fill(root + "/homes/" + user);
+            writeFile(root + "/homes/" + user + "/" + Smbd::ownFile(user), "content", 0666);
+        }
+        text += "[homes]\npath = " + root + "/homes/%S\nread only = no\nvalid users = %S\ninvalid users = judy\n";
         fill(root + "/shut", 0755);
         for (const ShareRow& row : kShareRows) {
             for (const std::string folder : {row.name, "each/alice", "each/bob", "shut"})
                 writeFile(root + "/" + folder + "/" + Smbd::ownFile(row.name), "content", 0666);
         }
         return text;
+    }
+    static void makeUserShares(const std::string& root) {
+        const std::string folder = systemRoot() + "/var/lib/samba/usershares";
+        makeFolder(folder);
+        EXPECT_EQ(chmod(folder.c_str(), 01770), 0);
+        EXPECT_EQ(mount(folder.c_str(), "/var/lib/samba/usershares", nullptr, MS_BIND, nullptr), 0);
+        for (const UserShareRow& row : kUserShareRows) {
+            const std::string path =
+                root + (strcmp(row.name, "reading") == 0 ? "/u-reading" : std::string("/") + row.name);
+            const std::string file = folder + "/" + row.name;
+            std::string text = row.text;
+            const size_t mark = text.find("%PATH%");
+            if (mark != std::string::npos) text.replace(mark, 6, path);
+            fill(path);
+            writeFile(path + "/" + Smbd::ownFile(row.name), "content", 0666);
+            writeFile(file, text);
+            EXPECT_EQ(chown(path.c_str(), row.owner, kUsersGid), 0);
+            EXPECT_EQ(chown(file.c_str(), row.file, kUsersGid) + chmod(file.c_str(), row.mode), 0);
+        }
+        EXPECT_EQ(symlink("u-all", (folder + "/u-link").c_str()), 0);
     }
     static void fill(const std::string& folder, mode_t mode = 0777) {
         makeFolder(folder, mode);
@@ -359,6 +433,18 @@ int compareVeto(const Smbd& smbd, const std::string& root, const std::string& fi
     return 1;
 }
 
+// Names that are only marked as hidden are there.
+int compareHidden(const Smbd& smbd, const std::string& root) {
+    for (const char* name : {".dot", "a.hid"}) writeFile(root + "/marked/" + name, name, 0666);
+    const std::string theirs = smbd.say("alice", "marked", "ls"),
+                      here = runCgi(PROGRAM_LIST, "alice", "GET", "action=folder&path=/marked");
+    for (const char* name : {".dot", "a.hid"}) {
+        EXPECT_NE(theirs.find(name), std::string::npos) << theirs;
+        EXPECT_NE(here.find(name), std::string::npos) << here;
+    }
+    return 1;
+}
+
 // One bin: what either deletes the other finds.
 int compareBins(const Smbd& smbd, const std::string& root) {
     const std::string at = root + "/bin/";
@@ -375,14 +461,16 @@ int compareBins(const Smbd& smbd, const std::string& root) {
 
 TEST_F(SambaOracle, NobodyMayMoreThanInSamba) {
     const std::vector<std::string> users(std::begin(kUserNames), std::end(kUserNames));
-    serve(users, [](const Smbd& smbd, const std::string&, const std::string& file) {
+    serve(users, [this](const Smbd& smbd, const std::string&, const std::string& file) {
         int cells = 0;
+        std::vector<std::string> shares = {"u-link", "alice", "hugo", "judy"};
+        for (const ShareRow& row : kShareRows) shares.emplace_back(row.name);
+        for (const UserShareRow& row : kUserShareRows) shares.emplace_back(row.name);
         std::map<std::string, std::map<std::string, May>> samba;
-        for (const char* user : kUserNames) samba[user] = smbd.may(user, file);
-        for (const ShareRow& row : kShareRows) {
-            if (::testing::Test::HasFatalFailure()) break;
+        for (const char* user : kUserNames) samba[user] = smbd.may(user, file, shares);
+        const auto compare = [&](const ShareRow& row, std::initializer_list<const char*> whom) {
             bool anyLess = false;
-            for (const char* user : kUserNames) {
+            for (const char* user : whom) {
                 const May theirs = samba[user][row.name], mine = ours(user, row.name);
                 ++cells;
                 EXPECT_TRUE(mine.isWithin(theirs))
@@ -392,6 +480,18 @@ TEST_F(SambaOracle, NobodyMayMoreThanInSamba) {
                     << row.name << " " << user << ": here " << mine.text() << ", Samba " << theirs.text();
             }
             EXPECT_EQ(anyLess, *row.narrower != '\0') << row.name << " is named as narrower without need";
+        };
+        for (const ShareRow& row : kShareRows) {
+            compare(row, {"alice", "bob", "carol", "dave", "erin", "frank", "gina", "hugo", "ivan", "judy"});
+        }
+        for (const UserShareRow& row : kUserShareRows) compare({row.name, ""}, {"alice", "bob", "dave", "judy"});
+        compare({"u-link", ""}, {"alice"});
+        // Homes are named after their users in Samba; here everybody has one, and no name leads to another's.
+        setSetting("userhome_enable", "yes");
+        for (const std::string user : {"alice", "hugo", "judy"}) {
+            ++cells;
+            EXPECT_EQ(ours(user, "home").text(), samba[user][user].text()) << user;
+            EXPECT_EQ(ours(user, "hugo").text(), user == "hugo" ? "---" : samba[user]["hugo"].text()) << user;
         }
         std::cout << cells << " cells\n";
     });
@@ -401,6 +501,7 @@ TEST_F(SambaOracle, FilesAreAsSambaMakesThem) {
     serve({"alice", "bob"}, [](const Smbd& smbd, const std::string& root, const std::string& file) {
         std::cout << compareModes(smbd, root, file) << " cells\n";
         compareVeto(smbd, root, file);
+        compareHidden(smbd, root);
         compareBins(smbd, root);
     });
 }

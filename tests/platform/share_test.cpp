@@ -345,4 +345,54 @@ TEST_F(ShareTest, HalfWrittenDefinitions) {
     EXPECT_EQ(std::count(names.begin(), names.end(), '|'), 10000);
 }
 
+// Shares of users come, change and go with their files and folders, and never let administrators act as root in them.
+TEST_F(ShareTest, UsersDefineSharesOfTheirOwn) {
+    SKIP_WITHOUT_ROOT();
+    const std::string folder = systemRoot() + "/users", file = folder + "/pub", target = shareRoot("photo") + "/pub";
+    const auto share = [&](const char* entries) {
+        writeFile(file, "#VERSION 2\npath=" + target + "\ncomment=\nusershare_acl=" + entries + "\nguest_ok=n\n");
+        EXPECT_EQ(chown(file.c_str(), 20001, 20100), 0);
+    };
+    const auto rights = [](const char* user) {
+        SDK::Share* loaded = SDK::Share::LoadShare("pub");
+        const int right = loaded == nullptr ? -1 : loaded->GetAccessRight(user);
+        SDK::Share::Release(loaded);
+        return right;
+    };
+    makeFolder(folder);
+    EXPECT_EQ(chmod(folder.c_str(), 01770), 0);
+    makeFolder(target);
+    EXPECT_EQ(chown(target.c_str(), 20001, 20100), 0);
+    share("S-1-1-0:F");
+    define("[photo]\npath = " + shareRoot("photo") + "\n");
+    EXPECT_EQ(rights("bob"), -1) << "no folder is stated, and this is not Samba's own file";
+    define("[global]\nusershare path = /users\n");
+    for (const auto& [user, right] : Rows<const char*, int>{{"alice", 2}, {"bob", 2}, {"carol", 0}}) {
+        EXPECT_EQ(rights(user), right) << user << "; carol is an administrator";
+    }
+    share("S-1-1-0:R");
+    EXPECT_EQ(rights("bob"), 1);
+    ASSERT_EQ(setegid(20100) + seteuid(20002), 0);
+    EXPECT_EQ(rights("bob"), 1) << "in a process that works as a user";
+    ASSERT_EQ(seteuid(0) + setegid(0), 0);
+    const std::vector<std::pair<const char*, std::function<int(bool)>>> breaks = {
+        {"a path of others", [&](bool bad) { return chown(target.c_str(), bad ? 20002 : 20001, 20100); }},
+        {"a file for all", [&](bool bad) { return chmod(file.c_str(), bad ? 0646 : 0644); }},
+        {"a folder without the sticky bit", [&](bool bad) { return chmod(folder.c_str(), bad ? 0770 : 01770); }},
+        {"a folder for all", [&](bool bad) { return chmod(folder.c_str(), bad ? 01777 : 01770); }},
+        {"a folder of others", [&](bool bad) { return chown(folder.c_str(), bad ? 20001 : 0, 0); }},
+        {"a path that is gone", [&](bool bad) {
+             return bad ? rmdir(target.c_str()) : mkdir(target.c_str(), 0755) + chown(target.c_str(), 20001, 20100);
+         }}};
+    for (const auto& [what, change] : breaks) {
+        EXPECT_EQ(change(true), 0);
+        EXPECT_EQ(rights("bob"), -1) << what;
+        EXPECT_EQ(change(false), 0);
+        EXPECT_EQ(rights("bob"), 1) << what;
+    }
+    define("[global]\nusershare path = /users\nusershare max shares = 0\n");
+    EXPECT_EQ(rights("bob"), -1);
+    takeLog();
+}
+
 }  // namespace

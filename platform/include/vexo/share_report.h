@@ -21,7 +21,7 @@ struct VEXOSHARENOTE {
     int line;            // where the section begins; of the option that closes it, or of the malformed line
     const char* option;  // that closes it; "veto files" of a share, as Samba shows what the system keeps there
     const char* text;    // its value
-    const char* why;     // "" for a share
+    const char* why;     // of a share: the user who defined it, "" for the administrator
 };
 
 VEXO_BEGIN_C

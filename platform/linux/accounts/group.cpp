@@ -70,7 +70,7 @@ int isAdministrator(const char* user) {
     if (user == nullptr) return vexo::fail(VEXO_ERR_PARAMETER);
     std::vector<gid_t> gids;
     if (findGroups(user, gids) < 0) return -1;
-    const auto name = vexo::readSetting("admin_group", "administrators");
+    const auto name = vexo::administratorsGroup();
     if (!name) return vexo::fail(VEXO_ERR_GENERAL);
     vexo::Group administrators;
     const vexo::Lookup answer = vexo::AccountSource::instance().group(*name, administrators);

@@ -31,7 +31,8 @@ std::string rootOfHomes() {
 std::string ownHomeOf(const Account& account) {
     const auto shares = currentShares();
     const ShareDefinition* homes = shares == nullptr ? nullptr : shares->homes();
-    if (homes == nullptr || account.home == kNoHome) return {};
+    const bool ofAccount = homes != nullptr && homes->path.find("%H") != std::string::npos;
+    if (homes == nullptr || (ofAccount && account.home == kNoHome)) return {};
     const std::optional<std::string> home = homeIn(*homes, account);
     VEXOSHARE* const record = new VEXOSHARE();
     const ShareRecord owner(record);

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <charconv>
 #include <exception>
 #include <utility>
 
@@ -45,9 +46,28 @@ bool ListedUser::matches(std::string_view entry) {
 
 bool ListedUser::holds(std::string_view entry) {
     if (entry == kEverybody) return true;
+    if (entry.starts_with(kListId)) return hasId(entry.substr(1));
     const size_t marks = std::min(entry.find_first_not_of(kGroupMarks), entry.size());
     const std::string name(entry.substr(marks));
     return marks > 0 ? isInGroup(name) : areEqual(name, name_);
+}
+
+// "uNUMBER" is the user's own number, "gNUMBER" that of a group he is in.
+bool ListedUser::hasId(std::string_view text) {
+    unsigned id = 0;
+    const char* const end = text.data() + text.size();
+    if (text.size() < 2 || std::from_chars(text.data() + 1, end, id).ptr != end) return false;
+    if (text.front() == 'g') {
+        const std::vector<gid_t>& mine = groups();
+        return std::find(mine.begin(), mine.end(), id) != mine.end();
+    }
+    Account account;
+    const Lookup answer = AccountSource::instance().user(name_, account);
+    if (answer == Lookup::failed) {
+        failed_ = true;
+        fail(VEXO_ERR_GENERAL);
+    }
+    return answer == Lookup::found && account.uid == id;
 }
 
 int ListedUser::rightOn(const VEXOSHARE& share) {

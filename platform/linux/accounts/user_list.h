@@ -30,6 +30,7 @@ class ListedUser {
 
  private:
     [[nodiscard]] bool holds(std::string_view entry);
+    [[nodiscard]] bool hasId(std::string_view text);
     [[nodiscard]] bool isInGroup(const std::string& group);
     [[nodiscard]] const std::vector<gid_t>& groups();
 

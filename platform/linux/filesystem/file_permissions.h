@@ -5,6 +5,8 @@
 #include <sys/stat.h>
 #include <sys/types.h>
 
+#include <optional>
+
 namespace vexo {
 
 // The umask for as long as files are created: the process's own may be 0, left so by the making of temporary folders. A
@@ -27,6 +29,9 @@ class Umask {
 
 // Whether a default ACL decides about new files in `folder`, which may be open for its path only.
 [[nodiscard]] bool hasDefaultAcl(int folder);
+// The most that the default ACL of `folder` grants to the owner, the group (its mask, where it has one) and others;
+// nothing where there is none.
+[[nodiscard]] std::optional<mode_t> defaultAclMode(int folder);
 
 }  // namespace vexo
 

@@ -12,6 +12,9 @@ namespace vexo {
 // errno, when that cannot be determined.
 [[nodiscard]] std::optional<std::string> readSetting(std::string_view key, std::string_view otherwise);
 
+// The group whose members act as root; "" for none. Nothing, with errno, when that cannot be determined.
+[[nodiscard]] std::optional<std::string> administratorsGroup();
+
 }  // namespace vexo
 
 #endif

@@ -67,6 +67,10 @@ int addAll(const std::vector<vexo::Setting>& settings, PVLIBCSZHASH* hash) {
 
 }  // namespace
 
+std::optional<std::string> vexo::administratorsGroup() {
+    return readSetting("admin_group", "administrators");
+}
+
 std::optional<std::string> vexo::readSetting(std::string_view key, std::string_view otherwise) {
     const int before = errno;
     const auto* settings = load(kSettings);

@@ -71,8 +71,16 @@ constexpr KnownKey kKeys[] = {
     {"forcegroup", ShareOption::forceGroup},
     {"group", ShareOption::forceGroup},
     {"inheritpermissions", ShareOption::inheritPermissions},
+    {"inheritacls", ShareOption::inheritAcls},
     {"vetofiles", ShareOption::vetoFiles},
     {"recycle:repository", ShareOption::recycleRepository},
+    {"-valid", ShareOption::valid},
+    {"usersharepath", ShareOption::usersharePath},
+    {"usersharemaxshares", ShareOption::usershareMost},
+    {"usershareowneronly", ShareOption::usershareOwnerOnly},
+    {"usershareprefixallowlist", ShareOption::usershareAllow},
+    {"usershareprefixdenylist", ShareOption::usershareDeny},
+    {"usersharetemplateshare", ShareOption::usershareTemplate},
     {"vexo:restriction", ShareOption::restriction},
     {"vexo:encrypted", ShareOption::encrypted},
     {"vexo:index", ShareOption::index},
@@ -105,6 +113,7 @@ class Parser {
     void endTorn() { fault("the file ends within a line: somebody is writing it"); }
     Definitions result() {
         out_.global = std::move(defaultLimits_);
+        out_.defaults = std::move(defaults_);
         return std::move(out_);
     }
 
@@ -164,7 +173,7 @@ void Parser::takeHeader(std::string_view line) {
     }
     current_ = out_.sections.size();
     byName_.emplace(foldedName(name), current_);
-    out_.sections.push_back({std::move(name), place_, defaults_, defaultLimits_, {}, {}});
+    out_.sections.push_back({std::move(name), place_, defaults_, defaultLimits_, {}, {}, {}});
 }
 
 void Parser::takeOption(std::string_view line) {

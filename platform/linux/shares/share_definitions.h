@@ -2,6 +2,8 @@
 #ifndef VEXO_LINUX_SHARE_DEFINITIONS_H
 #define VEXO_LINUX_SHARE_DEFINITIONS_H
 
+#include <sys/types.h>
+
 #include <array>
 #include <cstddef>
 #include <functional>
@@ -37,8 +39,16 @@ enum class ShareOption {
     forceDirectoryMode,
     forceGroup,
     inheritPermissions,
+    inheritAcls,
     vetoFiles,
     recycleRepository,
+    valid,
+    usersharePath,
+    usershareMost,
+    usershareOwnerOnly,
+    usershareAllow,
+    usershareDeny,
+    usershareTemplate,
     ignore,
 };
 constexpr size_t kShareOptions = static_cast<size_t>(ShareOption::ignore) + 1;
@@ -51,6 +61,18 @@ struct OptionValue {
 };
 using OptionValues = std::array<OptionValue, kShareOptions>;
 
+// An entry of the access list of a share that a user defines: whom it means, as an entry of a share's lists.
+struct UserShareEntry {
+    std::string who;
+    char right;  // 'R' read, 'F' read and write, 'D' nothing
+};
+
+// What only the share of a user has.
+struct UserShareTerms {
+    uid_t owner;
+    std::vector<UserShareEntry> entries;  // the first that decides counts
+};
+
 struct DefinitionSection {
     std::string name;  // as first written
     Place place;       // of its first header
@@ -58,6 +80,7 @@ struct DefinitionSection {
     LimitValues limits;
     std::string fault;  // why the section cannot be trusted to mean what its author meant; "" when it can
     Place faultPlace;
+    std::optional<UserShareTerms> user;  // whose share it is; nothing for one of the administrator's
     [[nodiscard]] const OptionValue& value(ShareOption option) const { return values[static_cast<size_t>(option)]; }
 };
 
@@ -70,6 +93,7 @@ struct Definitions {
     std::vector<DefinitionSection> sections;  // in order of their first header; [global] is not among them
     std::vector<Problem> problems;            // what is wrong outside every section
     LimitValues global;                       // what [global] says in the end
+    OptionValues defaults;                    // the same, of the options that mean something here
     std::vector<std::string> files;           // the names of the included ones, behind "" for the main one
 };
 

@@ -93,10 +93,14 @@ std::shared_ptr<const ShareTable> vetoingShares() {
     return vetoes ? table : nullptr;
 }
 
-mode_t modeFor(const NewFiles& rules, const struct stat& folder, bool isFolder, mode_t wanted, bool own) {
+// `acl`: what the folder's default ACL grants, where it counts.
+mode_t modeFor(const NewFiles& rules, const struct stat& folder, bool isFolder, mode_t wanted, bool own,
+               std::optional<mode_t> acl) {
     if (rules.inheritPermissions) return folder.st_mode & (isFolder ? mode_t{03777} : kReadWrite);
     const std::optional<unsigned>& mask = isFolder ? rules.directoryMask : rules.createMask;
     const mode_t most = mask ? *mask : own ? mode_t{kBits} : isFolder ? kFolderMask : kFileMask;
+    if (acl && rules.inheritAcls) return *acl & most;
+    if (acl) return *acl & ((wanted & most) | (isFolder ? rules.forceDirectoryMode : rules.forceCreateMode));
     return (wanted & most) | (isFolder ? rules.forceDirectoryMode : rules.forceCreateMode);
 }
 
@@ -156,15 +160,16 @@ bool giveNew(int folder, int made, mode_t mode, bool own, uid_t uid, gid_t gid) 
     const auto shares = table == nullptr ? std::vector<const ShareDefinition*>() : table->holding(pathOf(folder));
     static const NewFiles& none = *new NewFiles;
     const NewFiles& rules = shares.empty() ? none : shares.front()->newFiles;
-    Wanted wanted = {uid, gid, modeFor(rules, above, isFolder, mode, own)};
+    // A mode of its own counts for itself; outside every share nothing limits a default ACL.
+    const auto acl = own ? std::nullopt : defaultAclMode(folder);
+    const bool modeStays = acl && shares.empty();
+    Wanted wanted = {uid, gid, modeFor(rules, above, isFolder, mode, own, acl)};
     if ((above.st_mode & S_ISGID) != 0) {
         wanted.gid = above.st_gid;
         if (isFolder) wanted.mode |= S_ISGID;
     } else if (const auto group = forcedGroup(rules.group)) {
         wanted.gid = *group;
     }
-    // A default ACL has decided already, with the mode that the file was made with as its mask.
-    const bool modeStays = !own && !rules.inheritPermissions && hasDefaultAcl(folder);
     return give(made, status, wanted, modeStays);
 }
 

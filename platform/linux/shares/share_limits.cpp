@@ -40,8 +40,7 @@ constexpr std::string_view kHarmless =
     "exec fakedirectorycreatetimes fakeoplocks forcedirectorysecuritymode forceprintername forcesecuritymode "
     "forceunknownacluser fstype getquotacommand getwdcache gpoupdatecommand guestaccount guestok hidedotfiles "
     "hidefiles hidespecialfiles homedirmap honorchangenotifyprivilege hostmsdfs hostnamelookups idmapbackend "
-    "idmapcachetime idmapdomains idmapgid idmapnegativecachetime idmapuid includesystemkrb5conf inheritacls "
-    "inheritowner "
+    "idmapcachetime idmapdomains idmapgid idmapnegativecachetime idmapuid includesystemkrb5conf "
     "initlogondelay initlogondelayedhosts interfaces iprintserver kdcdefaultdomainsupportedenctypes kdcenablefast "
     "kdcforceenablerc4weaksessionkeys kdcsupportedenctypes keepalive kerberosencryptiontypes kerberosmethod "
     "kernelchangenotify kerneloplocks kernelsharemodes kpasswdport krb5port lanmanauth largereadwrite ldapadmindn "
@@ -81,8 +80,7 @@ constexpr std::string_view kHarmless =
     "strictsync svcctllist syncalways syslog syslogonly templatehomedir templateshell timeoffset timeserver "
     "timestamplogs tlscafile tlscertfile tlscrlfile tlsdhparamsfile tlsenabled tlskeyfile tlspriority tlsverifypeer "
     "unicode unixcharset unixextensions unixpasswordsync updateencrypted useclientdriver usemmap usernamelevel "
-    "usernamemap usernamemapcachetime usernamemapscript usershareallowguests usersharemaxshares usershareowneronly "
-    "usersharepath usershareprefixallowlist usershareprefixdenylist usersharetemplateshare usesendfile usespnego "
+    "usernamemap usernamemapcachetime usernamemapscript usershareallowguests usesendfile usespnego "
     "utmp utmpdirectory vetooplockfiles volume volumeserialnumber widelinks winbindcachetime winbinddebugtraceid "
     "winbinddsocketdirectory winbindenumgroups winbindenumusers winbindexpandgroups winbindgid winbindmaxclients "
     "winbindmaxdomainconnections winbindnestedgroups winbindnormalizenames winbindnssinfo winbindofflinelogon "
@@ -135,6 +133,11 @@ bool saysYes(const std::string& text) {
 
 bool saysNo(const std::string& text) {
     return !parseBoolean(text).value_or(false);
+}
+
+// An option that has more words than yes and no.
+bool saysNotNo(const std::string& text) {
+    return parseBoolean(text) != std::optional(false);
 }
 
 bool isSet(const std::string& text) {
@@ -193,6 +196,7 @@ constexpr Limit kLimits[] = {
     {"hosts deny", isSet, kByAddress, true},
     {"guest only", saysYes, "everybody would be the guest account there"},
     {"force user", isSet, "everybody would be that user there"},
+    {"inherit owner", saysNotNo, "files belong to whoever makes them here"},
     {"hide unreadable", saysYes, "names that a user cannot read would show"},
     {"hide unwriteable files", saysYes, "names that a user cannot write would show"},
     {"hide new files timeout", isNotZero, "new files would show at once"},

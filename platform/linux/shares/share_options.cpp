@@ -103,7 +103,7 @@ std::string faultOf(const DefinitionSection& section) {
     if (!isShareName(section.name)) return "no name for a share";
     for (const OptionValue& value : section.values) {
         const bool control = std::any_of(value.text.begin(), value.text.end(),
-                                         [](char c) { return c == '\0' || c == kListAnd || c == kListNot; });
+                                         [](char c) { return c == '\0' || (c >= kListId && c <= kListAnd); });
         if (control) return "a zero or control byte in a value";
     }
     const std::string& path = section.value(ShareOption::path).text;
@@ -192,6 +192,28 @@ void fillLists(Lists&& lists, bool readOnly, ShareDefinition& share) {
     addBoth(lists.read, valid, share.readOnly);
 }
 
+// Who may enter the share of a user is who may by both its access list and what it is made after.
+bool limitToTerms(const UserShareTerms& terms, ShareDefinition& share) {
+    const size_t lists = share.readWrite.size() + share.readOnly.size();
+    if (terms.entries.size() * lists > kMaxPairs) return false;
+    std::vector<std::string> denied, write, read;
+    for (const UserShareEntry& entry : terms.entries) {
+        if (entry.right == 'D') {
+            if (entry.who == kEverybody) break;
+            denied.push_back(entry.who);
+            continue;
+        }
+        std::string& who = (entry.right == 'F' ? write : read).emplace_back(entry.who);
+        if (!denied.empty()) (who += kListAnd) += negated(denied);
+    }
+    const auto readWrite = std::exchange(share.readWrite, {}), readOnly = std::exchange(share.readOnly, {});
+    addBoth(readWrite, write, share.readWrite);
+    addBoth(readWrite, read, share.readOnly);
+    addBoth(readOnly, write, share.readOnly);
+    addBoth(readOnly, read, share.readOnly);
+    return true;
+}
+
 void replaceShare(std::vector<std::string>& list, const std::string& name) {
     for (std::string& entry : list) {
         for (size_t at = 0; (at = entry.find("%S", at)) != std::string::npos; at += name.size()) {
@@ -245,6 +267,7 @@ NewFiles newFilesOf(Values& values) {
     files.forceCreateMode = values.mode(ShareOption::forceCreateMode).value_or(0);
     files.forceDirectoryMode = values.mode(ShareOption::forceDirectoryMode).value_or(0);
     files.inheritPermissions = values.boolean(ShareOption::inheritPermissions, false);
+    files.inheritAcls = values.boolean(ShareOption::inheritAcls, false);
     files.group = values.value(ShareOption::forceGroup).text;
     return files;
 }
@@ -266,6 +289,7 @@ std::string recycleOf(const DefinitionSection& section) {
 std::string offReason(const DefinitionSection& section, Values& values) {
     const std::string key = foldedName(section.name);
     if (!values.boolean(ShareOption::available, true)) return "available = no";
+    if (!values.boolean(ShareOption::valid, true)) return "-valid = no";
     if (values.boolean(ShareOption::printable, false)) return "a printer";
     return key == "printers" || key == "print$" ? "what belongs to printers" : "";
 }
@@ -284,7 +308,8 @@ ShareDefinition takeOptions(Values& values, const DefinitionSection& section) {
     share.recycle = recycleOf(section);
     share.synced = values.boolean(ShareOption::synced, false);
     // One index cannot be of as many folders as there are users.
-    share.index = values.boolean(ShareOption::index, false) && !hasVariables(share.path);
+    share.index = values.boolean(ShareOption::index, false) && !hasVariables(share.path) && !section.user;
+    share.isUsers = section.user.has_value();
     return share;
 }
 
@@ -319,6 +344,10 @@ ShareReading readShare(const DefinitionSection& section, const LimitValues& glob
     if (!reading.fault.empty() || !reading.closings.empty()) return reading;
     fillLists(std::move(lists), readOnly && !ownHomes, share);
     if (!ownHomes) replaceShare(share, share.name);
+    if (section.user && !limitToTerms(*section.user, share)) {
+        reading.fault = "its access list is too long";
+        return reading;
+    }
     reading.share = std::move(share);
     return reading;
 }

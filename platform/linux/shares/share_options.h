@@ -17,7 +17,8 @@ struct NewFiles {
     unsigned forceCreateMode = 0;
     unsigned forceDirectoryMode = 0;
     bool inheritPermissions = false;
-    std::string group;  // "" for none; behind "+" for its members alone
+    bool inheritAcls = false;  // where a folder has a default ACL, nothing but the mask limits it
+    std::string group;         // "" for none; behind "+" for its members alone
 };
 
 struct ShareDefinition {
@@ -29,6 +30,7 @@ struct ShareDefinition {
     bool acl = false;
     bool synced = false;
     bool index = false;
+    bool isUsers = false;  // a user has defined it
     std::vector<std::string> noAccess;
     std::vector<std::string> readWrite;
     std::vector<std::string> readOnly;
@@ -55,6 +57,8 @@ struct ShareReading {
 // In an entry of a share's lists, between conditions all of which must hold, and in front of one that must not.
 constexpr char kListAnd = '\x1F';
 constexpr char kListNot = '\x1E';
+// An entry that means an account by its number, behind this and "u", or "g" for a group.
+constexpr char kListId = '\x1D';
 
 // `path` without repeated and trailing slashes when it is absolute, has a component or more, and neither "." nor ".."
 // is one; else nothing.

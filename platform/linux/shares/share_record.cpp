@@ -1,10 +1,12 @@
 #include "shares/share_record.h"
 
+#include <optional>
 #include <utility>
 #include <vector>
 
 #include "failure.h"
 #include "field.h"
+#include "settings/appliance_setting.h"
 #include "shares/share_store.h"
 
 namespace vexo {
@@ -25,6 +27,17 @@ void releaseLists(VEXOSHARE& record) {
     VLIBCSzListFree(std::exchange(record.roList, nullptr));
 }
 
+// Whom the share does not let in. Administrators act as root: a user's own folder, which may be exchanged for a link
+// under their hands, is none for them. Nothing, with errno, when nobody knows who they are.
+std::optional<std::vector<std::string>> noAccessOf(const ShareDefinition& share) {
+    std::vector<std::string> entries = share.noAccess;
+    if (!share.isUsers) return entries;
+    const auto group = administratorsGroup();
+    if (!group) return std::nullopt;
+    if (!group->empty()) entries.push_back("@" + *group);
+    return entries;
+}
+
 }  // namespace
 
 bool fillShare(const ShareDefinition& share, const std::string& root, VEXOSHARE& record) {
@@ -40,7 +53,9 @@ bool fillShare(const ShareDefinition& share, const std::string& root, VEXOSHARE&
     record.acl = static_cast<int>(share.acl);
     record.synced = static_cast<int>(share.synced);
     record.index = static_cast<int>(share.index);
-    record.naList = makeList(share.noAccess);
+    const auto noAccess = noAccessOf(share);
+    if (!noAccess) return fail(VEXO_ERR_GENERAL) == 0;
+    record.naList = makeList(*noAccess);
     record.rwList = makeList(share.readWrite);
     record.roList = makeList(share.readOnly);
     return record.naList != nullptr && record.rwList != nullptr && record.roList != nullptr;

@@ -4,12 +4,19 @@
 #include <exception>
 #include <string>
 
+#include "accounts/account_source.h"
 #include "failure.h"
 #include "fault_gate.h"
 #include "shares/share_store.h"
 
 namespace vexo {
 namespace {
+
+std::string nameOf(uid_t uid) {
+    Account account;
+    const bool found = AccountSource::instance().user(uid, account) == Lookup::found;
+    return found ? account.name : std::to_string(uid);
+}
 
 class Reporter {
  public:
@@ -25,7 +32,10 @@ class Reporter {
                                                  : stated;
         if (reading.share) {
             give(reading.isHomes ? VEXO_NOTE_HOMES : VEXO_NOTE_SHARE, section.place, path,
-                 {.share = section.name, .option = "veto files", .text = section.value(ShareOption::vetoFiles).text});
+                 {.share = section.name,
+                  .option = "veto files",
+                  .text = section.value(ShareOption::vetoFiles).text,
+                  .why = section.user ? nameOf(section.user->owner) : ""});
         } else if (!reading.off.empty()) {
             give(VEXO_NOTE_OFF, section.place, path, {.share = section.name, .why = reading.off});
         } else if (!reading.fault.empty()) {

@@ -15,6 +15,7 @@
 #include "failure.h"
 #include "io/file_io.h"
 #include "settings/appliance_setting.h"
+#include "shares/user_share_files.h"
 #include "vexo/system_root.h"
 
 namespace vexo {
@@ -22,6 +23,7 @@ namespace {
 
 constexpr const char* kSource = "share_store";
 constexpr const char* kDefinitions = "/etc/vexo/shares.conf";
+constexpr const char* kSambas = "/etc/samba/smb.conf";
 constexpr size_t kMaxFile = size_t{1} << 20;
 constexpr const char* kRecycle = "#recycle";
 
@@ -58,15 +60,18 @@ struct Origin {
 struct Store {
     std::vector<Origin> origins;  // the main file first
     std::shared_ptr<const ShareTable> table;
+    UserShareFiles users;
     bool provisional = false;  // made from a text that somebody may still be writing
 
     [[nodiscard]] bool isCurrent(const std::string& path) const {
         return table != nullptr && !provisional && origins.front().path == path &&
-               std::all_of(origins.begin(), origins.end(), [](const Origin& origin) { return origin.isUnchanged(); });
+               std::all_of(origins.begin(), origins.end(), [](const Origin& origin) { return origin.isUnchanged(); }) &&
+               users.isUnchanged();
     }
     // True when both were made from files in the same state, read again only because a file was quite new.
     [[nodiscard]] bool isSameAs(const Store& other) const {
-        return std::equal(origins.begin(), origins.end(), other.origins.begin(), other.origins.end(),
+        return users.isSameAs(other.users) &&
+               std::equal(origins.begin(), origins.end(), other.origins.begin(), other.origins.end(),
                           [](const Origin& a, const Origin& b) { return a.path == b.path && a.stamp == b.stamp; });
     }
     std::optional<std::string> read(const std::string& path) {
@@ -77,12 +82,34 @@ struct Store {
         origins.push_back(origin);
         return origin.read ? std::optional(std::move(text)) : std::nullopt;
     }
+    Definitions parse(const std::string& path, const std::string& text);
 };
 
 // A relative name lies beside the main file.
 std::string pathOfIncluded(const std::string& file, const std::string& main) {
     if (file.starts_with('/')) return VEXO::SystemPath(file);
     return main.substr(0, main.rfind('/') + 1) + file;
+}
+
+bool endsWithinLine(const std::string& text) {
+    return !text.empty() && text.back() != '\n';
+}
+
+// Whether the file may be one that somebody is still writing.
+bool isFresh(const Stamp& stamp) {
+    constexpr time_t kQuiet = 2;  // seconds
+    timespec now{};
+    clock_gettime(CLOCK_REALTIME, &now);
+    return stamp.seconds + kQuiet >= now.tv_sec && stamp.seconds <= now.tv_sec + kQuiet;
+}
+
+// All that the file at `path`, whose text this is, leads to.
+Definitions Store::parse(const std::string& path, const std::string& text) {
+    provisional = endsWithinLine(text) && isFresh(origins.front().stamp);
+    Definitions definitions = parseDefinitions(
+        text, [&](const std::string& file) { return read(pathOfIncluded(file, path)); }, provisional);
+    users.addTo(definitions, path == VEXO::SystemPath(kSambas));
+    return definitions;
 }
 
 struct Reading {
@@ -119,18 +146,6 @@ Reading readShares(const Definitions& definitions) {
         }
     }
     return result;
-}
-
-bool endsWithinLine(const std::string& text) {
-    return !text.empty() && text.back() != '\n';
-}
-
-// Whether the file may be one that somebody is still writing.
-bool isFresh(const Stamp& stamp) {
-    constexpr time_t kQuiet = 2;  // seconds
-    timespec now{};
-    clock_gettime(CLOCK_REALTIME, &now);
-    return stamp.seconds + kQuiet >= now.tv_sec && stamp.seconds <= now.tv_sec + kQuiet;
 }
 
 // Nothing, with errno, when the settings cannot be read: the shares of another file must not be served.
@@ -259,10 +274,7 @@ std::shared_ptr<const ShareTable> currentShares() {
     const std::optional<std::string> text = fresh.read(path);
     if (!text) return nullptr;
     const KeepErrno keep;
-    const bool torn = endsWithinLine(*text) && isFresh(fresh.origins.front().stamp);
-    fresh.provisional = torn;
-    Reading reading = readShares(parseDefinitions(
-        *text, [&](const std::string& file) { return fresh.read(pathOfIncluded(file, path)); }, torn));
+    Reading reading = readShares(fresh.parse(path, *text));
     if (!fresh.isSameAs(store)) {
         for (const std::string& fault : reading.faults) {
             syslog(LOG_ERR, "%s:%d %s", kSource, __LINE__, orvel::printable(fault).c_str());
@@ -302,9 +314,7 @@ DefinitionsReport reportDefinitions() {
         report.error = errno;
         return report;
     }
-    report.definitions = parseDefinitions(
-        *text, [&](const std::string& file) { return fresh.read(pathOfIncluded(file, path)); },
-        endsWithinLine(*text) && isFresh(fresh.origins.front().stamp));
+    report.definitions = fresh.parse(path, *text);
     for (size_t i = 1; i < report.definitions.files.size(); ++i) {
         report.paths.push_back(pathOfIncluded(report.definitions.files[i], path));
     }
