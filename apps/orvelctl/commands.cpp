@@ -129,7 +129,8 @@ const std::vector<Command>& table() {
          .options = {{"--json", "", "{\"failures\",\"swept\":[{\"name\",\"removed\",\"error\"}]}"},
                      {"--quiet", "", "only failures, for a timer"}},
          .examples = {{"orvelctl sweep --quiet", "safe beside running work and beside another sweep"}},
-         .notes = "Prepares the temporary folders of every volume, too. Needs root."},
+         .notes = "Keeps recycle bins to the settings recycle_days and recycle_mib, see orvel-settings(5), and "
+                  "prepares the temporary folders of every volume. Needs root."},
         {.name = "volumes",
          .run = volumes,
          .summary = "makes the temporary folders of every volume",

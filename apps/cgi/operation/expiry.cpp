@@ -25,7 +25,7 @@
 namespace orvel::cgi {
 namespace {
 
-constexpr size_t kMostLooked = 10'000'000;  // of one bin
+constexpr size_t kMostLooked = 1'000'000;  // of one bin, which are some 250 MB
 constexpr int kDeepest = 200;
 constexpr long long kMiB = 1024LL * 1024;
 
