@@ -1,7 +1,7 @@
 // Which columns a list has, how wide they are, which of them there is room for, and how high a row is.
 
 import { emit } from "./events.js";
-import { extensionOf } from "./entries.js";
+import { typeOf } from "./entries.js";
 import { formatFullTime, formatMode, formatSize, formatTime } from "./format.js";
 import { plainName } from "./dom.js";
 import { openMenu } from "./menu.js";
@@ -57,12 +57,6 @@ function timeColumn(id, timeOf) {
   };
 }
 
-function typeOf(entry) {
-  if (entry.isFolder) return t("type.folder");
-  const extension = extensionOf(entry);
-  return extension ? t(`kind.${entry.kind}`, { extension }) : t("type.file");
-}
-
 function wanted() {
   const kept = pref("columns", USUAL);
   return OPTIONAL.filter((id) => kept.includes(id));
@@ -84,7 +78,7 @@ export function fitColumns(columns, room) {
   const least = columns.some(({ id }) => id === "folder" || id === "from") ? 2 : 1; // where a found entry lies is always said
   while (fitting.length > least && taken() > room) fitting.pop();
   const template = fitting.map(({ id, width, grows }) =>
-    id === "name" ? "minmax(0, 4fr)" : grows > 0 ? `minmax(${width}px, ${grows}fr)` : `${width}px`,
+    id === "name" ? "minmax(0, 4fr)" : grows > 0 ? `minmax(${taken() > room ? 0 : width}px, ${grows}fr)` : `${width}px`,
   );
   return { fitting, template: template.join(" ") };
 }

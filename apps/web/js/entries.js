@@ -66,3 +66,9 @@ export function isInBin(id) {
 export function isRecycleBin(id) {
   return isInBin(id) && id.split("/").length === 3;
 }
+
+export function typeOf(entry) {
+  if (entry.isFolder) return t("type.folder");
+  const extension = extensionOf(entry);
+  return extension ? t(`kind.${entry.kind}`, { extension }) : t("type.file");
+}

@@ -4,7 +4,7 @@ import { post } from "./api.js";
 import { browser, refresh, shareEntry } from "./browser.js";
 import { askText, dialog, toast, toastFailure } from "./dialogs.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
-import { extensionOf } from "./entries.js";
+import { typeOf } from "./entries.js";
 import { emit } from "./events.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
@@ -148,7 +148,7 @@ export async function showProperties(what) {
           "div.grow",
           {},
           h("b", {}, nameNode(entry.name)),
-          h("span.soft", {}, entry.isFolder ? t("type.folder") : extensionOf(entry) || t("type.file")),
+          h("span.soft", {}, typeOf(entry)),
         ),
       ),
       h(

@@ -3,13 +3,12 @@
 import { post } from "./api.js";
 import { browser, go, refresh } from "./browser.js";
 import { addCommand } from "./commands.js";
-import { toastFailure } from "./dialogs.js";
+import { loaded, toastFailure } from "./dialogs.js";
 import { $, announce, h, iconButton } from "./dom.js";
 import { describe } from "./errors.js";
 import { on } from "./events.js";
 import { formatTime } from "./format.js";
 import { isDeleted, isSearch, normaliseId, taskOf } from "./path.js";
-import { isEmptySearch, paramsOf, searchForm } from "./search_form.js";
 import { firstPage, keepFirstPage } from "./sources.js";
 import { t } from "./strings.js";
 
@@ -45,8 +44,12 @@ addCommand({
 });
 addCommand({ id: "closeSearch", icon: "close", group: "go", when: ({ search }) => search, run: closeSearch });
 
-export function openSearch() {
-  const form = searchForm(asked, start);
+let maker = null; // what makes and reads the form, loaded when it is wanted
+
+export async function openSearch() {
+  maker ??= await loaded(import("./search_form.js"));
+  if (!maker) return;
+  const form = maker.searchForm(asked, start);
   form.addEventListener("reset", (event) => {
     event.preventDefault();
     asked = {};
@@ -76,8 +79,8 @@ export function searchFor(name) {
 
 async function start(values) {
   const complaint = $("panel").querySelector(".complaint");
-  const params = paramsOf(values);
-  complaint.textContent = isEmptySearch(params) ? t("search.nothing") : "";
+  const params = maker.paramsOf(values);
+  complaint.textContent = maker.isEmptySearch(params) ? t("search.nothing") : "";
   if (complaint.textContent) return;
   const filled = Object.entries({ ...values, folder: browser.lastFolder }).filter(([, value]) => value !== "");
   asked = Object.fromEntries(filled);
@@ -105,9 +108,9 @@ function recall(id) {
 }
 
 // What the address asks for, once more: the server keeps no results for good.
-export function searchAgain() {
-  openSearch();
-  $("panel").querySelector("form").requestSubmit();
+export async function searchAgain() {
+  await openSearch();
+  $("panel").querySelector("form")?.requestSubmit();
 }
 
 // As long as it runs, what is in sight is asked for again.
