@@ -54,7 +54,7 @@ export async function openPage(user, { path = "/", kept = false, ...options } = 
   });
   const page = await context.newPage();
   if (!kept) await page.route("**/cgi-bin/preferences*", (route) => route.fulfill({ json: { success: true, data: { values: {} } } }));
-  if (SCREENSHOTS) photograph(page);
+  if (SCREENSHOTS && process.argv[1].endsWith(".test.mjs")) photograph(page);
   page.complaints = [];
   page.on("console", (message) => {
     if (["error", "warning"].includes(message.type()) && !isNoPicture(message.location().url)) page.complaints.push(`console: ${message.text()}`);

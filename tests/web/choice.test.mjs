@@ -70,46 +70,6 @@ test("a range and everything are what was shown, and what came since is said and
     assert.deepEqual(readdirSync(folder).sort(), ["before all.dat", nameOf(MANY - 1)]);
   }));
 
-test("all but one, in another order, beside somebody who renames, adds and removes all the time", () =>
-  withPage("admin", { path: "/projects/chosen" }, async (page) => {
-    const kept = new Set(); // what nobody chooses
-    let turn = 0;
-    const others = setInterval(() => {
-      const n = turn++;
-      const added = `came ${n}.dat`;
-      writeFileSync(`${folder}/${added}`, "", { mode: 0o666 });
-      kept.add(added);
-      const from = `${folder}/${nameOf(2 * n + 1)}`;
-      if (!existsSync(from) || 2 * n + 1 >= MANY - 1) return;
-      renameSync(from, `${folder}/renamed ${n}.dat`);
-      kept.add(`renamed ${n}.dat`);
-    }, 40);
-    try {
-      await page.keyboard.press("Control+a");
-      await chosenCount(page, MANY);
-      await row(page, nameOf(20)).click({ modifiers: ["Control"] });
-      await chosenCount(page, MANY - 1);
-      await page.click("[data-sort=size]");
-      await page.waitForSelector("[aria-sort=ascending] [data-sort=size]");
-      await page.waitForSelector(".toast >> text=no longer here");
-      await page.keyboard.press("Alt+r");
-      await page.click("[data-sort=name]");
-      await page.waitForSelector("[aria-sort=ascending] [data-sort=name]");
-      await page.focus("#view");
-      await page.keyboard.press("Shift+Delete");
-      await page.click(".dialog .button.danger");
-      await page.waitForSelector(".activity-card:is(.good, .failed) >> text=Delete");
-    } finally {
-      clearInterval(others);
-    }
-    const left = readdirSync(folder);
-    for (const name of [...kept, nameOf(20)]) assert.ok(left.includes(name), `${name} was not chosen`);
-    assert.deepEqual(left.filter((name) => name.startsWith("item-")), [nameOf(20)]);
-    // What failed comes back in every page until somebody has done with it.
-    for (const button of await page.locator(".activity-card.failed >> [aria-label='Remove from the list']").all())
-      await button.click();
-  }));
-
 test("a list that is gone: what was chosen by name stays, all must be chosen again, nothing is sent", () =>
   withPage("admin", { path: "/projects/chosen" }, async (page) => {
     const forget = () => {

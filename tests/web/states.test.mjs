@@ -3,6 +3,7 @@ import assert from "node:assert/strict";
 import { chmodSync, mkdirSync, writeFileSync } from "node:fs";
 import { before, test } from "node:test";
 import { findings, go, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+import { visitStates } from "./main_states.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const DEEP = "a drawer/with a rather long name/and another rather long name/in which there lies/one more/and the last one";
@@ -27,51 +28,8 @@ async function accessible(page, state, part = "html") {
   assert.deepEqual(found, [], state);
 }
 
-async function visitStates(page) {
-  const press = (keys) => page.keyboard.press(keys);
-  await accessible(page, "home");
-  await go(page, "/projects");
-  await page.waitForSelector("#view >> text=notes.md");
-  await accessible(page, "list");
-  await row(page, "notes.md").click();
-  await accessible(page, "chosen");
-  for (const [keys, opened, state, part] of [
-    ["Shift+F10", ".menu", "context menu", ".menu"],
-    ["F2", ".in-place", "rename"],
-    ["Alt+n", ".dialog", "new folder"], // with what lies behind a dialog
-    ["Alt+Enter", ".why li", "properties", ".dialog"],
-    ["Control+k", ".dialog", "share a link", ".dialog"],
-    ["?", ".dialog", "shortcuts", ".dialog"],
-    [" ", ".preview pre", "preview"],
-  ]) {
-    await press(keys);
-    await page.waitForSelector(opened);
-    await accessible(page, state, part);
-    await press("Escape");
-    await page.waitForSelector(opened, { state: "detached" });
-  }
-  await page.click("#settings-button");
-  await accessible(page, "settings", ".menu");
-  await press("Escape");
-  await page.click("#account-button");
-  await page.click(".menu >> text=/public links|Öffentliche/");
-  await accessible(page, "links", ".dialog");
-  await press("Escape");
-  await press("Alt+2");
-  await page.waitForSelector("#view.grid .row");
-  await accessible(page, "grid");
-  await press("Alt+1");
-  await page.click("#search-button");
-  await accessible(page, "search panel");
-  await page.fill("[name=name]", "plan");
-  await press("Enter");
-  await page.waitForSelector("#view >> text=plan.pdf");
-  await page.waitForFunction(() => !document.querySelector("#status .running"));
-  await accessible(page, "results");
-}
-
 test("no finding in any main state, light and dark, wide and on a phone", async () => {
-  await withPage("alice", { path: "/" }, visitStates);
+  await withPage("alice", { path: "/" }, (page) => visitStates(page, accessible));
   await withPage("alice", { path: "/photo", colorScheme: "dark", locale: "de-DE" }, async (page) => {
     await accessible(page, "dark");
     await page.keyboard.press("Control+a");
