@@ -12,6 +12,7 @@
 
 #include "base/owner.h"
 #include "base/raised_identity.h"
+#include "filesystem/mount_table.h"
 #include "shares/user_share.h"
 #include "vexo/filesystem.h"
 #include "vexo/system_root.h"
@@ -21,6 +22,7 @@ namespace {
 
 constexpr const char* kSambasFolder = "/var/lib/samba/usershares";
 constexpr size_t kMaxNames = 10000;
+constexpr size_t kMaxMounts = size_t{16} << 20;
 using Folder = std::unique_ptr<DIR, orvel::Releaser<closedir>>;
 
 bool isSameTime(const timespec& a, const timespec& b) {
@@ -40,6 +42,17 @@ bool readNames(int fd, std::set<std::string>& names) {
         names.insert(name);
     }
     return errno == 0;
+}
+
+// By a table of mounts read for itself: the one that is kept holds a descriptor, and orveld's parent holds none.
+bool isOnNetwork(const std::string& path) {
+    const std::string own = VEXO::SystemPath("/proc/mounts");
+    const Descriptor file = openFile(access(own.c_str(), F_OK) == 0 ? own : "/proc/self/mounts", O_RDONLY);
+    std::string text;
+    if (!file || !readAll(file.get(), text, kMaxMounts)) return true;
+    const MountTable table = parseMountTable(text);
+    const Mount* mount = mountHolding(table, path);
+    return mount != nullptr && VEXOFSIsRemoteFS(mount->type) == 1;
 }
 
 DefinitionSection madeAfter(const Definitions& definitions, const UserShareRules& rules, bool& found) {
@@ -177,7 +190,7 @@ std::string UserShareFiles::readFile(int folder, const std::string& name, const 
 
 std::string UserShareFiles::judgeTarget(const std::string& path, uid_t owner, bool ownerOnly) {
     // The server of a network mount may be dead, and would keep everybody waiting.
-    if (VEXOFSIsRemoteFS(VEXOGetFSType(path.c_str(), 0)) == 1) return "its folder lies on a network mount";
+    if (isOnNetwork(path)) return "its folder lies on a network mount";
     looks_.push_back(lookAt(path, false));
     const Look& look = looks_.back();
     if (!look.found || !S_ISDIR(look.status.st_mode)) return "its folder " + path + " is not there";
