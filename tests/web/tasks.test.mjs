@@ -239,8 +239,9 @@ test("undone by a key: a rename, a deletion; what stands in the way is named", (
 
 test("deleted files: one list of all bins, sorted, searched, restored, emptied", () =>
   withPage("alice", { path: "/projects/undone" }, async (page) => {
+    rmSync(`${projects}/#recycle`, { recursive: true, force: true }); // with what only an administrator may remove
     mkdirSync(`${projects}/#recycle/samba`, { recursive: true });
-    chmodSync(`${projects}/#recycle/samba`, 0o777);
+    for (const folder of ["#recycle", "#recycle/samba"]) chmodSync(`${projects}/${folder}`, 0o777);
     writeFileSync(`${projects}/#recycle/samba/unknown.txt`, "by Samba");
     writeFileSync(`${projects}/undone/gone.txt`, "gone");
     await page.keyboard.press("Alt+r");
