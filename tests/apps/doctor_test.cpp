@@ -131,9 +131,11 @@ TEST_F(Doctor, LooksAtMountsAndIndexes) {
 }
 
 TEST_F(Doctor, HearsOrveld) {
-    // A share of a user's, which is read before orveld looks at what it has open.
+    // A share of a user's, which is read before orveld looks at what it has open; with the mounts of the machine
+    // itself.
     shell(
-        "mkdir -p users pub; chmod 1770 users; printf '[global]\\nusershare path = /users\\n' >>etc/vexo/shares.conf; "
+        "rm -f proc/mounts; mkdir -p users pub; chmod 1770 users; printf '[global]\\nusershare path = /users\\n' "
+        ">>etc/vexo/shares.conf; "
         "printf \"#VERSION 2\\npath=$PWD/pub\\ncomment=\\nusershare_acl=S-1-1-0:F\\nguest_ok=n\\n\" >users/pub");
     const Orveld orveld;
     setSetting("orveld_socket", orveld.socket());
