@@ -113,7 +113,7 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
 test("previews, thumbnails, rename, downloads", () =>
   withPage("alice", { path: "/projects/incoming%20%E2%80%9C1%E2%80%9D/trip" }, async (page) => {
     await row(page, "list & more").dblclick();
-    await page.waitForSelector(".preview.paper pre >> text=<b>bread</b>");
+    await page.waitForSelector(".preview.paper .markdown li >> text=<b>bread</b>");
     const texts = { "latin.txt": Buffer.from("Café", "latin1"), "wide.txt": Buffer.from("\uFEFFCafé", "utf16le") };
     for (const [name, bytes] of Object.entries(texts)) writeFileSync(join(projects, "incoming “1”/trip", name), bytes);
     for (const name of Object.keys(texts)) {

@@ -16,7 +16,7 @@ export async function visitStates(page, at) {
     ["Alt+Enter", ".why li", "properties", ".dialog"],
     ["Control+k", ".dialog", "share a link", ".dialog"],
     ["?", ".dialog", "shortcuts", ".dialog"],
-    [" ", ".preview pre", "preview"],
+    [" ", ".preview .text-shown > .scrolls", "preview"],
   ]) {
     await press(keys);
     await page.waitForSelector(opened);

@@ -1,7 +1,7 @@
 // A look at a file: pictures, text, sound and film; of everything else what it is.
 
 import { addressOf, readAddress } from "./address.js";
-import { readReply, send, urlOf } from "./api.js";
+import { ApiError, urlOf } from "./api.js";
 import { browser } from "./browser.js";
 import { command, context, runCommand } from "./commands.js";
 import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
@@ -11,9 +11,7 @@ import { formatSize, formatTime } from "./format.js";
 import { canShowImage, iconOf } from "./icons.js";
 import { download } from "./download.js";
 import { t } from "./strings.js";
-import { detect } from "./text_codec.js";
 
-const TEXT_START = 256 * 1024;
 const LARGEST_IMAGE = 64 * 1024 * 1024;
 const LARGEST_AHEAD = 16 * 1024 * 1024;
 
@@ -61,8 +59,8 @@ export function preview(entry, there = false) {
   });
   node.addEventListener("keydown", (event) => {
     const by = { ArrowLeft: -1, ArrowRight: 1, ArrowUp: -1, ArrowDown: 1 }[event.key];
-    if (by && !event.target.closest("pre, video, audio")) step(by);
-    if (event.key !== " " || event.target.closest("button, video, audio")) return;
+    if (by && !event.target.closest(".scrolls, select, video, audio")) step(by);
+    if (event.key !== " " || event.target.closest("button, select, input, video, audio")) return;
     event.preventDefault(); // or the same key would open it again
     node.close();
   });
@@ -92,26 +90,26 @@ addEventListener("popstate", (event) => {
   }
 });
 
-// The next file of the list; the selection goes along.
-function step(by) {
+// The next file of the list, or the next of a kind; the selection goes along. `play`: it begins by itself.
+function step(by, { kind = null, play = false } = {}) {
   const { listing, selection, view } = browser;
   for (let i = selection.cursor + by; i >= 0 && i < listing.total; i += by) {
     const entry = listing.item(i);
     if (!entry) break;
-    if (entry.isFolder) continue;
+    if (entry.isFolder || (kind !== null && entry.kind !== kind)) continue;
     selection.pick(i);
     view.reveal(i);
-    fill(entry);
+    fill(entry, play);
     if (!leaving) history.replaceState(history.state, "", addressOf(browser.id, entry.id));
     return;
   }
 }
 
-async function fill(entry) {
+async function fill(entry, play = false) {
   shown.abort.abort();
   const abort = new AbortController();
   Object.assign(shown, { entry, abort });
-  const about = [entry.size !== null && formatSize(entry.size), formatTime(entry.mtime)].filter(Boolean).join(" · ");
+  const about = [entry.size !== null && formatSize(entry.size), formatTime(entry.mtime), placeOf(entry)].filter(Boolean).join(" · ");
   shown.title.replaceChildren(
     icon(iconOf(entry), "file-icon"),
     h("div.grow", {}, h("b", {}, nameNode(entry.name)), h("span", {}, about)),
@@ -122,9 +120,21 @@ async function fill(entry) {
   const content = await contentOf(entry, abort.signal).catch((failure) => message(entry, describe(failure).title));
   if (abort.signal.aborted) return;
   shown.stage.replaceChildren(content);
-  if (content.matches("img")) fetchBeside();
+  if (content.matches("img")) {
+    fetchBeside();
+    const { pictureTools } = await import("./view_picture.js");
+    if (!abort.signal.aborted) shown.stage.append(pictureTools(shown.stage, content, abort.signal, step));
+  }
+  if (play) content.play?.().catch(() => {}); // where the browser lets nothing begin by itself
   // Pictures and films lie on a dark ground, what is read on that of the page.
   shown.node.classList.toggle("paper", !content.matches("img, video"));
+}
+
+// "3 of 40": which row of the list it is.
+function placeOf(entry) {
+  const { listing, selection } = browser;
+  if (listing?.item(selection.cursor)?.id !== entry.id || listing.total < 2) return "";
+  return t("preview.place", { number: selection.cursor + 1, count: listing.total });
 }
 
 // The pictures before and behind this one, so that a step finds them there.
@@ -140,7 +150,8 @@ function fetchBeside() {
 async function contentOf(entry, signal) {
   if (entry.size === 0) return message(entry, t("preview.empty"));
   if (canShowImage(entry.name) && entry.size <= LARGEST_IMAGE) return imageOf(entry);
-  if (entry.kind === "audio" || entry.kind === "video") return mediaOf(entry);
+  if (entry.kind === "audio" || entry.kind === "video") return mediaOf(entry, signal);
+  if (entry.kind === "pdf") return pdfOf(entry, signal);
   if (mayBeText(entry)) return textOf(entry, signal);
   return message(entry, t("preview.none"));
 }
@@ -167,25 +178,34 @@ function imageOf(entry) {
   });
 }
 
-function mediaOf(entry) {
+function mediaOf(entry, signal) {
   return new Promise((resolve) => {
     const player = h(entry.kind, { controls: true, preload: "metadata" });
-    player.addEventListener("loadedmetadata", () => resolve(player));
+    player.addEventListener("loadedmetadata", async () => {
+      resolve(player);
+      const { addSubtitles, keepPlace } = await import("./view_media.js");
+      if (signal.aborted) return;
+      keepPlace(player, entry.id, signal);
+      if (entry.kind === "video") addSubtitles(player, entry, signal).catch(() => {}); // the film goes without
+      else player.addEventListener("ended", () => step(1, { kind: "audio", play: true }), { signal });
+    });
     player.addEventListener("error", () => resolve(message(entry, t("preview.broken"))));
+    signal.addEventListener("abort", () => player.pause());
     player.src = source(entry);
   });
 }
 
 async function textOf(entry, signal) {
-  const response = await send(source(entry), { headers: { Range: `bytes=0-${TEXT_START - 1}` }, signal });
-  if (!response.ok) readReply(response.status, await response.text());
-  const bytes = new Uint8Array(await response.arrayBuffer());
-  const encoding = detect(bytes, entry.size > bytes.length);
-  if (!encoding) return message(entry, t("preview.none"));
-  const text = h("pre", { tabindex: 0 }, new TextDecoder(encoding).decode(bytes));
-  return entry.size > TEXT_START
-    ? h("div.text-part", {}, text, h("p.soft", {}, t("preview.start", { size: formatSize(TEXT_START) })))
-    : text;
+  const { textNode } = await import("./view_text.js");
+  return (await textNode(entry, signal)) ?? message(entry, t("preview.none"));
+}
+
+async function pdfOf(entry, signal) {
+  const { pdfNode } = await import("./view_pdf.js");
+  return pdfNode(entry, signal).catch((failure) => {
+    if (failure instanceof ApiError) throw failure;
+    return message(entry, t("preview.broken"));
+  });
 }
 
 function message(entry, text) {
