@@ -105,6 +105,7 @@ test("what somebody else changed meanwhile is compared, not replaced", () =>
       await page.keyboard.press("Control+s");
       await page.click(".dialog.compare >> text=Keep both");
       await page.locator(".editor-name", { hasText: "shared (2).txt" }).waitFor();
+      await row(page, "shared (2).txt").waitFor({ state: "attached" }); // or the rows would move under the next click
       assert.equal(readFileSync(at("shared (2).txt"), "utf8"), "mine first\nsecond\nthird\n");
       assert.equal(readFileSync(at("shared.txt"), "utf8"), "first\ntheirs\nthird\n");
       await leave(page);
