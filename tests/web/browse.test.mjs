@@ -382,6 +382,7 @@ test("the keyboard alone is never lost", () =>
     await page.click("#find");
     assert.equal(await held(), "find");
     await page.click("#search-button");
+    await page.waitForSelector("[name=name]:focus");
     await page.keyboard.press("Escape");
     assert.equal(await held(), "search-button");
   }));

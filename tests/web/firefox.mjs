@@ -117,11 +117,18 @@ export class Firefox {
     throw new Error(`${selector} “${text}” stayed`);
   }
 
+  // What is drawn anew between finding and clicking is found again.
   async click(selector, text, count = 1) {
-    const origin = { type: "element", element: await this.find(selector, text) };
     const clicks = Array.from({ length: count }, () => [{ type: "pointerDown", button: 0 }, { type: "pointerUp", button: 0 }]);
-    const actions = [{ type: "pointerMove", x: 0, y: 0, origin }, ...clicks.flat()];
-    await this.send("input.performActions", { context: this.context, actions: [{ type: "pointer", id: "mouse", actions }] });
+    for (const end = Date.now() + LONGEST; ; ) {
+      const origin = { type: "element", element: await this.find(selector, text) };
+      const actions = [{ type: "pointerMove", x: 0, y: 0, origin }, ...clicks.flat()];
+      try {
+        return await this.send("input.performActions", { context: this.context, actions: [{ type: "pointer", id: "mouse", actions }] });
+      } catch (failure) {
+        if (!/^(move target out of bounds|no such element|stale element reference)/.test(failure.message) || Date.now() > end) throw failure;
+      }
+    }
   }
 
   // A key by name, or characters.

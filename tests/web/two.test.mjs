@@ -58,13 +58,11 @@ async function clickAt(page, part, modifiers) {
   }, part);
   await drawn(page);
   await rowsReady(page);
-  const name = await page.evaluate(() => {
-    const { top, height } = document.getElementById("view").getBoundingClientRect();
-    const rows = [...document.querySelectorAll("#view .row:not(.header, .waiting)")];
-    return rows.find((one) => one.getBoundingClientRect().top > top + height / 2).querySelector(".name").title;
-  });
-  await page.click(`#view .name[title="${name}"]`, { modifiers });
-  return name;
+  const { left, top, height } = await page.evaluate(() => document.getElementById("view").getBoundingClientRect());
+  for (const key of modifiers) await page.keyboard.down(key);
+  await page.mouse.click(left + 200, top + height / 2);
+  for (const key of modifiers) await page.keyboard.up(key);
+  return page.getAttribute("#view .row.cursor .name", "title"); // rows may have moved below the pointer
 }
 
 const CHOICES = [

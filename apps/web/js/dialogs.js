@@ -18,7 +18,7 @@ export function dialog({ title, className = "", fill, wide = false }) {
     node.append(
       h(
         "header",
-        {},
+        { role: "presentation" }, // the page has one banner
         h("h2#dialog-title", {}, title),
         iconButton("close", t("dialog.close"), () => close(null)),
       ),

@@ -123,7 +123,8 @@ async function fill(entry, play = false) {
   if (content.matches("img")) {
     fetchBeside();
     const { pictureTools } = await import("./view_picture.js");
-    if (!abort.signal.aborted) shown.stage.append(pictureTools(shown.stage, content, abort.signal, step));
+    if (abort.signal.aborted) return;
+    shown.stage.append(pictureTools(shown.stage, content, abort.signal, step));
   }
   if (play) content.play?.().catch(() => {}); // where the browser lets nothing begin by itself
   // Pictures and films lie on a dark ground, what is read on that of the page.
