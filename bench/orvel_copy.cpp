@@ -30,7 +30,7 @@ int main(int argc, char** argv) {
     {
         const std::unique_ptr<KTR::Task> task(KTR::TaskMgr("bench").createTask("Quorvane_copy"));
         if (task == nullptr) return 2;
-        Progress progress(*task, "copy");
+        Progress progress(*task, "bench", "copy");
         measure(item, progress);
         Transfer transfer(progress, {.conflict = Conflict::kError, .move = false, .owner = {}, .onFat = false});
         Entry to = {target.get(), item.place.name, "/target/" + item.place.name};
