@@ -61,7 +61,9 @@ export class Firefox {
     if (method === "input.fileDialogOpened") this.chooser?.(params.element);
     else if (method === "network.responseCompleted") {
       const { status, url } = params.response;
-      if (status >= 400) this.complaints.push(`status ${status}: ${new URL(url).pathname}`);
+      const { pathname } = new URL(url);
+      const noPicture = pathname === "/cgi-bin/thumbnail" && [415, 503].includes(status); // see browser.mjs
+      if (status >= 400 && !noPicture) this.complaints.push(`status ${status}: ${pathname}`);
     } else if (params.level === "error" || params.level === "warn") this.complaints.push(`${params.level}: ${params.text}`);
   }
 
