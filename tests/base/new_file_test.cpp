@@ -159,11 +159,12 @@ TEST_F(NewFileTest, OnlyTheExpectedFileIsReplaced) {
         int asked = 0;
         std::optional<orvel::NewFile> file(folder_.get());
         ASSERT_TRUE(file->create("a", 0644) && write(file->get(), "new", 3) == 3);
-        const bool stored = file->publishInPlaceOf("a", [&, question = question, event = event](const struct stat& now) {
-            const bool same = now.st_ino == known.st_ino && now.st_size == known.st_size;
-            if (++asked == question) event();
-            return same;
-        });
+        const bool stored =
+            file->publishInPlaceOf("a", [&, question = question, event = event](const struct stat& now) {
+                const bool same = now.st_ino == known.st_ino && now.st_size == known.st_size;
+                if (++asked == question) event();
+                return same;
+            });
         EXPECT_EQ(stored ? 0 : errno, found == "new" ? 0 : ESTALE);
         file.reset();
         EXPECT_EQ(entries(), found.empty() ? Entries{} : Entries{"a=" + found});
