@@ -62,6 +62,7 @@ async function clickAt(page, part, modifiers) {
   for (const key of modifiers) await page.keyboard.down(key);
   await page.mouse.click(left + 200, top + height / 2);
   for (const key of modifiers) await page.keyboard.up(key);
+  await drawn(page);
   return page.getAttribute("#view .row.cursor .name", "title"); // rows may have moved below the pointer
 }
 
