@@ -5,6 +5,7 @@
 
 #include <memory>
 
+#include "base/new_file.h"
 #include "check.h"
 #include "operation/progress.h"
 #include "operation/unpack.h"
@@ -47,7 +48,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     for (const auto& entry : fs::recursive_directory_iterator(target)) {
         fuzz::require(entry.is_symlink() || entry.is_regular_file() || entry.is_directory());
         if (entry.is_symlink()) fuzz::require(!fs::read_symlink(entry.path()).is_absolute());
-        fuzz::require(!entry.path().filename().string().starts_with(".part-"));
+        fuzz::require(!orvel::isPartName(entry.path().filename().string()));
         if (!entry.is_symlink()) fs::permissions(entry.path(), fs::perms::owner_all, fs::perm_options::add);
     }
     fs::remove_all(work);
