@@ -105,7 +105,7 @@ std::int64_t parseHttpDate(std::string_view text) {
     for (const char* format : {"%a, %d %b %Y %H:%M:%S GMT", "%a, %d-%b-%y %H:%M:%S GMT", "%a %b %d %H:%M:%S %Y"}) {
         struct tm parts {};
         const char* end = strptime(copy.c_str(), format, &parts);
-        if (end != nullptr && *end == '\0') return timegm(&parts);
+        if (end != nullptr && *end == '\0') return std::max<std::int64_t>(timegm(&parts), -1);
     }
     return -1;
 }

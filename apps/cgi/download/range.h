@@ -34,7 +34,7 @@ bool namesTag(std::string_view ifMatch, std::string_view tag);
 // Whether a Range header counts: If-Range is absent, this tag, or this very date.
 bool rangeCounts(std::string_view ifRange, std::string_view tag, std::int64_t modified);
 
-// An HTTP date, and back (-1 for anything else).
+// An HTTP date, and back (-1 for anything else, and for what lies before 1970).
 std::string httpDate(std::int64_t seconds);
 std::int64_t parseHttpDate(std::string_view text);
 
