@@ -3,7 +3,7 @@ import assert from "node:assert/strict";
 import { mkdirSync, readdirSync, readFileSync, readlinkSync, writeFileSync } from "node:fs";
 import { before, test } from "node:test";
 import { KINDS, PICTURES } from "../../apps/web/js/icons.js";
-import { drawn, go, row, rowsReady, withPage } from "./browser.mjs";
+import { boxOf, drawn, go, row, rowsReady, withPage } from "./browser.mjs";
 
 const LARGE = 20_000; // files of the share "warehouse"
 
@@ -43,10 +43,10 @@ test("sorting keeps folders first, both ways", () =>
     await page.click(".columns-button");
     await page.click(".menu >> text=Dense");
     await page.waitForSelector("#view .row .group >> text=users");
-    assert.equal((await row(page, "Landscapes").boundingBox()).height, 28);
+    assert.equal((await boxOf(row(page, "Landscapes"))).height, 28);
     await page.setViewportSize({ width: 800, height: 800 });
     await page.waitForSelector("#view .group", { state: "detached" }); // there is no room for it
-    assert.ok((await page.locator("#view .row .cell.name").first().boundingBox()).width >= 200);
+    assert.ok((await boxOf(page.locator("#view .row .cell.name").first())).width >= 200);
     await page.setViewportSize({ width: 1280, height: 800 });
     await page.waitForSelector("#view .row .group");
     await page.press("#view", "End");
@@ -137,7 +137,7 @@ test("a list of a million rows reaches its end", () =>
     await page.press("#view", "End");
     const last = page.locator("#view .row.cursor", { hasText: `row ${total - 1}` });
     await last.waitFor();
-    const [row, view] = [await last.boundingBox(), await page.locator("#view").boundingBox()];
+    const [row, view] = [await boxOf(last), await boxOf(page.locator("#view"))];
     assert.ok(row.y + row.height <= view.y + view.height + 1);
     for (let i = 0; i < 3; ++i) await page.press("#view", "PageUp");
     await page.waitForSelector("#view .row.cursor");
@@ -356,7 +356,7 @@ test("the keyboard alone is never lost", () =>
     const held = () => page.evaluate(() => document.activeElement.id || document.activeElement.dataset.sort);
     await page.focus("[data-command=newFolder]");
     await page.keyboard.press("Enter");
-    const box = await page.locator(".dialog .field").boundingBox();
+    const box = await boxOf(page.locator(".dialog .field"));
     await page.mouse.click(box.x - 8, box.y + 8); // beside the field, and still in the dialog
     await page.fill(".dialog .input", "by keyboard");
     await page.keyboard.press("Enter");

@@ -155,6 +155,15 @@ export function row(page, name) {
     .first();
 }
 
+// Where something is. A row that is drawn anew is nowhere in between.
+export async function boxOf(locator) {
+  for (const limit = Date.now() + 30_000; Date.now() < limit; ) {
+    const box = await locator.boundingBox();
+    if (box) return box;
+  }
+  throw new Error(`not to be seen within 30 s: ${locator}`);
+}
+
 // Waits for the card of what went well, and takes it away.
 export async function wentWell(page, text) {
   await page.waitForFunction((wanted) => {

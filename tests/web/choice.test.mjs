@@ -2,7 +2,7 @@
 import assert from "node:assert/strict";
 import { existsSync, mkdirSync, readdirSync, renameSync, rmSync, writeFileSync } from "node:fs";
 import { beforeEach, test } from "node:test";
-import { drawn, row, rowsReady, wentWell, withPage } from "./browser.mjs";
+import { boxOf, drawn, row, rowsReady, wentWell, withPage } from "./browser.mjs";
 
 const folder = `${process.env.ORVEL_TEST_PROJECTS}/chosen`;
 const MANY = 1500; // of which the middle is never on screen
@@ -199,8 +199,8 @@ test("a frame drawn beside the names chooses what it touches, in tiles, too", ()
       await page.mouse.move(...to, { steps: 5 });
       await page.mouse.up();
     };
-    const box = async (index) => page.locator(`#row-${index}`).boundingBox();
-    const cell = await page.locator("#row-2 .mtime").boundingBox();
+    const box = (index) => boxOf(page.locator(`#row-${index}`));
+    const cell = await boxOf(page.locator("#row-2 .mtime"));
     await drag([cell.x + 60, cell.y + 8], [cell.x + 90, (await box(5)).y + 10]);
     await chosenCount(page, 4);
     await page.click(".view-switch button >> nth=1");

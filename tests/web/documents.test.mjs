@@ -3,7 +3,7 @@ import assert from "node:assert/strict";
 import { chmodSync, copyFileSync, mkdirSync, readdirSync, rmSync, writeFileSync } from "node:fs";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
-import { findings, row, screenshot, withPage } from "./browser.mjs";
+import { boxOf, findings, row, screenshot, withPage } from "./browser.mjs";
 
 const folder = join(process.env.ORVEL_TEST_PROJECTS, "papers");
 const here = { path: "/projects/papers" };
@@ -132,7 +132,7 @@ test("PDF in place: its text can be read, its scripts cannot run", async () => {
       return data.filter((value, i) => i % 4 === 0 && value < 100).length;
     });
     assert.ok(dark > 100, `${dark} dark points`);
-    const before = await page.locator(".pdf-page").first().boundingBox();
+    const before = await boxOf(page.locator(".pdf-page").first());
     await page.locator(".pdf-pages").press("+");
     await page.waitForFunction((width) => document.querySelector(".pdf-page").offsetWidth > width, before.width);
     await harmless();

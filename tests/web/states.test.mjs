@@ -2,7 +2,7 @@
 import assert from "node:assert/strict";
 import { chmodSync, mkdirSync, writeFileSync } from "node:fs";
 import { before, test } from "node:test";
-import { findings, go, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+import { boxOf, findings, go, row, rowsReady, screenshot, withPage } from "./browser.mjs";
 import { visitStates } from "./main_states.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
@@ -93,7 +93,7 @@ test("a deep path in a narrow window, names in the tree, results on a phone", as
       const stem = page.locator(".tree-line", { hasText: "four with a rather" }).locator(".stem");
       await page.click(".tree-line.current .twist").catch(() => {});
       await stem.waitFor();
-      assert.ok((await stem.boundingBox()).width >= 20);
+      assert.ok((await boxOf(stem)).width >= 20);
     },
   );
   await withPage("alice", { path: "/", ...phone }, async (page) => {

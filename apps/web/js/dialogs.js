@@ -8,12 +8,14 @@ import { t } from "./strings.js";
 // content, an array of nodes.
 export function dialog({ title, className = "", fill, wide = false }) {
   return new Promise((resolve) => {
-    let answer = null;
     const node = h("dialog.dialog", { "aria-labelledby": "dialog-title" });
     node.className = `dialog ${className} ${wide ? "wide" : ""}`;
+    // At once: the browser announces a close later, and what comes in between finds the question answered.
     const close = (value) => {
-      answer = value;
       node.close();
+      node.remove();
+      raise();
+      resolve(value);
     };
     node.append(
       h(
@@ -24,10 +26,7 @@ export function dialog({ title, className = "", fill, wide = false }) {
       ),
       ...fill(close),
     );
-    node.addEventListener("close", () => {
-      node.remove();
-      resolve(answer);
-    });
+    node.addEventListener("close", () => close(null)); // dismissed by a key
     node.addEventListener("mousedown", (event) => {
       if (event.target === node && isOutside(event, node.getBoundingClientRect())) close(null);
     });

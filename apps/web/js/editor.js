@@ -294,8 +294,9 @@ class Editor {
 
   // `gone`: the browser's way back was taken already.
   async leave(gone = false) {
-    if (this.asking) return;
+    if (!this.node.open) return; // it is being left
     if (gone && this.changed) history.pushState({ ...history.state, editor: true }, "", location.href);
+    if (this.asking) return;
     this.asking = true;
     const way = this.changed ? await this.ask() : "leave";
     this.asking = false;
