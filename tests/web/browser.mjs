@@ -90,7 +90,8 @@ export async function withPage(user, options, run, expected = []) {
     );
   } catch (failure) {
     await screenshot(page, `failed-${user}-${Date.now()}`);
-    failure.message += `\nComplaints: ${page.complaints.join("\n")}`;
+    const shown = await page.evaluate(() => `${location.hash}\n${document.body.innerText}`).catch((reason) => reason.message);
+    failure.message += `\nComplaints: ${page.complaints.join("\n")}\nShown: ${shown.slice(0, 2000)}`;
     throw failure;
   } finally {
     await page.context().close();

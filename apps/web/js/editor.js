@@ -81,12 +81,12 @@ class Editor {
     addEventListener("popstate", back);
     await new Promise((resolve) => this.node.addEventListener("close", resolve));
     removeEventListener("popstate", back);
-    this.view.destroy();
-    this.node.remove();
     if (history.state?.editor) {
       history.back();
       await new Promise((resolve) => addEventListener("popstate", resolve, { once: true }));
     }
+    this.view.destroy();
+    this.node.remove();
   }
 
   build() {
