@@ -148,7 +148,7 @@ TEST_F(UndoCgi, ARecordIsNotBelieved) {
     for (const auto& [was, is] :
          {std::pair("/photo/c", "/photo/../../../etc/c"), std::pair("/photo/c", "/photo/@tmp/c"),
           std::pair("/photo/c", "/photo/a/../x/c"), std::pair("/photo/c", "/photo/.."), std::pair("m ", "m x"),
-          std::pair("m ", "? "), std::pair("ORVUNDO1", "ORVUNDO2")}) {
+          std::pair("m ", "? "), std::pair("ORVUNDO2", "ORVUNDO1")}) {
         std::string text = whole;
         text.replace(text.rfind(was), strlen(was), is);
         write(text);
@@ -169,6 +169,37 @@ TEST_F(UndoCgi, WhatIsBackAlreadyIsFoundSo) {
     EXPECT_EQ(errors(undo(id)), "");
     EXPECT_EQ(readFile(photo_ + "/c") + readFile(photo_ + "/a/1"), "/c/a/1");
     EXPECT_FALSE(fs::exists(undoFile(id)));
+}
+
+// An overlay that is mounted again is what a disk is after the machine has been started anew: the same files, and the
+// same number of its file system, under another device number.
+TEST_F(UndoCgi, TheDeviceMayHaveAnotherNumberByThen) {
+    const std::string disk = addShare("other", "read only = no\n");
+    EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
+        EXPECT_EQ(mount("none", disk.c_str(), "tmpfs", 0, "mode=0777"), 0);
+        for (const char* name : {"/below", "/above", "/work", "/others"}) openFolder(disk + name);
+        const std::string layers = "lowerdir=" + disk + "/below,upperdir=" + disk + "/above,workdir=" + disk + "/work";
+        const auto deviceAfterMount = [&] {
+            struct stat status {};
+            const bool mounted = mount("none", video_.c_str(), "overlay", 0, layers.c_str()) == 0;
+            return mounted && stat(video_.c_str(), &status) == 0 ? status.st_dev : 0;
+        };
+        const dev_t before = deviceAfterMount();
+        if (before == 0) return support::kNoPrivateMounts;
+        writeFiles(video_, {"/a/1", "/c"});
+        const std::string moved = act("action=move&target=/video/a&path=/video/c");
+        const std::string copied = act("action=copy&target=/video&path=/video/a/1");
+        dev_t after = before;
+        for (int others = 0; after == before && others < 1000; ++others) {
+            EXPECT_EQ(umount(video_.c_str()), 0);
+            EXPECT_EQ(mount("none", (disk + "/others").c_str(), "tmpfs", 0, nullptr), 0);  // takes a free number
+            after = deviceAfterMount();
+        }
+        EXPECT_NE(after, before);
+        EXPECT_EQ(errors(undo(moved)) + errors(undo(copied)), "");
+        EXPECT_EQ(filesOf(video_), "a/1=/a/1 c=/c");
+        return 0;
+    }));
 }
 
 TEST_F(UndoCgi, AcrossFileSystemsAndWhileAtWork) {

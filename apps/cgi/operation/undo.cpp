@@ -62,7 +62,7 @@ class Undo {
     // One that was interrupted has moved some items already.
     [[nodiscard]] bool isBack(const UndoItem& item) const {
         Item now;
-        return openItem(user_, item.other, {}, now) == ORV_ERR_NONE && isSameFile(item.status, now.status);
+        return openItem(user_, item.other, {}, now) == ORV_ERR_NONE && isItem(item, now.place.folder.get(), now.status);
     }
     [[nodiscard]] bool isSourceThere(const UndoItem& item) const {
         Item source;
@@ -102,7 +102,7 @@ bool Undo::moveBack(const UndoItem& item) {
                               : openItem(user_, item.path, {Need::kModify}, now);
     if (code == ORV_ERR_MISSING && isBack(item)) return done();
     if (code != ORV_ERR_NONE) return failed(item.path, code);
-    if (!isUntouched(item.status, now.status)) return refused(item.path, kChanged);
+    if (!isUntouched(item, now.place.folder.get(), now.status)) return refused(item.path, kChanged);
 
     std::optional<RecycleBin> bin;
     const int binCode = RecycleBin::open(now.info, bin);
@@ -154,7 +154,8 @@ bool Undo::removeCopy(const UndoItem& item) {
     const int code = openItem(user_, item.path, {Need::kModify}, now);
     if (code == ORV_ERR_MISSING) return done();
     if (code != ORV_ERR_NONE) return failed(item.path, code);
-    if (S_ISDIR(now.status.st_mode) || !isUntouched(item.status, now.status)) return refused(item.path, kChanged);
+    if (S_ISDIR(now.status.st_mode) || !isUntouched(item, now.place.folder.get(), now.status))
+        return refused(item.path, kChanged);
     if (!isSourceThere(item)) return refused(item.path, kNoSource);
     if (unlinkat(now.place.folder.get(), now.place.name.c_str(), 0) != 0) {
         return failed(item.path, OrvParseErrnoToError(errno, nullptr, nullptr));
@@ -168,7 +169,8 @@ bool Undo::removeCopy(const UndoItem& item) {
 bool Undo::removeMade(const UndoItem& item) {
     Item now;
     const int code = openItem(user_, item.path, {Need::kModify}, now);
-    if (code == ORV_ERR_MISSING || (code == ORV_ERR_NONE && !isSameFile(item.status, now.status))) return done();
+    if (code == ORV_ERR_MISSING || (code == ORV_ERR_NONE && !isItem(item, now.place.folder.get(), now.status)))
+        return done();
     if (code != ORV_ERR_NONE) return failed(item.path, code);
     const bool gone = unlinkat(now.place.folder.get(), now.place.name.c_str(), AT_REMOVEDIR) == 0;
     const int error = errno;

@@ -10,6 +10,7 @@
 #include "base/file.h"
 #include "base/hex.h"
 #include "base/new_file.h"
+#include "file_system.h"
 #include "orvel/error_state.h"
 #include "user_folder.h"
 
@@ -20,36 +21,36 @@ constexpr std::string_view kPrefix = "Quorvane_";
 constexpr size_t kDigits = 16;
 constexpr long long kMostBytes = 16LL * 1024 * 1024;  // of one record, some 100,000 items
 constexpr OwnStore kStore = {"/var/lib/vexo/undo", 100, 64LL * 1024 * 1024, 2LL * 24 * 60 * 60, isOperationId};
-constexpr std::string_view kBeginning("ORVUNDO1\0", 9);
+constexpr std::string_view kBeginning("ORVUNDO2\0", 9);
 constexpr size_t kFacts = 8;
 
-std::array<long long, kFacts> factsOf(const struct stat& status) {
-    return {static_cast<long long>(status.st_dev),         static_cast<long long>(status.st_ino),
+std::array<long long, kFacts> factsOf(const UndoItem& item) {
+    const struct stat& status = item.status;
+    return {static_cast<long long>(item.fileSystem),       static_cast<long long>(status.st_ino),
             static_cast<long long>(status.st_mode),        static_cast<long long>(status.st_size),
             static_cast<long long>(status.st_mtim.tv_sec), static_cast<long long>(status.st_mtim.tv_nsec),
             static_cast<long long>(status.st_ctim.tv_sec), static_cast<long long>(status.st_ctim.tv_nsec)};
 }
 
-struct stat statusOf(const std::array<long long, kFacts>& facts) {
-    struct stat status {};
-    status.st_dev = static_cast<dev_t>(facts[0]);
+void takeFacts(const std::array<long long, kFacts>& facts, UndoItem& item) {
+    struct stat& status = item.status;
+    item.fileSystem = static_cast<std::uint64_t>(facts[0]);
     status.st_ino = static_cast<ino_t>(facts[1]);
     status.st_mode = static_cast<mode_t>(facts[2]);
     status.st_size = facts[3];
     status.st_mtim = {static_cast<time_t>(facts[4]), static_cast<long>(facts[5])};
     status.st_ctim = {static_cast<time_t>(facts[6]), static_cast<long>(facts[7])};
-    return status;
 }
 
-std::string lineOf(Deed deed, const std::string& path, const std::string& other, const struct stat& status) {
-    std::string line(1, static_cast<char>(deed));
-    for (const long long fact : factsOf(status)) line += " " + std::to_string(fact);
-    return line + '\0' + path + '\0' + other + '\0';
+std::string lineOf(const UndoItem& item) {
+    std::string line(1, static_cast<char>(item.deed));
+    for (const long long fact : factsOf(item)) line += " " + std::to_string(fact);
+    return line + '\0' + item.path + '\0' + item.other + '\0';
 }
 
-bool parseFacts(std::string_view text, Deed& deed, struct stat& status) {
+bool parseFacts(std::string_view text, UndoItem& item) {
     if (text.empty() || std::string_view("mcdr").find(text[0]) == std::string_view::npos) return false;
-    deed = static_cast<Deed>(text[0]);
+    item.deed = static_cast<Deed>(text[0]);
     text.remove_prefix(1);
     std::array<long long, kFacts> facts{};
     for (long long& fact : facts) {
@@ -59,7 +60,7 @@ bool parseFacts(std::string_view text, Deed& deed, struct stat& status) {
         if (error != std::errc()) return false;
         text.remove_prefix(static_cast<size_t>(end - text.data()));
     }
-    status = statusOf(facts);
+    takeFacts(facts, item);
     return text.empty();
 }
 
@@ -78,11 +79,17 @@ bool isTime(const timespec& a, const timespec& b) {
 
 }  // namespace
 
-bool isUntouched(const struct stat& left, const struct stat& now) {
-    const bool sameKind = (left.st_mode & S_IFMT) == (now.st_mode & S_IFMT);
+// What is mounted over the item can neither be moved nor removed, so the folder speaks for it.
+bool isItem(const UndoItem& left, int folder, const struct stat& now) {
+    return left.status.st_ino == now.st_ino && left.fileSystem != 0 && left.fileSystem == fileSystemOf(folder);
+}
+
+bool isUntouched(const UndoItem& left, int folder, const struct stat& now) {
+    const struct stat& then = left.status;
+    const bool sameKind = (then.st_mode & S_IFMT) == (now.st_mode & S_IFMT);
     const bool same =
-        isSameFile(left, now) && sameKind && isTime(left.st_ctim, now.st_ctim) && isTime(left.st_mtim, now.st_mtim);
-    return same && (S_ISDIR(now.st_mode) || left.st_size == now.st_size);
+        isItem(left, folder, now) && sameKind && isTime(then.st_ctim, now.st_ctim) && isTime(then.st_mtim, now.st_mtim);
+    return same && (S_ISDIR(now.st_mode) || then.st_size == now.st_size);
 }
 
 bool isOperationId(std::string_view text) {
@@ -107,9 +114,10 @@ bool UndoRecord::open() {
     return static_cast<bool>(file_);
 }
 
-bool UndoRecord::add(Deed deed, const std::string& path, const std::string& other, const struct stat& status) {
+bool UndoRecord::add(UndoItem item, int folder) {
     if (off_) return false;
-    const std::string line = lineOf(deed, path, other, status);
+    item.fileSystem = folder < 0 ? 0 : fileSystemOf(folder);
+    const std::string line = lineOf(item);
     const auto size = static_cast<long long>(line.size());
     failed_ = failed_ || (!file_ && !open()) || bytes_ + size > kMostBytes;
     if (!failed_ && !writeAll(file_.get(), line)) failed_ = true;  // what follows half a line could not be read
@@ -126,7 +134,7 @@ void UndoRecord::moved(int folder, const std::string& name, const std::string& p
     const bool renamed = before.st_dev == now.st_dev;
     const bool whole = renamed ? isSameFile(before, now) : (before.st_mode & S_IFMT) == (now.st_mode & S_IFMT);
     if (!there || !whole) return leaveOut();  // by now it is something else
-    if (add(Deed::kMoved, path, other, now)) ++count_;
+    if (add({Deed::kMoved, path, other, now}, folder)) ++count_;
 }
 
 void UndoRecord::copied(int folder, const std::string& name, const std::string& path, const std::string& other,
@@ -137,18 +145,18 @@ void UndoRecord::copied(int folder, const std::string& name, const std::string& 
     const bool whole = there && (source.st_mode & S_IFMT) == (now.st_mode & S_IFMT) && source.st_size == now.st_size &&
                        std::abs(source.st_mtim.tv_sec - now.st_mtim.tv_sec) <= 2;  // as some file systems count
     if (!whole) return leaveOut();
-    if (add(Deed::kCopied, path, other, now)) ++count_;
+    if (add({Deed::kCopied, path, other, now}, folder)) ++count_;
 }
 
 void UndoRecord::made(int folder, const std::string& name, const std::string& path) {
     struct stat now {};
     if (off_) return;
     if (fstatat(folder, name.c_str(), &now, AT_SYMLINK_NOFOLLOW) != 0 || !S_ISDIR(now.st_mode)) return leaveOut();
-    if (add(Deed::kMade, path, "", now)) ++count_;
+    if (add({Deed::kMade, path, "", now}, folder)) ++count_;
 }
 
 void UndoRecord::removed(const std::string& path, const struct stat& before) {
-    add(Deed::kRemoved, path, "", before);
+    add({Deed::kRemoved, path, "", before}, -1);
 }
 
 int UndoFile::open(const std::string& user, const std::string& id) {
@@ -165,8 +173,8 @@ int UndoFile::read() {
     struct stat status {};
     if (fstat(file_.get(), &status) != 0 || !S_ISREG(status.st_mode)) return ORV_ERR_GENERAL;
     if (status.st_nlink == 0 || kStore.isOver(status)) return ORV_ERR_MISSING;
-    if (!readAll(file_.get(), text_, static_cast<size_t>(kMostBytes)) || !text_.starts_with(kBeginning))
-        return ORV_ERR_GENERAL;
+    if (!readAll(file_.get(), text_, static_cast<size_t>(kMostBytes))) return ORV_ERR_GENERAL;
+    if (!text_.starts_with(kBeginning)) return ORV_ERR_MISSING;  // another version's
     std::string_view rest = text_;
     rest.remove_prefix(kBeginning.size());
     // What a killed process left unfinished is the last one.
@@ -181,7 +189,7 @@ bool UndoFile::item(size_t position, UndoItem& item) const {
     const Piece& piece = items_[position];
     item.path = piece.path;
     item.other = piece.other;
-    return parseFacts(piece.facts, item.deed, item.status);
+    return parseFacts(piece.facts, item);
 }
 
 void UndoFile::keep(const std::function<bool(size_t position)>& isLeft) {

@@ -7,6 +7,7 @@
 
 #include <sys/stat.h>
 
+#include <cstdint>
 #include <functional>
 #include <optional>
 #include <string>
@@ -27,12 +28,15 @@ enum class Deed : char {
 
 struct UndoItem {
     Deed deed = Deed::kMoved;
-    std::string path, other;  // share-relative
-    struct stat status {};    // as the operation left it; of kRemoved as it was
+    std::string path, other;       // share-relative
+    struct stat status {};         // as the operation left it; of kRemoved as it was; without a device, see fileSystem
+    std::uint64_t fileSystem = 0;  // that it lay on (fileSystemOf)
 };
 
-// Whether it is what the operation left, and has not been changed since.
-bool isUntouched(const struct stat& left, const struct stat& now);
+// Whether what is now in the open `folder`, with the status `now`, is what the operation left; and has not been changed
+// since.
+bool isItem(const UndoItem& left, int folder, const struct stat& now);
+bool isUntouched(const UndoItem& left, int folder, const struct stat& now);
 
 // An id that a record can have: that of an operation.
 bool isOperationId(std::string_view text);
@@ -62,7 +66,7 @@ class UndoRecord {
 
  private:
     bool open();
-    bool add(Deed deed, const std::string& path, const std::string& other, const struct stat& status);
+    bool add(UndoItem item, int folder);
 
     std::string user_, id_;
     Descriptor file_;  // locked as long as the operation goes on

@@ -3,7 +3,6 @@
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
-#include <sys/statfs.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -22,6 +21,7 @@
 #include "base/new_file.h"
 #include "base/raised_identity.h"
 #include "base/random.h"
+#include "file_system.h"
 #include "vexo/filesystem.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"
@@ -97,14 +97,10 @@ void tidyShelf(int shelf) {
 
 std::string thumbnailKey(int source, unsigned edge) {
     struct stat status {};
-    struct statfs system {};
-    if (fstat(source, &status) != 0 || fstatfs(source, &system) != 0) return "";
-    // Not the device number, which is another after each start of the machine.
-    std::uint64_t identity = 0;
-    static_assert(sizeof identity == sizeof system.f_fsid);
-    memcpy(&identity, &system.f_fsid, sizeof identity);
+    const std::uint64_t system = fileSystemOf(source);
+    if (system == 0 || fstat(source, &status) != 0) return "";
     char key[160];
-    snprintf(key, sizeof key, "1-%016llx-%llx-%llx.%09ld-%llx-%u", static_cast<unsigned long long>(identity),
+    snprintf(key, sizeof key, "1-%016llx-%llx-%llx.%09ld-%llx-%u", static_cast<unsigned long long>(system),
              static_cast<unsigned long long>(status.st_ino), static_cast<unsigned long long>(status.st_ctim.tv_sec),
              status.st_ctim.tv_nsec, static_cast<unsigned long long>(status.st_size), edge);
     return key;
