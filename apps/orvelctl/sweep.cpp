@@ -15,6 +15,8 @@
 
 #include "arguments.h"
 #include "base/beneath.h"
+#include "base/file.h"
+#include "base/new_file.h"
 #include "base/owner.h"
 #include "command.h"
 #include "folder_names.h"
@@ -38,6 +40,7 @@ namespace {
 
 constexpr std::chrono::minutes kLongest{5};
 constexpr time_t kResultsKept = time_t{2} * 24 * 60 * 60;  // as long as records of tasks
+constexpr const char* kState = "/var/lib/vexo";
 constexpr const char* kLinkSessions = "/tmp/foldersharing.current.users";
 constexpr const char* kSearchRecord = "Quorvane_Search_";
 constexpr std::string_view kJournal = "-journal";
@@ -219,6 +222,30 @@ Part sweepUndo(Sweep& /*sweep*/) {
     return part;
 }
 
+// Folders that killed processes were about to make for the system in `folder`, and, when `below`, in those that it has.
+// Who is at work on one has it locked, or makes it again.
+void sweepParts(const Descriptor& folder, const std::string& path, bool below, Part& part) {
+    std::vector<std::string> names;
+    if (!folder || !cgi::namesIn(folder.get(), cgi::Hidden::kInclude, names)) return addError(part, path, errno);
+    for (const std::string& name : names) {
+        struct stat status {};
+        if (fstatat(folder.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0 || !S_ISDIR(status.st_mode))
+            continue;
+        if (isPartName(name)) {
+            part.removed += removeAbandonedPart(folder.get(), name) ? 1 : 0;
+        } else if (below) {
+            const Descriptor inside = openBeneath(folder, name, LinkPolicy::kNone, O_RDONLY | O_DIRECTORY);
+            sweepParts(inside, path + "/" + name, false, part);
+        }
+    }
+}
+
+Part sweepState(Sweep& /*sweep*/) {
+    Part part;
+    sweepParts(openFile(VEXO::SystemPath(kState), O_RDONLY | O_DIRECTORY | O_NOFOLLOW), kState, true, part);
+    return part;
+}
+
 Part sweepBins(Sweep& sweep) {
     cgi::Expiry expiry = cgi::expireBins([&sweep] { return sweep.isOver(); });
     return {expiry.removed, std::move(expiry.error)};
@@ -241,6 +268,7 @@ constexpr struct {
     {"indexes", "left by killed builds", sweepIndexes},
     {"kept listings", "at rest for an hour", sweepKept},
     {"undo records", "older than two days", sweepUndo},
+    {"hidden folders", "left by killed processes", sweepState},
     {"recycle bins", "beyond their days or size", sweepBins},  // last: it may take long
 };
 

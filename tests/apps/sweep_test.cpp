@@ -4,7 +4,9 @@
 
 #include "apps/orveld.h"
 #include "apps/task_fixture.h"
+#include "base/file.h"
 #include "platform/private_mounts.h"
+#include "vexo/filesystem.h"
 #include "vexo/sweep.h"
 
 namespace {
@@ -72,6 +74,11 @@ TEST_F(Sweep, RemovesWhatIsOverAndNothingElse) {
         support::makeFolder(std::string(kResults) + "/alice", 0700);
         support::makeFolder("/mnt/elsewhere");
         fs::create_directory_symlink("/mnt/elsewhere", std::string(kResults) + "/bob");
+        const std::string state = systemRoot() + "/var/lib/vexo/", part = VEXO_PART_PREFIX;
+        const auto folder = [](const std::string& path) {
+            support::makeFolder(path, 0700);
+            return path;
+        };
         const std::string ended = R"({"created":1000,"finished":true})", results = std::string(kResults) + "/alice/";
         const std::vector<std::string> gone = {
             file(sessions + old, true, "user=\"alice\"\n"),
@@ -83,6 +90,8 @@ TEST_F(Sweep, RemovesWhatIsOverAndNothingElse) {
             file(upload + "part-1", true),
             file(systemRoot() + "/var/lib/vexo/index/photo.new", false),
             file(undo + "Quorvane_move_0123456789abcdef", true),
+            folder(state + part + "0-listings"),
+            folder(state + "undo/" + part + "20002-20002"),
         };
         const std::string now = std::to_string(time(nullptr));
         const std::vector<std::string> kept = {
@@ -94,7 +103,11 @@ TEST_F(Sweep, RemovesWhatIsOverAndNothingElse) {
             file("/mnt/elsewhere/0AA", true),
             file(upload + "part-2", false),
             file(undo + "Quorvane_move_0123456789abcde0", false),
+            folder(state + part + "0-at-work"),
+            file(folder(state + part + "0-full") + "/x", true),
         };
+        const orvel::Descriptor atWork = orvel::openFile(state + part + "0-at-work", O_RDONLY);
+        EXPECT_TRUE(orvel::lockFile(atWork.get(), LOCK_EX | LOCK_NB));
         writeRootFile("/tmp/foldersharing.current.users", "10.0.0.5,alice,s1,1,1,1,0,L\n10.0.0.5,alice,s2,1,1,1,1,L\n");
         chmod((systemRoot() + "/tmp/foldersharing.current.users").c_str(), 0600);
         setSetting("session_timeout", "0");
@@ -108,7 +121,8 @@ TEST_F(Sweep, RemovesWhatIsOverAndNothingElse) {
         EXPECT_EQ(last.failures, 2);
 
         EXPECT_EQ(counts(),
-                  "sessions 1\nlink sessions 1\ntasks 2\nsearch results 2\nuploads 1\nindexes 1\nundo records 1\n");
+                  "sessions 1\nlink sessions 1\ntasks 2\nsearch results 2\nuploads 1\nindexes 1\nundo records 1\n"
+                  "hidden folders 2\n");
         for (const std::string& path : gone) EXPECT_FALSE(fs::exists(path)) << path;
         for (const std::string& path : kept) EXPECT_TRUE(fs::exists(path)) << path;
         EXPECT_EQ(run({"--quiet"}).output, "");
