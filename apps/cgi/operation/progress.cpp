@@ -116,6 +116,7 @@ bool Progress::publish() {
 void Progress::end() {
     if (state_ == "running") state_ = *stopFlag() != 0 ? "cancelled" : "done";
     current_.clear();
+    undo_.close();
     publish();
     task_.finish();
 }

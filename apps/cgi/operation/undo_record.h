@@ -58,6 +58,8 @@ class UndoRecord {
     void removed(const std::string& path, const struct stat& before);
     // Something was done that cannot be undone: another file was replaced, or it went wrong halfway.
     void leaveOut() { leftOut_ += off_ ? 0 : 1; }
+    // The operation is over: whoever sees that may undo it.
+    void close() { file_ = Descriptor(); }
 
     [[nodiscard]] const std::string& id() const { return id_; }
     // How many items can be moved back or removed again, and how many were left out.
