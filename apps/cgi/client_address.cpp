@@ -13,12 +13,10 @@ std::string canonicalAddress(std::string_view text) {
     char out[INET6_ADDRSTRLEN];
     in_addr four{};
     in6_addr six{};
-    if (inet_pton(AF_INET6, address.c_str(), &six) == 1) {
-        if (!IN6_IS_ADDR_V4MAPPED(&six)) return inet_ntop(AF_INET6, &six, out, sizeof out);
-        std::memcpy(&four, six.s6_addr + 12, sizeof four);
-    } else if (inet_pton(AF_INET, address.c_str(), &four) != 1) {
-        return "";
-    }
+    if (inet_pton(AF_INET, address.c_str(), &four) == 1) return address;  // taken in one spelling alone
+    if (inet_pton(AF_INET6, address.c_str(), &six) != 1) return "";
+    if (!IN6_IS_ADDR_V4MAPPED(&six)) return inet_ntop(AF_INET6, &six, out, sizeof out);
+    std::memcpy(&four, six.s6_addr + 12, sizeof four);
     return inet_ntop(AF_INET, &four, out, sizeof out);
 }
 

@@ -1,5 +1,6 @@
 #include <json/value.h>
 
+#include "base/json_text.h"
 #include "listing.h"
 #include "orvel/file_icon.h"
 #include "orvel/file_info.h"
@@ -28,7 +29,7 @@ void appendIcon(const DIRENTRY_INFO& entry, std::string& out) {
                   entry.path.substr(0, entry.path.rfind('/')));
     out.pop_back();
     out += ",\"icon\":";
-    appendJson(readable(icon), out);
+    appendJsonText(readable(icon), out);
     out += '}';
 }
 
@@ -54,6 +55,8 @@ void appendEntry(const DIRENTRY_INFO& entry, int additional, std::string& out) {
 }
 
 void appendShare(const DIRENTRY_INFO& entry, int additional, std::string& out) {
+    const int own = additional & (ADDITIONAL_PERM | ADDITIONAL_SYNC_SHARE);
+    if (own == 0) return appendEntry(entry, additional & ~kAdditionalIcon, out);
     Json::Value item(Json::objectValue);
     // DumpFileInfo keeps what "perm" holds already.
     if ((additional & ADDITIONAL_PERM) != 0) {

@@ -2,6 +2,7 @@
 
 #include <json/value.h>
 
+#include "base/json_text.h"
 #include "text.h"
 #include "vexo/error.h"
 
@@ -38,12 +39,25 @@ std::string_view statusLine(Status status) {
     return "Status: 500 Internal Server Error\r\n";
 }
 
-Json::Value errorOf(int code, const char* key, std::string_view path) {
-    Json::Value error;
-    error["code"] = code;
-    error["key"] = key;
-    putPath(error, "path", path);
-    return error;
+// What a failure says, `before` being other members of the reply.
+void appendFailure(std::string_view before, int code, const char* key, std::string_view path, std::string& out) {
+    out.append("{").append(before).append("\"error\":{\"code\":").append(std::to_string(code)).append(",\"key\":");
+    appendJsonText(key, out);
+    out += ",\"path\":";
+    appendJsonText(readable(path), out);
+    if (!isUtf8(path)) {
+        out += ",\"path_raw\":";
+        appendJsonText(percentEncode(path), out);
+    }
+    out += "},\"success\":false}";
+}
+
+std::string dataMember(const Json::Value& data) {
+    std::string text;
+    if (data.isNull()) return text;
+    text = "\"data\":";
+    appendJson(data, text);
+    return text += ',';
 }
 
 }  // namespace
@@ -75,26 +89,22 @@ void putPath(Json::Value& object, const char* key, std::string_view path) {
 
 void reply(Output& out, Status status, const std::string& cookie, int code, std::string_view path,
            const Json::Value& data) {
-    Json::Value whole;
-    whole["success"] = code == ORV_ERR_NONE;
-    if (!data.isNull()) whole["data"] = data;
-    if (code != ORV_ERR_NONE) whole["error"] = errorOf(code, OrvParseErrorToKTRString(code, nullptr), path);
+    if (code != ORV_ERR_NONE) {
+        return replyOwnFailure(out, status, cookie, code, OrvParseErrorToKTRString(code, nullptr), path, data);
+    }
     beginReply(out, status, cookie);
-    appendJson(whole, out.text());
+    out.text().append("{").append(dataMember(data)).append("\"success\":true}");
 }
 
 void replyOwnFailure(Output& out, Status status, const std::string& cookie, int code, const char* key,
                      std::string_view path, const Json::Value& data) {
-    Json::Value whole;
-    whole["success"] = false;
-    if (!data.isNull()) whole["data"] = data;
-    whole["error"] = errorOf(code, key, path);
     beginReply(out, status, cookie);
-    appendJson(whole, out.text());
+    appendFailure(dataMember(data), code, key, path, out.text());
 }
 
 void replyFailure(Output& out, Status status, const std::string& cookie, int code, std::string_view path) {
-    reply(out, status, cookie, code, path, Json::Value());
+    beginReply(out, status, cookie);
+    appendFailure("", code, OrvParseErrorToKTRString(code, nullptr), path, out.text());
 }
 
 }  // namespace orvel::cgi

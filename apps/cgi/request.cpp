@@ -58,16 +58,17 @@ bool addList(const std::vector<std::string>& lines, std::vector<std::string>& pa
 }  // namespace
 
 void settleClientAddress() {
+    const char* forwarded = getenv("HTTP_X_FORWARDED_FOR");
+    const char* client = getenv("HTTP_CLIENT_IP");
+    const char* scheme = getenv("HTTP_X_FORWARDED_PROTO");
+    if (forwarded == nullptr && client == nullptr && scheme == nullptr) return;
     const char* asked = getenv("REMOTE_ADDR");
     const std::string peer = asked == nullptr ? "" : canonicalAddress(asked);
     const std::vector<std::string> proxies = trustedProxies();
     const bool trusted = std::find(proxies.begin(), proxies.end(), peer) != proxies.end();
-    const char* forwarded = getenv("HTTP_X_FORWARDED_FOR");
-    const char* client = getenv("HTTP_CLIENT_IP");
     std::string address;
     if (trusted && forwarded != nullptr) address = clientBehind(forwarded, peer, proxies);
     if (trusted && forwarded == nullptr && client != nullptr) address = canonicalAddress(client);
-    const char* scheme = getenv("HTTP_X_FORWARDED_PROTO");
     if (trusted && scheme != nullptr && std::string_view(scheme) == "https") setenv("HTTPS", "on", 1);
     unsetenv("HTTP_CLIENT_IP");
     unsetenv("HTTP_X_FORWARDED_FOR");

@@ -6,8 +6,9 @@
 #include <algorithm>
 #include <cstdint>
 #include <cstring>
-#include <memory>
-#include <sstream>
+
+#include "base/hex.h"
+#include "base/json_text.h"
 
 namespace orvel::cgi {
 namespace {
@@ -56,11 +57,27 @@ bool isUnreserved(char c) {
            std::string_view("-._~/").find(c) != std::string_view::npos;
 }
 
-int hexDigit(char c) {
-    if (c >= '0' && c <= '9') return c - '0';
-    if (c >= 'a' && c <= 'f') return c - 'a' + 10;
-    if (c >= 'A' && c <= 'F') return c - 'A' + 10;
-    return -1;
+std::string_view textOf(const Json::Value& value) {
+    const char* begin = nullptr;
+    const char* end = nullptr;
+    value.getString(&begin, &end);
+    return {begin, static_cast<size_t>(end - begin)};
+}
+
+void appendMembers(const Json::Value& value, std::string& out) {
+    const bool named = value.isObject();
+    out += named ? '{' : '[';
+    for (auto at = value.begin(); at != value.end(); ++at) {
+        if (at != value.begin()) out += ',';
+        if (named) {
+            const char* end = nullptr;
+            const char* name = at.memberName(&end);
+            appendJsonText({name, static_cast<size_t>(end - name)}, out);
+            out += ':';
+        }
+        appendJson(*at, out);
+    }
+    out += named ? '}' : ']';
 }
 
 }  // namespace
@@ -86,14 +103,13 @@ std::string readable(std::string_view bytes) {
 }
 
 std::string percentEncode(std::string_view bytes) {
-    static constexpr char digits[] = "0123456789ABCDEF";
     std::string out;
     for (const char c : bytes) {
         if (isUnreserved(c)) {
             out += c;
         } else {
-            const auto byte = static_cast<unsigned char>(c);
-            out += {'%', digits[byte >> 4], digits[byte & 15]};
+            out += '%';
+            appendHex(c, out, kUpperHex);
         }
     }
     return out;
@@ -104,8 +120,8 @@ std::optional<std::string> percentDecode(std::string_view text) {
     for (size_t i = 0; i < text.size(); ++i) {
         char byte = text[i];
         if (byte == '%') {
-            const int high = i + 2 < text.size() ? hexDigit(text[i + 1]) : -1;
-            const int low = i + 2 < text.size() ? hexDigit(text[i + 2]) : -1;
+            const int high = i + 2 < text.size() ? hexValue(text[i + 1]) : -1;
+            const int low = i + 2 < text.size() ? hexValue(text[i + 2]) : -1;
             if (high < 0 || low < 0) return std::nullopt;
             byte = static_cast<char>(high << 4 | low);
             i += 2;
@@ -117,15 +133,29 @@ std::optional<std::string> percentDecode(std::string_view text) {
 }
 
 void appendJson(const Json::Value& value, std::string& out) {
-    static const std::unique_ptr<Json::StreamWriter> writer = [] {
-        Json::StreamWriterBuilder builder;
-        builder["indentation"] = "";
-        builder["emitUTF8"] = true;
-        return std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter());
-    }();
-    std::ostringstream text;
-    writer->write(value, &text);
-    out += text.str();
+    switch (value.type()) {
+        case Json::nullValue:
+            out += "null";
+            break;
+        case Json::intValue:
+            out += std::to_string(value.asLargestInt());
+            break;
+        case Json::uintValue:
+            out += std::to_string(value.asLargestUInt());
+            break;
+        case Json::realValue:
+            out += Json::valueToString(value.asDouble());
+            break;
+        case Json::booleanValue:
+            out += value.asBool() ? "true" : "false";
+            break;
+        case Json::stringValue:
+            appendJsonText(textOf(value), out);
+            break;
+        case Json::arrayValue:
+        case Json::objectValue:
+            appendMembers(value, out);
+    }
 }
 
 }  // namespace orvel::cgi

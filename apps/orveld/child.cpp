@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <sys/socket.h>
-#include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -64,7 +63,6 @@ void endReply(int status, void*) {
 }
 
 void takeConnection(int connection, const Limits& limits) {
-    closelog();  // its descriptor would be closed under it
     dup2(connection, STDIN_FILENO);
     dup2(connection, STDOUT_FILENO);
     close_range(STDERR_FILENO + 1, ~0U, 0);

@@ -1,36 +1,19 @@
 #include "enum/file_info_writer.h"
 
-#include <array>
 #include <charconv>
 #include <cmath>
 #include <cstring>
 #include <string_view>
 
-#include "base/hex.h"
+#include "base/json_text.h"
 #include "orvel/privilege.h"
 
 namespace orvel {
 namespace {
 
 constexpr size_t kFixedText = 768;     // more than the names, numbers and marks of an object with every property
-constexpr size_t kLongestEscape = 6;   // "\u001f"
 constexpr double kPlainDigits = 1e17;  // from here on 17 significant digits no longer hold every digit
 constexpr size_t kNumberRoom = 32;
-
-// What follows the backslash for a byte: 0 none (the byte stands for itself), 'u' a hexadecimal escape.
-constexpr std::array<char, 256> makeEscapes() {
-    std::array<char, 256> escapes{};
-    for (size_t byte = 0; byte < 0x20; ++byte) escapes[byte] = 'u';
-    escapes['\b'] = 'b';
-    escapes['\f'] = 'f';
-    escapes['\n'] = 'n';
-    escapes['\r'] = 'r';
-    escapes['\t'] = 't';
-    escapes['"'] = '"';
-    escapes['\\'] = '\\';
-    return escapes;
-}
-constexpr std::array<char, 256> kEscapes = makeEscapes();
 
 // Writes at a place that has room for everything to come.
 class Pen {
@@ -46,16 +29,7 @@ class Pen {
     }
 
     Pen& text(std::string_view value) {
-        *at_++ = '"';
-        for (const char c : value) {
-            const char escape = kEscapes[static_cast<unsigned char>(c)];
-            if (escape == 0) {
-                *at_++ = c;
-            } else {
-                putEscape(c, escape);
-            }
-        }
-        *at_++ = '"';
+        at_ = putJsonText(at_, value);
         return *this;
     }
 
@@ -81,15 +55,6 @@ class Pen {
     }
 
  private:
-    void putEscape(char c, char escape) {
-        *at_++ = '\\';
-        *at_++ = escape;
-        if (escape != 'u') return;
-        put("00");
-        *at_++ = kLowerHex[static_cast<unsigned char>(c) >> 4];
-        *at_++ = kLowerHex[c & 15];
-    }
-
     char* at_;
 };
 
@@ -136,7 +101,7 @@ void writeAdditional(int bits, const DIRENTRY_INFO& info, Pen& pen) {
 size_t roomFor(const DIRENTRY_INFO& info) {
     const size_t bytes = info.name.size() + info.path.size() + info.realPath.size() + info.type.size() +
                          info.owner.size() + info.group.size() + info.mountPointType.size();
-    return kFixedText + kLongestEscape * bytes;
+    return kFixedText + kLongestJsonEscape * bytes;
 }
 
 }  // namespace

@@ -1,5 +1,8 @@
 #include "text.h"
 
+#include <json/value.h>
+#include <json/writer.h>
+
 #include "support/testing.h"
 
 using namespace orvel::cgi;
@@ -25,6 +28,28 @@ TEST(Text, OnlyWellFormedSequencesPass) {
         EXPECT_EQ(readable(bytes), shown) << shown;
         EXPECT_EQ(isUtf8(bytes), bytes == shown) << shown;
     }
+}
+
+TEST(Text, JsonIsThatOfTheLibraryWithoutBlanks) {
+    Json::Value whole;
+    for (const char* key : {"", "b", "a \"quoted\" \\key\x1f"}) {
+        Json::Value& list = whole[key];
+        for (const double real : {0.0, 1.0, -2.5, 1e300, 1.0 / 3}) list.append(real);
+        list.append(Json::Value::minLargestInt);
+        list.append(Json::Value::maxLargestUInt);
+        for (const bool flag : {false, true}) list.append(flag);
+        for (const auto type : {Json::nullValue, Json::stringValue, Json::arrayValue, Json::objectValue}) {
+            list.append(Json::Value(type));
+        }
+        list.append(Json::Value(std::string("\0\b\f\n\r\t\x7f \u20AC/", 11)));
+        list.append(list);
+    }
+    Json::StreamWriterBuilder builder;
+    builder["indentation"] = "";
+    builder["emitUTF8"] = true;
+    std::string text;
+    appendJson(whole, text);
+    EXPECT_EQ(text, Json::writeString(builder, whole));
 }
 
 TEST(Text, PercentCodingReturnsEveryByte) {

@@ -11,11 +11,10 @@
 //   filetype         "dir", "file" or "all" (default; folder only)
 // and those of kept listings: see list/kept.h.
 // "data" of the reply is {"total","offset","items"}; beside that of the shares stands "user", who is logged in.
-#include <json/value.h>
-
 #include <optional>
 #include <string>
 
+#include "base/json_text.h"
 #include "list/deleted.h"
 #include "list/kept.h"
 #include "listing.h"
@@ -76,7 +75,7 @@ void serveListProgram(Request& request, Output& out) {
     out.text() += "{\"success\":true,";
     if (shares) {
         out.text() += "\"user\":";
-        appendJson(Json::Value(readable(user.name)), out.text());
+        appendJsonText(readable(user.name), out.text());
         out.text() += ',';
     }
     out.text() += "\"data\":";

@@ -103,6 +103,18 @@ std::optional<KeptSession> findSession(int store, const std::string& sid, const 
     return KeptSession{sid, std::move(*record), status.st_mtime};
 }
 
+// The session that this request has found alive: its further questions do not read it again.
+struct LastFound {
+    RecentLook look;
+    std::string sid;
+    SessionRecord record;
+};
+
+LastFound& lastFound() {
+    static auto& last = *new LastFound;
+    return last;
+}
+
 std::vector<KeptSession> find(const Descriptor& store, const std::string& user) {
     const SessionLimits limits = sessionLimits();
     std::vector<KeptSession> list;
@@ -166,11 +178,18 @@ std::string createSession(SessionRecord record) {
 }
 
 std::optional<SessionRecord> useSession(const std::string& sid) {
+    if (lastFound().look.isRecent() && lastFound().sid == sid) return lastFound().record;
     const SessionLimits limits = sessionLimits();
     const orvel::RaisedIdentity raised;
     const Descriptor store = isSessionId(sid) ? openRunFolder(kStore) : Descriptor();
     auto found = store ? findSession(store.get(), sid, limits, true) : std::nullopt;
-    return found ? std::optional(std::move(found->record)) : std::nullopt;
+    if (!found) return std::nullopt;
+    LastFound& last = lastFound();
+    last.look = {};
+    last.sid = sid;
+    last.record = std::move(found->record);
+    last.look.note();
+    return last.record;
 }
 
 bool useSession(const std::string& sid, const std::string& user) {
@@ -185,6 +204,7 @@ std::vector<KeptSession> sessionsOf(const std::string& user) {
 }
 
 bool endSession(const std::string& sid) {
+    RecentLook::forgetAll();
     const KeepErrno keep;
     const orvel::RaisedIdentity raised;
     const Descriptor store = isSessionId(sid) ? openRunFolder(kStore) : Descriptor();
