@@ -1,12 +1,14 @@
 #include "confined.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <memory>
 #include <string_view>
 
+#include "base/file.h"
 #include "orvel/error_state.h"
 #include "orvel/privilege.h"
 #include "orvel/share_path.h"
@@ -17,6 +19,8 @@
 
 namespace orvel::cgi {
 namespace {
+
+constexpr int kMostTries = 100;  // to open what others replace again and again
 
 struct ReleaseShare {
     void operator()(SDK::Share* share) const { SDK::Share::Release(share); }
@@ -94,12 +98,25 @@ int confinedFolder(const PathInfo& info, LinkPolicy policy, Descriptor& folder, 
     return ORV_ERR_NONE;
 }
 
+int openShown(const Descriptor& root, const Descriptor& from, const std::string& path, LinkPolicy policy, int flags,
+              const std::string& realPath, Descriptor& opened) {
+    struct stat before {
+    }, now{};
+    for (int tries = 0; tries < kMostTries; ++tries) {
+        opened = openBeneath(from, path, policy, flags);
+        if (!opened) return refusalCode(errno, realPath);
+        if (!isHiddenPlace(root, opened)) return ORV_ERR_NONE;
+        // A file that is replaced bears a hidden name once the new one has its own: then this is the new one.
+        if (fstat(opened.get(), &now) != 0 || (tries > 0 && isSameFile(before, now))) break;
+        before = now;
+    }
+    return ORV_ERR_MISSING;
+}
+
 int confinedOpen(const PathInfo& info, LinkPolicy policy, int flags, Descriptor& opened) {
     const Descriptor root = openRoot(info);
     if (!root) return refusalCode(errno, info.shareRoot);
-    opened = openBeneath(root, pathBelow(info.shareRoot, info.realPath), policy, flags);
-    if (!opened) return refusalCode(errno, info.realPath);
-    return isHiddenPlace(root, opened) ? ORV_ERR_MISSING : ORV_ERR_NONE;
+    return openShown(root, root, pathBelow(info.shareRoot, info.realPath), policy, flags, info.realPath, opened);
 }
 
 std::optional<std::string> pathInShare(const PathInfo& info, const Descriptor& opened) {

@@ -36,6 +36,11 @@ std::optional<std::string> pathInShare(const PathInfo& info, const Descriptor& o
 // is not there for anybody.
 bool isHiddenPlace(const Descriptor& root, const Descriptor& opened);
 
+// Opens `path` beneath the open folder `from` of the share whose root is open. 0 or a code as of confinedOpen, of which
+// `realPath` is the path meant; 408 for what is never shown.
+int openShown(const Descriptor& root, const Descriptor& from, const std::string& path, LinkPolicy policy, int flags,
+              const std::string& realPath, Descriptor& opened);
+
 // The library code for a confined opening that failed with `error`.
 int refusalCode(int error, const std::string& realPath);
 

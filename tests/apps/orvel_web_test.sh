@@ -80,7 +80,7 @@ expect "names" 1 "$(openssl x509 -in "$own/certificate.pem" -noout -ext subjectA
 lighttpd -D -f "$work/run/orvel-web/lighttpd.conf" 2>"$work/log" &
 pid=$!
 ask() { curl -s --max-time 20 --cacert "$own/certificate.pem" "$@"; }
-for _ in $(seq 100); do taken "$port" && break; sleep 0.1; done
+for _ in $(seq 600); do taken "$port" && break; sleep 0.1; done
 expect "the page" 200 "$(ask -o /dev/null -w '%{http_code}' "https://localhost:$port/")"
 expect "plain HTTP" "307 https://localhost:$port/a?b" "$(ask -o /dev/null -w '%{http_code} %{redirect_url}' "http://localhost:$((port + 1))/a?b")"
 expect "a proxy" 200 "$(ask -o /dev/null -w '%{http_code}' "http://127.0.0.1:$((port + 2))/")"

@@ -82,6 +82,7 @@ TEST_F(UploadConditionCgi, OfManyAtOnceNoChangeIsLost) {
         writers.emplace_back([writer] {
             for (int line = 0; line < kLines;) {
                 const RawReply read = fetch();
+                ASSERT_TRUE(read.headers.contains("ETag")) << read.status << " " << read.body;
                 const std::string body = read.body + std::to_string(writer) + "." + std::to_string(line) + "\n";
                 const CgiReply reply = put(body, {{"HTTP_IF_MATCH", read.headers.at("ETag")}});
                 if (reply.status == 200) ++line;

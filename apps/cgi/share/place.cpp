@@ -49,11 +49,14 @@ int findPlace(const std::string& owner, const std::string& sharedPath, const std
     if (place.isFile && !rest.empty()) return ORV_ERR_MISSING;
 
     const auto below = pathInShare(info, shared);
-    place.found = rest.empty() ? std::move(shared) : openBeneath(shared, rest, linkPolicyOf(info.shareName), O_PATH);
-    if (!place.found) return refusalCode(errno, info.realPath);
-    if (!rest.empty()) {
+    if (rest.empty()) {
+        place.found = std::move(shared);
+    } else {
         const Descriptor root(open(info.shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-        if (!root || isHiddenPlace(root, place.found)) return ORV_ERR_MISSING;
+        if (!root) return refusalCode(errno, info.shareRoot);
+        const int inside =
+            openShown(root, shared, rest, linkPolicyOf(info.shareName), O_PATH, info.realPath, place.found);
+        if (inside != ORV_ERR_NONE) return inside;
     }
     place.realPath = realPathOf(place.found);
     if (!below || top.empty() || !place.realPath.starts_with(top)) return ORV_ERR_DENIED;
