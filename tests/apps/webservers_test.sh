@@ -8,7 +8,7 @@ shift 2
 [ "$#" -gt 0 ] || set -- lighttpd nginx apache
 export ASAN_OPTIONS=detect_leaks=0
 slow=20 # connections that dawdle
-[ -z "${ORVEL_TEST_LONG:-}" ] || slow=2000
+[ -z "${ORVEL_TEST_LONG:-}" ] || slow=4000
 ulimit -n 8192 2>/dev/null
 
 . "$(dirname "$0")/webserver.sh"
