@@ -2,12 +2,9 @@
 #include <json/reader.h>
 
 #include "apps/orveld.h"
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
-
-constexpr const char* kOpenssl =
-    "openssl req -x509 -newkey ec -pkeyopt ec_paramgen_curve:prime256v1 -nodes -subj /CN=x ";
 
 class Doctor : public ApplianceTest {
  protected:
@@ -47,70 +44,25 @@ class Doctor : public ApplianceTest {
 
 TEST_F(Doctor, NamesWhatIsWrong) {
     SKIP_WITHOUT_ROOT();
-    const std::string cert = kOpenssl + std::string("-days 300 -keyout key -out crt && chmod 600 key");
-    const std::string web = "mkdir -p etc/orvel var/lib/orvel-web; : >etc/orvel/web.conf; cd var/lib/orvel-web; ";
-    const std::string own = web + "" + cert + "; mv crt certificate.pem; mv key key.pem";
-    const struct {
-        const char* check;
-        std::string breaks;  // after what the rows before it did
-        const char* severity;
-        const char* text;
-    } rows[] = {
-        {"files", "chmod 644 etc/vexoinfo.conf", "good", "are as they should be"},
-        {"files", "chmod 666 etc/vexoinfo.conf", "problem", "can be changed by others"},
-        {"files", "chmod 640 etc/vexoinfo.conf", "problem", "cannot be read by users"},
-        {"files", "chmod 644 etc/vexoinfo.conf; chown 30001 etc/vexoinfo.conf", "problem", "belongs to uid 30001"},
-        {"files", "chown 0 etc/vexoinfo.conf; mkdir -p run/vexo/sessions; chmod 755 run/vexo/sessions", "problem",
-         "can be read by others"},
-        {"files", "chmod 700 run/vexo/sessions; mkdir -p etc/vexo/ddns.conf", "problem", "is not a file"},
-        {"log-in", "true", "note", "not the machine's own"},
-        {"log-in",
-         "mkdir -p etc/pam.d; printf 'auth required pam_unix.so\\naccount [default=ignore a=b] pam_unix.so\\n' "
-         ">etc/pam.d/orvel",
-         "good", "are there"},
-        {"log-in", "echo 'auth required pam_of_nobody.so' >>etc/pam.d/orvel", "problem",
-         "the module pam_of_nobody.so is not installed"},
-        {"log-in", "echo '@include common-nothing' >etc/pam.d/orvel", "problem",
-         "includes common-nothing, which is not there"},
-        {"log-in", "echo 'auth include orvel' >etc/pam.d/orvel", "problem", "has no line of the kind account"},
-        {"log-in", "chmod 666 etc/pam.d/orvel", "problem", "can be changed by others than root"},
-        {"certificate", "true", "note", "is not set up here"},
-        {"certificate", web + "true", "problem", "the certificate cannot be read"},
-        {"certificate", own, "good", "fits its key and is valid for"},
-        {"certificate", "chmod 644 var/lib/orvel-web/key.pem", "problem", "anybody can pose"},
-        {"certificate", "cd var/lib/orvel-web; mv key.pem old; " + cert + "; cp key key.pem", "problem",
-         "belongs to another certificate"},
-        {"certificate", "cd var/lib/orvel-web; cp crt certificate.pem; rm key.pem", "problem", "cannot be read"},
-        {"certificate", "echo x >var/lib/orvel-web/certificate.pem", "problem", "no certificate in PEM form"},
-        {"certificate",
-         "cd var/lib/orvel-web; cat key crt >both.pem; chmod 600 both.pem; echo certificate=$PWD/both.pem "
-         ">../../../etc/orvel/web.conf",
-         "good", "fits its key"},
-        {"certificate",
-         "cd var/lib/orvel-web; " + std::string(kOpenssl) + "-days 3 -keyout both.pem -out c && cat c >>both.pem",
-         "note", "is valid for"},
-        {"orveld", "true", "problem", "orveld does not answer"},
-        {"orveld", "echo 'orveld_web_servers=\"root, nobody-of-this-name\"' >>etc/vexoinfo.conf", "problem",
-         "names nobody-of-this-name, who is no user here"},
-        {"sweep", "true", "problem", "nothing was ever swept"},
-        {"sweep", std::string(ORVELCTL) + " sweep", "good", "swept 0 minutes ago"},
-        {"sweep", "echo 'recycle_days=\"a week\"' >>etc/vexoinfo.conf", "problem", "recycle_days is no number"},
-        {"sweep", "sed -i 's/time=.*/time=\"1000\"/' var/lib/vexo/sweep", "problem", "days ago"},
-        {"indexes", "true", "good", "no share has an index"},
-        {"shares",
-         "mkdir -p users pub; chmod 1770 users; printf \"#VERSION "
-         "2\\npath=$PWD/pub\\ncomment=\\nusershare_acl=S-1-1-0:F"
-         "\\nguest_ok=n\\n\" >users/pub; chown 20001 users/pub pub; printf '[global]\\nusershare path = /users\\n' "
-         ">etc/vexo/shares.conf",
-         "good", ", which the user alice shares"},
-        {"shares", "chown 20002 pub", "problem", "belongs to another user"},
-        {"shares", "chmod 1777 users", "problem", "in which not everybody may write"},
-        {"shares", "rm etc/vexo/shares.conf; rm -r users pub", "problem", "there are no share definitions"},
-        {"volumes", "! " ORVELCTL " volumes 2>said; grep -q 'doctor shares' said; rm said", "note", ""},
-    };
-    for (const auto& row : rows) {
-        shell(row.breaks);
-        expect(row.check, row.severity, row.text);
+    const std::string own = "mkdir -p etc/orvel var/lib/orvel-web; : >etc/orvel/web.conf; cd var/lib/orvel-web; ";
+    const std::string openssl =
+        "openssl req -x509 -newkey ec -pkeyopt ec_paramgen_curve:prime256v1 -nodes -subj /CN=x ";
+    const std::string cert = openssl + "-days 300 -keyout key -out crt && chmod 600 key";
+    const std::map<std::string, std::string> words = {
+        {"{openssl}", openssl},
+        {"{orvelctl}", ORVELCTL},
+        {"{cert}", cert},
+        {"{web}", own},
+        {"{own}", own + cert + "; mv crt certificate.pem; mv key key.pem"}};
+    // Each breaks something after what the rows before it did.
+    for (auto [check, breaks, severity, text] :
+         rowsOf<std::string, std::string, std::string, std::string>("apps/doctor")) {
+        for (const auto& [word, meaning] : words) {
+            const size_t at = breaks.find(word);
+            if (at != std::string::npos) breaks.replace(at, word.size(), meaning);
+        }
+        shell(breaks);
+        expect(check, severity, text);
     }
 }
 

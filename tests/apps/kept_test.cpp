@@ -5,7 +5,7 @@
 #include "kept_file.h"
 #include "natural_order.h"
 #include "row_ranges.h"
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
 
@@ -18,23 +18,11 @@ TEST(RowRanges, AreInOrderAndWithinTheList) {
     for (const char* wrong : {"", "3-2", "0-10", "10", "0-3,3-4", "4,2", "1,", ",1", "1-", "-1", "a", "1 ",
                               "0-4294967296", "99999999999999999999"})
         EXPECT_FALSE(orvel::cgi::parseRanges(wrong, 10)) << wrong;
-    const struct {
-        const char *ranges, *except, *left;
-    } cases[] = {{"0-9", "", "0-9"},
-                 {"0-9", "0,9", "1-8"},
-                 {"0-9", "0-9", ""},
-                 {"2,4-6,8-9", "5", "2,4,6,8-9"},
-                 {"0-3,5-9", "2-3,5", "0-1,6-9"},
-                 {"0-3,4-9", "3-4", "none"},
-                 {"0-3", "5", "none"},
-                 {"2-4", "1", "none"},
-                 {"0-3,8", "5-6", "none"},
-                 {"0-5", "5-6", "none"}};
-    for (const auto& one : cases) {
+    for (const auto& [ranges, without, remaining] : rowsOf<std::string, std::string, std::string>("apps/row_ranges")) {
         const auto except =
-            *one.except == '\0' ? std::vector<orvel::cgi::RowRange>() : *orvel::cgi::parseRanges(one.except, 10);
-        const auto left = orvel::cgi::withoutRows(*orvel::cgi::parseRanges(one.ranges, 10), except);
-        EXPECT_EQ(left ? orvel::cgi::rangesText(*left) : "none", one.left) << one.ranges << " without " << one.except;
+            without.empty() ? std::vector<orvel::cgi::RowRange>() : *orvel::cgi::parseRanges(without, 10);
+        const auto left = orvel::cgi::withoutRows(*orvel::cgi::parseRanges(ranges, 10), except);
+        EXPECT_EQ(left ? orvel::cgi::rangesText(*left) : "none", remaining) << ranges << " without " << without;
     }
     const orvel::cgi::ChosenRowNumbers rows(*orvel::cgi::parseRanges("1,4-6,8", 10));
     std::string all;

@@ -1,5 +1,6 @@
 // The program operation, run as a web server runs it.
 #include "apps/cgi_test.h"
+#include "support/table.h"
 
 namespace {
 
@@ -37,18 +38,7 @@ TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
     makeFolder(root + "/root's", 0755);
     makeFolder(root + "/old/@tmp", 0777);
     fs::create_symlink("/tmp", root + "/outside");
-    for (const auto& [user, expected, paths] : Rows<std::string, int, Names>{
-             {"alice", 0, {"/photo/a"}},
-             {"carol", 0, {"/photo/c"}},
-             {"bob", 0, {"/home/b"}},
-             {"bob", 407, {"/photo/b"}},
-             {"alice", 400, {"/photo"}},
-             {"alice", 407, {"/photo/root's/x", "/photo/outside/x"}},
-             {"alice", 408, {"/photo/p/q/r", "/nowhere/x"}},
-             {"alice", 412, {"/photo/" + std::string(256, 'n')}},
-             {"alice", 414, {"/photo/a/"}},
-             {"alice", 418, {"/photo/@tmp", "/photo/old/@tmp/x", "/photo/.vexo-part-x", "/photo/a/..", "/photo/a:b"}},
-             {"alice", 419, {"/usb/a|b"}}}) {
+    for (const auto& [user, expected, paths] : rowsOf<std::string, int, Names>("apps/made_folders")) {
         for (const std::string& path : paths) EXPECT_EQ(mkdir(user, path), expected) << path;
     }
     EXPECT_EQ(mkdir("alice", "/photo/p/q/._r", "&parents=true"), 418);

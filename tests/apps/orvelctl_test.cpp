@@ -1,7 +1,7 @@
 // What the command-line tool says of itself: help, its exit status, completion.
 #include "apps/program.h"
 #include "criteria.h"
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
 
@@ -59,46 +59,16 @@ TEST(Orvelctl, OffersEverySearchCriterion) {
 }
 
 TEST(Orvelctl, TellsByItsStatusHowItWent) {
-    const struct {
-        Words words;
-        int status;
-    } rows[] = {{{"--version"}, 0},
-                {{}, 2},
-                {{"nonsense"}, 2},
-                {{"help", "nonsense"}, 2},
-                {{"ls"}, 2},
-                {{"ls", "/", "--user"}, 2},
-                {{"ls", "/photo", "--user", "nobody-of-this-name"}, 1},
-                {{"link"}, 2},
-                {{"link", "list", "--propose"}, 2},
-                {{"index", "build", "photo", "--full"}, 2},
-                {{"search", "/photo", "--user", "--help", "--name", "--help"}, 1},
-                {{"search", "/photo", "--help"}, 0}};
-    for (const auto& row : rows)
-        EXPECT_EQ(orvelctl(row.words).status, row.status) << ::testing::PrintToString(row.words);
+    for (const auto& [words, status] : rowsOf<Words, int>("apps/orvelctl_status"))
+        EXPECT_EQ(orvelctl(words).status, status) << ::testing::PrintToString(words);
 }
 
 TEST(Orvelctl, CompletesCommandLines) {
-    const struct {
-        const char* typed;  // words, the last one to be completed
-        const char* offered;
-    } rows[] = {{"orvelctl st", "status"},
-                {"orvelctl --ver", "--version"},
-                {"orvelctl --root / link re", "revoke"},
-                {"orvelctl link create --p", "--password --propose"},
-                {"orvelctl link list --p", ""},
-                {"orvelctl ls --type ", "dir file all"},
-                {"orvelctl search --type d", "dir"},
-                {"orvelctl ls --user link --s", "--sort"},
-                {"orvelctl sharing set per", "per_user"},
-                {"orvelctl help vol", "volumes"},
-                {"orvelctl ls --user roo", "root"},
-                {"orvelctl status --socket /usr/shar", "/usr/share"}};
-    for (const auto& row : rows) {
-        const std::string script = std::string("set -f; . <(") + ORVELCTL + " completion bash); line='" + row.typed +
+    for (const auto& [typed, offered] : rowsOf<std::string, std::string>("apps/orvelctl_completion")) {
+        const std::string script = std::string("set -f; . <(") + ORVELCTL + " completion bash); line='" + typed +
                                    "'; COMP_WORDS=($line); [[ $line != *' ' ]] || COMP_WORDS+=(''); set +f; " +
                                    "COMP_CWORD=$((${#COMP_WORDS[@]} - 1)); _orvelctl; echo -n \"${COMPREPLY[*]}\"";
-        EXPECT_EQ(support::runProgram({"/bin/bash", "-c", script}).output, row.offered) << row.typed;
+        EXPECT_EQ(support::runProgram({"/bin/bash", "-c", script}).output, offered) << typed;
     }
 }
 

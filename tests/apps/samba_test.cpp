@@ -9,7 +9,7 @@
 
 #include "apps/program.h"
 #include "platform/private_mounts.h"
-#include "support/testing.h"
+#include "support/table.h"
 #include "text.h"
 
 using orvel::cgi::percentEncode;
@@ -19,115 +19,40 @@ namespace {
 struct ShareRow {
     const char* name;
     const char* options;
-    const char* narrower = "";  // why somebody may do less here
+    const char* narrower;  // why somebody may do less here
 };
 
-constexpr const char* kClosed = "closed, as the option is not honoured here";
-
-const ShareRow kShareRows[] = {
-    {"plain", "read only = no\n"},
-    {"reading", ""},
-    {"valid", "read only = no\nvalid users = alice, @team\n"},
-    {"case", "writeable = yes\nvalid users = ALICE @TEAM +readers\n"},
-    {"invalid", "read only = no\ninvalid users = bob @readers +nosuch\n"},
-    {"both", "read only = no\nvalid users = @team @readers judy\ninvalid users = gina\n"},
-    {"readlist", "read only = no\nread list = alice @readers\n"},
-    {"writelist", "write list = bob @team\n"},
-    {"twolists", "read only = no\nread list = @team\nwrite list = alice\n"},
-    {"outsider", "valid users = alice dave\nwrite list = bob dave\nread list = judy\n"},
-    {"frank", "read only = no\nvalid users = %S\n"},
-    {"star", "read only = no\nvalid users = *\n"},
-    {"nobody", "valid users = \"\"\n"},
-    {"netgroup", "valid users = &team alice\n"},
-    {"plusnet", "valid users = +&team\n"},
-    {"copied", "copy = valid\nread only = yes\nwrite list = alice\n"},
-    {"admins", "admin users = dave\nread only = yes\n"},
-    {"adminwrites", "admin users = dave\nread only = no\nvalid users = dave erin\n"},
-    {"guests", "guest ok = yes\nread only = no\nvalid users = alice\n"},
-    {"off", "available = no\nread only = no\n"},
-    {"hidden", "browseable = no\nread only = no\n"},
-    {"printer", "printable = yes\n", "a printer is no share"},
-    {"group", "read only = no\nforce group = team\ncreate mask = 0600\n"},
-    {"temporary", "read only = no\nveto files = /@tmp/\n"},
-    {"modules", "read only = no\nvfs objects =\nrecycle:keeptree = yes\n"},
-    {"each", "read only = no\npath = %ROOT%/each/%U\n"},
-    {"rightsof", "read only = no\npath = %ROOT%/shut\n"},
-    {"opened", "read only = no\nhosts allow = 127.\nvexo:ignore = hosts allow\n"},
-    {"hosts", "read only = no\nhosts allow = 127.\n", kClosed},
-    {"nohosts", "hosts deny = ALL\n"},
-    {"forced", "read only = no\nforce user = erin\n", kClosed},
-    {"guestonly", "guest ok = yes\nguest only = yes\nread only = no\n", kClosed},
-    {"unreadable", "read only = no\nhide unreadable = yes\n", kClosed},
-    {"vetoed", "read only = no\nveto files = /F*.T?T/*.no/\n"},
-    {"nolinks", "read only = no\nfollow symlinks = no\n", kClosed},
-    {"asks", "read only = no\nroot preexec = /bin/false\nroot preexec close = yes\n"},
-    {"encrypted", "read only = no\nsmb encrypt = mandatory\n", kClosed},
-    {"unknown", "read only = no\nsome new option = yes\n", kClosed},
-    {"marked", "read only = no\nhide dot files = yes\nhide files = /*.hid/\n"},
-    {"owned", "read only = no\ninherit owner = unix only\n", kClosed},
-    {"notowned", "read only = no\ninherit owner = no\n"},
-};
+const std::vector<ShareRow>& shareRows() {
+    static const auto rows = recordsOf<ShareRow, const char*, const char*, const char*>("apps/samba_shares");
+    return rows;
+}
 
 // Shares that users define, a file each, made after [like]; %PATH% is a folder of the row's `owner`.
 struct UserShareRow {
     const char* name;
     uid_t file, owner;
     const char* text;
-    mode_t mode = 0644;
+    mode_t mode;
 };
-constexpr uid_t kAlice = 20001, kBob = 20002;
 constexpr const char* kLike = "[like]\n-valid = no\npath = /tmp\nread only = yes\ninvalid users = judy\n";
-#define USER_SHARE "#VERSION 2\npath=%PATH%\ncomment=c\n"
-const UserShareRow kUserShareRows[] = {
-    {"u-all", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\nsharename=U-All\n"},
-    {"u-comma", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F,\nguest_ok=n\n"},
-    {"u-read", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:R\nguest_ok=y\n"},
-    {"u-one", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-22-1-20002:F,S-1-1-0:R\nguest_ok=n\n"},
-    {"u-denied", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-22-1-20002:D,S-1-1-0:F\nguest_ok=n\n"},
-    {"u-late", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F,S-1-22-1-20002:D\nguest_ok=n\n"},
-    {"u-group", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-22-2-20110:f\nguest_ok=n\n"},
-    {"u-nobody", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-5-21-1-2-3-1000:F\nguest_ok=n\n"},
-    {"u-blank", kAlice, kAlice, USER_SHARE "usershare_acl=\nguest_ok=n\n"},
-    {"u-one-line", kAlice, kAlice, "#VERSION 1\npath=%PATH%\ncomment=\nusershare_acl=S-1-1-0:F\n"},
-    {"u-root", 0, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n"},
-    {"u-anothers", kAlice, kBob, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n"},
-    {"u-open", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n", 0646},
-    {"u-torn", kAlice, kAlice, USER_SHARE "usershare_a"},
-    {"u-badlist", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:X\nguest_ok=n\n"},
-    {"u-version", kAlice, kAlice, "#VERSION 3\npath=%PATH%\ncomment=c\nusershare_acl=S-1-1-0:F\nguest_ok=n\n"},
-    {"u-renamed", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\nsharename=another\n"},
-    {"u-missing", kAlice, kAlice, "#VERSION 2\npath=/nowhere\ncomment=\nusershare_acl=S-1-1-0:F\nguest_ok=n\n"},
-    {"u-relative", kAlice, kAlice, "#VERSION 2\npath=tmp\ncomment=\nusershare_acl=S-1-1-0:F\nguest_ok=n\n"},
-    {"u-prefix", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n"},
-    {"reading", kAlice, kAlice, USER_SHARE "usershare_acl=S-1-1-0:F\nguest_ok=n\n"},
-};
-#undef USER_SHARE
+const std::vector<UserShareRow>& userShareRows() {
+    static const auto rows =
+        recordsOf<UserShareRow, const char*, uid_t, uid_t, const char*, mode_t>("apps/samba_user_shares");
+    return rows;
+}
 
 // Shares in which files and folders are made, by smbclient and by the programs; `parent` is the mode of the share's
 // root.
 struct ModeRow {
     const char* name;
     const char* options;
-    mode_t parent = 0777;
-    const char* acl = "";  // entries of the root's default ACL
+    mode_t parent;
+    const char* acl;  // entries of the root's default ACL
 };
-const ModeRow kModeRows[] = {
-    {"m-plain", ""},
-    {"m-masks", "create mask = 0664\ndirectory mask = 0770\n"},
-    {"m-closed", "create mode = 0600\ndirectory mode = 0700\n"},
-    {"m-forced", "force create mode = 0660\nforce directory mode = 0070\n"},
-    {"m-both", "create mask = 0640\nforce create mode = 0020\ndirectory mask = 0750\nforce directory mode = 02000\n"},
-    {"m-group", "force group = team\ncreate mask = 0660\ndirectory mask = 0770\n"},
-    {"m-plus", "force group = +team\n"},
-    {"m-setgid", "create mask = 0664\ndirectory mask = 0775\n", 02777},
-    {"m-setgidgroup", "force group = team\n", 02777},
-    {"m-inherit", "inherit permissions = yes\ncreate mask = 0600\n", 0775},
-    {"m-inheritall", "inherit permissions = yes\n", 02777},
-    {"m-acl", "inherit acls = yes\n", 0777, "u::rwx,g::r-x,o::---,u:20011:rwx,m::rwx"},
-    {"m-aclmasks", "inherit acls = yes\ncreate mask = 0600\ndirectory mask = 0700\n", 0777, "u::rwx,g::rwx,o::r-x"},
-    {"m-aclalone", "create mask = 0640\n", 0777, "u::rwx,g::rwx,o::rwx,u:20011:rwx,m::rwx"},
-    {"m-filemode", "dos filemode = yes\ncreate mask = 0660\n"},
-};
+const std::vector<ModeRow>& modeRows() {
+    static const auto rows = recordsOf<ModeRow, const char*, const char*, mode_t, const char*>("apps/samba_modes");
+    return rows;
+}
 const char* const kUserNames[] = {"alice", "bob", "carol", "dave", "erin", "frank", "gina", "hugo", "ivan", "judy"};
 
 // What somebody may do in a share.
@@ -279,7 +204,7 @@ class SambaOracle : public ApplianceTest {
     // The text of the shares, and their folders: everybody's by their Unix permissions, but those of one.
     static std::string makeShares(const std::string& root) {
         std::string text;
-        for (const ShareRow& row : kShareRows) {
+        for (const ShareRow& row : shareRows()) {
             std::string options = row.options;
             const size_t mark = options.find("%ROOT%");
             if (mark != std::string::npos) options.replace(mark, 6, root);
@@ -287,7 +212,7 @@ class SambaOracle : public ApplianceTest {
             text += std::string("[") + row.name + "]\npath = " + root + "/" + row.name + "\n" + options;
             fill(root + "/" + row.name);
         }
-        for (const ModeRow& row : kModeRows) {
+        for (const ModeRow& row : modeRows()) {
             const std::string folder = root + "/" + row.name;
             text += std::string("[") + row.name + "]\npath = " + folder + "\nread only = no\n" + row.options;
             fill(folder, row.parent);
@@ -307,7 +232,7 @@ class SambaOracle : public ApplianceTest {
         }
         text += "[homes]\npath = " + root + "/homes/%S\nread only = no\nvalid users = %S\ninvalid users = judy\n";
         fill(root + "/shut", 0755);
-        for (const ShareRow& row : kShareRows) {
+        for (const ShareRow& row : shareRows()) {
             for (const std::string folder : {row.name, "each/alice", "each/bob", "shut"})
                 writeFile(root + "/" + folder + "/" + Smbd::ownFile(row.name), "content", 0666);
         }
@@ -318,7 +243,7 @@ class SambaOracle : public ApplianceTest {
         makeFolder(folder);
         EXPECT_EQ(chmod(folder.c_str(), 01770), 0);
         EXPECT_EQ(mount(folder.c_str(), "/var/lib/samba/usershares", nullptr, MS_BIND, nullptr), 0);
-        for (const UserShareRow& row : kUserShareRows) {
+        for (const UserShareRow& row : userShareRows()) {
             const std::string path =
                 root + (strcmp(row.name, "reading") == 0 ? "/u-reading" : std::string("/") + row.name);
             const std::string file = folder + "/" + row.name;
@@ -373,7 +298,7 @@ std::string operate(const std::string& user, const std::string& form) {
 // What smbclient and the programs make looks alike.
 int compareModes(const Smbd& smbd, const std::string& root, const std::string& file) {
     int cells = 0;
-    for (const ModeRow& row : kModeRows) {
+    for (const ModeRow& row : modeRows()) {
         for (const std::string user : {"alice", "bob"}) {
             const std::string share = row.name, at = root + "/" + share + "/";
             smbd.say(user, share,
@@ -464,8 +389,8 @@ TEST_F(SambaOracle, NobodyMayMoreThanInSamba) {
     serve(users, [this](const Smbd& smbd, const std::string&, const std::string& file) {
         int cells = 0;
         std::vector<std::string> shares = {"u-link", "alice", "hugo", "judy"};
-        for (const ShareRow& row : kShareRows) shares.emplace_back(row.name);
-        for (const UserShareRow& row : kUserShareRows) shares.emplace_back(row.name);
+        for (const ShareRow& row : shareRows()) shares.emplace_back(row.name);
+        for (const UserShareRow& row : userShareRows()) shares.emplace_back(row.name);
         std::map<std::string, std::map<std::string, May>> samba;
         for (const char* user : kUserNames) samba[user] = smbd.may(user, file, shares);
         const auto compare = [&](const ShareRow& row, std::initializer_list<const char*> whom) {
@@ -481,11 +406,11 @@ TEST_F(SambaOracle, NobodyMayMoreThanInSamba) {
             }
             EXPECT_EQ(anyLess, *row.narrower != '\0') << row.name << " is named as narrower without need";
         };
-        for (const ShareRow& row : kShareRows) {
+        for (const ShareRow& row : shareRows()) {
             compare(row, {"alice", "bob", "carol", "dave", "erin", "frank", "gina", "hugo", "ivan", "judy"});
         }
-        for (const UserShareRow& row : kUserShareRows) compare({row.name, ""}, {"alice", "bob", "dave", "judy"});
-        compare({"u-link", ""}, {"alice"});
+        for (const UserShareRow& row : userShareRows()) compare({row.name, "", ""}, {"alice", "bob", "dave", "judy"});
+        compare({"u-link", "", ""}, {"alice"});
         // Homes are named after their users in Samba; here everybody has one, and no name leads to another's.
         setSetting("userhome_enable", "yes");
         for (const std::string user : {"alice", "hugo", "judy"}) {

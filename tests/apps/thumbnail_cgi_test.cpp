@@ -4,6 +4,7 @@
 
 #include "apps/cgi_test.h"
 #include "base/descriptor.h"
+#include "support/table.h"
 #include "thumbnail/sandbox.h"
 
 namespace {
@@ -67,16 +68,7 @@ TEST_F(ThumbnailCgi, EachKindIsDrawnSmallAndUpright) {
     writeFile(at("a.pdf"), kDocument, 0644);
     fs::copy_file(at("a.png"), at("named.txt"));
     for (const auto& [name, more, type, extent] :
-         Rows<std::string, std::string, std::string, std::string>{{"a.png", "", "image/webp", "256x128"},
-                                                                  {"a.jpg", "&size=100", "image/webp", "128x64"},
-                                                                  {"a.webp", "&size=512", "image/webp", "512x256"},
-                                                                  {"a.gif", "&size=1024", "image/webp", "320x160"},
-                                                                  {"a.tif", "", "image/webp", "256x128"},
-                                                                  {"a.heic", "", "image/webp", "256x128"},
-                                                                  {"a.avif", "", "image/webp", "256x128"},
-                                                                  {"named.txt", "", "image/webp", "256x128"},
-                                                                  {"turned.jpg", "", "image/webp", "128x256"},
-                                                                  {"a.pdf", "", "image/png", "256x128"}}) {
+         rowsOf<std::string, std::string, std::string, std::string>("apps/thumbnails")) {
         SCOPED_TRACE(name);
         const RawReply reply = fetch(name, more);
         ASSERT_EQ(reply.status, 200) << reply.body;
@@ -119,15 +111,7 @@ TEST_F(ThumbnailCgi, Refusals) {
     writeFile(at("bare.jpg"), "\xFF\xD8\xFF", 0644);
     writeFile(at("bare.pdf"), "%PDF-1.4", 0644);
     makeFolder(at("folder.jpg"), 0755);
-    for (const auto& [name, more, status] : Rows<std::string, std::string, int>{{"text.jpg", "", 415},
-                                                                                {"bare.jpg", "", 415},
-                                                                                {"bare.pdf", "", 415},
-                                                                                {"huge.png", "", 415},
-                                                                                {"folder.jpg", "", 415},
-                                                                                {"missing.jpg", "", 404},
-                                                                                {"a.png", "&size=0", 400},
-                                                                                {"a.png", "&size=1025", 400},
-                                                                                {"a.png", "&size=x", 400}}) {
+    for (const auto& [name, more, status] : rowsOf<std::string, std::string, int>("apps/thumbnail_refusals")) {
         EXPECT_EQ(fetch(name, more).status, status) << name << more;
     }
 }

@@ -2,6 +2,7 @@
 #include "apps/task_fixture.h"
 #include "platform/private_mounts.h"
 #include "support/refuse_calls.h"
+#include "support/table.h"
 
 namespace {
 
@@ -105,35 +106,9 @@ TEST_F(TaskCgi, SourcesAndTargetsAreJudged) {
     give(photo_ + "/a");
     writeFiles(photo_, {"/case/Name", "/case/name", "/case/q?"});
     fs::create_symlink("/etc", photo_ + "/out");
-    struct {
-        const char *user, *form;
-        int code;            // of the request
-        const char* errors;  // of the task
-    } const cases[] = {
-        {"bob", "action=copy&path=/video/x&target=/photo", 407, ""},
-        {"alice", "action=copy&path=/photo/a&target=/photo/out", 407, ""},
-        {"alice", "action=copy&path=/photo/a&target=/photo/none", 408, ""},
-        {"alice", "action=copy&path=/photo/a&target=/photo/a/b/f", 408, ""},
-        {"alice", "action=copy&path=/photo/a&target=/video&conflict=maybe", 400, ""},
-        {"alice", "action=copy&path=/photo/a&target=/photo/a/b", 0, "/photo/a 1005\n"},
-        {"alice", "action=move&path=/photo/a&target=/photo/a", 0, "/photo/a 1005\n"},
-        {"alice", "action=copy&path=/photo/a&target=/photo", 0, "/photo/a 414\n"},
-        {"alice", "action=copy&path=/photo/a&target=/photo&conflict=overwrite", 0, "/photo/a 1005\n"},
-        {"alice", "action=copy&path=/photo/a&target=/photo&conflict=keep_both", 0, ""},
-        {"alice", "action=copy&path=/photo/out/passwd&target=/video", 0, "/photo/out/passwd 407\n"},
-        {"alice", "action=copy&path=/photo&target=/video", 0, "/photo 400\n"},
-        {"alice", "action=copy&path=/locked/f&target=/video", 0, "/locked/f 407\n"},
-        {"alice", "action=copy&path=/fixed/f&target=/video", 0, ""},
-        {"alice", "action=copy&path=/photo/a/&target=/home", 0, ""},
-        {"carol", "action=copy&path=/photo/case/&path=/photo/out&target=/home", 0, ""},
-        {"alice", "action=move&path=/fixed/f&target=/video", 0, "/fixed/f 407\n"},
-        {"alice", "action=delete&path=/fixed/f", 0, "/fixed/f 407\n"},
-        {"bob", "action=delete&path=/photo/a/b/f", 0, "/photo/a/b/f 407\n"},
-        {"bob", "action=move&path=/photo/a&target=/video", 0, "/photo/a 407\n"},
-        {"alice", "action=copy&path=/photo/case&target=/usb&conflict=overwrite", 0, "/photo/case/name 414\n"},
-        {"alice", "action=copy&path=/photo/case/q?&target=/usb", 0, "/photo/case/q? 419\n"},
-    };
-    for (const auto& [user, form, refusal, expected] : cases) {
+    // Who asks for what, the code of the request, the errors of the task.
+    for (const auto& [user, form, refusal, expected] :
+         rowsOf<const char*, const char*, int, const char*>("apps/judged_transfers")) {
         SCOPED_TRACE(form);
         const CgiReply reply = ask(user, form);
         EXPECT_EQ(code(reply), refusal);

@@ -13,6 +13,7 @@
 #include "orvel/sharing_settings.h"
 #include "platform/private_mounts.h"
 #include "support/calls.h"
+#include "support/table.h"
 #include "vexo/filesystem.h"
 #include "vexo/index.h"
 #include "vexo/link_store.h"
@@ -23,61 +24,20 @@ namespace {
 // Path and content of what users see; and what else there is, by a name without "/".
 using Tree = std::map<std::string, std::string>;
 
-enum Given : unsigned { kNothing = 0, kLink = 1, kIndex = 2, kSearch = 4, kDeleted = 8 };
-
 // What is done. "LINK", "SEARCH" and "DELETED" stand for the ids of the link, the search and the deletion that are
-// there; orvelctl has no method.
+// there, where `given` names one; orvelctl has no method. A form without a type is the usual one.
 struct Work {
     const char *name, *program, *user, *method, *query, *body;
-    unsigned given = kNothing;
+    const char* given = "";
     bool again = true;  // whether it can be repeated after a failure
-    const char* type = "application/x-www-form-urlencoded";
+    const char* type = "";
 };
 
-constexpr const char* kForm =
-    "--b\r\nContent-Disposition: form-data; name=\"file\"; filename=\"formed\"\r\n\r\nby form\r\n--b--\r\n";
-
-const Work kWorks[] = {
-    {"upload", PROGRAM_UPLOAD, "alice", "PUT", "path=/photo/new", "uploaded"},
-    {"upload deep", PROGRAM_UPLOAD, "alice", "PUT", "path=/photo/x/y/new", "uploaded"},
-    {"upload over", PROGRAM_UPLOAD, "alice", "PUT", "path=/photo/old&overwrite=overwrite", "replaced"},
-    {"upload form", PROGRAM_UPLOAD, "alice", "POST", "path=/photo", kForm, kNothing, true,
-     "multipart/form-data; boundary=b"},
-    {"mkdir", PROGRAM_OPERATION, "alice", "POST", "", "action=mkdir&path=/photo/made"},
-    {"mkdir deep", PROGRAM_OPERATION, "carol", "POST", "", "action=mkdir&parents=true&path=/photo/x/y/z"},
-    {"rename", PROGRAM_OPERATION, "alice", "POST", "", "action=rename&path=/photo/old&name=other"},
-    {"copy", PROGRAM_OPERATION, "alice", "POST", "", "action=copy&conflict=skip&path=/photo/d&target=/video"},
-    {"copy over", PROGRAM_OPERATION, "alice", "POST", "",
-     "action=copy&conflict=overwrite&path=/photo/old&target=/video"},
-    {"move", PROGRAM_OPERATION, "alice", "POST", "", "action=move&path=/photo/d&target=/video", kNothing, false},
-    {"move over", PROGRAM_OPERATION, "alice", "POST", "",
-     "action=move&conflict=overwrite&path=/photo/old&target=/video", kNothing, false},
-    {"move afar", PROGRAM_OPERATION, "alice", "POST", "", "action=move&conflict=skip&path=/photo/d&target=/other",
-     kNothing, false},
-    {"delete", PROGRAM_OPERATION, "alice", "POST", "", "action=delete&path=/photo/d&path=/photo/old", kNothing, false},
-    {"delete for good", PROGRAM_OPERATION, "alice", "POST", "", "action=delete&permanent=true&path=/photo/d", kNothing,
-     false},
-    {"restore", PROGRAM_OPERATION, "alice", "POST", "", "action=restore&path=/photo/%23recycle/gone/f", kNothing,
-     false},
-    {"undo", PROGRAM_OPERATION, "alice", "POST", "", "action=undo&taskid=DELETED", kDeleted},
-    {"empty", PROGRAM_OPERATION, "alice", "POST", "", "action=empty&path=/photo", kNothing, false},
-    {"compress", PROGRAM_OPERATION, "alice", "POST", "", "action=compress&path=/photo/d&target=/video/d.zip"},
-    {"extract", PROGRAM_OPERATION, "alice", "POST", "", "action=extract&conflict=skip&path=/photo/a.zip&target=/video"},
-    {"search", PROGRAM_SEARCH, "alice", "POST", "", "action=start&path=/photo/d&type=file"},
-    {"forget search", PROGRAM_SEARCH, "alice", "POST", "", "action=clean&taskid=SEARCH", kSearch, false},
-    {"forget task", PROGRAM_OPERATION, "alice", "POST", "", "action=clear&taskid=Quorvane_copy_0", kNothing, false},
-    {"first link", PROGRAM_LINK, "alice", "POST", "", "action=create&path=/photo/d"},
-    {"link", PROGRAM_LINK, "alice", "POST", "", "action=create&path=/photo/d", kLink},
-    {"revoke", PROGRAM_LINK, "alice", "POST", "", "action=revoke&id=LINK", kLink},
-    {"log-in", PROGRAM_SHARE, "", "POST", "", "action=login&password=word", kLink},
-    {"setting", ORVELCTL, "", nullptr, "sharing set per_user", ""},
-    {"setting gone", ORVELCTL, "", nullptr, "sharing set everybody", ""},
-    {"choice", ORVELCTL, "", nullptr, "sharing set yes --user alice", ""},
-    {"choice gone", ORVELCTL, "", nullptr, "sharing set no --user bob", ""},
-    {"index build", ORVELCTL, "", nullptr, "index build photo", ""},
-    {"index update", ORVELCTL, "", nullptr, "index update photo", "", kIndex},
-    {"index drop", ORVELCTL, "", nullptr, "index drop photo", "", kIndex},
-};
+const std::vector<Work>& works() {
+    static const auto rows = recordsOf<Work, const char*, const char*, const char*, const char*, const char*,
+                                       const char*, const char*, bool, const char*>("apps/works");
+    return rows;
+}
 
 bool isHidden(const std::string& name) {
     return name == "@tmp" || name == "@vexoea" || name.starts_with(VEXO_PART_PREFIX);
@@ -115,7 +75,7 @@ class Unfinished : public TaskCgi {
     // What takes work to make is made once.
     void prepare() {
         lay({});
-        EXPECT_TRUE(run({"", PROGRAM_OPERATION, "alice", "POST", "", "action=compress&path=/photo/d&target=/video/z"}));
+        EXPECT_TRUE(run({"", "operation", "alice", "POST", "", "action=compress&path=/photo/d&target=/video/z"}));
         zip_ = readFile(video_ + "/z");
         VEXO::Link link;
         link.owner = "alice";
@@ -126,7 +86,7 @@ class Unfinished : public TaskCgi {
         link_ = link.id;
         links_ = readFile(linkDatabase_);
         lay({});
-        EXPECT_TRUE(run({"", ORVELCTL, "", nullptr, "index build photo", ""}));
+        EXPECT_TRUE(run({"", "orvelctl", "", nullptr, "index build photo", ""}));
         index_ = readFile(systemRoot() + kIndexFile);
     }
     // Everything as it is before the work.
@@ -152,13 +112,13 @@ class Unfinished : public TaskCgi {
         }
         laySystem(work.given);
     }
-    void laySystem(unsigned given) {
+    void laySystem(const std::string& given) {
         for (const char* rest : {".pending", ".pending.new"}) fs::remove(systemRoot() + kSettings + rest);
         setSetting("PX_SHARING_SETTING", "anybody");
         writeRootFile("/usr/vexo/etc/vexosharing.conf", std::to_string(support::kBobUid) + "=\"true\"\n");
         writeRootFile("/tmp/foldersharing.current.users", "10.0.0.9,alice,abcdefghijk,1,1,1,1,other\n");
-        if ((given & kLink) != 0) writeFile(linkDatabase_, links_, 0600);
-        if ((given & kIndex) != 0) {
+        if (given == "link") writeFile(linkDatabase_, links_, 0600);
+        if (given == "index") {
             support::makeFolder(fs::path(systemRoot() + kIndexFile).parent_path(), 0700);
             writeFile(systemRoot() + kIndexFile, index_, 0600);
             writeFile(photo_ + "/d/since", "since the index was built", 0666);
@@ -167,14 +127,13 @@ class Unfinished : public TaskCgi {
         EXPECT_TRUE(task != nullptr && task->finish());
         search_.clear();
         found_.clear();
-        if ((given & kDeleted) != 0) {
-            run({"", PROGRAM_OPERATION, "alice", "POST", "", "action=delete&path=/photo/d&path=/photo/old"});
+        if (given == "deletion") {
+            run({"", "operation", "alice", "POST", "", "action=delete&path=/photo/d&path=/photo/old"});
             Json::Value names(Json::arrayValue);
             EXPECT_TRUE(KTR::TaskMgr("alice").getAllTaskId("Quorvane_delete_", names) && names.size() == 1);
             deleted_ = names[0].asString();
         }
-        if ((given & kSearch) != 0)
-            run({"", PROGRAM_SEARCH, "alice", "POST", "", "action=start&path=/photo/d&type=file"});
+        if (given == "search") run({"", "search", "alice", "POST", "", "action=start&path=/photo/d&type=file"});
     }
     [[nodiscard]] Tree seen() const {
         Tree tree;
@@ -242,14 +201,15 @@ class Unfinished : public TaskCgi {
         };
         if (work.method == nullptr) {
             std::istringstream text(work.query);
-            std::vector<std::string> words = {work.program};
+            std::vector<std::string> words = {ORVELCTL};
             for (std::string word; text >> word;) words.push_back(word);
             return support::runProgram(words, variables);
         }
-        variables["CONTENT_TYPE"] = work.type;
+        variables["CONTENT_TYPE"] = *work.type == 0 ? "application/x-www-form-urlencoded" : work.type;
         variables["HTTP_FOLDER_SHARING"] = link_;
         variables["VEXO_GATE_MILLISECONDS"] = std::to_string(time_ += 1000000);  // nobody has to wait for a turn
-        return support::finishCgi(work.program, work.user, work.method, work.query, filled(work.body), variables);
+        return support::finishCgi(std::string(PROGRAMS) + "/" + work.program, work.user, work.method, work.query,
+                                  filled(work.body), variables);
     }
     // Strikes the n-th call that changes something (without an error), or the n-th of all.
     void order(long nth, int error) {
@@ -352,7 +312,7 @@ class Unfinished : public TaskCgi {
     void sweep(const Work& work, int error, int few, const char* only = "") {
         SCOPED_TRACE(work.name);
         only_ = only;
-        work_ = &work - kWorks;
+        work_ = &work - works().data();
         order(0, error);
         lay(work);
         const Tree before = seen();
@@ -415,14 +375,14 @@ TEST_F(Unfinished, IsNeverLostTornOrCalledDone) {
         prctl(PR_SET_CHILD_SUBREAPER, 1);
         prepare();
         for (const int error : extents.at(extent)) {
-            for (const Work& work : kWorks) {
+            for (const Work& work : works()) {
                 const bool whole = error == 0 && std::string(work.name).starts_with("upload");
                 if (only == nullptr || std::string(only) == work.name) sweep(work, error, whole ? 0 : few);
             }
             printf("%ld points so far\n", allPoints_);
         }
         // Where something lies decides whether it is thrown away, and where it comes back to.
-        for (const Work& work : kWorks) {
+        for (const Work& work : works()) {
             const std::string name = work.name;
             if (few > 0 && (name == "delete" || name == "restore")) sweep(work, EIO, 0, "readlink");
             if (few > 0 && name == "index build") sweep(work, EACCES, 0, "readdir");

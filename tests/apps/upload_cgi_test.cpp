@@ -5,6 +5,7 @@
 #include <sys/sysmacros.h>
 
 #include "apps/cgi_test.h"
+#include "support/table.h"
 
 namespace {
 
@@ -99,16 +100,7 @@ TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
     fs::create_symlink("/tmp", root + "/outside");
     fs::create_symlink("nowhere", root + "/dangling");
     const auto before = namesIn(root);
-    for (const auto& [user, path, expected] : Rows<std::string, std::string, int>{
-             row("bob", "/photo/x", 407), row("alice", "/photo/root's/x", 407), row("alice", "/nowhere/x", 408),
-             row("alice", "/photo", 414), row("alice", "/photo/pipe", 414), row("alice", "/photo/device", 414),
-             row("alice", "/photo/file/x", 408), row("alice", "/photo/outside/orveltest-x", 407),
-             row("alice", "/photo/../orveltest-x", 407), row("alice", "/home/../../../etc/passwd", 407),
-             row("alice", "/photo/../../etc/none", 407), row("alice", "/photo/new/@vexoea/x", 418),
-             row("alice", "/photo/@tmp", 418), row("alice", "/photo/folder/@tmp/x", 418),
-             row("alice", "/photo/hidden/x", 418), row("alice", "/photo/.vexo-part-x", 418),
-             row("alice", "/usb/new*/b", 419), row("alice", "/photo/new/" + std::string(256, 'n') + "/x", 412),
-             row("alice", "", 400)}) {
+    for (const auto& [user, path, expected] : rowsOf<std::string, std::string, int>("apps/refused_uploads")) {
         for (const char* mode : {"error", "overwrite"}) {
             const bool shareRoot = path == "/photo" && *mode == 'o';
             EXPECT_EQ(code(put(user, path, "data", mode)), shareRoot ? 400 : expected) << path << mode;

@@ -2,7 +2,7 @@
 
 #include "orvel/privilege_reason.h"
 #include "support/fault_sweep.h"
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
 
@@ -132,22 +132,7 @@ TEST_F(PrivilegeTest, Uploads) {
         writeFile(shareRoot("") + folder + "/there", "x");
     }
     for (const auto& [path, user, mode, granted, modeAfter, code, log] :
-         Rows<const char*, const char*, int, bool, int, int, const char*>{
-             {"/photo/new", "alice", 0, true, 0, 7, ""},
-             {"/photo/there", "alice", 1, true, 1, 7, ""},
-             {"/photo/there", "alice", 0, false, 0, 414, "orveldir:# Share no modify privilege, path=/photo/there"},
-             {"/photo/new", "bob", 0, false, 0, 407, "orveldir:# Share no upload privilege, path=/photo/new"},
-             {"/drop/there", "alice", 0, true, 2, 7, ""},
-             {"/quiet/there", "alice", 1, true, 2, 7, ""},
-             {"/quiet/there", "carol", 1, true, 1, 7, ""},  // an administrator is free of the mask
-             {"/none/x", "alice", 0, false, 0, 408,
-              "orveldir(#): VEXOShareGet none fail\norveldir:# Failed to get privilege, path= /none/x, reason=[408] "},
-             {nullptr, "alice", 0, false, 0, 400, ""},
-             {"/home/x", nullptr, 0, false, 0, 400, "orveldir:# Failed to get path info:/home/x, reason=[190]"},
-             {"/home/x", nullptr, 2, true, 2, 7, ""},
-             {"/home/new", "bob", 0, true, 0, 7, ""},
-             {"/home/there", "bob", 0, false, 0, 414, "orveldir:# Share no modify privilege, path=/home/there"},
-         }) {
+         rowsOf<const char*, const char*, int, bool, int, int, const char*>("core/upload_privileges")) {
         SCOPED_TRACE(std::string(path != nullptr ? path : "null") + " mode " + std::to_string(mode));
         OrvLibSetErr(7);
         auto changed = static_cast<_tag__type_>(mode);

@@ -1,6 +1,6 @@
 #include "orvel/privilege.h"
 #include "support/fault_sweep.h"
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
 
@@ -22,16 +22,8 @@ class ShareListTest : public ApplianceTest {
 };
 
 TEST_F(ShareListTest, OnlyTheListsDecide) {
-    for (const auto& [user, sort, writable, expected] : Rows<const char*, int, int, const char*>{
-             {"alice", 0, 0, "photo|homes|Zoo|attic|"},
-             {"alice", 1, 0, "attic|homes|photo|Zoo|"},
-             {"alice", 7, 1, "homes|photo|Zoo|"},
-             {"bob", 1, 0, "attic|cave|homes|photo|Zoo|"},
-             {"bob", 0, 1, "homes|cave|"},
-             {"carol", 0, 0, "homes|"},  // an administrator is nothing special here
-             {"fay@corp", 0, 0, "dune|"},
-             {"", 0, 0, ""},
-         }) {
+    for (const auto& [user, sort, writable, expected] :
+         rowsOf<const char*, int, int, const char*>("core/share_lists")) {
         OrvLibSetErr(7);
         EXPECT_EQ(names(OrvLibValidShareGen(user, sort, writable)), expected) << user << sort << writable;
         EXPECT_EQ(OrvLibGetErr(), 0);

@@ -2,7 +2,7 @@
 
 #include <climits>
 
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
 
@@ -76,16 +76,8 @@ TEST_F(SharePathTest, SharesResolve) {
 
 TEST_F(SharePathTest, RefusedPaths) {
     // `share`: what the output holds afterwards.
-    for (const auto& [path, user, code, share, log] : Rows<const char*, const char*, int, const char*, const char*>{
-             {nullptr, "alice", 400, "unset", ""},
-             {"", "alice", 400, "unset", ""},
-             {"/photo", "", 400, "unset", ""},
-             {"photo", "alice", 401, "unset", "orveldir(#): bad path name=photo\norveldir:# OrvLibGetTokOfPath fail"},
-             {"//", "alice", 401, "unset", "orveldir(#) error path\norveldir:# OrvLibGetTokOfPath fail"},
-             {"/nowhere/x", "alice", 408, "nowhere", "orveldir:# VEXOShareGet fail"},
-             {"/home", "nobody", 403, "home",
-              "orveldir:# Failed to get user (nobody)\norveldir:# OrvUserHomeFullPathGet fail"},
-         }) {
+    for (const auto& [path, user, code, share, log] :
+         rowsOf<const char*, const char*, int, const char*, const char*>("core/refused_paths")) {
         const Resolved out = resolve(path, user);
         EXPECT_EQ(out.result, 0);
         EXPECT_EQ(OrvLibGetErr(), code) << log;

@@ -1,6 +1,6 @@
 #include "orvel/upload_check.h"
 
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
 
@@ -58,15 +58,7 @@ TEST_F(UploadCheckTest, CheckedInOrder) {
     makeFolder(root + "/closed", 0755);
     addShare("fixed", "read only = no\nvexo:restriction = 2\n");
     for (const auto& [user, path, before, result, switched, log, after] :
-         Rows<const char*, const char*, int, int, bool, const char*, int>{
-             row("alice", "photo", 0, 401, false, "Failed to get fullpath of: photo", 0),
-             row("alice", "/none/a", 0, 408, false, "Failed to get fullpath of: /none/a", 0),
-             row(nullptr, "/photo/a", 0, 400, false, "Failed to get fullpath of: /photo/a", 0),
-             row("bob", "/photo/a", 0, 407, false, "No upload privilege to path /photo/a", 0),
-             row("alice", "/photo/there", 0, 414, false, "No upload privilege to path /photo/there", 0),
-             row("alice", "/photo/there", 2, 0, true, "", 2), row("alice", "/photo/new/deeper/a", 0, 0, true, "", 0),
-             row("alice", "/photo/closed/a", 0, 407, true, "reason=[197]", 0),
-             row("alice", "/fixed/a", 0, 0, true, "", 2), row("alice", "/home/a", 0, 0, true, "", 0)}) {
+         rowsOf<const char*, const char*, int, int, bool, const char*, int>("core/checked_files")) {
         SCOPED_TRACE(path);
         int mode = before;
         inChild([&, path = path, user = user, result = result, switched = switched, log = log, after = after] {

@@ -1,7 +1,7 @@
 #include <json/value.h>
 
 #include "orvel/file_info.h"
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
 
@@ -19,18 +19,7 @@ TEST_F(PathInfoTest, TrailingSlashesGo) {
 
 TEST_F(PathInfoTest, FailuresLeaveBothNumbers) {
     for (const auto& [user, path, code, platform, kept, log] :
-         Rows<const char*, const char*, int, int, std::string, const char*>{
-             {nullptr, "/photo", 400, 0x0D00, "", ""},
-             {"alice", "", 400, 0x0D00, "", ""},
-             {"", "/photo", 400, 0x0D00, "/photo", "orvelenum:# Fail to get the Full Path, /photo"},
-             {"alice", "/none//", 408, 0xBE00, "/none",
-              "orveldir:# VEXOShareGet fail\norvelenum:# Fail to get the Full Path, /none//"},
-             {"alice", "///", 401, 0x8000, "///",
-              "orveldir(#) error path\norveldir:# OrvLibGetTokOfPath fail\norvelenum:# Fail to get the Full Path, ///"},
-             {"nobody", "/home/x", 403, 0x8000, "/home/x",
-              "orveldir:# Failed to get user (nobody)\norveldir:# OrvUserHomeFullPathGet fail\norvelenum:# Fail to get "
-              "the Full Path, /home/x"},
-         }) {
+         rowsOf<const char*, const char*, int, int, std::string, const char*>("enum/path_failures")) {
         PathInfo info;
         EXPECT_FALSE(PathInfoFactory::create(user, path, info)) << path;
         EXPECT_EQ(OrvLibGetErr(), code) << path;

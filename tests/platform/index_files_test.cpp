@@ -85,19 +85,6 @@ TEST_F(IndexFilesTest, DamagedDatabasesDoNoHarm) {
     EXPECT_GT(refused, 0);
 }
 
-// A search that has nothing more to insert for long, and is killed then.
-TEST_F(IndexFilesTest, ResultsAreSeenWhileTheSearchGoesOnAndAfterItDies) {
-    const pid_t child = fork();
-    if (child == 0) {
-        for (int i = 0; i < 1000; ++i) insert(db_, {.path = "a" + std::to_string(i)});
-        pause();
-    }
-    EXPECT_TRUE(waitUntil("all its results", [&] { return select(db_).size() == 1000; }));
-    kill(child, SIGKILL);
-    waitpid(child, nullptr, 0);
-    EXPECT_EQ(select(db_).size(), 1000U);
-}
-
 // A writer that dies half-way through a large commit: its journal is played back, by readers of a share's index too.
 TEST_F(IndexFilesTest, HalfACommitIsTakenBack) {
     std::vector<Record> records(3000, {.path = "", .size = 1});

@@ -2,7 +2,7 @@
 #include "shares/share_definitions.h"
 
 #include "shares/share_options.h"
-#include "support/testing.h"
+#include "support/table.h"
 #include "vexo/share.h"
 
 namespace {
@@ -78,42 +78,6 @@ std::optional<Sections> samba(const std::string& file) {
     return out;
 }
 
-// Included files are named "@/...", for the test's folder.
-const char* const kAlike[] = {
-    // keys without case and blanks
-    "[photo]\nPATH = /v/p\n V A L I D\tusers=alice\nReadOnly = no\n  WRITE   list = w\nBrowseAble=No\n"
-    "invalidusers = i\nREADLIST = r\n",
-    // lists
-    "[photo]\npath = /v/p\nvalid users = alice, \"bob smith\";carol\t+grp &net @\"Domain Users\" fo\"o b\"ar\n"
-    "read list = a\"\"b \"c,d\" \"e;f\" \"g\th\" @\"DOM\\x y\" \"q\"w\"e r\"t\nwrite list = a,,b ; c ,\n"
-    "invalid users = \"\" x\n[music]\npath = /v/m\ninvalid users = \"unterminated x, y\nvalid users = ,;\n"
-    "read list = \"\"\nwrite list = 'x y' z\\,w\n",
-    // comments, continued lines, carriage returns and blanks
-    "; c\n# c\n[photo] # rest\npath = \\\n  /v/p\n# comment \\\nvalid users = x\\\n; y \\\t \n z\n   ; c \\\n"
-    "read list = a \\\n  b,\\\nc\\\n\\\n d\n\\\nwrite list = w\\x\\\\y\\\n[music]\npath = /v/m\\\nu\nread list = q\\",
-    "[photo]\r\npath = /v/p  \t q\tr\r\nvalid users = x \\\r\n y\r\n \t [two  words] path = /v/no\r\n\tpath\t=\t/v/t\t",
-    // sections merge, and start from what was global by then
-    "read only = no\nvalid users = g\n[a]\npath = /v/a\n[global]\nread only = yes\nread list = r\n[b]\npath = /v/b\n"
-    "valid users =\n[A]\nwrite list = w\n[G lobals]\nbrowseable = no\n[c]\npath = /v/c\n[B]\npath = /v/b2\n",
-    // copies
-    "[t]\navailable = no\npath = /v/t\nvalid users = t1 t2\nread only = no\n[a]\nread only = yes\ncopy = T\n"
-    "path = /v/a\nvalid users =\n[b]\npath = /v/b\navailable = yes\nread list = y\nwrite list = w\n[c]\ncopy = t\n"
-    "copy = b\npath = /v/c\n[global]\ninvalid users = late\n[d]\ninvalid users = own\ncopy = c\n[e]\npath = /v/e\n",
-    // synonyms
-    "[a]\npath = /v/a\nwriteable = yes\n[b]\ndirectory = /v/b\nwritable = 1\n[c]\npath = /v/c\nwrite ok = TRUE\n"
-    "browsable = 0\n[d]\npath = /v/d\nread only = oN\navailable = Off\n[e]\npath = /v/e\nwriteable = no\n"
-    "read only = off\n[f]\npath = /v/f\nread only = off\nwriteable = False\n",
-    // values are texts
-    "[a]\npath = /v/a ; no comment\n[b]\npath = /v/b # neither\n[c]\npath = \"/v/c c\"\n[d]\npath = /v//d/\n[e]\n"
-    "path = /v/%U\n[f]\npath = /v/x=y\nread list = \"a=b\" c=d\nunknown key = 1\nvexo:restriction = 0x4\n",
-    // names of any script, without case
-    "[\xC3\xA9t\xC3\xA9]\npath = /v/e\nvalid users = \xC3\xA9ric\n[\xC3\x89T\xC3\x89]\nread list = z\n"
-    "[\xD0\x9C\xD0\xB8\xD1\x80]\npath = /v/\xD0\xBC\n",
-    // an included file goes on where it is included, and leaves its last section open
-    "[a]\npath = /v/a\ninclude = @/users.conf\nread list = after\n[b]\npath = /v/b\nInclude = @/sections.conf\n"
-    "write list = inner\n[global]\ninclude = @/users.conf\n[c]\npath = /v/c\n",
-};
-
 // Samba refuses the whole file; here the sections listed are sound.
 const Rows<std::string, std::set<std::string>> kRefusedBySamba = {
     {"[a]\npath = /v/a\n[b]\npath = /v/b\nread only = maybe\n[c]\npath = /v/c\n", {"a", "c"}},
@@ -137,7 +101,8 @@ TEST_F(SambaGrammar, ReadsAlike) {
             return fs::exists(file) ? std::optional(readFile(file)) : std::nullopt;
         });
     };
-    for (std::string text : kAlike) {
+    // Included files are named "@/...", for the test's folder.
+    for (auto [text] : rowsOf<std::string>("platform/samba_grammar")) {
         const Sections mine = ours(read(text));
         EXPECT_TRUE(!hasOracle || samba(folder + "/smb.conf") == mine) << text;
     }
@@ -163,23 +128,7 @@ vexo::ShareReading read(const std::string& text, std::string before = {}) {
 }
 
 TEST(ShareSection, MalformedOnesSayWhy) {
-    for (const auto& [text, fault] : Rows<std::string, const char*>{
-             {"path =\n", "no path"},
-             {"path = volume1/photo\n", "is not that of a folder"},
-             {"path = //\n", "is not that of a folder"},
-             {"path = /volume1/..\n", "is not that of a folder"},
-             {"path = /volume1/" + std::string(256, 'x') + "\n", "is not that of a folder"},
-             {std::string("path = /volume1/a\0b\n", 20), "a zero or control byte"},
-             {"path = /v/p\nvexo:index =\n", "neither yes nor no"},
-             {"path = /v/p\nvexo:restriction = -1\n", "is no number"},
-             {"path = /v/p\nvexo:restriction = 4294967296\n", "is no number or too large"},
-             {"path = /v/p\nvexo:ftp = 2147483648\n", "is no number or too large"},
-             {"path = /v/p\nvalid users alice\n", "neither"},
-             // What is not offered is no fault.
-             {"available = no\n", ""},
-             {"printable = yes\npath = /var/tmp\n", ""},
-             {"print ok = 1\nread only = ?\n", ""},
-         }) {
+    for (const auto& [text, fault] : rowsOf<std::string, const char*>("platform/malformed_shares")) {
         const vexo::ShareReading reading = read(text);
         EXPECT_FALSE(reading.share.has_value()) << text;
         EXPECT_NE(reading.fault.find(fault), std::string::npos) << text << reading.fault;

@@ -1,7 +1,7 @@
 // Shares on a running appliance: records, rights from the lists, files that change, homes.
 #include "vexo/share.h"
 
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
 
@@ -255,7 +255,7 @@ TEST_F(ShareTest, HomesThatAreInNoShare) {
 // Options that keep somebody out and are not honoured, those that are not known among them, close a share, and nothing
 // else does.
 TEST_F(ShareTest, WhatClosesAShare) {
-    const auto stateOf = [&](const std::string& options, const std::string& global = "") {
+    const auto stateOf = [&](const std::string& options, const std::string& global) {
         define("[global]\n" + global + "[s]\npath = /srv/samba/team\n" + options);
         const std::string root = rootOf("s");
         std::string closing;
@@ -264,54 +264,10 @@ TEST_F(ShareTest, WhatClosesAShare) {
         EXPECT_EQ(root.empty(), begin != std::string::npos) << options << closing;
         return begin == std::string::npos ? "" : closing.substr(begin + 11, closing.find(" = ", begin) - begin - 11);
     };
-    for (const auto& [options, closing] : Rows<const char*, const char*>{
-             {"", ""},
-             {"hosts allow = 192.168.1.\n", "line 4: hosts allow"},
-             {"comment = x\nallow hosts = 10.\n", "line 5: hosts allow"},
-             {"hosts allow = ALL\nhosts deny =\n", ""},
-             {"hosts allow = 10.\nvexo:ignore = Hosts Allow\n", ""},
-             {"hosts allow = 10.\nvexo:ignore = hosts deny, allowhosts; force user\nforce user = x\n", ""},
-             {"hosts allow = 10.\nvexo:ignore = hosts deny\n", "line 4: hosts allow"},
-             {"force user = nobody\n", "line 4: force user"},
-             {"force group = team\ncreate mask = 0600\nadmin users = bob\nguest ok = yes\nwide links = yes\n", ""},
-             {"guest only = no\nhide unreadable = no\nfollow symlinks = yes\npreexec close = 0\n", ""},
-             {"only guest = yes\n", "line 4: guest only"},
-             {"hide unreadable = yes\n", "line 4: hide unreadable"},
-             {"hide unreadable = perhaps\n", "line 4: hide unreadable"},
-             {"hide new files timeout = 0\n", ""},
-             {"hide new files timeout = 5\n", "line 4: hide new files timeout"},
-             {"follow symlinks = no\n", "line 4: follow symlinks"},
-             {"veto files = /@tmp/\n", ""},
-             {"veto files = /@tmp/*.exe/\n", ""},
-             {"veto files = /%U/\n", "line 4: veto files"},
-             {"vfs objects = fruit streams_xattr, recycle\nfruit:model = X\nrecycle:keeptree = yes\n", ""},
-             {"vfs objects = recycle acl_xattr\n", "line 4: vfs objects"},
-             {"worm:grace_period = 5\n", "line 4: worm:grace_period"},
-             {"smb encrypt = desired\n", ""},
-             {"smb encrypt = mandatory\n", "line 4: server smb encrypt"},
-             {"some new option = 1\n", "line 4: some new option"},
-             {"vexo:restrict = 7\n", "line 4: vexo:restrict"},
-             {"valid users = %D\\alice\n", "line 4: valid users"},
-             {"invalid users = &staff\n", "line 4: invalid users"},
-             {"path = /srv/%m\n", "line 4: path"},
-             {"include = /etc/samba/%m.conf\n", "line 4: include"}}) {
-        EXPECT_EQ(stateOf(options), closing) << options;
-    }
-    // What [global] says counts below it, and some of it everywhere.
-    for (const auto& [global, options, closing] : Rows<const char*, const char*, const char*>{
-             {"workgroup = W\nserver role = standalone server\nlog file = x\nmap to guest = bad user\n", "", ""},
-             {"force user = x\n", "", "line 2: force user"},
-             {"force user = x\n", "force user =\n", ""},
-             {"hosts allow = 10.\n", "hosts allow =\n", "line 2: hosts allow"},
-             {"hosts allow = 10.\n", "vexo:ignore = hosts allow\n", ""},
-             {"vexo:ignore = hosts allow\nhosts allow = 10.\n", "", ""},
-             {"", "[global]\nhosts deny = ALL\n", "line 5: hosts deny"},
-             {"", "[global]\nroot directory = /chroot\n", "line 5: root directory"},
-             {"config backend = registry\n", "", "line 2: config backend"},
-             {"config backend = file\n", "", ""}}) {
+    for (const auto& [global, options, closing] :
+         rowsOf<std::string, std::string, std::string>("platform/closed_shares")) {
         EXPECT_EQ(stateOf(options, global), closing) << global << options;
     }
-    EXPECT_EQ(stateOf("", "include = registry\n"), "line 2: include");
     define(
         "[t]\npath = /srv/t\nforce user = x\n[s]\ncopy = t\npath = /srv/s\n[u]\ncopy = t\nforce user =\npath = "
         "/srv/u\n");

@@ -1,6 +1,6 @@
 #include "orvel/search_criteria.h"
 
-#include "support/testing.h"
+#include "support/table.h"
 
 using namespace FileSearch;
 
@@ -46,16 +46,8 @@ std::string textOf(const __tag_FI_SQL_COND* node) {
 class CriteriaTest : public ApplianceTest {};
 
 TEST_F(CriteriaTest, ArgumentsAndResultsOfEachField) {
-    const char* const kNone = nullptr;
-    for (const auto& [field, op, value, result, code, added] : Rows<int, const char*, const char*, bool, int, size_t>{
-             row(0, "x", kNone, false, 400, size_t{0}), row(1, "DIR", kNone, true, 0, size_t{1}),
-             row(1, "File", kNone, true, 0, size_t{1}), row(1, "link", kNone, true, 0, size_t{0}),
-             row(1, kNone, "dir", false, 400, size_t{0}), row(2, kNone, "jpg", true, 0, size_t{2}),
-             row(3, kNone, "nobody-here", false, 403, size_t{0}), row(4, kNone, "nobody-here", false, 404, size_t{0}),
-             row(5, kNone, "1", false, 400, size_t{0}), row(5, "before", kNone, false, 400, size_t{0}),
-             row(6, "", "", true, 0, size_t{1}), row(7, "after", "no number", true, 0, size_t{1}),
-             row(8, kNone, "1", false, 400, size_t{0}), row(9, kNone, "x", true, 0, size_t{0}),
-             row(9, "x", kNone, false, 400, size_t{0}), row(-1, kNone, "x", true, 0, size_t{0})}) {
+    for (const auto& [field, op, value, result, code, added] :
+         rowsOf<int, const char*, const char*, bool, int, size_t>("search/fields")) {
         SCOPED_TRACE(std::to_string(field) + " " + (op ? op : "-") + " " + (value ? value : "-"));
         Criteria criteria;
         OrvLibSetErr(0);
@@ -117,24 +109,9 @@ TEST_F(CriteriaTest, ComparesTheLastComponent) {
 }
 
 TEST_F(CriteriaTest, SizesAndTypes) {
-    constexpr int64_t kMax = INT64_MAX;
     using Sizes = std::vector<int64_t>;
     for (const auto& [op, value, condition, matching, others] :
-         Rows<const char*, const char*, const char*, Sizes, Sizes>{
-             {"equal", "100", "7.2.105(7.5.95)", {95, 100, 104}, {94, 105}},
-             {"equal", "10", "7.2.11(7.5.9)", {9, 10}, {8, 11}},
-             {"equal", "0", "7.2.1(7.5.0)", {0}, {1}},
-             {"equal",
-              "18446744073709551615",
-              "7.2.9223372036854775807(7.5.8762203435012037017)",
-              {kMax - 1},
-              {0, kMax}},
-             {"less", "100", "7.2.100", {0, 99}, {100}},
-             {"Less", "100", "7.4.100", {101}, {99, 100}},
-             {"", "ten", "7.4.0", {1}, {0}},
-             {"greater", "9223372036854775807", "7.4.9223372036854775807", {}, {0, kMax}},
-             {"less", "-1", "7.2.9223372036854775807", {0, kMax - 1}, {}},  // counts as the largest
-         }) {
+         rowsOf<const char*, const char*, const char*, Sizes, Sizes>("search/sizes")) {
         SCOPED_TRACE(std::string(op) + " " + value);
         Criteria criteria;
         ASSERT_TRUE(criteria.add(8, op, value));

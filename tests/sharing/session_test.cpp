@@ -2,10 +2,14 @@
 #include <sys/sysinfo.h>
 
 #include "platform/private_mounts.h"
+#include "platform/trust.h"
 #include "sharing/critical_section.h"
 #include "sharing/login_add.h"
+#include "sharing/login_record.h"
 #include "sharing/visitor_fixture.h"
 #include "support/fault_sweep.h"
+#include "support/race.h"
+#include "support/table.h"
 
 extern "C" {
 int sysinfo(struct sysinfo* info) noexcept {
@@ -47,29 +51,7 @@ TEST_F(SessionTest, WhatACheckAnswersAndLeavesInTheFile) {
     const std::string carol = "10.0.0.5,carol,s1,5,99999,1,0,L\n", carolNow = "10.0.0.5,carol,s1,5,100000,2,0,L\n";
     const std::string stale = "10.0.0.5,alice,s1,5,99099,1,0,L\n";
     for (const auto& [what, before, flags, keep, answer, after, name] :
-         Rows<const char*, std::string, int, int, int, std::string, std::string>{
-             row("a user", alice + kOther, 3, 0, 1, aliceNow + kOther, "alice"),
-             row("an administrator", carol, 3, 0, 2, carolNow, "carol"),
-             row("an administrator as a user", carol, 2, 0, 1, carolNow, "carol"),
-             row("a user where only administrators count", alice, 1, 0, -2, aliceNow, "alice"),
-             row("the time of access kept", alice, 3, 1, 1, "10.0.0.5,alice,s1,5,99999,2,0,L\n", "alice"),
-             row("just fresh", "10.0.0.5,alice,s1,5,99100,1,0,L\n", 3, 0, 1, aliceNow, "alice"),
-             row("just stale", stale + kOther, 3, 0, -1, kOther, "alice"),
-             row("stale, but kept", stale, 3, 1, -1, "10.0.0.5,alice,s1,5,99099,2,0,L\n", "alice"),
-             row("never stale", "10.0.0.5,alice,s1,5,1,1,7,L\n", 3, 0, 1, "10.0.0.5,alice,s1,5,100000,2,7,L\n",
-                 "alice"),
-             row("of others: stale, fresh, never stale", "a,u,x,5,99099,1,0,L\na,u,x,5,99100,1,0,K\na,u,x,5,0,1,1,M\n",
-                 3, 0, -2, "a,u,x,5,99100,1,0,K\na,u,x,5,0,1,1,M\n", ""),
-             row("another link", "10.0.0.5,alice,s1,5,99999,1,0,K\n", 3, 0, -2, "10.0.0.5,alice,s1,5,99999,1,0,K\n",
-                 ""),
-             row("another address, stale", "10.0.0.6,alice,s1,5,99099,1,0,L\n" + kOther, 3, 1, -2, kOther, ""),
-             row("a deleted user", "10.0.0.5,zed,s1,5,99999,1,0,L\n" + kOther, 3, 0, -2, kOther, "zed"),
-             row("an account that ended", "10.0.0.5,gone,s1,5,99999,1,0,L\n", 3, 0, -2, "", "gone"),
-             row("the last match decides", carol + alice, 3, 0, 1, carolNow + aliceNow, "alice"),
-             row("a deleted user decides nothing", alice + "10.0.0.5,zed,s1,5,99999,1,0,L\n", 3, 0, 1, aliceNow, "zed"),
-             row("no records in between", "torn,li\n" + alice + std::string("\0\1\xFF\n", 4) + kOther + "10.0.0.5,al",
-                 3, 0, 1, aliceNow + kOther, "alice"),
-             row("an empty file", "", 3, 0, -2, "", "")}) {
+         rowsOf<const char*, std::string, int, int, int, std::string, std::string>("sharing/checks")) {
         SCOPED_TRACE(what);
         writeRecords(before);
         unsetenv("USERNAME");
@@ -142,44 +124,59 @@ TEST_F(SessionTest, RefusedBeforeAnyRecordIsRead) {
 }
 
 TEST_F(SessionTest, PlantedFiles) {
-    const std::string record = path(orvel::kRecordFile), temporary = path(orvel::kRecordTemporary),
-                      lock = path(orvel::kRecordLock);
-    const std::string victim = path("/etc/victim"), good = "10.0.0.5,alice,s1,5,99999,1,0,L\n";
-    writeFile(victim, good);
-    const auto plants = std::vector<std::pair<const char*, std::function<void(const std::string&)>>>{
-        {"link", [&](const std::string& at) { fs::create_symlink(victim, at); }},
-        {"second name", [&](const std::string& at) { fs::create_hard_link(victim, at); }},
-        {"pipe", [](const std::string& at) { mkfifo(at.c_str(), 0666); }},
-        {"folder", [](const std::string& at) { fs::create_directory(at); }},
-        {"writable by the group", [&](const std::string& at) { writeFile(at, good, 0620); }},
-        {"writable by others", [&](const std::string& at) { writeFile(at, good, 0602); }},
-        {"another's",
-         [&](const std::string& at) {
-             writeFile(at, good, 0600);
-             if (chown(at.c_str(), kBobUid, kUsersGid) != 0) chmod(at.c_str(), 0666);
-         }},
-    };
-    for (const auto& [what, plant] : plants) {
-        SCOPED_TRACE(what);
-        plant(record);
-        EXPECT_EQ(check(), -2);
+    const std::string record = path(orvel::kRecordFile), temporary = path(orvel::kRecordTemporary);
+    const std::string good = "10.0.0.5,alice,s1,5,99999,1,0,L\n";
+    const auto refused = [&] {
         std::string session;
+        EXPECT_EQ(check(), -2);
         EXPECT_FALSE(orvel::addLoginRecord("alice", session, 0, "L"));
-        const bool isFolder = fs::is_directory(record);
-        fs::remove(record);
-        writeRecords(good);
-        plant(temporary);
+    };
+    plantEach(record, refused, good);
+    writeRecords(good);
+    const auto replaced = [&] {
+        const bool isFolder = fs::is_directory(temporary);
         if (isFolder) announceLog("file open error, reason=Is a directory");
         EXPECT_EQ(check(), isFolder ? -4 : 1);
         const struct stat status = statusOf(record);
         EXPECT_TRUE(S_ISREG(status.st_mode) && (status.st_mode & 07777) == 0600 && status.st_nlink == 1);
-        fs::remove(lock);
-        plant(lock);
+    };
+    plantEach(temporary, replaced, good);
+    const auto shut = [&] {
         announceLog("VexoCgiBeginCriticalSection Failed.");
         EXPECT_EQ(check(), -2);
-        EXPECT_EQ(readFile(victim), good);
-        for (const std::string& planted : {record, temporary, lock}) fs::remove(planted);
+    };
+    plantEach(path(orvel::kRecordLock), shut, good);
+}
+
+TEST_F(SessionTest, ManyAtOnceLoseNothing) {
+    constexpr int kProcesses = 16, kRounds = 20, kSessions = 200;
+    std::string before;
+    for (int i = 0; i < kSessions; ++i) before += "10.0.0.5,alice,s" + std::to_string(i) + ",99000,99500,1,0,L\n";
+    writeRecords(before);
+    const auto visits = [] {
+        for (int round = 0; round < kRounds; ++round) {
+            const std::string visitor = std::to_string(getpid()) + "n" + std::to_string(round);
+            const std::string session = "s" + std::to_string(round * 7);
+            std::string added;
+            char name[64] = {}, link[] = "L";
+            _tag_VexoCgi request = {orvel::kRecordLock, orvel::kRecordFile, {{"id", session}}};
+            if (!orvel::addLoginRecord(visitor.c_str(), added, 0, visitor.c_str()) ||
+                checkSession(session.c_str(), link, name, sizeof name, kEverything) != 1 ||
+                VexoCgiHasRecord(&request, name, sizeof name, link) != 1) {
+                return false;
+            }
+        }
+        return true;
+    };
+    EXPECT_EQ(countAtOnce(kProcesses, visits), kProcesses);
+    const std::string after = records();
+    EXPECT_EQ(std::count(after.begin(), after.end(), '\n'), kSessions + kProcesses * kRounds);
+    std::string whole;
+    std::string_view rest = after;
+    for (orvel::LoginRecord record; orvel::nextLoginRecord(rest, orvel::kLongestCheckedLine, record);) {
+        orvel::appendLoginRecord(record, whole);
     }
+    EXPECT_EQ(whole, after) << "a line is torn";
 }
 
 TEST_F(SessionTest, NoFaultLosesARecord) {

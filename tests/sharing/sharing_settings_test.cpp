@@ -1,7 +1,7 @@
 #include "orvel/sharing_settings.h"
 
 #include "support/refuse_calls.h"
-#include "support/testing.h"
+#include "support/table.h"
 
 using OrvelSharing::SharingManager;
 
@@ -95,20 +95,8 @@ TEST_F(SharingSettingsTest, Failures) {
 TEST_F(SharingSettingsTest, WhoMayShare) {
     addUser("gone", 20009, kUsersGid);
     writeRootFile("/etc/shadow", "gone:x:1:0:9:7::7:\n");
-    const char* const kNoSetting = nullptr;
-    for (const auto& [setting, user, choices, may, log] : Rows<const char*, const char*, const char*, int, const char*>{
-             {kNoSetting, "alice", "", 1, nullptr},
-             {"anything", "alice", "", 1, nullptr},
-             {"admin_only", "alice", "20001=\"true\"\n", 0, nullptr},
-             {"admin_only", "carol", "", 1, nullptr},
-             {"per_user", "alice", "20001=\"true\"\n", 1, nullptr},
-             {"per_user", "alice", "", 0, nullptr},
-             {"per_user", "carol", "20001=\"true\"\n", 0, nullptr},  // administrators included
-             {"per_user", "carol", "20003=\"true\"\n", 1, nullptr},
-             {kNoSetting, "gone", "", 0, nullptr},
-             {kNoSetting, "zed", "", 0, "VEXOGroupIsAdminGroupMemEx(zed) failed. [0x1D00 "},
-             {kNoSetting, nullptr, "", 0, "VEXOGroupIsAdminGroupMemEx((null)) failed. [0x0D00 "},
-         }) {
+    for (const auto& [setting, user, choices, may, log] :
+         rowsOf<const char*, const char*, const char*, int, const char*>("sharing/who_may_share")) {
         if (setting != nullptr) setSetting("PX_SHARING_SETTING", setting);
         writeFile(file() + ".new", choices);
         fs::rename(file() + ".new", file());

@@ -1,5 +1,5 @@
 #include "orvel/text.h"
-#include "support/testing.h"
+#include "support/table.h"
 
 namespace {
 
@@ -54,15 +54,7 @@ TEST_F(TextReplace, NoMemoryForTheResult) {
 
 TEST_F(TextReplace, Two) {
     for (const auto& [source, s1, r1, s2, r2, expected] :
-         Rows<const char*, const char*, const char*, const char*, const char*, const char*>{
-             row("%%", "a", "1", "b", "2", "0 %%"), row("abba", "a", "1", "b", "2", "1 1221"),
-             row("ab", "a", "<aa>", "b", "()", "1 <aa>()"),
-             row("aab", "a", "1", "aab", "2", "-1 (null)"),  // the first is tried first
-             row("abab", "ab", "1", "b", "2", "1 11"),
-             row("a.b", "a", "1", "b", "2", "-1 (null)"),  // anything but occurrences: no advance
-             row("a", "a", "100%%", "b", "2", "1 100%"),   // the formatter's part, without its dangers
-             row("a%s%n", "a", "%s", "%s%n", "%5$n", "1 %s%5$n"), row("a", "", "1", "b", "2", "-1 (null)"),
-             row("a", "a", "1", "b", "", "-1 (null)"), row(nullptr, "a", "1", "b", "2", "-1 (null)")})
+         rowsOf<const char*, const char*, const char*, const char*, const char*, const char*>("util/text_replace"))
         EXPECT_EQ(replaceTwo(source, s1, r1, s2, r2), expected);
 }
 
