@@ -53,7 +53,7 @@ std::chrono::seconds lifetime() {
         Talk talk(socket, begin.user, begin.client);
         if (begin.size == 0) {
             judgeNobody(talk);
-        } else if (VEXO::SystemRoot().empty()) {
+        } else if (VEXO::SystemRoot().empty() || folderOfTests() != nullptr) {
             judgeByPam(talk);
         } else {
             judgeByShadow(talk);

@@ -62,6 +62,8 @@ class Talk {
 
 // Judges the log-in: says an outcome in every case, unless nobody listens any more.
 void judgeByPam(Talk& talk);
+// Where tests have laid a PAM service of their own, for a root that is not the machine's; nullptr without one.
+const char* folderOfTests();
 void judgeByShadow(Talk& talk);
 // For a name that nobody can have.
 void judgeNobody(Talk& talk);

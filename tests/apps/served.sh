@@ -37,6 +37,9 @@ for operation in VEXOFileCopy FILEIDXOutputDBInsert; do
     VEXO_GATE_HOLD="${VEXO_GATE_HOLD:+$VEXO_GATE_HOLD;}$operation=$gates/$operation"
 done
 export VEXO_GATE_HOLD
+# A PAM service that a test lays here judges the log-ins while it does.
+export VEXO_GATE_PAM=$work/pam
+mkdir "$VEXO_GATE_PAM"
 
 # Below what the kernel gives to clients; by the process, so that two tests at once begin apart.
 port=$((20000 + $$ % 12000))

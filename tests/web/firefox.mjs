@@ -29,7 +29,7 @@ export class Firefox {
       firefox.socket.onmessage = ({ data }) => firefox.told(JSON.parse(data));
       await within("Firefox", new Promise((resolve) => (firefox.socket.onopen = resolve)));
       await firefox.send("session.new", { capabilities: { alwaysMatch: { unhandledPromptBehavior: { file: "ignore", default: "dismiss" } } } });
-      await firefox.send("session.subscribe", { events: ["log.entryAdded", "network.responseCompleted", "input.fileDialogOpened"] });
+      await firefox.send("session.subscribe", { events: ["log.entryAdded", "network.responseCompleted", "input.fileDialogOpened", "network.beforeRequestSent"] });
       return firefox;
     } catch (failure) {
       await firefox.close();
@@ -59,7 +59,9 @@ export class Firefox {
 
   happened(method, params) {
     if (method === "input.fileDialogOpened") this.chooser?.(params.element);
-    else if (method === "network.responseCompleted") {
+    else if (method === "network.beforeRequestSent") {
+      if (params.isBlocked) this.held(params.request.request);
+    } else if (method === "network.responseCompleted") {
       const { status, url } = params.response;
       const { pathname } = new URL(url);
       const noPicture = pathname === "/cgi-bin/thumbnail" && [415, 503].includes(status); // see browser.mjs
@@ -71,6 +73,18 @@ export class Firefox {
     const id = ++this.sent;
     this.socket.send(JSON.stringify({ id, method, params }));
     return within(method, new Promise((resolve, reject) => this.waiting.set(id, { resolve, reject })));
+  }
+
+  // Does `act` while the next request of that path is about to be sent.
+  async holdOnce(pathname, act) {
+    const { protocol, hostname, port } = new URL((await this.call("() => location.href")).value);
+    const pattern = { type: "pattern", protocol: protocol.slice(0, -1), hostname, port, pathname };
+    const request = new Promise((resolve) => (this.held = resolve));
+    const { intercept } = await this.send("network.addIntercept", { phases: ["beforeRequestSent"], urlPatterns: [pattern] });
+    const held = await within(pathname, request);
+    await act();
+    await this.send("network.removeIntercept", { intercept });
+    await this.send("network.continueRequest", { request: held });
   }
 
   // A page of its own, without what others keep.

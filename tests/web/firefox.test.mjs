@@ -5,6 +5,7 @@ import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
 import { Firefox } from "./firefox.mjs";
+import { goAllWays } from "./log_ins.mjs";
 
 const SITE = process.env.ORVEL_TEST_URL.replace("127.0.0.1", "localhost"); // where the page asks for the password
 const there = join(process.env.ORVEL_TEST_PROJECTS, "house");
@@ -12,7 +13,7 @@ const files = mkdtempSync(join(tmpdir(), "orvel-firefox-"));
 let firefox;
 
 before(async () => {
-  for (const name of ["letter.txt", "list.txt"]) writeFileSync(join(files, name), `This is ${name}.`);
+  for (const name of ["letter.txt", "list.txt", "later.txt"]) writeFileSync(join(files, name), `This is ${name}.`);
   firefox = await Firefox.start();
 });
 after(async () => {
@@ -20,12 +21,22 @@ after(async () => {
   rmSync(files, { recursive: true });
 });
 
-test("in, upload, preview, rename, delete, link, out", async () => {
-  const row = ["#view .row:not(.header) .name"];
-  await firefox.open(`${SITE}#/projects`);
+async function logIn() {
   await firefox.fill(".login [name=user]", "alice");
   await firefox.fill(".login [name=password]", process.env.ORVEL_TEST_ALICE);
   await firefox.type("Enter");
+}
+
+async function leave() {
+  await firefox.click("#account-button", "");
+  await firefox.click(".menu button", "Log out");
+  await firefox.find(".login [name=user]");
+}
+
+test("in, upload, preview, rename, delete, link, out", async () => {
+  const row = ["#view .row:not(.header) .name"];
+  await firefox.open(`${SITE}#/projects`);
+  await logIn();
   await firefox.click(...row, "house", 2);
   await firefox.find("#view[aria-busy=false]");
   firefox.complaints.length = 0; // that nobody was logged in
@@ -59,9 +70,7 @@ test("in, upload, preview, rename, delete, link, out", async () => {
   const { value: link } = await firefox.call("() => document.querySelector('.dialog .address').value");
   await firefox.type("Escape");
   assert.deepEqual(firefox.complaints, []);
-  await firefox.click("#account-button", "");
-  await firefox.click(".menu button", "Log out");
-  await firefox.find(".login [name=user]");
+  await leave();
   firefox.complaints.length = 0;
 
   await firefox.goto(link.replace(/^https?:\/\/[^/]+\//, SITE));
@@ -69,4 +78,29 @@ test("in, upload, preview, rename, delete, link, out", async () => {
   await firefox.type("Enter");
   await firefox.find(".single h1", "plan.pdf");
   assert.deepEqual(firefox.complaints, []);
+});
+
+test("locked, expired, a one-time code, too many failures", () =>
+  goAllWays({
+    open: () => firefox.open(SITE),
+    fill: (selector, text) => firefox.fill(selector, text),
+    enter: () => firefox.type("Enter"),
+    see: (selector, text) => firefox.find(selector, text),
+    leave,
+  }));
+
+test("a session that ends during an upload: asked for in place, and it arrives", async () => {
+  await firefox.open(`${SITE}#/projects/house`);
+  await logIn();
+  await firefox.find("#view .row .name", "plan.pdf");
+  const logOut = "() => fetch('cgi-bin/logout', { method: 'POST', body: new URLSearchParams() }).then((reply) => reply.status)";
+  const sent = firefox.holdOnce("/cgi-bin/upload", async () => assert.equal((await firefox.call(logOut)).value, 200));
+  await firefox.click("#toolbar button", "Upload");
+  await firefox.choose([join(files, "later.txt")], () => firefox.click(".menu button", "Upload files"));
+  await sent;
+  await firefox.fill(".login-again [name=password]", process.env.ORVEL_TEST_ALICE);
+  await firefox.type("Enter");
+  await firefox.find("#view .row .name", "later");
+  await firefox.gone(".login-again");
+  await leave();
 });

@@ -5,6 +5,7 @@ import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
 import { browser, findings, go, PASSWORDS, rowsReady, screenshot, upload, URL_OF_PAGE, wentWell } from "./browser.mjs";
+import { goAllWays } from "./log_ins.mjs";
 
 // By this name the demo's web server asks nobody for a password.
 const SITE = URL_OF_PAGE.replace("127.0.0.1", "localhost");
@@ -107,6 +108,21 @@ test("right, wrong, unknown, asked once more, out again", () =>
     assert.equal(await page.locator("#view >> text=Landscapes").count(), 0);
     assert.equal((await context.request.get(`${SITE}cgi-bin/list?action=shares`)).status(), 401);
   }));
+
+test("locked, expired, a one-time code, too many failures", () =>
+  withBrowser((page) =>
+    goAllWays({
+      open: () => page.goto(SITE),
+      fill: (selector, text) => page.fill(selector, text),
+      enter: () => page.keyboard.press("Enter"),
+      see: (selector, text) => page.waitForSelector(`${selector} >> text=${text}`),
+      leave: async () => {
+        await page.click("#account-button");
+        await page.click(".menu >> text=Log out");
+        await page.waitForSelector(".login [name=user]");
+      },
+    }),
+  ));
 
 test("a session that ends during an upload: asked for in place, everything arrives once", () =>
   withBrowser(async (page, context) => {
