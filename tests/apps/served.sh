@@ -46,9 +46,10 @@ port=$((20000 + $$ % 12000))
 while (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null; do port=$((port + 1)); done
 "$server" --port "$port" --root "$demo" --build "$build" >"$log" 2>&1 &
 pid=$!
-for _ in $(seq 600); do
-    (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null && break
+limit=$((SECONDS + 300))
+until (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null; do
     kill -0 "$pid" 2>/dev/null || { cat "$log"; echo "FAILED: the server ended"; exit 1; }
+    [ "$SECONDS" -lt "$limit" ] || { cat "$log"; echo "FAILED: waited in vain for the server"; exit 1; }
     sleep 0.1
 done
 
