@@ -147,6 +147,9 @@ class ORVEL_API OrvSearchWalker {
 
     // True: only the entries directly in the chosen folders. False from the start.
     void setSearchCurrentDir(bool currentOnly);
+    // The order in which results are asked for while the search is still going on, as for OrvSearchDBTask::queryResult:
+    // where an index keeps it, what comes first in it is found first. Without it, in any order.
+    void setShownOrder(const char* sortBy, const bool* sortFlag);
     // "" before a successful init; then what OrvSearchDBTask takes, until the walker ends.
     [[nodiscard]] const char* getDBTaskId() const;
     [[nodiscard]] const char* getDBVol() const;
@@ -170,6 +173,7 @@ class ORVEL_API OrvSearchWalker {
     std::string taskId_, volume_, database_;
     __tag_FI_SQL_COND* root_ = nullptr;
     SearchShareDirMap map_;
+    std::optional<FISORT> shown_;
 };
 
 }  // namespace FileSearch

@@ -7,6 +7,7 @@
 #include "base/beneath.h"
 #include "core/boundary.h"
 #include "orvel/search_walker.h"
+#include "vexo/index_shown.h"
 #include "vexo/user.h"
 
 namespace FileSearch {
@@ -84,9 +85,9 @@ bool OrvSearchWalker::askIndex(const std::string& shareName, const std::vector<P
     const bool asksFolders = !seesEverything(user_);
     AccessTest times{orvel::Descriptor(open(folders.front().shareRoot.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC)),
                      accessTimeCriteria};
-    return FILEIDXResultGetAndTableGen(shareName.c_str(), paths.head(), root_, database_.c_str(),
-                                       asksTimes ? testAccessTime : nullptr, &times, cancelFlag_,
-                                       asksFolders ? testFolder : nullptr, &verdicts) >= 0;
+    return FILEIDXResultGetShown(shareName.c_str(), paths.head(), root_, database_.c_str(),
+                                 asksTimes ? testAccessTime : nullptr, &times, cancelFlag_,
+                                 asksFolders ? testFolder : nullptr, &verdicts, shown_ ? &*shown_ : nullptr) >= 0;
 }
 
 }  // namespace FileSearch

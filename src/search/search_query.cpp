@@ -8,6 +8,7 @@
 #include "core/boundary.h"
 #include "orvel/search_criteria.h"
 #include "orvel/search_task.h"
+#include "orvel/search_walker.h"
 
 namespace FileSearch {
 namespace {
@@ -69,6 +70,13 @@ class Filters {
 };
 
 }  // namespace
+
+void OrvSearchWalker::setShownOrder(const char* sortBy, const bool* sortFlag) {
+    FIQUERY query{};
+    setOrder(sortBy, sortFlag, query);
+    shown_.reset();
+    if (query.nSort == 1) shown_ = query.sort[0];
+}
 
 bool OrvSearchDBTask::queryResult(unsigned long offset, unsigned long limit, const char* sortBy, const bool* sortFlag,
                                   const _tag_dir_entry_type_* typeFilter, const char* nameFilter,

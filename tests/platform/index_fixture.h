@@ -6,7 +6,7 @@
 
 #include "index/index_connections.h"
 #include "support/testing.h"
-#include "vexo/index.h"
+#include "vexo/index_shown.h"
 #include "vexo/stat.h"
 
 namespace index_tests {
@@ -114,9 +114,9 @@ class IndexTest : public ApplianceTest {
     Addresses searched(const Cond* cond, const Cond* paths = nullptr) {
         const std::string out = folder_ + "/out";
         EXPECT_EQ(FILEIDXDBCreate(out.c_str()), 0);
-        EXPECT_EQ(
-            FILEIDXResultGetAndTableGen("PHOTO", paths, cond, out.c_str(), nullptr, nullptr, nullptr, nullptr, nullptr),
-            0);
+        EXPECT_EQ(FILEIDXResultGetShown("PHOTO", paths, cond, out.c_str(), nullptr, nullptr, nullptr, nullptr, nullptr,
+                                        &shown_),
+                  0);
         Addresses found = select(out);
         unlink(out.c_str());
         return found;
@@ -135,6 +135,7 @@ class IndexTest : public ApplianceTest {
         sqlite3_close(db);
         return answer;
     }
+    FISORT shown_ = {FI_COL_NAME, 0};
     std::string folder_;
     std::string db_;
     char path_[4096] = "";  // that of the index that is written

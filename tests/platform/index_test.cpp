@@ -1,6 +1,8 @@
 // What the index finds, keeps and orders, held against the criteria and against plain sorting.
 #include <random>
 
+#include "index/index_name_order.h"
+#include "index/index_store.h"
 #include "orvel/search_criteria.h"
 #include "platform/index_fixture.h"
 #include "vexo/text.h"
@@ -108,6 +110,7 @@ TEST_F(IndexTest, ConditionsSayWhatTheCriteriaSay) {
         }
         found += expected.size();
         EXPECT_EQ(select(db_, tree), sorted(expected)) << criteria.text;
+        shown_.descending = round % 2;
         EXPECT_EQ(searched(tree), sorted(expected)) << criteria.text;
     }
     EXPECT_GT(found, records.size() * 10);
@@ -317,6 +320,103 @@ TEST_F(IndexTest, PagesFollowTheOrderWhetherItIsKeptOrNot) {
     EXPECT_EQ(keptAfterOnePage(), 0) << "an order outlived a change";
     check("after a change ");
     EXPECT_EQ(select(db_, {{{FI_COL_NAME, 0}, {}}, 1, nullptr, 20000, 10}), Addresses());
+}
+
+// The addresses that satisfy, in the order by name that the index keeps.
+Addresses inKeptOrder(const Cond* cond, bool descending) {
+    using namespace vexo::fileindex;
+    const std::unique_ptr<Database> index = openIndex("photo");
+    const std::optional<Condition> condition = readCondition(cond, {.ofCriteria = true});
+    std::unique_ptr<const Names> names = index == nullptr ? nullptr : openNames("photo", *index);
+    if (names == nullptr || !condition) return {"no names"};
+    NameOrder order(*index, *condition, std::move(names), descending, Database::Clock::now() + std::chrono::hours(1));
+    std::vector<OwnedRecord> found;
+    while (!order.atEnd()) EXPECT_TRUE(order.read(70, found));
+    EXPECT_TRUE(order.wasWhole());
+    Addresses addresses;
+    for (const OwnedRecord& record : found) addresses.push_back(std::string("photo:") + record.view().szPath);
+    return addresses;
+}
+
+TEST_F(IndexTest, NamesKeepTheirOrderWhateverChanges) {
+    std::vector<Record> records = manyRecords();
+    for (int i = 0; i < 300; ++i) records.push_back({.path = std::to_string(i % 50) + "/same", .share = "photo"});
+    std::sort(records.begin(), records.end(), [](auto& a, auto& b) { return a.path < b.path; });
+    records.erase(std::unique(records.begin(), records.end(), [](auto& a, auto& b) { return a.path == b.path; }),
+                  records.end());
+    std::mt19937 random(3);
+    std::shuffle(records.begin(), records.end(), random);
+    build(records);
+    const Cond every = node(FI_COL_NAME, FI_OP_WILDCARD, "*");
+    const Cond jpg = node(FI_COL_NAME, FI_OP_WILDCARD, "*.jpg");
+    const auto check = [&](const std::string& when) {
+        for (const bool descending : {false, true}) {
+            std::vector<Keyed> order;
+            for (const Record& record : records) order.emplace_back(record.name(), &record);
+            std::sort(order.begin(), order.end(),
+                      [&](auto& a, auto& b) { return comesBefore(a, b, FI_COL_NAME, descending); });
+            Addresses all, images;
+            for (const auto& [name, record] : order) {
+                all.push_back(record->address());
+                if (name.size() >= 4 && strcasecmp(name.c_str() + name.size() - 4, ".jpg") == 0) {
+                    images.push_back(all.back());
+                }
+            }
+            EXPECT_EQ(inKeptOrder(&every, descending), all) << when << descending;
+            EXPECT_EQ(inKeptOrder(&jpg, descending), images) << when << descending;
+        }
+    };
+    check("built");
+    const std::string file = systemRoot() + "/var/lib/vexo/index/photo.names";
+    const auto update = [&](int changes) {
+        ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path_, sizeof path_), 0);
+        for (int i = 0; i < changes; ++i) {
+            const size_t at = random() % records.size();
+            const Cond where = node(FI_COL_PATH, FI_OP_EQUAL, records[at].path);
+            ASSERT_EQ(FILEIDXDBDel(path_, &where), 0);
+            if (i % 3 == 0) {
+                records.erase(records.begin() + static_cast<std::ptrdiff_t>(at));
+            } else {
+                records[at].path = std::to_string(random() % 9) + "/" + "SameR"[random() % 5] + std::to_string(i);
+            }
+            if (i % 3 != 0) {
+                ASSERT_EQ(insert(path_, records[at]), 0);
+            }
+        }
+        ASSERT_EQ(FILEIDXIndexEnd("photo", 1), 0);
+    };
+    const std::string before = readFile(file);
+    update(40);
+    EXPECT_EQ(readFile(file), before) << "packed again for a few changes";
+    check("a few changes ");
+    for (int i = 0; i < 1100; ++i)
+        records.push_back({.path = "more/" + std::to_string(random() % 700) + "." + std::to_string(i)});
+    ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path_, sizeof path_), 0);
+    for (size_t i = records.size() - 1100; i < records.size(); ++i) ASSERT_EQ(insert(path_, records[i]), 0);
+    ASSERT_EQ(FILEIDXIndexEnd("photo", 1), 0);
+    EXPECT_NE(readFile(file), before);
+    check("packed again ");
+
+    // One that is torn, foreign or gone: searches do without, and the next update makes it.
+    const std::string good = readFile(file);
+    for (const std::string& bad : {good.substr(0, good.size() / 2), "VEXONAM0" + good.substr(8), before,
+                                   good.substr(0, 20), good.substr(0, 8) + "other" + good.substr(13), std::string()}) {
+        writeFile(file, bad, 0600);
+        if (bad.empty()) unlink(file.c_str());
+        EXPECT_EQ(searched(&every).size(), records.size());
+        if (bad != before) {
+            EXPECT_EQ(inKeptOrder(&every, false), Addresses{"no names"}) << bad.size();
+        }
+        update(1);
+        EXPECT_EQ(inKeptOrder(&every, false).size(), records.size()) << "made anew";
+    }
+    check("at the end ");
+    const FISORT sort = {FI_COL_NAME, 1};
+    const Addresses expected = inKeptOrder(&every, true);
+    ASSERT_EQ(FILEIDXResultGetShown("photo", nullptr, &every, db_.c_str(), nullptr, nullptr, nullptr, nullptr, nullptr,
+                                    &sort),
+              0);
+    EXPECT_EQ(select(db_, {{sort, {}}, 1, nullptr, 0, ~0UL}), expected);
 }
 
 }  // namespace

@@ -84,9 +84,10 @@ bool note(Search& search, const std::vector<std::string>& folders, const User& u
 }
 
 int beginSearch(const User& user, const std::vector<std::string>& folders, bool recursive, const Criteria& criteria,
-                std::string& id) {
+                const std::optional<ListRequest>& shown, std::string& id) {
     Search search(user, criteria);
     search.walker.setSearchCurrentDir(!recursive);
+    if (shown) search.walker.setShownOrder(shown->sortBy.c_str(), &shown->ascending);
     if (!search.walker.init(folders, criteria.list())) return platformCode();
     id = search.walker.getDBTaskId();
     const std::string volume = search.walker.getDBVol();
@@ -156,7 +157,7 @@ void startSearch(Output& out, const User& user, const VEXO::WebCGI& web) {
     if (code == ORV_ERR_NONE) code = makeRoomForTask(user.name);
     if (code == ORV_ERR_NONE) {
         std::string id;
-        code = beginSearch(user, folders, recursive == "true", criteria, id);
+        code = beginSearch(user, folders, recursive == "true", criteria, page, id);
         if (code == ORV_ERR_NONE) return replyStarted(out, user, id, page);
     }
     reply(out, statusOf(code), user.cookie, code, culprit, data);

@@ -99,14 +99,21 @@ std::optional<std::string> endingOf(std::string_view text, const orvel::Wildcard
     return rest.substr(1);
 }
 
-void appendValues(Condition& to, Condition& from) {
-    std::move(from.values.begin(), from.values.end(), std::back_inserter(to.values));
+template <class Item>
+void appendTo(std::vector<Item>& to, std::vector<Item>& from) {
+    std::move(from.begin(), from.end(), std::back_inserter(to));
+}
+
+bool fits(const Value& test, std::string_view name) {
+    if (const auto* pattern = std::get_if<Pattern>(&test)) return (*pattern)->match(name);
+    const auto* endings = std::get_if<EndingList>(&test);
+    return endings == nullptr || (*endings)->match(name);
 }
 
 // What one of many alternatives asks for, without what it says itself.
 void addHints(Condition& to, Condition& from) {
     if (to.folders && from.folders) {
-        std::move(from.folders->begin(), from.folders->end(), std::back_inserter(*to.folders));
+        appendTo(*to.folders, *from.folders);
     } else {
         to.folders.reset();
     }
@@ -115,11 +122,14 @@ void addHints(Condition& to, Condition& from) {
     } else {
         to.trigrams.reset();
     }
+    // What holds for all of either holds for the first of each.
+    to.names.resize(to.names.empty() || from.names.empty() ? 0 : 1);
+    if (!to.names.empty()) appendTo(to.names.front(), from.names.front());
 }
 
 Condition either(Condition a, Condition b) {
     a.sql = "(" + a.sql + " OR " + b.sql + ")";
-    appendValues(a, b);
+    appendTo(a.values, b.values);
     addHints(a, b);
     if (a.trigrams) a.trigrams = "(" + *a.trigrams + ")";
     a.plain.reset();
@@ -136,7 +146,7 @@ Condition joined(const std::vector<Condition>& parts, bool endings) {
             folders->add(part.plain->text, part.plain->kind == PlainTest::Kind::kBelow);
         }
     }
-    if (endings) return {"vexo_ending(?,name)", {Value(EndingList(names))}};
+    if (endings) return {"vexo_ending(?,name)", {Value(EndingList(names))}, {}, {}, {}, {{Value(EndingList(names))}}};
     return {"vexo_within(?,path)", {Value(FolderList(folders))}};
 }
 
@@ -152,7 +162,9 @@ void joinPlain(std::vector<Condition>& parts, bool endings) {
         Condition all = joined(plain, endings);
         all.folders = std::move(plain.front().folders);
         all.trigrams = std::move(plain.front().trigrams);
+        const auto names = all.names;  // of all of them
         for (size_t i = 1; i < plain.size(); ++i) addHints(all, plain[i]);
+        all.names = names;
         if (all.trigrams) all.trigrams = "(" + *all.trigrams + ")";
         plain.clear();
         plain.push_back(std::move(all));
@@ -259,6 +271,7 @@ class Reader {
         const std::string_view text = textOf(node).substr(0, isCut ? kNamePatternLimit : std::string_view::npos);
         const auto pattern = std::make_shared<const orvel::Wildcard>(text, kEscape);
         Condition out{std::string("vexo_match(?,") + column.name + ")", {Value(Pattern(pattern))}};
+        if (isName) out.names = {{Value(Pattern(pattern))}};
         if (isName && reading_.ofCriteria) out.trigrams = trigramsOf(*pattern);
         if (auto ending = isName ? endingOf(text, *pattern) : std::nullopt) {
             out.plain = {PlainTest::Kind::kEnding, std::move(*ending)};
@@ -296,7 +309,8 @@ Condition both(Condition a, Condition b) {
     if (b.sql == "1") return a;
     a.plain.reset();
     a.sql = "(" + a.sql + " AND " + b.sql + ")";
-    appendValues(a, b);
+    appendTo(a.values, b.values);
+    appendTo(a.names, b.names);
     if (!a.folders) a.folders = std::move(b.folders);
     if (a.trigrams && b.trigrams) {
         a.trigrams = "(" + *a.trigrams + " AND " + *b.trigrams + ")";
@@ -304,6 +318,13 @@ Condition both(Condition a, Condition b) {
         a.trigrams = std::move(b.trigrams);
     }
     return a;
+}
+
+bool fitsNames(const Condition& condition, std::string_view name) {
+    return std::all_of(condition.names.begin(), condition.names.end(), [name](const std::vector<Value>& alternatives) {
+        return std::any_of(alternatives.begin(), alternatives.end(),
+                           [name](const Value& test) { return fits(test, name); });
+    });
 }
 
 Value valueOf(const __tag_FI_SQL_COND& node) {

@@ -4,6 +4,7 @@
 
 #include <optional>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -42,7 +43,12 @@ struct Condition {
     std::optional<std::string> trigrams = {};
     // Set where the tree is this test alone.
     std::optional<PlainTest> plain = {};
+    // The name of every record satisfying the tree fits one of each of these; a Value of patterns or endings.
+    std::vector<std::vector<Value>> names = {};
 };
+
+// Whether a record of this name may satisfy the condition, as far as names tell.
+[[nodiscard]] bool fitsNames(const Condition& condition, std::string_view name);
 
 // Null `tree` holds for every record. Nothing, with the slot filled (0x0D00), for columns and comparisons that do not
 // exist or do not go together, and for a tree that is too deep or large or a cycle.

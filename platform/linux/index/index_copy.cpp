@@ -15,13 +15,14 @@
 #include "index/index_search.h"
 #include "index/index_store.h"
 #include "shares/share_record.h"
-#include "vexo/index.h"
+#include "vexo/index_shown.h"
 
 namespace vexo::fileindex {
 namespace {
 
 constexpr size_t kFirstPart = 128;
 constexpr size_t kPart = 4096;
+constexpr size_t kOrdered = 1000;
 
 // What the caller says about single records; see FILEIDXResultGetAndTableGen.
 struct Tests {
@@ -45,13 +46,15 @@ bool insertInto(const char* out, const std::vector<__tag_FI_FILE_INFO_DATA>& rec
 // The first rows are committed at once, since somebody waits for them. The share's root is what it is now: the rows may
 // be older than a move of the share's folder.
 bool copy(IndexSearch& search, const char* root, const char* out, const Tests& tests, const int* cancel) {
-    size_t most = kFirstPart;
+    size_t most = search.isShort() ? kPart : kFirstPart;
     bool isFirst = true;
+    size_t ordered = 0;
     while (!search.atEnd() && !isCancelled(cancel)) {
         std::vector<OwnedRecord> part;
+        const bool inOrder = search.readsInOrder();
         {
             const orvel::RaisedIdentity raised;
-            if (!search.read(most, part)) return false;
+            if (!search.read(inOrder ? kOrdered - ordered : most, part)) return false;
         }
         std::vector<__tag_FI_FILE_INFO_DATA> kept;
         kept.reserve(part.size());
@@ -61,9 +64,10 @@ bool copy(IndexSearch& search, const char* root, const char* out, const Tests& t
             view.szShareRoot = root;
             if (holds(tests, view)) kept.push_back(view);
         }
+        if (inOrder && (ordered += kept.size()) == kOrdered) search.endOrder();
         most = std::min(most * 2, kPart);
         if (kept.empty()) continue;
-        if (!insertInto(out, kept, isFirst)) return false;
+        if (!insertInto(out, kept, isFirst || inOrder)) return false;
         isFirst = false;
         most = kPart;
     }
@@ -81,7 +85,15 @@ Condition shorterFirst(Condition a, Condition b) {
 
 int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_COND* paths, const __tag_FI_SQL_COND* cond,
                                 const char* out, BOOL (*accessTest)(__tag_FI_FILE_INFO_DATA*, void*), void* accessArg,
-                                int* cancel, BOOL (*folderTest)(const char*, void*), void* folderArg) try {
+                                int* cancel, BOOL (*folderTest)(const char*, void*), void* folderArg) {
+    return FILEIDXResultGetShown(share, paths, cond, out, accessTest, accessArg, cancel, folderTest, folderArg,
+                                 nullptr);
+}
+
+int FILEIDXResultGetShown(const char* share, const __tag_FI_SQL_COND* paths, const __tag_FI_SQL_COND* cond,
+                          const char* out, BOOL (*accessTest)(__tag_FI_FILE_INFO_DATA*, void*), void* accessArg,
+                          int* cancel, BOOL (*folderTest)(const char*, void*), void* folderArg,
+                          const FISORT* shown) try {
     using namespace vexo::fileindex;
     VEXO_GATE("FILEIDXResultGetAndTableGen", -1);
     if (share == nullptr || out == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
@@ -98,7 +110,8 @@ int FILEIDXResultGetAndTableGen(const char* share, const __tag_FI_SQL_COND* path
         index = openIndex(share);
         if (index == nullptr) return -1;
         search.emplace(*index, asked, cancel);
-        if (!search->begin()) return -1;
+        const bool byName = shown != nullptr && shown->column == FI_COL_NAME;
+        if (!search->begin(byName ? openNames(share, *index) : nullptr, byName && shown->descending != 0)) return -1;
     }
     const Tests tests = {accessTest, accessArg, folderTest, folderArg};
     return copy(*search, record->szPath, out, tests, cancel) ? 0 : -1;

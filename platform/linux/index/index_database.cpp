@@ -15,6 +15,7 @@
 #include "index/index_vfs.h"
 #include "io/file_io.h"
 #include "vexo/error.h"
+#include "vexo/text.h"
 
 namespace vexo::fileindex {
 namespace {
@@ -57,6 +58,16 @@ void endingFunction(sqlite3_context* context, int, sqlite3_value** values) {
     answer(context, values, "endings", &Endings::match);
 }
 
+void keyFunction(sqlite3_context* context, int, sqlite3_value** values) {
+    try {
+        std::string out;
+        VEXO::AppendFoldKey(bytesOf(values[0]), out);
+        sqlite3_result_blob64(context, out.data(), out.size(), SQLITE_TRANSIENT);
+    } catch (...) {
+        sqlite3_result_error_nomem(context);
+    }
+}
+
 void withinFunction(sqlite3_context* context, int, sqlite3_value** values) {
     answer(context, values, "folders", &FolderSet::holds);
 }
@@ -77,7 +88,8 @@ bool addFunctions(sqlite3* db) {
         return sqlite3_create_function(db, name, arguments, flags, nullptr, function, nullptr, nullptr) == SQLITE_OK;
     };
     return add("vexo_match", 2, matchFunction) && add("vexo_ending", 2, endingFunction) &&
-           add("vexo_within", 2, withinFunction) && add("vexo_comparable", 1, comparableFunction);
+           add("vexo_within", 2, withinFunction) && add("vexo_comparable", 1, comparableFunction) &&
+           add("vexo_key", 1, keyFunction);
 }
 
 // A file may be made to harm who opens it; only the central store may say by triggers what is to be done.
@@ -169,9 +181,12 @@ bool Database::configure(OpenMode mode) {
     if (!addFunctions(db_)) return failSql(db_);
     // Results are worth nothing after a loss of power, but must survive the death of their writer. Pages that a large
     // batch changed wait in memory: written early, they would lock readers out for the rest of the batch.
-    constexpr const char* common =
-        "PRAGMA temp_store=MEMORY;PRAGMA secure_delete=OFF;PRAGMA cache_spill=OFF;"
-        "PRAGMA cache_size=-16384;";
+    // In an index that is built they need not, and its sorts use files, so that memory does not grow with it.
+    if (!execute(db_, mode.isNew ? "PRAGMA temp_store=FILE;PRAGMA cache_spill=ON"
+                                 : "PRAGMA temp_store=MEMORY;PRAGMA cache_spill=OFF")) {
+        return false;
+    }
+    constexpr const char* common = "PRAGMA secure_delete=OFF;PRAGMA cache_size=-16384;";
     return execute(db_, common) &&
            execute(db_, mode.ofShare ? "PRAGMA synchronous=FULL;PRAGMA mmap_size=2147418112;"
                                      : "PRAGMA synchronous=OFF;PRAGMA mmap_size=0;PRAGMA cell_size_check=ON;");
@@ -236,6 +251,16 @@ bool Database::readState(State& state) {
         return false;
     }
     state = {std::max<int64_t>(statement.number(0), 0), statement.number(1), statement.number(2), statement.number(3)};
+    return true;
+}
+
+bool Database::readHighest(int64_t& id) {
+    Statement statement;
+    if (!statement.prepare(db_, "SELECT max(highest,coalesce((SELECT max(id) FROM record),0)) FROM state") ||
+        statement.step() != Statement::kRow) {
+        return false;
+    }
+    id = statement.number(0);
     return true;
 }
 

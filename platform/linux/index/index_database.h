@@ -17,6 +17,7 @@ namespace vexo::fileindex {
 struct OpenMode {
     bool readOnly = false;
     bool ofShare = false;  // in the central store: it may hold the trigrams of names, and outlives a loss of power
+    bool isNew = false;    // an index while it is built: nobody reads it yet, and nobody needs it after a loss of power
 };
 
 // What a database says about itself; times are seconds since the epoch, 0 for never.
@@ -65,6 +66,8 @@ class Database {
     [[nodiscard]] bool select(const Condition& condition, std::vector<int64_t>& ids);
     [[nodiscard]] bool count(const Condition& condition, int64_t& count);
     [[nodiscard]] bool readState(State& state);
+    // The highest id that a record has or, in the index of a share, ever had.
+    [[nodiscard]] bool readHighest(int64_t& id);
 
  private:
     Database(std::string path, sqlite3* db, bool ofShare) : path_(std::move(path)), db_(db), ofShare_(ofShare) {}
@@ -72,7 +75,6 @@ class Database {
     [[nodiscard]] bool hasOurSchema(bool ofShare);
     [[nodiscard]] bool makeSchema();
     [[nodiscard]] bool begin();
-    [[nodiscard]] bool readHighest();
     // What a write ends with.
     [[nodiscard]] bool written(bool done);
     [[nodiscard]] bool change(const std::string& sql, const std::vector<Value>& values);

@@ -12,6 +12,9 @@ namespace {
 // are asked; where trigrams do not help, a sixteenth of all.
 constexpr int64_t kFewRecords = 4096;
 constexpr int64_t kWorthPart = 16;
+constexpr size_t kSoonRead = 2048;  // all of them, and no order is needed
+// Somebody waits for the first rows; what is not found by then is found in the order of ids.
+constexpr std::chrono::milliseconds kOrderTime(25);
 // What is looked at in one transaction takes some 20 milliseconds at most: writers wait for it.
 constexpr size_t kLooks = 4096;
 constexpr int64_t kWindow = 65536;
@@ -95,14 +98,19 @@ bool IndexSearch::inTransaction(Work work) {
     return true;
 }
 
-bool IndexSearch::begin() {
-    return inTransaction([&] { return chooseWay(); });
+bool IndexSearch::begin(std::unique_ptr<const Names> names, bool descending) {
+    if (!inTransaction([&] { return chooseWay(); })) return false;
+    const bool isLong = chosen_.size() > kSoonRead || (chosen_.empty() && after_ == 0);
+    isShort_ = !isLong;
+    if (names != nullptr && isLong && !atEnd_) {
+        order_.emplace(index_, condition_, std::move(names), descending, Database::Clock::now() + kOrderTime);
+    }
+    return true;
 }
 
 bool IndexSearch::chooseWay() {
     State state{};
-    int64_t highest = 0;
-    if (!index_.readState(state) || !highestId(last_, index_.handle(), highest)) return false;
+    if (!index_.readState(state) || !highestId(last_, index_.handle(), highest_)) return false;
     const int64_t worth = std::max(state.records / kWorthPart, kFewRecords);
     bool tooMany = true;
     if (condition_.folders) {
@@ -118,24 +126,37 @@ bool IndexSearch::chooseWay() {
     if (tooMany) {
         chosen_.clear();
     } else {
-        after_ = highest;
+        after_ = highest_;
     }
     return true;
 }
 
-bool IndexSearch::prepare(Statement& statement, const char* ids) const {
+bool prepareRecords(Database& index, const Condition& condition, const char* ids, Statement& statement) {
     if (statement) return true;
-    return statement.prepare(index_.handle(), std::string("SELECT ") + kRecordColumns + ",id FROM record NOT INDEXED " +
-                                                  "WHERE " + condition_.sql + " AND " + ids) &&
-           statement.bind(condition_.values);
+    return statement.prepare(index.handle(), std::string("SELECT ") + kRecordColumns + ",id FROM record NOT INDEXED " +
+                                                 "WHERE " + condition.sql + " AND " + ids) &&
+           statement.bind(condition.values);
 }
 
 bool IndexSearch::read(size_t most, std::vector<OwnedRecord>& part) {
-    return inTransaction([&] { return next_ < chosen_.size() ? readChosen(most, part) : readAll(most, part); });
+    return inTransaction([&] {
+        if (order_) return readOrder(most, part);
+        return next_ < chosen_.size() ? readChosen(most, part) : readAll(most, part);
+    });
+}
+
+bool IndexSearch::readOrder(size_t most, std::vector<OwnedRecord>& part) {
+    if (!order_->read(most, part)) return false;
+    if (order_->wasWhole()) {
+        next_ = chosen_.size();
+        after_ = highest_;
+    }
+    if (order_->atEnd()) order_.reset();
+    return true;
 }
 
 bool IndexSearch::readChosen(size_t most, std::vector<OwnedRecord>& part) {
-    if (!prepare(one_, "id=?")) return false;
+    if (!prepareRecords(index_, condition_, "id=?", one_)) return false;
     const int idAt = static_cast<int>(condition_.values.size()) + 1;
     const size_t end = std::min(chosen_.size(), next_ + kLooks);
     const size_t full = part.size() + most;
@@ -152,7 +173,8 @@ bool IndexSearch::readChosen(size_t most, std::vector<OwnedRecord>& part) {
 
 bool IndexSearch::readAll(size_t most, std::vector<OwnedRecord>& part) {
     int64_t highest = 0;
-    if (!prepare(some_, "id>? AND id<=? ORDER BY id LIMIT ?") || !highestId(last_, index_.handle(), highest)) {
+    if (!prepareRecords(index_, condition_, "id>? AND id<=? ORDER BY id LIMIT ?", some_) ||
+        !highestId(last_, index_.handle(), highest)) {
         return false;
     }
     const int64_t windowEnd = highest - after_ > kWindow ? after_ + kWindow : highest;

@@ -18,6 +18,7 @@
 #include "failure.h"
 #include "fault_gate.h"
 #include "index/index_connections.h"
+#include "index/index_names_format.h"
 #include "io/file_io.h"
 #include "shares/share_record.h"
 #include "shares/share_store.h"
@@ -31,6 +32,7 @@ namespace {
 
 constexpr const char* kFolder = "/var/lib/vexo/index";
 constexpr const char* kParent = "/var/lib/vexo";
+constexpr OpenMode kNewIndex = {.isNew = true};
 constexpr std::string_view kNew = ".new";  // of an index while it is built
 
 // What this process is writing of a share.
@@ -133,8 +135,7 @@ bool begin(const std::string& share, int mode) {
     if (!work.lock) return false;
     if (mode == FI_INDEX_BUILD) {
         if (!removeFile(newPath(share)) || !Database::create(newPath(share))) return false;
-        // Until it is complete nobody needs it after a loss of power.
-        admitDatabase(newPath(share), {});
+        admitDatabase(newPath(share), kNewIndex);
     } else {
         if (!indexExists(share)) {
             fail(VEXO_ERR_MISSING, ENOENT);
@@ -164,12 +165,26 @@ bool synchronise(const std::string& path, int flags) {
     return false;
 }
 
+std::string namesPath(std::string_view share) {
+    return storePath(share, ".names");
+}
+
+// Where that fails searches do without, and the next update tries again.
+void renewNames(const std::string& share, Database& index) {
+    const KeepErrno keep;
+    const QuietFailures quiet;
+    if (namesAreOld(namesPath(share), index)) static_cast<void>(packNames(namesPath(share), index));
+}
+
 // The records become an index: trigrams and all.
-bool complete(const std::string& path) {
-    const std::unique_ptr<Database> database = Database::open(path, {});
+bool complete(const std::string& share, const std::string& path) {
+    const std::unique_ptr<Database> database = Database::open(path, kNewIndex);
     if (database == nullptr) return false;
     sqlite3* db = database->handle();
-    return execute(db, "BEGIN") && execute(db, kShareSchema) && noteTime(db, true) && execute(db, "COMMIT");
+    const bool done = execute(db, "BEGIN") && execute(db, kShareSchema) && execute(db, drawMark().c_str()) &&
+                      noteTime(db, true) && execute(db, "COMMIT");
+    if (done) renewNames(share, *database);
+    return done;
 }
 
 bool replaceIndex(std::string_view share) {
@@ -185,7 +200,7 @@ bool replaceIndex(std::string_view share) {
 bool endBuild(const std::string& share, bool done) {
     const std::string path = newPath(share);
     const bool written = dismissDatabase(path);
-    if (done && written && complete(path) && noteVeto(share, kNoVeto) && replaceIndex(share) &&
+    if (done && written && complete(share, path) && noteVeto(share, kNoVeto) && replaceIndex(share) &&
         noteVeto(share, works()[share].veto)) {
         return true;
     }
@@ -197,7 +212,9 @@ bool endUpdate(const std::string& share, bool done) {
     if (!dismissDatabase(indexPath(share))) return false;
     if (!done) return true;
     const std::unique_ptr<Database> database = Database::open(indexPath(share), {false, true});
-    return database != nullptr && noteTime(database->handle(), false);
+    if (database == nullptr || !noteTime(database->handle(), false)) return false;
+    renewNames(share, *database);
+    return true;
 }
 
 // Removes what killed builds left, unless the share's index is being written.
@@ -241,6 +258,7 @@ bool mark(const std::string& share, int state, Work& work) {
     if (state == FI_INDEX_BEHIND) return true;
     const std::unique_ptr<Database> database = Database::open(indexPath(share), {false, true});
     if (database == nullptr || !noteTime(database->handle(), false)) return false;
+    renewNames(share, *database);
     if (state == FI_INDEX_IN_STEP || work.live) return true;
     struct flock lock = writeLock();
     Descriptor file = openFile(storePath(share, ".live"), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK, 0600);
@@ -263,8 +281,10 @@ bool readStatus(const std::string& share, FIINDEXSTATUS& status) {
         fail(errorOfErrno(errno));
         return false;
     }
-    status = {static_cast<unsigned long long>(state.records), static_cast<unsigned long long>(folders), file.st_size,
-              state.built, state.updated};
+    struct stat names {};
+    const bool hasNames = lstat(namesPath(share).c_str(), &names) == 0;
+    status = {static_cast<unsigned long long>(state.records), static_cast<unsigned long long>(folders),
+              file.st_size + (hasNames ? names.st_blocks * 512 : 0), state.built, state.updated};
     return true;
 }
 
@@ -299,6 +319,10 @@ std::unique_ptr<Database> openIndex(std::string_view share) {
         return nullptr;
     }
     return Database::open(indexPath(share), {true, true});
+}
+
+std::unique_ptr<const Names> openNames(std::string_view share, Database& index) {
+    return Names::open(namesPath(share), index);
 }
 
 }  // namespace vexo::fileindex
@@ -365,7 +389,8 @@ int FILEIDXIndexDrop(const char* share) try {
     if (!vexo::fileindex::makeStore()) return -1;
     const orvel::Descriptor lock = vexo::fileindex::lockIndex(share);
     if (!lock) return -1;
-    return vexo::fileindex::removeFile(vexo::fileindex::indexPath(share)) ? 0 : -1;
+    using namespace vexo::fileindex;
+    return removeFile(indexPath(share)) && removeFile(namesPath(share)) ? 0 : -1;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

@@ -7,6 +7,7 @@
 #include <string_view>
 
 #include "index/index_database.h"
+#include "index/index_names.h"
 
 namespace vexo::fileindex {
 
@@ -17,6 +18,8 @@ namespace vexo::fileindex {
 
 // The share's index for reading. Null with the slot filled, 0x0600 when there is none. The caller has raised.
 [[nodiscard]] std::unique_ptr<Database> openIndex(std::string_view share);
+// The names of that index in their order; null where they are not kept. The caller has raised.
+[[nodiscard]] std::unique_ptr<const Names> openNames(std::string_view share, Database& index);
 
 }  // namespace vexo::fileindex
 

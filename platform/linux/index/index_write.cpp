@@ -6,6 +6,7 @@
 #include "failure.h"
 #include "index/index_columns.h"
 #include "index/index_database.h"
+#include "index/index_names_format.h"
 
 namespace vexo::fileindex {
 namespace {
@@ -42,7 +43,7 @@ bool Database::begin() {
         rollBack();
         return false;
     }
-    if (ofShare_ && !readHighest()) {
+    if (ofShare_ && !readHighest(highest_)) {
         const KeepErrno keep;
         rollBack();
         return false;
@@ -50,16 +51,6 @@ bool Database::begin() {
     began_ = Clock::now();
     rows_ = 0;
     added_ = 0;
-    return true;
-}
-
-bool Database::readHighest() {
-    Statement statement;
-    if (!statement.prepare(db_, "SELECT max(highest,coalesce((SELECT max(id) FROM record),0)) FROM state") ||
-        statement.step() != Statement::kRow) {
-        return false;
-    }
-    highest_ = statement.number(0);
     return true;
 }
 
@@ -157,6 +148,8 @@ bool Database::update(const Node* set, const Node* where) {
         values.push_back(valueOf(*node));
     }
     append(values, condition->values);
+    // Names that were packed may have changed.
+    if (ofShare_ && !execute(db_, drawMark().c_str())) return written(false);
     return written(clearTarget(nodes, *condition) && change(sql + " WHERE " + condition->sql, values));
 }
 

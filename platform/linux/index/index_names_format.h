@@ -1,0 +1,31 @@
+// The file of packed names; see docs/formats/index.md.
+#ifndef VEXO_LINUX_INDEX_NAMES_FORMAT_H
+#define VEXO_LINUX_INDEX_NAMES_FORMAT_H
+
+#include <cstdint>
+#include <string>
+
+#include "index/index_database.h"
+
+namespace vexo::fileindex {
+
+// Its last character is the version. Numbers are little-endian.
+constexpr char kNamesMagic[] = "VEXONAM1";
+
+struct NamesHead {
+    char magic[8];
+    int64_t index;    // the mark of the index
+    int64_t highest;  // id of its records by then
+    uint64_t count;
+    uint64_t textsAt, textsSize;
+};
+static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__);
+
+// SQL that gives the index a new mark.
+[[nodiscard]] std::string drawMark();
+// What tells an index from others, and from itself before a name in it changed in place; 0 for none.
+[[nodiscard]] bool readMark(Database& index, int64_t& mark);
+
+}  // namespace vexo::fileindex
+
+#endif
