@@ -3,6 +3,8 @@
 #include <archive_entry.h>
 #include <sys/sysmacros.h>
 
+#include <clocale>
+
 #include "apps/task_fixture.h"
 
 namespace {
@@ -17,6 +19,7 @@ struct Packed {
 
 void pack(const std::string& path, const char* format, const char* filter, const std::vector<Packed>& members,
           const char* password = nullptr) {
+    setlocale(LC_CTYPE, "C");  // names are written as they are, whatever ran before
     archive* out = archive_write_new();
     ASSERT_EQ(archive_write_set_format_by_name(out, format), ARCHIVE_OK);
     if (filter != nullptr) {
