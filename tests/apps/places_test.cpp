@@ -44,7 +44,6 @@ class Places : public ApplianceTest {
             EXPECT_EQ(OrvLibUGIDSet(nullptr, "alice"), 0);
             body();
             takeLog();
-            return 0;
         });
     }
     static ListRequest request(const std::string& path) {
@@ -97,7 +96,6 @@ TEST_F(Places, ALinkIsToWhatWasPublished) {
             EXPECT_EQ(makeLink({.user = "alice", .sid = "", .path = asked, .password = ""}, link), 0) << asked;
             EXPECT_EQ(link.path, expected);
             takeLog();
-            return 0;
         });
     }
     asAlice([&] {

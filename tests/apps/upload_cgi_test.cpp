@@ -285,7 +285,6 @@ TEST_F(UploadCgi, AFileTakesNoMemory) {
     inChild([&] {
         const long small = peakOf(1);
         EXPECT_LT(peakOf(96 << 20) - small, 32 << 10) << "KiB";
-        return 0;
     });
 }
 

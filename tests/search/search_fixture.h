@@ -134,10 +134,7 @@ class Indexer : public OrvDirectoryWalkerCallBack {
 
 // The platform keeps databases open for the process, so what uses them runs in one of its own.
 inline void inOwnProcess(const std::function<void()>& body) {
-    inChild([&] {
-        body();
-        return 0;
-    });
+    inChild([&] { body(); });
 }
 
 class SearchFixture : public ApplianceTest {

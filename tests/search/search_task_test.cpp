@@ -84,7 +84,6 @@ TEST_F(SearchTaskTest, LifeOfATask) {
         setrlimit(RLIMIT_NOFILE, &none);  // no random device can be opened
         for (int i = 0; i < 200; ++i) ids.insert(OrvSearchDBTask::getUniqueID(volume, "bob"));
         EXPECT_EQ(ids.size(), 400U);
-        return 0;
     });
 }
 

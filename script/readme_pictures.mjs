@@ -1,8 +1,8 @@
 // The pictures of the README, made anew:
-//   ORVEL_TEST_SCREENSHOTS=$PWD/docs/screenshots tests/web/run.sh $PWD/script/server $PWD/build/dev $PWD/tests/web/readme_pictures.mjs
+//   ORVEL_TEST_SCREENSHOTS=$PWD/docs/screenshots tests/web/run.sh $PWD/script/server $PWD/build/dev $PWD/script/readme_pictures.mjs
 import { rmSync, writeFileSync } from "node:fs";
 import { test } from "node:test";
-import { browser, drawn, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+import { browser, drawn, row, rowsReady, screenshot, withPage } from "../tests/web/browser.mjs";
 
 const LOADED = ".thumbnail.loaded img";
 const SCRIPT = `#!/usr/bin/env python3

@@ -1,9 +1,9 @@
 // Pictures of the main states at three widths, light and dark, in both languages, for looking at.
-//   ORVEL_TEST_SCREENSHOTS=FOLDER tests/web/run.sh $PWD/script/server $PWD/build/dev $PWD/tests/web/screenshots.mjs
+//   ORVEL_TEST_SCREENSHOTS=FOLDER tests/web/run.sh $PWD/script/server $PWD/build/dev $PWD/script/page_pictures.mjs
 // ORVEL_TEST_ONLY: "390 dark de" makes those alone.
 import { test } from "node:test";
-import { rowsReady, screenshot, withPage } from "./browser.mjs";
-import { visitStates } from "./main_states.mjs";
+import { rowsReady, screenshot, withPage } from "../tests/web/browser.mjs";
+import { visitStates } from "../tests/web/main_states.mjs";
 
 const WIDTHS = { 1440: 900, 820: 1100, 390: 780 };
 
