@@ -192,7 +192,7 @@ void compete(std::vector<Contestant>& contestants, int rounds, std::chrono::mill
 }
 
 struct Place {
-    std::string build, root, orveld, floor, resident;
+    std::string build, root, orveld, floor, linked, resident;
 };
 
 Texts variablesOf(const std::string& user, const std::string& query, const std::string& cookie) {
@@ -239,14 +239,16 @@ int main(int count, char** words) {
     std::string work = "/tmp/request-bench-XXXXXX";
     if (mkdtemp(work.data()) == nullptr) return 1;
     chmod(work.c_str(), 0755);
-    const Place place = {words[1], work + "/root", work + "/orveld", work + "/floor", work + "/resident"};
+    const Place place = {words[1],        work + "/root",   work + "/orveld",
+                         work + "/floor", work + "/linked", work + "/resident"};
     makeAppliance(place);
     const std::string floor = place.build + "/bench/floor_request";
     const Texts environment = {"PATH=/usr/bin:/bin", "VEXO_ROOT=" + place.root, "LD_BIND_NOW=1"};  // as its unit has it
     const pid_t servers[] = {start({floor, "fork", place.floor}, environment),
+                             start({floor + "_linked", "fork", place.linked}, environment),
                              start({floor, "resident", place.resident}, environment),
                              start({place.build + "/bin/orveld", "--socket", place.orveld}, environment)};
-    for (const std::string& path : {place.floor, place.resident, place.orveld}) {
+    for (const std::string& path : {place.floor, place.linked, place.resident, place.orveld}) {
         int fd = -1;
         while ((fd = connectTo(path)) < 0) usleep(10000);
         close(fd);
@@ -260,6 +262,8 @@ int main(int count, char** words) {
     std::vector<Contestant> contestants;
     contestants.push_back(
         {"floor: SCGI, fork, 100 bytes", [&] { return exchange(place.floor, hello); }, "890123", {}, {}, {}});
+    contestants.push_back(
+        {"the same, mapping what orveld maps", [&] { return exchange(place.linked, hello); }, "890123", {}, {}, {}});
     contestants.push_back(
         {"resident FastCGI, 100 bytes", [&] { return exchange(place.resident, fastCgi()); }, "890123", {}, {}, {}});
     addRequest(contestants, place, "shares", variablesOf("alice", "action=shares", cookie), "\"success\":true");

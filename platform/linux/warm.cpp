@@ -35,6 +35,7 @@ void VEXOWarm() try {
     const vexo::KeepErrno keep;
     const int code = VLIBCErrGet();
     static_cast<void>(VexoConf::Info().Get("", ""));
+    static_cast<void>(VLIBCFileCheckKeyValue("/etc.defaults/vexoinfo.conf", "", "", 0));
     warmFiles();
     static_cast<void>(vexo::currentShares());
     std::string key;
