@@ -4,12 +4,19 @@
 
 #include "base/json_text.h"
 #include "text.h"
+#include "tus/status.h"
 #include "vexo/error.h"
 
 namespace orvel::cgi {
 namespace {
 
 std::string_view statusLine(Status status) {
+    if (status == kStatusCreated) return "Status: 201 Created\r\n";
+    if (status == kStatusNoContent) return "Status: 204 No Content\r\n";
+    if (status == kStatusConflict) return "Status: 409 Conflict\r\n";
+    if (status == kStatusLocked) return "Status: 423 Locked\r\n";
+    if (status == kStatusMismatch) return "Status: 460 Checksum Mismatch\r\n";
+    if (status == kStatusNoSpace) return "Status: 507 Insufficient Storage\r\n";
     switch (status) {
         case Status::kOk:
             return "Status: 200 OK\r\n";

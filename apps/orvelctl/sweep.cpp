@@ -27,6 +27,7 @@
 #include "orvel/task_progress.h"
 #include "search_task.h"
 #include "text.h"
+#include "tus/record.h"
 #include "upload/spool.h"
 #include "vexo/auto_block.h"
 #include "vexo/index.h"
@@ -198,10 +199,23 @@ Part sweepResults(Sweep& sweep) {
     return part;
 }
 
+// Records of uploads that nobody went on with.
+Part sweepUnfinished(Sweep& /*sweep*/) {
+    Part part;
+    const cgi::OwnSweep swept = cgi::sweepUploadRecords();
+    part.removed = swept.removed;
+    if (swept.error != 0) addError(part, "unfinished uploads", swept.error);
+    return part;
+}
+
+// What killed processes left, and bytes that no record leads to any more.
 Part sweepUploads(Sweep& sweep) {
     Part part;
-    forEachFolder(sweep, "@tmp/orvel", part, [&part](const std::string& name, const Descriptor& folder) {
-        if (name.starts_with(kUploads)) count(part, name, cgi::removeAbandonedUploads(folder));
+    const auto kept = cgi::keptUploadIds();
+    if (!kept) addError(part, "unfinished uploads", errno);
+    const auto isKept = [&kept](const std::string& id) { return !kept || kept->contains(id); };
+    forEachFolder(sweep, "@tmp/orvel", part, [&part, &isKept](const std::string& name, const Descriptor& folder) {
+        if (name.starts_with(kUploads)) count(part, name, cgi::removeAbandonedUploads(folder, isKept));
     });
     return part;
 }
@@ -264,7 +278,8 @@ constexpr struct {
     {"blocked addresses", "over", sweepAutoBlock},
     {"tasks", "older than two days", sweepTasks},
     {"search results", "without a task", sweepResults},  // behind the tasks
-    {"uploads", "left by killed processes", sweepUploads},
+    {"unfinished uploads", "at rest for two days", sweepUnfinished},
+    {"uploads", "left by killed processes", sweepUploads},  // behind their records
     {"indexes", "left by killed builds", sweepIndexes},
     {"kept listings", "at rest for an hour", sweepKept},
     {"undo records", "older than two days", sweepUndo},

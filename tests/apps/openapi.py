@@ -156,12 +156,32 @@ def checkTable():
                  for method in ("get", "post") for s in requestSchemas(program, method)} - {None, ""}
         expect(actions == named, f"{program}: its actions are {actions}, described are {named}")
         read = set(re.findall(r'Params?\((?:[\w.]+, )?"(\w+)"', code))
-        taken = {name for schema in (s for m in ("get", "post", "put") for s in requestSchemas(program, m)) for name in schema["properties"]}
+        taken = {name for schema in (s for m in ("get", "post", "put", "patch") for s in requestSchemas(program, m)) for name in schema["properties"]}
         expect(read <= taken, f"{program}: parameters {read - taken} are not described")
-        allowed = send(program, "DELETE", {}, "alice")[1]["Allow"]
+        refused = "PUT" if program == "tus" else "DELETE"
+        allowed = send(program, refused, {}, "alice")[1]["Allow"]
         methods = {m.lower() for m in allowed.split(", ")} - {"head"}
         expect(methods == set(described["paths"]["/cgi-bin/" + program]), f"{program}: methods {allowed}")
-        ask(program, "DELETE", {}, status=405, success=False, whole=False)
+        ask(program, refused, {}, status=405, success=False, whole=False)
+
+
+def checkResumed():
+    """An upload in two pieces; what has no body is held against its status alone."""
+    version = {"Tus-Resumable": "1.0.0"}
+    piece = version | {"Content-Type": "application/offset+octet-stream"}
+    asked = {"path": "/projects/resumed", "conflict": "overwrite", "mtime": 1}
+    begun = ask("tus", "POST", asked, status=201, headers=version | {"Upload-Length": "4"})
+    ask("tus", "GET", {}, whole=False)
+    ask("tus", "POST", asked, status=412, success=False, headers={"Upload-Length": "4"})
+    known = set(map(int, described["paths"]["/cgi-bin/tus"]["patch"]["responses"]))
+    one = {"id": begun["data"]["id"]}
+    for method, headers, body, status in (("OPTIONS", {}, None, 204), ("PATCH", piece | {"Upload-Offset": "0"}, b"te", 204),
+                                          ("PATCH", piece | {"Upload-Offset": "0"}, b"te", 409),
+                                          ("PATCH", piece | {"Upload-Offset": "2", "Upload-Checksum": "md5 kAFQmDzST7DWlj99KOF/cg=="}, b"xt", 460),
+                                          ("PATCH", piece | {"Upload-Offset": "2"}, b"xt", 204), ("DELETE", version, None, 204),
+                                          ("DELETE", version, None, 404)):
+        got = send("tus", method, one, "alice", body, headers)[0]
+        expect(got == status and status in known, f"{method} tus: status {got}, not {status}")
 
 
 def checkRefusals():
@@ -259,6 +279,7 @@ def checkCoverage():
 checkText(described)
 checkTable()
 checkRequests()
+checkResumed()
 checkRefusals()
 checkCoverage()
 for failure in failures:

@@ -80,6 +80,20 @@ check_requests() {
     expect "a zip" 200 "$(code "$(url "download?path=/photo/$server")")"
 }
 
+# An upload in pieces: methods, statuses and headers that nothing else uses.
+check_pieces() {
+    local at piece=(-H 'Tus-Resumable: 1.0.0' -H 'Expect:' -H 'Content-Type: application/offset+octet-stream' -X PATCH --data-binary @-)
+    expect "abilities" 204 "$(code -X OPTIONS "$(url tus)")"
+    at=$(url "tus$(ask -o /dev/null -D - -X POST -H 'Content-Length: 0' -H 'Tus-Resumable: 1.0.0' -H 'Upload-Length: 3000000' \
+        "$(url "tus?path=/photo/$server/pieces")" | tr -d '\r' | sed -n 's/^[Ll]ocation: *\(.*\)/\1/p')")
+    expect "first piece" 204 "$(head -c 1000000 "$work/data" | code "${piece[@]}" -H 'Upload-Offset: 0' "$at")"
+    expect "a wrong sum" 460 "$(echo x | code "${piece[@]}" -H 'Upload-Offset: 1000000' -H 'Upload-Checksum: md5 kAFQmDzST7DWlj99KOF/cg==' "$at")"
+    expect "how much" 1000000 "$(ask -I -H 'Tus-Resumable: 1.0.0' "$at" | tr -d '\r' | sed -n 's/^[Uu]pload-[Oo]ffset: //p')"
+    expect "the rest" 204 "$(tail -c +1000001 "$work/data" | code "${piece[@]}" -H 'Upload-Offset: 1000000' "$at")"
+    ask "$(url "download?path=/photo/$server/pieces")" | cmp -s - "$work/data" || expect "pieces" same different
+    expect "its end" "204 404" "$(code -X DELETE -H 'Tus-Resumable: 1.0.0' "$at") $(code -X DELETE -H 'Tus-Resumable: 1.0.0' "$at")"
+}
+
 begin_upload() { # fd variable, name
     local login
     login=$(printf 'alice:%s' "$(password alice)" | base64 -w 0)
@@ -141,6 +155,7 @@ for server in "$@"; do
     before=$failures
     serve
     check_requests
+    check_pieces
     check_address
     check_slow
     stop KILL

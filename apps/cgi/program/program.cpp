@@ -23,19 +23,21 @@ constexpr std::int64_t kSmallForm = std::int64_t{64} << 10;     // a name, and a
 constexpr std::int64_t kPreferences = std::int64_t{256} << 10;  // percent-encoded up to three times as long
 constexpr std::string_view kAsking = "GET, HEAD, POST";
 
-constexpr Program kPrograms[] = {{"list", kAsking, kForm, Caller::kUser, true, serveListProgram},
-                                 {"download", kAsking, kLongForm, Caller::kUser, true, serveDownloadProgram},
-                                 {"link", kAsking, kForm, Caller::kUser, false, serveLinkProgram},
-                                 {"login", kAsking, kSmallForm, Caller::kAnybody, false, serveLogInProgram},
-                                 {"logout", "POST", kSmallForm, Caller::kAnybody, false, serveLogOutProgram},
-                                 {"operation", kAsking, kForm, Caller::kUser, false, serveOperationProgram},
-                                 {"preferences", kAsking, kPreferences, Caller::kUser, false, servePreferencesProgram},
-                                 {"search", kAsking, kForm, Caller::kUser, false, serveSearchProgram},
-                                 {"sessions", "GET, HEAD", kForm, Caller::kAnybody, true, serveSessionsProgram},
-                                 {"share", kAsking, kForm, Caller::kAnybody, false, serveShareProgram},
-                                 {"thumbnail", kAsking, kForm, Caller::kUser, true, serveThumbnailProgram},
-                                 {"upload", "POST, PUT", kAnyLength, Caller::kUser, false, serveUploadProgram},
-                                 {"why", kAsking, kForm, Caller::kUser, true, serveWhyProgram}};
+constexpr Program kPrograms[] = {
+    {"list", kAsking, kForm, Caller::kUser, true, serveListProgram},
+    {"download", kAsking, kLongForm, Caller::kUser, true, serveDownloadProgram},
+    {"link", kAsking, kForm, Caller::kUser, false, serveLinkProgram},
+    {"login", kAsking, kSmallForm, Caller::kAnybody, false, serveLogInProgram},
+    {"logout", "POST", kSmallForm, Caller::kAnybody, false, serveLogOutProgram},
+    {"operation", kAsking, kForm, Caller::kUser, false, serveOperationProgram},
+    {"preferences", kAsking, kPreferences, Caller::kUser, false, servePreferencesProgram},
+    {"search", kAsking, kForm, Caller::kUser, false, serveSearchProgram},
+    {"sessions", "GET, HEAD", kForm, Caller::kAnybody, true, serveSessionsProgram},
+    {"share", kAsking, kForm, Caller::kAnybody, false, serveShareProgram},
+    {"thumbnail", kAsking, kForm, Caller::kUser, true, serveThumbnailProgram},
+    {"tus", "OPTIONS, GET, HEAD, POST, PATCH, DELETE", kAnyLength, Caller::kUser, false, serveTusProgram},
+    {"upload", "POST, PUT", kAnyLength, Caller::kUser, false, serveUploadProgram},
+    {"why", kAsking, kForm, Caller::kUser, true, serveWhyProgram}};
 
 std::string_view variable(const char* name) {
     const char* value = getenv(name);

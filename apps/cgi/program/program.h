@@ -49,6 +49,7 @@ void servePreferencesProgram(Request& request, Output& out);
 void serveSearchProgram(Request& request, Output& out);
 void serveShareProgram(Request& request, Output& out);
 void serveThumbnailProgram(Request& request, Output& out);
+void serveTusProgram(Request& request, Output& out);
 void serveUploadProgram(Request& request, Output& out);
 void serveWhyProgram(Request& request, Output& out);
 

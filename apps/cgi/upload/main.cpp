@@ -14,10 +14,7 @@
 // "data" of the reply is {"files":[{"path","size","skipped"}]}. The first file that cannot be stored ends the request;
 // those before it stay, and are listed in "data" beside the error. Folders that do not exist are made.
 #include <json/value.h>
-#include <unistd.h>
 
-#include <algorithm>
-#include <cerrno>
 #include <cstdint>
 #include <cstdlib>
 #include <ctime>
@@ -34,13 +31,13 @@
 #include "request.h"
 #include "search_task.h"
 #include "text.h"
+#include "upload/body.h"
 #include "upload/store.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
 namespace {
 
-constexpr size_t kPiece = size_t{256} * 1024;
 constexpr size_t kLongestField = 64 * 1024;
 
 std::optional<_tag__type_> modeOf(const std::string& word) {
@@ -92,24 +89,6 @@ struct Outcome {
         return true;
     }
 };
-
-// Reads the announced body piece by piece. False when `take` refused one; `whole` says whether the body came to its own
-// end.
-template <class Take>
-bool readBody(long long length, bool& whole, Take take) {
-    std::string piece(kPiece, '\0');
-    long long left = length;
-    while (left > 0 && isCancelled() == 0) {
-        const size_t wanted = std::min(kPiece, static_cast<size_t>(left));
-        const ssize_t got = read(0, piece.data(), wanted);
-        if (got < 0 && errno == EINTR) continue;
-        if (got <= 0) break;  // the client hung up
-        left -= got;
-        if (!take(std::string_view(piece.data(), static_cast<size_t>(got)))) return false;
-    }
-    whole = left == 0;
-    return true;
-}
 
 std::string variable(const char* name) {
     const char* value = getenv(name);
@@ -225,13 +204,6 @@ void storeForm(const User& user, const VEXO::WebCGI& web, const std::string& bou
     if (outcome.code != ORV_ERR_NONE) return;
     if (reader.status() == MultipartReader::Status::kMalformed) outcome.refuse(CGI_UPLOAD_BAD_FORM, "");
     if (reader.status() == MultipartReader::Status::kMore) outcome.refuse(CGI_UPLOAD_TORN_FORM, "");
-}
-
-// Nothing for a length that is missing, no number or more than a file can have.
-std::optional<long long> bodyLength() {
-    const auto length = parseNumber(variable("CONTENT_LENGTH"));
-    if (!length || *length > static_cast<unsigned long>(INT64_MAX)) return std::nullopt;
-    return static_cast<long long>(*length);
 }
 
 void receive(const User& user, const VEXO::WebCGI& web, Outcome& outcome) {

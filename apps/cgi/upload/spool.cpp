@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <sys/statvfs.h>
 
 #include <array>
 #include <cerrno>
@@ -25,12 +26,14 @@ constexpr time_t kAbandonedAfter = 3600;  // seconds
 
 // What nobody holds the lock of and has not been written to for a while (a file is unlocked for a moment after it was
 // made).
-long removeAbandonedUploads(const Descriptor& folder) {
+long removeAbandonedUploads(const Descriptor& folder, const std::function<bool(const std::string& id)>& isKept) {
     std::vector<std::string> names;
     if (!namesIn(folder.get(), Hidden::kInclude, names)) return -1;
     long removed = 0;
     for (const std::string& name : names) {
-        if (!name.starts_with(kPrefix) && !isPartName(name)) continue;
+        const bool between = name.starts_with(kKeptPrefix);
+        if (between && (isKept == nullptr || isKept(name.substr(kKeptPrefix.size())))) continue;
+        if (!between && !name.starts_with(kPrefix) && !isPartName(name)) continue;
         const Descriptor file(openat(folder.get(), name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
         struct stat status {};
         const bool old = file && fstat(file.get(), &status) == 0 && status.st_mtime < time(nullptr) - kAbandonedAfter;
@@ -97,18 +100,50 @@ int Spool::open(const std::string& volumePath) {
     return ORV_ERR_NONE;
 }
 
+int Spool::openKept(const std::string& volumePath, const std::string& id, bool make) {
+    const int code = openFolder(volumePath);
+    if (code != ORV_ERR_NONE) return code;
+    if (make) static_cast<void>(removeAbandonedUploads(folder_));
+    name_.assign(kKeptPrefix).append(id);
+    const int how = make ? O_CREAT | O_EXCL : 0;
+    kept_ = openFile(folder_.get(), name_.c_str(), O_RDWR | O_APPEND | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | how, 0600);
+    struct stat status {};
+    if (!kept_ || fstat(kept_.get(), &status) != 0) return uploadCodeOf(errno);
+    if (!S_ISREG(status.st_mode)) return ORV_ERR_MISSING;
+    size_ = status.st_size;
+    return ORV_ERR_NONE;
+}
+
+void Spool::removeKept() {
+    if (kept_) unlinkat(folder_.get(), name_.c_str(), 0);
+}
+
+bool Spool::cut(long long size) {
+    if (ftruncate(fd(), size) != 0) return false;
+    size_ = size;
+    return true;
+}
+
+long long Spool::freeBytes() const {
+    struct statvfs system {};
+    if (fstatvfs(fd(), &system) != 0) return -1;
+    const auto blocks = static_cast<long long>(geteuid() == 0 ? system.f_bfree : system.f_bavail);
+    return blocks * static_cast<long long>(system.f_frsize);
+}
+
 int Spool::write(std::string_view data) {
-    if (!writeAll(file_->get(), data)) return uploadCodeOf(errno);
+    if (!writeAll(fd(), data)) return uploadCodeOf(errno);
     size_ += static_cast<off_t>(data.size());
     return ORV_ERR_NONE;
 }
 
 bool Spool::setModified(time_t time) const {
     const std::array<timespec, 2> times = {{{.tv_sec = 0, .tv_nsec = UTIME_OMIT}, {.tv_sec = time, .tv_nsec = 0}}};
-    return futimens(file_->get(), times.data()) == 0;
+    return futimens(fd(), times.data()) == 0;
 }
 
 std::string Spool::publish() {
+    if (kept_) return folder_.path(name_);
     if (!named_) named_ = file_->publish(name_, false);
     return named_ ? folder_.path(name_) : "";
 }

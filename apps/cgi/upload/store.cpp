@@ -9,6 +9,7 @@
 
 #include "base/new_file.h"
 #include "download/range.h"
+#include "free_names.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
 #include "orvel/file_info.h"
@@ -23,6 +24,7 @@
 namespace orvel::cgi {
 namespace {
 
+constexpr int kMostNames = 1000;  // that are tried beside one that is taken
 volatile std::sig_atomic_t terminated = 0;
 
 std::string tagOf(const struct stat& status) {
@@ -34,6 +36,14 @@ void prepareVolume(std::string volumePath) {
     static_cast<void>(openTemporaryFolder(volumePath));
     static_cast<void>(OrvCreateTmpDir(volumePath.data()));
     umask(022);  // that of every other file
+}
+
+// An inode number and the time of its birth: which folder it is, also after a restart, when devices have other numbers.
+std::string folderIdentity(int folder) {
+    struct statx status {};
+    if (statx(folder, "", AT_EMPTY_PATH, STATX_INO | STATX_BTIME, &status) != 0) return "";
+    return std::to_string(status.stx_ino) + "." + std::to_string(status.stx_btime.tv_sec) + "." +
+           std::to_string(status.stx_btime.tv_nsec);
 }
 
 // Waits for the target's name, and those of the folders that were made for it.
@@ -55,6 +65,12 @@ int isCancelled() {
 }
 
 int Upload::begin() {
+    int code = enter();
+    if (code == ORV_ERR_NONE) code = check();
+    return code != ORV_ERR_NONE || skipped_ ? code : spool_.open(info_.volumePath);
+}
+
+int Upload::enter() {
     OrvLibSetErr(ORV_ERR_NONE);
     if (path_.find('\0') != std::string::npos) return ORV_ERR_PARAMETER;  // would be cut there
     if (!PathInfoFactory::create(user_.name.c_str(), path_, info_)) return lastCode();
@@ -64,10 +80,8 @@ int Upload::begin() {
     const char* user = user_.name.c_str();
     // The share's rules alone, as yet: what is at the path shows once the process is the user (see inspect()).
     _tag__type_ rules = OVERWRITE_MODE_SKIP;
-    if (!CheckShareUploadPrivilege(user, user_.sid.c_str(), path_.c_str(), rules)) return lastCode();
-    const int code = actAs(user_.sid.c_str(), user_.name, IsDirUserHome(path_, nullptr));
-    if (code != ORV_ERR_NONE) return code;
-    return inspect();
+    rules_ = CheckShareUploadPrivilege(user, user_.sid.c_str(), path_.c_str(), rules) ? ORV_ERR_NONE : lastCode();
+    return actAs(user_.sid.c_str(), user_.name, IsDirUserHome(path_, nullptr));
 }
 
 // Whether what is at the path may be replaced, before the data comes.
@@ -90,14 +104,22 @@ int Upload::inspect() {
     if (code != ORV_ERR_NONE) return code;
     bool there = false;
     code = judge(target, there);
-    if (code != ORV_ERR_NONE) return code;
+    if (code != ORV_ERR_NONE && !(keepBoth_ && code == ORV_ERR_EXISTS)) return code;
     const std::string share = path_.substr(0, path_.size() - (info_.realPath.size() - info_.shareRoot.size()));
-    code = CheckFile(share + within, user_.name.c_str(), user_.sid.c_str(), mode_);
+    _tag__type_ beside = OVERWRITE_MODE_SKIP;
+    code = CheckFile(share + within, user_.name.c_str(), user_.sid.c_str(), keepBoth_ ? beside : mode_);
     if (code != ORV_ERR_NONE) return code;
     // The share may have made "skip" of it: files that are there stay.
     if (mode_ == OVERWRITE_MODE_SKIP && !condition_.match.empty()) return ORV_ERR_DENIED;
     skipped_ = there && mode_ == OVERWRITE_MODE_SKIP;
-    return skipped_ ? ORV_ERR_NONE : spool_.open(info_.volumePath);
+    return ORV_ERR_NONE;
+}
+
+std::string Upload::folderNow() const {
+    Target target;
+    std::string within;
+    const int code = previewTarget(info_, linkPolicyOf(info_.shareName), target, within);
+    return code == ORV_ERR_NONE && target.folder ? folderIdentity(target.folder.get()) : "";
 }
 
 int Upload::write(std::string_view data) {
@@ -138,12 +160,26 @@ int Upload::replace(const std::string& source, const std::string& place, const V
     return errno == ETXTBSY ? kUploadInUse : uploadCodeOf(errno);
 }
 
-int Upload::finish() {
+// Under the name that was asked for, or one beside it.
+int Upload::putNamed(Target& target, const std::function<bool(int number)>& naming) {
+    const std::string wanted = target.name;
+    for (int number = 1;; ++number) {
+        if (naming != nullptr && !naming(number)) return uploadCodeOf(errno);
+        const int code = put(target);
+        if (!keepBoth_ || code != ORV_ERR_EXISTS || number == kMostNames) return code;
+        target.name = numberedName(wanted, number + 1, false);
+        path_ = path_.substr(0, path_.rfind('/') + 1) + target.name;
+    }
+}
+
+int Upload::finish(const std::function<bool(int number)>& naming) {
     if (skipped_) return ORV_ERR_NONE;
     Target target;
-    int code = openTarget(info_, linkPolicyOf(info_.shareName), user_.name, Missing::kMake, target);
+    const Missing missing = folder_.empty() ? Missing::kMake : Missing::kRefuse;
+    int code = openTarget(info_, linkPolicyOf(info_.shareName), user_.name, missing, target);
     if (code != ORV_ERR_NONE) return code;
-    code = put(target);
+    if (!folder_.empty() && folderIdentity(target.folder.get()) != folder_) return ORV_ERR_MISSING;
+    code = putNamed(target, naming);
     if (skipped_) return ORV_ERR_NONE;
     if (code != ORV_ERR_NONE) {
         removeMadeFolders(target);

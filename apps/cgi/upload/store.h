@@ -5,10 +5,12 @@
 #include <sys/stat.h>
 
 #include <ctime>
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
 
+#include "orvel/error_state.h"
 #include "orvel/privilege.h"
 #include "request.h"
 #include "target.h"
@@ -51,9 +53,21 @@ class Upload {
 
     // Asks every rule and takes on the user's identity.
     int begin();
+    // The steps of begin() for data that stays between requests, in the spool that the caller opens: identity, and what
+    // the rules say of it now.
+    int enter();
+    int check() { return rules_ != ORV_ERR_NONE ? rules_ : inspect(); }
+    // A name that is taken leads to one beside it.
+    void keepBoth() { keepBoth_ = true; }
+    // Which folder it is that the file will be in, "" where it is not there yet; finish() puts the file into no other.
+    [[nodiscard]] std::string folderNow() const;
+    void expectFolder(std::string folder) { folder_ = std::move(folder); }
+    Spool& spool() { return spool_; }
+    [[nodiscard]] const std::string& volumePath() const { return info_.volumePath; }
     int write(std::string_view data);
-    // Puts the file in place and logs it. On 0 it is on the disk, under its name.
-    int finish();
+    // Puts the file in place and logs it. On 0 it is on the disk, under its name. `naming` is called before each name
+    // that is tried (1: the one that was asked for, see keepBoth), false ends it.
+    int finish(const std::function<bool(int number)>& naming = nullptr);
 
     // An existing file was left as it is, as asked for; what is written is not kept. Known after begin().
     [[nodiscard]] bool skipped() const { return skipped_; }
@@ -65,6 +79,7 @@ class Upload {
  private:
     int inspect();
     int judge(const Target& target, bool& there) const;
+    int putNamed(Target& target, const std::function<bool(int number)>& naming);
     int put(const Target& target);
     int replace(const std::string& source, const std::string& place, const VEXOCOPYOPT& options);
     static int isExpected(const struct stat* old, const struct stat* fresh, void* upload);
@@ -77,6 +92,9 @@ class Upload {
     Condition condition_;
     std::string tag_;
     bool skipped_ = false;
+    bool keepBoth_ = false;
+    int rules_ = ORV_ERR_NONE;  // of the share
+    std::string folder_;        // that is expected
     PathInfo info_;
     Spool spool_;
 };
