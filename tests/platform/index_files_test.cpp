@@ -181,6 +181,20 @@ TEST_F(IndexFilesTest, AnIndexIsReplacedAsAWholeByOneAtATime) {
     EXPECT_EQ(statusOf(store_).st_mode & 0777, 0700U);
 }
 
+// Who removes a record to write it anew may be killed at any time.
+TEST_F(IndexFilesTest, ABatchDoesNotEndBehindARemoval) {
+    build({{"a"}});
+    ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path_, sizeof path_), 0);
+    for (int i = 0; i < 15; ++i) ASSERT_EQ(insert(path_, {"b" + std::to_string(i)}), 0);
+    usleep(350000);  // old enough to be committed
+    Cond where = node(FI_COL_PATH, FI_OP_EQUAL, "a");
+    ASSERT_EQ(FILEIDXDBDel(path_, &where), 0);
+    const std::string index = path_;
+    EXPECT_EQ(ask(index, "SELECT count(*) FROM record WHERE path='a'"), 1);
+    ASSERT_EQ(FILEIDXIndexEnd("photo", 1), 0);
+    EXPECT_EQ(ask(index, "SELECT count(*) FROM record WHERE path='a'"), 0);
+}
+
 TEST_F(IndexFilesTest, AnUpdateKeepsNamesFindable) {
     build({{"a/Holiday.jpg"}, {"a/work.txt"}, {"b/holiday.png"}});
     ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path_, sizeof path_), 0);

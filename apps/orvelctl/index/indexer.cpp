@@ -162,7 +162,8 @@ void Indexer::visit(const std::string& folder, const Row& stored, bool everythin
     const int64_t seen = kernelClock();
     const Presence presence = files_.status(folder, own.status);
     if (presence == Presence::kUnknown) noteUnread("/" + folder + " cannot be read: " + std::strerror(errno));
-    // One that went this moment has changed the folder above, which the next update sees.
+    // The folder above may be gone from the index, and then nothing else would find this one.
+    if (presence == Presence::kGone) return removeTree(folder, true);
     if (presence != Presence::kThere || !own.isFolder()) return;
 
     const FolderState state = judgeFolder(stored.times, timesOf(own.status), changed_.contains(parent));

@@ -155,10 +155,13 @@ bool Database::update(const Node* set, const Node* where) {
 
 bool Database::remove(const Node* where) {
     const std::optional<Condition> condition = readCondition(where, {});
-    if (!condition || !begin()) return false;
+    // A batch may end before a record is removed, but not behind: what is written in its place must not be missing.
+    if (!condition || (began_ && rows_ >= kBatchRows && !commit()) || !begin()) return false;
     const bool done = change("DELETE FROM record WHERE " + condition->sql, condition->values);
-    if (done) added_ -= sqlite3_changes64(db_);
-    return written(done);
+    if (!done) return written(false);
+    added_ -= sqlite3_changes64(db_);
+    ++rows_;
+    return true;
 }
 
 }  // namespace vexo::fileindex
