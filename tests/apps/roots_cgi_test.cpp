@@ -96,6 +96,41 @@ void RootsCgi::refuseTemporaryFolder(const std::string& top) {
     }
 }
 
+// What was begun in a share while it was open leads nowhere once an option closes it.
+TEST_F(RootsCgi, AClosedShareIsClosedToAllThatWasBegunInIt) {
+    SKIP_WITHOUT_ROOT();
+    support::makeFolder(shareRoot("photo"), 0777);
+    const auto define = [this](const std::string& option) {
+        addShare("photo", "read only = no\nvexo:index = yes\n" + option);
+    };
+    define("");
+    EXPECT_EQ(upload("/photo/one.txt") + upload("/photo/a/two.txt"), 0);
+    EXPECT_EQ(support::runProgram({ORVELCTL, "index", "build", "photo"}).status, 0);
+    EXPECT_EQ(rows(search("/photo")), "/photo/a/two.txt /photo/one.txt ");
+    const std::string kept = get(PROGRAM_LIST, "action=folder&keep=1&path=/photo/a").json["data"]["listing"].asString();
+    const std::string link = post(PROGRAM_LINK, "action=create&path=/photo/a").json["data"]["id"].asString();
+    const std::string undo =
+        ask("alice", "action=rename&name=3.txt&path=/photo/one.txt").json["data"]["undo"].asString();
+    const auto all = [&] {
+        const Names replies = {
+            get(PROGRAM_LIST, "action=folder&path=/photo/a").body,
+            get(PROGRAM_LIST, "action=page&listing=" + kept).body,
+            support::runCgi(PROGRAM_DOWNLOAD, "alice", "GET", "path=/photo/a/two.txt"),
+            support::runCgi(PROGRAM_SHARE, "", "GET", "FOLDER_SHARING=" + link + "&action=download&path=two.txt"),
+            support::runProgram({ORVELCTL, "search", "/photo", "--user", "alice", "--name", "two*"}).output};
+        std::string found;
+        for (const std::string& reply : replies) {
+            found += reply.empty() || reply.find("\"success\":false") != std::string::npos ? "0" : "1";
+        }
+        return found;
+    };
+    EXPECT_EQ(all(), "11111");
+    define("hosts allow = 10.\n");
+    EXPECT_EQ(all(), "00000");
+    EXPECT_NE(errors(ended("alice", start("alice", "action=undo&taskid=" + undo))), "");
+    EXPECT_TRUE(fs::exists(shareRoot("photo") + "/3.txt")) << "nothing is undone there";
+}
+
 TEST_F(RootsCgi, EverythingWorksAtAnyDepth) {
     SKIP_WITHOUT_ROOT();
     const std::string deep = photo_ + "/srv/samba/team", options = "read only = no\nvexo:index = yes\npath = ";
