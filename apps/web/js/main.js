@@ -22,7 +22,7 @@ import { context, runCommand } from "./commands.js";
 import { setWhy } from "./dialogs.js";
 import { $, h, keepFocus, loadIcons } from "./dom.js";
 import { setupDragAndDrop } from "./dragdrop.js";
-import { emit, on } from "./events.js";
+import { arrived, emit, on } from "./events.js";
 import { filterHome, homeNode, paintVolume } from "./home.js";
 import { setupKeys } from "./keys.js";
 import "./links.js";
@@ -306,6 +306,7 @@ async function start() {
   document.body.classList.add("started");
   setupTasks();
   followAddress().finally(() => emit("arrived"));
+  arrived.then(() => import("./unfinished.js")).then(({ showUnfinished }) => showUnfinished());
 }
 
 start().catch((failure) => {

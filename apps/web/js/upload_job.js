@@ -7,6 +7,7 @@ import { entryAt } from "./sources.js";
 import { modifiedOf, sendFiles } from "./upload_request.js";
 
 const EXISTS = 414;
+const LARGE = 8 * 1024 * 1024; // goes on where it was cut off; smaller ones begin anew
 const MOST_TRIES = 20;
 const MOST_IN_VAIN = 4; // tries that brought no byte across although the server answers: the file cannot be read
 let asking = Promise.resolve();
@@ -18,6 +19,8 @@ export class Job {
     this.meets = null; // what has its name already
     this.alone = false; // not with others in one request
     this.sent = false; // it may have arrived before
+    this.upload = null; // of a large file: its id
+    this.arrived = 0; // of that: bytes on the server's disk
     this.reset();
   }
 
@@ -60,6 +63,7 @@ export class Job {
     if (answer === "both") return this.sendBeside();
     if (answer === "overwrite") return this.send("overwrite");
     this.state = answer === null ? "cancelled" : "skipped";
+    if (this.upload) this.discard();
     return undefined;
   }
 
@@ -83,6 +87,7 @@ export class Job {
   }
 
   async sendBeside() {
+    if (this.isLarge) return this.send("keep_both");
     const [stem, extension] = splitExtension(nameOf(this.id));
     const folder = parentOf(this.id);
     for (let n = 2; ; ++n) {
@@ -95,13 +100,16 @@ export class Job {
     }
   }
 
-  // Tries again when the connection broke, as often as something came across.
+  // Tries again when the connection broke, as often as something came across; what is on the server's disk is no attempt
+  // in vain.
   async send(overwrite) {
     let inVain = 0;
     for (let tries = 1; ; ++tries) {
+      const { arrived } = this;
       try {
-        return await this.put(overwrite);
+        return await (this.isLarge ? this.putLarge(overwrite) : this.put(overwrite));
       } catch (failure) {
+        if (this.arrived > arrived) tries = 1;
         // The try before may have arrived whole, and only its answer got lost.
         if (failure.code === EXISTS && this.sent && (await this.found()).size === this.file.size) return this.stored();
         inVain = this.loaded > 0 ? 0 : inVain + 1;
@@ -137,9 +145,44 @@ export class Job {
     if (reply) this.stored();
   }
 
+  get isLarge() {
+    return this.file.size >= LARGE;
+  }
+
+  async putLarge(conflict) {
+    const { sendResumable } = await import("./upload_resume.js");
+    const done = await sendResumable(this.id, this.file, {
+      conflict,
+      known: this.upload,
+      onUpload: (id) => {
+        this.upload = id;
+        if (this.state === "cancelled") this.discard();
+      },
+      onBegin: (request) => {
+        this.request = request;
+      },
+      onOffset: (bytes, onDisk = false) => {
+        this.loaded = bytes;
+        if (onDisk) this.arrived = bytes;
+        this.batch.paintSoon();
+      },
+      wait: (promise) => this.batch.pauseFor(promise).then(() => this.state !== "cancelled"),
+    });
+    if (!done || this.state === "cancelled") return;
+    this.id = done.path;
+    if (done.skipped) this.state = "skipped";
+    else this.stored();
+  }
+
+  async discard() {
+    const { discard } = await import("./upload_resume.js");
+    if (this.upload) discard(this.upload).catch(() => {});
+  }
+
   cancel() {
     if (this.state !== "waiting" && this.state !== "running") return;
     this.state = "cancelled";
     this.request?.abort();
+    if (this.upload) this.discard();
   }
 }

@@ -21,6 +21,7 @@ const EXISTS = 414;
 const REPAINT = 100; // milliseconds between two looks at all files of an upload
 
 const queue = [];
+const batches = new Set(); // whose cards are there
 let running = 0;
 
 export function chooseFiles(folders) {
@@ -69,7 +70,9 @@ class Batch {
     this.paused = 0; // files that wait for the connection
     this.bytes = this.jobs.reduce((sum, job) => sum + job.file.size, 0);
     this.begun = performance.now();
-    this.card = new Card({ iconName: "upload", onCancel: () => this.cancel(), title: this.title() });
+    batches.add(this);
+    const onRemove = () => batches.delete(this);
+    this.card = new Card({ iconName: "upload", onCancel: () => this.cancel(), onRemove, title: this.title() });
   }
 
   title() {
@@ -196,6 +199,11 @@ class Batch {
       if (browser.id === this.target) refresh();
     }, wait);
   }
+}
+
+// Whether this page is at work on the upload of that id.
+export function isUploading(id) {
+  return [...batches].some((batch) => batch.jobs.some((job) => job.upload === id && ["waiting", "running"].includes(job.state)));
 }
 
 // Somebody else is logged in: what waits is not theirs, and cannot be sent.
