@@ -60,6 +60,7 @@ for (const user of NAMES) {
 const { part, deviations } = compare(times.alice, times.alina);
 console.log(`the known name took longer in ${(100 * part).toFixed(2)} % of pairs, ${deviations.toFixed(2)} standard deviations from half`);
 console.log(`${begun} guesses in ${((performance.now() - from) / 1000).toFixed(0)} s; other answers: ${JSON.stringify(others)}`);
-assert.ok(times.alice.length + times.alina.length >= guesses * 0.99, "nearly all are judged");
+// A machine that has other work may turn some away (503).
+assert.ok(times.alice.length + times.alina.length >= guesses * 0.9, "most are judged");
 // By chance once in 15,000 runs.
 assert.ok(Math.abs(deviations) < 4, "the times of the two differ");
