@@ -12,11 +12,12 @@ namespace orvel::cgi {
 
 // Properties of the record.
 inline constexpr const char* kVolumeProperty = "volume";
-inline constexpr const char* kSharesProperty = "shares";     // {name: "index" or "walk"}
-inline constexpr const char* kIndexesProperty = "indexes";   // {name: {"updated","live"}}, as the search began
-inline constexpr const char* kLeftOutProperty = "left_out";  // [folder]: without what network mounts below it hold
-inline constexpr const char* kStoppedProperty = "stopped";   // true when it was ended before it had seen everything
-inline constexpr const char* kCodeProperty = "code";         // library code of a failure
+inline constexpr const char* kSharesProperty = "shares";      // {name: "index" or "walk"}
+inline constexpr const char* kSearchedProperty = "searched";  // [path of a share], percent-encoded
+inline constexpr const char* kIndexesProperty = "indexes";    // {name: {"updated","live"}}, as the search began
+inline constexpr const char* kLeftOutProperty = "left_out";   // [folder]: without what network mounts below it hold
+inline constexpr const char* kStoppedProperty = "stopped";    // true when it was ended before it had seen everything
+inline constexpr const char* kCodeProperty = "code";          // library code of a failure
 
 // An id as the library makes them: it can name nothing but a task.
 bool isTaskId(const std::string& text);

@@ -107,6 +107,7 @@ TEST_F(RootsCgi, AClosedShareIsClosedToAllThatWasBegunInIt) {
     EXPECT_EQ(upload("/photo/one.txt") + upload("/photo/a/two.txt"), 0);
     EXPECT_EQ(support::runProgram({ORVELCTL, "index", "build", "photo"}).status, 0);
     EXPECT_EQ(rows(search("/photo")), "/photo/a/two.txt /photo/one.txt ");
+    const std::string found = search("/photo");
     const std::string kept = get(PROGRAM_LIST, "action=folder&keep=1&path=/photo/a").json["data"]["listing"].asString();
     const std::string link = post(PROGRAM_LINK, "action=create&path=/photo/a").json["data"]["id"].asString();
     const std::string undo =
@@ -115,18 +116,19 @@ TEST_F(RootsCgi, AClosedShareIsClosedToAllThatWasBegunInIt) {
         const Names replies = {
             get(PROGRAM_LIST, "action=folder&path=/photo/a").body,
             get(PROGRAM_LIST, "action=page&listing=" + kept).body,
+            get(PROGRAM_SEARCH, "action=list&taskid=" + found).body,
             support::runCgi(PROGRAM_DOWNLOAD, "alice", "GET", "path=/photo/a/two.txt"),
             support::runCgi(PROGRAM_SHARE, "", "GET", "FOLDER_SHARING=" + link + "&action=download&path=two.txt"),
             support::runProgram({ORVELCTL, "search", "/photo", "--user", "alice", "--name", "two*"}).output};
-        std::string found;
+        std::string open;
         for (const std::string& reply : replies) {
-            found += reply.empty() || reply.find("\"success\":false") != std::string::npos ? "0" : "1";
+            open += reply.empty() || reply.find("\"success\":false") != std::string::npos ? "0" : "1";
         }
-        return found;
+        return open;
     };
-    EXPECT_EQ(all(), "11111");
+    EXPECT_EQ(all(), "111111");
     define("hosts allow = 10.\n");
-    EXPECT_EQ(all(), "00000");
+    EXPECT_EQ(all(), "000000");
     EXPECT_NE(errors(ended("alice", start("alice", "action=undo&taskid=" + undo))), "");
     EXPECT_TRUE(fs::exists(shareRoot("photo") + "/3.txt")) << "nothing is undone there";
 }

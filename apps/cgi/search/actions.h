@@ -5,6 +5,7 @@
 #include <json/value.h>
 
 #include <optional>
+#include <string>
 
 #include "listing.h"
 #include "request.h"
@@ -32,8 +33,9 @@ std::optional<ListRequest> parsePage(const User& user, const VEXO::WebCGI& web);
 struct ResultPage {
     Json::Value state;
     Listing listing;
+    std::string culprit;  // path to name when it is refused
 };
-// 0 or a library code.
+// 0 or a library code; 407 once one of the shares has been closed to the user.
 int readPage(const ListRequest& request, const SearchTask& task, ResultPage& page);
 void writeResults(const ListRequest& request, const ResultPage& page, Output& out);
 

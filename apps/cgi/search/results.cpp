@@ -7,6 +7,7 @@
 #include "found_entry.h"
 #include "listing.h"
 #include "orvel/error_state.h"
+#include "orvel/privilege.h"
 #include "search/actions.h"
 #include "text.h"
 
@@ -65,9 +66,27 @@ Json::Value stateOf(const KTR::Task& record) {
     return state;
 }
 
+// What lies in a share that was closed to the user since is not shown any more, not even its names.
+int judgeSearched(const ListRequest& request, const KTR::Task& record, std::string& culprit) {
+    const Json::Value searched = record.getProperty(kSearchedProperty);
+    if (!searched.isArray()) return ORV_ERR_MISSING;
+    const char* sid = request.sid.empty() ? nullptr : request.sid.c_str();
+    for (const Json::Value& one : searched) {
+        const auto share = percentDecode(one.isString() ? one.asString() : "");
+        if (!share) return ORV_ERR_MISSING;
+        culprit = *share;
+        OrvLibSetErr(ORV_ERR_NONE);
+        if (!CheckShareListPrivilege(request.user.c_str(), sid, share->c_str())) return lastCode(ORV_ERR_DENIED);
+    }
+    culprit.clear();
+    return ORV_ERR_NONE;
+}
+
 }  // namespace
 
 int readPage(const ListRequest& request, const SearchTask& task, ResultPage& page) {
+    const int code = judgeSearched(request, *task.record, page.culprit);
+    if (code != ORV_ERR_NONE) return code;
     // Asked first: what is finished has all its results.
     page.state = stateOf(*task.record);
     return task.results == nullptr ? ORV_ERR_MISSING : readResults(request, *task.results, page.listing);
@@ -85,7 +104,7 @@ void listResults(Output& out, const User& user, const VEXO::WebCGI& web, const S
     if (!request) return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, "");
     ResultPage page;
     const int code = readPage(*request, task, page);
-    if (code != ORV_ERR_NONE) return replyFailure(out, statusOf(code), user.cookie, code, "");
+    if (code != ORV_ERR_NONE) return replyFailure(out, statusOf(code), user.cookie, code, page.culprit);
 
     beginReply(out, Status::kOk, user.cookie);
     out.text() += "{\"success\":true,\"data\":";

@@ -4,6 +4,7 @@
 #include <chrono>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <thread>
 #include <vector>
@@ -66,6 +67,15 @@ void noteShares(KTR::Task& record, const std::vector<std::string>& folders) {
     record.setProperty(kIndexesProperty, indexes);
 }
 
+// Whoever reads the results is judged by these once more.
+Json::Value searchedPaths(const std::vector<std::string>& folders) {
+    std::set<std::string> shares;
+    for (const std::string& folder : folders) shares.insert(percentEncode(folder.substr(0, folder.find('/', 1))));
+    Json::Value list(Json::arrayValue);
+    for (const std::string& share : shares) list.append(share);
+    return list;
+}
+
 Json::Value leftOut(const std::string& user, const std::vector<std::string>& folders) {
     Json::Value list(Json::arrayValue);
     for (const std::string& folder : foldersWithoutMounts(user, folders)) list.append(readable(folder));
@@ -79,6 +89,7 @@ bool note(Search& search, const std::vector<std::string>& folders, const User& u
     if (!record.beginUpdate()) return false;
     record.setProperty(kVolumeProperty, search.walker.getDBVol());
     noteShares(record, folders);
+    record.setProperty(kSearchedProperty, searchedPaths(folders));
     record.setProperty(kLeftOutProperty, leftOut(user.name, folders));
     return record.endUpdate();
 }
