@@ -38,7 +38,8 @@ class UploadCgi : public CgiTest {
     static Names temporaries(unsigned uid) {
         const std::string folder = "/tmp/@tmp/orvel/upload-" + std::to_string(uid);
         Names names = fs::exists(folder) ? namesIn(folder) : Names();
-        std::erase_if(names, [](const std::string& name) { return name.starts_with("resume-"); });  // to be gone on with
+        // What is to be gone on with is another program's.
+        std::erase_if(names, [](const std::string& name) { return name.starts_with("resume-"); });
         return names;
     }
 };
