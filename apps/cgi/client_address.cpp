@@ -9,7 +9,7 @@
 namespace orvel::cgi {
 
 std::string canonicalAddress(std::string_view text) {
-    const std::string address(text);
+    std::string address(text);
     char out[INET6_ADDRSTRLEN];
     in_addr four{};
     in6_addr six{};

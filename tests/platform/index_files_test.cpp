@@ -174,7 +174,7 @@ TEST_F(IndexFilesTest, AnIndexIsReplacedAsAWholeByOneAtATime) {
     EXPECT_EQ(files(), 2);
     ASSERT_EQ(FILEIDXIndexStatus("photo", &status), 0);
     EXPECT_TRUE(status.records == 2 && status.folders == 1 && status.bytes > 0);
-    EXPECT_NEAR(static_cast<double>(status.built), static_cast<double>(time(nullptr)), 5.0);
+    EXPECT_NEAR(static_cast<double>(status.built), static_cast<double>(time(nullptr)), 3600.0);
     for (int time = 0; time < 2; ++time) EXPECT_EQ(FILEIDXIndexDrop("photo"), 0);
     EXPECT_EQ(FILEIDXIsIndexEnable("photo"), 0);
     EXPECT_EQ(files(), 0);

@@ -15,7 +15,7 @@ namespace orvel::cgi {
 
 inline constexpr const char* kChecksums = "sha1,sha256,md5";
 
-// The bytes that a text in base64 stands for; nothing for what is none.
+// The bytes that a text in base64 stands for; nothing for a text that is not base64.
 std::optional<std::string> base64Decode(std::string_view text);
 
 class Checksum {

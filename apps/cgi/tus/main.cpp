@@ -51,7 +51,7 @@ std::optional<long long> lengthHeader(const char* name) {
     return static_cast<long long>(*number);
 }
 
-// How a refusal shows to a client that knows the protocol alone. Such a client takes 404 for an upload that is no more,
+// How a refusal shows to a client that knows the protocol alone. Such a client takes 404 for an upload that is gone,
 // and tries again after 409, 423 and all from 500 on.
 Status refusalStatus(int code) {
     switch (code) {
@@ -127,7 +127,7 @@ class TusRequest {
         if (record.state() == UploadState::kDone) header("Orvel-Path", percentEncode(resumable_.path()));
     }
 
-    // False for metadata that are none. A name in them is that of the file.
+    // False for metadata that cannot be read. A name in them is that of the file.
     static bool readMetadata(const std::string& metadata, std::string& fileName) {
         if (metadata.size() > kLongestMetadata) return false;
         for (size_t begin = 0; begin < metadata.size();) {
@@ -225,7 +225,7 @@ class TusRequest {
         beginReply(out_, Status::kOk, user_.cookie);
     }
 
-    // False for a checksum that is none, or of an algorithm that is not known.
+    // False for a checksum that cannot be read, or of an algorithm that is not known.
     static bool readChecksum(std::optional<Checksum>& checksum) {
         const std::string header = variable("HTTP_UPLOAD_CHECKSUM");
         checksum = Checksum::parse(header);
