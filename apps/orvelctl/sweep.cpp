@@ -249,7 +249,7 @@ void sweepParts(const Descriptor& folder, const std::string& path, bool below, P
             part.removed += removeAbandonedPart(folder.get(), name) ? 1 : 0;
         } else if (below) {
             const Descriptor inside = openBeneath(folder, name, LinkPolicy::kNone, O_RDONLY | O_DIRECTORY);
-            sweepParts(inside, path + "/" + name, false, part);
+            sweepParts(inside, std::string(path).append("/").append(name), false, part);
         }
     }
 }

@@ -173,7 +173,7 @@ class TusRequest {
         std::optional<Checksum> checksum;
         if (withPiece && !readChecksum(checksum)) return refuse(Status::kBadRequest, ORV_ERR_PARAMETER, facts.path);
         const std::string path = facts.path;
-        int code = resumable_.create(std::move(facts));
+        const int code = resumable_.create(std::move(facts));
         if (code != ORV_ERR_NONE) {
             const Status status = code == ORV_ERR_MISSING ? Status::kNotFound : refusalStatus(code);
             return refuse(status, code, path);
@@ -183,8 +183,11 @@ class TusRequest {
         // What became of a piece that came along is in the offset; a file that cannot have its name is told so when it
         // is asked about.
         Piece piece = Piece::kTaken;
-        if (withPiece) code = resumable_.append(0, bodyLength().value_or(0), std::move(checksum), piece);
-        if (!withPiece && resumable_.isWhole()) code = resumable_.complete();
+        if (withPiece) {
+            static_cast<void>(resumable_.append(0, bodyLength().value_or(0), std::move(checksum), piece));
+        } else if (resumable_.isWhole()) {
+            static_cast<void>(resumable_.complete());
+        }
         describe();
         Json::Value data;
         data["id"] = resumable_.record().id();
