@@ -57,7 +57,7 @@ class Packing {
         const auto number = static_cast<uint32_t>(id);
         ids_.add({reinterpret_cast<const char*>(&number), sizeof number});
         texts_.add(name);
-        texts_.add(std::string_view("", 1));
+        texts_.add(std::string_view("\0", 1));
     }
     // False with errno.
     [[nodiscard]] bool finish(int fd, int64_t mark, int64_t highest) {
