@@ -4,6 +4,7 @@ import { setupAccess } from "./access.js";
 import { setupAccount } from "./account.js";
 import { readAddress } from "./address.js";
 import { setupActivity } from "./activity.js";
+import { get } from "./api.js";
 import {
   browser,
   columns,
@@ -306,7 +307,13 @@ async function start() {
   document.body.classList.add("started");
   setupTasks();
   followAddress().finally(() => emit("arrived"));
-  arrived.then(() => import("./unfinished.js")).then(({ showUnfinished }) => showUnfinished());
+  arrived.then(showLeft);
+}
+
+// Only whoever left an upload unfinished needs what shows it.
+async function showLeft() {
+  const { items } = await get("tus", {}).catch(() => ({ items: [] }));
+  if (items.length > 0) (await import("./unfinished.js")).showUnfinished();
 }
 
 start().catch((failure) => {
