@@ -39,7 +39,8 @@ bool endWork(KTR::Task& record, bool forGood);
 bool removeTask(const SearchTask& task);
 
 // Before another one is begun: removes what ended and whose beginning lies nearly two days away, of searches and of
-// operations, and of what ended later the oldest, where the user has too many. 0, or 420 when too many are at work.
+// operations, and of what ended later the oldest, where the user has too many, or their results take more than half of
+// the setting "search_results_mib" on a volume. 0, or 420 when too many are at work.
 int makeRoomForTask(const std::string& user);
 
 }  // namespace orvel::cgi

@@ -318,6 +318,26 @@ TEST_F(SearchCgi, ASearchThatCouldNotStoreAllHasFailed) {
     }
 }
 
+TEST_F(SearchCgi, ResultsAreBoundedOnAVolume) {
+    SKIP_WITHOUT_ROOT();
+    setSetting("search_results_mib", "1");
+    const std::string root = addShare("photo", "read only = no\n");
+    for (int i = 0; i < 2000; ++i) writeFile(root + "/" + std::string(200, 'n') + std::to_string(i), "");
+    std::string former;
+    for (int time = 0; time < 2; ++time) {
+        const std::string id = start("carol", "path=/photo&type=file");
+        const Json::Value data = finished("carol", id).json["data"];
+        EXPECT_EQ(data["failure"]["code"], 416) << data.toStyledString().substr(0, 300);
+        EXPECT_TRUE(data["total"].asInt() > 100 && data["total"].asInt() < 2000) << data["total"];
+        if (time > 0) {
+            EXPECT_EQ(code(ask("carol", "action=clean&taskid=" + former)), 408) << "it made room";
+        }
+        former = id;
+    }
+    const Json::Value few = finished("carol", start("carol", "path=/photo&name=n*77")).json["data"];
+    EXPECT_TRUE(!few["failed"].asBool() && few["total"].asInt() == 20) << few["total"];
+}
+
 TEST_F(SearchCgi, WhatAnIndexCannotHoldIsSaid) {
     SKIP_WITHOUT_ROOT();
     const std::string root = addShare("photo", kIndexed);

@@ -12,6 +12,7 @@
 
 #include "failure.h"
 #include "index/index_columns.h"
+#include "index/index_room.h"
 #include "index/index_vfs.h"
 #include "io/file_io.h"
 #include "vexo/error.h"
@@ -22,6 +23,7 @@ namespace {
 
 constexpr int kBusyMilliseconds = 10000;
 constexpr int kSoonMilliseconds = 100;
+constexpr int64_t kPageSize = 8192, kMostPages = 1 << 30;
 
 // Compared word for word before a database is used, so a change here makes another format.
 constexpr std::array<const char*, 4> kSchema = {
@@ -186,6 +188,12 @@ bool Database::configure(OpenMode mode) {
                                  : "PRAGMA temp_store=MEMORY;PRAGMA cache_spill=OFF")) {
         return false;
     }
+    // What is beyond fails as on a full disk.
+    const int64_t pages = mode.ofShare || mode.readOnly ? 0 : roomForResults(path_) / kPageSize;
+    if (!mode.ofShare && !mode.readOnly &&
+        !execute(db_, ("PRAGMA max_page_count=" + std::to_string(std::clamp<int64_t>(pages, 1, kMostPages))).c_str())) {
+        return false;
+    }
     constexpr const char* common = "PRAGMA secure_delete=OFF;PRAGMA cache_size=-16384;";
     return execute(db_, common) &&
            execute(db_, mode.ofShare ? "PRAGMA synchronous=FULL;PRAGMA mmap_size=2147418112;"
@@ -194,8 +202,8 @@ bool Database::configure(OpenMode mode) {
 
 bool Database::makeSchema() {
     const std::string identity =
-        "PRAGMA page_size=8192;PRAGMA auto_vacuum=NONE;BEGIN;PRAGMA application_id=" + std::to_string(kApplicationId) +
-        ";";
+        "PRAGMA page_size=" + std::to_string(kPageSize) +
+        ";PRAGMA auto_vacuum=NONE;BEGIN;PRAGMA application_id=" + std::to_string(kApplicationId) + ";";
     if (!execute(db_, identity.c_str())) return false;
     for (const char* sql : kSchema) {
         if (!execute(db_, sql)) return false;
