@@ -3,7 +3,7 @@ import assert from "node:assert/strict";
 import { mkdirSync, readdirSync, readFileSync, readlinkSync, writeFileSync } from "node:fs";
 import { before, test } from "node:test";
 import { KINDS, PICTURES } from "../../apps/web/js/icons.js";
-import { boxOf, drawn, go, row, rowsReady, withPage } from "./browser.mjs";
+import { boxOf, drawn, go, row, rowsReady, typeName, withPage } from "./browser.mjs";
 
 const LARGE = 20_000; // files of the share "warehouse"
 
@@ -84,7 +84,7 @@ test("a large folder: first view, its end, everything chosen", () =>
     );
     assert.ok((await page.locator("#view .row").count()) < 80);
     await page.focus("#view");
-    await page.keyboard.type("item-1734");
+    await typeName(page, "item-1734");
     await page.waitForSelector("#view .row.selected >> text=item-17340.dat");
     await page.keyboard.press("Shift+End");
     const many = `#status >> text=${(LARGE - 17340).toLocaleString("en-GB")} selected`;

@@ -144,6 +144,13 @@ export async function findings(page, part = "html") {
   }, part);
 }
 
+// Looks for a name in the list by its letters, which come as fast as the page takes for one word.
+export function typeName(page, name) {
+  return page.evaluate((letters) => {
+    for (const key of letters) document.getElementById("view").dispatchEvent(new KeyboardEvent("keydown", { key, bubbles: true, cancelable: true }));
+  }, [...name]);
+}
+
 // What the page was about to draw is drawn.
 export function drawn(page) {
   return page.evaluate(() => new Promise((done) => requestAnimationFrame(() => requestAnimationFrame(done))));
