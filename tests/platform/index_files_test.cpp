@@ -186,7 +186,7 @@ TEST_F(IndexFilesTest, ABatchDoesNotEndBehindARemoval) {
     build({{"a"}});
     ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path_, sizeof path_), 0);
     for (int i = 0; i < 15; ++i) ASSERT_EQ(insert(path_, {"b" + std::to_string(i)}), 0);
-    usleep(350000);  // old enough to be committed
+    usleep(350000);  // a batch ends once it is 300 ms old; older changes nothing
     Cond where = node(FI_COL_PATH, FI_OP_EQUAL, "a");
     ASSERT_EQ(FILEIDXDBDel(path_, &where), 0);
     const std::string index = path_;
