@@ -3,6 +3,7 @@
 #include <utime.h>
 
 #include <cerrno>
+#include <thread>
 
 #include "apps/cgi_test.h"
 #include "base/descriptor.h"
@@ -54,6 +55,17 @@ class TusCgi : public CgiTest {
     }
     static std::string bytes(const std::string& id) {
         return "/tmp/@tmp/orvel/upload-" + std::to_string(kAliceUid) + "/resume-" + id;
+    }
+    // In a process other than this one.
+    static bool isOpenElsewhere(const std::string& path) {
+        std::error_code gone;
+        for (const auto& process : fs::directory_iterator("/proc")) {
+            if (process.path().filename() == std::to_string(getpid())) continue;
+            for (const auto& open : fs::directory_iterator(process.path() / "fd", gone)) {
+                if (fs::read_symlink(open.path(), gone) == path) return true;
+            }
+        }
+        return false;
     }
     static void makeOld(const std::string& path) {
         const time_t then = time(nullptr) - 3 * 24 * 3600;
@@ -221,9 +233,13 @@ TEST_F(TusCgi, WhatIsNotOfTheProtocolIsRefused) {
         ASSERT_EQ(flock(other.get(), LOCK_EX | LOCK_NB), 0);
         EXPECT_EQ(append(id, 2, "345").status, 423);
         EXPECT_EQ(send("DELETE", "id=" + id).status, 423);
+        EXPECT_EQ(send("DELETE", "id=" + id + "&wait=11").status, 400);
         EXPECT_EQ(offsetOf(id), "2");
+        std::thread ends([&] { EXPECT_EQ(send("DELETE", "id=" + id + "&wait=10").status, 204); });
+        EXPECT_TRUE(waitUntil("the end that waits", [&] { return isOpenElsewhere(record(id)); }));
+        EXPECT_EQ(flock(other.get(), LOCK_UN), 0);
+        ends.join();
     }
-    EXPECT_EQ(send("DELETE", "id=" + id).status, 204);
     EXPECT_EQ(send("HEAD", "id=" + id).status, 404);
     EXPECT_FALSE(fs::exists(bytes(id)));
     EXPECT_EQ(namesIn(root_), Names{});

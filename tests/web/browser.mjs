@@ -3,6 +3,7 @@ import { existsSync, readFileSync } from "node:fs";
 import assert from "node:assert/strict";
 import { basename, join } from "node:path";
 import { after } from "node:test";
+import { setTimeout } from "node:timers/promises";
 import { chromium } from "playwright-core";
 
 // The shell draws and computes the same with a third less work; it lacks what a user has around a page.
@@ -170,6 +171,18 @@ export async function boxOf(locator) {
     if (box) return box;
   }
   throw new Error(`not to be seen within 30 s: ${locator}`);
+}
+
+// Waits for what neither the page nor its requests show.
+export async function untilSo(what, isSo) {
+  for (const end = Date.now() + 60_000; Date.now() < end; await setTimeout(20)) if (await isSo()) return;
+  throw new Error(`waited a minute in vain for ${what}`);
+}
+
+// A user's uploads that are not over.
+export async function unfinished(request) {
+  const { data } = await (await request.get(`${URL_OF_PAGE}cgi-bin/tus`)).json();
+  return data.items;
 }
 
 // Waits for the card of what went well, and takes it away.

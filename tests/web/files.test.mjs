@@ -4,7 +4,7 @@ import { copyFileSync, existsSync, mkdirSync, mkdtempSync, readdirSync, readFile
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
-import { drawn, go, row, upload, wentWell, withPage } from "./browser.mjs";
+import { drawn, go, row, unfinished, untilSo, upload, wentWell, withPage } from "./browser.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const files = mkdtempSync(join(tmpdir(), "orvel-upload-"));
@@ -107,6 +107,8 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     );
     await page.locator(".activity-card").first().locator("button").click();
     await card(page, "Cancelled").waitFor();
+    const { request } = page.context();
+    await untilSo("the upload's end on the server", async () => !(await unfinished(request)).some(({ path }) => path.endsWith("large.bin")));
     assert.ok(!existsSync(join(there, "large.bin")));
   }));
 

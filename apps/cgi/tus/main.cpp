@@ -9,11 +9,13 @@
 //              taskid           a search whose results shall show the file
 //   HEAD     how much of it is there (?id=); where that is all of it the file has its name after this
 //   PATCH    appends; with the last piece the file gets its name
-//   DELETE   ends it and removes what is there
+//   DELETE   ends it and removes what is there; while another request is at work on it, that one is waited for: as many
+//            seconds as "wait" says
 //   GET      the user's uploads that are not over; not of the protocol
 #include <json/value.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstdlib>
 #include <memory>
 #include <optional>
@@ -38,6 +40,7 @@ namespace {
 
 constexpr const char* kVersion = "1.0.0";
 constexpr const char* kExtensions = "creation,creation-with-upload,termination,expiration,checksum";
+constexpr unsigned long kLongestWait = 10;  // seconds
 constexpr const char* kPieceType = "application/offset+octet-stream";
 
 std::string variable(const char* name) {
@@ -261,7 +264,9 @@ class TusRequest {
     }
 
     void remove() {
-        const int code = resumable_.open(web_.GetParam("id", ""), true);
+        const auto wait = parseNumber(web_.GetParam("wait", "0"));
+        if (!wait || *wait > kLongestWait) return refuse(Status::kBadRequest, ORV_ERR_PARAMETER, "");
+        const int code = resumable_.open(web_.GetParam("id", ""), true, std::chrono::seconds(*wait));
         // Where its share is gone it can be ended all the same.
         if (code != ORV_ERR_NONE && !resumable_.isLocked()) {
             return refuse(code == ORV_ERR_MISSING ? Status::kNotFound : refusalStatus(code), code, "");

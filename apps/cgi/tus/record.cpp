@@ -12,6 +12,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <memory>
+#include <thread>
 
 #include "base/file.h"
 #include "base/hex.h"
@@ -34,6 +35,7 @@ constexpr std::string_view kMagic = "ORVTUS1 ";
 constexpr size_t kHead = 31;  // the first line: magic, state, blank, twenty digits, line feed
 constexpr int kMostUnfinished = 100;
 constexpr int kMostRecords = 300;  // with those that are over
+constexpr std::chrono::milliseconds kLookAgain{20};
 constexpr long long kDefaultGiB = 1024, kMostGiB = 1 << 20;
 constexpr std::array<std::string_view, 4> kConflicts = {"error", "skip", "overwrite", "keep_both"};
 // What makes room does so here, not in makeRoom: an unfinished upload is nobody's to forget.
@@ -93,6 +95,15 @@ bool parseJson(std::string_view text, Json::Value& value) try {
 
 bool isNumber(const Json::Value& value) {
     return value.isInt64() && value.asInt64() >= 0;
+}
+
+bool lockWithin(int fd, std::chrono::seconds wait) {
+    const auto end = std::chrono::steady_clock::now() + wait;
+    while (!lockFile(fd, LOCK_EX | LOCK_NB)) {
+        if (errno != EWOULDBLOCK || std::chrono::steady_clock::now() >= end) return false;
+        std::this_thread::sleep_for(kLookAgain);
+    }
+    return true;
 }
 
 // What is more than may be kept, of those that are over, oldest first.
@@ -169,11 +180,11 @@ int UploadRecord::create(const std::string& user, const std::string& id, UploadF
     return made ? open(user, id, true) : code;
 }
 
-int UploadRecord::take(const Descriptor& folder, bool lock) {
+int UploadRecord::take(const Descriptor& folder, bool lock, std::chrono::seconds wait) {
     file_ = openFile(folder.get(), id_.c_str(), (lock ? O_RDWR : O_RDONLY) | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY);
     struct stat status {};
     if (!file_) return errno == ENOENT ? static_cast<int>(ORV_ERR_MISSING) : codeOf(errno);
-    if (lock && !lockFile(file_.get(), LOCK_EX | LOCK_NB)) return errno == EWOULDBLOCK ? ORV_ERR_BUSY : codeOf(errno);
+    if (lock && !lockWithin(file_.get(), wait)) return errno == EWOULDBLOCK ? ORV_ERR_BUSY : codeOf(errno);
     if (fstat(file_.get(), &status) != 0) return codeOf(errno);
     if (!S_ISREG(status.st_mode) || status.st_nlink == 0 || kStore.isOver(status)) return ORV_ERR_MISSING;
     touched_ = status.st_mtim.tv_sec;
@@ -203,12 +214,12 @@ bool UploadRecord::parse(const std::string& text, const std::string& user) {
     return printable && (facts_.search.empty() || isTaskId(facts_.search)) && isConflict(facts_.conflict);
 }
 
-int UploadRecord::open(const std::string& user, const std::string& id, bool lock) {
+int UploadRecord::open(const std::string& user, const std::string& id, bool lock, std::chrono::seconds wait) {
     id_ = id;
     errno = ENOENT;
     folder_ = isUploadId(id) ? openUserFolder(kStore.path, user, false) : Descriptor();
     if (!folder_) return errno == ENOENT ? static_cast<int>(ORV_ERR_MISSING) : codeOf(errno);
-    const int code = take(folder_, lock);
+    const int code = take(folder_, lock, wait);
     if (code != ORV_ERR_NONE) return code;
     std::string text;
     if (!readAll(file_.get(), text, kLongestRecord) || !parse(text, user)) return ORV_ERR_MISSING;

@@ -5,6 +5,7 @@
 #ifndef ORVEL_CGI_TUS_RECORD_H
 #define ORVEL_CGI_TUS_RECORD_H
 
+#include <chrono>
 #include <ctime>
 #include <optional>
 #include <set>
@@ -55,8 +56,9 @@ class UploadRecord {
     // 0, with a new id; 415 when the user has too many unfinished ones or of too many bytes, or the code of the
     // failure.
     int create(const std::string& user, const std::string& id, UploadFacts facts);
-    // 0; 408 when the user has none of that id, or it expired; 420 when it is to be locked and somebody else has it.
-    int open(const std::string& user, const std::string& id, bool lock);
+    // 0; 408 when the user has none of that id, or it expired; 420 when it is to be locked and somebody else has it,
+    // still after `wait`.
+    int open(const std::string& user, const std::string& id, bool lock, std::chrono::seconds wait = {});
 
     [[nodiscard]] const std::string& id() const { return id_; }
     [[nodiscard]] const UploadFacts& facts() const { return facts_; }
@@ -71,7 +73,7 @@ class UploadRecord {
     void remove();
 
  private:
-    int take(const Descriptor& folder, bool lock);
+    int take(const Descriptor& folder, bool lock, std::chrono::seconds wait);
     bool parse(const std::string& text, const std::string& user);
 
     std::string id_;

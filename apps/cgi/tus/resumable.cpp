@@ -49,10 +49,10 @@ int Resumable::create(UploadFacts facts) {
     return code;
 }
 
-int Resumable::open(const std::string& id, bool lock) {
+int Resumable::open(const std::string& id, bool lock, std::chrono::seconds wait) {
     // As the user, who could put anything in place of the record.
     int code = actAs(user_.sid.c_str(), user_.name, false);
-    if (code == ORV_ERR_NONE) code = record_.open(user_.name, id, lock);
+    if (code == ORV_ERR_NONE) code = record_.open(user_.name, id, lock, wait);
     locked_ = lock && code == ORV_ERR_NONE;
     if (code != ORV_ERR_NONE || record_.isOver()) return code;
     code = enter();

@@ -2,6 +2,7 @@
 #ifndef ORVEL_CGI_TUS_RESUMABLE_H
 #define ORVEL_CGI_TUS_RESUMABLE_H
 
+#include <chrono>
 #include <optional>
 #include <string>
 
@@ -31,8 +32,8 @@ class Resumable {
     int create(UploadFacts facts);
     // What an existing file means from now on, as far as open() is concerned; "" for what the upload was begun with.
     void answer(std::string conflict) { conflict_ = std::move(conflict); }
-    // Opens one of the user's; 420 when it is to be locked and another request has it.
-    int open(const std::string& id, bool lock);
+    // Opens one of the user's; 420 when it is to be locked and another request has it, still after `wait`.
+    int open(const std::string& id, bool lock, std::chrono::seconds wait = {});
     // Appends the body of the request. It is on the disk, and where it was the last piece the file has its name.
     // What was sent before stays, whatever happens.
     int append(long long offset, long long length, std::optional<Checksum> checksum, Piece& piece);

@@ -157,6 +157,7 @@ export class Job {
       onUpload: (id) => {
         this.upload = id;
         if (this.state === "cancelled") this.discard();
+        return this.state !== "cancelled";
       },
       onBegin: (request) => {
         this.request = request;

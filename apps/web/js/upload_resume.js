@@ -1,6 +1,6 @@
 // Large files on their way, by the protocol tus: what has arrived stays, whatever breaks in between.
 
-import { ApiError, get, headersOf, readReply, urlOf } from "./api.js";
+import { ApiError, get, headersOf, readReply, send, urlOf } from "./api.js";
 import { idIn, normaliseId } from "./path.js";
 import { modifiedOf } from "./upload_request.js";
 
@@ -51,16 +51,15 @@ function refusal({ status, text }) {
 const pause = () => new Promise((resolve) => setTimeout(resolve, WAIT));
 
 // Sends the file to `path`, an id; what of it has arrived before is not sent again. `known`: the id of the upload, where
-// the page knows it. onUpload(id) when that is known; wait(promise) while another request is at work on it. Resolves with
+// the page knows it. onUpload(id) when that is known, false for one that is not wanted any more; wait(promise) while another request is at work on it. Resolves with
 // {path, skipped} once the file has its name, undefined when it was aborted.
 export async function sendResumable(path, file, { conflict, known, onUpload, onBegin, onOffset, wait }) {
   let id = known ?? (await unfinishedUploads()).find((item) => isOf(item, path, file))?.id;
   for (let waits = 0; ; ) {
     if (!id) {
-      id = await begin(path, file, conflict, onBegin);
-      if (!id) return undefined;
+      id = await begin(path, file, conflict);
     }
-    onUpload(id);
+    if (!onUpload(id)) return undefined;
     let reply = await ask("HEAD", { id, conflict }, { onBegin });
     const offset = Number(reply?.header("Upload-Offset"));
     if (reply?.status === 200) {
@@ -79,10 +78,10 @@ export async function sendResumable(path, file, { conflict, known, onUpload, onB
   }
 }
 
-async function begin(path, file, conflict, onBegin) {
+// Never aborted: what it began could not be ended by anybody who does not know its id.
+async function begin(path, file, conflict) {
   const params = { path_raw: path, conflict, mtime: modifiedOf(file) };
-  const reply = await ask("POST", params, { headers: { "Upload-Length": file.size }, onBegin });
-  if (!reply) return null;
+  const reply = await ask("POST", params, { headers: { "Upload-Length": file.size } });
   if (reply.status !== 201) throw refusal(reply);
   return readReply(reply.status, reply.text).id;
 }
@@ -98,12 +97,13 @@ function outcome(reply, path) {
   return { path: given ? normaliseId(given) : path, skipped: reply.header("Orvel-Skipped") !== null };
 }
 
-// Ends an upload and removes what has arrived. The server may still be busy with the request that was cut off.
+// Ends an upload and removes what has arrived. The server waits for the request that was cut off, and the browser sends
+// this even if the page is closed meanwhile.
 export async function discard(id) {
-  for (let waits = 0; waits < MOST_WAITS; ++waits) {
-    const reply = await ask("DELETE", { id });
-    if (reply?.status !== LOCKED) return reply?.status === 204 || GONE.has(reply?.status);
-    await pause();
+  const headers = { "Tus-Resumable": "1.0.0" };
+  for (let tries = 0; tries < 6; ++tries) {
+    const { status } = await send(urlOf("tus", { id, wait: 10 }), { method: "DELETE", headers, keepalive: true });
+    if (status !== LOCKED) return status === 204 || GONE.has(status);
   }
   return false;
 }
