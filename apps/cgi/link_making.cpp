@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <limits>
 
@@ -14,12 +15,15 @@
 #include "orvel/sharing_settings.h"
 #include "reply.h"
 #include "request.h"
+#include "text.h"
 #include "vexo/user.h"
 
 namespace orvel::cgi {
 namespace {
 
 constexpr std::int64_t kDay = 86400;
+constexpr size_t kLongestNote = 400;
+constexpr std::int64_t kMostDownloads = 1'000'000;
 
 // May the user, as whom the process acts, download the path? It must be there. Published is where it leads now: links
 // and ".." in it could lead elsewhere later, to what the user never meant to show.
@@ -47,6 +51,36 @@ bool isDate(std::int64_t seconds) {
     return seconds >= 0 && seconds <= std::numeric_limits<std::int64_t>::max() - kDay;
 }
 
+bool isNote(const std::string& note) {
+    const auto isControl = [](char c) { return static_cast<unsigned char>(c) < 0x20 || c == 0x7F; };
+    return note.size() <= kLongestNote && isUtf8(note) && std::none_of(note.begin(), note.end(), isControl);
+}
+
+// Without an end the begin would not count.
+bool isWindow(std::int64_t available, std::int64_t expires) {
+    return isDate(available) && isDate(expires) && (available == 0 || (expires != 0 && expires + kDay > available));
+}
+
+// The terms as they are stored: of a password its hash, which takes its time.
+int readyTerms(LinkTerms& terms) {
+    if (terms.password && terms.password->size() > kLongestPassword) return ORV_ERR_PARAMETER;
+    if (terms.note && !isNote(*terms.note)) return ORV_ERR_PARAMETER;
+    if (terms.most && (*terms.most < 0 || *terms.most > kMostDownloads)) return ORV_ERR_PARAMETER;
+    if (!terms.password || terms.password->empty()) return ORV_ERR_NONE;
+    terms.password = hashPassword(*terms.password);
+    return terms.password->empty() ? ORV_ERR_GENERAL : ORV_ERR_NONE;
+}
+
+// False when the dates do not go together.
+bool applyTerms(const LinkTerms& ready, Link& link) {
+    link.passwordHash = ready.password.value_or(link.passwordHash);
+    link.available = ready.available.value_or(link.available);
+    link.expires = ready.expires.value_or(link.expires);
+    link.note = ready.note.value_or(link.note);
+    link.most = ready.most.value_or(link.most);
+    return isWindow(link.available, link.expires);
+}
+
 }  // namespace
 
 int makeLink(const LinkWish& wish, Link& link) {
@@ -55,22 +89,33 @@ int makeLink(const LinkWish& wish, Link& link) {
     gid_t gid = 0;
     const bool keepable = wish.user.find_first_of(",\r\n") == std::string::npos;
     if (!keepable || VEXOUserGetUGID(wish.user.c_str(), &link.uid, &gid) != 0) return ORV_ERR_PARAMETER;
-    if (!isDate(wish.available) || !isDate(wish.expires)) return ORV_ERR_PARAMETER;
-    // Without an end the begin would not count.
-    if (wish.available > 0 && (wish.expires == 0 || wish.expires + kDay <= wish.available)) return ORV_ERR_PARAMETER;
-    int code = actAs(wish.sid.empty() ? nullptr : wish.sid.c_str(), wish.user, IsDirUserHome(wish.path, nullptr));
+    LinkTerms terms = wish.terms;
+    int code = readyTerms(terms);
+    if (code == ORV_ERR_NONE && !applyTerms(terms, link)) code = ORV_ERR_PARAMETER;
+    if (code == ORV_ERR_NONE)
+        code = actAs(wish.sid.empty() ? nullptr : wish.sid.c_str(), wish.user, IsDirUserHome(wish.path, nullptr));
     if (code == ORV_ERR_NONE) code = judgePath(wish, link.path);
     if (code != ORV_ERR_NONE) return code;
     link.owner = wish.user;
-    link.available = wish.available;
-    link.expires = wish.expires;
-    if (wish.password.size() > kLongestPassword) return ORV_ERR_PARAMETER;
-    if (!wish.password.empty()) {
-        link.passwordHash = hashPassword(wish.password);
-        if (link.passwordHash.empty()) return ORV_ERR_GENERAL;
-    }
     LinkStore store;
     return store.add(link) ? ORV_ERR_NONE : ORV_ERR_GENERAL;
+}
+
+int changeLink(const std::string& user, const std::string& id, const LinkTerms& terms, Link& link) {
+    if (OrvLibUserPrivForSharing(user.c_str()) != 1) return ORV_ERR_DENIED;
+    LinkTerms ready = terms;
+    int code = readyTerms(ready);
+    if (code != ORV_ERR_NONE) return code;
+    const auto edit = [&](Link& found) {
+        code = applyTerms(ready, found) ? ORV_ERR_NONE : ORV_ERR_PARAMETER;
+        return code == ORV_ERR_NONE;
+    };
+    std::optional<Link> changed;
+    LinkStore store;
+    if (!store.change(id, user, edit, changed)) return ORV_ERR_GENERAL;
+    if (!changed) return ORV_ERR_MISSING;
+    link = *changed;
+    return code;
 }
 
 }  // namespace orvel::cgi

@@ -2,27 +2,39 @@
 #ifndef ORVEL_CGI_LINK_MAKING_H
 #define ORVEL_CGI_LINK_MAKING_H
 
+#include <cstdint>
+#include <optional>
 #include <string>
 
 #include "public_link.h"
 
 namespace orvel::cgi {
 
-// Who publishes what, and for how long.
+// What the owner says of a link; what he leaves out stays as it is.
+struct LinkTerms {
+    std::optional<std::string> password;  // "" for none
+    std::optional<std::int64_t> available, expires;
+    std::optional<std::string> note;
+    std::optional<std::int64_t> most;  // downloads, 0 for any number
+};
+
+// Who publishes what, and on which terms.
 struct LinkWish {
     std::string user;
     std::string sid;  // "" for none
     std::string path;
-    std::string password;  // "" for none
-    std::int64_t available = 0;
-    std::int64_t expires = 0;
+    LinkTerms terms;
 };
 
 // Makes the link when the user may create links and may download the path, taking on his identity for the rest of the
 // process. 0, or a library code: 407 he may not, or the path is neither a file nor a folder; 400 a begin without an end
-// or behind it, a date out of range, a password that is too long, an owner whose sessions could not be recorded (a
-// comma in his name); 401 a database that failed; else as for opening the path.
+// or behind it, a date out of range, a password or note that is too long, a limit that is too high, an owner whose
+// sessions could not be recorded (a comma in his name); 401 a database that failed; else as for opening the path.
 int makeLink(const LinkWish& wish, Link& link);
+
+// Changes a link of the user's in place, when he may still create links. Who had logged in with another password than
+// the link's new one is logged out. 0, or 407, 400 and 401 as above; 408 for no such link of his.
+int changeLink(const std::string& user, const std::string& id, const LinkTerms& terms, Link& link);
 
 }  // namespace orvel::cgi
 

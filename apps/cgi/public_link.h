@@ -10,6 +10,7 @@ namespace orvel::cgi {
 
 using VEXO::Link;
 using VEXO::LinkStore;
+using VEXO::LinkTaking;
 
 inline constexpr size_t kLongestPassword = 511;
 
@@ -23,6 +24,11 @@ enum class Owner {
     kUnknown  // could not be determined
 };
 Owner ownerOf(const Link& link);
+
+// Whether as many downloads were begun as may be.
+inline bool isUsedUp(const Link& link) {
+    return link.most > 0 && link.used >= link.most;
+}
 
 // Where a visitor opens the link: the appliance's outside address and the program, or without an address the program.
 std::string linkAddress(const std::string& id);

@@ -30,6 +30,8 @@ std::string_view statusLine(Status status) {
             return "Status: 404 Not Found\r\n";
         case Status::kMethodNotAllowed:
             return "Status: 405 Method Not Allowed\r\n";
+        case Status::kGone:
+            return "Status: 410 Gone\r\n";
         case Status::kChanged:
             return "Status: 412 Precondition Failed\r\n";
         case Status::kTooLarge:

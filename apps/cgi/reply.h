@@ -24,6 +24,7 @@ enum class Status {
     kForbidden = 403,
     kNotFound = 404,
     kMethodNotAllowed = 405,
+    kGone = 410,
     kChanged = 412,
     kTooLarge = 413,
     kUnsupportedType = 415,

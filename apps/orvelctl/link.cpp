@@ -28,6 +28,18 @@ std::int64_t dateOf(const std::string& text) {
     return seconds;
 }
 
+std::int64_t countOf(const std::string& text) {
+    char* rest = nullptr;
+    const long long count = strtoll(text.c_str(), &rest, 10);
+    if (text.empty() || *rest != '\0' || count < 0) throw UsageError(text + " is not a number of downloads");
+    return count;
+}
+
+// How many downloads were begun, and of how many.
+std::string usesText(const cgi::Link& link) {
+    return std::to_string(link.used) + (link.most == 0 ? "" : "/" + std::to_string(link.most));
+}
+
 std::string dayText(std::int64_t seconds) {
     const auto time = static_cast<time_t>(seconds);
     tm parts = {};
@@ -40,6 +52,7 @@ std::string dayText(std::int64_t seconds) {
 const char* stateOf(const cgi::Link& link) {
     const cgi::Owner owner = cgi::ownerOf(link);
     if (owner != cgi::Owner::kThere) return owner == cgi::Owner::kGone ? "owner gone" : "owner?";
+    if (link.most > 0 && link.used >= link.most) return "used up";
     if (OrvelLogin::IsLinkOpen(link.available, link.expires, time(nullptr))) return "open";
     return link.available > time(nullptr) ? "not yet" : "expired";
 }
@@ -55,12 +68,11 @@ int create(const std::vector<std::string>& words) {
     if (arguments.has("--propose") && (proposed.empty() || arguments.has("--password"))) {
         throw UsageError("--propose draws a password, and --password gives one");
     }
-    const cgi::LinkWish wish = {.user = arguments.required("--user"),
-                                .sid = "",
-                                .path = arguments.position(0),
-                                .password = arguments.value("--password", proposed),
-                                .available = dateOf(arguments.value("--from", "")),
-                                .expires = dateOf(arguments.value("--until", ""))};
+    cgi::LinkWish wish = {.user = arguments.required("--user"), .sid = "", .path = arguments.position(0), .terms = {}};
+    wish.terms.password = arguments.value("--password", proposed);
+    wish.terms.available = dateOf(arguments.value("--from", ""));
+    wish.terms.expires = dateOf(arguments.value("--until", ""));
+    wish.terms.most = countOf(arguments.value("--downloads", "0"));
     cgi::Link link;
     const int code = cgi::makeLink(wish, link);
     if (code != 0) return refused(wish.path, code);
@@ -75,9 +87,9 @@ int list(const std::vector<std::string>& words) {
     cgi::LinkStore store;
     if (!store.list(arguments.value("--user", ""), links)) return broken(store);
     for (const cgi::Link& link : links) {
-        printf("%s  %-10s  %-10s  %-10s  %-10s  %-8s  %s\n", link.id.c_str(), terminalText(link.owner).c_str(),
+        printf("%s  %-10s  %-10s  %-10s  %-10s  %-8s  %-6s  %s\n", link.id.c_str(), terminalText(link.owner).c_str(),
                stateOf(link), dayText(link.available).c_str(), dayText(link.expires).c_str(),
-               link.passwordHash.empty() ? "" : "password", terminalText(link.path).c_str());
+               link.passwordHash.empty() ? "" : "password", usesText(link).c_str(), terminalText(link.path).c_str());
     }
     return 0;
 }

@@ -93,7 +93,7 @@ TEST_F(Places, ALinkIsToWhatWasPublished) {
                                                                         {"/photo/shared/..", "/photo"}}) {
         inChild([&, asked = path, expected = published] {
             Link link;
-            EXPECT_EQ(makeLink({.user = "alice", .sid = "", .path = asked, .password = ""}, link), 0) << asked;
+            EXPECT_EQ(makeLink({.user = "alice", .sid = "", .path = asked, .terms = {}}, link), 0) << asked;
             EXPECT_EQ(link.path, expected);
             takeLog();
         });

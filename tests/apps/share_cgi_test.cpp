@@ -2,6 +2,7 @@
 // where a test puts it.
 #include "apps/cgi_test.h"
 #include "public_link.h"
+#include "support/race.h"
 #include "vexo/guess.h"
 
 namespace {
@@ -202,6 +203,97 @@ TEST_F(ShareCgi, WhatCannotBePublished) {
         const std::string form = std::string("action=create&path=") + path + dates;
         EXPECT_EQ(code(post(PROGRAM_LINK, "alice", form)), expected) << form;
     }
+}
+
+TEST_F(ShareCgi, DownloadsAreCountedAndLimited) {
+    const auto made = [this](const char* terms) {
+        return post(PROGRAM_LINK, "alice", std::string("action=create&path=/photo/shared") + terms)
+            .json["data"]["id"]
+            .asString();
+    };
+    const auto shown = [this](const std::string& id) {
+        const Json::Value items = get(PROGRAM_LINK, "alice", "action=list").json["data"]["items"];
+        for (const Json::Value& link : items)
+            if (link["id"] == id) return link;
+        return Json::Value();
+    };
+    const auto take = [this](const std::string& link, const std::string& more, const Variables& headers = {}) {
+        Variables all = {{"HTTP_X_FORWARDED_FOR", visitor_}, {"HTTP_FOLDER_SHARING", link}};
+        all.insert(headers.begin(), headers.end());
+        return RawReply(runCgi(PROGRAM_SHARE, "", "GET", "action=download" + more, "", all)).status;
+    };
+    const std::string file = "&path=inner/two.txt";
+    const std::string open = made("");
+    EXPECT_EQ(take(open, file + "&look=1"), 200);
+    EXPECT_EQ(shown(open)["used"], 0) << "the page shows it";
+    EXPECT_EQ(take(open, file), 200);
+    EXPECT_EQ(take(open, file, {{"HTTP_RANGE", "bytes=1-"}}), 206);
+    EXPECT_EQ(take(open, file, {{"HTTP_IF_NONE_MATCH", "*"}}), 304);
+    EXPECT_EQ(take(open, "&path=missing"), 404);
+    EXPECT_EQ(shown(open)["used"], 1);
+    EXPECT_GT(shown(open)["last_use"].asInt64(), 0);
+
+    const std::string three = made("&downloads=3&note=for%20Ann");
+    EXPECT_EQ(shown(three)["note"], "for Ann");
+    EXPECT_EQ(countAtOnce(12, [&] { return take(three, file) == 200; }), 3) << "many at once";
+    EXPECT_EQ(shown(three)["used"], 3);
+    EXPECT_EQ(take(three, ""), 410) << "a zip";
+    EXPECT_EQ(take(three, file, {{"HTTP_RANGE", "bytes=1-"}}), 206) << "the rest of what was begun";
+    visitor_ = "192.0.2.7";
+    EXPECT_EQ(take(three, file, {{"HTTP_RANGE", "bytes=1-"}}), 410) << "somebody else has begun nothing";
+    const RawReply page(ask(three, ""));
+    EXPECT_EQ(page.status, 410);
+    EXPECT_NE(page.body.find("used up"), std::string::npos) << page.body;
+    EXPECT_EQ(CgiReply(ask(three, "action=state")).json["data"]["downloads_left"], 0);
+
+    const std::string one = made("&downloads=1");
+    EXPECT_EQ(countAtOnce(6,
+                          [&] {
+                              return take(one, file, {{"HTTP_RANGE", "bytes=0-0"}}) == 206;
+                          }),
+              6)
+        << "one, in parts";
+    EXPECT_EQ(take(one, file + "&look=1"), 410) << "whoever sees it has it";
+    EXPECT_EQ(post(PROGRAM_LINK, "alice", "action=change&downloads=2&id=" + one).status, 200);
+    EXPECT_EQ(take(one, file), 200);
+    EXPECT_EQ(post(PROGRAM_LINK, "alice", "action=revoke&id=" + one).status, 200);
+    EXPECT_EQ(take(one, file), 404);
+}
+
+TEST_F(ShareCgi, ALinkIsChangedInPlace) {
+    EXPECT_EQ(enter(kPassword).status, 200);
+    cookies_ = given();
+    EXPECT_EQ(status(guarded_, "list"), 200);
+    const std::string change = "action=change&id=" + guarded_;
+    const std::string tooLong(401, 'n');
+    for (const auto& [user, terms, expected] : Rows<const char*, std::string, int>{
+             row("bob", "&password=mine", ORV_ERR_MISSING), row("alice", "&available=5", ORV_ERR_PARAMETER),
+             row("alice", "&expires=x", ORV_ERR_PARAMETER), row("alice", "&note=" + tooLong, ORV_ERR_PARAMETER),
+             row("alice", "&note=%0A", ORV_ERR_PARAMETER), row("alice", "&downloads=1000001", ORV_ERR_PARAMETER),
+             row("alice", "&password=" + std::string(512, 'p'), ORV_ERR_PARAMETER)}) {
+        EXPECT_EQ(code(post(PROGRAM_LINK, user, change + terms)), expected) << terms;
+    }
+    EXPECT_EQ(code(get(PROGRAM_LINK, "alice", change)), ORV_ERR_PARAMETER) << "not posted";
+    EXPECT_EQ(status(guarded_, "list"), 200) << "nothing changed";
+    const CgiReply changed = post(PROGRAM_LINK, "alice", change + "&note=n&expires=4102444799");
+    EXPECT_TRUE(changed.json["data"]["has_password"].asBool()) << "not named, not changed";
+    EXPECT_EQ(changed.json["data"]["expires"], Json::Int64(4102444799));
+    EXPECT_EQ(status(guarded_, "list"), 200) << "and nobody is logged out";
+    post(PROGRAM_LINK, "alice", change + "&password=other");
+    EXPECT_EQ(status(guarded_, "list"), 401) << "the old password's log-ins are over";
+    post(PROGRAM_LINK, "alice", change + "&password=");
+    EXPECT_EQ(status(guarded_, "list"), 200) << "open to all";
+    post(PROGRAM_LINK, "alice", change + "&expires=172799");
+    EXPECT_EQ(status(guarded_, "list"), 404) << "its time is over";
+
+    const std::string inner = addLink("alice", kAliceUid, "", "/photo/shared/inner");
+    const auto named = [](const std::string& query) {
+        return each(get(PROGRAM_LINK, "alice", "action=list" + query).json["data"]["items"], "id");
+    };
+    EXPECT_EQ(named("&path=/photo/shared"), (Names{free_, guarded_}));
+    EXPECT_EQ(named("&folder=/photo/shared"), Names{inner});
+    EXPECT_EQ(named("&folder_raw=/photo"), (Names{free_, guarded_}));
+    EXPECT_EQ(get(PROGRAM_LINK, "alice", "action=list&folder=/").json["data"]["total"], 3);
 }
 
 TEST_F(ShareCgi, AToolWithARelativeRoot) {

@@ -1,11 +1,15 @@
 // The link database: whole before it has its name, trusted or not used.
 #include "vexo/link_store.h"
 
+#include <sqlite3.h>
+
 #include "platform/trust.h"
 #include "support/race.h"
 #include "support/refuse_calls.h"
 
 namespace {
+
+using VEXO::LinkTaking;
 
 class LinkStoreTest : public ApplianceTest {
  protected:
@@ -58,6 +62,23 @@ TEST_F(LinkStoreTest, AFirstLinkThatFailsLeavesNothingBroken) {
     EXPECT_NE(add("/photo"), "");
     EXPECT_EQ(paths(), "/photo|");
     EXPECT_FALSE(fs::exists(file_ + ".new") || fs::exists(file_ + ".new-journal"));
+}
+
+TEST_F(LinkStoreTest, ADatabaseOfLinksAloneIsAddedTo) {
+    const std::string id = add("/photo");
+    const auto execute = [this](const char* sql) {
+        sqlite3* database = nullptr;
+        EXPECT_EQ(sqlite3_open(file_.c_str(), &database), SQLITE_OK);
+        EXPECT_EQ(sqlite3_exec(database, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sql;
+        sqlite3_close(database);
+    };
+    execute("DROP TABLE linkMore; DROP TABLE linkTaken; PRAGMA user_version = 0");
+    LinkTaking taking = LinkTaking::kGone;
+    EXPECT_EQ(countAtOnce(4, [&] { return VEXO::LinkStore().take(id, "a", "b", false, taking); }), 4);
+    std::optional<VEXO::Link> link;
+    EXPECT_TRUE(VEXO::LinkStore().find(id, link) && link && link->used == 4);
+    execute("PRAGMA user_version = 99");
+    EXPECT_EQ(paths(), "failed") << "of a newer version";
 }
 
 TEST_F(LinkStoreTest, ManyMakeItAtOnce) {

@@ -1,16 +1,21 @@
 // CGI program "link": the public links of the logged-in user.
 //
 // Parameters, from the query or a form:
-//   action           "create", "list" or "revoke"; what changes something must be posted
-//   path, path_raw   what to publish (create)
-//   password         that a visitor must give (create); none without it
-//   available        from when on, seconds since 1970 (create)
-//   expires          the first or the last second of the last day (create); 0 or none: for ever
-//   id               of the link (revoke); an administrator may revoke anybody's
-// "data" of the reply is the link, or {"items": [...]} of them: id, address, path, has_password, available, expires,
-// created, owner.
+//   action           "create", "list", "change" or "revoke"; what changes something must be posted
+//   path, path_raw   what to publish (create); list: only the links of exactly that
+//   folder, folder_raw  list: only the links of what lies directly in it
+//   password         that a visitor must give; none without it, "" takes it away (create, change)
+//   available        from when on, seconds since 1970 (create, change)
+//   expires          the first or the last second of the last day; 0: for ever (create, change)
+//   note             for the owner alone (create, change)
+//   downloads        how many may be begun; 0: any number (create, change)
+//   id               of the link (change, revoke); an administrator may revoke anybody's
+// What "change" does not name stays as it is. "data" of the reply is the link, or {"items": [...], "total"} of them,
+// the latter of all that the user has: id, address, path, has_password, available, expires, created, owner, note,
+// downloads, used, last_use.
 #include <json/value.h>
 
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <vector>
@@ -21,6 +26,7 @@
 #include "public_link.h"
 #include "reply.h"
 #include "request.h"
+#include "text.h"
 #include "vexo/user.h"
 #include "vexo/web.h"
 
@@ -37,33 +43,66 @@ Json::Value shown(const Link& link) {
     item["available"] = Json::Int64(link.available);
     item["expires"] = Json::Int64(link.expires);
     item["created"] = Json::Int64(link.created);
+    item["note"] = readable(link.note);
+    item["downloads"] = Json::Int64(link.most);
+    item["used"] = Json::Int64(link.used);
+    item["last_use"] = Json::Int64(link.lastUse);
     return item;
+}
+
+// False for a number that is not one.
+bool readNumber(const VEXO::WebCGI& web, const char* name, std::optional<std::int64_t>& number) {
+    if (!web.HasParam(name)) return true;
+    const auto given = numberParam(web, name, 0);
+    if (given) number = static_cast<std::int64_t>(*given);
+    return given.has_value();
+}
+
+bool readTerms(const VEXO::WebCGI& web, LinkTerms& terms) {
+    if (web.HasParam("password")) terms.password = web.GetParam("password", "");
+    if (web.HasParam("note")) terms.note = web.GetParam("note", "");
+    return readNumber(web, "available", terms.available) && readNumber(web, "expires", terms.expires) &&
+           readNumber(web, "downloads", terms.most);
 }
 
 int create(const VEXO::WebCGI& web, const User& user, Json::Value& data, std::string& path) {
     const auto given = pathParam(web);
-    const auto available = numberParam(web, "available", 0);
-    const auto expires = numberParam(web, "expires", 0);
-    if (!isPosted() || !given || !available || !expires) return ORV_ERR_PARAMETER;
+    LinkTerms terms;
+    if (!isPosted() || !given || !readTerms(web, terms)) return ORV_ERR_PARAMETER;
     path = *given;
     Link link;
-    const int code = makeLink({.user = user.name,
-                               .sid = user.sid,
-                               .path = path,
-                               .password = web.GetParam("password", ""),
-                               .available = static_cast<std::int64_t>(*available),
-                               .expires = static_cast<std::int64_t>(*expires)},
-                              link);
+    const int code = makeLink({.user = user.name, .sid = user.sid, .path = path, .terms = terms}, link);
     if (code == ORV_ERR_NONE) data = shown(link);
     return code;
 }
 
-int list(const User& user, Json::Value& data) {
+int change(const VEXO::WebCGI& web, const User& user, Json::Value& data) {
+    LinkTerms terms;
+    if (!isPosted() || !readTerms(web, terms)) return ORV_ERR_PARAMETER;
+    Link link;
+    const int code = changeLink(user.name, web.GetParam("id", ""), terms, link);
+    if (code == ORV_ERR_NONE) data = shown(link);
+    return code;
+}
+
+bool isGiven(const VEXO::WebCGI& web, const std::string& name) {
+    return web.HasParam(name) || web.HasParam(name + "_raw");
+}
+
+int list(const VEXO::WebCGI& web, const User& user, Json::Value& data) {
+    const auto path = bytesParam(web, "path"), folder = bytesParam(web, "folder");
+    if (!path || !folder) return ORV_ERR_PARAMETER;
+    const bool onePath = isGiven(web, "path"), oneFolder = isGiven(web, "folder");
     std::vector<Link> links;
     LinkStore store;
     if (!store.list(user.name, links)) return ORV_ERR_GENERAL;
     data["items"] = Json::Value(Json::arrayValue);
-    for (const Link& link : links) data["items"].append(shown(link));
+    data["total"] = static_cast<Json::UInt64>(links.size());
+    for (const Link& link : links) {
+        if (onePath && link.path != *path) continue;
+        if (oneFolder && link.path.substr(0, link.path.rfind('/')) != *folder) continue;
+        data["items"].append(shown(link));
+    }
     return ORV_ERR_NONE;
 }
 
@@ -86,7 +125,8 @@ void serveLinkProgram(Request& request, Output& out) {
     std::string path;
     int code = ORV_ERR_PARAMETER;
     if (action == "create") code = create(web, user, data, path);
-    if (action == "list") code = list(user, data);
+    if (action == "change") code = change(web, user, data);
+    if (action == "list") code = list(web, user, data);
     if (action == "revoke") code = revoke(web, user);
     reply(out, statusOf(code), user.cookie, code, path, data);
 }

@@ -3,12 +3,14 @@
 // Parameters, from the query or a form:
 //   FOLDER_SHARING   the link; the header Folder-Sharing comes before it
 //   action           none: the page, which asks for the rest
-//                    "state": {"logged_in", "password"}, the latter whether the link takes one
+//                    "state": {"logged_in", "password"}, the latter whether the link takes one; "downloads_left" where
+//                    they are limited
 //                    "login" (posted): with `password`; sets the cookies of the link. 429 when it is not the visitor's
 //                    turn, with {"wait", "turn"}: `turn` goes with the next attempt, after `wait` milliseconds
 //                    "list": what the shared folder holds, or the shared file alone
 //                    "download": a file with ranges, a folder or several paths as a zip
 //   path, path_raw   below the shared folder (list, download)
+//   look             "1": the page shows it, which does not count as a download where these are not limited
 //   sort_by, sort_direction, offset, limit, additional   as for the program "list"; of the additional properties only
 //                    size, time and type
 // A link that is not open for whatever reason, and any path outside it, is missing. What needs a log-in answers 401
@@ -18,13 +20,16 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <cstdio>
+#include <cstdlib>
 #include <set>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "confined.h"
+#include "download/range.h"
 #include "download/sending.h"
 #include "listing.h"
 #include "orvel/error_state.h"
@@ -42,6 +47,7 @@ namespace {
 
 // Each is looked at before the zip begins.
 constexpr size_t kMostPaths = 500;
+constexpr int kLinkUsedUp = 1808;
 constexpr int kShown = ADDITIONAL_SIZE | ADDITIONAL_TIME | ADDITIONAL_TYPE | kAdditionalIcon;
 
 // In front of what the library writes: nothing that the page names may come from elsewhere, nobody learns its address.
@@ -83,6 +89,11 @@ constexpr Notice kNotThere = {
     {"This link is not available.", "It was withdrawn, or its time is over. Ask whoever sent it for a new one."},
     {"Dieser Link ist nicht verfügbar.",
      "Er wurde zurückgezogen oder ist abgelaufen. Bitten Sie die Person, die ihn geschickt hat, um einen neuen."}};
+constexpr Notice kUsedUpNow = {
+    "410 Gone",
+    {"This link has been used up.", "It was made for so many downloads. Ask whoever sent it for a new one."},
+    {"Dieser Link ist aufgebraucht.",
+     "Er war für eine bestimmte Zahl von Downloads. Bitten Sie die Person, die ihn geschickt hat, um einen neuen."}};
 constexpr Notice kBrokenNow = {"500 Internal Server Error",
                                {"This link cannot be opened now.", "Try again later."},
                                {"Dieser Link lässt sich jetzt nicht öffnen.", "Versuchen Sie es später noch einmal."}};
@@ -113,6 +124,7 @@ void servePage(Output& out, Visit& visit) {
         case Availability::kOpen:
             break;
     }
+    if (isUsedUp(visit.link())) return writeNotice(out, kUsedUpNow, tunnel);
     printf("Status: 200 OK\r\n%s", kPageHeaders);
     visit.writePage();
 }
@@ -157,6 +169,8 @@ void serveState(Output& out, Visit& visit) {
     Json::Value state;
     state["logged_in"] = session == Session::kIn;
     state["password"] = !visit.link().passwordHash.empty();
+    const Link& link = visit.link();
+    if (link.most > 0) state["downloads_left"] = Json::Int64(std::max<std::int64_t>(link.most - link.used, 0));
     reply(out, Status::kOk, visit.dropCookie(), ORV_ERR_NONE, "", state);
 }
 
@@ -216,6 +230,35 @@ void serveList(Output& out, Visit& visit, const std::string& wanted) {
     out.text() += '}';
 }
 
+std::string variable(const char* name) {
+    const char* value = getenv(name);
+    return value == nullptr ? "" : value;
+}
+
+// Counts a download before its first byte goes out. What the page shows of a file is no download, unless the link has a
+// limit: whoever saw a file has it. False with the reply written.
+bool countDownload(Output& out, Visit& visit, const std::vector<Source>& sources) {
+    const bool limited = visit.link().most > 0;
+    if (variable("REQUEST_METHOD") == "HEAD" || (!limited && visit.web().GetParam("look", "") == "1")) return true;
+    const bool oneFile = sources.size() == 1 && S_ISREG(sources[0].status.st_mode);
+    const bool partly = oneFile && !variable("HTTP_RANGE").empty();
+    const struct stat& status = sources[0].status;
+    const std::string tag = entityTag(status.st_ino, status.st_size, status.st_mtim.tv_sec, status.st_mtim.tv_nsec);
+    const bool current = oneFile && isCurrent(variable("HTTP_IF_NONE_MATCH"), variable("HTTP_IF_MODIFIED_SINCE"), tag,
+                                              status.st_mtim.tv_sec);
+    if (current && variable("REQUEST_METHOD") != "POST") return true;  // nothing but "304 Not Modified" goes out
+    LinkTaking taking = LinkTaking::kTaken;
+    LinkStore store;
+    if (!store.take(visit.link().id, clientAddress(), oneFile ? tag : "zip", partly, taking)) {
+        fprintf(stderr, "share: a download cannot be counted: %s\n", store.error().c_str());
+        if (limited) replyFailure(out, Status::kBroken, "", ORV_ERR_GENERAL, "");
+        return !limited;
+    }
+    if (taking == LinkTaking::kUsedUp) replyOwnFailure(out, Status::kGone, "", kLinkUsedUp, "link_used_up", "", {});
+    if (taking == LinkTaking::kGone) replyFailure(out, Status::kNotFound, "", ORV_ERR_MISSING, "");
+    return taking == LinkTaking::kTaken;
+}
+
 // Each place once, however often it is named: a visitor could have the same folder packed again and again.
 void serveDownload(Output& out, Visit& visit, std::vector<std::string> wanted) {
     if (wanted.empty()) wanted.emplace_back();
@@ -231,6 +274,7 @@ void serveDownload(Output& out, Visit& visit, std::vector<std::string> wanted) {
     std::string culprit;
     const int code = findSources(wanted, open, sources, culprit);
     if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), "", code, culprit);
+    if (!countDownload(out, visit, sources)) return;
     const User owner = {.name = visit.link().owner, .sid = "", .cookie = ""};
     if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, owner, sources[0]);
     serveZip(out, owner, sources, sources.size() == 1 ? sources[0].name : "download", open);

@@ -5,6 +5,7 @@
 #include <sys/types.h>
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -27,6 +28,16 @@ struct Link {
     std::int64_t available = 0;
     std::int64_t expires = 0;
     std::int64_t created = 0;
+    std::string note{};        // of its owner, for himself
+    std::int64_t most = 0;     // downloads; 0: any number
+    std::int64_t used = 0;     // downloads that were begun
+    std::int64_t lastUse = 0;  // when the last one was; 0: never
+};
+
+enum class LinkTaking {
+    kTaken,   // counted, or a part of one that was
+    kUsedUp,  // as many were begun as may be
+    kGone     // no such link any more
 };
 
 // Its operations answer whether the database could be used; error() then says why not. Everything happens as root where
@@ -46,6 +57,14 @@ class VEXO_API LinkStore {
     [[nodiscard]] bool find(const std::string& id, std::optional<Link>& link);
     // All links of `owner`, or of everybody for "", the oldest first.
     [[nodiscard]] bool list(const std::string& owner, std::vector<Link>& links);
+    // Changes a link of `owner` in one step: `edit` gets it as it is and answers whether to store what it made of its
+    // password, dates, note and limit. `link` is then the link; empty when there is none.
+    [[nodiscard]] bool change(const std::string& id, const std::string& owner, const std::function<bool(Link&)>& edit,
+                              std::optional<Link>& link);
+    // Counts a download, unless the link's limit is reached: many at once never exceed it. `partly`: what `who` took of
+    // `what` within the last hour counts as one.
+    [[nodiscard]] bool take(const std::string& id, const std::string& who, const std::string& what, bool partly,
+                            LinkTaking& taking);
     // Removes a link; `owner` other than "" must be its own. `removed` says whether there was one.
     [[nodiscard]] bool remove(const std::string& id, const std::string& owner, bool& removed);
 

@@ -1,143 +1,82 @@
 #include "vexo/link_store.h"
 
-#include <unistd.h>
-
 #include <cerrno>
-#include <cstdio>
-#include <cstdlib>
 #include <cstring>
 #include <ctime>
 
 #include "base/raised_identity.h"
 #include "base/random.h"
-#include "failure.h"
 #include "fault_gate.h"
-#include "io/sqlite_handle.h"
-#include "io/trusted_file.h"
-#include "vexo/filesystem.h"
-#include "vexo/system_root.h"
+#include "link_database.h"
 
 namespace VEXO {
 namespace {
 
-constexpr int kPatience = 4000;  // milliseconds for the locks of others
 constexpr size_t kIdBytes = 16;
+constexpr std::int64_t kTogether = 3600;         // seconds in which the parts of a file count as one download
+constexpr const char* kMostRemembered = "1000";  // downloads of a link whose parts count as one
 
-// The library reads the first seven columns by these names.
-constexpr const char* kTable =
-    "CREATE TABLE IF NOT EXISTS sharingLinks(linkID TEXT PRIMARY KEY NOT NULL, uid TEXT NOT NULL, filepath TEXT NOT "
-    "NULL, filename TEXT NOT NULL, password TEXT NOT NULL, AvailDate TEXT NOT NULL, ExpDate TEXT NOT NULL, owner TEXT "
-    "NOT NULL, created TEXT NOT NULL)";
 constexpr const char* kInsert =
     "INSERT INTO sharingLinks(linkID, owner, uid, filepath, filename, password, AvailDate, ExpDate, created) "
     "VALUES(?,?,?,?,?,?,?,?,?)";
 constexpr const char* kSelect =
-    "SELECT linkID, owner, uid, filepath, password, AvailDate, ExpDate, created FROM sharingLinks ";
+    "SELECT s.linkID, owner, uid, filepath, password, AvailDate, ExpDate, created, note, most, used, lastUse "
+    "FROM sharingLinks s LEFT JOIN linkMore m ON m.linkID = s.linkID ";
+constexpr const char* kUpdate = "UPDATE sharingLinks SET password = ?2, AvailDate = ?3, ExpDate = ?4 WHERE linkID = ?1";
+constexpr const char* kInsertMore = "INSERT OR IGNORE INTO linkMore(linkID) VALUES(?)";
+constexpr const char* kUpdateMore = "UPDATE linkMore SET note = ?2, most = ?3 WHERE linkID = ?1";
 constexpr const char* kDelete = "DELETE FROM sharingLinks WHERE linkID = ?1 AND (?2 = '' OR owner = ?2)";
 
-std::string text(const vexo::Statement& row, int column) {
-    const auto* bytes = static_cast<const char*>(sqlite3_column_blob(row.get(), column));
-    return bytes == nullptr ? "" : std::string(bytes, static_cast<size_t>(sqlite3_column_bytes(row.get(), column)));
-}
-
-std::int64_t number(const vexo::Statement& row, int column) {
-    return strtoll(text(row, column).c_str(), nullptr, 10);
-}
+constexpr const char* kIsPart = "SELECT 1 FROM linkTaken WHERE linkID = ? AND who = ? AND what = ? AND at > ?";
+constexpr const char* kCount =
+    "UPDATE linkMore SET used = used + 1, lastUse = ?2 WHERE linkID = ?1 AND (most = 0 OR used < most)";
+constexpr const char* kRemember = "INSERT OR REPLACE INTO linkTaken(linkID, who, what, at) VALUES(?,?,?,?)";
+constexpr const char* kForget =
+    "DELETE FROM linkTaken WHERE linkID = ?1 AND (at <= ?2 OR rowid NOT IN "
+    "(SELECT rowid FROM linkTaken WHERE linkID = ?1 ORDER BY at DESC LIMIT ?3))";
 
 Link linkOf(const vexo::Statement& row) {
-    return {.id = text(row, 0),
-            .owner = text(row, 1),
-            .uid = static_cast<uid_t>(number(row, 2)),
-            .path = text(row, 3),
-            .passwordHash = text(row, 4),
-            .available = number(row, 5),
-            .expires = number(row, 6),
-            .created = number(row, 7)};
-}
-
-vexo::Statement prepare(sqlite3* database, const char* sql, const std::vector<std::string>& values) {
-    vexo::Statement statement = vexo::prepare(database, sql);
-    for (size_t i = 0; statement != nullptr && i < values.size(); ++i) {
-        sqlite3_bind_text(statement.get(), static_cast<int>(i + 1), values[i].data(),
-                          static_cast<int>(values[i].size()), SQLITE_TRANSIENT);
-    }
-    return statement;
-}
-
-// Whether something bears the name; what cannot be determined counts so, and fails when it is opened.
-bool isThere(const std::string& path) {
-    struct stat status {};
-    return lstat(path.c_str(), &status) == 0 || errno != ENOENT;
-}
-
-// An empty database at `path`, which is the caller's own; what a killed process left there goes first.
-bool makeTable(const std::string& path) {
-    for (const char* rest : {"", "-journal"}) {
-        if (unlink((path + rest).c_str()) != 0 && errno != ENOENT) return false;
-    }
-    if (!vexo::openTrusted(path, O_RDWR | O_CREAT | O_EXCL, 0600)) return false;
-    const vexo::Database made = vexo::openDatabase(path, SQLITE_OPEN_READWRITE);
-    if (!made) return false;
-    const int result = sqlite3_exec(made.get(), kTable, nullptr, nullptr, nullptr);
-    if (result != SQLITE_OK) errno = vexo::errnoOfSqlite(result);
-    return result == SQLITE_OK;
-}
-
-// Makes the database with its folder, one process at a time, and names it once it is whole. False with errno.
-bool makeDatabase(const std::string& path) {
-    constexpr uid_t keep = static_cast<uid_t>(-1);
-    const std::string folder = path.substr(0, path.rfind('/')), part = path + ".new";
-    if (VEXOFSMkdirP(folder.c_str(), nullptr, 1, keep, keep, 0755) != 0) return false;
-    const vexo::Descriptor lock = vexo::openFile(folder, O_RDONLY | O_DIRECTORY);
-    if (!lock || !vexo::lockFile(lock.get(), LOCK_EX)) return false;
-    if (isThere(path)) return true;  // another process was faster
-    if (makeTable(part) && rename(part.c_str(), path.c_str()) == 0) return fsync(lock.get()) == 0;
-    const vexo::KeepErrno keepErrno;
-    unlink(part.c_str());
-    return false;
+    return {.id = vexo::textOf(row, 0),
+            .owner = vexo::textOf(row, 1),
+            .uid = static_cast<uid_t>(vexo::numberOf(row, 2)),
+            .path = vexo::textOf(row, 3),
+            .passwordHash = vexo::textOf(row, 4),
+            .available = vexo::numberOf(row, 5),
+            .expires = vexo::numberOf(row, 6),
+            .created = vexo::numberOf(row, 7),
+            .note = vexo::textOf(row, 8),
+            .most = vexo::numberOf(row, 9),
+            .used = vexo::numberOf(row, 10),
+            .lastUse = vexo::numberOf(row, 11)};
 }
 
 }  // namespace
 
 struct LinkStore::Impl {
-    vexo::Database database;
-    std::string error;
+    vexo::LinkDatabase database;
 
-    bool fail() {
-        error = database == nullptr ? std::strerror(errno) : sqlite3_errmsg(database.get());
-        return false;
+    bool run(const char* sql, const std::vector<std::string>& values) { return database.run(sql, values); }
+    bool select(const std::string& where, const std::string& value, std::vector<Link>& links) {
+        return database.run((kSelect + where).c_str(), {value},
+                            [&links](const vexo::Statement& row) { links.push_back(linkOf(row)); });
     }
-    // Opens the database that is there.
-    bool open(const std::string& path) {
-        if (database != nullptr) return true;
-        if (!vexo::isTrustedFile(path)) return fail();
-        database = vexo::openDatabase(path, SQLITE_OPEN_READWRITE);
-        if (database == nullptr) return fail();
-        sqlite3_busy_timeout(database.get(), kPatience);
-        return true;
+    // What a link has beside its row.
+    bool keepMore(const Link& link) {
+        return run(kInsertMore, {link.id}) && run(kUpdateMore, {link.id, link.note, std::to_string(link.most)});
     }
-    // Opens it, made where there is none.
-    bool openForAdding() {
-        const std::string path = SystemPath(kLinkDatabase);
-        if (database == nullptr && !isThere(path) && !makeDatabase(path)) return fail();
-        if (!open(path)) return false;
-        return sqlite3_exec(database.get(), kTable, nullptr, nullptr, nullptr) == SQLITE_OK || fail();
+    // Whether that visitor's download of it was counted lately.
+    bool isPart(const std::string& id, const std::string& who, const std::string& what, bool& part) {
+        part = false;
+        return database.run(kIsPart, {id, who, what, std::to_string(time(nullptr) - kTogether)},
+                            [&part](const vexo::Statement&) { part = true; });
     }
-    // Runs a statement and hands over its rows.
-    bool run(const char* sql, const std::vector<std::string>& values, std::vector<Link>* links = nullptr) {
-        const vexo::Statement statement = prepare(database.get(), sql, values);
-        if (statement == nullptr) return fail();
-        int state = SQLITE_DONE;
-        while ((state = sqlite3_step(statement.get())) == SQLITE_ROW && links != nullptr) {
-            links->push_back(linkOf(statement));
-        }
-        return state == SQLITE_DONE || fail();
-    }
-    // Runs a statement where a link was ever made; else there is just nothing.
-    bool ask(const char* sql, const std::vector<std::string>& values, std::vector<Link>* links, bool& asked) {
-        const std::string path = SystemPath(kLinkDatabase);
-        asked = database != nullptr || isThere(path);
-        return !asked || (open(path) && run(sql, values, links));
+    bool count(const std::string& id, const std::string& who, const std::string& what, LinkTaking& taking) {
+        const std::int64_t now = time(nullptr);
+        if (!run(kInsertMore, {id}) || !run(kCount, {id, std::to_string(now)})) return false;
+        taking = database.changed() == 1 ? LinkTaking::kTaken : LinkTaking::kUsedUp;
+        if (taking == LinkTaking::kUsedUp) return true;
+        return run(kRemember, {id, who, what, std::to_string(now)}) &&
+               run(kForget, {id, std::to_string(now - kTogether), kMostRemembered});
     }
 };
 
@@ -145,56 +84,113 @@ LinkStore::LinkStore() : impl_(std::make_unique<Impl>()) {}
 
 LinkStore::~LinkStore() {
     const orvel::RaisedIdentity raised;
-    impl_->database.reset();
+    impl_->database.close();
 }
 
 const std::string& LinkStore::error() const {
-    return impl_->error;
+    return impl_->database.error();
 }
 
 bool LinkStore::add(Link& link) {
-    VEXO_GATE("LinkStore::add", impl_->fail());
+    VEXO_GATE("LinkStore::add", impl_->database.fail());
     const orvel::RaisedIdentity raised;
-    if (!impl_->openForAdding()) return false;
+    if (!impl_->database.openForAdding()) return false;
     link.id = orvel::draw<kIdBytes>();
     link.created = time(nullptr);
-    if (link.id.empty()) {
-        impl_->error = std::strerror(errno);
-        return false;
-    }
-    return impl_->run(
-        kInsert, {link.id, link.owner, std::to_string(link.uid), link.path, link.path.substr(link.path.rfind('/') + 1),
-                  link.passwordHash, std::to_string(link.available), std::to_string(link.expires),
-                  std::to_string(link.created)});
+    if (link.id.empty()) return impl_->database.fail();
+    vexo::LinkTransaction transaction(impl_->database);
+    return transaction.begun() &&
+           impl_->run(kInsert,
+                      {link.id, link.owner, std::to_string(link.uid), link.path,
+                       link.path.substr(link.path.rfind('/') + 1), link.passwordHash, std::to_string(link.available),
+                       std::to_string(link.expires), std::to_string(link.created)}) &&
+           impl_->keepMore(link) && transaction.commit();
 }
 
 bool LinkStore::find(const std::string& id, std::optional<Link>& link) {
-    VEXO_GATE("LinkStore::find", impl_->fail());
+    VEXO_GATE("LinkStore::find", impl_->database.fail());
     const orvel::RaisedIdentity raised;
     std::vector<Link> links;
-    bool asked = false;
+    bool there = false;
     link.reset();
-    if (!impl_->ask((std::string(kSelect) + "WHERE linkID = ?").c_str(), {id}, &links, asked)) return false;
+    if (!impl_->database.open(there)) return false;
+    if (there && !impl_->select("WHERE s.linkID = ?", id, links)) return false;
     if (!links.empty()) link = links.front();
     return true;
 }
 
 bool LinkStore::list(const std::string& owner, std::vector<Link>& links) {
-    VEXO_GATE("LinkStore::list", impl_->fail());
+    VEXO_GATE("LinkStore::list", impl_->database.fail());
     const orvel::RaisedIdentity raised;
-    bool asked = false;
-    const std::string sql = std::string(kSelect) + "WHERE ?1 = '' OR owner = ?1 ORDER BY rowid";
-    return impl_->ask(sql.c_str(), {owner}, &links, asked);
+    bool there = false;
+    if (!impl_->database.open(there)) return false;
+    return !there || impl_->select("WHERE ?1 = '' OR owner = ?1 ORDER BY s.rowid", owner, links);
+}
+
+bool LinkStore::change(const std::string& id, const std::string& owner, const std::function<bool(Link&)>& edit,
+                       std::optional<Link>& link) {
+    VEXO_GATE("LinkStore::change", impl_->database.fail());
+    const orvel::RaisedIdentity raised;
+    std::vector<Link> links;
+    bool there = false;
+    link.reset();
+    if (!impl_->database.open(there)) return false;
+    if (!there) return true;
+    vexo::LinkTransaction transaction(impl_->database);
+    if (!transaction.begun() || !impl_->select("WHERE s.linkID = ?", id, links)) return false;
+    if (links.empty() || links.front().owner != owner) return true;
+    Link& found = links.front();
+    if (!edit(found)) {
+        link = found;
+        return true;
+    }
+    if (!impl_->run(kUpdate,
+                    {id, found.passwordHash, std::to_string(found.available), std::to_string(found.expires)}) ||
+        !impl_->keepMore(found) || !transaction.commit()) {
+        return false;
+    }
+    link = found;
+    return true;
+}
+
+bool LinkStore::take(const std::string& id, const std::string& who, const std::string& what, bool partly,
+                     LinkTaking& taking) {
+    taking = LinkTaking::kTaken;
+    VEXO_GATE("LinkStore::take", impl_->database.fail());
+    const orvel::RaisedIdentity raised;
+    bool there = false, part = false;
+    if (!impl_->database.open(there)) return false;
+    if (!there) {
+        taking = LinkTaking::kGone;
+        return true;
+    }
+    if (partly && !impl_->isPart(id, who, what, part)) return false;
+    if (part) return true;
+    // Whoever was faster may have counted it, or revoked the link.
+    std::vector<Link> links;
+    vexo::LinkTransaction transaction(impl_->database);
+    if (!transaction.begun() || !impl_->select("WHERE s.linkID = ?", id, links)) return false;
+    if (links.empty()) taking = LinkTaking::kGone;
+    if (partly && !impl_->isPart(id, who, what, part)) return false;
+    if (links.empty() || part) return true;
+    return impl_->count(id, who, what, taking) && transaction.commit();
 }
 
 bool LinkStore::remove(const std::string& id, const std::string& owner, bool& removed) {
     removed = false;
-    VEXO_GATE("LinkStore::remove", impl_->fail());
+    VEXO_GATE("LinkStore::remove", impl_->database.fail());
     const orvel::RaisedIdentity raised;
-    bool asked = false;
-    if (!impl_->ask(kDelete, {id, owner}, nullptr, asked)) return false;
-    removed = asked && sqlite3_changes(impl_->database.get()) > 0;
-    return true;
+    bool there = false;
+    if (!impl_->database.open(there)) return false;
+    if (!there) return true;
+    vexo::LinkTransaction transaction(impl_->database);
+    if (!transaction.begun() || !impl_->run(kDelete, {id, owner})) return false;
+    if (impl_->database.changed() == 0) return true;
+    for (const char* beside : {"DELETE FROM linkMore WHERE linkID = ?", "DELETE FROM linkTaken WHERE linkID = ?"}) {
+        if (!impl_->run(beside, {id})) return false;
+    }
+    removed = transaction.commit();
+    return removed;
 }
 
 }  // namespace VEXO
