@@ -74,6 +74,65 @@ test("a folder with a password, opened elsewhere, then revoked", () =>
     });
   }));
 
+test("changed in place: downloads that end, a badge, a code", () =>
+  withPage("alice", { path: "/projects" }, async (page) => {
+    await row(page, "notes.md").click();
+    await page.click("#toolbar >> text=Share a link");
+    await page.fill("[name=password]", "");
+    await page.click(".dialog >> text=Create link");
+    const address = await page.inputValue(".address");
+    await page.click(".dialog >> text=QR code");
+    const code = page.locator(".link-code");
+    await code.locator(`svg[aria-label$="${address}"]`).waitFor();
+    await screenshot(page, "link-code");
+    assert.deepEqual(await findings(page), []);
+    const picture = page.waitForEvent("download");
+    await code.locator("text=Download picture").click();
+    assert.equal((await picture).suggestedFilename(), "link.png");
+    await page.keyboard.press("Escape");
+    await page.keyboard.press("Escape");
+    const marked = row(page, "notes.md").locator(".badge[title*='public link']");
+    await marked.waitFor();
+
+    await row(page, "notes.md").click({ button: "right" });
+    await page.click(".menu >> text=Links of this item");
+    const link = page.locator(".link-list li", { has: page.locator(`a[href="${address}"]`) });
+    await link.locator("text=no downloads yet").waitFor();
+    await link.locator("[aria-label='Change this link']").click();
+    const form = page.locator(".dialog:has([name=note])");
+    await form.locator("[name=downloads]").fill("1");
+    await form.locator("[name=note]").fill("for Ann");
+    await form.locator("text=Save changes").click();
+    await link.locator("text=no downloads yet, 1 possible").waitFor();
+    await link.locator("text=for Ann").waitFor();
+    await screenshot(page, "links-of-item");
+    assert.deepEqual(await findings(page), []);
+
+    await visit(address, async (visitor, status, wrong) => {
+      await visitor.waitForSelector("#left:has-text('1 download left')");
+      assert.equal(await visitor.locator("text=Preview").count(), 0);
+      assert.deepEqual(await findings(visitor), []);
+      await screenshot(visitor, "visitor-limited");
+      const download = visitor.waitForEvent("download");
+      await visitor.click("text=Download");
+      await (await download).path();
+      await visitor.click("text=Download");
+      await visitor.waitForSelector("h1:has-text('used up')");
+      assert.equal((await visitor.reload()).status(), 410);
+      await visitor.waitForSelector("h1:has-text('This link has been used up.')");
+      assert.deepEqual(wrong.filter((text) => !text.includes("410")), []);
+    });
+    await page.keyboard.press("Escape");
+    await row(page, "notes.md").click({ button: "right" });
+    await page.click(".menu >> text=Links of this item");
+    await link.locator("text=used up: 1 of 1 download").waitFor();
+    await link.locator("[aria-label=Revoke]").click();
+    await page.click(".dialog .button.danger");
+    await link.waitFor({ state: "detached" });
+    await page.keyboard.press("Escape");
+    await marked.waitFor({ state: "detached" });
+  }));
+
 test("names of markup reach a visitor as text", () =>
   withPage("alice", { path: "/" }, async (page) => {
     await go(page, "/worldwide");

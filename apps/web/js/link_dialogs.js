@@ -1,92 +1,53 @@
-// Public links: making one for a file or folder, and all of one's own.
+// Public links: making one for a file or folder, and those that one has.
 
 import { get, post } from "./api.js";
 import { confirm, dialog, toast, toastFailure } from "./dialogs.js";
-import { dayRange, h, icon, iconButton, keepFocus, nameNode, plainName } from "./dom.js";
-import { sentenceOf } from "./errors.js";
-import { formatDay } from "./format.js";
+import { h, icon, iconButton, keepFocus, nameNode, plainName } from "./dom.js";
+import { emit } from "./events.js";
+import { formatDay, formatTime } from "./format.js";
 import { iconOf } from "./icons.js";
+import { showCode } from "./link_code.js";
+import { linkForm, termFields } from "./link_form.js";
 import { copyText } from "./operations.js";
 import { decode, idIn, nameOf } from "./path.js";
 import { t } from "./strings.js";
 
-const dayStart = (day) => (day ? Math.floor(new Date(`${day}T00:00:00`).getTime() / 1000) : undefined);
-
-// 80 random bits in characters that are not mistaken for one another.
-function proposedPassword() {
-  const symbols = "abcdefghijkmnpqrstuvwxyz23456789";
-  const drawn = crypto.getRandomValues(new Uint8Array(16));
-  return [...drawn].map((byte, at) => (at > 0 && at % 4 === 0 ? "-" : "") + symbols[byte % symbols.length]).join("");
-}
-
 export async function makeLink(entry) {
   let password = "";
-  const link = await dialog({
+  const link = await linkForm({
     title: t("link.title"),
-    fill: (close) => {
-      const complaint = h("span.complaint", { role: "alert" });
-      const today = new Date().toLocaleDateString("sv"); // year-month-day
-      const [available, expires] = dayRange({ name: "available" }, { name: "expires", min: today });
-      const field = (key, node, hint) =>
-        h("label.field", {}, h("span", {}, t(`link.${key}`)), node, hint && h("span.soft", {}, hint));
-      const form = h(
-        "form",
-        {
-          onsubmit: async (event) => {
-            event.preventDefault();
-            ({ password } = Object.fromEntries(new FormData(form)));
-            try {
-              close(
-                await post("link", {
-                  action: "create",
-                  path_raw: entry.id,
-                  password: password || undefined,
-                  available: dayStart(available.value),
-                  expires: dayStart(expires.value),
-                }),
-              );
-            } catch (failure) {
-              complaint.textContent = available.value && !expires.value ? t("link.window") : sentenceOf(failure);
-            }
-          },
-        },
-        h("div.hero", {}, icon(iconOf(entry), "file-icon"), h("b.grow", {}, nameNode(entry.name))),
-        h(
-          "div.fields.link-fields",
-          {},
-          field(
-            "password",
-            h("input.input", {
-              name: "password",
-              type: "text",
-              autocomplete: "off",
-              spellcheck: "false",
-              autofocus: true,
-              value: proposedPassword(),
-              placeholder: t("link.password.none"),
-            }),
-            t("link.password.proposed"),
-          ),
-          h(
-            "div.pair",
-            {},
-            field("available", available),
-            field("expires", expires),
-          ),
-          h("p.soft", {}, t(entry.isFolder ? "link.about.folder" : "link.about.file")),
-          complaint,
-        ),
-        h(
-          "footer",
-          {},
-          h("button.button", { type: "button", onclick: () => close(null) }, t("dialog.cancel")),
-          h("button.button.primary", { type: "submit" }, icon("link"), t("link.create")),
-        ),
-      );
-      return [form];
+    picture: iconOf(entry),
+    name: entry.name,
+    fields: termFields(),
+    about: t(entry.isFolder ? "link.about.folder" : "link.about.file"),
+    action: t("link.create"),
+    submit: (terms) => {
+      ({ password } = terms);
+      return post("link", { action: "create", path_raw: entry.id, ...terms });
     },
   });
-  if (link) showLink(link, password);
+  if (!link) return;
+  emit("links");
+  showLink(link, password);
+}
+
+async function editLink(link) {
+  let password;
+  const changed = await linkForm({
+    title: t("link.edit.title"),
+    picture: link.has_password ? "lock" : "link",
+    name: nameOf(idIn(link)),
+    fields: termFields(link),
+    action: t("link.save"),
+    submit: (terms) => {
+      ({ password } = terms);
+      return post("link", { action: "change", id: link.id, ...terms });
+    },
+  });
+  if (!changed) return null;
+  if (password) await showLink(changed, password);
+  else toast({ text: t("link.saved") });
+  return changed;
 }
 
 // The password is shown this once: the appliance keeps no more than its hash.
@@ -129,7 +90,7 @@ function showLink(link, password) {
         h(
           "p.soft",
           {},
-          [link.has_password ? t("link.tell_password") : t("link.open_to_all"), windowOf(link)]
+          [link.has_password ? t("link.tell_password") : t("link.open_to_all"), windowOf(link), limitOf(link)]
             .filter(Boolean)
             .join(" "),
         ),
@@ -137,6 +98,7 @@ function showLink(link, password) {
       h(
         "footer",
         {},
+        h("button.button.outlined", { type: "button", onclick: () => codeOf(link) }, icon("code"), t("link.code")),
         h(
           "a.button.outlined",
           { href: addressOf(link), target: "_blank", rel: "noopener" },
@@ -155,6 +117,10 @@ function addressOf(link) {
   return new URL(link.address, location.href).href;
 }
 
+function codeOf(link) {
+  return showCode(addressOf(link), plainName(nameOf(idIn(link)))).catch(toastFailure);
+}
+
 function copyLink(link) {
   return copyText(addressOf(link), t("link.copied"));
 }
@@ -167,15 +133,27 @@ function windowOf(link) {
   });
 }
 
-export async function showLinks() {
+function limitOf({ downloads }) {
+  return downloads ? t("link.limit", { count: downloads }) : "";
+}
+
+function usesOf({ used, downloads, last_use: last }) {
+  if (downloads && used >= downloads) return t("link.used_up", { count: downloads });
+  if (!used) return downloads ? t("link.unused.of", { count: downloads }) : t("link.unused");
+  const count = downloads ? t("link.used.of", { used, count: downloads }) : t("link.used", { count: used });
+  return `${count}, ${t("link.last", { time: formatTime(last) })}`;
+}
+
+// Of one file or folder, or all.
+export async function showLinks(entry = null) {
   let items;
   try {
-    ({ items } = await get("link", { action: "list" }));
+    ({ items } = await get("link", { action: "list", path_raw: entry?.id }));
   } catch (failure) {
     return toastFailure(failure);
   }
   return dialog({
-    title: t("command.links"),
+    title: t(entry ? "command.itemLinks" : "command.links"),
     wide: true,
     className: "links",
     fill: () => {
@@ -186,61 +164,78 @@ export async function showLinks() {
             ...(items.length > 0 ? items.map(rowOf) : [h("li.none", {}, icon("link"), h("span", {}, t("link.none")))]),
           ),
         );
-      const rowOf = (link) =>
-        h(
-          "li",
-          {},
-          h("span.card-icon", {}, icon(link.has_password ? "lock" : "link")),
-          h(
-            "div.grow",
-            {},
-            h("b", { title: plainName(decode(idIn(link))) }, nameNode(nameOf(idIn(link)))),
-            h(
-              "span.soft",
-              {},
-              [
-                plainName(decode(idIn(link))),
-                link.has_password && t("link.protected"),
-                windowOf(link) || t("link.forever"),
-              ]
-                .filter(Boolean)
-                .join(" · "),
-            ),
-          ),
-          h(
-            "a.icon-button",
-            {
-              href: addressOf(link),
-              target: "_blank",
-              rel: "noopener",
-              "aria-label": t("link.visit"),
-              title: t("link.visit"),
-            },
-            icon("eye"),
-          ),
-          iconButton("copy", t("link.copy"), () => copyLink(link)),
-          iconButton("trash", t("link.revoke"), async () => {
-            if (
-              !(await confirm({
-                title: t("link.revoke.title"),
-                text: t("link.revoke.text"),
-                action: t("link.revoke"),
-                kind: "danger",
-              }))
-            )
-              return;
-            try {
-              await post("link", { action: "revoke", id: link.id });
-              items = items.filter((one) => one !== link);
-              paint();
-              toast({ text: t("link.revoked") });
-            } catch (failure) {
-              toastFailure(failure);
-            }
-          }),
-        );
+      const edit = async (link) => {
+        const changed = await editLink(link);
+        if (!changed) return;
+        items = items.map((one) => (one === link ? changed : one));
+        paint();
+      };
+      const revoke = async (link) => {
+        if (!(await confirmRevoking())) return;
+        try {
+          await post("link", { action: "revoke", id: link.id });
+          items = items.filter((one) => one !== link);
+          paint();
+          emit("links");
+          toast({ text: t("link.revoked") });
+        } catch (failure) {
+          toastFailure(failure);
+        }
+      };
+      const rowOf = (link) => linkRow(link, { edit, revoke });
       paint();
       return [list];
     },
   });
+}
+
+function confirmRevoking() {
+  return confirm({
+    title: t("link.revoke.title"),
+    text: t("link.revoke.text"),
+    action: t("link.revoke"),
+    kind: "danger",
+  });
+}
+
+function linkRow(link, { edit, revoke }) {
+  const spent = Boolean(link.downloads) && link.used >= link.downloads;
+  return h(
+    "li",
+    {},
+    h("span.card-icon", {}, icon(link.has_password ? "lock" : "link")),
+    h(
+      "div.grow",
+      {},
+      h("b", { title: plainName(decode(idIn(link))) }, nameNode(nameOf(idIn(link)))),
+      link.note && h("span.note", {}, h("bdi", {}, link.note)),
+      h(
+        "span.soft",
+        {},
+        [plainName(decode(idIn(link))), link.has_password && t("link.protected"), windowOf(link) || t("link.forever")]
+          .filter(Boolean)
+          .join(" · "),
+      ),
+      h(spent ? "span.soft.spent" : "span.soft", {}, usesOf(link)),
+    ),
+    h(
+      "div.link-actions",
+      {},
+      h(
+        "a.icon-button",
+        {
+          href: addressOf(link),
+          target: "_blank",
+          rel: "noopener",
+          "aria-label": t("link.visit"),
+          title: t("link.visit"),
+        },
+        icon("eye"),
+      ),
+      iconButton("copy", t("link.copy"), () => copyLink(link)),
+      iconButton("code", t("link.code"), () => codeOf(link)),
+      iconButton("rename", t("link.edit"), () => edit(link)),
+      iconButton("trash", t("link.revoke"), () => revoke(link)),
+    ),
+  );
 }

@@ -2,6 +2,7 @@
 
 import { addCommand } from "./commands.js";
 import { loaded } from "./dialogs.js";
+import { hasLink } from "./link_marks.js";
 
 const dialogs = () => loaded(import("./link_dialogs.js"));
 
@@ -12,5 +13,12 @@ addCommand({
   group: "info",
   when: ({ single, inBin, canDownload }) => single && !inBin && canDownload,
   run: async ({ single }) => (await dialogs())?.makeLink(single),
+});
+addCommand({
+  id: "itemLinks",
+  icon: "link",
+  group: "info",
+  when: ({ single }) => Boolean(single && hasLink(single.id)),
+  run: async ({ single }) => (await dialogs())?.showLinks(single),
 });
 addCommand({ id: "links", icon: "link", group: "info", run: async () => (await dialogs())?.showLinks() });

@@ -26,6 +26,7 @@ import { setupDragAndDrop } from "./dragdrop.js";
 import { arrived, emit, on } from "./events.js";
 import { filterHome, homeNode, paintVolume } from "./home.js";
 import { setupKeys } from "./keys.js";
+import { setupLinkMarks } from "./link_marks.js";
 import "./links.js";
 import { isUnreachable, untilReachable } from "./network.js";
 import { newFolder } from "./operations.js";
@@ -275,6 +276,7 @@ async function start() {
   });
   applyDensity();
   setupAccess();
+  setupLinkMarks();
   setupToolbar(setSort);
   setupPathbar();
   setupTree();

@@ -5,6 +5,7 @@ import { h, icon, nameNode, plainName } from "./dom.js";
 import { isLocked, isOffline, shownName } from "./entries.js";
 import { formatSize, formatTime } from "./format.js";
 import { iconOf } from "./icons.js";
+import { hasLink } from "./link_marks.js";
 import { t } from "./strings.js";
 import { thumbnailOf } from "./thumbnails.js";
 
@@ -72,6 +73,7 @@ function spoken(entry) {
   return [
     plainName(shownName(entry)),
     isLocked(entry) && t("mark.locked"),
+    hasLink(entry.id) && t("mark.link"),
     isOffline(entry) && t("mark.offline"),
     entry.size === null ? t("type.folder") : formatSize(entry.size),
     formatTime(entry.mtime),
@@ -101,6 +103,7 @@ function more() {
 function badges(entry) {
   return [
     isLocked(entry) && h("span.badge", { title: t("mark.locked") }, icon("lock")),
+    hasLink(entry.id) && h("span.badge", { title: t("mark.link") }, icon("link")),
     isOffline(entry) && h("span.badge.warn", { title: t("mark.offline") }, icon("offline")),
   ];
 }

@@ -121,6 +121,12 @@ export class View {
     this.paintSelection();
   }
 
+  // What these entries show besides themselves is another.
+  renew(ids) {
+    for (const row of this.rows.values()) if (row.entry && ids.has(row.entry.id)) row.filled = false;
+    this.render();
+  }
+
   place(index, box) {
     let row = this.rows.get(index);
     if (!row) {

@@ -2,7 +2,7 @@
 
 import { kindOf, thumbnail } from "./kinds.js";
 import { aboutText, drawing, make, nameNode, picture, sizeText, texts, timeText } from "./parts.js";
-import { fileAddress, list, pathField } from "./requests.js";
+import { fileAddress, limits, list, pathField } from "./requests.js";
 
 const COLUMNS = [["name", texts.name], ["size", texts.size], ["mtime", texts.changed]];
 const order = { by: "name", direction: "asc" };
@@ -44,7 +44,7 @@ export class Folder {
     this.total = json.data.total;
     // Whoever has not said how, sees a folder of pictures as pictures.
     const pictures = this.items.filter((item) => kindOf(item) === "image").length;
-    this.mode = mode ?? (pictures * 2 > this.items.length ? "gallery" : "list");
+    this.mode = mode ?? (limits.left === null && pictures * 2 > this.items.length ? "gallery" : "list");
     this.paint();
     return true;
   }

@@ -1,6 +1,6 @@
 // What a browser shows of a file by itself.
 
-import { fileAddress } from "./requests.js";
+import { limits, lookAddress } from "./requests.js";
 import { make } from "./parts.js";
 
 const KINDS = {
@@ -20,12 +20,12 @@ export function kindOf({ isdir, name }) {
 // The picture itself in place of `drawn`, once it is there.
 export function thumbnail(item, drawn) {
   const size = item.additional?.size ?? 0;
-  if (kindOf(item) !== "image" || size === 0 || size > LARGEST_THUMBNAIL) return drawn;
+  if (limits.left !== null || kindOf(item) !== "image" || size === 0 || size > LARGEST_THUMBNAIL) return drawn;
   const frame = make("span.thumbnail", {}, drawn);
   const image = make("img", { alt: "", loading: "lazy", decoding: "async" });
   image.addEventListener("load", () => drawn.remove());
   image.addEventListener("error", () => image.remove());
-  image.src = fileAddress(item);
+  image.src = lookAddress(item);
   frame.append(image);
   return frame;
 }

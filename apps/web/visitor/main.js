@@ -3,7 +3,7 @@
 import { Folder, placeAddress } from "./folder.js";
 import { aboutText, drawing, make, nameNode, picture, texts } from "./parts.js";
 import { closePreview, openPreview } from "./preview.js";
-import { fileAddress, logIn, pathField, state } from "./requests.js";
+import { fileAddress, limits, logIn, pathField, state } from "./requests.js";
 
 let view = null;
 let folder = null; // what is shown, a Folder
@@ -11,6 +11,11 @@ let asked = 0; // places asked for; the last one is shown
 
 function show(...children) {
   view.replaceChildren(...children);
+}
+
+// How many downloads are left, where that is limited.
+function leftLine() {
+  return limits.left === null ? null : make("p.soft.left", { id: "left", role: "status" });
 }
 
 function notice(text, hint = "") {
@@ -103,7 +108,9 @@ function look(item) {
 function showFile(item) {
   const get = make("a.button", { href: fileAddress({}), download: "" }, texts.download);
   const see = make("button.outlined", { type: "button", click: () => openPreview(item, { onStep() {}, onClose: closePreview }) }, texts.preview);
-  show(make("div.single", {}, picture(item.icon ?? "misc.png"), make("h1", {}, nameNode(item)), make("p.soft", {}, aboutText(item)), make("div.choice", {}, see, get)));
+  const choice = make("div.choice", {}, limits.left === null ? see : null, get);
+  show(make("div.single", {}, picture(item.icon ?? "misc.png"), make("h1", {}, nameNode(item)), make("p.soft", {}, aboutText(item)), choice, leftLine()));
+  paintLeft();
 }
 
 // The folders on the way to this one, from the shared one.
@@ -123,8 +130,29 @@ function showFolder() {
   const get = total > 0 && make("a.button", { href: fileAddress(place), download: "" }, drawing("download"), texts.downloadAll);
   const head = make("header", {}, make("h1", {}, nameNode(place)), ...(get ? [get] : []));
   const way = place.path ? [crumbs(place)] : [];
-  show(...way, head, total > 0 ? folder.node : make("p.empty", {}, texts.empty));
+  const left = leftLine();
+  show(...way, head, ...(left ? [left] : []), total > 0 ? folder.node : make("p.empty", {}, texts.empty));
+  paintLeft();
   document.title = place.name;
+}
+
+// A link for so many downloads: when they are over, the page says so instead of a download that fails.
+async function guard(event) {
+  const get = event.target.closest?.("a[download]");
+  if (!get || limits.left === null) return;
+  event.preventDefault();
+  const { status } = await state();
+  if (status !== 200) return noticeOf(status);
+  if (limits.left === 0) return notice(texts.usedUp, texts.usedUpHint);
+  location.assign(get.href);
+  limits.left -= 1;
+  paintLeft();
+  return undefined;
+}
+
+function paintLeft() {
+  const line = document.getElementById("left");
+  if (line) line.textContent = texts.left[limits.left === 1 ? 0 : 1].replace("{count}", limits.left.toLocaleString());
 }
 
 export function start() {
@@ -132,5 +160,6 @@ export function start() {
   const mark = make("img", { src: new URL("../favicon.svg", import.meta.url), alt: "", width: "26", height: "26" });
   document.body.append(make("div.brand", { role: "banner" }, mark, "Orvel"), view);
   addEventListener("hashchange", open);
+  document.addEventListener("click", guard, true);
   open();
 }

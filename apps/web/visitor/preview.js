@@ -2,7 +2,7 @@
 
 import { kindOf } from "./kinds.js";
 import { aboutText, drawing, make, nameNode, picture, texts } from "./parts.js";
-import { fileAddress } from "./requests.js";
+import { fileAddress, limits, lookAddress } from "./requests.js";
 
 const TEXT_START = 256 * 1024;
 const SWIPE = 60; // pixels
@@ -55,9 +55,10 @@ export function closePreview() {
 
 function contentOf(item) {
   const kind = kindOf(item);
-  const source = fileAddress(item);
-  const none = make("div.none", {}, picture(item.icon), make("p", {}, texts.noPreview), make("a.button", { href: source, download: "" }, texts.download));
-  if (kind === "other" || !(item.additional?.size > 0)) return none;
+  const source = lookAddress(item);
+  const why = limits.left === null ? texts.noPreview : texts.noLook;
+  const none = make("div.none", {}, picture(item.icon), make("p", {}, why), make("a.button", { href: fileAddress(item), download: "" }, texts.download));
+  if (limits.left !== null || kind === "other" || !(item.additional?.size > 0)) return none;
   if (kind === "text") return textOf(item, source, none);
   const node = kind === "image" ? make("img", { alt: item.name }) : make(kind, { controls: "", preload: "metadata", "aria-label": item.name });
   node.addEventListener("error", () => node.replaceWith(none));

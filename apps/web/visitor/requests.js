@@ -19,6 +19,14 @@ export function fileAddress(item) {
   return address({ action: "download", ...pathField(item) });
 }
 
+// What the page itself shows of a file.
+export function lookAddress(item) {
+  return address({ action: "download", look: 1, ...pathField(item) });
+}
+
+// Where a link is good for so many downloads, whoever sees a file has it: then nothing is shown but names.
+export const limits = { left: null };
+
 async function ask(fields, options) {
   const answer = await fetch(address(fields), { credentials: "same-origin", ...options });
   return { status: answer.status, json: await answer.json() };
@@ -27,8 +35,10 @@ async function ask(fields, options) {
 // Without a reply there is nothing to tell apart.
 const FAILED = { status: 500, json: { success: false } };
 
-export function state() {
-  return ask({ action: "state" }).catch(() => FAILED);
+export async function state() {
+  const answer = await ask({ action: "state" }).catch(() => FAILED);
+  limits.left = answer.json.data?.downloads_left ?? null;
+  return answer;
 }
 
 export function list(path, offset, { by, direction }) {
