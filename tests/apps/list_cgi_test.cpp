@@ -46,6 +46,27 @@ TEST_F(ListCgi, EachUserSeesTheOwnShares) {
     EXPECT_EQ(names(ask("bob", "action=shares&sort_by=name&sort_direction=desc")), (Names{"photo", "homes", "home"}));
 }
 
+TEST_F(ListCgi, WhatAPageNeedsBesideComesInTheSameReply) {
+    const auto dataOf = [](const char* program, const std::string& query) {
+        return CgiReply(runCgi(program, "bob", "GET", query)).json["data"];
+    };
+    const Json::Value tasks = dataOf(PROGRAM_OPERATION, "action=status"), uploads = dataOf(PROGRAM_TUS, "");
+    const Json::Value own = dataOf(PROGRAM_PREFERENCES, "action=get"), access = dataOf(PROGRAM_WHY, "path=/photo");
+    ASSERT_TRUE(tasks["tasks"].isArray() && uploads["items"].isArray() && own.isMember("values"));
+    ASSERT_EQ(access["rule"], "read_only");
+    for (const auto& [query, expected] : Rows<const char*, std::map<std::string, Json::Value>>{
+             {"action=shares&with=uploads,tasks,preferences,tasks,other,access",
+              {{"tasks", tasks}, {"uploads", uploads}, {"preferences", own}}},
+             {"action=folder&path=/photo&with=access", {{"access", access}}},
+             {"action=folder&path=/photo&with=access,&keep=1", {{"access", access}}},
+             {"action=folder&path=/photo&with=", {}},
+         }) {
+        const Json::Value with = ask("bob", query).json["data"]["with"];
+        EXPECT_EQ(with.size(), expected.size()) << query << with;
+        for (const auto& [name, data] : expected) EXPECT_EQ(with[name], data) << query;
+    }
+}
+
 TEST_F(ListCgi, RefusalsSayWhy) {
     addShare("music", "read only = no\nvalid users = alice\ninvalid users = bob\n");
     addShare("sealed", "read only = no\nvalid users = bob\nvexo:restriction = 1\n");

@@ -156,7 +156,7 @@ def checkTable():
                  for method in ("get", "post") for s in requestSchemas(program, method)} - {None, ""}
         expect(actions == named, f"{program}: its actions are {actions}, described are {named}")
         read = set(re.findall(r'Params?\((?:[\w.]+, )?"(\w+)"', code))
-        taken = {name for schema in (s for m in ("get", "post", "put", "patch") for s in requestSchemas(program, m)) for name in schema["properties"]}
+        taken = {name for schema in (s for m in ("get", "post", "put", "patch", "delete") for s in requestSchemas(program, m)) for name in schema["properties"]}
         expect(read <= taken, f"{program}: parameters {read - taken} are not described")
         refused = "PUT" if program == "tus" else "DELETE"
         allowed = send(program, refused, {}, "alice")[1]["Allow"]

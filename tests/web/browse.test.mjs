@@ -420,6 +420,15 @@ test("every module that a start needs is fetched at once", async () => {
   assert.deepEqual(listed.sort(), [...needed].sort());
 });
 
+test("a start asks for the shares and the folder, and for nothing else", () =>
+  withPage("bob", { path: "/photo" }, async (page) => {
+    const asked = [];
+    page.on("request", (one) => one.url().includes("/cgi-bin/") && asked.push(new URL(one.url())));
+    await page.reload({ waitUntil: "networkidle" });
+    await rowsReady(page);
+    assert.deepEqual(asked.map((url) => `${url.pathname} ${url.searchParams.get("action")}`), ["/cgi-bin/list shares", "/cgi-bin/list folder"]);
+  }));
+
 test("every message key has its words, in both languages", async () => {
   const source = readFileSync(new URL("../../src/core/error_state.cpp", import.meta.url), "utf8");
   const keys = [...source.matchAll(/"(error:\w+)"/g)].map((match) => match[1]);

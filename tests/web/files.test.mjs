@@ -175,6 +175,7 @@ test("a refused download says so in words", () =>
     { path: "/preview" },
     async (page) => {
       // As if the share had been closed to downloads a moment ago.
+      await page.route(/&with=access/, (route) => route.continue({ url: route.request().url().replace("&with=access", "") }));
       await page.route("**/cgi-bin/why?path_raw=%2Fpreview", (route) =>
         route.fulfill({ json: { success: false, error: { code: 401, key: "error:error_error_system", path: "" } } }),
       );

@@ -7,6 +7,7 @@
 
 #include "chosen_rows.h"
 #include "kept_store.h"
+#include "list/beside.h"
 #include "natural_order.h"
 #include "orvel/error_state.h"
 #include "orvel/share_path.h"
@@ -190,6 +191,7 @@ void serveKeeping(Request& request, const ListRequest& wanted, Output& out) {
     }
     appendMember("changed", false, out);
     appendRows(anew.rows, wanted.additional, out);
+    appendBeside(request, wanted.path, out);
     out.text() += "}}";
 }
 

@@ -9,12 +9,14 @@
 //   additional       words as for additionalBits
 //   pattern          comma-separated name patterns (folder only)
 //   filetype         "dir", "file" or "all" (default; folder only)
+//   with             see list/beside.h (shares, folder)
 // and those of kept listings: see list/kept.h.
 // "data" of the reply is {"total","offset","items"}; beside that of the shares stands "user", who is logged in.
 #include <optional>
 #include <string>
 
 #include "base/json_text.h"
+#include "list/beside.h"
 #include "list/deleted.h"
 #include "list/kept.h"
 #include "listing.h"
@@ -79,8 +81,10 @@ void serveListProgram(Request& request, Output& out) {
         out.text() += ',';
     }
     out.text() += "\"data\":";
-    writeListing(*wanted, listing, shares ? appendShare : appendEntry, out);
-    out.text() += '}';
+    out.text() += '{';
+    writePage(*wanted, listing, shares ? appendShare : appendEntry, out);
+    appendBeside(request, shares ? "" : wanted->path, out);
+    out.text() += "}}";
 }
 
 }  // namespace orvel::cgi

@@ -22,7 +22,7 @@ int clearOperation(Operation& operation) {
     static_cast<void>(makeRoomForTask(user));  // old ones go, whatever is asked for
     if (operation.web.HasParam("taskid")) return clearOne(operation);
     std::vector<std::unique_ptr<KTR::Task>> tasks;
-    if (!tasksOf(operation, tasks)) return ORV_ERR_GENERAL;
+    if (!tasksOf(operation.user.name, tasks)) return ORV_ERR_GENERAL;
     int cleared = 0;
     for (const auto& task : tasks) {
         if (task->isFinished() && task->remove()) ++cleared;

@@ -11,11 +11,7 @@ int statusOperation(Operation& operation) {
         operation.data = taskReply(*task);
         return ORV_ERR_NONE;
     }
-    std::vector<std::unique_ptr<KTR::Task>> tasks;
-    if (!tasksOf(operation, tasks)) return ORV_ERR_GENERAL;
-    operation.data["tasks"] = Json::Value(Json::arrayValue);
-    for (const auto& task : tasks) operation.data["tasks"].append(taskReply(*task));
-    return ORV_ERR_NONE;
+    return tasksReply(operation.user.name, operation.data) ? ORV_ERR_NONE : ORV_ERR_GENERAL;
 }
 
 }  // namespace orvel::cgi

@@ -38,8 +38,8 @@ std::unique_ptr<KTR::Task> taskOf(const Operation& operation) {
     return std::unique_ptr<KTR::Task>(KTR::TaskMgr(operation.user.name.c_str()).getTask(id.c_str()));
 }
 
-bool tasksOf(const Operation& operation, std::vector<std::unique_ptr<KTR::Task>>& tasks) {
-    const KTR::TaskMgr manager(operation.user.name.c_str());
+bool tasksOf(const std::string& user, std::vector<std::unique_ptr<KTR::Task>>& tasks) {
+    const KTR::TaskMgr manager(user.c_str());
     Json::Value names(Json::arrayValue);
     if (!manager.getAllTaskId(kTaskPrefix, names)) return false;
     for (const Json::Value& name : names) {
@@ -47,6 +47,14 @@ bool tasksOf(const Operation& operation, std::vector<std::unique_ptr<KTR::Task>>
         std::unique_ptr<KTR::Task> task(manager.getTask(name.asCString()));
         if (task != nullptr) tasks.push_back(std::move(task));
     }
+    return true;
+}
+
+bool tasksReply(const std::string& user, Json::Value& data) {
+    std::vector<std::unique_ptr<KTR::Task>> tasks;
+    if (!tasksOf(user, tasks)) return false;
+    data["tasks"] = Json::Value(Json::arrayValue);
+    for (const auto& task : tasks) data["tasks"].append(taskReply(*task));
     return true;
 }
 

@@ -5,6 +5,7 @@
 #include <json/value.h>
 
 #include <memory>
+#include <string>
 #include <vector>
 
 #include "operation/operation.h"
@@ -19,7 +20,9 @@ Json::Value taskReply(KTR::Task& task);
 // The background operation "taskid" of the user, null when he has no such one; and all of them, false when they cannot
 // be listed. Searches have records of the same kind, but are no operations.
 std::unique_ptr<KTR::Task> taskOf(const Operation& operation);
-bool tasksOf(const Operation& operation, std::vector<std::unique_ptr<KTR::Task>>& tasks);
+bool tasksOf(const std::string& user, std::vector<std::unique_ptr<KTR::Task>>& tasks);
+// All of them: {"tasks":[...]}.
+bool tasksReply(const std::string& user, Json::Value& data);
 
 }  // namespace orvel::cgi
 

@@ -23,7 +23,6 @@
 
 #include "download/range.h"
 #include "orvel/error_state.h"
-#include "orvel/file_info.h"
 #include "program/program.h"
 #include "reply.h"
 #include "request.h"
@@ -31,8 +30,8 @@
 #include "text.h"
 #include "tus/resumable.h"
 #include "tus/status.h"
+#include "tus/unfinished.h"
 #include "upload/body.h"
-#include "upload/spool.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
@@ -276,28 +275,9 @@ class TusRequest {
     }
 
     void list() {
-        Json::Value data;
-        data["items"] = Json::Value(Json::arrayValue);
-        int code = actAs(user_.sid.c_str(), user_.name, false);
+        const int code = actAs(user_.sid.c_str(), user_.name, false);
         if (code != ORV_ERR_NONE) return refuse(Status::kBroken, code, "");
-        for (const UploadRecord& record : unfinishedUploads(user_.name)) {
-            const UploadFacts& facts = record.facts();
-            PathInfo info;
-            Spool spool;
-            if (!PathInfoFactory::create(user_.name.c_str(), facts.path, info)) continue;
-            if (spool.openKept(info.volumePath, record.id(), false) != ORV_ERR_NONE) continue;
-            Json::Value item;
-            item["id"] = record.id();
-            putPath(item, "path", facts.path);
-            item["size"] = static_cast<Json::Int64>(facts.size);
-            item["offset"] = static_cast<Json::Int64>(record.counted(spool.size()));
-            if (facts.modified) item["mtime"] = static_cast<Json::Int64>(*facts.modified);
-            item["conflict"] = facts.conflict;
-            item["created"] = static_cast<Json::Int64>(facts.created);
-            item["expires"] = static_cast<Json::Int64>(record.expires());
-            data["items"].append(item);
-        }
-        reply(out_, Status::kOk, user_.cookie, ORV_ERR_NONE, "", data);
+        reply(out_, Status::kOk, user_.cookie, ORV_ERR_NONE, "", unfinishedReply(user_));
     }
 
     const User& user_;

@@ -2,6 +2,7 @@
 
 import { readAddress } from "./address.js";
 import { get, MISSING, session } from "./api.js";
+import { bring } from "./beside.js";
 import { chosenColumns, COLUMNS } from "./columns.js";
 import { toast, toastFailure } from "./dialogs.js";
 import { heldItems } from "./clipboard.js";
@@ -42,8 +43,11 @@ export const browser = {
 const remembered = new Map();
 let turn = 0;
 
-export async function loadShares() {
-  const reply = await get("list", { action: "shares", additional: "perm,volume_status,mount_point_type,sync_share" });
+// `beside`: what else is to come with them.
+export async function loadShares(beside) {
+  const asked = { action: "shares", additional: "perm,volume_status,mount_point_type,sync_share", with: beside };
+  const reply = await get("list", asked);
+  bring(reply.with);
   session.user = browser.user = reply.user ?? "";
   browser.shares = reply.items.map(entryOf);
   emit("shares");
@@ -117,6 +121,7 @@ export async function open(id) {
   }
   await show(id, mine, choice);
   if (mine !== turn) return;
+  emit("opened", id);
   if (browser.listing?.ready) announce(t("announce.opened", { count: browser.listing.total }));
   else if (browser.listing?.error?.code === MISSING) openFile(id, mine);
 }

@@ -5,6 +5,7 @@ import { setupAccount } from "./account.js";
 import { readAddress } from "./address.js";
 import { setupActivity } from "./activity.js";
 import { get } from "./api.js";
+import { broughtOr } from "./beside.js";
 import {
   browser,
   columns,
@@ -300,7 +301,7 @@ async function start() {
     if (context().folder) refresh();
   });
   try {
-    await loadShares();
+    await loadShares("preferences,tasks,uploads");
   } catch (failure) {
     setState(failedState(failure, undefined, { retry: () => location.reload() }));
     return;
@@ -314,7 +315,7 @@ async function start() {
 
 // Only whoever left an upload unfinished needs what shows it.
 async function showLeft() {
-  const { items } = await get("tus", {}).catch(() => ({ items: [] }));
+  const { items } = await broughtOr("uploads", () => get("tus", {}).catch(() => ({ items: [] })));
   if (items.length > 0) (await import("./unfinished.js")).showUnfinished();
 }
 

@@ -2,6 +2,7 @@
 // (private windows) or server it lasts as long as the page.
 
 import { get, PROGRAMS, sendOnce } from "./api.js";
+import { broughtOr } from "./beside.js";
 import { arrived, emit } from "./events.js";
 
 const PREFIX = "orvel.";
@@ -48,7 +49,8 @@ export async function setupPrefs(user) {
   addEventListener("pagehide", send);
   addEventListener("online", send);
   await arrived;
-  const { values } = await get("preferences", { action: "get" }).catch(() => ({}));
+  const ask = () => get("preferences", { action: "get" }).catch(() => ({}));
+  const { values } = await broughtOr("preferences", ask);
   if (!values) return;
   known = true;
   const changed = OWN.filter((name) => !unsent.has(name) && name in values && !same(values[name], pref(name, null)));

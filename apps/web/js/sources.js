@@ -3,6 +3,7 @@
 import { ApiError, get, MISSING, post } from "./api.js";
 import { breathe } from "./dom.js";
 import { entryOf } from "./entries.js";
+import { emit } from "./events.js";
 import { Listing, PAGE } from "./listing.js";
 import { encodeName, inBothForms, inForms, lastOf, parentOf, patternOf, splitExtension } from "./path.js";
 import { language } from "./strings.js";
@@ -44,8 +45,9 @@ export function folderListing(id, { sort, filter }, onChange) {
 function keptPages(listing, asked, unkept) {
   let keeping = null;
   const keep = async (page, signal) => {
-    const order = { keep: 1, natural: language, folders_first: 1 };
+    const order = { keep: 1, natural: language, folders_first: 1, with: "access" };
     const reply = await get("list", { ...asked, ...order, ...page }, signal);
+    if (reply.with?.access) emit("asked-access", { id: asked.path_raw, answer: reply.with.access });
     if (!reply.listing) {
       await unkept();
       return listing.fetchPart(listing.parts[0].part, page);

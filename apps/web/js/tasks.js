@@ -3,6 +3,7 @@
 
 import { get, MISSING, post } from "./api.js";
 import { Card } from "./activity.js";
+import { broughtOr } from "./beside.js";
 import { browser, go, refresh } from "./browser.js";
 import { addCommand } from "./commands.js";
 import { Choice } from "./choice.js";
@@ -44,7 +45,8 @@ export async function setupTasks() {
     toast({ text: what.title, actions: [{ label: t("activity.undo"), run: () => undo(what) }] });
   });
   await arrived;
-  const { tasks } = await get("operation", { action: "status" }).catch(() => ({ tasks: [] }));
+  const ask = () => get("operation", { action: "status" }).catch(() => ({ tasks: [] }));
+  const { tasks } = await broughtOr("tasks", ask);
   for (const task of tasks) {
     // What ended well while nobody looked needs no word any more, nor what somebody has seen already.
     if (task.finished && (isGood(task) || noteOf(task.taskid).seen)) clear(task.taskid);

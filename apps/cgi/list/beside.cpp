@@ -1,0 +1,40 @@
+#include "list/beside.h"
+
+#include <json/value.h>
+
+#include <sstream>
+
+#include "operation/task_reply.h"
+#include "orvel/error_state.h"
+#include "preferences/store.h"
+#include "text.h"
+#include "tus/unfinished.h"
+#include "why/reason.h"
+
+namespace orvel::cgi {
+namespace {
+
+bool fill(const std::string& word, const User& user, const std::string& path, Json::Value& data) {
+    if (word == "preferences") return readPreferences(user.name, data["values"]) == ORV_ERR_NONE;
+    if (word == "tasks") return tasksReply(user.name, data);
+    if (word == "access") return !path.empty() && explainAccess(path, user, data);
+    if (word != "uploads") return false;
+    data = unfinishedReply(user);
+    return true;
+}
+
+}  // namespace
+
+void appendBeside(const Request& request, const std::string& path, Output& out) {
+    std::istringstream words(request.web.GetParam("with", ""));
+    Json::Value with(Json::objectValue);
+    for (std::string word; std::getline(words, word, ',');) {
+        Json::Value data;
+        if (!with.isMember(word) && fill(word, request.user, path, data)) with[word] = data;
+    }
+    if (with.empty()) return;
+    out.text() += ",\"with\":";
+    appendJson(with, out.text());
+}
+
+}  // namespace orvel::cgi

@@ -1,0 +1,19 @@
+// What decides about a user's access to a path, as replies show it.
+#ifndef ORVEL_CGI_WHY_REASON_H
+#define ORVEL_CGI_WHY_REASON_H
+
+#include <json/value.h>
+
+#include <string>
+
+#include "request.h"
+
+namespace orvel::cgi {
+
+// {"share","rule","privilege","administrator","restrictions","remote","read_only","exists","permissions"}: see the
+// program "why". The process acts as the user. False, with the library's error set, when it cannot be determined.
+[[nodiscard]] bool explainAccess(const std::string& path, const User& user, Json::Value& data);
+
+}  // namespace orvel::cgi
+
+#endif
