@@ -82,7 +82,8 @@ export function askText({ title, label, value = "", type = "text", selectTo = nu
         h("footer", {}, h("button.button", { type: "button", onclick: () => close(null) }, t("dialog.cancel")), button),
       );
       input.addEventListener("input", () => complain(""));
-      requestAnimationFrame(() => input.setSelectionRange(0, selectTo ?? input.value.length));
+      // Before the first key, however soon it comes.
+      input.addEventListener("focus", () => input.setSelectionRange(0, selectTo ?? input.value.length), { once: true });
       return [form];
     },
   });

@@ -61,10 +61,10 @@ export const $ = (id) => document.getElementById(id);
 export function keepFocus(box, change) {
   const held = box.contains(document.activeElement) ? document.activeElement : null;
   change();
-  if (!held || held.isConnected) return;
+  if (!held || held === document.activeElement) return;
   const name = ["id", "data-command", "data-sort", "aria-label"].find((one) => held.hasAttribute(one));
   const like = name && box.querySelector(`[${name}="${CSS.escape(held.getAttribute(name))}"]`);
-  (like ?? box.closest("dialog")?.querySelector("button") ?? $("view")).focus({ preventScroll: true });
+  (held.isConnected ? held : (like ?? box.closest("dialog")?.querySelector("button") ?? $("view"))).focus({ preventScroll: true });
 }
 
 const BIDI = {

@@ -59,7 +59,7 @@ export async function setupPrefs(user) {
   send();
 }
 
-function same(one, other) {
+export function same(one, other) {
   return JSON.stringify(one) === JSON.stringify(other);
 }
 

@@ -79,6 +79,11 @@ export async function startTask(action, what, { params = {}, affected = [], targ
 // order: {choice, params, folders, target} of what this page started.
 function show(task, order = { folders: [] }) {
   const { taskid } = task;
+  const before = cards.get(taskid); // a look may find what was begun before the reply says so
+  if (before) {
+    before.order = order;
+    return update(task);
+  }
   const card = new Card({
     iconName: ICONS[task.action] ?? "activity",
     title: titleOf(task),
@@ -90,7 +95,7 @@ function show(task, order = { folders: [] }) {
   });
   cards.set(taskid, { card, order });
   update(task);
-  watch();
+  return watch();
 }
 
 function titleOf(task) {
@@ -114,6 +119,7 @@ function watch() {
 
 // Also what other tabs have started.
 async function look() {
+  const asked = [...cards.keys()]; // what begins meanwhile may be missing in the answer
   const { tasks } = await get("operation", { action: "status" }).catch(() => ({ tasks: null }));
   if (tasks) {
     for (const task of tasks) {
@@ -122,8 +128,9 @@ async function look() {
     }
     // A record that is gone has nothing more to tell.
     const known = new Set(tasks.map((task) => task.taskid));
-    for (const [taskid, { card }] of cards) {
-      if (!known.has(taskid) && !card.finished) card.finish("good", "");
+    for (const taskid of asked) {
+      const { card } = cards.get(taskid) ?? {};
+      if (card && !known.has(taskid) && !card.finished) card.finish("good", "");
     }
   }
   watch();

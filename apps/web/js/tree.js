@@ -2,7 +2,7 @@
 
 import { get } from "./api.js";
 import { browser, go } from "./browser.js";
-import { h, icon, nameNode, plainName } from "./dom.js";
+import { h, icon, keepFocus, nameNode, plainName } from "./dom.js";
 import { isOffline, isReadOnlyShare } from "./entries.js";
 import { arrived, on } from "./events.js";
 import { folderKindOf } from "./icons.js";
@@ -84,16 +84,15 @@ async function load(id, node) {
   }
   const level = Number(node.item.getAttribute("aria-level")) + 1;
   const kept = new Map([...node.group.children].map((child) => [child.firstChild.dataset.id, child]));
-  node.group.replaceChildren(
-    ...items.slice(0, MOST).map((folder) => {
-      const child = idIn(folder);
-      return (
-        kept.get(child) ??
-        makeItem(child, labelOf(child), folderKindOf(child, folder.mount_type ?? ""), level)
-      );
-    }),
-    ...(items.length > MOST ? [moreItem(id, items.length - MOST, level)] : []),
-  );
+  const lines = items.slice(0, MOST).map((folder) => {
+    const child = idIn(folder);
+    return kept.get(child) ?? makeItem(child, labelOf(child), folderKindOf(child, folder.mount_type ?? ""), level);
+  });
+  if (items.length > MOST) lines.push(moreItem(id, items.length - MOST, level));
+  // Lines that stay are not taken out: one may hold the keyboard.
+  const { children } = node.group;
+  if (lines.length !== children.length || lines.some((line, i) => line !== children[i]))
+    keepFocus(node.group, () => node.group.replaceChildren(...lines));
   if (items.length === 0) node.item.removeAttribute("aria-expanded");
   paintCurrent();
 }

@@ -3,6 +3,7 @@
 import { isCut } from "./clipboard.js";
 import { fitColumns } from "./columns.js";
 import { h, keepFocus, set } from "./dom.js";
+import { same } from "./prefs.js";
 import { makeRow, fillRow, makeHeader } from "./rows.js";
 
 // Browsers lose precision beyond some ten million pixels; longer lists scroll at a scale.
@@ -135,7 +136,9 @@ export class View {
       this.canvas.append(row);
     }
     const entry = this.listing.ready ? this.listing.item(index) : undefined;
-    if (!row.editing && (row.entry !== entry || !row.filled)) fillRow(row, index, entry, this.mode, this.columns);
+    // What shows the same stays: a click may be under way on it.
+    if (!row.editing && !(row.filled && same(row.entry, entry))) fillRow(row, index, entry, this.mode, this.columns);
+    else if (!row.editing) row.entry = entry;
     const y = Math.floor(index / box.across) * box.height - box.top + box.top / box.scale;
     const x = (index % box.across) * box.width;
     row.style.transform = `translate(${x}px, ${y}px)`;
