@@ -5,6 +5,7 @@ import { basename, join } from "node:path";
 import { after } from "node:test";
 import { setTimeout } from "node:timers/promises";
 import { chromium } from "playwright-core";
+import { LONGEST, until } from "./support.mjs";
 
 // The shell draws and computes the same with a third less work; it lacks what a user has around a page.
 const PROGRAM =
@@ -34,7 +35,7 @@ const ARGUMENTS = [
 export const browser = await launch();
 
 export function launch(...args) {
-  return chromium.launch({ executablePath: PROGRAM, args: [...ARGUMENTS, ...args] });
+  return chromium.launch({ executablePath: PROGRAM, args: [...ARGUMENTS, ...args], timeout: LONGEST });
 }
 
 after(() => browser.close());
@@ -42,19 +43,43 @@ after(() => browser.close());
 // Most of the demo's photos hold no picture (415), and on a busy machine it says so later (503).
 const isNoPicture = (url) => new URL(url, URL_OF_PAGE).pathname === "/cgi-bin/thumbnail";
 
-// A page of `user`. `complaints` is what must be empty at the end: errors on the console or of scripts, failed requests.
-// What users choose in it reaches no other page, unless `kept`.
-export async function openPage(user, { path = "/", kept = false, ...options } = {}) {
+// Counts what is being changed on the server: a test is over when this is.
+function countChanges() {
+  const { fetch } = globalThis, { open, send } = XMLHttpRequest.prototype;
+  globalThis.changing = 0;
+  const done = () => --globalThis.changing;
+  globalThis.fetch = (url, options, ...more) => {
+    const reply = fetch(url, options, ...more);
+    if ((options?.method ?? "GET") === "GET") return reply;
+    ++globalThis.changing;
+    reply.then(done, done);
+    return reply;
+  };
+  XMLHttpRequest.prototype.open = function (method, ...more) {
+    if (method !== "GET") this.addEventListener("loadend", done, { once: true });
+    this.changes = method !== "GET";
+    return open.call(this, method, ...more);
+  };
+  XMLHttpRequest.prototype.send = function (...body) {
+    globalThis.changing += this.changes;
+    return send.apply(this, body);
+  };
+}
+
+// A page of a browser of its own. `complaints` is what must be empty at the end: errors on the console or of scripts,
+// failed requests. What users choose in it reaches no other page, unless `kept`.
+export async function newPage({ kept = false, ...options } = {}) {
   const context = await browser.newContext({
     viewport: { width: 1280, height: 800 },
     locale: "en-GB",
     colorScheme: "light",
     reducedMotion: "reduce",
-    httpCredentials: user && { username: user, password: PASSWORDS[user] },
     ...options,
   });
+  context.setDefaultTimeout(LONGEST);
+  await context.addInitScript(countChanges);
+  if (!kept) await context.route("**/cgi-bin/preferences*", (route) => route.fulfill({ json: { success: true, data: { values: {} } } }));
   const page = await context.newPage();
-  if (!kept) await page.route("**/cgi-bin/preferences*", (route) => route.fulfill({ json: { success: true, data: { values: {} } } }));
   if (SCREENSHOTS && process.argv[1].endsWith(".test.mjs")) photograph(page);
   page.complaints = [];
   page.on("console", (message) => {
@@ -69,34 +94,48 @@ export async function openPage(user, { path = "/", kept = false, ...options } = 
   page.on("response", (response) => {
     if (response.status() >= 400 && !([415, 503].includes(response.status()) && isNoPicture(response.url()))) page.complaints.push(`status ${response.status()}: ${response.url()}`);
   });
+  return page;
+}
+
+// A page of `user`.
+export async function openPage(user, { path = "/", ...options } = {}) {
+  const page = await newPage({ httpCredentials: { username: user, password: PASSWORDS[user] }, ...options });
+  // What tests before this one left would be shown.
+  const headers = { Origin: new URL(URL_OF_PAGE).origin };
+  assert.ok((await page.context().request.post(`${URL_OF_PAGE}cgi-bin/operation`, { form: { action: "clear" }, headers })).ok());
   await page.goto(`${URL_OF_PAGE}#${path}`);
   await page.waitForSelector("body.started");
   return page;
 }
 
+// Does `run` in a page and closes it when the server is done with what was asked of it.
+export async function finish(page, run) {
+  try {
+    await run();
+    await page.waitForFunction(() => !globalThis.changing);
+  } catch (failure) {
+    await screenshot(page, `failed-${Date.now()}`);
+    const shown = await page.evaluate(() => `${location.hash}\n${document.body.innerText}`).catch((reason) => reason.message);
+    failure.stack += `\nComplaints: ${page.complaints.join("\n")}\nShown: ${shown.slice(0, 2000)}`;
+    throw failure;
+  } finally {
+    await page.unrouteAll({ behavior: "ignoreErrors" });
+    await page.context().close();
+  }
+}
+
 // What `run` does as `user`; `expected` are complaints that must come.
 export async function withPage(user, options, run, expected = []) {
   const page = await openPage(user, options);
-  try {
+  await finish(page, async () => {
     await rowsReady(page);
     await run(page);
-    for (const one of expected)
-      assert.ok(
-        page.complaints.some((text) => one.test(text)),
-        `${one} in ${page.complaints}`,
-      );
+    for (const one of expected) await until(`${one} among the complaints`, () => page.complaints.some((text) => one.test(text)));
     assert.deepEqual(
       page.complaints.filter((text) => !expected.some((one) => one.test(text))),
       [],
     );
-  } catch (failure) {
-    await screenshot(page, `failed-${user}-${Date.now()}`);
-    const shown = await page.evaluate(() => `${location.hash}\n${document.body.innerText}`).catch((reason) => reason.message);
-    failure.message += `\nComplaints: ${page.complaints.join("\n")}\nShown: ${shown.slice(0, 2000)}`;
-    throw failure;
-  } finally {
-    await page.context().close();
-  }
+  });
 }
 
 // A picture of each dialog, message and state that a test waits for.
@@ -145,10 +184,12 @@ export async function findings(page, part = "html") {
   }, part);
 }
 
-// Looks for a name in the list by its letters, which come as fast as the page takes for one word.
+// Looks for a name in the list by its letters, which come at one moment: those of a slow hand begin another word.
 export function typeName(page, name) {
   return page.evaluate((letters) => {
-    for (const key of letters) document.getElementById("view").dispatchEvent(new KeyboardEvent("keydown", { key, bubbles: true, cancelable: true }));
+    const now = { value: performance.now() };
+    for (const key of letters)
+      document.getElementById("view").dispatchEvent(Object.defineProperty(new KeyboardEvent("keydown", { key, bubbles: true, cancelable: true }), "timeStamp", now));
   }, [...name]);
 }
 
@@ -164,32 +205,31 @@ export function row(page, name) {
     .first();
 }
 
+// Clicks on the name, which is another node as soon as the row is another file's.
+export async function choose(page, name, options) {
+  await row(page, name).locator(".name").first().click(options);
+}
+
 // Where something is. A row that is drawn anew is nowhere in between.
-export async function boxOf(locator) {
-  for (const limit = Date.now() + 30_000; Date.now() < limit; ) {
-    const box = await locator.boundingBox();
-    if (box) return box;
-  }
-  throw new Error(`not to be seen within 30 s: ${locator}`);
+export function boxOf(locator) {
+  return until(`${locator} in sight`, () => locator.boundingBox());
 }
 
-// Waits for what neither the page nor its requests show.
-export async function untilSo(what, isSo) {
-  for (const end = Date.now() + 60_000; Date.now() < end; await setTimeout(20)) if (await isSo()) return;
-  throw new Error(`waited a minute in vain for ${what}`);
+// Waits for what goes by itself (a card, a toast), and clicks that button of it in the same look.
+export function press(page, what, text, button) {
+  return page.waitForFunction(
+    ([selector, wanted, label]) => {
+      const isIt = (one) => one.getAttribute("aria-label") === label || one.textContent.trim() === label;
+      const ones = [...document.querySelectorAll(selector)].filter((one) => one.textContent.includes(wanted));
+      const found = ones.flatMap((one) => [...one.querySelectorAll("button")]).find(isIt);
+      found?.click();
+      return found !== undefined;
+    },
+    [what, text, button],
+  );
 }
 
-// A user's uploads that are not over.
-export async function unfinished(request) {
-  const { data } = await (await request.get(`${URL_OF_PAGE}cgi-bin/tus`)).json();
-  return data.items;
-}
+export const cardOf = (page, text) => page.locator(".activity-card", { hasText: text }).first();
 
 // Waits for the card of what went well, and takes it away.
-export async function wentWell(page, text) {
-  await page.waitForFunction((wanted) => {
-    const card = [...document.querySelectorAll(".activity-card.good")].find((one) => one.textContent.includes(wanted));
-    card?.querySelector(":scope > .icon-button").click();
-    return card !== undefined;
-  }, text);
-}
+export const wentWell = (page, text) => press(page, ".activity-card.good", text, "Remove from the list");

@@ -1,8 +1,7 @@
 // Holds the programs behind the page before an operation of the platform (see platform/linux/fault_gate.h).
-import assert from "node:assert/strict";
 import { chmodSync, readFileSync, renameSync, rmSync, writeFileSync } from "node:fs";
 import { join } from "node:path";
-import { setTimeout } from "node:timers/promises";
+import { until } from "./support.mjs";
 
 // Shut from the start. Which operations can be held says tests/apps/served.sh.
 export class Gate {
@@ -13,12 +12,8 @@ export class Gate {
   }
 
   // Waits until a program is held.
-  async holds() {
-    for (let i = 0; i < 3000; ++i) {
-      if (readFileSync(this.file).length > 0) return;
-      await setTimeout(10);
-    }
-    assert.fail(`waited half a minute in vain for somebody at the gate of ${this.operation}`);
+  holds() {
+    return until(`somebody at the gate of ${this.operation}`, () => readFileSync(this.file).length > 0);
   }
 
   // Lets the one that is held pass, and holds the next.

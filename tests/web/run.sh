@@ -18,7 +18,8 @@ cmp -s "$here/package-lock.json" "$here/node_modules/.installed" ||
     { echo "FAILED: npm ci"; exit 1; }
 
 [ -z "${ORVEL_TEST_SCREENSHOTS:-}" ] || mkdir -p "$ORVEL_TEST_SCREENSHOTS"
-export ORVEL_TEST_DEMO=$demo ORVEL_TEST_GATES=$gates ORVEL_TEST_KEPT=$demo/var/lib/vexo/listings ORVEL_TEST_URL=http://127.0.0.1:$port/
+mkdir "$work/files"
+export ORVEL_TEST_WORK=$work/files ORVEL_TEST_DEMO=$demo ORVEL_TEST_GATES=$gates ORVEL_TEST_KEPT=$demo/var/lib/vexo/listings ORVEL_TEST_URL=http://127.0.0.1:$port/
 for user in alice bob admin; do export "ORVEL_TEST_${user^^}=$(password "$user")"; done
 ORVEL_TEST_PHOTO=$(root_of photo) ORVEL_TEST_PROJECTS=$(root_of projects)
 export ORVEL_TEST_PHOTO ORVEL_TEST_PROJECTS
