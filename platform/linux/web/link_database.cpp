@@ -97,16 +97,18 @@ bool LinkDatabase::upgrade() {
         return false;
     }
     LinkTransaction transaction(*this);
-    return transaction.begun() && execute(kTable) && execute(kBeside) && transaction.commit();
+    // One without its table is broken: it must not pass for one without links.
+    return transaction.begun() && execute("SELECT 1 FROM sharingLinks LIMIT 1") && execute(kBeside) &&
+           transaction.commit();
 }
 
-bool LinkDatabase::openFile(const std::string& path) {
+bool LinkDatabase::openFile(const std::string& path, bool adding) {
     if (database_ != nullptr) return true;
     if (!isTrustedFile(path)) return fail();
     database_ = openDatabase(path, SQLITE_OPEN_READWRITE);
     if (database_ == nullptr) return fail();
     sqlite3_busy_timeout(database_.get(), kPatience);
-    if (upgrade()) return true;
+    if ((!adding || execute(kTable)) && upgrade()) return true;
     database_.reset();
     return false;
 }
@@ -114,13 +116,13 @@ bool LinkDatabase::openFile(const std::string& path) {
 bool LinkDatabase::openForAdding() {
     const std::string path = VEXO::SystemPath(VEXO::kLinkDatabase);
     if (database_ == nullptr && !isThere(path) && !makeDatabase(path)) return fail();
-    return openFile(path);
+    return openFile(path, true);
 }
 
 bool LinkDatabase::open(bool& there) {
     const std::string path = VEXO::SystemPath(VEXO::kLinkDatabase);
     there = database_ != nullptr || isThere(path);
-    return !there || openFile(path);
+    return !there || openFile(path, false);
 }
 
 bool LinkDatabase::run(const char* sql, const std::vector<std::string>& values, const TakeRow& take) {

@@ -34,7 +34,7 @@ class LinkDatabase {
     [[nodiscard]] int changed() const { return sqlite3_changes(database_.get()); }
 
  private:
-    bool openFile(const std::string& path);
+    bool openFile(const std::string& path, bool adding);
     bool upgrade();
     bool execute(const char* sql);
 
