@@ -385,14 +385,14 @@ test("the keyboard alone is never lost", () => {
 
 test("what was chosen is there in another browser, too", async () => {
   const favourites = "section[aria-label=Favourites]";
-  await withPage("alice", { path: "/photo", kept: true }, async (page) => {
+  await withPage("bob", { path: "/photo", kept: true }, async (page) => {
     const sent = page.waitForResponse((response) => (response.request().postData() ?? "").includes("favourites"));
     await page.click("[data-sort=mtime]");
     await choose(page, "Landscapes", { button: "right" });
     await page.click(".menu >> text=Add to favourites");
     assert.equal((await sent).status(), 200);
   });
-  await withPage("alice", { kept: true }, async (page) => {
+  await withPage("bob", { kept: true }, async (page) => {
     await page.click(`${favourites} >> text=Landscapes`);
     await page.waitForSelector("#view >> text=Dusk.png");
     await page.waitForSelector("[aria-sort=ascending] [data-sort=name]");

@@ -43,13 +43,16 @@ after(() => browser.close());
 // Most of the demo's photos hold no picture (415), and on a busy machine it says so later (503).
 const isNoPicture = (url) => new URL(url, URL_OF_PAGE).pathname === "/cgi-bin/thumbnail";
 
-// Counts what is being changed on the server: a test is over when this is.
-function countChanges() {
+// Counts what is being changed on the server: a test is over when this is. What users choose in a page is not `kept`, and
+// reaches no other one: even a page that is being closed would send it.
+function standBetween(kept) {
   const { fetch } = globalThis, { open, send } = XMLHttpRequest.prototype;
   globalThis.changing = 0;
   const done = () => --globalThis.changing;
   globalThis.fetch = (url, options, ...more) => {
-    const reply = fetch(url, options, ...more);
+    const ofChoices = !kept && typeof url === "string" && url.startsWith("/cgi-bin/");
+    if (ofChoices && url.startsWith("/cgi-bin/preferences")) return Promise.resolve(Response.json({ success: true, data: { values: {} } }));
+    const reply = fetch(ofChoices ? url.replace("with=preferences%2C", "with=") : url, options, ...more);
     if ((options?.method ?? "GET") === "GET") return reply;
     ++globalThis.changing;
     reply.then(done, done);
@@ -67,7 +70,7 @@ function countChanges() {
 }
 
 // A page of a browser of its own. `complaints` is what must be empty at the end: errors on the console or of scripts,
-// failed requests. What users choose in it reaches no other page, unless `kept`.
+// failed requests.
 export async function newPage({ kept = false, ...options } = {}) {
   const context = await browser.newContext({
     viewport: { width: 1280, height: 800 },
@@ -77,8 +80,7 @@ export async function newPage({ kept = false, ...options } = {}) {
     ...options,
   });
   context.setDefaultTimeout(LONGEST);
-  await context.addInitScript(countChanges);
-  if (!kept) await context.route("**/cgi-bin/preferences*", (route) => route.fulfill({ json: { success: true, data: { values: {} } } }));
+  await context.addInitScript(standBetween, kept);
   const page = await context.newPage();
   if (SCREENSHOTS && process.argv[1].endsWith(".test.mjs")) photograph(page);
   page.complaints = [];
@@ -233,3 +235,9 @@ export const cardOf = (page, text) => page.locator(".activity-card", { hasText: 
 
 // Waits for the card of what went well, and takes it away.
 export const wentWell = (page, text) => press(page, ".activity-card.good", text, "Remove from the list");
+
+// A user's uploads that are not over.
+export async function unfinished(request) {
+  const { data } = await (await request.get(`${URL_OF_PAGE}cgi-bin/tus`)).json();
+  return data.items;
+}

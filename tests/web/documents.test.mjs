@@ -1,23 +1,20 @@
 // Documents, pictures, films and sound in place; what is hostile in them stays what it is.
 import assert from "node:assert/strict";
-import { chmodSync, copyFileSync, mkdirSync, readdirSync, rmSync, writeFileSync } from "node:fs";
+import { readdirSync, readFileSync } from "node:fs";
 import { join } from "node:path";
-import { after, before, test } from "node:test";
+import { before, test } from "node:test";
 import { boxOf, findings, row, screenshot, withPage } from "./browser.mjs";
+import { ownFolder, write as writeIn } from "./support.mjs";
 
-const folder = join(process.env.ORVEL_TEST_PROJECTS, "papers");
 const here = { path: "/projects/papers" };
+const write = (name, content) => writeIn(folder, { [name]: content });
+let folder, picture;
 
 before(() => {
-  mkdirSync(folder);
-  chmodSync(folder, 0o777);
+  const pictures = join(process.env.ORVEL_TEST_PHOTO, "Landscapes");
+  picture = readFileSync(join(pictures, readdirSync(pictures)[0]));
+  folder = ownFolder("papers", { "picture.png": picture });
 });
-after(() => rmSync(folder, { recursive: true, force: true }));
-
-function write(name, content) {
-  writeFileSync(join(folder, name), content);
-  chmodSync(join(folder, name), 0o666);
-}
 
 async function look(page, name) {
   await row(page, name).dblclick();
@@ -48,8 +45,6 @@ test("Markdown is shown as it is meant, and nothing in it runs or tells", async 
     "[three]( JaVaScRiPt&#58;globalThis.hacked=5) <javascript:globalThis.hacked=6> [up](../../../../etc/passwd)", "",
     "![far](http://elsewhere.example/pixel.png) ![near](picture.png)", "",
     "| a | b |", "|---|---|", "| 1 | <b onclick=hacked=7>2</b> |", ""].join("\n"));
-  copyFileSync(join(process.env.ORVEL_TEST_PHOTO, "Landscapes", readdirSync(join(process.env.ORVEL_TEST_PHOTO, "Landscapes"))[0]), join(folder, "picture.png"));
-  chmodSync(join(folder, "picture.png"), 0o666);
   await withPage("alice", here, async (page) => {
     const harmless = watch(page);
     await look(page, "attack.md");
@@ -62,7 +57,7 @@ test("Markdown is shown as it is meant, and nothing in it runs or tells", async 
       assert.match(await link.getAttribute("href"), /^(https:|#\/)/);
       assert.match(await link.getAttribute("rel"), /noopener/);
     }
-    assert.equal(await shown.locator("img").count(), 1); // the one beside it
+    await shown.locator("img").waitFor(); // the one beside it, and no other
     await harmless();
     assert.deepEqual(await findings(page, ".preview"), []);
     await screenshot(page, "documents markdown");
@@ -87,11 +82,10 @@ test("texts in any encoding, code in colours, long ones in pieces", async () => 
     await leave(page);
     await look(page, "long.log");
     await page.locator(".preview [role=status]", { hasText: "Part 1 of 3" }).waitFor();
-    assert.match(await page.locator(".preview pre").textContent(), /^ä+\|ü$/);
+    await page.locator(".preview pre", { hasText: /^ä+\|ü$/ }).waitFor();
     await page.click(".preview >> text=Next part");
     await page.locator(".preview [role=status]", { hasText: "Part 2 of 3" }).waitFor();
-    assert.match(await page.locator(".preview pre").textContent(), /^ü+\n?[\s\S]*$/);
-    assert.ok(!(await page.locator(".preview pre").textContent()).includes("\uFFFD"));
+    await page.locator(".preview pre", { hasText: /^ü+$/ }).waitFor();
     await leave(page);
   });
 });
@@ -132,9 +126,9 @@ test("PDF in place: its text can be read, its scripts cannot run", async () => {
       return data.filter((value, i) => i % 4 === 0 && value < 100).length;
     });
     assert.ok(dark > 100, `${dark} dark points`);
-    const before = await boxOf(page.locator(".pdf-page").first());
+    const { width } = await boxOf(page.locator(".pdf-page").first());
     await page.locator(".pdf-pages").press("+");
-    await page.waitForFunction((width) => document.querySelector(".pdf-page").offsetWidth > width, before.width);
+    await page.waitForFunction((less) => document.querySelector(".pdf-page").offsetWidth > less, width);
     await harmless();
     await screenshot(page, "documents pdf");
     assert.deepEqual(await findings(page, ".preview"), []);
@@ -146,21 +140,20 @@ test("PDF in place: its text can be read, its scripts cannot run", async () => {
 });
 
 test("pictures closer and turned, by keys, wheel and touch", async () => {
-  for (const name of ["picture 1.png", "picture 2.png"]) copyFileSync(join(folder, "picture.png"), join(folder, name));
+  for (const name of ["picture 1.png", "picture 2.png"]) write(name, picture);
   await withPage("alice", { ...here, hasTouch: true }, async (page) => {
     await look(page, "picture 1.png");
     const image = page.locator(".preview .stage > img");
     await page.locator(".preview-tools").waitFor();
-    assert.match(await page.locator(".preview-title").textContent(), /\d+ of \d+/);
-    const transform = () => image.evaluate((node) => node.style.transform);
+    await page.locator(".preview-title", { hasText: /\d+ of \d+/ }).waitFor();
+    const lies = (part) => page.waitForSelector(`.stage > img[style*="${part}"]`);
     await page.keyboard.press("+");
-    assert.match(await transform(), /scale\(1\.5\)/);
-    await page.keyboard.press("0");
-    await page.keyboard.press("r");
-    assert.match(await transform(), /rotate\(90deg\)/);
+    await lies("scale(1.5)");
+    for (const key of ["0", "r"]) await page.keyboard.press(key);
+    await lies("rotate(90deg)");
     await image.hover();
     await page.mouse.wheel(0, -300);
-    await page.waitForFunction(() => document.querySelector(".stage > img").classList.contains("zoomed"));
+    await page.waitForSelector(".stage > img.zoomed");
     await screenshot(page, "documents picture");
     await page.keyboard.press("0");
     // A swipe leads on.
@@ -190,10 +183,10 @@ test("films with the subtitles beside them and the place kept; sound goes on wit
   write("film.de.srt", Buffer.from("\uFEFF1\r\n00:00:20,500 --> 00:00:24,000\r\nSchöne Grüße\r\n\r\n2\r\n00:00:30,000 --> 00:00:31,000\r\n<b>Ende</b>\r\n"));
   write("film.vtt", "WEBVTT\n\nNOTE nothing\n\n00:21.000 --> 00:22.000 line:0\nHello\n");
   write("tune 1.wav", wave(2));
-  write("tune 2.wav", wave(2));
+  write("tune 2.wav", wave(600)); // it still plays when somebody looks
   await withPage("alice", here, async (page) => {
     await look(page, "film.mkv");
-    await page.waitForFunction(() => document.querySelector(".preview video")?.textTracks.length === 2);
+    await page.waitForFunction(() => document.querySelector(".preview video")?.textTracks[1]?.mode === "disabled");
     const said = await page.evaluate(() =>
       [...document.querySelector(".preview video").textTracks].map((track) => [track.language, track.mode, [...(track.cues ?? [])].map(({ startTime, text }) => [startTime, text])]),
     );

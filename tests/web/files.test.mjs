@@ -4,7 +4,8 @@ import { copyFileSync, existsSync, mkdirSync, mkdtempSync, readdirSync, readFile
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
-import { drawn, go, row, unfinished, untilSo, upload, wentWell, withPage } from "./browser.mjs";
+import { drawn, go, row, unfinished, upload, wentWell, withPage } from "./browser.mjs";
+import { until } from "./support.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const files = mkdtempSync(join(tmpdir(), "orvel-upload-"));
@@ -108,7 +109,7 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () =>
     await page.locator(".activity-card").first().locator("button").click();
     await card(page, "Cancelled").waitFor();
     const { request } = page.context();
-    await untilSo("the upload's end on the server", async () => !(await unfinished(request)).some(({ path }) => path.endsWith("large.bin")));
+    await until("the upload's end on the server", async () => !(await unfinished(request)).some(({ path }) => path.endsWith("large.bin")));
     assert.ok(!existsSync(join(there, "large.bin")));
   }));
 

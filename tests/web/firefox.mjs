@@ -5,9 +5,9 @@ import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { createInterface } from "node:readline";
 import { setTimeout } from "node:timers/promises";
+import { LONGEST, until } from "./support.mjs";
 
 const PROGRAM = process.env.ORVEL_TEST_FIREFOX ?? "/usr/bin/firefox-esr";
-const LONGEST = 30_000;
 const KEYS = { Enter: "\uE007", Escape: "\uE00C", Delete: "\uE017", F2: "\uE032" };
 
 // The first of what `selector` finds that is in sight and holds `text`.
@@ -111,13 +111,25 @@ export class Firefox {
   }
 
   // Waits until it is there and in sight.
-  async find(selector, text = "") {
-    for (const end = Date.now() + LONGEST; Date.now() < end; await setTimeout(50)) {
+  find(selector, text = "") {
+    return this.look(`${selector} “${text}”`, async () => {
       const { sharedId } = await this.call(FIND, selector, text);
-      if (sharedId) return { sharedId };
+      return sharedId && { sharedId };
+    });
+  }
+
+  gone(selector, text = "") {
+    return this.look(`the end of ${selector} “${text}”`, async () => (await this.call(FIND, selector, text)).type === "null");
+  }
+
+  async look(what, run) {
+    try {
+      return await until(what, run);
+    } catch (failure) {
+      await this.screenshot("failed-firefox");
+      failure.stack += `\nShown: ${(await this.call("() => location.hash + '\\n' + document.body.innerText")).value.slice(0, 2000)}`;
+      throw failure;
     }
-    await this.screenshot("failed-firefox");
-    throw new Error(`waited in vain for ${selector} “${text}”; the page says: ${(await this.call("() => document.body.innerText")).value.slice(0, 1000)}`);
   }
 
   async screenshot(name) {
@@ -127,24 +139,19 @@ export class Firefox {
     writeFileSync(join(folder, `${name}.png`), Buffer.from(data, "base64"));
   }
 
-  async gone(selector, text = "") {
-    for (const end = Date.now() + LONGEST; Date.now() < end; await setTimeout(50))
-      if ((await this.call(FIND, selector, text)).type === "null") return;
-    throw new Error(`${selector} “${text}” stayed`);
-  }
-
   // What is drawn anew between finding and clicking is found again.
   async click(selector, text, count = 1) {
     const clicks = Array.from({ length: count }, () => [{ type: "pointerDown", button: 0 }, { type: "pointerUp", button: 0 }]);
-    for (const end = Date.now() + LONGEST; ; ) {
+    return until(`a click on ${selector} “${text}”`, async () => {
       const origin = { type: "element", element: await this.find(selector, text) };
       const actions = [{ type: "pointerMove", x: 0, y: 0, origin }, ...clicks.flat()];
       try {
         return await this.send("input.performActions", { context: this.context, actions: [{ type: "pointer", id: "mouse", actions }] });
       } catch (failure) {
-        if (!/^(move target out of bounds|no such element|stale element reference)/.test(failure.message) || Date.now() > end) throw failure;
+        if (!/^(move target out of bounds|no such element|stale element reference)/.test(failure.message)) throw failure;
+        return null;
       }
-    }
+    });
   }
 
   // A key by name, or characters.

@@ -1,25 +1,20 @@
 // The ways that people go most, in Firefox.
 import assert from "node:assert/strict";
-import { existsSync, mkdtempSync, readFileSync, rmSync, writeFileSync } from "node:fs";
-import { tmpdir } from "node:os";
+import { existsSync, readFileSync } from "node:fs";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
 import { Firefox } from "./firefox.mjs";
 import { goAllWays } from "./log_ins.mjs";
+import { localFiles, ownFolder } from "./support.mjs";
 
 const SITE = process.env.ORVEL_TEST_URL.replace("127.0.0.1", "localhost"); // where the page asks for the password
-const there = join(process.env.ORVEL_TEST_PROJECTS, "house");
-const files = mkdtempSync(join(tmpdir(), "orvel-firefox-"));
+const files = localFiles("firefox", Object.fromEntries(["letter.txt", "list.txt", "later.txt"].map((name) => [name, `This is ${name}.`])));
 let firefox;
 
 before(async () => {
-  for (const name of ["letter.txt", "list.txt", "later.txt"]) writeFileSync(join(files, name), `This is ${name}.`);
   firefox = await Firefox.start();
 });
-after(async () => {
-  await firefox?.close();
-  rmSync(files, { recursive: true });
-});
+after(() => firefox?.close());
 
 async function logIn() {
   await firefox.fill(".login [name=user]", "alice");
@@ -35,10 +30,11 @@ async function leave() {
 
 test("in, upload, preview, rename, delete, link, out", async () => {
   const row = ["#view .row:not(.header) .name"];
-  await firefox.open(`${SITE}#/projects`);
+  const there = join(ownFolder("in firefox", { "inside/": "", "inside/plan.pdf": "a plan" }), "inside");
+  await firefox.open(`${SITE}#/projects/in%20firefox`);
   await logIn();
-  await firefox.click(...row, "house", 2);
-  await firefox.find("#view[aria-busy=false]");
+  await firefox.click(...row, "inside", 2);
+  await firefox.find(...row, "plan.pdf");
   firefox.complaints.length = 0; // that nobody was logged in
 
   await firefox.click("#toolbar button", "Upload");
@@ -90,7 +86,8 @@ test("locked, expired, a one-time code, too many failures", () =>
   }));
 
 test("a session that ends during an upload: asked for in place, and it arrives", async () => {
-  await firefox.open(`${SITE}#/projects/house`);
+  const there = ownFolder("later in firefox", { "plan.pdf": "a plan" });
+  await firefox.open(`${SITE}#/projects/later%20in%20firefox`);
   await logIn();
   await firefox.find("#view .row .name", "plan.pdf");
   const logOut = "() => fetch('cgi-bin/logout', { method: 'POST', body: new URLSearchParams() }).then((reply) => reply.status)";
@@ -100,7 +97,8 @@ test("a session that ends during an upload: asked for in place, and it arrives",
   await sent;
   await firefox.fill(".login-again [name=password]", process.env.ORVEL_TEST_ALICE);
   await firefox.type("Enter");
-  await firefox.find("#view .row .name", "later");
+  await firefox.find("#view .row .name", "later.txt");
+  assert.equal(readFileSync(join(there, "later.txt"), "utf8"), "This is later.txt.");
   await firefox.gone(".login-again");
   await leave();
 });

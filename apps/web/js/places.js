@@ -49,11 +49,12 @@ export function dropFavourite(id) {
 }
 
 export function setupPlaces() {
-  on("shown", () => {
+  const keep = () => {
     const { id, listing } = browser;
     const [last] = pref("recent", []);
     if (!isFolderPlace(id) || !listing?.ready || listing.error || last === id) return;
     const others = pref("recent", []).filter((one) => one !== id);
     setPref("recent", [id, ...others].slice(0, MOST_RECENT), RECENT_REST);
-  });
+  };
+  for (const name of ["shown", "listing"]) on(name, keep); // a slow one comes later
 }

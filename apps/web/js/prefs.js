@@ -13,6 +13,7 @@ const held = new Map();
 const unsent = new Map();
 let known = false; // what the server has
 let timer = null;
+let due = Infinity; // when the server is to have what is unsent
 
 export function pref(name, fallback) {
   if (held.has(name)) return held.get(name) ?? fallback;
@@ -38,6 +39,9 @@ export function setPref(name, value, rest = REST) {
   hold(name, value);
   if (!OWN.includes(name)) return;
   unsent.set(name, value);
+  const wanted = performance.now() + rest;
+  if (wanted > due) return;
+  due = wanted;
   clearTimeout(timer);
   timer = setTimeout(send, rest);
 }
@@ -66,6 +70,7 @@ export function same(one, other) {
 // What could not be sent goes with the next change.
 async function send() {
   clearTimeout(timer);
+  due = Infinity;
   if (!known || unsent.size === 0) return;
   const values = Object.fromEntries(unsent);
   unsent.clear();
