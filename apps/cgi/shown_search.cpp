@@ -10,7 +10,6 @@
 #include <vector>
 
 #include "confined.h"
-#include "orvel/user_directory.h"
 #include "vexo/index.h"
 #include "vexo/stat.h"
 
@@ -73,11 +72,20 @@ void ShownSearch::added(const ChangedFile& file) {
     const std::string path = rowPath(file);
     if (path.empty() || !statusOf(file.folder, file.name, status)) return;
     const std::string share = definedShareName(file.info.shareName);
-    OrvelUserEnum names;
     // The first leaves a row that is there as it is, the second refreshes it.
-    task_.results->insertFile(share, path, names.GetUserNameByUID(status.st_uid),
-                              names.GetGroupNameByGID(status.st_gid), status);
+    task_.results->insertFile(share, path, names_.GetUserNameByUID(status.st_uid),
+                              names_.GetGroupNameByGID(status.st_gid), status);
     task_.results->updateFile(share, path, share, path, status);
+}
+
+void ShownSearch::refreshed(const ChangedFile& file) {
+    _tag_VEXOSTAT_ status;
+    if (task_.results == nullptr) return;
+    const std::string path = rowPath(file);
+    if (path.empty() || !statusOf(file.folder, file.name, status)) return;
+    task_.results->updatePermRecs(definedShareName(file.info.shareName), path,
+                                  names_.GetUserNameByUID(status.st_uid).c_str(),
+                                  names_.GetGroupNameByGID(status.st_gid).c_str(), status);
 }
 
 void ShownSearch::removed(const ChangedFile& file) {

@@ -6,6 +6,7 @@
 
 #include "base/descriptor.h"
 #include "orvel/file_info.h"
+#include "orvel/user_directory.h"
 #include "search_task.h"
 
 namespace orvel::cgi {
@@ -30,6 +31,8 @@ class ShownSearch {
 
     // A file or folder came into being, or a file got a new content.
     void added(const ChangedFile& file);
+    // Its owner, group or permissions changed.
+    void refreshed(const ChangedFile& file);
     // It is gone, with everything below it.
     void removed(const ChangedFile& file);
     // Some of what is below it may be gone.
@@ -41,6 +44,7 @@ class ShownSearch {
 
  private:
     SearchTask task_;
+    OrvelUserEnum names_;
 };
 
 }  // namespace orvel::cgi

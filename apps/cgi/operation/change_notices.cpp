@@ -30,4 +30,8 @@ void ChangeNotices::moved(const Item& from, const ChangedFile& to, long long byt
     }
 }
 
+void ChangeNotices::permitted(const Item& item) {
+    OrvLibDoLog(user_, item.info.path, 0, ORVEL_ACTION_PROPERTY_SET, S_ISDIR(item.status.st_mode));
+}
+
 }  // namespace orvel::cgi

@@ -20,6 +20,9 @@ class ChangeNotices {
     void deleted(const std::string& path, const ChangedFile& file, bool isFolder, bool whole);
     void copied(const Item& from, const ChangedFile& to, long long bytes);
     void moved(const Item& from, const ChangedFile& to, long long bytes, bool whole);
+    // The permissions of what a request names, and below it; refreshed: of each that was changed.
+    void permitted(const Item& item);
+    void refreshed(const ChangedFile& file) { search_.refreshed(file); }
 
  private:
     const std::string& user_;

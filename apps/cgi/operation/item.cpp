@@ -56,16 +56,28 @@ Owner ownerFor(const std::string& user) {
     return owner;
 }
 
-void measure(const Item& item, Progress& progress) {
+static Sum sumOf(const Item& item) {
     Sum sum;
+    sum.items = 1;
+    sum.bytes = S_ISREG(item.status.st_mode) ? item.status.st_size : 0;
     if (S_ISDIR(item.status.st_mode)) {
         const Descriptor top(
             openat(item.place.folder.get(), item.place.name.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
         OrvDirectoryWalker walker(ENUM_IGNORE_ALL_ERR, stopFlag());
         if (top) walker.Walk_TopDown(item.info.path, "", top.path(), sum, nullptr, false);
-        if (chdir("/") != 0) return;  // a walk stays in its last folder, which would keep a volume busy
+        // A walk stays in its last folder, which would keep a volume busy.
+        [[maybe_unused]] const int ignored = chdir("/");
     }
-    progress.expect(sum.items + 1, sum.bytes + (S_ISREG(item.status.st_mode) ? item.status.st_size : 0));
+    return sum;
+}
+
+void measure(const Item& item, Progress& progress) {
+    const Sum sum = sumOf(item);
+    progress.expect(sum.items, sum.bytes);
+}
+
+void countItems(const Item& item, Progress& progress) {
+    progress.expect(sumOf(item).items, 0);
 }
 
 }  // namespace orvel::cgi

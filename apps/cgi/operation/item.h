@@ -54,6 +54,8 @@ Owner ownerFor(const std::string& user);
 
 // Expects the item, and all that lies below it.
 void measure(const Item& item, Progress& progress);
+// The same for work that does not depend on sizes.
+void countItems(const Item& item, Progress& progress);
 
 }  // namespace orvel::cgi
 

@@ -41,6 +41,9 @@ constexpr Action kActions[] = {{"mkdir", Takes::kPath, true, Need::kCreate, make
                                {"compress", Takes::kPaths, true, Need::kRead, compressOperation},
                                {"extract", Takes::kPaths, true, Need::kRead, extractOperation},
                                {"measure", Takes::kPaths, true, Need::kList, measureOperation},
+                               {"permit", Takes::kPaths, true, Need::kModify, permitOperation},
+                               {"permissions", Takes::kPaths, false, Need::kList, permissionsOperation},
+                               {"access", Takes::kPath, false, Need::kList, accessOperation},
                                {"undo", Takes::kTask, true, Need::kModify, undoOperation},
                                {"status", Takes::kTask, false, Need::kList, statusOperation},
                                {"cancel", Takes::kTask, true, Need::kList, cancelOperation},
@@ -107,8 +110,12 @@ void serveOperationProgram(Request& request, Output& out) {
                            .info = {},
                            .chosen = Choice(std::move(paths)),
                            .culprit = first,
-                           .data = {}};
+                           .data = {},
+                           .key = nullptr};
     const int code = perform(operation, *action, home);
+    if (operation.key != nullptr) {
+        return replyOwnFailure(out, Status::kOk, user.cookie, code, operation.key, operation.culprit, operation.data);
+    }
     reply(out, statusOf(code), user.cookie, code, operation.culprit, operation.data);
 }
 

@@ -22,6 +22,7 @@ struct Operation {
     Choice chosen;        // for the others
     std::string culprit;  // path to name when the action is refused
     Json::Value data;
+    const char* key = nullptr;  // of a failure that is this program's own
 };
 
 // "parents" = "true": missing folders above are made, too. data: {"path"}.
@@ -52,6 +53,16 @@ int emptyOperation(Operation& operation);
 int compressOperation(Operation& operation);
 // Unpacks the archives at the paths into the folder "target" or "target_raw"; "conflict" as above.
 int extractOperation(Operation& operation);
+
+// Changes permissions: see readChange for what is to be changed; "below" = "true": of all that lies below, too, links
+// left alone. Without "confirm" = "true" it is refused (2201, data: {"warnings"}) where the user gives up what he
+// cannot take back: see Loss.
+int permitOperation(Operation& operation);
+// Not in the background: data: what the chosen items have in common, see permissions_shown.cpp; and what a user or
+// group
+// ("user", "group") may do with the item at the path, see access_of.cpp.
+int permissionsOperation(Operation& operation);
+int accessOperation(Operation& operation);
 
 // Undoes what the operation "taskid" did, item by item: a copy, move, rename, deletion into the bin, restoring. What is
 // not as the operation left it stays, and so does what would not find its old place. "search": as "taskid" above.

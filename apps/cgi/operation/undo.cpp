@@ -9,6 +9,7 @@
 #include "operation/change_notices.h"
 #include "operation/moved_links.h"
 #include "operation/operation.h"
+#include "operation/permission_item.h"
 #include "operation/recycle_item.h"
 #include "operation/task_reply.h"
 #include "operation/task_start.h"
@@ -43,10 +44,11 @@ class Undo {
     // Whether the item is as it was before the operation: undone, or found so.
     bool run(const UndoItem& item) {
         progress_.begin(item.path);
-        const bool done = item.deed == Deed::kMoved    ? moveBack(item)
-                          : item.deed == Deed::kCopied ? removeCopy(item)
-                          : item.deed == Deed::kMade   ? removeMade(item)
-                                                       : makeAgain(item);
+        const bool done = item.deed == Deed::kMoved       ? moveBack(item)
+                          : item.deed == Deed::kCopied    ? removeCopy(item)
+                          : item.deed == Deed::kMade      ? removeMade(item)
+                          : item.deed == Deed::kPermitted ? permitAgain(item)
+                                                          : makeAgain(item);
         if (!done) failed_ = item.path;
         return done;
     }
@@ -58,6 +60,7 @@ class Undo {
     bool removeCopy(const UndoItem& item);
     bool removeMade(const UndoItem& item);
     bool makeAgain(const UndoItem& item);
+    bool permitAgain(const UndoItem& item);
 
     // One that was interrupted has moved some items already.
     [[nodiscard]] bool isBack(const UndoItem& item) const {
@@ -195,6 +198,28 @@ bool Undo::makeAgain(const UndoItem& item) {
     if (code != ORV_ERR_NONE) return failed(item.path, code);
     [[maybe_unused]] const int ignored = fchmodat(AT_FDCWD, made.path().c_str(), item.status.st_mode & 0777, 0);
     return done();
+}
+
+// What else became of the item since, its content say, is no matter.
+bool Undo::permitAgain(const UndoItem& item) {
+    const size_t end = item.other.find('\n');
+    const auto before = parsePermissions(item.other.substr(0, end));
+    const auto after = end == std::string::npos ? std::nullopt : parsePermissions(item.other.substr(end + 1));
+    Item found;
+    Descriptor opened;
+    Permissions now;
+    const int code = openItem(user_, item.path, {Need::kModify}, found);
+    if (code != ORV_ERR_NONE) return failed(item.path, code);
+    const bool readable = !S_ISLNK(found.status.st_mode) && openForPermissions(found, opened);
+    struct stat status {};
+    const bool same = readable && fstat(opened.get(), &status) == 0 && isItem(item, found.place.folder.get(), status);
+    if (!before || !after || !same || !readPermissions(opened, now)) return refused(item.path, kChanged);
+    if (isSame(now, *before)) return done();
+    if (!isSame(now, *after)) return refused(item.path, kChanged);
+    const bool written = writePermissions(opened, now, *before);
+    const int error = errno;
+    notices_.refreshed(found.changed());
+    return written ? done() : failed(item.path, OrvParseErrnoToError(error, nullptr, nullptr));
 }
 
 void undoAll(Operation& operation, UndoFile& file, Progress& progress) {

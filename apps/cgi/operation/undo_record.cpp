@@ -49,7 +49,7 @@ std::string lineOf(const UndoItem& item) {
 }
 
 bool parseFacts(std::string_view text, UndoItem& item) {
-    if (text.empty() || std::string_view("mcdr").find(text[0]) == std::string_view::npos) return false;
+    if (text.empty() || std::string_view("mcdrp").find(text[0]) == std::string_view::npos) return false;
     item.deed = static_cast<Deed>(text[0]);
     text.remove_prefix(1);
     std::array<long long, kFacts> facts{};
@@ -157,6 +157,13 @@ void UndoRecord::made(int folder, const std::string& name, const std::string& pa
 
 void UndoRecord::removed(const std::string& path, const struct stat& before) {
     add({Deed::kRemoved, path, "", before}, -1);
+}
+
+void UndoRecord::permitted(int folder, const std::string& name, const std::string& path, const std::string& change) {
+    struct stat now {};
+    if (off_) return;
+    if (fstatat(folder, name.c_str(), &now, AT_SYMLINK_NOFOLLOW) != 0) return leaveOut();
+    if (add({Deed::kPermitted, path, change, now}, folder)) ++count_;
 }
 
 int UndoFile::open(const std::string& user, const std::string& id) {

@@ -20,10 +20,11 @@
 namespace orvel::cgi {
 
 enum class Deed : char {
-    kMoved = 'm',   // lies at `path`, and was at `other`
-    kCopied = 'c',  // a file or link at `path`, from the one at `other`
-    kMade = 'd',    // the folder at `path`
-    kRemoved = 'r'  // the folder at `path`, which was empty by then
+    kMoved = 'm',      // lies at `path`, and was at `other`
+    kCopied = 'c',     // a file or link at `path`, from the one at `other`
+    kMade = 'd',       // the folder at `path`
+    kPermitted = 'p',  // at `path` has other permissions: `other` has those before and after, a line each
+    kRemoved = 'r'     // the folder at `path`, which was empty by then
 };
 
 struct UndoItem {
@@ -56,6 +57,7 @@ class UndoRecord {
                 const struct stat& source);
     void made(int folder, const std::string& name, const std::string& path);
     void removed(const std::string& path, const struct stat& before);
+    void permitted(int folder, const std::string& name, const std::string& path, const std::string& change);
     // Something was done that cannot be undone: another file was replaced, or it went wrong halfway.
     void leaveOut() { leftOut_ += off_ ? 0 : 1; }
     // The operation is over: whoever sees that may undo it.

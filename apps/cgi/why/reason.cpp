@@ -2,30 +2,11 @@
 
 #include "orvel/error_state.h"
 #include "orvel/privilege.h"
-#include "orvel/privilege_reason.h"
 #include "reply.h"
 #include "vexo/acl.h"
 
 namespace orvel::cgi {
 namespace {
-
-const char* ruleWord(PrivilegeRule rule) {
-    switch (rule) {
-        case PrivilegeRule::kHome:
-            return "home";
-        case PrivilegeRule::kNoAccess:
-            return "no_access";
-        case PrivilegeRule::kReadWrite:
-            return "read_write";
-        case PrivilegeRule::kReadOnly:
-            return "read_only";
-        case PrivilegeRule::kService:
-            return "service";
-        case PrivilegeRule::kNoList:
-            break;
-    }
-    return "no_list";
-}
 
 struct BitWord {
     unsigned bit;
@@ -51,6 +32,24 @@ Json::Value wordsOf(unsigned bits, const BitWord (&table)[count]) {
 }
 
 }  // namespace
+
+const char* ruleWord(PrivilegeRule rule) {
+    switch (rule) {
+        case PrivilegeRule::kHome:
+            return "home";
+        case PrivilegeRule::kNoAccess:
+            return "no_access";
+        case PrivilegeRule::kReadWrite:
+            return "read_write";
+        case PrivilegeRule::kReadOnly:
+            return "read_only";
+        case PrivilegeRule::kService:
+            return "service";
+        case PrivilegeRule::kNoList:
+            break;
+    }
+    return "no_list";
+}
 
 bool explainAccess(const std::string& path, const User& user, Json::Value& data) {
     PrivilegeReason reason;

@@ -1,0 +1,323 @@
+// Permissions: what is there, who may what, and changes that stay where they were asked for.
+#include <acl/libacl.h>
+#include <sys/acl.h>
+
+#include "apps/task_fixture.h"
+#include "support/gate.h"
+
+namespace {
+
+class PermissionCgi : public TaskCgi {
+ protected:
+    void SetUp() override {
+        TaskCgi::SetUp();
+        SKIP_WITHOUT_ROOT();
+        lay();
+    }
+    void lay() {
+        fs::remove_all(photo_ + "/t");
+        writeFiles(photo_, {"/t/f", "/t/in/g", "/t/run"});
+        writeFiles(outside(), {"/victim"});
+        for (const auto& [path, mode] :
+             {std::pair("/t", 0750), {"/t/in", 0750}, {"/t/run", 0750}, {"/t/f", 0640}, {"/t/in/g", 0640}}) {
+            EXPECT_EQ(chmod((photo_ + path).c_str(), static_cast<mode_t>(mode)), 0);
+        }
+        fs::create_symlink(outside() + "/victim", photo_ + "/t/link");
+        fs::create_directory_symlink(outside(), photo_ + "/t/way");
+    }
+    static std::string outside() { return systemRoot() + "/outside"; }
+    static std::string listOf(const std::string& path, acl_type_t type = ACL_TYPE_ACCESS) {
+        const acl_t list = acl_get_file(path.c_str(), type);
+        char* text = acl_to_any_text(list, nullptr, ',', TEXT_ABBREVIATE | TEXT_NUMERIC_IDS);
+        std::string shown = text == nullptr ? "?" : text;
+        acl_free(text);
+        acl_free(list);
+        return shown;
+    }
+    static void setList(const std::string& path, const char* text, acl_type_t type = ACL_TYPE_ACCESS) {
+        const acl_t list = acl_from_text(text);
+        EXPECT_EQ(acl_set_file(path.c_str(), type, list), 0) << path;
+        acl_free(list);
+    }
+    // Everything in the share and outside, with owners and lists.
+    [[nodiscard]] std::string all() const {
+        const auto shown = [](const fs::directory_entry& entry) {
+            const struct stat status = statusOf(entry.path());
+            const std::string owner = " " + std::to_string(status.st_uid) + ":" + std::to_string(status.st_gid) + " ";
+            if (entry.is_symlink()) return owner;
+            return owner + listOf(entry.path()) +
+                   (entry.is_directory() ? "/" + listOf(entry.path(), ACL_TYPE_DEFAULT) : "");
+        };
+        return treeOf(photo_, shown) + " | " + treeOf(outside(), shown);
+    }
+    static std::string permit(const std::string& how) { return "action=permit&path=/photo/t" + how; }
+    static std::string encoded(const std::string& name, const std::string& text) {
+        return "&" + name + "=" + percentEncode(text);
+    }
+};
+
+TEST_F(PermissionCgi, ChangesReachWhatTheyShallAndAreUndone) {
+    const struct {
+        const char *what, *form, *entries, *defaults;
+        const char *folder, *handsDown, *file, *program, *below;  // then
+    } rows[] = {
+        {"the folder alone", "&mode=g%2Bw,o=rX", "", "", "u::rwx,g::rwx,o::r-x", "", "u::rw-,g::r--,o::---",
+         "u::rwx,g::r-x,o::---", "u::rw-,g::r--,o::---"},
+        {"below, run where it makes sense", "&below=true&mode=g%2Bw,o=rX", "", "", "u::rwx,g::rwx,o::r-x", "",
+         "u::rw-,g::rw-,o::r--", "u::rwx,g::rwx,o::r-x", "u::rw-,g::rw-,o::r--"},
+        {"files by a rule of their own", "&below=true&mode=go=rx&file_mode=a-x,g%2Bw", "", "", "u::rwx,g::r-x,o::r-x",
+         "", "u::rw-,g::rw-,o::---", "u::rw-,g::rw-,o::---", "u::rw-,g::rw-,o::---"},
+        {"a folder that closes behind its content", "&below=true&confirm=true&mode=u-rwx,g%2Bw", "", "",
+         "u::---,g::rwx,o::---", "", "u::---,g::rw-,o::---", "u::---,g::rwx,o::---", "u::---,g::rw-,o::---"},
+        {"an entry and its mask", "&below=true", "user:bob:rwX", "", "u::rwx,u:20002:rwx,g::r-x,m::rwx,o::---", "",
+         "u::rw-,u:20002:rw-,g::r--,m::rw-,o::---", "u::rwx,u:20002:rwx,g::r-x,m::rwx,o::---",
+         "u::rw-,u:20002:rw-,g::r--,m::rw-,o::---"},
+        {"what is handed down", "", "", "user:bob:rx\nother::", "u::rwx,g::r-x,o::---",
+         "u::rwx,u:20002:r-x,g::r-x,m::r-x,o::---", "u::rw-,g::r--,o::---", "u::rwx,g::r-x,o::---",
+         "u::rw-,g::r--,o::---"},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.what);
+        lay();
+        const std::string before = all();
+        const Json::Value task =
+            perform("alice", permit(row.form) + encoded("entries", row.entries) + encoded("defaults", row.defaults));
+        EXPECT_EQ(errors(task), "");
+        EXPECT_EQ(task["items_done"].asInt() + task["items_skipped"].asInt(), task["items_total"].asInt());
+        EXPECT_EQ(listOf(photo_ + "/t"), row.folder);
+        EXPECT_EQ(listOf(photo_ + "/t", ACL_TYPE_DEFAULT), row.handsDown);
+        EXPECT_EQ(listOf(photo_ + "/t/f"), row.file);
+        EXPECT_EQ(listOf(photo_ + "/t/run"), row.program);
+        EXPECT_EQ(listOf(photo_ + "/t/in/g"), row.below);
+        EXPECT_EQ(listOf(outside() + "/victim"), "u::rw-,g::rw-,o::rw-") << "behind a link";
+        EXPECT_EQ(errors(ended("alice", start("alice", "action=undo&taskid=" + task["taskid"].asString()))), "");
+        EXPECT_EQ(all(), before);
+    }
+}
+
+TEST_F(PermissionCgi, AMaskWithholdsWhatItWithheldBefore) {
+    const std::string file = photo_ + "/t/f";
+    const char* masked = "u::rw-,u:20002:rwx,u:20003:r--,g::rw-,m::r--,o::---";
+    const struct {
+        const char *form, *entries, *then;
+    } rows[] = {{"", "group:administrators:rw", "u::rw-,u:20002:r--,u:20003:r--,g::r--,g:20101:rw-,m::rw-,o::---"},
+                {"&mode=g%2Bw", "", "u::rw-,u:20002:r--,u:20003:r--,g::rw-,m::rw-,o::---"},
+                {"&mode=u%2Bx,o=r", "", "u::rwx,u:20002:rwx,u:20003:r--,g::rw-,m::r--,o::r--"},
+                {"", "user:carol:", "u::rw-,u:20002:r--,u:20003:---,g::r--,m::r--,o::---"},
+                {"", "user:bob\nuser:#20003", "u::rw-,g::r--,o::---"}};
+    for (const auto& row : rows) {
+        SCOPED_TRACE(std::string(row.form) + row.entries);
+        setList(file, masked);
+        const Json::Value task =
+            perform("alice", "action=permit&path=/photo/t/f" + std::string(row.form) + encoded("entries", row.entries));
+        EXPECT_EQ(errors(task), "");
+        EXPECT_EQ(listOf(file), row.then);
+    }
+}
+
+TEST_F(PermissionCgi, WhatIsWrongOrForbiddenChangesNothing) {
+    writeFile(photo_ + "/t/bobs", "", 0644);
+    give(photo_ + "/t/bobs", kBobUid);
+    EXPECT_EQ(chown((photo_ + "/t/in").c_str(), kAliceUid, kAdminGid), 0);
+    EXPECT_EQ(chown((photo_ + "/t/run").c_str(), kAliceUid, kAdminGid), 0);
+    EXPECT_EQ(chmod((photo_ + "/t/in").c_str(), 02750), 0);
+    const std::string before = all();
+    const struct {
+        const char *user, *form;
+        int code;              // of the reply,
+        const char* failures;  // or of the task
+        const char* warning = "";
+    } rows[] = {
+        {"alice", "&path=/photo/t", 400, ""},
+        {"alice", "&path=/photo/t&mode=u%2Bq", 400, ""},
+        {"alice", "&path=/photo/t&mode=755", 400, ""},
+        {"alice", "&path=/photo/t&entries=user:bob:rq", 400, ""},
+        {"alice", "&path=/photo/t&entries=mask::r", 400, ""},
+        {"alice", "&path=/photo/t&entries=user::r", 400, ""},
+        {"alice", "&path=/photo/t&entries=user:nobody-here:r", 403, ""},
+        {"alice", "&path=/photo/t&entries=group:%234294967295:r", 404, ""},
+        {"alice", "&path=/photo/t&owner=nobody-here", 403, ""},
+        {"alice", "&path=/photo/t/f&mode=u-r", 2201, "", "access"},
+        {"alice", "&path=/photo/t/f&path=/photo/t/in&mode=u-x", 2201, "", "access set_gid"},
+        {"alice", "&path=/photo/t&below=true&mode=o%2Br&file_mode=u=w", 2201, "", "access"},
+        {"alice", "&path=/photo/t/run&group=users", 2201, "", "group"},
+        {"alice", "&path=/photo/t/f&owner=bob", 2201, "", "owner"},
+        {"carol", "&path=/photo/t/f&owner=bob", 2201, "", "owner"},
+        {"alice", "&path=/photo/t/f&owner=bob&confirm=true", 0, "/photo/t/f 407\n"},
+        {"alice", "&path=/photo/t/f&group=administrators", 0, "/photo/t/f 407\n"},
+        {"alice", "&path=/photo/t/bobs&mode=o=", 0, "/photo/t/bobs 407\n"},
+        {"alice", "&path=/photo/t/bobs&entries=user:alice:rw", 0, "/photo/t/bobs 407\n"},
+        {"alice", "&path=/photo/t/link&mode=o=", 0, "/photo/t/link 2202\n"},
+        {"alice", "&path=/photo/t/way/victim&mode=o=", 0, "/photo/t/way/victim 407\n"},
+        {"alice", "&path=/photo/t/none&mode=o=", 0, "/photo/t/none 408\n"},
+        {"alice", "&path=/photo&mode=o=", 0, "/photo 400\n"},
+        {"bob", "&path=/photo/t/bobs&mode=o=", 0, "/photo/t/bobs 407\n"},  // he may only read in the share
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(std::string(row.user) + row.form);
+        const CgiReply reply = ask(row.user, std::string("action=permit") + row.form);
+        EXPECT_EQ(code(reply), row.code);
+        std::string warnings;
+        for (const Json::Value& word : reply.json["data"]["warnings"]) {
+            warnings += (warnings.empty() ? "" : " ") + word.asString();
+        }
+        EXPECT_EQ(warnings, row.warning);
+        if (row.code == 0) {
+            EXPECT_EQ(errors(ended(row.user, reply.json["data"]["taskid"].asString())), row.failures);
+        }
+        EXPECT_EQ(all(), before);
+    }
+    EXPECT_EQ(code(get(PROGRAM_OPERATION, "alice", permit("&mode=o%2Br").c_str())), 400) << "not posted";
+    EXPECT_EQ(errors(perform("carol", "action=permit&path=/photo/t/f&owner=bob&group=administrators&confirm=true")),
+              "");
+    EXPECT_EQ(statusOf(photo_ + "/t/f").st_uid, kBobUid);
+    EXPECT_EQ(statusOf(photo_ + "/t/f").st_gid, kAdminGid);
+}
+
+TEST_F(PermissionCgi, BelowItGoesOnByItselfAndNamesWhatItCouldNotChange) {
+    writeFiles(photo_, {"/t/in/theirs", "/t/in/z", "/t/in/closed/x"});
+    give(photo_ + "/t/in/theirs", kBobUid);
+    EXPECT_EQ(chmod((photo_ + "/t/in/closed").c_str(), 0), 0);
+    const Json::Value task = perform("alice", permit("&below=true&mode=o=w"));
+    EXPECT_EQ(errors(task), "/photo/t/in/closed 407\n/photo/t/in/theirs 407\n");
+    EXPECT_EQ(listOf(photo_ + "/t/in/z"), "u::rw-,g::rw-,o::-w-");
+    EXPECT_EQ(listOf(photo_ + "/t/in/g"), "u::rw-,g::r--,o::-w-");
+    // What was changed by others since is not undone.
+    EXPECT_EQ(chmod((photo_ + "/t/f").c_str(), 0600), 0);
+    writeFile(photo_ + "/t/in/g", "another content", 0644);
+    const Json::Value back = ended("alice", start("alice", "action=undo&taskid=" + task["taskid"].asString()));
+    EXPECT_EQ(errors(back), "/photo/t/in/g 2101\n/photo/t/f 2101\n");
+    EXPECT_EQ(listOf(photo_ + "/t/in"), "u::rwx,g::r-x,o::---");
+    EXPECT_EQ(listOf(photo_ + "/t/f"), "u::rw-,g::---,o::---");
+}
+
+// Held after each item, when its row in the results on screen is about to be brought up to date.
+TEST_F(PermissionCgi, AFolderSwappedForALinkLeadsNowhereAndResultsFollow) {
+    const std::string found =
+        post(PROGRAM_SEARCH, "alice", "action=start&path=/photo&name=*").json["data"]["taskid"].asString();
+    searched("alice", found);
+    const std::string before = listOf(outside() + "/victim"), above = listOf(outside());
+    support::Gate gate("FILEIDXDBUpdate", systemRoot() + "/gate");
+    const std::string id = start("alice", permit("&below=true&mode=g%2Bw,o=rX&taskid=" + found), {gate.order()});
+    ASSERT_TRUE(gate.holds());  // the folder t
+    gate.next();
+    ASSERT_TRUE(gate.holds());  // t/f; the names in t are known by now
+    fs::rename(photo_ + "/t/run", photo_ + "/moved");
+    fs::create_symlink(outside() + "/victim", photo_ + "/t/run");
+    gate.next();
+    ASSERT_TRUE(gate.holds());  // t/in, which is open
+    fs::rename(photo_ + "/t/in", photo_ + "/aside");
+    fs::create_directory_symlink(outside(), photo_ + "/t/in");
+    writeFiles(outside(), {"/g"});
+    gate.open();
+    const Json::Value task = ended("alice", id);
+    EXPECT_EQ(errors(task), "");
+    EXPECT_EQ(task["state"], "done");
+    EXPECT_EQ(listOf(outside() + "/victim"), before);
+    EXPECT_EQ(listOf(outside()), above);
+    EXPECT_EQ(listOf(outside() + "/g"), "u::rw-,g::rw-,o::rw-");
+    EXPECT_EQ(listOf(photo_ + "/moved"), "u::rwx,g::r-x,o::---");
+    std::map<std::string, int> modes;
+    const Json::Value rows = get(PROGRAM_SEARCH, "alice", "action=list&additional=perm&taskid=" + found).json["data"];
+    for (const Json::Value& row : rows["items"]) {
+        modes[row["path"].asString()] = row["additional"]["perm"]["posix"].asInt();
+    }
+    EXPECT_EQ(modes["/photo/t"], 775);
+    EXPECT_EQ(modes["/photo/t/f"], 664);
+}
+
+TEST_F(PermissionCgi, ACancelledOneStopsAndWhatItDidIsUndone) {
+    const std::string found =
+        post(PROGRAM_SEARCH, "alice", "action=start&path=/photo&name=*").json["data"]["taskid"].asString();
+    searched("alice", found);
+    const std::string before = all();
+    support::Gate gate("FILEIDXDBUpdate", systemRoot() + "/gate");
+    const std::string id = start("alice", permit("&below=true&mode=o%2Br&taskid=" + found), {gate.order()});
+    ASSERT_TRUE(gate.holds());
+    EXPECT_EQ(code(ask("alice", "action=cancel&taskid=" + id)), 0);
+    gate.open();
+    const Json::Value task = ended("alice", id);
+    EXPECT_EQ(task["state"], "cancelled");
+    EXPECT_EQ(listOf(photo_ + "/t/run"), "u::rwx,g::r-x,o::---");
+    EXPECT_EQ(errors(ended("alice", start("alice", "action=undo&taskid=" + id))), "");
+    EXPECT_EQ(all(), before);
+}
+
+TEST_F(PermissionCgi, ManyAreShownByWhatTheyHaveInCommon) {
+    setList(photo_ + "/t/f", "u::rw-,u:20002:rw-,g::rw-,m::r--,o::---");
+    setList(photo_ + "/t/in", "u::rwx,g:20100:r-x,g::r-x,m::r-x,o::r-x", ACL_TYPE_DEFAULT);
+    writeFile(photo_ + "/t/secret", "", 0600);
+    give(photo_ + "/t/secret", kBobUid);
+    const auto shown = [](const char* user, const Names& paths) {
+        return get(PROGRAM_OPERATION, user, "action=permissions" + about(paths)).json["data"];
+    };
+    Json::Value data = shown("alice", {"/photo/t/f", "/photo/t/in", "/photo/t/link", "/photo/t/secret"});
+    EXPECT_EQ(data["items"].asString() + data["folders"].asString() + data["links"].asString() +
+                  data["failed"].asString() + data["owned"].asString(),
+              "21112");
+    EXPECT_EQ(data["owner"]["name"], "alice");
+    EXPECT_EQ(data["group"]["id"].asUInt(), kUsersGid);
+    std::string text;
+    for (const char* list : {"entries", "defaults"}) {
+        for (const Json::Value& entry : data[list]) {
+            text += entry["kind"].asString() + ":" + entry["name"].asString() + " " + entry["all"].asString() + "/" +
+                    entry["any"].asString() + "x" + entry["items"].asString() + " ";
+        }
+    }
+    EXPECT_EQ(text,
+              "user: 6/7x2 user:bob 4/4x1 group: 4/5x2 mask: 4/4x1 other: 0/0x2 "
+              "user: 7/7x1 group: 5/5x1 group:users 5/5x1 mask: 5/5x1 other: 5/5x1 ");
+    EXPECT_EQ(each(data["groups"], "name"), Names{"users"});
+    EXPECT_FALSE(data["administrator"].asBool());
+    EXPECT_TRUE(shown("carol", {"/photo/t/secret"})["administrator"].asBool());
+    const CgiReply refused = get(PROGRAM_OPERATION, "alice", "action=permissions&path=/photo/t/secret");
+    EXPECT_EQ(code(refused), 407);
+    EXPECT_TRUE(refused.json["data"].isNull()) << refused.body;
+}
+
+TEST_F(PermissionCgi, WhoMayWhatAndWhy) {
+    setList(photo_ + "/t/f", "u::rw-,u:20002:rw-,g::rw-,g:20101:rwx,m::r--,o::---");
+    writeFile(photo_ + "/t/secret", "", 0600);
+    give(photo_ + "/t/secret", kBobUid);
+    EXPECT_EQ(chmod((photo_ + "/t/in").c_str(), 0700), 0);
+    const struct {
+        const char *asking, *path, *about;
+        int code;
+        const char* answer;  // rights, by, masked, closed
+    } rows[] = {
+        {"alice", "/photo/t/f", "user=alice", 0, "read write | owner | | "},
+        {"alice", "/photo/t/f", "user=bob", 0, "read | user | write | "},
+        {"alice", "/photo/t/f", "group=users", 0, "read | group | write | "},
+        {"alice", "/photo/t/f", "group=administrators", 0, "read | group | write enter | /photo/t"},
+        {"alice", "/photo/t/f", "user=carol", 0, "read write enter | administrator | | "},
+        {"alice", "/photo/t/in/g", "user=bob", 0, "read | group | | /photo/t/in"},
+        {"carol", "/photo/t/in/g", "user=bob", 0, "read | group | | /photo/t/in | read_only"},
+        {"alice", "/photo/t/secret", "user=bob", 407, ""},
+        {"bob", "/photo/t/in/g", "user=alice", 407, ""},
+        {"alice", "/photo/t/f", "user=nobody-here", 403, ""},
+        {"alice", "/photo/t/f", "group=nobody-here", 404, ""},
+        {"alice", "/photo/t/f", "user=bob&group=users", 400, ""},
+    };
+    const auto joined = [](const Json::Value& list) {
+        std::string text;
+        for (const Json::Value& one : list) {
+            text += one.asString() + " ";
+        }
+        return text;
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(std::string(row.asking) + " " + row.path + " " + row.about);
+        const CgiReply reply =
+            get(PROGRAM_OPERATION, row.asking, std::string("action=access&path=") + row.path + "&" + row.about);
+        EXPECT_EQ(code(reply), row.code);
+        if (row.code != 0) continue;
+        const Json::Value& data = reply.json["data"];
+        std::string closed = joined(data["closed"]);
+        if (!closed.empty()) closed.pop_back();
+        EXPECT_EQ(joined(data["rights"]) + "| " + data["by"].asString() + " | " + joined(data["masked"]) + "| " +
+                      closed + (data.isMember("share") ? " | " + data["share"]["rule"].asString() : ""),
+                  row.answer);
+    }
+}
+
+}  // namespace
