@@ -419,4 +419,21 @@ TEST_F(IndexTest, NamesKeepTheirOrderWhateverChanges) {
     EXPECT_EQ(select(db_, {{sort, {}}, 1, nullptr, 0, ~0UL}), expected);
 }
 
+// Two searches of one user that store what they find at the same time.
+TEST_F(IndexTest, ResultsThatGrowTogetherAreBoundedTogether) {
+    const auto fill = [](const std::string& db, int most) {
+        int stored = 0;
+        while (stored < most && insert(db, {std::to_string(stored)}) == 0) ++stored;
+        return stored;
+    };
+    setSetting("search_results_mib", "4");
+    const std::string other = folder_ + "/other";
+    ASSERT_EQ(FILEIDXDBCreate(other.c_str()), 0);
+    ASSERT_EQ(fill(db_, 1), 1) << "begun while there was room for it alone";
+    ASSERT_EQ(fill(other, 15000), 15000);
+    ASSERT_EQ(countError(other), 0) << "which stores them";
+    const int alone = 4 * (1 << 20) / static_cast<int>(fs::file_size(other) / 15000);
+    EXPECT_LT(fill(db_, alone), alone - 8192);
+}
+
 }  // namespace

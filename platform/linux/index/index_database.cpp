@@ -188,16 +188,17 @@ bool Database::configure(OpenMode mode) {
                                  : "PRAGMA temp_store=MEMORY;PRAGMA cache_spill=OFF")) {
         return false;
     }
-    // What is beyond fails as on a full disk.
-    const int64_t pages = mode.ofShare || mode.readOnly ? 0 : roomForResults(path_) / kPageSize;
-    if (!mode.ofShare && !mode.readOnly &&
-        !execute(db_, ("PRAGMA max_page_count=" + std::to_string(std::clamp<int64_t>(pages, 1, kMostPages))).c_str())) {
-        return false;
-    }
+    if (!mode.ofShare && !mode.readOnly && !boundRoom()) return false;
     constexpr const char* common = "PRAGMA secure_delete=OFF;PRAGMA cache_size=-16384;";
     return execute(db_, common) &&
            execute(db_, mode.ofShare ? "PRAGMA synchronous=FULL;PRAGMA mmap_size=2147418112;"
                                      : "PRAGMA synchronous=OFF;PRAGMA mmap_size=0;PRAGMA cell_size_check=ON;");
+}
+
+// What is beyond fails as on a full disk.
+bool Database::boundRoom() {
+    const int64_t pages = std::clamp<int64_t>(roomForResults(path_) / kPageSize, 1, kMostPages);
+    return execute(db_, ("PRAGMA max_page_count=" + std::to_string(pages)).c_str());
 }
 
 bool Database::makeSchema() {

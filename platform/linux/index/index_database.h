@@ -73,6 +73,7 @@ class Database {
     Database(std::string path, sqlite3* db, bool ofShare) : path_(std::move(path)), db_(db), ofShare_(ofShare) {}
     [[nodiscard]] bool configure(OpenMode mode);
     [[nodiscard]] bool hasOurSchema(bool ofShare);
+    [[nodiscard]] bool boundRoom();
     [[nodiscard]] bool makeSchema();
     [[nodiscard]] bool begin();
     // What a write ends with.

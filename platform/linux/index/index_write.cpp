@@ -15,6 +15,7 @@ using Node = __tag_FI_SQL_COND;
 
 // In a search that finds much, a batch is this large; in one that finds little, it is this old.
 constexpr int kBatchRows = 50000;
+constexpr int kLookRows = 4096;  // between two looks at the room that is left
 constexpr std::chrono::milliseconds kBatchAge(300);
 constexpr std::chrono::milliseconds kFirstAge(30);  // somebody waits for the first rows
 constexpr int kSetLimit = FI_COL_GROUP + 1;
@@ -37,6 +38,8 @@ void append(std::vector<Value>& to, const std::vector<Value>& values) {
 
 bool Database::begin() {
     if (began_) return true;
+    // Others of the user's results may have grown since the last batch.
+    if (!ofShare_ && !boundRoom()) return false;
     // Orders that were made for the records as they were are gone with the first change.
     if (!execute(db_, "BEGIN IMMEDIATE;DELETE FROM ranking")) {
         const KeepErrno keep;
@@ -55,6 +58,7 @@ bool Database::begin() {
 }
 
 bool Database::written(bool done) {
+    if (done && !ofShare_ && rows_ % kLookRows == kLookRows - 1) done = boundRoom();
     if (!done) {
         const KeepErrno keep;
         rollBack();
