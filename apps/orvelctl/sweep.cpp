@@ -199,13 +199,11 @@ Part sweepResults(Sweep& sweep) {
     return part;
 }
 
-// Records of uploads that nobody went on with.
-Part sweepUnfinished(Sweep& /*sweep*/) {
-    Part part;
-    const cgi::OwnSweep swept = cgi::sweepUploadRecords();
-    part.removed = swept.removed;
-    if (swept.error != 0) addError(part, "unfinished uploads", swept.error);
-    return part;
+// What users' own stores keep for a time.
+template <cgi::OwnSweep (*sweepStore)()>
+Part sweepOwn(Sweep& /*sweep*/) {
+    const cgi::OwnSweep swept = sweepStore();
+    return {swept.removed, swept.error != 0 ? strerror(swept.error) : ""};
 }
 
 // What killed processes left, and bytes that no record leads to any more.
@@ -217,22 +215,6 @@ Part sweepUploads(Sweep& sweep) {
     forEachFolder(sweep, "@tmp/orvel", part, [&part, &isKept](const std::string& name, const Descriptor& folder) {
         if (name.starts_with(kUploads)) count(part, name, cgi::removeAbandonedUploads(folder, isKept));
     });
-    return part;
-}
-
-Part sweepKept(Sweep& /*sweep*/) {
-    Part part;
-    const cgi::OwnSweep kept = cgi::sweepKeptListings();
-    part.removed = kept.removed;
-    if (kept.error != 0) addError(part, "kept listings", kept.error);
-    return part;
-}
-
-Part sweepUndo(Sweep& /*sweep*/) {
-    Part part;
-    const cgi::OwnSweep swept = cgi::sweepUndoRecords();
-    part.removed = swept.removed;
-    if (swept.error != 0) addError(part, "undo records", swept.error);
     return part;
 }
 
@@ -278,11 +260,11 @@ constexpr struct {
     {"blocked addresses", "over", sweepAutoBlock},
     {"tasks", "older than two days", sweepTasks},
     {"search results", "without a task", sweepResults},  // behind the tasks
-    {"unfinished uploads", "at rest for two days", sweepUnfinished},
+    {"unfinished uploads", "at rest for two days", sweepOwn<cgi::sweepUploadRecords>},
     {"uploads", "left by killed processes", sweepUploads},  // behind their records
     {"indexes", "left by killed builds", sweepIndexes},
-    {"kept listings", "at rest for an hour", sweepKept},
-    {"undo records", "older than two days", sweepUndo},
+    {"kept listings", "at rest for an hour", sweepOwn<cgi::sweepKeptListings>},
+    {"undo records", "older than two days", sweepOwn<cgi::sweepUndoRecords>},
     {"hidden folders", "left by killed processes", sweepState},
     {"recycle bins", "beyond their days or size", sweepBins},  // last: it may take long
 };
