@@ -22,6 +22,8 @@ class Choice {
     // later. As ChosenRows; `data` says what a failure is about.
     int findRows(const User& user, const VEXO::WebCGI& web, Json::Value& data);
 
+    // Rows of one folder, each of them once.
+    [[nodiscard]] bool isRows() const { return rows_.has_value(); }
     [[nodiscard]] size_t size() const { return rows_ ? rows_->size() : paths_.size(); }
     // The share-relative path of one; of the folder where its name cannot be read any more.
     [[nodiscard]] std::string path(size_t position);

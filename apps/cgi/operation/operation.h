@@ -68,7 +68,8 @@ int accessOperation(Operation& operation);
 // not as the operation left it stays, and so does what would not find its old place. "search": as "taskid" above.
 int undoOperation(Operation& operation);
 
-// Counts what is chosen, with all that lies below it: "items_total" and "bytes_total" of the task that has ended.
+// Counts what is chosen, with all that lies below it, see SizeReport: "measured" of the task, and "items_total" and
+// "bytes_total" of one that has ended.
 int measureOperation(Operation& operation);
 
 // "taskid" (or without it, all of the user's): data: the task, or {"tasks":[...]}; see taskReply.

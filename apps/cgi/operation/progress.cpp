@@ -64,7 +64,8 @@ void Progress::failed(const std::string& path, int code) {
 }
 
 void Progress::failed(const std::string& path, int code, const char* key) {
-    if (errorBytes_ + path.size() + kErrorOverhead > kErrorBytes) {
+    const size_t room = measured_ ? kErrorBytes / 4 : kErrorBytes;  // besides what was measured
+    if (errorBytes_ + path.size() + kErrorOverhead > room) {
         ++errorsLeftOut_;
     } else {
         Json::Value error;
@@ -138,6 +139,7 @@ Json::Value Progress::data(long long underWay) const {
         data["undo_count"] = Json::Int64{undo_.count()};
         data["undo_left_out"] = Json::Int64{undo_.leftOut()};
     }
+    if (measured_) data["measured"] = measured_();
     if (newCount_ == 0) return data;
     data["new"] = new_;
     data["new_count"] = newCount_;

@@ -4,7 +4,9 @@
 
 #include <json/value.h>
 
+#include <functional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "operation/undo_record.h"
@@ -15,8 +17,8 @@ namespace orvel::cgi {
 // The record's "data": {"action", "state": "running", "done", "cancelled" or "failed", "items_done", "items_skipped",
 // "items_failed", "items_total", "bytes_done", "bytes_total", "current", "errors": [{"path","code","key"}],
 // "errors_left_out": how many more there were than the list holds, "new": [{"path"}] and "new_count": see noteNew,
-// "undo_count" and "undo_left_out": see undo}; paths are share-relative. Totals may grow. At most one of these objects
-// in a process.
+// "undo_count" and "undo_left_out": see undo, "measured": see measures}; paths are share-relative. Totals may grow. At
+// most one of these objects in a process.
 class Progress {
  public:
     Progress(KTR::Task& task, const std::string& user, const std::string& action);
@@ -43,6 +45,8 @@ class Progress {
     void noteNew(const std::string& path, const std::vector<std::string>& names);
     // Where it is written down how to undo what was done.
     [[nodiscard]] UndoRecord& undo() { return undo_; }
+    // The record has a member "measured" as well, which is asked for whenever the record is written.
+    void measures(std::function<Json::Value()> measured) { measured_ = std::move(measured); }
     // How many items were done so far.
     [[nodiscard]] long long itemsDone() const { return itemsDone_; }
     // Whether the user wants the operation to end. To be asked often.
@@ -72,6 +76,7 @@ class Progress {
     long long errorsLeftOut_ = 0;
     Json::Value new_{Json::arrayValue};
     Json::Int64 newCount_ = 0;
+    std::function<Json::Value()> measured_;
     long long publishedAt_ = 0;  // milliseconds
     bool begun_ = false;
 };

@@ -3,6 +3,7 @@
 #include <cctype>
 #include <utility>
 
+#include "operation/size_report.h"
 #include "operation/task_start.h"
 
 namespace orvel::cgi {
@@ -54,7 +55,11 @@ bool tasksReply(const std::string& user, Json::Value& data) {
     std::vector<std::unique_ptr<KTR::Task>> tasks;
     if (!tasksOf(user, tasks)) return false;
     data["tasks"] = Json::Value(Json::arrayValue);
-    for (const auto& task : tasks) data["tasks"].append(taskReply(*task));
+    for (const auto& task : tasks) {
+        Json::Value shown = taskReply(*task);
+        if (shown.isMember("measured")) leaveOutLists(shown["measured"]);
+        data["tasks"].append(shown);
+    }
     return true;
 }
 
