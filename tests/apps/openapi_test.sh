@@ -7,5 +7,6 @@ for user in alice bob admin; do export "ORVEL_TEST_${user^^}=$(password "$user")
 projects=$(root_of projects)
 mkdir "$projects"/$'not\xFFtext'
 chown --reference="$projects" "$projects"/$'not\xFFtext'
+mkdir -m 700 "$projects"/$'not\xFFtext'/closed
 /usr/bin/python3 "$here/openapi.py" "$here/../.." "$build" "http://127.0.0.1:$port" || failures=$((failures + 1))
 finish

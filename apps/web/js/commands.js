@@ -2,9 +2,10 @@
 
 import { mayDownload, mayModify, mayWriteIn } from "./access.js";
 import { browser, chosenItems, go, goTo, goUp, refresh, setMode, shareEntry } from "./browser.js";
-import { isInBin, isReadOnlyShare, mayBeText } from "./entries.js";
+import { loaded } from "./dialogs.js";
+import { isInBin, isOffline, isReadOnlyShare, mayBeText } from "./entries.js";
 import { download } from "./download.js";
-import { copyPath, newFolder, newText, rename, showProperties } from "./operations.js";
+import { copyPath, newFolder, newText, rename, showProperties, showSpaceOf } from "./operations.js";
 import { isDeleted, isSearch } from "./path.js";
 import { editPath } from "./pathbar.js";
 import { preview } from "./preview.js";
@@ -141,8 +142,20 @@ addCommand({
   icon: "info",
   keys: ["Alt+Enter"],
   group: "info",
-  when: ({ single, count, folder, search }) => single || (count === 0 && folder && !search),
-  run: ({ single }) => showProperties(single ?? browser.id),
+  when: ({ count, folder, search }) => count > 0 || (folder && !search),
+  run: async ({ single, count }) => {
+    if (single || count === 0) return showProperties(single ?? browser.id);
+    const sizes = await loaded(import("./sizes.js"));
+    return sizes?.showMany(await chosenItems());
+  },
+});
+addCommand({
+  id: "space",
+  icon: "space",
+  keys: ["Alt+s"],
+  group: "info",
+  when: ({ single, count, folder, search }) => (single ? single.isFolder && !isOffline(single) : count === 0 && folder && !search),
+  run: ({ single }) => showSpaceOf(single?.id ?? browser.id),
 });
 addCommand({
   id: "upload",

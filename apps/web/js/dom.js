@@ -31,6 +31,12 @@ export async function loadIcons() {
   document.body.prepend(document.adoptNode(sprite));
 }
 
+// The rules of what is not always there, before it shows.
+export function loadStyle(name) {
+  const href = new URL(`../css/${name}.css`, import.meta.url).href;
+  if (!document.querySelector(`link[href="${href}"]`)) document.head.append(h("link", { rel: "stylesheet", href }));
+}
+
 export function icon(name, className = "icon") {
   const svg = document.createElementNS("http://www.w3.org/2000/svg", "svg");
   svg.setAttribute("class", className);

@@ -2,9 +2,9 @@
 
 import { post } from "./api.js";
 import { browser, refresh, shareEntry } from "./browser.js";
-import { askText, dialog, toast, toastFailure } from "./dialogs.js";
+import { askText, dialog, loaded, toast, toastFailure } from "./dialogs.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
-import { typeOf } from "./entries.js";
+import { isOffline, typeOf } from "./entries.js";
 import { emit } from "./events.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
@@ -126,6 +126,18 @@ export async function copyText(text, said) {
   toast({ text: said });
 }
 
+export async function showSpaceOf(id) {
+  return (await loaded(import("./space.js")))?.showSpace(id);
+}
+
+// What a folder holds, counted while its properties are shown.
+function contentNode({ id }) {
+  const more = h("button.button.outlined", { type: "button", onclick: () => showSpaceOf(id) }, icon("space"), t("command.space"));
+  const node = h("div", {});
+  loaded(import("./sizes.js")).then((sizes) => sizes && node.replaceWith(sizes.sizesNode([{ id }], { without: 1, more: [h("p.size-actions", {}, more)] })));
+  return node;
+}
+
 // Of an entry, or of the folder with an id.
 export async function showProperties(what) {
   let entry = what;
@@ -166,6 +178,7 @@ export async function showProperties(what) {
             t("volume.free", { free: formatSize(entry.volume.freespace), total: formatSize(entry.volume.totalspace) }),
         ),
       ),
+      entry.isFolder && !isOffline(entry) ? contentNode(entry) : "",
       whyNode(entry.id),
       h(
         "footer",

@@ -47,7 +47,7 @@ export async function setupTasks() {
   await arrived;
   const ask = () => get("operation", { action: "status" }).catch(() => ({ tasks: [] }));
   const { tasks } = await broughtOr("tasks", ask);
-  for (const task of tasks) {
+  for (const task of tasks.filter(hasCard)) {
     // What ended well while nobody looked needs no word any more, nor what somebody has seen already.
     if (task.finished && (isGood(task) || noteOf(task.taskid).seen)) clear(task.taskid);
     else show(task);
@@ -124,7 +124,7 @@ async function look() {
   if (tasks) {
     for (const task of tasks) {
       if (cards.has(task.taskid)) update(task);
-      else if (!task.finished) show(task);
+      else if (!task.finished && hasCard(task)) show(task);
     }
     // A record that is gone has nothing more to tell.
     const known = new Set(tasks.map((task) => task.taskid));
@@ -134,6 +134,11 @@ async function look() {
     }
   }
   watch();
+}
+
+// Who counts looks at a dialog meanwhile.
+function hasCard(task) {
+  return task.action !== "measure";
 }
 
 function isGood(task) {

@@ -1,6 +1,6 @@
 // CodeMirror in this page: loaded when it is asked for, in a shadow tree, where its rules need no style element.
 
-import { h } from "./dom.js";
+import { h, loadStyle } from "./dom.js";
 import { t } from "./strings.js";
 
 let loading = null;
@@ -8,14 +8,8 @@ let loading = null;
 export function loadEditor() {
   loading ??= import("../third/editor.js");
   loading.catch(() => (loading = null));
-  loadStyle();
+  loadStyle("documents");
   return loading;
-}
-
-// The rules of documents and texts.
-export function loadStyle() {
-  const href = new URL("../css/documents.css", import.meta.url).href;
-  if (!document.querySelector(`link[href="${href}"]`)) document.head.append(h("link", { rel: "stylesheet", href }));
 }
 
 const NAMES = ["Find", "Replace", "next", "previous", "all", "match case", "regexp", "by word", "replace", "replace all", "close", "Control character"];

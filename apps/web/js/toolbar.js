@@ -64,7 +64,7 @@ export function contextItems() {
       "-",
       ...items(["undo", "paste", "selectAll", "refresh"]),
       "-",
-      ...items(["favour", "unfavour", "emptyBin", "properties"]),
+      ...items(["favour", "unfavour", "emptyBin", "space", "properties"]),
     ];
   }
   return [
@@ -76,7 +76,7 @@ export function contextItems() {
     "-",
     ...items(["delete", "deleteForever"]),
     "-",
-    ...items(["favour", "unfavour", "copyPath", "properties"]),
+    ...items(["favour", "unfavour", "copyPath", "space", "properties"]),
   ];
 }
 

@@ -2,9 +2,8 @@
 
 import { headersOf, urlOf } from "./api.js";
 import { askText } from "./dialogs.js";
-import { h, iconButton } from "./dom.js";
+import { h, iconButton, loadStyle } from "./dom.js";
 import { t } from "./strings.js";
-import { loadStyle } from "./text_view.js";
 
 const MOST_PIXELS = 16e6; // of one page
 const AHEAD = "600px";
@@ -14,7 +13,7 @@ const third = (path) => new URL(`../third/pdf/${path}`, import.meta.url).href;
 
 // The node of a document. Throws what is wrong with it.
 export async function pdfNode(entry, signal) {
-  loadStyle();
+  loadStyle("documents");
   const pdfjs = await import("../third/pdf/pdf.js");
   pdfjs.GlobalWorkerOptions.workerSrc = third("worker.js");
   const task = pdfjs.getDocument({

@@ -2,12 +2,11 @@
 // Markdown as it is meant.
 
 import { readReply, send, urlOf } from "./api.js";
-import { h } from "./dom.js";
+import { h, loadStyle } from "./dom.js";
 import { formatSize } from "./format.js";
 import { splitExtension } from "./path.js";
 import { t } from "./strings.js";
 import { detect, ENCODINGS } from "./text_codec.js";
-import { loadStyle } from "./text_view.js";
 
 const PIECE = 256 * 1024;
 const LONGEST = 4; // bytes of a character
@@ -15,7 +14,7 @@ const MOST_COLOURED = 150 * 1000; // characters
 
 // The node of a text; null for what is none.
 export async function textNode(entry, signal) {
-  loadStyle();
+  loadStyle("documents");
   const reader = new Reader(entry, signal);
   return (await reader.read(0)) ? reader.node : null;
 }
