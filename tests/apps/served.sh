@@ -33,7 +33,7 @@ expect() { # what, wanted, got
 # A program that calls OPERATION is held while the file of that name is in $gates (see platform/linux/fault_gate.h).
 gates=$work/gates
 mkdir -m 777 "$gates"
-for operation in VEXOFileCopy FILEIDXOutputDBInsert; do
+for operation in VEXOFileCopy FILEIDXOutputDBInsert KTR::Task::beginUpdate; do
     VEXO_GATE_HOLD="${VEXO_GATE_HOLD:+$VEXO_GATE_HOLD;}$operation=$gates/$operation"
 done
 export VEXO_GATE_HOLD

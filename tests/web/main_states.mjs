@@ -7,6 +7,11 @@ export async function visitStates(page, at) {
   await go(page, "/projects");
   await page.waitForSelector("#view >> text=notes.md");
   await at(page, "list");
+  await press("Alt+s");
+  await page.waitForSelector(".treemap");
+  await at(page, "space", ".dialog");
+  await press("Escape");
+  await page.waitForSelector(".dialog", { state: "detached" });
   await row(page, "notes.md").click();
   await at(page, "chosen");
   for (const [keys, opened, state, part] of [

@@ -3,6 +3,7 @@ import assert from "node:assert/strict";
 import { mkdirSync, rmSync, writeFileSync } from "node:fs";
 import { before, test } from "node:test";
 import { findings, row, screenshot, withPage } from "./browser.mjs";
+import { Gate } from "./gate.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const phone = { viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true };
@@ -80,4 +81,34 @@ test("a folder that is gone says so, and the way back stays", () =>
     await pictured(page, "sizes");
     await page.tap(".space header button");
     await page.waitForSelector("dialog", { state: "detached" });
+  }));
+
+test("counting ends when it is told to, or with its dialog", () =>
+  withPage("alice", { path: "/projects/sizes" }, async (page) => {
+    const gate = new Gate("KTR::Task::beginUpdate");
+    const open = async () => {
+      await page.focus("#view");
+      await page.keyboard.press("Alt+Enter");
+      await gate.holds(); // before it begins
+      gate.next();
+      await gate.holds(); // in the first folder
+    };
+    try {
+      await open();
+      await page.click(".size-running button");
+      gate.open();
+      await page.waitForSelector(".sizes >> text=Cancelled: not everything was counted");
+      assert.equal(await page.locator(".activity-card", { hasText: "measure" }).count(), 0);
+      await page.click(".sizes >> text=Count again");
+      await page.waitForSelector(".sizes dd >> text=/ files, /");
+      await page.keyboard.press("Escape");
+      gate.next();
+      await open();
+      const cleared = page.waitForResponse((response) => response.request().postData()?.includes("action=clear"));
+      await page.keyboard.press("Escape");
+      gate.open();
+      assert.equal((await (await cleared).json()).success, true);
+    } finally {
+      gate.open();
+    }
   }));

@@ -5,6 +5,7 @@ import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { isOffline, isReadOnlyShare } from "./entries.js";
 import { formatSize } from "./format.js";
 import { folderKindOf, iconOf } from "./icons.js";
+import { showSpaceOf } from "./operations.js";
 import { decode, parentOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { dropFavourite, favourites, recentPlaces } from "./places.js";
@@ -91,5 +92,6 @@ export function paintVolume(node, share) {
   node.replaceChildren(
     bar,
     h("span", {}, t("volume.free", { free: formatSize(volume.freespace), total: formatSize(volume.totalspace) })),
+    share && !isOffline(share) ? iconButton("space", t("space.of", { name: labelOf(share.id) }), () => showSpaceOf(share.id)) : "",
   );
 }

@@ -3,7 +3,7 @@
 import { encodeParams, get, isAbort, post, PROGRAMS, sendOnce } from "./api.js";
 import { Choice } from "./choice.js";
 import { dialog } from "./dialogs.js";
-import { h, icon, loadStyle, plainName } from "./dom.js";
+import { h, icon, keepFocus, loadStyle, plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { formatSize } from "./format.js";
 import { t } from "./strings.js";
@@ -133,6 +133,7 @@ export function sizesNode(what, { without = 0, more = [] } = {}) {
   const said = h("p.visually-hidden", { role: "status" });
   const rest = h("div", {});
   const node = h("section.sizes", {}, h("h3", {}, t("sizes.title")), lines, rest, said, ...more);
+  const again = (text) => h("button.link", { type: "button", onclick: start }, t(text));
   const line = (key, value) => [h("dt", {}, t(`properties.${key}`)), h("dd", {}, value)];
   const show = (result) => {
     const { measured } = result;
@@ -142,21 +143,20 @@ export function sizesNode(what, { without = 0, more = [] } = {}) {
       ...line("disk", formatSize(measured.disk)),
       ...line("contains", countsOf(measured, without)),
     );
-    rest.replaceChildren(notesOf(result));
+    keepFocus(rest, () => rest.replaceChildren(notesOf(result), result.state === "done" ? "" : again("space.again")));
     said.textContent = `${size}, ${countsOf(measured, without)}`;
   };
   const start = async () => {
     const ending = new AbortController();
     const running = runningNode(() => ending.abort());
     node.setAttribute("aria-busy", "true");
-    rest.replaceChildren(running.node);
+    keepFocus(rest, () => rest.replaceChildren(running.node));
     requestAnimationFrame(() => node.closest("dialog")?.addEventListener("close", () => ending.abort()));
     try {
       show(await measure(what, { signal: ending.signal, onProgress: running.update }));
     } catch (failure) {
       if (isAbort(failure)) return;
-      const again = h("button.link", { type: "button", onclick: start }, t("state.retry"));
-      rest.replaceChildren(h("p", { role: "alert" }, describe(failure).title, " ", again));
+      rest.replaceChildren(h("p", { role: "alert" }, describe(failure).title, " ", again("state.retry")));
     }
     node.removeAttribute("aria-busy");
   };

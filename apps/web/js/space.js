@@ -132,6 +132,7 @@ class SpaceView {
   picture(measured) {
     const all = measured.parts ?? [];
     const box = h("ul.treemap", { "aria-label": t("space.picture") });
+    if (!measured.parts) return "";
     if (measured.size === 0) return h("p.soft.space-empty", {}, t("space.empty"));
     const shown = all.filter(({ size }, i) => i < MOST_TILES && size / measured.size >= LEAST_SHARE);
     const left = measured.size - shown.reduce((sum, { size }) => sum + size, 0);
