@@ -94,7 +94,7 @@ class SpaceView {
         {},
         h(
           "button.crumb",
-          { type: "button", "aria-current": id === this.id ? "location" : null, onclick: () => id !== this.id && this.enter(id) },
+          { type: "button", autofocus: id === this.id, "aria-current": id === this.id ? "location" : null, onclick: () => id !== this.id && this.enter(id) },
           plainName(labelOf(id)),
         ),
       ),
@@ -138,7 +138,7 @@ class SpaceView {
     const left = measured.size - shown.reduce((sum, { size }) => sum + size, 0);
     const count = all.length - shown.length + (measured.rest?.count ?? 0);
     const tiles = shown.map((part) => ({ size: part.size, part }));
-    if (left > 0) tiles.push({ size: left, count });
+    if (left / measured.size >= LEAST_SHARE) tiles.push({ size: left, count });
     tiles.sort((a, b) => b.size - a.size);
     const narrow = innerWidth < 640;
     const places = treemap(tiles.map(({ size }) => size), narrow ? 1 : 2, 1);
@@ -150,7 +150,7 @@ class SpaceView {
   }
 
   tile({ size, part, count }, place, total, side) {
-    const label = part ? nameNode(nameOf(idIn(part)), false) : t("space.rest", { count });
+    const label = part ? nameNode(labelOf(idIn(part)), false) : t("space.rest", { count });
     const text = h("span.tile-text", {}, h("b", {}, label), h("span", {}, `${formatSize(size)} · ${percent(size / total)}`));
     const content = part
       ? h("button.tile", { type: "button", title: this.tip(part, total), onclick: () => this.choose(part) }, text)
@@ -164,7 +164,7 @@ class SpaceView {
   }
 
   tip(part, total) {
-    return `${plainName(nameOf(idIn(part)))} – ${formatSize(part.size)} (${percent(part.size / total)})`;
+    return `${plainName(labelOf(idIn(part)))} – ${formatSize(part.size)} (${percent(part.size / total)})`;
   }
 
   paintList(list, measured) {
@@ -207,7 +207,7 @@ class SpaceView {
         "button.row-main",
         { type: "button", title: isFolder ? t("space.enter") : t("space.show"), onclick: () => this.choose(part) },
         icon(`kind-${kind}`, "file-icon"),
-        h("span.row-text", {}, h("b", {}, nameNode(nameOf(id))), h("span.soft", {}, about.filter(Boolean).join(" · ")), bar),
+        h("span.row-text", {}, h("b", {}, nameNode(labelOf(id))), h("span.soft", {}, about.filter(Boolean).join(" · ")), bar),
         h("span.row-size", {}, formatSize(part.size), h("span.soft", {}, size > 0 ? percent(part.size / size) : "")),
       ),
       isFolder && iconButton("folder-open", t("space.show_named", { name: nameOf(id) }), () => this.show(id)),
