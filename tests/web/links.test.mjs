@@ -1,10 +1,11 @@
 // Public links: made, opened by a visitor who has no account, revoked.
 import assert from "node:assert/strict";
 import { test } from "node:test";
-import { browser, findings, go, row, screenshot, withPage } from "./browser.mjs";
+import { choose, findings, finish, newPage, press, row, screenshot, withPage } from "./browser.mjs";
+import { ownFolder } from "./support.mjs";
 
 async function makeLink(page, name, password) {
-  await row(page, name).click();
+  await choose(page, name);
   await page.click("#toolbar >> text=Share a link");
   assert.match(await page.inputValue("[name=password]"), /^([a-km-np-z2-9]{4}-){3}[a-km-np-z2-9]{4}$/, "80 bits");
   await page.fill("[name=password]", password);
@@ -12,34 +13,23 @@ async function makeLink(page, name, password) {
   const address = await page.inputValue(".address");
   if (password) assert.equal(await page.inputValue(".dialog .password"), password);
   await page.click(".dialog >> text=Copy link");
-  await page.click(".toast:has-text('Link copied') button");
+  await press(page, ".toast", "Link copied", "Close");
   await page.keyboard.press("Escape");
   return address;
 }
 
 async function visit(address, run, options = {}) {
-  const context = await browser.newContext({
-    viewport: { width: 1280, height: 800 },
-    locale: "en-GB",
-    ...options,
-  });
-  const page = await context.newPage();
-  const wrong = [];
-  page.on("pageerror", (error) => wrong.push(error.stack));
-  page.on("console", (message) => {
-    if (message.type() === "error") wrong.push(message.text());
-  });
-  try {
+  const page = await newPage(options);
+  await finish(page, async () => {
     const response = await page.goto(address);
-    await run(page, response.status(), wrong);
-  } finally {
-    await context.close();
-  }
+    await run(page, response.status(), () => page.complaints.filter((text) => !text.startsWith("status")));
+  });
 }
 
-test("a folder with a password, opened elsewhere, then revoked", () =>
-  withPage("alice", { path: "/projects" }, async (page) => {
-    const address = await makeLink(page, "house", "let me in");
+test("a folder with a password, opened elsewhere, then revoked", () => {
+  ownFolder("linked", { "cabin/": "", "cabin/plan.pdf": "a plan" });
+  return withPage("alice", { path: "/projects/linked" }, async (page) => {
+    const address = await makeLink(page, "cabin", "let me in");
     await visit(address, async (visitor, status, wrong) => {
       assert.equal(status, 200);
       await screenshot(visitor, "visitor-door");
@@ -54,13 +44,13 @@ test("a folder with a password, opened elsewhere, then revoked", () =>
       await visitor.click("[aria-label='Download: plan.pdf']");
       assert.equal((await download).suggestedFilename(), "plan.pdf");
       assert.deepEqual(
-        wrong.filter((text) => !text.includes("403") && !text.includes("429")),
+        wrong().filter((text) => !text.includes("403") && !text.includes("429")),
         [],
       );
     });
     await page.click("#account-button");
     await page.click(".menu >> text=My public links");
-    const link = page.locator(".link-list li:has(b[title$='/house'])"); // others may have left theirs
+    const link = page.locator(".link-list li:has(b[title$='/linked/cabin'])"); // others may have left theirs
     await link.locator("text=with password").waitFor();
     await link.locator("[aria-label=Revoke]").click();
     await page.click(".dialog .button.danger");
@@ -72,11 +62,13 @@ test("a folder with a password, opened elsewhere, then revoked", () =>
       assert.deepEqual(await findings(visitor), []);
       assert.notEqual(await visitor.evaluate(() => getComputedStyle(document.querySelector("main")).borderRadius), "0px");
     });
-  }));
+  });
+});
 
-test("changed in place: downloads that end, a badge, a code", () =>
-  withPage("alice", { path: "/projects" }, async (page) => {
-    await row(page, "notes.md").click();
+test("changed in place: downloads that end, a badge, a code", () => {
+  ownFolder("limited", { "notes.md": "# Notes" });
+  return withPage("alice", { path: "/projects/limited" }, async (page) => {
+    await choose(page, "notes.md");
     await page.click("#toolbar >> text=Share a link");
     await page.fill("[name=password]", "");
     await page.click(".dialog >> text=Create link");
@@ -94,7 +86,7 @@ test("changed in place: downloads that end, a badge, a code", () =>
     const marked = row(page, "notes.md").locator(".badge[title*='public link']");
     await marked.waitFor();
 
-    await row(page, "notes.md").click({ button: "right" });
+    await choose(page, "notes.md", { button: "right" });
     await page.click(".menu >> text=Links of this item");
     const link = page.locator(".link-list li", { has: page.locator(`a[href="${address}"]`) });
     await link.locator("text=no downloads yet").waitFor();
@@ -120,10 +112,10 @@ test("changed in place: downloads that end, a badge, a code", () =>
       await visitor.waitForSelector("h1:has-text('used up')");
       assert.equal((await visitor.reload()).status(), 410);
       await visitor.waitForSelector("h1:has-text('This link has been used up.')");
-      assert.deepEqual(wrong.filter((text) => !text.includes("410")), []);
+      assert.deepEqual(wrong().filter((text) => !text.includes("410")), []);
     });
     await page.keyboard.press("Escape");
-    await row(page, "notes.md").click({ button: "right" });
+    await choose(page, "notes.md", { button: "right" });
     await page.click(".menu >> text=Links of this item");
     await link.locator("text=used up: 1 of 1 download").waitFor();
     await link.locator("[aria-label=Revoke]").click();
@@ -131,25 +123,22 @@ test("changed in place: downloads that end, a badge, a code", () =>
     await link.waitFor({ state: "detached" });
     await page.keyboard.press("Escape");
     await marked.waitFor({ state: "detached" });
-  }));
+  });
+});
 
 test("names of markup reach a visitor as text", () =>
-  withPage("alice", { path: "/" }, async (page) => {
-    await go(page, "/worldwide");
-    await page.waitForSelector("#view >> text=#hash.txt");
+  withPage("alice", { path: "/worldwide" }, async (page) => {
     const address = await makeLink(page, "<img src=x onerror", "");
     await visit(address, async (visitor, status, wrong) => {
       assert.equal(status, 200);
       await visitor.waitForSelector("text=<img src=x onerror=alert(1)>.txt");
       assert.equal(await visitor.locator("img:not(.picture, .brand img)").count(), 0);
-      assert.deepEqual(wrong, []);
+      assert.deepEqual(wrong(), []);
     });
   }));
 
 test("pictures on a phone: tiles, the file itself, sorted, back", () =>
-  withPage("alice", { path: "/" }, async (page) => {
-    await go(page, "/photo");
-    await page.waitForSelector("#view >> text=Landscapes");
+  withPage("alice", { path: "/photo" }, async (page) => {
     const address = await makeLink(page, "Landscapes", "");
     const phone = { viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true };
     await visit(
@@ -167,7 +156,7 @@ test("pictures on a phone: tiles, the file itself, sorted, back", () =>
         await shown("Blue hour.png");
         await visitor.reload(); // the address keeps it
         await shown("Blue hour.png");
-        await visitor.goBack();
+        await visitor.goBack({ waitUntil: "commit" });
         await visitor.waitForSelector(".preview", { state: "detached" });
         await visitor.selectOption("select", "name desc");
         await visitor.waitForSelector(".tiles li:first-child:has-text('North slope.png')");
@@ -175,7 +164,7 @@ test("pictures on a phone: tiles, the file itself, sorted, back", () =>
         await visitor.waitForSelector("tbody tr:first-child:has-text('North slope.png')");
         assert.deepEqual(await findings(visitor), []);
         await screenshot(visitor, "visitor-phone");
-        assert.deepEqual(wrong, []);
+        assert.deepEqual(wrong(), []);
       },
       phone,
     );

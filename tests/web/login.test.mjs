@@ -1,37 +1,24 @@
 // Logging in by the page: who gets in, what is asked, where one is logged in, a session that ends in the middle of work.
 import assert from "node:assert/strict";
-import { mkdtempSync, rmSync, writeFileSync } from "node:fs";
-import { tmpdir } from "node:os";
 import { join } from "node:path";
-import { after, before, test } from "node:test";
-import { browser, findings, go, PASSWORDS, rowsReady, screenshot, upload, URL_OF_PAGE, wentWell } from "./browser.mjs";
+import { test } from "node:test";
+import { findings, finish, go, newPage, PASSWORDS, rowsReady, screenshot, upload, URL_OF_PAGE, wentWell } from "./browser.mjs";
 import { goAllWays } from "./log_ins.mjs";
+import { localFiles } from "./support.mjs";
 
 // By this name the demo's web server asks nobody for a password.
 const SITE = URL_OF_PAGE.replace("127.0.0.1", "localhost");
-const files = mkdtempSync(join(tmpdir(), "orvel-login-"));
 const NAMES = ["large.bin", "one.txt", "two.txt", "three.txt"];
-
-before(() => {
-  for (const name of NAMES) writeFileSync(join(files, name), Buffer.alloc(name === "large.bin" ? 2 << 20 : 10, 7));
-});
-after(() => rmSync(files, { recursive: true }));
+const files = localFiles("login", Object.fromEntries(NAMES.map((name, i) => [name, Buffer.alloc(i === 0 ? 2 << 20 : 10, 7)])));
+const FILES = NAMES.map((name) => join(files, name));
 
 // A browser of its own, with the page's scripts under watch.
 async function withBrowser(run, options = {}) {
-  const context = await browser.newContext({ viewport: { width: 1280, height: 800 }, locale: "en-GB", reducedMotion: "reduce", ...options });
-  const page = await context.newPage();
-  const wrong = [];
-  page.on("pageerror", (error) => wrong.push(error.stack));
-  try {
-    await run(page, context);
-    assert.deepEqual(wrong, []);
-  } catch (failure) {
-    await screenshot(page, `failed-login-${Date.now()}`);
-    throw failure;
-  } finally {
-    await context.close();
-  }
+  const page = await newPage(options);
+  await finish(page, async () => {
+    await run(page, page.context());
+    assert.deepEqual(page.complaints.filter((text) => text.startsWith("page:")), []);
+  });
 }
 
 async function logIn(page, user, password = PASSWORDS[user], path = "/") {
@@ -82,6 +69,7 @@ test("right, wrong, unknown, asked once more, out again", () =>
     await page.keyboard.type(PASSWORDS.alice);
     await page.keyboard.press("Enter");
     await page.waitForSelector("#view >> text=Landscapes"); // where the address led
+    await post(context, "logout", { scope: "others" }); // where tests before this one logged in
 
     // Somewhere else, too: seen, and ended from here.
     await withBrowser(async (other) => {
@@ -89,8 +77,7 @@ test("right, wrong, unknown, asked once more, out again", () =>
       await page.click("#account-button");
       await page.waitForSelector(".menu >> text=alice");
       await page.click(".menu >> text=Where am I logged in");
-      await page.waitForSelector(".session-list li >> nth=1");
-      assert.equal(await page.locator(".session-list li").count(), 2);
+      await page.waitForFunction(() => document.querySelectorAll(".session-list li").length === 2);
       assert.deepEqual(await findings(page, ".dialog"), []);
       await screenshot(page, "sessions");
       await page.click(".session-list li:not(:has(.tag)) button");
@@ -132,7 +119,7 @@ test("a session that ends during an upload: asked for in place, everything arriv
       if (++uploads === 1) await post(context, "logout", {});
       await route.continue();
     });
-    await upload(page, "Upload files", NAMES.map((name) => join(files, name)));
+    await upload(page, "Upload files", FILES);
     await page.waitForSelector(".login-again [name=password]:focus");
     for (let i = 0; i < 3; ++i) await page.keyboard.press("Escape"); // there is nothing to go back to
     assert.deepEqual(await findings(page, ".login-again"), []);
@@ -156,10 +143,10 @@ test("somebody else is logged in by then: the page starts anew, nothing that was
       assert.equal((await reply.json()).data?.user, "bob");
       await route.continue();
     });
-    await upload(page, "Upload files", NAMES.map((name) => join(files, name)));
+    await upload(page, "Upload files", FILES);
     await page.waitForSelector(".home >> text=Hello, bob");
     await page.waitForFunction(() => location.hash === "#/");
-    assert.equal(await page.locator(".activity-card").count(), 0);
+    await page.waitForSelector(".activity-card", { state: "detached" });
     assert.deepEqual(await inHome(context), []);
   }));
 

@@ -1,4 +1,4 @@
-import { go, row } from "./browser.mjs";
+import { choose, go } from "./browser.mjs";
 
 // Goes through the main states of the page; `at(page, state, part)` looks at each, `part` being what is new in it.
 export async function visitStates(page, at) {
@@ -12,7 +12,7 @@ export async function visitStates(page, at) {
   await at(page, "space", ".dialog");
   await press("Escape");
   await page.waitForSelector(".dialog", { state: "detached" });
-  await row(page, "notes.md").click();
+  await choose(page, "notes.md");
   await at(page, "chosen");
   for (const [keys, opened, state, part] of [
     ["Shift+F10", ".menu", "context menu", ".menu"],

@@ -1,34 +1,26 @@
 // Uploads of large files that go on: after a network that breaks, a reload, and by another maker's client.
 import assert from "node:assert/strict";
 import { randomBytes } from "node:crypto";
-import { chmodSync, mkdirSync, mkdtempSync, readFileSync, rmSync, statSync, writeFileSync } from "node:fs";
-import { tmpdir } from "node:os";
+import { readFileSync, statSync } from "node:fs";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
 import * as tus from "tus-js-client";
-import { PASSWORDS, unfinished, upload, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
+import { cardOf, PASSWORDS, unfinished, upload, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
 import { CuttingNetwork } from "./cutting.mjs";
+import { localFiles, ownFolder } from "./support.mjs";
 
 const MIB = 1024 * 1024;
 const SIZE = 32 * MIB; // more than all buffers on the way hold
-const folder = `${process.env.ORVEL_TEST_PROJECTS}/resume`;
-const files = mkdtempSync(join(tmpdir(), "orvel-resume-"));
+const folder = ownFolder("resume");
 const data = randomBytes(SIZE);
+const files = localFiles("resume", { "film.bin": data, "other.bin": data.subarray(0, 9 * MIB) });
 const login = `Basic ${Buffer.from(`alice:${PASSWORDS.alice}`).toString("base64")}`;
-const card = (page, text) => page.locator(".activity-card", { hasText: text });
 let network;
 
 before(async () => {
-  mkdirSync(folder);
-  chmodSync(folder, 0o777);
-  writeFileSync(join(files, "film.bin"), data);
-  writeFileSync(join(files, "other.bin"), data.subarray(0, 9 * MIB));
   network = await new CuttingNetwork(URL_OF_PAGE).listen();
 });
-after(() => {
-  network.close();
-  rmSync(files, { recursive: true });
-});
+after(() => network.close());
 
 function arrived(name) {
   assert.ok(readFileSync(join(folder, name)).equals(data), `${name} is not what was sent`);
@@ -97,7 +89,7 @@ test("the page: what a closed browser left goes on with the file chosen again", 
       if (one.method() === "PATCH") offsets.push(one.headers()["upload-offset"]);
     });
     await page.reload();
-    const left = card(page, "Not finished: “left.bin”");
+    const left = cardOf(page, "Not finished: “left.bin”");
     await left.waitFor();
     const choose = async (file) => {
       const chooser = page.waitForEvent("filechooser");
@@ -110,7 +102,7 @@ test("the page: what a closed browser left goes on with the file chosen again", 
     await wentWell(page, "1 file uploaded");
     assert.deepEqual(offsets, [String(5 * MIB)]);
     arrived("left.bin");
-    const dropped = card(page, "“dropped.bin”");
+    const dropped = cardOf(page, "“dropped.bin”");
     await dropped.locator("button", { hasText: "Discard" }).click();
     await dropped.waitFor({ state: "detached" });
     const items = await unfinished(request);

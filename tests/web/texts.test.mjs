@@ -1,29 +1,24 @@
 // Texts: edited in place without a byte changed that nobody touched, and never over somebody else's work.
 import assert from "node:assert/strict";
-import { chmodSync, existsSync, mkdirSync, readFileSync, rmSync, unlinkSync, writeFileSync } from "node:fs";
+import { existsSync, readFileSync, unlinkSync } from "node:fs";
 import { join } from "node:path";
-import { after, before, test } from "node:test";
-import { findings, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+import { before, test } from "node:test";
+import { choose, findings, press, row, rowsReady, screenshot, withPage } from "./browser.mjs";
+import { ownFolder, write as writeIn } from "./support.mjs";
 
-const folder = join(process.env.ORVEL_TEST_PROJECTS, "texts");
 const here = { path: "/projects/texts" };
 const at = (name) => join(folder, name);
+const write = (name, content) => writeIn(folder, { [name]: content });
+let folder;
 
 before(() => {
-  mkdirSync(folder);
-  chmodSync(folder, 0o777);
+  folder = ownFolder("texts");
 });
-after(() => rmSync(folder, { recursive: true, force: true }));
-
-function write(name, content) {
-  writeFileSync(at(name), content);
-  chmodSync(at(name), 0o666);
-}
 
 async function openEditor(page, name) {
-  await row(page, name).click();
+  await choose(page, name);
   await page.keyboard.press("F4");
-  await page.locator(".editor .cm-content").waitFor();
+  await page.locator(".editor .cm-focused").waitFor();
 }
 
 const state = (page, text) => page.locator(".editor [role=status]", { hasText: new RegExp(`^${text}$`) }).waitFor();
@@ -64,7 +59,7 @@ test("bytes that nobody touched stay, whatever they mean", async () => {
     await page.keyboard.press("Control+s");
     await page.locator(".toast", { hasText: "“Ж” in line 1 does not exist in Windows-1252" }).waitFor();
     assert.deepEqual(readFileSync(at("latin.txt")), cases.at(-1)[2]);
-    await page.click(".toast >> text=Save as UTF-8");
+    await press(page, ".toast", "“Ж” in line 1", "Save as UTF-8");
     await state(page, "Saved");
     assert.equal(readFileSync(at("latin.txt"), "utf8"), "ЖCafé €\u0081\nx");
     await leave(page);
@@ -136,7 +131,7 @@ test("a new text; changes that are not saved keep the editor open", () =>
     await page.tap("#toolbar >> text=New text file");
     await page.fill(".dialog .input", "notes.md");
     await page.keyboard.press("Enter");
-    await page.locator(".editor .cm-content").waitFor();
+    await page.locator(".editor .cm-focused").waitFor();
     await page.keyboard.type("# Notes");
     await page.locator(".editor .tok-heading").first().waitFor();
     await screenshot(page, "texts editor");
@@ -163,7 +158,7 @@ test("a new text; changes that are not saved keep the editor open", () =>
     // From the preview, which shows it again afterwards.
     await row(page, "notes.md").dblclick();
     await page.click(".preview [data-does=edit]");
-    await page.locator(".editor .cm-content").waitFor();
+    await page.locator(".editor .cm-focused").waitFor();
     await page.keyboard.press("Control+End");
     await page.keyboard.type("\nmore");
     await page.keyboard.press("Control+s");

@@ -1,14 +1,15 @@
 // Two people at work in one folder: one chooses, sorts and deletes in the page, the other renames, adds and removes beside
 // it. What was chosen goes, and nothing else. ORVEL_TEST_LONG=1: 20,000 files for a minute.
 import assert from "node:assert/strict";
-import { existsSync, mkdirSync, readdirSync, renameSync, rmSync, writeFileSync } from "node:fs";
+import { existsSync, readdirSync, renameSync, rmSync, writeFileSync } from "node:fs";
 import { test } from "node:test";
 import { drawn, rowsReady, withPage } from "./browser.mjs";
+import { ownFolder } from "./support.mjs";
 
 const LONG = process.env.ORVEL_TEST_LONG !== undefined;
 const FILES = LONG ? 20_000 : 1500;
 const ROUNDS = 3;
-const folder = `${process.env.ORVEL_TEST_PROJECTS}/two`;
+const folder = ownFolder("two");
 const nameOf = (i) => `item-${String(i).padStart(5, "0")}`;
 
 // Everything that ever was: when it came, and whether the other one took it away.
@@ -88,7 +89,7 @@ async function deleteChosen(page) {
   await page.press("#view", "Shift+Delete");
   await page.click(".dialog .button.danger");
   const card = page.locator(".activity-card:is(.good, .failed, .stopped)");
-  await card.first().waitFor({ timeout: 60_000 });
+  await card.first().waitFor();
   await card.first().locator(":scope > .icon-button").click();
 }
 
@@ -102,15 +103,9 @@ function check(isChosen, shown, chosen) {
   }
 }
 
-test("two people in one folder", { timeout: 300_000 }, () =>
-  withPage("admin", { path: "/projects" }, async (page) => {
-    mkdirSync(folder, { mode: 0o777 });
-    for (let i = 0; i < FILES; ++i) add(nameOf(i));
-    // What ended before would be taken for what is done here.
-    await page.evaluate(() => fetch("/cgi-bin/operation", { method: "POST", body: new URLSearchParams({ action: "clear" }) }));
-    await page.goto(`${page.url().split("#")[0]}#/projects/two`);
-    await page.reload();
-    await page.waitForSelector(`#view >> text=${nameOf(0)}`);
+test("two people in one folder", () => {
+  for (let i = 0; i < FILES; ++i) add(nameOf(i));
+  return withPage("admin", { path: "/projects/two" }, async (page) => {
     const end = Date.now() + 60_000;
     let rounds = 0;
     const others = setInterval(otherStep, 30);
@@ -132,4 +127,5 @@ test("two people in one folder", { timeout: 300_000 }, () =>
       clearInterval(others);
     }
     console.log(`${rounds} times chosen and deleted, ${moment - FILES} things added and renamed meanwhile`);
-  }));
+  });
+});
