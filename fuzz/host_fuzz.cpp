@@ -9,9 +9,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     fuzz::require(parts.host.size() <= 4095 && parts.port.size() <= 4095);
     // Between brackets, and behind one that is not closed, the text is taken as it stands.
     fuzz::require((input.starts_with('[') ? parts.port : parts.host + parts.port).find('/') == std::string::npos);
-    if (const auto address = vexo::normaliseAddress(input.c_str())) {
+    if (const auto address = vexo::normaliseAddress(input.c_str()))
         fuzz::require(vexo::normaliseAddress(address->c_str()) == address && address->size() < 46);
-    }
     const vexo::AutoBlockRules rules = vexo::parseAutoBlockRules("yes", input, input, input);
     fuzz::require(rules.window >= 0 && rules.duration >= 0);
     return 0;

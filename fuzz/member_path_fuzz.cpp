@@ -8,9 +8,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const std::string_view input = fuzz::text(data, size);
     if (const auto components = orvel::cgi::memberComponents(input)) {
         fuzz::require(!components->empty() && input.front() != '/');
-        for (const std::string& one : *components) {
+        for (const std::string& one : *components)
             fuzz::require(!one.empty() && one != "." && one != ".." && one.find('/') == std::string::npos);
-        }
     }
     for (const std::size_t depth : {std::size_t{0}, std::size_t{1}, std::size_t{3}}) {
         if (!orvel::cgi::staysInside(input, depth)) continue;

@@ -8,9 +8,8 @@
 namespace {
 
 BOOL look(__tag_FI_FILE_INFO_DATA* record, void* bytes) {
-    for (const char* text : {record->szName, record->szPath, record->szShare, record->szParent, record->szOwner}) {
+    for (const char* text : {record->szName, record->szPath, record->szShare, record->szParent, record->szOwner})
         *static_cast<std::size_t*>(bytes) += std::string_view(text == nullptr ? "" : text).size();
-    }
     return 1;
 }
 

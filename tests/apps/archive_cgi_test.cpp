@@ -50,29 +50,17 @@ void pack(const std::string& path, const char* format, const char* filter, const
 }
 
 TEST_F(TaskCgi, HostileArchivesReachNothingOutside) {
-    const std::vector<Packed> members = {{"good/a", AE_IFREG, "1"},
-                                         {"/abs", AE_IFREG, "x"},
-                                         {"../up", AE_IFREG, "x"},
-                                         {"good/../../up", AE_IFREG, "x"},
-                                         {"good/out", AE_IFLNK, "/etc"},
-                                         {"good/up", AE_IFLNK, "../../x"},
-                                         {"good/in", AE_IFLNK, "../good/a"},
-                                         {"door", AE_IFLNK, "good"},
-                                         {"door/through", AE_IFREG, "x"},
-                                         {"planted/x", AE_IFREG, "x"},
-                                         {"good/a", AE_IFREG, "2"},
-                                         {"good/hard", AE_IFREG, "good/a", true},
-                                         {"good/stolen", AE_IFREG, "../../../etc/passwd", true},
-                                         {"good/stolen2", AE_IFREG, "planted/passwd", true},
-                                         {"device", AE_IFCHR, ""},
-                                         {"pipe", AE_IFIFO, ""},
-                                         {"good/\xFFraw", AE_IFREG, "3"},
-                                         {"@vexoea/x", AE_IFREG, "x"},
-                                         {"@tmp/x", AE_IFREG, "x"},
-                                         {"a:b", AE_IFREG, "x"},
-                                         {"./", AE_IFDIR, ""},
-                                         {"folder/", AE_IFDIR, ""},
-                                         {"last", AE_IFREG, "4"}};
+    const auto file = [](const char* name, const char* text) { return Packed{name, AE_IFREG, text}; };
+    const auto link = [](const char* name, const char* text) { return Packed{name, AE_IFLNK, text}; };
+    const auto further = [](const char* name, const char* text) { return Packed{name, AE_IFREG, text, true}; };
+    const auto other = [](const char* name, unsigned type) { return Packed{name, type, ""}; };
+    const auto members = listOf<Packed>(
+        file("good/a", "1"), file("/abs", "x"), file("../up", "x"), file("good/../../up", "x"),
+        link("good/out", "/etc"), link("good/up", "../../x"), link("good/in", "../good/a"), link("door", "good"),
+        file("door/through", "x"), file("planted/x", "x"), file("good/a", "2"), further("good/hard", "good/a"),
+        further("good/stolen", "../../../etc/passwd"), further("good/stolen2", "planted/passwd"),
+        other("device", AE_IFCHR), other("pipe", AE_IFIFO), file("good/\xFFraw", "3"), file("@vexoea/x", "x"),
+        file("@tmp/x", "x"), file("a:b", "x"), other("./", AE_IFDIR), other("folder/", AE_IFDIR), file("last", "4"));
     pack(video_ + "/h.tar.gz", "pax", "gzip", members);
     for (const char* folder : {"/t", "/t/@tmp"}) openFolder(photo_ + folder);
     fs::create_symlink("/etc", photo_ + "/t/planted");
@@ -133,9 +121,8 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
          {{"whole", AE_IFREG, "1"}, {"half", AE_IFREG, std::string(1 << 20, 'h')}});
     const std::string random = readFile(PROGRAM_OPERATION).substr(0, 300000);
     pack(video_ + "/cut.zip", "zip", nullptr, {{"first", AE_IFREG, "1"}, {"cut", AE_IFREG, random}});
-    for (const char* name : {"/torn.tar.xz", "/cut.zip"}) {
+    for (const char* name : {"/torn.tar.xz", "/cut.zip"})
         ASSERT_EQ(truncate((video_ + name).c_str(), static_cast<off_t>(fs::file_size(video_ + name) * 3 / 4)), 0);
-    }
     pack(video_ + "/secret.zip", "zip", nullptr, {{"hidden", AE_IFREG, "1"}, {"too", AE_IFREG, "2"}}, "p\xC3\xA9 +&");
     writeFile(video_ + "/none.zip", "no archive at all");
     writeFile(video_ + "/empty.zip", "");

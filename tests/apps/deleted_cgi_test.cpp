@@ -1,5 +1,4 @@
 // The recycle bins of all shares as one list, and what keeps them small.
-#include <json/reader.h>
 
 #include "apps/task_fixture.h"
 
@@ -43,9 +42,7 @@ class DeletedCgi : public TaskCgi {
         }
     }
     static std::string swept() {
-        const support::Finished finished = support::runProgram({ORVELCTL, "sweep", "--json"});
-        Json::Value report;
-        EXPECT_TRUE(Json::Reader().parse(finished.output, report)) << finished.output;
+        const Json::Value report = support::jsonOf(support::orvelctl({"sweep", "--json"}).output);
         for (const Json::Value& part : report["swept"]) {
             if (part["name"] == "recycle bins") return part["removed"].asString() + part["error"].asString();
         }

@@ -1,25 +1,16 @@
 // What the doctor says of an appliance in which one thing is not as it should be.
-#include <json/reader.h>
 
 #include "apps/orveld.h"
-#include "support/table.h"
+#include "support/testing.h"
 
 namespace {
 
 class Doctor : public ApplianceTest {
  protected:
-    void TearDown() override {
-        for (const char* made :
-             {"/etc/pam.d", "/etc/orvel", "/etc/fstab", "/etc/vexo/ddns.conf", "/var/lib/orvel-web"}) {
-            fs::remove_all(systemRoot() + made);
-        }
-        ApplianceTest::TearDown();
-    }
     // "severity|text" of each finding of a check.
     static std::string say(const std::string& check) {
-        const support::Finished finished = support::runProgram({ORVELCTL, "doctor", check, "--json"});
-        Json::Value report;
-        EXPECT_TRUE(Json::Reader().parse(finished.output, report)) << finished.output;
+        const support::Finished finished = support::orvelctl({"doctor", check, "--json"});
+        const Json::Value report = support::jsonOf(finished.output);
         EXPECT_EQ(finished.status, report["problems"].asInt() == 0 ? 0 : 1) << finished.output;
         std::string all;
         for (const Json::Value& finding : report["findings"]) {
@@ -71,15 +62,15 @@ TEST_F(Doctor, LooksAtMountsAndIndexes) {
     const std::string photo = shareRoot("photo");
     writeRootFile("/etc/vexo/shares.conf", "[photo]\npath = " + photo + "\nvexo:index = yes\n");
     expect("indexes", "problem", "[photo] has no index");
-    EXPECT_EQ(support::runProgram({ORVELCTL, "index", "build", "photo"}).status, 0);
+    EXPECT_EQ(support::orvelctl({"index", "build", "photo"}).status, 0);
     expect("indexes", "good", "entries, updated 0 minutes ago");
     expect("mounts", "good", "which holds files without a name");
     writeRootFile("/etc/fstab", "/dev/none " + photo + " ext4 defaults 0 0\n");
     expect("mounts", "problem", "which is not mounted");
     addMount(photo, "ext4", "ro");
     expect("mounts", "note", "on a read-only mount");
-    EXPECT_EQ(support::runProgram({ORVELCTL, "doctor", "kernel"}).status, 0);
-    EXPECT_EQ(support::runProgram({ORVELCTL, "doctor", "nonsense"}).status, 2);
+    EXPECT_EQ(support::orvelctl({"doctor", "kernel"}).status, 0);
+    EXPECT_EQ(support::orvelctl({"doctor", "nonsense"}).status, 2);
 }
 
 TEST_F(Doctor, HearsOrveld) {

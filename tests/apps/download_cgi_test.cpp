@@ -96,24 +96,17 @@ TEST_F(DownloadCgi, AFileComesWholeOrInPart) {
 }
 
 TEST_F(DownloadCgi, RefusalsShowInTheStatus) {
-    const std::string root = shareRoot("photo");
     addShare("preview", "read only = no\nvalid users = alice\nvexo:restriction = 4\n");
     writeFile(shareRoot("preview") + "/f", "secret", 0644);
-    writeFile(root + "/folder/f", "x", 0644);
-    writeFile(root + "/folder/@tmp/f", "x", 0644);
-    ASSERT_EQ(mkfifo((root + "/pipe").c_str(), 0666), 0);
-    fs::create_symlink("folder/f", root + "/inside");
-    fs::create_symlink("/etc/passwd", root + "/outside");
-    fs::create_symlink("/etc", root + "/etc");
-    fs::create_symlink("../" + fs::path(shareRoot("preview")).filename().string(), root + "/next");
-    for (const auto& [user, query, status, code] : Rows<std::string, std::string, int, int>{
-             row("", "path=/photo/folder/f", 401, 407), row("alice", "", 400, 400),
-             row("alice", "path_raw=/photo/%25zz", 400, 400), row("alice", "path=/photo/x", 404, 408),
-             row("alice", "path=/photo/folder/@tmp/f", 404, 408), row("alice", "path=/preview/f", 403, 407),
-             row("alice", "path=/preview", 403, 407), row("alice", "path=/photo/pipe", 403, 407),
-             row("alice", "path=/photo/outside", 403, 407), row("alice", "path=/photo/next/f", 403, 407),
-             row("alice", "path=/photo/folder/f&path=/photo/x", 404, 408),
-             row("alice", "path=/photo/folder/f&path=/photo/outside", 403, 407)}) {
+    writeFile(photo_ + "/folder/f", "x", 0644);
+    writeFile(photo_ + "/folder/@tmp/f", "x", 0644);
+    ASSERT_EQ(mkfifo((photo_ + "/pipe").c_str(), 0666), 0);
+    fs::create_symlink("folder/f", photo_ + "/inside");
+    fs::create_symlink("/etc/passwd", photo_ + "/outside");
+    fs::create_symlink("/etc", photo_ + "/etc");
+    fs::create_symlink("../" + fs::path(shareRoot("preview")).filename().string(), photo_ + "/next");
+    for (const auto& [user, query, status, code] :
+         rowsOf<std::string, std::string, int, int>("apps/refused_downloads")) {
         SCOPED_TRACE(query);
         const CgiReply reply(ask(user, query));
         EXPECT_EQ(reply.status, status);
@@ -126,15 +119,12 @@ TEST_F(DownloadCgi, RefusalsShowInTheStatus) {
 }
 
 TEST_F(DownloadCgi, FoldersAndSeveralPathsComeAsZip) {
-    const std::string root = shareRoot("photo");
-    makeFolder(root + "/sub/empty");
-    for (const char* name : {"/sub/ü.txt", "/sub/日本", "/sub/\xE9", "/sub/\xE8"}) {
-        writeFile(root + name, name, 0644);
-    }
-    writeFile(root + "/sub/@tmp/x", "hidden", 0644);
-    writeFile(root + "/other/sub/big", std::string(300000, 'z'), 0644);
-    fs::create_symlink("/etc/passwd", root + "/sub/link");
-    ASSERT_EQ(mkfifo((root + "/sub/pipe").c_str(), 0666), 0);
+    makeFolder(photo_ + "/sub/empty");
+    for (const char* name : {"/sub/ü.txt", "/sub/日本", "/sub/\xE9", "/sub/\xE8"}) writeFile(photo_ + name, name, 0644);
+    writeFile(photo_ + "/sub/@tmp/x", "hidden", 0644);
+    writeFile(photo_ + "/other/sub/big", std::string(300000, 'z'), 0644);
+    fs::create_symlink("/etc/passwd", photo_ + "/sub/link");
+    ASSERT_EQ(mkfifo((photo_ + "/sub/pipe").c_str(), 0666), 0);
 
     const Members sub = {{"sub/", ""},
                          {"sub/empty/", ""},
@@ -157,11 +147,10 @@ TEST_F(DownloadCgi, FoldersAndSeveralPathsComeAsZip) {
 
 TEST_F(DownloadCgi, AZipTellsWhatItLacks) {
     SKIP_WITHOUT_ROOT();
-    const std::string root = shareRoot("photo");
-    writeFile(root + "/sub/readable", "x", 0644);
-    writeFile(root + "/sub/closed.txt", "secret", 0600);
-    writeFile(root + "/sub/closed/inner", "secret", 0644);
-    chmod((root + "/sub/closed").c_str(), 0700);
+    writeFile(photo_ + "/sub/readable", "x", 0644);
+    writeFile(photo_ + "/sub/closed.txt", "secret", 0600);
+    writeFile(photo_ + "/sub/closed/inner", "secret", 0644);
+    chmod((photo_ + "/sub/closed").c_str(), 0700);
     const Members members = zip("path=/photo/sub");
     EXPECT_EQ(members.at("sub/readable"), "x");
     EXPECT_EQ(members.size(), 3U);
@@ -172,12 +161,11 @@ TEST_F(DownloadCgi, AZipTellsWhatItLacks) {
 }
 
 TEST_F(DownloadCgi, ManyPathsNeedFewDescriptorsAndEachComesOnce) {
-    const std::string root = shareRoot("photo");
     std::string list;
     Members all;
     for (int i = 0; i < 200; ++i) {
         const std::string path = "/" + std::to_string(i) + "/a.txt";
-        writeFile(root + path, path, 0644);
+        writeFile(photo_ + path, path, 0644);
         list += "&path=/photo" + path;
         all[i == 0 ? "a.txt" : "a (" + std::to_string(i + 1) + ").txt"] = path;
     }
@@ -199,12 +187,11 @@ TEST_F(DownloadCgi, ManyPathsNeedFewDescriptorsAndEachComesOnce) {
 }
 
 TEST_F(DownloadCgi, RowsOfAKeptListingComeAsTheyWereShown) {
-    const std::string root = shareRoot("photo");
-    for (const char* name : {"/a", "/b", "/c", "/d/e"}) writeFile(root + name, name, 0644);
+    for (const char* name : {"/a", "/b", "/c", "/d/e"}) writeFile(photo_ + name, name, 0644);
     const CgiReply kept = get(PROGRAM_LIST, "alice", "action=folder&keep=1&path=/photo");
     const std::string rows = "listing=" + kept.json["data"]["listing"].asString() + "&ranges=";
-    fs::remove(root + "/b");
-    writeFile(root + "/came later", "", 0644);
+    fs::remove(photo_ + "/b");
+    writeFile(photo_ + "/came later", "", 0644);
     const Members members = zip(rows + "0-3");
     EXPECT_EQ(members, (Members{{"a", "/a"},
                                 {"c", "/c"},

@@ -2,13 +2,11 @@
 #include <spawn.h>
 
 #include <fstream>
-#include <random>
 
 #include "apps/program.h"
 #include "index/folder_state.h"
 #include "index/share_files.h"
 #include "support/gate.h"
-#include "support/refuse_calls.h"
 #include "support/testing.h"
 #include "vexo/index.h"
 
@@ -32,10 +30,9 @@ TEST(FolderState, WhatTheTimesSay) {
         {{10, 10, 5}, {20, 21, 6}, false, FolderState::kReplaced},
         {{10, 10, 10}, {20, 20, 20}, false, FolderState::kChanged},  // no times of creation
     };
-    for (const auto& folder : cases) {
+    for (const auto& folder : cases)
         EXPECT_EQ(judgeFolder(folder.stored, folder.found, folder.parentChanged), folder.state)
             << folder.found.modified << ' ' << folder.found.changed << ' ' << folder.found.created;
-    }
     const std::pair<FolderTimes, bool> recent[] = {{{90, 98, 1}, false}, {{90, 99, 1}, true},   {{99, 90, 1}, true},
                                                    {{90, 102, 1}, true}, {{900, 90, 1}, false}, {{1, 900, 1}, false}};
     for (const auto& [times, unseen] : recent) EXPECT_EQ(mayChangeUnseen(times, 100), unseen) << times.changed;
@@ -45,23 +42,19 @@ class Index : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
-        root_ = addShare("photo", "read only = no\nvexo:index = yes\n");
-    }
-    static Finished run(const std::vector<std::string>& words) {
-        std::vector<std::string> all = {ORVELCTL};
-        all.insert(all.end(), words.begin(), words.end());
-        return runProgram(all);
+        SKIP_WITHOUT_ROOT();
+        addShare("photo", "read only = no\nvexo:index = yes\n");
     }
     static std::string update(const std::string& more = "") {
         std::vector<std::string> words = {"index", "update", "photo"};
         if (!more.empty()) words.push_back(more);
-        const Finished finished = run(words);
+        const Finished finished = orvelctl(words);
         EXPECT_EQ(finished.status, 0);
         return finished.output.substr(std::min(finished.output.find("compared"), finished.output.size()));
     }
     static std::string search() {
-        return run({"search", "/photo", "--user", "carol", "--name", "*", "--json", "--sort", "ppath", "--additional",
-                    "size,owner,perm,type"})
+        return orvelctl({"search", "/photo", "--user", "carol", "--name", "*", "--json", "--sort", "ppath",
+                         "--additional", "size,owner,perm,type"})
             .output;
     }
     // What the index says, and what a walk says.
@@ -72,8 +65,8 @@ class Index : public ApplianceTest {
         addShare("photo", "read only = no\nvexo:index = yes\n");
         EXPECT_EQ(indexed, walked) << when;
     }
-    void file(const std::string& path) { writeFile(root_ + path, path); }
-    void move(const std::string& from, const std::string& to) { fs::rename(root_ + from, root_ + to); }
+    void file(const std::string& path) { writeFile(photo_ + path, path); }
+    void move(const std::string& from, const std::string& to) { fs::rename(photo_ + from, photo_ + to); }
     // Starts the command and ends it with a signal when it is about to call `operation` for the `nth` time.
     static void broken(const std::vector<std::string>& words, int signal, const std::string& operation, int nth) {
         Gate gate(operation, systemRoot() + "/gate");
@@ -89,50 +82,47 @@ class Index : public ApplianceTest {
         kill(child, signal);
         waitpid(child, nullptr, 0);
     }
-    std::string root_;
 };
 
 TEST_F(Index, AnUpdateMakesWhatABuildWouldMake) {
-    SKIP_WITHOUT_ROOT();
     for (const std::string folder :
          {"/same", "/a", "/b", "/swap1", "/swap2", "/gone", "/kind", "/moved/from", "/in/*"}) {
         for (const std::string path : {"/sub/deep/f", "/sub/g", "/h"}) file(folder + path + folder.substr(1, 1));
     }
-    EXPECT_EQ(run({"index", "update", "photo"}).status, 1) << "no index yet";
-    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    EXPECT_EQ(orvelctl({"index", "update", "photo"}).status, 1) << "no index yet";
+    EXPECT_EQ(orvelctl({"index", "build", "photo"}).status, 0);
     expectTruth("built");
     EXPECT_EQ(update(), "compared 1; 0 entries added, 0 changed, 0 removed\n");
 
     file("/a/sub/new");
     file("/new/tree/of/files");
     file("/in/*/made/later");
-    fs::remove_all(root_ + "/gone");
-    fs::remove(root_ + "/b/hb");
+    fs::remove_all(photo_ + "/gone");
+    fs::remove(photo_ + "/b/hb");
     move("/b/sub", "/b/renamed_%");
     move("/swap1", "/swap");
     move("/swap2", "/swap1");
     move("/swap", "/swap2");
-    fs::remove_all(root_ + "/kind/sub");
+    fs::remove_all(photo_ + "/kind/sub");
     file("/kind/sub");
-    fs::remove(root_ + "/kind/hk");
+    fs::remove(photo_ + "/kind/hk");
     file("/kind/hk/now a folder");
     move("/moved/from/sub", "/moved/sub");
-    chmod((root_ + "/same/sub").c_str(), 0700);
-    fs::create_symlink("a", root_ + "/link");
+    chmod((photo_ + "/same/sub").c_str(), 0700);
+    fs::create_symlink("a", photo_ + "/link");
     EXPECT_NE(update().find(" added"), std::string::npos);
     expectTruth("updated");
     EXPECT_EQ(update(), "compared 1; 0 entries added, 0 changed, 0 removed\n");
 
-    writeFile(root_ + "/same/hs", "longer than it was");
+    writeFile(photo_ + "/same/hs", "longer than it was");
     EXPECT_EQ(update(), "compared 1; 0 entries added, 0 changed, 0 removed\n") << "its folder does not tell";
     EXPECT_NE(update("--full").find("0 entries added, 1 changed, 0 removed"), std::string::npos);
     expectTruth("compared in full");
 }
 
 TEST_F(Index, OneThatCannotBeUsedIsBuiltAnew) {
-    SKIP_WITHOUT_ROOT();
     file("/in/f");
-    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    EXPECT_EQ(orvelctl({"index", "build", "photo"}).status, 0);
     const std::string store = systemRoot() + "/var/lib/vexo/index/photo.db";
     const std::string good = readFile(store);
     std::string other = good;  // of a version that called a column otherwise
@@ -140,35 +130,34 @@ TEST_F(Index, OneThatCannotBeUsedIsBuiltAnew) {
     for (const std::string& bad : {other, std::string("text"), good.substr(0, 8192), std::string()}) {
         writeFile(store, bad, 0600);
         expectTruth("walked");
-        EXPECT_NE(run({"index", "update", "photo"}).output.find("is built anew"), std::string::npos) << bad.size();
+        EXPECT_NE(orvelctl({"index", "update", "photo"}).output.find("is built anew"), std::string::npos) << bad.size();
         EXPECT_EQ(update(), "compared 1; 0 entries added, 0 changed, 0 removed\n") << bad.size();
     }
 }
 
 TEST_F(Index, NetworkMountsStayOut) {
-    SKIP_WITHOUT_ROOT();
     file("/local/f");
     file("/nfs/far/f");
-    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    EXPECT_EQ(orvelctl({"index", "build", "photo"}).status, 0);
     EXPECT_NE(search().find("/photo/nfs/far/f"), std::string::npos);
-    addMount(root_ + "/nfs", "nfs");
+    addMount(photo_ + "/nfs", "nfs");
     EXPECT_NE(update().find(" 3 removed"), std::string::npos);
     EXPECT_EQ(search().find("nfs"), std::string::npos);
-    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    EXPECT_EQ(orvelctl({"index", "build", "photo"}).status, 0);
     EXPECT_EQ(search().find("nfs"), std::string::npos);
     EXPECT_NE(search().find("/photo/local/f"), std::string::npos);
-    addMount(root_, "cifs");
-    EXPECT_EQ(run({"index", "update", "photo"}).status, 1);
-    EXPECT_EQ(run({"index", "build", "photo"}).status, 1);
-    EXPECT_EQ(asUser(kAliceUid, kUsersGid, [] { return run({"index", "build", "photo"}).status; }), 1);
+    addMount(photo_, "cifs");
+    EXPECT_EQ(orvelctl({"index", "update", "photo"}).status, 1);
+    EXPECT_EQ(orvelctl({"index", "build", "photo"}).status, 1);
+    EXPECT_EQ(asUser(kAliceUid, kUsersGid, [] { return orvelctl({"index", "build", "photo"}).status; }), 1);
 }
 
 // A user may put a link where the indexer, as root, saw a folder a moment before.
 TEST_F(Index, NoLinkIsFollowed) {
     file("/in/deep/f");
-    fs::create_symlink("in", root_ + "/link");
+    fs::create_symlink("in", photo_ + "/link");
     int stop = 0;
-    const ShareFiles files(root_, &stop);
+    const ShareFiles files(photo_, &stop);
     for (const char* folder : {"", "in", "in/deep", "link", "link/deep"}) {
         const size_t expected = *folder == '\0' || *folder == 'i' ? 1 : 0;
         EXPECT_EQ(files.list(folder).size(), expected) << folder;
@@ -186,14 +175,13 @@ TEST_F(Index, NoLinkIsFollowed) {
 
 // An index that was built before holds names that are kept out now.
 TEST_F(Index, NamesThatAreKeptOutAreNotFound) {
-    SKIP_WITHOUT_ROOT();
     file("/a/x.no");
     file("/a/y");
-    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    EXPECT_EQ(orvelctl({"index", "build", "photo"}).status, 0);
     EXPECT_NE(search().find("x.no"), std::string::npos);
     addShare("photo", "read only = no\nvexo:index = yes\nveto files = /*.NO/\n");
     EXPECT_EQ(search().find("x.no"), std::string::npos);
-    EXPECT_EQ(run({"index", "update", "photo"}).status, 0);
+    EXPECT_EQ(orvelctl({"index", "update", "photo"}).status, 0);
     const std::string found = search();
     EXPECT_EQ(found.find("x.no"), std::string::npos);
     EXPECT_NE(found.find("/photo/a/y"), std::string::npos);
@@ -202,7 +190,7 @@ TEST_F(Index, NamesThatAreKeptOutAreNotFound) {
 TEST_F(Index, OnlyWhatIsGoneIsPassedOver) {
     file("/in/f");
     int stop = 0;
-    const ShareFiles files(root_, &stop);
+    const ShareFiles files(photo_, &stop);
     for (const int error : {ENOENT, ENOTDIR, EACCES, EIO}) {
         vexo::gate::fail("VLIBCFileLStatAt", VEXO_ERR_GENERAL, error);
         if (error == ENOENT || error == ENOTDIR) {
@@ -215,9 +203,8 @@ TEST_F(Index, OnlyWhatIsGoneIsPassedOver) {
 }
 
 TEST_F(Index, WorkThatIsBrokenOffLosesNothing) {
-    SKIP_WITHOUT_ROOT();
     file("/before");
-    EXPECT_EQ(run({"index", "build", "photo"}).status, 0);
+    EXPECT_EQ(orvelctl({"index", "build", "photo"}).status, 0);
     const std::string before = search();
     for (const char* folder : {"/1", "/2", "/3", "/4"}) {
         for (const char* name : {"/a/f", "/a/g", "/b/f"}) file(std::string(folder) + name);
@@ -239,16 +226,16 @@ TEST_F(Index, WorkThatIsBrokenOffLosesNothing) {
                          {SIGKILL, "FILEIDXIndexEnd", 1, "/4/a"}};
     for (const auto& [signal, operation, nth, gone] : updates) {
         broken({"index", "update", "photo"}, signal, operation, nth);
-        fs::remove_all(root_ + gone);
+        fs::remove_all(photo_ + gone);
     }
     update();
     expectTruth("after updates that were killed");
-    fs::rename(root_, root_ + "-away");
-    EXPECT_EQ(run({"index", "update", "photo"}).status, 1) << "a volume that is not there has lost nothing";
-    fs::rename(root_ + "-away", root_);
+    fs::rename(photo_, photo_ + "-away");
+    EXPECT_EQ(orvelctl({"index", "update", "photo"}).status, 1) << "a volume that is not there has lost nothing";
+    fs::rename(photo_ + "-away", photo_);
     expectTruth("there again");
-    EXPECT_EQ(run({"index", "drop", "photo"}).status, 0);
-    EXPECT_EQ(run({"index", "status", "photo"}).status, 1);
+    EXPECT_EQ(orvelctl({"index", "drop", "photo"}).status, 0);
+    EXPECT_EQ(orvelctl({"index", "status", "photo"}).status, 1);
 }
 
 class WatchedIndex : public Index {
@@ -290,7 +277,6 @@ class WatchedIndex : public Index {
 };
 
 TEST_F(WatchedIndex, WhateverChangesIsFound) {
-    SKIP_WITHOUT_ROOT();
     for (const std::string folder : {"/a", "/b", "/in/deep", "/swap1", "/swap2", "/gone"}) {
         for (const std::string path : {"/sub/f", "/g"}) file(folder + path + folder.substr(1, 1));
     }
@@ -298,22 +284,22 @@ TEST_F(WatchedIndex, WhateverChangesIsFound) {
     writeFile(outside + "/tree/x/y", "");
     watchUntilLive();  // builds it as well
     expectTruthSoon("at its start");
-    EXPECT_EQ(run({"index", "update", "photo"}).status, 1) << "one writer at a time";
+    EXPECT_EQ(orvelctl({"index", "update", "photo"}).status, 1) << "one writer at a time";
 
     file("/new/tree/of/files");
     file("/a/sub/new");
-    writeFile(root_ + "/a/ga", "longer than it was");
-    fs::remove_all(root_ + "/gone");
+    writeFile(photo_ + "/a/ga", "longer than it was");
+    fs::remove_all(photo_ + "/gone");
     move("/b/sub", "/b/renamed");
     move("/swap1", "/swap");
     move("/swap2", "/swap1");
     move("/swap", "/swap2");
     move("/in/deep", "/a/deep");
-    fs::rename(outside + "/tree", root_ + "/tree");
-    fs::rename(root_ + "/in", outside + "/in");
-    chmod((root_ + "/a/sub").c_str(), 0700);
-    EXPECT_EQ(chown((root_ + "/b/gb").c_str(), kAliceUid, kUsersGid), 0);
-    fs::create_symlink("a", root_ + "/link");
+    fs::rename(outside + "/tree", photo_ + "/tree");
+    fs::rename(photo_ + "/in", outside + "/in");
+    chmod((photo_ + "/a/sub").c_str(), 0700);
+    EXPECT_EQ(chown((photo_ + "/b/gb").c_str(), kAliceUid, kUsersGid), 0);
+    fs::create_symlink("a", photo_ + "/link");
     file("/@eaDir/hidden/f");
     for (int i = 0; i < 300; ++i) file("/many/" + std::to_string(i));
     expectTruthSoon("after changes");
@@ -322,16 +308,16 @@ TEST_F(WatchedIndex, WhateverChangesIsFound) {
     end(SIGKILL);
     EXPECT_FALSE(isLive());
     file("/while/nobody/watched");
-    fs::remove(root_ + "/many/7");
+    fs::remove(photo_ + "/many/7");
     watchUntilLive();
     expectTruthSoon("watched again");
-    fs::rename(root_, root_ + "-away");
-    fs::create_directory(root_);
+    fs::rename(photo_, photo_ + "-away");
+    fs::create_directory(photo_);
     file("/another");
     EXPECT_TRUE(waitUntil("the watcher's end", [] { return !isLive(); })) << "its folder is another one";
     EXPECT_NE(end(SIGTERM), 0);
-    fs::remove_all(root_);
-    fs::rename(root_ + "-away", root_);
+    fs::remove_all(photo_);
+    fs::rename(photo_ + "-away", photo_);
     watchUntilLive();
     expectTruthSoon("there again");
     EXPECT_EQ(end(SIGTERM), 0);
@@ -340,7 +326,6 @@ TEST_F(WatchedIndex, WhateverChangesIsFound) {
 
 // Where the kernel reports nothing.
 TEST_F(WatchedIndex, WithoutEventsItIsUpdatedNowAndThen) {
-    SKIP_WITHOUT_ROOT();
     file("/f");
     watch({{SYS_fanotify_init, EPERM}});
     for (const char* name : {"/g", "/h/i"}) {
@@ -388,7 +373,6 @@ void changeAtRandom(const std::string& root, unsigned seed, int steps) {
 }
 
 TEST_F(WatchedIndex, ManyAtOnceChangeAtRandom) {
-    SKIP_WITHOUT_ROOT();
     const bool isLong = getenv("ORVEL_TEST_LONG") != nullptr;
     for (unsigned seed = 1; seed <= (isLong ? 20 : 2); ++seed) {
         watchUntilLive();
@@ -396,7 +380,7 @@ TEST_F(WatchedIndex, ManyAtOnceChangeAtRandom) {
         for (unsigned i = 0; i < 8; ++i) {
             children.push_back(fork());
             if (children.back() == 0) {
-                changeAtRandom(root_, seed * 100 + i, isLong ? 5000 : 100);
+                changeAtRandom(photo_, seed * 100 + i, isLong ? 5000 : 100);
                 _exit(0);
             }
         }

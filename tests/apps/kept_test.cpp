@@ -1,11 +1,10 @@
 // The parts of kept listings: ranges of rows, the file, the natural order.
 #include <fstream>
-#include <random>
 
 #include "kept_file.h"
 #include "natural_order.h"
 #include "row_ranges.h"
-#include "support/table.h"
+#include "support/testing.h"
 
 namespace {
 

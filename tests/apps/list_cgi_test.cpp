@@ -70,9 +70,8 @@ TEST_F(ListCgi, WhatAPageNeedsBesideComesInTheSameReply) {
 TEST_F(ListCgi, RefusalsSayWhy) {
     addShare("music", "read only = no\nvalid users = alice\ninvalid users = bob\n");
     addShare("sealed", "read only = no\nvalid users = bob\nvexo:restriction = 1\n");
-    const std::string root = shareRoot("photo");
-    writeFile(root + "/file.txt", "x", 0644);
-    addMount(root + "/dead", "nfs");
+    writeFile(photo_ + "/file.txt", "x", 0644);
+    addMount(photo_ + "/dead", "nfs");
     for (const auto& [path, code] : Rows<std::string, int>{
              row("/sealed", 407), row("/", 407), row("/photo/missing", 408), row("/photo/file.txt/below", 408),
              row("photo", 401), row("", 400), row("/photo/" + std::string(5000, 'x'), 402), row("/photo/../photo", 407),
@@ -98,26 +97,17 @@ TEST_F(ListCgi, ParametersAreTakenStrictly) {
     std::string patterns = "a";
     for (int i = 1; i < 100; ++i) patterns += ",a";
     for (const auto& [pattern, code] : Rows<std::string, int>{
-             {patterns, 0}, {patterns + ",a", 400}, {std::string(491, 'a'), 400}, {"a,,", 0}, {" ", 400}}) {
+             {patterns, 0}, {patterns + ",a", 400}, {std::string(491, 'a'), 400}, {"a,,", 0}, {" ", 400}})
         EXPECT_EQ(folder("alice", "/photo", "&pattern=" + pattern).json["error"]["code"].asInt(), code);
-    }
 }
 
 TEST_F(ListCgi, APageIsSortedCountedAndFiltered) {
-    const std::string root = shareRoot("photo");
-    makeFolder(root + "/b-folder");
-    makeFolder(root + "/a-folder");
-    for (const char* name : {"one.jpg", "three.jpg", "seven.png"}) {
-        writeFile(root + "/" + name, std::string(std::string(name).size(), 'x'));
-    }
-    writeFile(root + "/ten.jpg", std::string(10, 'x'));
-    for (const auto& [parameters, expected, total] : Rows<const char*, Names, int>{
-             {"", {"a-folder", "b-folder", "one.jpg", "seven.png", "ten.jpg", "three.jpg"}, 6},
-             {"&sort_by=size&sort_direction=desc&offset=3&limit=2", {"one.jpg", "b-folder"}, 6},
-             {"&pattern=SEVEN,t?n*", {"seven.png", "ten.jpg"}, 2},
-             {"&filetype=dir", {"a-folder", "b-folder"}, 2},
-             {"&filetype=file&pattern=o", {"one.jpg"}, 1},
-         }) {
+    makeFolder(photo_ + "/b-folder");
+    makeFolder(photo_ + "/a-folder");
+    for (const char* name : {"one.jpg", "three.jpg", "seven.png"})
+        writeFile(photo_ + "/" + name, std::string(std::string(name).size(), 'x'));
+    writeFile(photo_ + "/ten.jpg", std::string(10, 'x'));
+    for (const auto& [parameters, expected, total] : rowsOf<const char*, Names, int>("apps/pages")) {
         const CgiReply reply = folder("alice", "/photo/", parameters);
         EXPECT_EQ(names(reply), expected) << parameters;
         EXPECT_EQ(reply.json["data"]["total"], total) << parameters;
@@ -130,17 +120,16 @@ TEST_F(ListCgi, APageIsSortedCountedAndFiltered) {
                "&limit=1&offset=2&additional=real_path,size,owner,time,perm,type,mount_point_type,new,icon");
     const Json::Value item = full.json["data"]["items"][0]["additional"];
     EXPECT_EQ(item.getMemberNames(), (Names{"mount_point_type", "owner", "perm", "real_path", "size", "time", "type"}));
-    EXPECT_EQ(item["real_path"], root + "/one.jpg");
+    EXPECT_EQ(item["real_path"], photo_ + "/one.jpg");
     EXPECT_EQ(full.json["data"]["items"][0]["icon"], "jpg.png") << "as the page has them";
     EXPECT_EQ(item["size"], 7.0);
 }
 
 TEST_F(ListCgi, NamesOfAnyBytesTravelAndComeBack) {
-    const std::string root = shareRoot("photo");
-    makeFolder(root + "/\xE9t\xE9", 0777);
+    makeFolder(photo_ + "/\xE9t\xE9", 0777);
     const std::string markup = "<b>\"\\\n\x7F\u202E.txt";
-    writeFile(root + "/\xE9t\xE9/dedans\xFF.txt", "x");
-    writeFile(root + "/\xE9t\xE9/" + markup, "x");
+    writeFile(photo_ + "/\xE9t\xE9/dedans\xFF.txt", "x");
+    writeFile(photo_ + "/\xE9t\xE9/" + markup, "x");
 
     const CgiReply outer = folder("alice", "/photo", "&additional=real_path,size,type");
     const Json::Value item = outer.json["data"]["items"][0];
@@ -160,24 +149,22 @@ TEST_F(ListCgi, NamesOfAnyBytesTravelAndComeBack) {
 }
 
 TEST_F(ListCgi, NothingLeadsOutOfAShare) {
-    const std::string root = shareRoot("photo");
-    makeFolder(root + "/folder/deep");
-    writeFile(root + "/folder/inside.txt", "x");
+    makeFolder(photo_ + "/folder/deep");
+    writeFile(photo_ + "/folder/inside.txt", "x");
     const std::string outside = addShare("other", "");
     writeFile(outside + "/secret.txt", "x");
-    fs::create_symlink("folder", root + "/inside");
-    fs::create_symlink("../folder/../inside", root + "/folder/around");
-    fs::create_symlink(outside, root + "/absolute");
-    fs::create_symlink("../" + fs::path(outside).filename().string(), root + "/relative");
-    fs::create_symlink("/proc/self/root", root + "/magic");
+    fs::create_symlink("folder", photo_ + "/inside");
+    fs::create_symlink("../folder/../inside", photo_ + "/folder/around");
+    fs::create_symlink(outside, photo_ + "/absolute");
+    fs::create_symlink("../" + fs::path(outside).filename().string(), photo_ + "/relative");
+    fs::create_symlink("/proc/self/root", photo_ + "/magic");
     for (const char* path : {"/photo/absolute", "/photo/relative", "/photo/magic/tmp", "/photo/folder/../../other",
-                             "/photo/folder/around/../../..", "/home/../bob"}) {
+                             "/photo/folder/around/../../..", "/home/../bob"})
         EXPECT_EQ(folder("alice", path).json["error"]["code"], 407) << path;
-    }
     for (const char* path : {"/photo/inside", "/photo/folder/around", "/photo/folder/deep/..", "//photo//./folder"}) {
         const CgiReply reply = folder("alice", path, "&filetype=file&additional=real_path");
         EXPECT_EQ(names(reply), Names{"inside.txt"}) << path;
-        EXPECT_EQ(reply.json["data"]["items"][0]["additional"]["real_path"], root + "/folder/inside.txt") << path;
+        EXPECT_EQ(reply.json["data"]["items"][0]["additional"]["real_path"], photo_ + "/folder/inside.txt") << path;
     }
 
     setSetting("link_policy_photo", "none");
@@ -188,15 +175,14 @@ TEST_F(ListCgi, NothingLeadsOutOfAShare) {
 
 TEST_F(ListCgi, TheKernelJudgesAsTheUser) {
     SKIP_WITHOUT_ROOT();
-    const std::string root = shareRoot("photo");
-    makeFolder(root + "/private", 0700);
-    ASSERT_EQ(chown((root + "/private").c_str(), kAliceUid, kUsersGid), 0);
+    makeFolder(photo_ + "/private", 0700);
+    ASSERT_EQ(chown((photo_ + "/private").c_str(), kAliceUid, kUsersGid), 0);
     addShare("photo", "read only = no\nvalid users = alice, bob, carol\n");
     EXPECT_TRUE(folder("alice", "/photo/private").json["success"].asBool());
     EXPECT_EQ(folder("bob", "/photo/private").json["error"]["code"], 407);
     EXPECT_TRUE(folder("carol", "/photo/private").json["success"].asBool()) << "an administrator";
     // Root's own groups must not help, nor his permissions below a folder that can be entered.
-    makeFolder(root + "/root's", 0750);
+    makeFolder(photo_ + "/root's", 0750);
     EXPECT_EQ(folder("alice", "/photo/root's").json["error"]["code"], 407);
 }
 

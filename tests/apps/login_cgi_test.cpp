@@ -6,8 +6,6 @@
 #include <future>
 
 #include "apps/cgi_test.h"
-#include "base/descriptor.h"
-#include "base/hex.h"
 #include "platform/private_mounts.h"
 
 namespace {
@@ -15,15 +13,6 @@ namespace {
 std::string hashed(const std::string& password) {
     crypt_data data = {};
     return crypt_r(password.c_str(), "$5$rounds=1000$saltsalt$", &data);
-}
-
-std::string encoded(const std::string& bytes) {
-    std::string text;
-    for (const char byte : bytes) {
-        text += '%';
-        orvel::appendHex(byte, text);
-    }
-    return text;
 }
 
 // A browser: it keeps the cookies that it gets.
@@ -48,9 +37,9 @@ class Browser {
         return CgiReply(finished.output);
     }
     CgiReply logIn(const std::string& user, const std::string& password, const Variables& more = {}) {
-        return ask("login", "action=begin&user=" + encoded(user) + "&password=" + encoded(password), more);
+        return ask("login", "action=begin&user=" + percentEncode(user) + "&password=" + percentEncode(password), more);
     }
-    CgiReply answer(const std::string& text) { return ask("login", "action=answer&text=" + encoded(text)); }
+    CgiReply answer(const std::string& text) { return ask("login", "action=answer&text=" + percentEncode(text)); }
     std::string user() { return ask("login", "").json["data"]["user"].asString(); }
     std::map<std::string, std::string>& jar() { return jar_; }
 
@@ -76,11 +65,7 @@ class Browser {
     std::map<std::string, std::string> jar_;
 };
 
-int codeOf(const CgiReply& reply) {
-    return reply.json["error"]["code"].asInt();
-}
-
-class LogInCgi : public support::ApplianceTest {
+class LogInCgi : public support::CgiTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
@@ -106,23 +91,12 @@ class LogInCgi : public support::ApplianceTest {
 
 TEST_F(LogInCgi, OneReplyForAllThatIsWrongAndOneSessionForWhatIsRight) {
     const std::string longName(4096, 'a');
-    std::vector<std::pair<std::string, std::string>> wrong = {{"alice", "wrong"},
-                                                              {"alice", ""},
-                                                              {"alice", std::string(72, 'x')},
-                                                              {"alice", "right\xFF\xFE"},
-                                                              {"nobody-here", "right"},
-                                                              {"root", "right"},
-                                                              {"daemon", "right"},
-                                                              {"", "right"},
-                                                              {"alice ", "right"},
-                                                              {"alice\nroot", "right"},
-                                                              {std::string("alice\0", 6), "right"},
-                                                              {std::string("alice\0root", 10), "right"},
-                                                              {longName, "right"},
-                                                              {"../alice", "right"},
-                                                              {"alice", std::string(4096, 'x')},
-                                                              {"alice", std::string(5000, 'x')},
-                                                              {"bob", "wrong"}};
+    const auto wrong = listOf<std::tuple<std::string, std::string>>(
+        row("alice", "wrong"), row("alice", ""), row("alice", std::string(72, 'x')), row("alice", "right\xFF\xFE"),
+        row("nobody-here", "right"), row("root", "right"), row("daemon", "right"), row("", "right"),
+        row("alice ", "right"), row("alice\nroot", "right"), row(std::string("alice\0", 6), "right"),
+        row(std::string("alice\0root", 10), "right"), row(longName, "right"), row("../alice", "right"),
+        row("alice", std::string(4096, 'x')), row("alice", std::string(5000, 'x')), row("bob", "wrong"));
     std::vector<std::future<std::string>> replies;
     for (size_t i = 0; i < wrong.size(); ++i) {
         const auto& [user, password] = wrong[i];
@@ -131,14 +105,13 @@ TEST_F(LogInCgi, OneReplyForAllThatIsWrongAndOneSessionForWhatIsRight) {
             return std::to_string(reply.status) + reply.body;
         }));
     }
-    for (auto& reply : replies) {
+    for (auto& reply : replies)
         EXPECT_EQ(reply.get(),
                   "403{\"error\":{\"code\":2001,\"key\":\"login_wrong\",\"path\":\"\"},\"success\":false}");
-    }
     Browser browser;
     EXPECT_EQ(browser.ask("login", "action=begin&user=alice&password=" + std::string(1000000, 'x')).status, 413);
-    EXPECT_EQ(codeOf(browser.logIn("bob", "right")), 2003);
-    EXPECT_EQ(codeOf(browser.logIn("carol", "right")), 2002);
+    EXPECT_EQ(code(browser.logIn("bob", "right")), 2003);
+    EXPECT_EQ(code(browser.logIn("carol", "right")), 2002);
     EXPECT_EQ(browser.user(), "");
     EXPECT_FALSE(fs::exists(sessions()));
     const CgiReply done = browser.logIn("alice", "right");
@@ -186,7 +159,7 @@ TEST_F(LogInCgi, ALogInHasANewIdentifierAndALogOutReallyEndsIt) {
     EXPECT_NE(first, std::string(32, 'a'));
     ASSERT_EQ(browser.logIn("alice", "right").status, 200);
     EXPECT_FALSE(fs::exists(sessions() + "/" + first)) << "the former session ends";
-    EXPECT_EQ(codeOf(browser.logIn("alice", "wrong")), 2001);
+    EXPECT_EQ(code(browser.logIn("alice", "wrong")), 2001);
     EXPECT_EQ(browser.user(), "alice") << "a failure ends none";
 
     Browser other("198.51.100.4", {{"HTTP_USER_AGENT", "Some\tBrowser/1 " + std::string(300, 'x')}});
@@ -244,25 +217,25 @@ TEST_F(LogInCgi, OtherSitesAndOtherBrowsersAreNotHeard) {
     const CgiReply asked = begun.ask("login", "action=begin&user=alice");
     EXPECT_EQ(asked.json["data"]["step"], "ask");
     EXPECT_TRUE(asked.json["data"]["hidden"].asBool());
-    EXPECT_EQ(codeOf(Browser().answer("right")), 2006);
+    EXPECT_EQ(code(Browser().answer("right")), 2006);
     Browser elsewhere("198.51.100.4");
     elsewhere.jar() = begun.jar();
-    EXPECT_EQ(codeOf(elsewhere.answer("right")), 2006);
+    EXPECT_EQ(code(elsewhere.answer("right")), 2006);
     Browser second, third;
     EXPECT_EQ(second.ask("login", "action=begin&user=alice").status, 200);
     const CgiReply busy = third.ask("login", "action=begin&user=alice");
-    EXPECT_EQ(codeOf(busy), 2005);
+    EXPECT_EQ(code(busy), 2005);
     EXPECT_NE(RawReply(busy).headers["Retry-After"], "");
     EXPECT_EQ(second.ask("login", "action=cancel").status, 200);
     EXPECT_EQ(third.ask("login", "action=begin&user=alice").status, 200);
     EXPECT_EQ(begun.answer("right").json["data"]["user"], "alice");
-    EXPECT_EQ(codeOf(begun.answer("right")), 2006);
+    EXPECT_EQ(code(begun.answer("right")), 2006);
     for (const char* form : {"action=other", "user=alice", "action="}) EXPECT_EQ(begun.ask("login", form).status, 400);
     EXPECT_EQ(begun.ask("login", "", {{"QUERY_STRING", "action=begin&user=alice"}}).status, 400) << "not posted";
 }
 
 // A machine of the test's own: its users, its PAM service, its log; `body` runs there.
-class PamCgi : public support::ApplianceTest {
+class PamCgi : public support::CgiTest {
  protected:
     static std::string field(const char* days) { return hashed("right") + ":" + days + ":0:99999:7:::\n"; }
     static int onMachine(const std::function<void(const std::function<void(const std::string&)>&)>& body) {
@@ -276,9 +249,8 @@ class PamCgi : public support::ApplianceTest {
                                      MS_BIND, nullptr) == 0;
             }
             made = made && mount(dev.c_str(), "/dev", nullptr, MS_BIND | MS_REC, nullptr) == 0;
-            for (const char* folder : {"/etc", "/run", "/var/lib"}) {
+            for (const char* folder : {"/etc", "/run", "/var/lib"})
                 made = made && mount("none", folder, "tmpfs", 0, nullptr) == 0;
-            }
             if (!made) return support::kNoPrivateMounts;
             writeFile("/etc/passwd",
                       "root:x:0:0::/root:/bin/sh\nalice:x:20001:20100::/:/bin/false\nbob:x:20002:20100::/:/bin/false\n"
@@ -310,13 +282,12 @@ const std::string kTold = std::string(" required ") + PAM_TOLD + " ";
 TEST_F(PamCgi, TheMachinesOwnUsersLogInWithTheirPasswords) {
     SKIP_WITHOUT_ROOT();
     EXPECT_WITH_PRIVATE_MOUNTS(onMachine([](const auto& serve) {
-        EXPECT_EQ(codeOf(browser().logIn("alice", "right")), 2008) << "no service";
+        EXPECT_EQ(code(browser().logIn("alice", "right")), 2008) << "no service";
         serve(kUnix);
         EXPECT_EQ(browser().logIn("alice", "right").json["data"]["user"], "alice");
         for (const auto& [user, password] : support::Rows<const char*, const char*>{
-                 {"alice", "wrong"}, {"root", "right"}, {"nobody-here", "x"}, {"carol", "right"}}) {
-            EXPECT_EQ(codeOf(browser("198.51.100.9").logIn(user, password)), 2001) << user;
-        }
+                 {"alice", "wrong"}, {"root", "right"}, {"nobody-here", "x"}, {"carol", "right"}})
+            EXPECT_EQ(code(browser("198.51.100.9").logIn(user, password)), 2001) << user;
         // A password that must be changed: the reason, the old one, and the new one twice.
         Browser bob = browser();
         CgiReply step = bob.logIn("bob", "right");
@@ -339,10 +310,8 @@ TEST_F(PamCgi, WhomSambaHasDisabledIsRefused) {
         serve(kUnix);
         makeFolder("/run/samba");
         std::string config = "[global]\npassdb backend = tdbsam\nlog file = /run/samba/log\n";
-        for (const char* key :
-             {"private dir", "lock directory", "state directory", "cache directory", "pid directory"}) {
+        for (const char* key : {"private dir", "lock directory", "state directory", "cache directory", "pid directory"})
             config += std::string(key) + " = /run/samba\n";
-        }
         writeFile("/etc/samba/smb.conf", config);
         const auto change = [](std::vector<std::string> words) {
             words.insert(words.begin(), {"/usr/bin/timeout", "60", "/usr/bin/smbpasswd"});
@@ -352,8 +321,8 @@ TEST_F(PamCgi, WhomSambaHasDisabledIsRefused) {
         change({"-a", "-s", "alice"});
         EXPECT_EQ(browser().logIn("alice", "right").status, 200);
         change({"-d", "alice"});
-        EXPECT_EQ(codeOf(browser().logIn("alice", "right")), 2003);
-        EXPECT_EQ(codeOf(browser("198.51.100.9").logIn("alice", "wrong")), 2001) << "nobody else learns of it";
+        EXPECT_EQ(code(browser().logIn("alice", "right")), 2003);
+        EXPECT_EQ(code(browser("198.51.100.9").logIn("alice", "wrong")), 2001) << "nobody else learns of it";
         change({"-e", "alice"});
         EXPECT_EQ(browser().logIn("alice", "right").status, 200);
         change({"-x", "alice"});
@@ -366,7 +335,7 @@ TEST_F(PamCgi, WhateverAStackDoesAnAnswerComesAndNothingIsLeft) {
     EXPECT_WITH_PRIVATE_MOUNTS(onMachine([](const auto& serve) {
         const auto refusal = [&](const std::string& stack, const Variables& more = {}) {
             serve(stack);
-            return codeOf(browser("198.51.100.8", more).logIn("alice", "right"));
+            return code(browser("198.51.100.8", more).logIn("alice", "right"));
         };
         // A one-time code behind the password, shown and with a message; PAM says who it is, and from where.
         serve("auth" + kTold + "ask=Password: want=right say=Code[sent] [show=One-time code: ] want=123456 user=bob\n" +
@@ -404,7 +373,7 @@ TEST_F(PamCgi, WhateverAStackDoesAnAnswerComesAndNothingIsLeft) {
         Browser endless = browser();
         step = endless.logIn("alice", "x");
         for (int i = 0; i < 16 && step.status == 200; ++i) step = endless.answer("x");
-        EXPECT_EQ(codeOf(step), 2008) << "no stack asks without an end";
+        EXPECT_EQ(code(step), 2008) << "no stack asks without an end";
         EXPECT_EQ(std::distance(fs::directory_iterator("/run/vexo/logins"), {}), 1) << "only the lock is left";
     }));
 }
@@ -427,7 +396,7 @@ TEST_F(PamCgi, EveryLogInIsALineThatThePackagedFilterReads) {
         browser("192.0.2.7").logIn("bob\" from 203.0.113.5 refused (wrong): \"x", "wrong");
         browser("192.0.2.7").logIn("al\nice", "wrong");
         const CgiReply blocked = browser("192.0.2.7").logIn("alice", "right");
-        EXPECT_EQ(codeOf(blocked), 2004);
+        EXPECT_EQ(code(blocked), 2004);
         EXPECT_GT(blocked.json["data"]["wait"].asInt(), 80000);
         browser("2001:db8::1").logIn("alice", "wrong");
 
@@ -448,9 +417,8 @@ TEST_F(PamCgi, EveryLogInIsALineThatThePackagedFilterReads) {
     for (const char* part :
          {"log-in from 203.0.113.5 accepted: \"alice\"", "log-out from 203.0.113.5 (1 ended): \"alice\"",
           "log-in from 192.0.2.7 refused (wrong): \"al\\x0Aice\"",
-          "log-in from 192.0.2.7 refused (blocked): \"alice\""}) {
+          "log-in from 192.0.2.7 refused (blocked): \"alice\""})
         EXPECT_NE(lines.find(part), std::string::npos) << part << "\n" << lines;
-    }
     const std::string tool = "/usr/bin/fail2ban-regex";
     if (access(tool.c_str(), X_OK) != 0) GTEST_SKIP() << "needs fail2ban";
     const support::Finished found = support::runProgram({tool, "--out", "ip", log, FAIL2BAN_FILTER});

@@ -1,6 +1,5 @@
 // The program operation, run as a web server runs it.
 #include "apps/cgi_test.h"
-#include "support/table.h"
 
 namespace {
 
@@ -53,46 +52,36 @@ TEST_F(OperationCgi, FoldersAreMadeAsTheUser) {
 
 TEST_F(OperationCgi, RenamingReplacesNothing) {
     SKIP_WITHOUT_ROOT();
-    const std::string root = shareRoot("photo");
     const std::string fat = addShare("usb", "read only = no\n");
     addShare("archive", "read only = no\nvexo:restriction = 2\n");
     addMount(fat, "vfat");
-    makeFolder(root + "/folder", 0777);
-    makeFolder(root + "/folder/empty", 0777);
-    makeFolder(root + "/root's", 0755);
+    makeFolder(photo_ + "/folder", 0777);
+    makeFolder(photo_ + "/folder/empty", 0777);
+    makeFolder(photo_ + "/root's", 0755);
     for (const std::string file : {"/one", "/two", "/root's/f", "/folder/f", "/hidden/@tmp/x"})
-        writeFile(root + file, file);
+        writeFile(photo_ + file, file);
     writeFile(fat + "/f", "x");
     writeFile(shareRoot("archive") + "/f", "x");
-    fs::create_symlink("folder", root + "/inside");
-    fs::create_symlink("/etc", root + "/outside");
-    for (const auto& [path, name, expected] : Rows<std::string, std::string, int>{
-             row("/photo/one", "two", 414), row("/photo/folder", "one", 414), row("/photo/one", "one", 0),
-             row("/photo/folder", "folder", 0), row("/photo/one", "", 400), row("/photo", "x", 400),
-             row("/photo/one", "folder/one", 418), row("/photo/one", "@tmp", 418), row("/photo/folder/..", "x", 418),
-             row("/photo/hidden/@tmp/x", "y", 408), row("/photo/hidden/@tmp", "y", 408),
-             row("/photo/missing", "x", 408), row("/photo/root's/f", "x", 407), row("/photo/outside/passwd", "x", 407),
-             row("/archive/f", "x", 407), row("/usb/f", "a?", 419), row("/photo/inside/f", "g\nh", 0),
-             row("/photo/outside", "link", 0), row("/photo/one", "ONE", 0)}) {
+    fs::create_symlink("folder", photo_ + "/inside");
+    fs::create_symlink("/etc", photo_ + "/outside");
+    for (const auto& [path, name, expected] : rowsOf<std::string, std::string, int>("apps/renamings"))
         EXPECT_EQ(rename("alice", path, name), expected) << path << " to " << name;
-    }
     EXPECT_EQ(rename("bob", "/photo/two", "x"), 407);
-    EXPECT_EQ(readFile(root + "/ONE"), "/one");
+    EXPECT_EQ(readFile(photo_ + "/ONE"), "/one");
     EXPECT_EQ(ask("alice", "action=rename&path=/photo/ONE&name=two").json["error"]["path"], "/photo/two");
     EXPECT_EQ(code(look("alice", "action=subfolders&path=/photo/hidden/@tmp")), 408);
-    EXPECT_EQ(readFile(root + "/two"), "/two");
-    EXPECT_EQ(readFile(root + "/folder/g\nh"), "/folder/f");
-    EXPECT_EQ(fs::read_symlink(root + "/link"), "/etc");
+    EXPECT_EQ(readFile(photo_ + "/two"), "/two");
+    EXPECT_EQ(readFile(photo_ + "/folder/g\nh"), "/folder/f");
+    EXPECT_EQ(fs::read_symlink(photo_ + "/link"), "/etc");
     const CgiReply raw = ask("alice", "action=rename&path=/photo/two&name_raw=%25FF");
     EXPECT_EQ(raw.json["data"]["path_raw"], "/photo/%FF");
-    EXPECT_TRUE(fs::exists(root + "/\xFF"));
+    EXPECT_TRUE(fs::exists(photo_ + "/\xFF"));
 }
 
 TEST_F(OperationCgi, SubFoldersOfAFolder) {
-    const std::string root = shareRoot("photo");
-    for (const char* name : {"/b", "/a", "/a/deep", "/@tmp", "/\xFF"}) makeFolder(root + name);
-    writeFile(root + "/file", "x");
-    fs::create_symlink("/etc", root + "/outside");
+    for (const char* name : {"/b", "/a", "/a/deep", "/@tmp", "/\xFF"}) makeFolder(photo_ + name);
+    writeFile(photo_ + "/file", "x");
+    fs::create_symlink("/etc", photo_ + "/outside");
     const CgiReply reply = look("bob", "action=subfolders&path=/photo");
     EXPECT_EQ(each(reply.json["data"]["items"], "path"), (Names{"/photo/a", "/photo/b", "/photo/\uFFFD"}));
     EXPECT_EQ(reply.json["data"]["items"][2]["name_raw"], "%FF");
@@ -103,9 +92,8 @@ TEST_F(OperationCgi, SubFoldersOfAFolder) {
     const Rows<const char*, int> rows = {{"/closed", 407},        {"/sealed", 407},        {"/nowhere", 408},
                                          {"/photo/missing", 408}, {"/photo/outside", 407}, {"/photo/../..", 407},
                                          {"/photo/file", 408}};
-    for (const auto& [path, expected] : rows) {
+    for (const auto& [path, expected] : rows)
         EXPECT_EQ(code(look("bob", std::string("action=subfolders&path=") + path)), expected) << path;
-    }
 }
 
 // Of all programs that change or fetch files, as far as something happened.
@@ -143,12 +131,11 @@ TEST_F(OperationCgi, TheTransferLogTellsWhatWasDone) {
 
 TEST_F(OperationCgi, NamesThatAreTakenAreToldInOneQuestion) {
     SKIP_WITHOUT_ROOT();
-    const std::string root = shareRoot("photo");
-    makeFolder(root + "/in", 0755);
-    makeFolder(root + "/in/folder", 0755);
-    writeFile(root + "/in/f\xFF", "four");
-    fs::create_symlink("/etc/passwd", root + "/in/link");
-    makeFolder(root + "/shut", 0700);
+    makeFolder(photo_ + "/in", 0755);
+    makeFolder(photo_ + "/in/folder", 0755);
+    writeFile(photo_ + "/in/f\xFF", "four");
+    fs::create_symlink("/etc/passwd", photo_ + "/in/link");
+    makeFolder(photo_ + "/shut", 0700);
     const auto present = [](const std::string& path, const std::string& names) {
         return ask("alice", "action=present&path=" + path + "&names_raw=" + percentEncode(names));
     };
@@ -162,9 +149,8 @@ TEST_F(OperationCgi, NamesThatAreTakenAreToldInOneQuestion) {
     EXPECT_EQ(present("/photo/in", "").json["data"]["items"].size(), 0U);
     for (const auto& [path, names, refused] : Rows<std::string, std::string, int>{
              row("/photo/in", "..", 400), row("/photo/in", "folder%2Fx", 400), row("/photo/in", "a\n%zz", 400),
-             row("/photo/none", "a", 408), row("/photo/in/link", "a", 407), row("/photo/shut", "a", 407)}) {
+             row("/photo/none", "a", 408), row("/photo/in/link", "a", 407), row("/photo/shut", "a", 407)})
         EXPECT_EQ(code(present(path, names)), refused) << path << " " << names;
-    }
 }
 
 }  // namespace

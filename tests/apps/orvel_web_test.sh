@@ -18,7 +18,7 @@ expect() { # what, wanted, got
     [ "$2" = "$3" ] || { echo "FAILED: $1: wanted '$2', got '$3'"; failures=$((failures + 1)); }
 }
 
-port=$((20000 + $$ % 12000))
+port=$((20000 + $$ * 4 % 12000))
 taken() { (exec 3<>"/dev/tcp/127.0.0.1/$1") 2>/dev/null; }
 while taken "$port" || taken "$((port + 1))" || taken "$((port + 2))"; do port=$((port + 3)); done
 # Nothing resolves the machine's name, and it has no address.
@@ -79,7 +79,7 @@ expect "names" 1 "$(openssl x509 -in "$own/certificate.pem" -noout -ext subjectA
 [ "$(id -u)" -ne 0 ] || chown -R nobody "$work/var/cache" "$work/run/orvel-web"
 lighttpd -D -f "$work/run/orvel-web/lighttpd.conf" 2>"$work/log" &
 pid=$!
-ask() { curl -s --max-time 20 --cacert "$own/certificate.pem" "$@"; }
+ask() { curl -s --max-time 60 --cacert "$own/certificate.pem" "$@"; }
 for _ in $(seq 600); do taken "$port" && break; sleep 0.1; done
 expect "the page" 200 "$(ask -o /dev/null -w '%{http_code}' "https://localhost:$port/")"
 expect "plain HTTP" "307 https://localhost:$port/a?b" "$(ask -o /dev/null -w '%{http_code} %{redirect_url}' "http://localhost:$((port + 1))/a?b")"

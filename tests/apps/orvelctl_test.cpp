@@ -1,16 +1,11 @@
 // What the command-line tool says of itself: help, its exit status, completion.
 #include "apps/program.h"
 #include "criteria.h"
-#include "support/table.h"
+#include "support/testing.h"
 
 namespace {
 
 using Words = std::vector<std::string>;
-
-support::Finished orvelctl(Words words) {
-    words.insert(words.begin(), ORVELCTL);
-    return support::runProgram(words);
-}
 
 std::string helpOf(const std::string& command) {
     const support::Finished finished = orvelctl({"help", command});

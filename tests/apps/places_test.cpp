@@ -16,8 +16,6 @@
 #include "orvel/search_task.h"
 #include "orvel/search_walker.h"
 #include "share/place.h"
-#include "support/race.h"
-#include "support/refuse_calls.h"
 #include "support/testing.h"
 #include "temporary_folder.h"
 
@@ -30,13 +28,10 @@ class Places : public ApplianceTest {
     void SetUp() override {
         ApplianceTest::SetUp();
         SKIP_WITHOUT_ROOT();
-        photo_ = shareRoot("photo");
-        for (const char* path : {"/shared/sub/one.txt", "/shared/one.txt", "/beside/secret.txt"}) {
+        for (const char* path : {"/shared/sub/one.txt", "/shared/one.txt", "/beside/secret.txt"})
             writeFile(photo_ + path, "x");
-        }
-        for (const char* path : {"", "/shared", "/shared/sub", "/shared/one.txt", "/beside", "/beside/secret.txt"}) {
+        for (const char* path : {"", "/shared", "/shared/sub", "/shared/one.txt", "/beside", "/beside/secret.txt"})
             EXPECT_EQ(chown((photo_ + path).c_str(), kAliceUid, kUsersGid), 0);
-        }
     }
     // As a request of alice, in a process of its own.
     static void asAlice(const std::function<void()>& body) {
@@ -58,7 +53,6 @@ class Places : public ApplianceTest {
     static void exchange(const std::string& a, const std::string& b) {
         syscall(SYS_renameat2, AT_FDCWD, a.c_str(), AT_FDCWD, b.c_str(), RENAME_EXCHANGE);
     }
-    std::string photo_;
 };
 
 TEST_F(Places, WhatIsOpenIsListed) {
@@ -87,17 +81,15 @@ TEST_F(Places, ALinkIsToWhatWasPublished) {
     makeFolder(systemRoot() + "/usr/vexo/etc/pexlander");
     fs::create_symlink("shared", photo_ + "/pub");
     fs::create_symlink("one.txt", photo_ + "/shared/file");
-    for (const auto& [path, published] : Rows<std::string, std::string>{{"/photo/pub", "/photo/shared"},
-                                                                        {"/photo/shared/sub/..", "/photo/shared"},
-                                                                        {"/photo/pub/./file/", "/photo/shared/one.txt"},
-                                                                        {"/photo/shared/..", "/photo"}}) {
+    for (const auto& [path, published] : Rows<std::string, std::string>{
+             row("/photo/pub", "/photo/shared"), row("/photo/shared/sub/..", "/photo/shared"),
+             row("/photo/pub/./file/", "/photo/shared/one.txt"), row("/photo/shared/..", "/photo")})
         inChild([&, asked = path, expected = published] {
             Link link;
             EXPECT_EQ(makeLink({.user = "alice", .sid = "", .path = asked, .terms = {}}, link), 0) << asked;
             EXPECT_EQ(link.path, expected);
             takeLog();
         });
-    }
     asAlice([&] {
         Place place;
         // Those made before paths were resolved still get a name that leads nowhere.
@@ -212,9 +204,8 @@ TEST_F(Places, NothingIsSeenBesideAnExchange) {
         const long rounds = race([&] {
             Place place;
             Listing visited, listed;
-            if (findPlace("alice", "/photo/shared", "sub", place) == 0) {
+            if (findPlace("alice", "/photo/shared", "sub", place) == 0)
                 listOpened(request(place.path), place.found, place.path, place.realPath, visited);
-            }
             look(visited);
             listFolder(request("/photo/dir"), listed);
             look(listed);

@@ -44,9 +44,8 @@ TEST_F(PreferencesCgi, WhatIsRefusedChangesNothing) {
              row("", ORV_ERR_PARAMETER), row("[]", ORV_ERR_PARAMETER), row("{\"mode\":", ORV_ERR_PARAMETER),
              row("{\"Mode\":1}", ORV_ERR_PARAMETER), row("{\"\":1}", ORV_ERR_PARAMETER),
              row("{\"mode\":\"\xFF\"}", ORV_ERR_PARAMETER), row("{\"mode\":" + deep + "}", ORV_ERR_PARAMETER),
-             row("{\"mode\":1,\"more\":\"" + most + "\"}", ORV_ERR_FILE_TOO_BIG)}) {
+             row("{\"mode\":1,\"more\":\"" + most + "\"}", ORV_ERR_FILE_TOO_BIG)})
         EXPECT_EQ(code(set("alice", values)), expected) << values.substr(0, 40);
-    }
     EXPECT_EQ(code(get(PROGRAM_PREFERENCES, "alice", "action=set&values={}")), ORV_ERR_PARAMETER) << "not posted";
     EXPECT_EQ(kept("alice"), R"({"mode":"grid"})");
     for (const char* damage : {"{\"version\":2,\"user\":\"alice\",\"values\":{}}", "torn"}) {
@@ -59,11 +58,10 @@ TEST_F(PreferencesCgi, WhatIsRefusedChangesNothing) {
 TEST_F(PreferencesCgi, BrowsersAtOnceLoseNothing) {
     SKIP_WITHOUT_ROOT();
     std::vector<std::thread> browsers;
-    for (int i = 0; i < 4; ++i) {
+    for (int i = 0; i < 4; ++i)
         browsers.emplace_back([i] {
             for (int n = 0; n < 5; ++n) set("alice", "{\"b" + std::to_string(i) + "." + std::to_string(n) + "\":1}");
         });
-    }
     for (auto& browser : browsers) browser.join();
     EXPECT_EQ(get(PROGRAM_PREFERENCES, "alice", "action=get").json["data"]["values"].size(), 20U);
 }

@@ -145,6 +145,21 @@ Finished runProgram(const std::vector<std::string>& words, const Variables& vari
     return finished;
 }
 
+Finished orvelctl(std::vector<std::string> words) {
+    words.insert(words.begin(), ORVELCTL);
+    return runProgram(words);
+}
+
+Json::Value jsonOf(const std::string& text) {
+    Json::CharReaderBuilder strict;
+    Json::CharReaderBuilder::strictMode(&strict.settings_);
+    const std::unique_ptr<Json::CharReader> reader(strict.newCharReader());
+    std::string errors;
+    Json::Value value;
+    EXPECT_TRUE(reader->parse(text.data(), text.data() + text.size(), &value, &errors)) << errors << text;
+    return value;
+}
+
 Finished finishCgi(const std::string& program, const std::string& user, const std::string& method,
                    const std::string& query, const std::string& input, const Variables& more) {
     // A web server starts a program in its folder.
@@ -185,11 +200,7 @@ RawReply::RawReply(const std::string& output) {
 
 CgiReply::CgiReply(const std::string& output) : RawReply(output) {
     EXPECT_TRUE(orvel::cgi::isUtf8(body)) << body;
-    Json::CharReaderBuilder strict;
-    Json::CharReaderBuilder::strictMode(&strict.settings_);
-    const std::unique_ptr<Json::CharReader> reader(strict.newCharReader());
-    std::string errors;
-    EXPECT_TRUE(reader->parse(body.data(), body.data() + body.size(), &json, &errors)) << errors << body;
+    json = jsonOf(body);
 }
 
 }  // namespace support

@@ -23,6 +23,11 @@ using Variables = std::map<std::string, std::string>;
 Finished runProgram(const std::vector<std::string>& words, const Variables& variables = {},
                     const std::string& input = "");
 
+// Runs orvelctl.
+Finished orvelctl(std::vector<std::string> words);
+// What strict JSON says; anything else fails the test.
+Json::Value jsonOf(const std::string& text);
+
 // Runs a program for a user who is logged in, as plain CGI, with `input` as body of the request.
 Finished finishCgi(const std::string& program, const std::string& user, const std::string& method,
                    const std::string& query, const std::string& input = "", const Variables& more = {});

@@ -5,7 +5,6 @@
 #include <optional>
 
 #include "client_address.h"
-#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 using namespace orvel::cgi;
@@ -15,9 +14,8 @@ namespace {
 TEST(Request, NumbersAreDigitsThatFit) {
     EXPECT_EQ(parseNumber("0"), 0U);
     EXPECT_EQ(parseNumber("18446744073709551615"), 18446744073709551615U);
-    for (const char* text : {"", "-1", "+1", " 1", "1 ", "1x", "0x10", "1.0", "18446744073709551616"}) {
+    for (const char* text : {"", "-1", "+1", " 1", "1 ", "1x", "0x10", "1.0", "18446744073709551616"})
         EXPECT_EQ(parseNumber(text), std::nullopt) << text;
-    }
 }
 
 TEST(Request, ListsOfPathsNameTheFolderOnce) {
@@ -40,9 +38,8 @@ TEST(ClientAddress, IsWhatTheLastTrustedProxySaw) {
              row("192.0.2.1", "192.0.2.1"), row("198.51.100.7, 192.0.2.1", "192.0.2.1"),
              row("198.51.100.7,192.0.2.1 , ::ffff:10.0.0.1,2001:DB8:0::1", "192.0.2.1"), row("10.0.0.1", "10.0.0.1"),
              row("192.0.2.1, unknown", "10.0.0.9"), row("192.0.2.1, , 10.0.0.1", "10.0.0.1"),
-             row("2001:db8::7", "2001:db8::7"), row("", "10.0.0.9")}) {
+             row("2001:db8::7", "2001:db8::7"), row("", "10.0.0.9")})
         EXPECT_EQ(clientBehind(forwarded, "10.0.0.9", proxies), client) << forwarded;
-    }
 }
 
 class ActAs : public ApplianceTest {};

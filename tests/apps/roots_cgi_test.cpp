@@ -1,5 +1,4 @@
 // Shares at any depth, from one end to the other: listed, filled, changed, searched, published and emptied.
-#include <json/reader.h>
 
 #include "apps/task_fixture.h"
 #include "platform/private_mounts.h"
@@ -46,9 +45,9 @@ void RootsCgi::useShare(const std::string& name, const std::string& root) {
 
     const std::string id = search(top), shown = "&taskid=" + id;
     EXPECT_EQ(rows(id), top + "/a/b/one.txt " + top + "/two.txt ");
-    EXPECT_EQ(support::runProgram({ORVELCTL, "index", "build", name}).status, 0);
+    EXPECT_EQ(support::orvelctl({"index", "build", name}).status, 0);
     EXPECT_EQ(rows(search(top)), top + "/a/b/one.txt " + top + "/two.txt ") << "from the index";
-    EXPECT_EQ(support::runProgram({ORVELCTL, "index", "drop", name}).status, 0);
+    EXPECT_EQ(support::orvelctl({"index", "drop", name}).status, 0);
     EXPECT_EQ(code(ask("alice", "action=rename&name=c&path=" + top + "/a/b" + shown)), 0);
     EXPECT_EQ(rows(id), top + "/a/c/one.txt " + top + "/two.txt ");
     EXPECT_EQ(errors(perform("alice", "action=move" + shown + about({top + "/a/c"}, top))), "");
@@ -77,9 +76,8 @@ void RootsCgi::refuseTemporaryFolder(const std::string& top) {
     for (const auto& [program, query] :
          std::vector<std::pair<const char*, std::string>>{{PROGRAM_LIST, "action=folder&path="},
                                                           {PROGRAM_DOWNLOAD, "path="},
-                                                          {PROGRAM_OPERATION, "action=subfolders&path="}}) {
+                                                          {PROGRAM_OPERATION, "action=subfolders&path="}})
         EXPECT_EQ(code(get(program, query + percentEncode(path))), 408) << program;
-    }
     EXPECT_EQ(upload(file + "/x"), 418);
     EXPECT_EQ(code(ask("alice", "action=mkdir&path=" + percentEncode(file + "/x"))), 418);
     EXPECT_EQ(code(ask("alice", "action=rename&name=x&path=" + percentEncode(path))), 408);
@@ -98,14 +96,13 @@ void RootsCgi::refuseTemporaryFolder(const std::string& top) {
 
 // What was begun in a share while it was open leads nowhere once an option closes it.
 TEST_F(RootsCgi, AClosedShareIsClosedToAllThatWasBegunInIt) {
-    SKIP_WITHOUT_ROOT();
     support::makeFolder(shareRoot("photo"), 0777);
     const auto define = [this](const std::string& option) {
         addShare("photo", "read only = no\nvexo:index = yes\n" + option);
     };
     define("");
     EXPECT_EQ(upload("/photo/one.txt") + upload("/photo/a/two.txt"), 0);
-    EXPECT_EQ(support::runProgram({ORVELCTL, "index", "build", "photo"}).status, 0);
+    EXPECT_EQ(support::orvelctl({"index", "build", "photo"}).status, 0);
     EXPECT_EQ(rows(search("/photo")), "/photo/a/two.txt /photo/one.txt ");
     const std::string found = search("/photo");
     const std::string kept = get(PROGRAM_LIST, "action=folder&keep=1&path=/photo/a").json["data"]["listing"].asString();
@@ -119,11 +116,10 @@ TEST_F(RootsCgi, AClosedShareIsClosedToAllThatWasBegunInIt) {
             get(PROGRAM_SEARCH, "action=list&taskid=" + found).body,
             support::runCgi(PROGRAM_DOWNLOAD, "alice", "GET", "path=/photo/a/two.txt"),
             support::runCgi(PROGRAM_SHARE, "", "GET", "FOLDER_SHARING=" + link + "&action=download&path=two.txt"),
-            support::runProgram({ORVELCTL, "search", "/photo", "--user", "alice", "--name", "two*"}).output};
+            support::orvelctl({"search", "/photo", "--user", "alice", "--name", "two*"}).output};
         std::string open;
-        for (const std::string& reply : replies) {
+        for (const std::string& reply : replies)
             open += reply.empty() || reply.find("\"success\":false") != std::string::npos ? "0" : "1";
-        }
         return open;
     };
     EXPECT_EQ(all(), "111111");
@@ -134,7 +130,6 @@ TEST_F(RootsCgi, AClosedShareIsClosedToAllThatWasBegunInIt) {
 }
 
 TEST_F(RootsCgi, EverythingWorksAtAnyDepth) {
-    SKIP_WITHOUT_ROOT();
     const std::string deep = photo_ + "/srv/samba/team", options = "read only = no\nvexo:index = yes\npath = ";
     addShare("team", options + deep + "\n");
     addShare("data", options + "/mnt\n");
@@ -153,10 +148,9 @@ TEST_F(RootsCgi, EverythingWorksAtAnyDepth) {
 // What the doctor says of a share, and its exit status. The findings of other shares are left out.
 TEST_F(RootsCgi, TheDoctorNamesTheLine) {
     const auto ask = [](const std::string& share, int status) {
-        const support::Finished finished = support::runProgram({ORVELCTL, "doctor", "shares", "--json"});
+        const support::Finished finished = support::orvelctl({"doctor", "shares", "--json"});
         EXPECT_EQ(finished.status, status) << finished.output;
-        Json::Value report;
-        EXPECT_TRUE(Json::Reader().parse(finished.output, report)) << finished.output;
+        const Json::Value report = support::jsonOf(finished.output);
         EXPECT_EQ(report["problems"].asInt() == 0, status == 0);
         std::string all;
         for (const Json::Value& finding : report["findings"]) {
@@ -194,27 +188,16 @@ TEST_F(RootsCgi, TheDoctorNamesTheLine) {
 }
 
 TEST_F(RootsCgi, VolumesHaveTheirTemporaryFolders) {
-    SKIP_WITHOUT_ROOT();
     writeRootFile("/etc/vexo/shares.conf", "[data]\npath = /mnt\nveto files = /@tmp/\nread only = no\n");
     EXPECT_WITH_PRIVATE_MOUNTS(support::inPrivateMounts([&] {
         EXPECT_EQ(mount("none", "/mnt", "tmpfs", 0, "mode=0777"), 0);
-        const auto run = [](std::vector<std::string> words) {
-            words.insert(words.begin(), ORVELCTL);
-            return support::runProgram(words).status;
-        };
-        const auto modeOf = [](const std::string& path) {
-            struct stat status {};
-            return lstat(path.c_str(), &status) == 0
-                       ? std::to_string(status.st_uid) + " " + std::to_string(status.st_mode & 07777)
-                       : "none";
-        };
+        const auto run = [](const std::vector<std::string>& words) { return support::orvelctl(words).status; };
         const std::string everybodys = "0 " + std::to_string(01777), search = "/mnt/@tmp/orvel/PXSearch";
         EXPECT_EQ(run({"doctor", "shares", "volumes"}), 1);
         EXPECT_EQ(run({"volumes"}), 0);
         EXPECT_EQ(run({"doctor", "shares", "volumes"}), 0);
-        for (const std::string& path : {std::string("/mnt/@tmp"), std::string("/mnt/@tmp/orvel"), search}) {
+        for (const std::string& path : {std::string("/mnt/@tmp"), std::string("/mnt/@tmp/orvel"), search})
             EXPECT_EQ(modeOf(path), everybodys) << path;
-        }
         EXPECT_EQ(chmod("/mnt/@tmp", 0777), 0);
         support::makeFolder(search + "/alice", 0777);
         EXPECT_EQ(run({"volumes", "--user", "alice"}), 0);

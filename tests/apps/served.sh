@@ -42,7 +42,7 @@ export VEXO_GATE_PAM=$work/pam
 mkdir "$VEXO_GATE_PAM"
 
 # Below what the kernel gives to clients; by the process, so that two tests at once begin apart.
-port=$((20000 + $$ % 12000))
+port=$((20000 + $$ * 4 % 12000))
 while (exec 3<>"/dev/tcp/127.0.0.1/$port") 2>/dev/null; do port=$((port + 1)); done
 "$server" --port "$port" --root "$demo" --build "$build" >"$log" 2>&1 &
 pid=$!

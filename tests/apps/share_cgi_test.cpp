@@ -181,9 +181,8 @@ TEST_F(ShareCgi, WhatWasDeletedIsNotShown) {
 
 TEST_F(ShareCgi, APathNamedAgainAndAgainIsPackedOnce) {
     std::string query = "action=download&path=inner/two.txt";
-    for (const char* spelling : {"inner", "inner", "/inner", "inner/", "./inner", "inner/."}) {
+    for (const char* spelling : {"inner", "inner", "/inner", "inner/", "./inner", "inner/."})
         query += std::string("&path=") + spelling;
-    }
     const std::string zip = RawReply(ask(free_, query)).body;
     size_t packed = 0;
     for (size_t at = zip.find("PK\3\4"); at != std::string::npos; at = zip.find("PK\3\4", at + 1)) ++packed;
@@ -299,7 +298,7 @@ TEST_F(ShareCgi, ALinkIsChangedInPlace) {
 TEST_F(ShareCgi, AToolWithARelativeRoot) {
     const std::string before = fs::current_path(), root = systemRoot();
     fs::current_path(fs::path(root).parent_path());
-    const Finished found = runProgram({ORVELCTL, "--root", fs::path(root).filename(), "link", "list"});
+    const Finished found = orvelctl({"--root", fs::path(root).filename(), "link", "list"});
     fs::current_path(before);
     EXPECT_NE(found.output.find(free_), std::string::npos) << found.output;
 }

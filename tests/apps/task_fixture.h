@@ -46,7 +46,7 @@ class TaskCgi : public support::CgiTest {
     void SetUp() override {
         ApplianceTest::SetUp();
         SKIP_WITHOUT_ROOT();
-        photo_ = addShare("photo", "read only = no\nvalid users = alice, bob, carol\nread list = bob\n");
+        addShare("photo", "read only = no\nvalid users = alice, bob, carol\nread list = bob\n");
         video_ = addShare("video", "read only = no\n");
     }
     static CgiReply ask(const std::string& user, const std::string& form, const Variables& more = {}) {
@@ -75,10 +75,15 @@ class TaskCgi : public support::CgiTest {
     // "path code" of each error.
     static std::string errors(const Json::Value& task) {
         std::string all;
-        for (const Json::Value& error : task["errors"]) {
+        for (const Json::Value& error : task["errors"])
             all += error["path"].asString() + " " + std::to_string(error["code"].asInt()) + "\n";
-        }
         return all;
+    }
+    // "OWNER MODE", decimal.
+    static std::string modeOf(const std::string& path) {
+        struct stat status {};
+        if (lstat(path.c_str(), &status) != 0) return "none";
+        return std::to_string(status.st_uid) + " " + std::to_string(status.st_mode & 07777);
     }
     static std::string recordOf(const std::string& id) { return systemRoot() + "/var/lib/vexo/tasks/alice/" + id; }
     static bool hasParts(const std::string& root) { return treeOf(root).find(".vexo-part-") != std::string::npos; }
@@ -89,7 +94,7 @@ class TaskCgi : public support::CgiTest {
             for (fs::path at = path; at.has_relative_path(); at = at.parent_path()) give(root + at.string());
         }
     }
-    std::string photo_, video_;
+    std::string video_;
 };
 
 #endif

@@ -17,9 +17,8 @@ TEST(OperationNames, AreNumberedBeforeTheirEnding) {
                        {"a", "a (2)", false},
                        {std::string(255, 'x') + ".txt", std::string(247, 'x') + " (2).txt", false},
                        {"a." + std::string(40, 'x'), "a." + std::string(40, 'x') + " (2)", false}};
-    for (const auto& [name, numbered, isFolder] : cases) {
+    for (const auto& [name, numbered, isFolder] : cases)
         EXPECT_EQ(orvel::cgi::numberedName(name, 2, isFolder), numbered);
-    }
     orvel::cgi::FreeNames names;
     for (const char* free : {"a.txt", "a (2).txt", "a (3).txt"}) EXPECT_EQ(names.take("a.txt", false), free);
     EXPECT_EQ(names.take("a (2).txt", false), "a (2) (2).txt");
@@ -44,9 +43,8 @@ TEST(OperationNames, OfTheBinLeadBack) {
 }
 
 TEST(OperationNames, OfArchivesLeadDownOnly) {
-    for (const char* name : {"", "/", "/etc/passwd", "..", "a/../b", "./..", "a/..", ".", "./"}) {
+    for (const char* name : {"", "/", "/etc/passwd", "..", "a/../b", "./..", "a/..", ".", "./"})
         EXPECT_FALSE(orvel::cgi::memberComponents(name)) << name;
-    }
     EXPECT_EQ(*orvel::cgi::memberComponents("./a//b/."), (std::vector<std::string>{"a", "b"}));
     EXPECT_EQ(*orvel::cgi::memberComponents("...\\..\\x"), (std::vector<std::string>{"...\\..\\x"}));
     struct {

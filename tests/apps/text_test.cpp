@@ -38,9 +38,8 @@ TEST(Text, JsonIsThatOfTheLibraryWithoutBlanks) {
         list.append(Json::Value::minLargestInt);
         list.append(Json::Value::maxLargestUInt);
         for (const bool flag : {false, true}) list.append(flag);
-        for (const auto type : {Json::nullValue, Json::stringValue, Json::arrayValue, Json::objectValue}) {
+        for (const auto type : {Json::nullValue, Json::stringValue, Json::arrayValue, Json::objectValue})
             list.append(Json::Value(type));
-        }
         list.append(Json::Value(std::string("\0\b\f\n\r\t\x7f \u20AC/", 11)));
         list.append(list);
     }

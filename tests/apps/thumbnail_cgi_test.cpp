@@ -3,8 +3,6 @@
 #include <sys/mman.h>
 
 #include "apps/cgi_test.h"
-#include "base/descriptor.h"
-#include "support/table.h"
 #include "thumbnail/sandbox.h"
 
 namespace {
@@ -59,9 +57,8 @@ class ThumbnailCgi : public CgiTest {
 };
 
 TEST_F(ThumbnailCgi, EachKindIsDrawnSmallAndUpright) {
-    for (const char* ending : {"jpg", "gif", "tif", "heic", "avif"}) {
+    for (const char* ending : {"jpg", "gif", "tif", "heic", "avif"})
         vips({"copy", at("a.png"), at(std::string("a.") + ending)});
-    }
     vips({"black", at("a.webp"), "800", "400", "--bands", "3"});
     const std::string camera = readFile(at("a.jpg"));
     writeFile(at("turned.jpg"), camera.substr(0, 2) + kTurned + camera.substr(2), 0644);
@@ -111,9 +108,8 @@ TEST_F(ThumbnailCgi, Refusals) {
     writeFile(at("bare.jpg"), "\xFF\xD8\xFF", 0644);
     writeFile(at("bare.pdf"), "%PDF-1.4", 0644);
     makeFolder(at("folder.jpg"), 0755);
-    for (const auto& [name, more, status] : rowsOf<std::string, std::string, int>("apps/thumbnail_refusals")) {
+    for (const auto& [name, more, status] : rowsOf<std::string, std::string, int>("apps/thumbnail_refusals"))
         EXPECT_EQ(fetch(name, more).status, status) << name << more;
-    }
 }
 
 TEST(Sandbox, AProgramHasItsBytesAndNothingElse) {

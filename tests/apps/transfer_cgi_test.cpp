@@ -1,8 +1,6 @@
 // Copies and moves.
 #include "apps/task_fixture.h"
 #include "platform/private_mounts.h"
-#include "support/refuse_calls.h"
-#include "support/table.h"
 
 namespace {
 
@@ -81,12 +79,7 @@ TEST_F(TaskCgi, ALinkThatWouldLeadOutStaysWhereItIs) {
     fs::create_directories(photo_ + "/a/b/c/deeper");
     for (const auto& entry : fs::recursive_directory_iterator(photo_)) give(entry.path());
     for (const char* action : {"copy", "move"}) {
-        for (const auto& [path, target, passes] : Rows<std::string, std::string, bool>{
-                 row("/photo/a/b/c/d", "/photo/a", false), row("/photo/a/b/c/d", "/photo", false),
-                 row("/photo/a/b/c/d/top", "/photo/a", false), row("/photo/a/b", "/photo", false),
-                 row("/photo/a/b/c/d", "/video", false), row("/photo/a/b/c/d/e", "/photo", true),
-                 row("/photo/a/b/c/near", "/photo/a", true), row("/photo/a/near", "/video", false),
-                 row("/photo/a/b/c/d", "/photo/a/b/c/deeper", true)}) {
+        for (const auto& [path, target, passes] : rowsOf<std::string, std::string, bool>("apps/moved_links")) {
             const bool isCopy = *action == 'c';
             if (isCopy && !fs::exists(fs::symlink_status(photo_ + path.substr(6)))) continue;
             const auto task = perform("alice", std::string("action=") + action + about({path}, target));
@@ -118,14 +111,12 @@ TEST_F(TaskCgi, SourcesAndTargetsAreJudged) {
     }
     EXPECT_EQ(readFile(photo_ + "/a (2)/b/f"), "1");
     EXPECT_EQ(readFile(shareRoot("homes") + "/alice/a/b/f"), "1");
-    for (const char* made : {"/case", "/case/name", "/out"}) {
+    for (const char* made : {"/case", "/case/name", "/out"})
         EXPECT_EQ(statusOf(shareRoot("homes") + "/carol" + made).st_uid, kCarolUid) << made << ": not root's";
-    }
     EXPECT_EQ(readFile(fat + "/case/Name"), "/case/Name");
     for (const char* form : {"action=copy&target=/video", "action=copy&path=/photo/a&target=/video&taskid=../x",
-                             "action=copy&path_raw=%25zz&target=/video"}) {
+                             "action=copy&path_raw=%25zz&target=/video"})
         EXPECT_EQ(ask("alice", form).status, 400) << form;
-    }
 }
 
 TEST_F(TaskCgi, AFullDiskFailsItsItemAndTheRestGoesOn) {

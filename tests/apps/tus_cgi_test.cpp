@@ -2,11 +2,9 @@
 #include <sys/file.h>
 #include <utime.h>
 
-#include <cerrno>
 #include <thread>
 
 #include "apps/cgi_test.h"
-#include "base/descriptor.h"
 
 namespace {
 
@@ -15,11 +13,6 @@ class TusCgi : public CgiTest {
     void SetUp() override {
         ApplianceTest::SetUp();
         SKIP_WITHOUT_ROOT();
-        root_ = shareRoot("photo");
-    }
-    void TearDown() override {
-        for (const std::string& id : begun_) fs::remove(bytes(id));
-        ApplianceTest::TearDown();
     }
     static RawReply send(const std::string& method, const std::string& query, const std::string& body = "",
                          Variables more = {}, const std::string& user = "alice") {
@@ -30,12 +23,11 @@ class TusCgi : public CgiTest {
         more["HTTP_UPLOAD_LENGTH"] = std::to_string(size);
         return send("POST", query, "", more);
     }
-    std::string idOf(const RawReply& created) {
+    static std::string idOf(const RawReply& created) {
         EXPECT_EQ(created.status, 201) << created.body;
         const std::string location = created.headers.count("Location") > 0 ? created.headers.at("Location") : "";
         EXPECT_TRUE(location.starts_with("?id=")) << location;
-        begun_.push_back(location.substr(std::min(location.size(), size_t{4})));
-        return begun_.back();
+        return location.substr(std::min(location.size(), size_t{4}));
     }
     static RawReply append(const std::string& id, long long offset, const std::string& body, Variables more = {}) {
         more["HTTP_UPLOAD_OFFSET"] = std::to_string(offset);
@@ -72,8 +64,6 @@ class TusCgi : public CgiTest {
         const utimbuf times = {then, then};
         EXPECT_EQ(utime(path.c_str(), &times), 0) << path;
     }
-    std::string root_;
-    Names begun_;  // their bytes lie in the machine's own /tmp
 };
 
 TEST_F(TusCgi, WhatWasCutOffGoesOnAndIsWholeUnderItsName) {
@@ -89,7 +79,7 @@ TEST_F(TusCgi, WhatWasCutOffGoesOnAndIsWholeUnderItsName) {
     EXPECT_EQ(asked.headers.at("Upload-Length"), "10");
     EXPECT_EQ(asked.headers.at("Upload-Metadata"), "type dGV4dA==");
     EXPECT_TRUE(asked.headers.at("Upload-Expires").ends_with(" GMT"));
-    EXPECT_FALSE(fs::exists(root_ + "/new"));
+    EXPECT_FALSE(fs::exists(photo_ + "/new"));
     const CgiReply listed = get(PROGRAM_TUS, "alice", "");
     EXPECT_EQ(listed.json["data"]["items"][0]["path"], "/photo/new/a.bin");
     EXPECT_EQ(listed.json["data"]["items"][0]["offset"], 4);
@@ -101,9 +91,9 @@ TEST_F(TusCgi, WhatWasCutOffGoesOnAndIsWholeUnderItsName) {
                                 {"CONTENT_TYPE", "application/offset+octet-stream"}});
     EXPECT_EQ(last.status, 204) << last.body;
     EXPECT_EQ(last.headers.at("Orvel-Path"), "/photo/new/a.bin");
-    EXPECT_EQ(readFile(root_ + "/new/a.bin"), data);
-    expectOwned(root_ + "/new/a.bin", kAliceUid, 0644);
-    EXPECT_EQ(statusOf(root_ + "/new/a.bin").st_mtime, 1000000000);
+    EXPECT_EQ(readFile(photo_ + "/new/a.bin"), data);
+    expectOwned(photo_ + "/new/a.bin", kAliceUid, 0644);
+    EXPECT_EQ(statusOf(photo_ + "/new/a.bin").st_mtime, 1000000000);
     // The reply to the last piece got lost.
     EXPECT_EQ(offsetOf(id), "10");
     EXPECT_EQ(append(id, 10, "").status, 204);
@@ -116,9 +106,9 @@ TEST_F(TusCgi, WhatWasCutOffGoesOnAndIsWholeUnderItsName) {
                                {"HTTP_UPLOAD_METADATA", "filename YiBi"},
                                {"CONTENT_TYPE", "application/offset+octet-stream"}});
     EXPECT_EQ(offset(one), "4");
-    EXPECT_EQ(readFile(root_ + "/new/b b"), "text");
+    EXPECT_EQ(readFile(photo_ + "/new/b b"), "text");
     EXPECT_EQ(offsetOf(idOf(begin("path=/photo/empty", 0))), "0");
-    EXPECT_TRUE(fs::exists(root_ + "/empty"));
+    EXPECT_TRUE(fs::exists(photo_ + "/empty"));
     // An administrator's process is root, and the file the administrator's own.
     const std::string open = addShare("open", "read only = no\nvalid users = carol\n");
     const RawReply admin =
@@ -135,7 +125,7 @@ TEST_F(TusCgi, ATakenNameMeansWhatWasAskedFor) {
                                                                    {"keep_both", 204, "old", "f (2).x"}};
     for (const auto& [conflict, status, content, beside] : rows) {
         SCOPED_TRACE(conflict);
-        const std::string folder = root_ + "/" + conflict,
+        const std::string folder = photo_ + "/" + conflict,
                           query = std::string("path=/photo/") + conflict + "/f.x&conflict=" + conflict;
         openFolder(folder);
         const std::string id = idOf(begin(query, 3));
@@ -185,7 +175,7 @@ TEST_F(TusCgi, WhatLacksItsChecksumDoesNotCount) {
         writeFile(bytes(id), "xyzz");
         EXPECT_EQ(offsetOf(id), "2");
         EXPECT_EQ(append(id, 2, "abc", sum).status, 204);
-        EXPECT_EQ(readFile(root_ + "/" + algorithm), "xyabc");
+        EXPECT_EQ(readFile(photo_ + "/" + algorithm), "xyabc");
     }
 }
 
@@ -242,7 +232,7 @@ TEST_F(TusCgi, WhatIsNotOfTheProtocolIsRefused) {
     }
     EXPECT_EQ(send("HEAD", "id=" + id).status, 404);
     EXPECT_FALSE(fs::exists(bytes(id)));
-    EXPECT_EQ(namesIn(root_), Names{});
+    EXPECT_EQ(namesIn(photo_), Names{});
     const RawReply known = send("OPTIONS", "", "", {{"HTTP_TUS_RESUMABLE", ""}});
     EXPECT_EQ(known.status, 204);
     EXPECT_EQ(known.headers.at("Tus-Version"), "1.0.0");
@@ -250,7 +240,7 @@ TEST_F(TusCgi, WhatIsNotOfTheProtocolIsRefused) {
 
 // Between the pieces others change the place; nothing is lost, and it goes on when the place is as it was.
 TEST_F(TusCgi, AnotherPlaceIsRefusedAndTheBytesStay) {
-    const std::string folder = root_ + "/d", away = root_ + "/away";
+    const std::string folder = photo_ + "/d", away = photo_ + "/away";
     const struct {
         const char* what;
         std::function<void()> change, back;
@@ -259,7 +249,7 @@ TEST_F(TusCgi, AnotherPlaceIsRefusedAndTheBytesStay) {
         {"renamed", [&] { fs::rename(folder, away); }, [&] { fs::rename(away, folder); }, 408},
         {"another one", [&] { fs::rename(folder, away), openFolder(folder); },
          [&] { fs::remove(folder), fs::rename(away, folder); }, 408},
-        {"a link", [&] { fs::rename(folder, away), openFolder(root_ + "/e"), fs::create_symlink("e", folder); },
+        {"a link", [&] { fs::rename(folder, away), openFolder(photo_ + "/e"), fs::create_symlink("e", folder); },
          [&] { fs::remove(folder), fs::rename(away, folder); }, 408},
         {"not writable", [&] { EXPECT_EQ(chmod(folder.c_str(), 0555), 0); },
          [&] { EXPECT_EQ(chmod(folder.c_str(), 0777), 0); }, 407},
@@ -296,14 +286,14 @@ TEST_F(TusCgi, ThereAreBoundsAndAnEnd) {
     writeFile(bytes(std::string(32, 'a')), "without a record");
     makeOld(bytes(std::string(32, 'a')));
     EXPECT_EQ(send("HEAD", "id=" + first).status, 404);
-    EXPECT_EQ(runProgram({ORVELCTL, "sweep", "--quiet"}).status, 0);
+    EXPECT_EQ(orvelctl({"sweep", "--quiet"}).status, 0);
     EXPECT_FALSE(fs::exists(record(first)) || fs::exists(bytes(first)) || fs::exists(bytes(std::string(32, 'a'))));
     EXPECT_EQ(offsetOf(second), "1");
     // Killed between the renaming and its note.
     std::string text = readFile(record(second));
     text.replace(8, 22, "n 00000000000000000001");
     writeFile(record(second), text);
-    fs::rename(bytes(second), root_ + "/b");
+    fs::rename(bytes(second), photo_ + "/b");
     EXPECT_EQ(offsetOf(second), "2");
     EXPECT_TRUE(readFile(record(second)).starts_with("ORVTUS1 d"));
 }

@@ -81,9 +81,8 @@ TEST_F(UndoCgi, ARenameIsUndoneByItsOwnId) {
     EXPECT_EQ(errors(undo(id)), "");
     EXPECT_EQ(readFile(photo_ + "/c"), "/c");
     EXPECT_FALSE(fs::exists(photo_ + "/d"));
-    for (const std::string bad : {"../x", "Quorvane_rename_", "Quorvane_rename_0123456789abcdef"}) {
+    for (const std::string bad : {"../x", "Quorvane_rename_", "Quorvane_rename_0123456789abcdef"})
         EXPECT_EQ(code(ask("alice", "action=undo&taskid=" + bad)), 408) << bad;
-    }
     EXPECT_EQ(code(get(PROGRAM_OPERATION, "alice", "action=undo&taskid=" + id)), 400) << "not posted";
 }
 

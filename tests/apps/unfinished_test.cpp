@@ -9,11 +9,9 @@
 #include <sys/prctl.h>
 
 #include "apps/task_fixture.h"
-#include "base/descriptor.h"
 #include "orvel/sharing_settings.h"
 #include "platform/private_mounts.h"
 #include "support/calls.h"
-#include "support/table.h"
 #include "vexo/filesystem.h"
 #include "vexo/index.h"
 #include "vexo/link_store.h"
@@ -54,6 +52,7 @@ class Unfinished : public TaskCgi {
     // Moves the appliance into memory, where nothing has to be waited for, in a mount namespace of its own. False where
     // the machine does not allow that.
     bool moveToMemory() {
+        if (std::string(TEST_CALLS).starts_with("/tmp/")) return false;  // would be hidden
         const std::string memory = systemRoot() + "/memory";
         support::makeFolder(memory);
         if (mount("none", memory.c_str(), "tmpfs", 0, "mode=1777") != 0) return false;
@@ -98,9 +97,8 @@ class Unfinished : public TaskCgi {
             if (!fs::exists(systemRoot() + folder)) continue;
             for (const auto& entry : fs::directory_iterator(systemRoot() + folder)) fs::remove_all(entry.path());
         }
-        for (const char* file : {"/old", "/d/1", "/d/sub/2", "/d/sub/3", "/#recycle/gone/f", "/#recycle/gone/g"}) {
+        for (const char* file : {"/old", "/d/1", "/d/sub/2", "/d/sub/3", "/#recycle/gone/f", "/#recycle/gone/g"})
             writeFile(photo_ + file, std::string("content of ") + file, 0666);
-        }
         writeFile(video_ + "/old", "the one before", 0666);
         if (!zip_.empty()) writeFile(photo_ + "/a.zip", zip_, 0666);
         support::makeFolder(photo_ + "/gone", 0777);
@@ -159,9 +157,8 @@ class Unfinished : public TaskCgi {
         char setting[64] = {};
         VLIBCFileGetKeyValue(kSettings, "PX_SHARING_SETTING", setting, sizeof setting, 0);
         tree["setting"] = setting;
-        for (const auto& [uid, chosen] : OrvelSharing::SharingManager().getPrivileges()) {
+        for (const auto& [uid, chosen] : OrvelSharing::SharingManager().getPrivileges())
             tree["choices"] += std::to_string(uid) + (chosen ? " yes\n" : " no\n");
-        }
         std::istringstream records(readFile(systemRoot() + "/tmp/foldersharing.current.users"));
         for (std::string line; std::getline(records, line);) {
             const bool whole = !records.eof() && std::count(line.begin(), line.end(), ',') == 7;
@@ -330,10 +327,8 @@ class Unfinished : public TaskCgi {
         const auto isKnown = [&](size_t nth) {
             return error != 0 && nth < trace.size() && !struck_.emplace(work.program, error, trace[nth]).second;
         };
-        for (long nth = 1;
-             few == 0 && (isKnown(static_cast<size_t>(nth)) || strike(work, nth, error, before, after));) {
+        for (long nth = 1; few == 0 && (isKnown(static_cast<size_t>(nth)) || strike(work, nth, error, before, after));)
             ++nth;
-        }
         printf("%s, %s: %ld points, something hidden after %ld\n", work.name, error == 0 ? "killed" : strerror(error),
                points_, hidden_);
         for (const std::string& name : stays_) printf("    stayed: %s\n", name.c_str());
@@ -358,7 +353,6 @@ class Unfinished : public TaskCgi {
 };
 
 TEST_F(Unfinished, IsNeverLostTornOrCalledDone) {
-    SKIP_WITHOUT_ROOT();
 #ifdef __SANITIZE_ADDRESS__
     GTEST_SKIP() << "the sanitizer's own library must be the first that is loaded";
 #endif

@@ -5,7 +5,6 @@
 #include <sys/sysmacros.h>
 
 #include "apps/cgi_test.h"
-#include "support/table.h"
 
 namespace {
 
@@ -67,7 +66,6 @@ TEST_F(UploadCgi, AFileBelongsToItsUserWithTheFoldersAboveIt) {
 }
 
 TEST_F(UploadCgi, WhatExistsIsReplacedOnlyWhenAskedForAndAllowed) {
-    const std::string root = shareRoot("photo");
     const std::string fixed = addShare("archive", "read only = no\nvalid users = alice\nvexo:restriction = 2\n");
     const Rows<const char*, const char*, int, bool, const char*> rows = {
         {"photo", "error", 414, false, "old"},   {"photo", "skip", 0, true, "old"},
@@ -89,20 +87,19 @@ TEST_F(UploadCgi, WhatExistsIsReplacedOnlyWhenAskedForAndAllowed) {
 }
 
 TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
-    const std::string root = shareRoot("photo");
     const std::string fat = addShare("usb", "read only = no\n");
     addMount(fat, "vfat");
-    makeFolder(root + "/folder", 0777);
-    makeFolder(root + "/root's", 0755);
-    writeFile(root + "/file", "x", 0666);
-    ASSERT_EQ(mkfifo((root + "/pipe").c_str(), 0666), 0);
-    ASSERT_EQ(mknod((root + "/device").c_str(), S_IFCHR | 0666, makedev(1, 3)), 0);
-    makeFolder(root + "/folder/@tmp", 0777);
-    fs::create_symlink("folder/@tmp", root + "/hidden");
-    fs::create_symlink("folder", root + "/inside");
-    fs::create_symlink("/tmp", root + "/outside");
-    fs::create_symlink("nowhere", root + "/dangling");
-    const auto before = namesIn(root);
+    makeFolder(photo_ + "/folder", 0777);
+    makeFolder(photo_ + "/root's", 0755);
+    writeFile(photo_ + "/file", "x", 0666);
+    ASSERT_EQ(mkfifo((photo_ + "/pipe").c_str(), 0666), 0);
+    ASSERT_EQ(mknod((photo_ + "/device").c_str(), S_IFCHR | 0666, makedev(1, 3)), 0);
+    makeFolder(photo_ + "/folder/@tmp", 0777);
+    fs::create_symlink("folder/@tmp", photo_ + "/hidden");
+    fs::create_symlink("folder", photo_ + "/inside");
+    fs::create_symlink("/tmp", photo_ + "/outside");
+    fs::create_symlink("nowhere", photo_ + "/dangling");
+    const auto before = namesIn(photo_);
     for (const auto& [user, path, expected] : rowsOf<std::string, std::string, int>("apps/refused_uploads")) {
         for (const char* mode : {"error", "overwrite"}) {
             const bool shareRoot = path == "/photo" && *mode == 'o';
@@ -113,39 +110,36 @@ TEST_F(UploadCgi, RefusalsSayWhyAndLeaveNothing) {
     while (deep.size() < 4200) deep += "/" + std::string(200, 'd');
     EXPECT_EQ(code(put("alice", deep, "data")), 412);
     EXPECT_EQ(code(put("alice", "/photo/dangling", "data", "overwrite")), 414);
-    EXPECT_EQ(namesIn(root), before);
+    EXPECT_EQ(namesIn(photo_), before);
     EXPECT_EQ(namesIn(fat), Names{});
     EXPECT_EQ(temporaries(kAliceUid), Names{});
 
     EXPECT_EQ(code(put("alice", "/photo/inside/x", "data")), 0);
-    EXPECT_EQ(readFile(root + "/folder/x"), "data");
+    EXPECT_EQ(readFile(photo_ + "/folder/x"), "data");
     setSetting("link_policy_photo", "none");
     EXPECT_EQ(code(put("alice", "/photo/inside/y", "data")), 407);
 }
 
 TEST_F(UploadCgi, ABodyThatIsNotWhatWasAnnouncedLeavesNothing) {
-    const std::string root = shareRoot("photo");
     for (const char* length : {"-1", "", "0x10", "4 ", "9223372036854775808"}) {
         const CgiReply reply = put("alice", "/photo/new/x", "data", "error", {{"CONTENT_LENGTH", length}});
         EXPECT_EQ(reply.status, 400) << length;
         EXPECT_EQ(code(reply), 1802) << length;
     }
     // The client hung up.
-    for (const char* length : {"5", "9223372036854775807"}) {
+    for (const char* length : {"5", "9223372036854775807"})
         EXPECT_EQ(code(put("alice", "/photo/new/x", "data", "error", {{"CONTENT_LENGTH", length}})), 1802) << length;
-    }
     EXPECT_EQ(CgiReply(runCgi(PROGRAM_UPLOAD, "alice", "GET", "path=/photo/x")).status, 405);
     EXPECT_EQ(put("alice", "/photo/x", "data", "sometimes").status, 400);
     EXPECT_EQ(put("", "/photo/x", "data").status, 401);
-    EXPECT_EQ(namesIn(root), Names{});
+    EXPECT_EQ(namesIn(photo_), Names{});
     EXPECT_EQ(temporaries(kAliceUid), Names{});
 
     EXPECT_EQ(code(put("alice", "/photo/x", "data", "error", {{"CONTENT_LENGTH", "3"}})), 0);
-    EXPECT_EQ(readFile(root + "/x"), "dat");
+    EXPECT_EQ(readFile(photo_ + "/x"), "dat");
 }
 
 TEST_F(UploadCgi, AFormBringsSeveralFiles) {
-    const std::string root = shareRoot("photo");
     const CgiReply reply = post("alice", "",
                                 part("name=path", "/photo/sub/") + part("name=b; filename=\"\"", "") +
                                     part("name=a; filename=\"../../two\xFF%0A.txt\"", "22") +
@@ -159,16 +153,15 @@ TEST_F(UploadCgi, AFormBringsSeveralFiles) {
                                      part("name=a; filename=\"\\\\three\"", "333") + "--XX--\r\n");
     EXPECT_EQ(code(second), 0);
     EXPECT_EQ(second.json["data"]["files"].size(), 2U);
-    EXPECT_EQ(readFile(root + "/sub/two\xFF\n.txt"), "2222");
-    EXPECT_EQ(namesIn(root + "/sub"), (Names{"\\three", "two\xFF\n.txt"}));
-    for (const std::string& name : namesIn(root + "/sub")) expectOwned(root + "/sub/" + name, kAliceUid, 0644);
+    EXPECT_EQ(readFile(photo_ + "/sub/two\xFF\n.txt"), "2222");
+    EXPECT_EQ(namesIn(photo_ + "/sub"), (Names{"\\three", "two\xFF\n.txt"}));
+    for (const std::string& name : namesIn(photo_ + "/sub")) expectOwned(photo_ + "/sub/" + name, kAliceUid, 0644);
 }
 
 TEST_F(UploadCgi, FilesKeepTheirTimes) {
-    const std::string root = shareRoot("photo");
     const auto modified = [&](const std::string& name) {
         struct stat status {};
-        EXPECT_EQ(stat((root + "/" + name).c_str(), &status), 0) << name;
+        EXPECT_EQ(stat((photo_ + "/" + name).c_str(), &status), 0) << name;
         return status.st_mtime;
     };
     const time_t before = time(nullptr);
@@ -176,10 +169,9 @@ TEST_F(UploadCgi, FilesKeepTheirTimes) {
     EXPECT_EQ(modified("a"), 1000000000);
     EXPECT_EQ(code(put("alice", "/photo/a", "2", "overwrite&mtime=4294967295")), 0);
     EXPECT_EQ(modified("a"), 4294967295);
-    for (const char* bad : {"4294967296", "-1", "1.5", "x"}) {
+    for (const char* bad : {"4294967296", "-1", "1.5", "x"})
         EXPECT_EQ(put("alice", "/photo/a", "3", std::string("overwrite&mtime=") + bad).status, 400) << bad;
-    }
-    EXPECT_EQ(readFile(root + "/a"), "2");
+    EXPECT_EQ(readFile(photo_ + "/a"), "2");
     EXPECT_EQ(code(post("alice", "path=/photo",
                         part("name=mtime", "7") + part("name=f; filename=b", "") + part("name=f; filename=c", "") +
                             part("name=mtime", "9") + part("name=f; filename=d", "") + "--XX--\r\n")),
@@ -190,7 +182,6 @@ TEST_F(UploadCgi, FilesKeepTheirTimes) {
 }
 
 TEST_F(UploadCgi, ABrokenFormKeepsOnlyItsWholeFiles) {
-    const std::string root = shareRoot("photo");
     const std::string file = part("name=a; filename=\"one\"", "1");
     for (const auto& [body, expected, left] : Rows<std::string, int, Names>{
              {file, 1800, {}},
@@ -206,9 +197,9 @@ TEST_F(UploadCgi, ABrokenFormKeepsOnlyItsWholeFiles) {
         SCOPED_TRACE(body.substr(0, 200));
         const CgiReply reply = post("alice", "path=/photo", body);
         EXPECT_EQ(code(reply), expected);
-        EXPECT_EQ(namesIn(root), left);
+        EXPECT_EQ(namesIn(photo_), left);
         EXPECT_EQ(reply.json["data"]["files"].size(), left.size());
-        fs::remove(root + "/one");
+        fs::remove(photo_ + "/one");
     }
     EXPECT_EQ(temporaries(kAliceUid), Names{});
     for (const char* type : {"multipart/form-data", "multipart/mixed; boundary=XX", "multipart/form-data; boundary="}) {
@@ -218,7 +209,6 @@ TEST_F(UploadCgi, ABrokenFormKeepsOnlyItsWholeFiles) {
 }
 
 TEST_F(UploadCgi, FullAndReadOnlyFileSystems) {
-    const std::string root = shareRoot("photo");
     put("alice", "/photo/first", "makes the temporary folders");
     const std::string big(size_t{3} << 20, 'x');
     struct {
@@ -227,11 +217,11 @@ TEST_F(UploadCgi, FullAndReadOnlyFileSystems) {
         unsigned long flags;
         int code;
     } const cases[] = {
-        {root, "size=1m,mode=0777", 0, 416},
+        {photo_, "size=1m,mode=0777", 0, 416},
         {"/tmp/@tmp/orvel", "size=1m,mode=0777", 0, 416},
-        {root, "mode=0777,usrquota_block_hardlimit=1M", 0, 415},
+        {photo_, "mode=0777,usrquota_block_hardlimit=1M", 0, 415},
         {"/tmp/@tmp/orvel", "mode=0777,usrquota_block_hardlimit=1M", 0, 415},
-        {root, "mode=0777", MS_RDONLY, 407},
+        {photo_, "mode=0777", MS_RDONLY, 407},
         {"/tmp/@tmp/orvel", "mode=0777", MS_RDONLY, 411},
     };
     for (const auto& full : cases) {
@@ -243,14 +233,14 @@ TEST_F(UploadCgi, FullAndReadOnlyFileSystems) {
             EXPECT_EQ(code(put("alice", "/photo/new/big", big, "overwrite")), full.code);
             Names left;
             for (const auto& entry : fs::recursive_directory_iterator(full.folder)) {
-                if (entry.is_regular_file() || full.folder == root) left.push_back(entry.path());
+                if (entry.is_regular_file() || full.folder == photo_) left.push_back(entry.path());
             }
             EXPECT_EQ(left, Names{});
             return 0;
         });
         if (result != 0) std::cout << "SKIPPED: could not mount a file system with " << full.options << '\n';
     }
-    EXPECT_EQ(namesIn(root), Names{"first"});
+    EXPECT_EQ(namesIn(photo_), Names{"first"});
 }
 
 TEST_F(UploadCgi, WhatAKilledUploadLeftIsRemovedByALaterOne) {

@@ -1,6 +1,4 @@
 // Uploads that name the state of the file that they replace.
-#include <fcntl.h>
-#include <unistd.h>
 
 #include <thread>
 
@@ -78,7 +76,7 @@ TEST_F(UploadConditionCgi, OfManyAtOnceNoChangeIsLost) {
     writeFile(shareRoot("photo") + "/f", "");
     give(shareRoot("photo") + "/f");
     std::vector<std::thread> writers;
-    for (int writer = 0; writer < kWriters; ++writer) {
+    for (int writer = 0; writer < kWriters; ++writer)
         writers.emplace_back([writer] {
             for (int line = 0; line < kLines;) {
                 const RawReply read = fetch();
@@ -89,7 +87,6 @@ TEST_F(UploadConditionCgi, OfManyAtOnceNoChangeIsLost) {
                 if (reply.status != 200 && reply.status != 412) return;
             }
         });
-    }
     for (std::thread& writer : writers) writer.join();
     const std::string text = readFile(shareRoot("photo") + "/f");
     EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), kWriters * kLines) << text;

@@ -24,11 +24,11 @@ expect() { # what, wanted, got
 until_true() { # what, command...
     local what=$1
     shift
-    for _ in $(seq 300); do
+    for _ in $(seq 1200); do
         "$@" >/dev/null 2>&1 && return
         sleep 0.1
     done
-    expect "$what" "in half a minute" never
+    expect "$what" "in two minutes" never
 }
 
 user=$(id -un)
@@ -77,7 +77,7 @@ stop() { # signal
 # Starts $server with its configuration on a port of its own.
 serve() {
     local user_line=user_$server
-    port=$((20000 + $$ % 12000))
+    port=$((20000 + $$ * 4 % 12000))
     while answers; do port=$((port + 1)); done
     state=$work/$server
     mkdir -p "$state"

@@ -3,9 +3,6 @@
 
 #include <optional>
 
-#include "base/descriptor.h"
-#include "support/race.h"
-#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 namespace {

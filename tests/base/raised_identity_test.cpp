@@ -2,7 +2,6 @@
 #include "base/raised_identity.h"
 
 #include "base/random.h"
-#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 namespace {

@@ -1,7 +1,5 @@
 #include "base/wildcard.h"
 
-#include <random>
-
 #include "base/wildcard_model.h"
 #include "orvel/text.h"
 #include "support/testing.h"

@@ -1,4 +1,3 @@
-#include "base/descriptor.h"
 #include "orvel/privilege.h"
 #include "support/testing.h"
 
@@ -51,28 +50,27 @@ TEST_F(AclPrivilegeTest, PermissionsOfTheCaller) {
 }
 
 TEST_F(AclPrivilegeTest, EnteringAFolder) {
-    const std::string root = shareRoot("photo");
-    writeFile(root + "/file", "x");
+    writeFile(photo_ + "/file", "x");
     EXPECT_FALSE(CheckDirListPrivilege(nullptr));
     for (const auto& [path, code, failure] :
-         Rows<std::string, int, int>{{root + "/none", 408, ENOENT},
-                                     {root + "/file", 408, ENOTDIR},
-                                     {root + "/" + std::string(300, 'x'), 402, ENAMETOOLONG}}) {
+         Rows<std::string, int, int>{{photo_ + "/none", 408, ENOENT},
+                                     {photo_ + "/file", 408, ENOTDIR},
+                                     {photo_ + "/" + std::string(300, 'x'), 402, ENAMETOOLONG}}) {
         OrvLibSetErr(7);
         EXPECT_CODE(CheckDirListPrivilege(path.c_str()), false, code);
         EXPECT_EQ(takeLogText(), "orveldir:# Failed to chdir " + path + ". [" + strerror(failure) + "]");
     }
     OrvLibSetErr(7);
-    EXPECT_CODE(CheckDirListPrivilege(root.c_str()), true, 0);
-    EXPECT_EQ(fs::current_path(), root) << "callers go on from inside the folder";
-    const orvel::Descriptor opened(open((root + "/file").c_str(), O_PATH | O_CLOEXEC));
-    fs::rename(root + "/file", root + "/moved");
-    makeFolder(root + "/file");
+    EXPECT_CODE(CheckDirListPrivilege(photo_.c_str()), true, 0);
+    EXPECT_EQ(fs::current_path(), photo_) << "callers go on from inside the folder";
+    const orvel::Descriptor opened(open((photo_ + "/file").c_str(), O_PATH | O_CLOEXEC));
+    fs::rename(photo_ + "/file", photo_ + "/moved");
+    makeFolder(photo_ + "/file");
     EXPECT_FALSE(CheckDirListPrivilege(opened.path().c_str())) << "what is open is asked about";
-    EXPECT_EQ(takeLogText(), "orveldir:# Failed to chdir " + root + "/moved. [Not a directory]");
+    EXPECT_EQ(takeLogText(), "orveldir:# Failed to chdir " + photo_ + "/moved. [Not a directory]");
 
     SKIP_WITHOUT_ROOT();
-    const std::string closed = root + "/closed", unread = root + "/unread";
+    const std::string closed = photo_ + "/closed", unread = photo_ + "/unread";
     makeFolder(closed, 0700);
     makeFolder(unread, 0711);
     asUser(kBobUid, kUsersGid, [&] {

@@ -13,9 +13,8 @@ TEST_F(HomePathTest, LocalUsers) {
              row("/homex", kNobody, false), row("", "alice", false), row("/homes/alice", kNobody, false),
              row("/homes", "alice", false), row("/HOMES/Alice/x", "alice", true), row("/homes/alicex", "alice", false),
              row("/homes/alic", "alice", false), row("/homes/alice/x", "bob", false),
-             row("/homes//alice", "alice", false), row("/photo/alice", "alice", false)}) {
+             row("/homes//alice", "alice", false), row("/photo/alice", "alice", false)})
         EXPECT_EQ(IsDirUserHome(path, user), home) << path << " for " << (user != nullptr ? user : "null");
-    }
     EXPECT_EQ(vexo::gate::calls("*"), 0) << "the platform is not asked about local users";
     EXPECT_EQ(OrvLibGetErr(), 0);
 }
@@ -26,15 +25,9 @@ TEST_F(HomePathTest, DomainAndDirectoryUsersByTheirHomeFolder) {
     addUser("CORP\\eve", 20010, kUsersGid);
     addUser("eve@corp", 20011, kUsersGid);
     writeRootFile("/etc/vexo/shares.conf", "[homes]\npath = /orvel-no-such-volume/homes\nread only = no\n");
-    const Rows<const char*, const char*, bool> rows = {
-        {"/homes/@CORP/eve", "CORP\\eve", true},     {"/Homes/@corp/EVE/x", "CORP\\eve", true},
-        {"/homes/@CORP/evelyn", "CORP\\eve", false}, {"/homes/CORP\\eve", "CORP\\eve", false},
-        {"/homes/eve@corp/x", "eve@corp", true},     {"/homes/eve@corp.org", "eve@corp", false},
-        {"/homes/eve@corp", "unknown@corp", false},  {"/home/x", "CORP\\eve", true},
-        {"/homes/@CORP/eve", nullptr, false}};
-    for (const auto& [path, user, home] : rows) {
+    const Rows<const char*, const char*, bool> rows = rowsOf<const char*, const char*, bool>("core/home_folders");
+    for (const auto& [path, user, home] : rows)
         EXPECT_EQ(IsDirUserHome(path, user), home) << path << " for " << (user != nullptr ? user : "null");
-    }
     EXPECT_EQ(vexo::gate::calls("VEXOFSMkdirP"), 0);
     setSetting("userhome_enable", "yes");
     vexo::gate::fail("VEXOFSMkdirP", 0x8100);

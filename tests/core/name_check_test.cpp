@@ -33,13 +33,12 @@ TEST_F(NameCheckTest, NamesOfFiles) {
 }
 
 TEST_F(NameCheckTest, Paths) {
-    const std::string disk = shareRoot("photo");
     const std::string fat = addShare("usb", "read only = no\n"), dead = addShare("dead", "read only = no\n");
     addMount(fat, "vfat");
     addMount(dead + "/gone", "nfs");
-    writeFile(disk + "/file", "x");
-    ASSERT_EQ(mkfifo((disk + "/fifo").c_str(), 0600), 0);
-    ASSERT_EQ(symlink("file", (disk + "/link").c_str()), 0);
+    writeFile(photo_ + "/file", "x");
+    ASSERT_EQ(mkfifo((photo_ + "/fifo").c_str(), 0600), 0);
+    ASSERT_EQ(symlink("file", (photo_ + "/link").c_str()), 0);
 
     const std::string longName(256, 'n');
     // `existing` on success; `log` "" for none.
@@ -48,12 +47,12 @@ TEST_F(NameCheckTest, Paths) {
              row("", true, 400, 0, "", ""), row("relative/x", true, 400, VEXO_ERR_PARAMETER, "", ""),
              row("/", true, 408, VEXO_ERR_MISSING, "", ""), row("//x", false, 400, 0, "", ""),
              row("/no-such-volume/a", true, 408, VEXO_ERR_MISSING, "", ""),
-             row(disk + "/file/", true, 0, 0, disk + "/file", ""),
-             row(disk + "/new/deeper", false, 408, VEXO_ERR_MISSING, "", ""),
-             row(disk + "/n?w/..", true, 0, 0, disk, ""), row(disk + "/" + longName, true, 0, 0, disk, ""),
-             row(disk + "/" + longName, false, 401, VEXO_ERR_GENERAL, "", "Failed to lstat"),
-             row(disk + "/fifo", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"),
-             row(disk + "/link", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"),
+             row(photo_ + "/file/", true, 0, 0, photo_ + "/file", ""),
+             row(photo_ + "/new/deeper", false, 408, VEXO_ERR_MISSING, "", ""),
+             row(photo_ + "/n?w/..", true, 0, 0, photo_, ""), row(photo_ + "/" + longName, true, 0, 0, photo_, ""),
+             row(photo_ + "/" + longName, false, 401, VEXO_ERR_GENERAL, "", "Failed to lstat"),
+             row(photo_ + "/fifo", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"),
+             row(photo_ + "/link", false, 401, VEXO_ERR_GENERAL, "", "Path is not regular file and directory:"),
              row(fat + "/a/b?c", true, 419, 0, fat, ""), row(fat + "/a/b", true, 0, 0, fat, ""),
              row(dead + "/gone", false, 410, VEXO_ERR_REMOTE_MOUNT, "", "")}) {
         SCOPED_TRACE(path + (walkUp ? " up" : ""));
@@ -70,11 +69,11 @@ TEST_F(NameCheckTest, Paths) {
     }
     EXPECT_CODE(OrvCheckPath(nullptr, true, ORV_NO_ACL_TEST, nullptr), -1, 400);
     vexo::gate::fail("VEXOGetFSType", VEXO_ERR_GENERAL, EIO);
-    announceLog("Failed to statfs " + disk + ", reason=Input/output error");
-    EXPECT_CODE(OrvCheckPath((disk + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), -1, 417);
+    announceLog("Failed to statfs " + photo_ + ", reason=Input/output error");
+    EXPECT_CODE(OrvCheckPath((photo_ + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), -1, 417);
     vexo::gate::reset();
-    EXPECT_EQ(OrvCheckPath((disk + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), 0);
-    const std::string beyond = disk + "/" + std::string(5000, 'x');
+    EXPECT_EQ(OrvCheckPath((photo_ + "/new").c_str(), true, ORV_NO_ACL_TEST, nullptr), 0);
+    const std::string beyond = photo_ + "/" + std::string(5000, 'x');
     EXPECT_EQ(OrvCheckPath(beyond.c_str(), true, ORV_NO_ACL_TEST, nullptr), 0) << "cut";
     addMount("/tmp", "vfat");
     EXPECT_EQ(OrvCheckPath("/tmp/orvel?missing/x", true, ORV_NO_ACL_TEST, nullptr), 0) << "a first component alone";
@@ -122,18 +121,16 @@ TEST(Utf8Pattern, Table) {
     // Overlong sequences and surrogates pass.
     for (const char* text :
          {static_cast<const char*>(nullptr), "", "plain", "\xC3\xA9", "\xE4\xBD\xA0", "\xF0\x9F\x98\x80",
-          "\xF8\x88\x80\x80\x80", "\xFC\x84\x80\x80\x80\x80", "\xC0\x80", "\xED\xA0\x80"}) {
+          "\xF8\x88\x80\x80\x80", "\xFC\x84\x80\x80\x80\x80", "\xC0\x80", "\xED\xA0\x80"})
         EXPECT_TRUE(IsUnicodeString(text));
-    }
     for (const char* text :
-         {"\xC3\x28", "\x80", "a\xBF", "\xE4\xBD", "\xFC\x84\x80\x80\x80", "\xFE\x80\x80\x80\x80\x80", "\xFF"}) {
+         {"\xC3\x28", "\x80", "a\xBF", "\xE4\xBD", "\xFC\x84\x80\x80\x80", "\xFE\x80\x80\x80\x80\x80", "\xFF"})
         EXPECT_FALSE(IsUnicodeString(text)) << text;
-    }
 }
 
 TEST_F(NameCheckTest, TemporaryFoldersAreOpenToAll) {
-    const std::string root = shareRoot("photo");
-    std::string volume = root, plain = root + "/plain", dangling = root + "/dangling", missing = root + "/missing";
+    std::string volume = photo_, plain = photo_ + "/plain", dangling = photo_ + "/dangling",
+                missing = photo_ + "/missing";
     inChild([&] {
         umask(077);
         EXPECT_EQ(OrvCreateTmpDir(volume.data()), 0);

@@ -1,6 +1,6 @@
 #include "orvel/privilege.h"
 #include "support/fault_sweep.h"
-#include "support/table.h"
+#include "support/testing.h"
 
 namespace {
 

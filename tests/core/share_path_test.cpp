@@ -2,7 +2,7 @@
 
 #include <climits>
 
-#include "support/table.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -66,7 +66,6 @@ TEST_F(SharePathTest, SharesResolve) {
         EXPECT_EQ(out.root, top);
         EXPECT_EQ(out.real + out.volume, std::string(top) + "/a/b" + volume);
     }
-    unsetenv("REMOTE_USER");
     std::string both = "/photo/x", real, volume, top;  // the path may lie in an output
     EXPECT_EQ(OrvFullPathGet(both.c_str(), real, both, volume, top, "alice"), 1);
     EXPECT_EQ(real + both, root + "/xphoto");
@@ -144,27 +143,26 @@ TEST_F(SharePathTest, HomeThatCannotBeHad) {
 }
 
 TEST_F(SharePathTest, CanonicalPaths) {
-    const std::string root = shareRoot("photo");
-    makeFolder(root + "/a");
-    writeFile(root + "/file", "x");
-    ASSERT_EQ(symlink("a", (root + "/link").c_str()), 0);
+    makeFolder(photo_ + "/a");
+    writeFile(photo_ + "/file", "x");
+    ASSERT_EQ(symlink("a", (photo_ + "/link").c_str()), 0);
     char resolved[PATH_MAX];
-    EXPECT_EQ(OrvLibRealFullPathGet((root + "//link/./../a").c_str(), resolved, 1), 1);
-    EXPECT_EQ(std::string(resolved), root + "/a");
+    EXPECT_EQ(OrvLibRealFullPathGet((photo_ + "//link/./../a").c_str(), resolved, 1), 1);
+    EXPECT_EQ(std::string(resolved), photo_ + "/a");
 
     for (const auto& [path, failure, code] :
-         Rows<std::string, int, int>{row(root + "/none", ENOENT, 408), row(root + "/file/x", ENOTDIR, 401),
+         Rows<std::string, int, int>{row(photo_ + "/none", ENOENT, 408), row(photo_ + "/file/x", ENOTDIR, 401),
                                      row("/" + std::string(5000, 'x'), ENAMETOOLONG, 401), row("", ENOENT, 408)}) {
         EXPECT_EQ(OrvLibRealFullPathGet(path.c_str(), resolved, 4095), 0);
         EXPECT_EQ(errno, failure);
         EXPECT_EQ(OrvLibGetErr(), code) << path;
         EXPECT_EQ(takeLogTexts(), Texts{"orveldir:# readpath(" + path + ") fail (" + strerror(failure) + ")"});
     }
-    EXPECT_CODE(OrvLibRealFullPathGet(root.c_str(), resolved, 0), 0, 400);
+    EXPECT_CODE(OrvLibRealFullPathGet(photo_.c_str(), resolved, 0), 0, 400);
     SKIP_WITHOUT_ROOT();
-    ASSERT_EQ(chmod(root.c_str(), 0700), 0);
+    ASSERT_EQ(chmod(photo_.c_str(), 0700), 0);
     asUser(kBobUid, kUsersGid, [&] {
-        EXPECT_CODE(OrvLibRealFullPathGet((root + "/a").c_str(), resolved, 4095), 0, 407);
+        EXPECT_CODE(OrvLibRealFullPathGet((photo_ + "/a").c_str(), resolved, 4095), 0, 407);
         takeLog();
     });
 }

@@ -1,6 +1,6 @@
 #include "orvel/upload_check.h"
 
-#include "support/table.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -10,9 +10,8 @@ class UploadCheckTest : public ApplianceTest {};
 
 TEST(UploadErrors, Table) {
     const int codes[] = {401, 1803, 401, 401, 415, 412, 401, 1802, 1801, 1800, 1800, 408, 411, 416, 407, 401};
-    for (int error = -15; error <= 0; ++error) {
+    for (int error = -15; error <= 0; ++error)
         EXPECT_EQ(ConvUploadErrnoToAPIErr(static_cast<_tag_cgi_upload_errno_>(error)), codes[error + 15]) << error;
-    }
 }
 
 TEST_F(UploadCheckTest, CopyFailuresHaveCodesOfTheirOwn) {
@@ -53,9 +52,8 @@ TEST_F(UploadCheckTest, MoveGivesTheFileToItsUser) {
 // CheckFile changes the identity for good: each case in a process of its own.
 TEST_F(UploadCheckTest, CheckedInOrder) {
     SKIP_WITHOUT_ROOT();
-    const std::string root = shareRoot("photo");
-    writeFile(root + "/there", "x", 0666);
-    makeFolder(root + "/closed", 0755);
+    writeFile(photo_ + "/there", "x", 0666);
+    makeFolder(photo_ + "/closed", 0755);
     addShare("fixed", "read only = no\nvexo:restriction = 2\n");
     for (const auto& [user, path, before, result, switched, log, after] :
          rowsOf<const char*, const char*, int, int, bool, const char*, int>("core/checked_files")) {
@@ -75,7 +73,7 @@ TEST_F(UploadCheckTest, CheckedInOrder) {
 
 // The look-up of permissions can fail without a code; what was stored before is answered then, but never "acceptable".
 TEST_F(UploadCheckTest, ARefusalIsNeverZero) {
-    for (const auto& [before, answer, log] : Rows<int, int, const char*>{{0, 401, "reason=[191]"}, {7, 7, "=[7]"}}) {
+    for (const auto& [before, answer, log] : Rows<int, int, const char*>{{0, 401, "reason=[191]"}, {7, 7, "=[7]"}})
         inChild([before = before, answer = answer, log = log] {
             OrvLibSetErr(before);
             vexo::gate::fail("VEXOACLPermGet", VEXO_ERR_GENERAL);
@@ -83,7 +81,6 @@ TEST_F(UploadCheckTest, ARefusalIsNeverZero) {
             EXPECT_EQ(CheckFile("/photo/a", "alice", nullptr, mode), answer);
             EXPECT_TRUE(OrvLibGetErr() == answer && takeLogText().ends_with(log));
         });
-    }
 }
 
 TEST_F(UploadCheckTest, ASwitchThatLeavesRootIsRefused) {

@@ -5,7 +5,6 @@
 
 #include <stdexcept>
 
-#include "base/descriptor.h"
 #include "support/system_faults.h"
 #include "support/testing.h"
 
@@ -76,15 +75,11 @@ void expectLevel(Order order, const std::string& real, const std::string& displa
 
 class DirectoryWalkerTest : public ApplianceTest {
  protected:
-    void SetUp() override {
-        ApplianceTest::SetUp();
-        root_ = shareRoot("photo");
-    }
     // Three levels, files and folders on each.
     void makeTree() {
-        for (const char* folder : {"/a", "/a/deep", "/b", "/b/deep", "/empty"}) makeFolder(root_ + folder);
+        for (const char* folder : {"/a", "/a/deep", "/b", "/b/deep", "/empty"}) makeFolder(photo_ + folder);
         for (const char* file : {"/f", "/a/f", "/a/deep/f", "/a/deep/g", "/b/deep/f", "/z"})
-            writeFile(root_ + file, "x");
+            writeFile(photo_ + file, "x");
     }
     // The walk alone calls something behind an entry.
     bool walk(Order order, int errors, const std::string& root, int* abortFlag = nullptr, bool skipRecycle = false) {
@@ -103,11 +98,10 @@ class DirectoryWalkerTest : public ApplianceTest {
     }
     Lines expected(Order order) const {
         Lines lines;
-        expectLevel(order, root_, "show", lines);
+        expectLevel(order, photo_, "show", lines);
         return lines;
     }
 
-    std::string root_;
     Lines lines_;
     Recorder before_{lines_, ""}, after_{lines_, "-"};
 };
@@ -115,19 +109,19 @@ class DirectoryWalkerTest : public ApplianceTest {
 TEST_F(DirectoryWalkerTest, OrdersOnAHostileTree) {
     makeTree();
     for (const std::string& name : {std::string(255, 'n'), std::string("line\nbreak"), std::string("\xFF\xFE\x80")})
-        writeFile(below(below(root_ + "/a", name), name), "x");
-    for (const char* hidden : {"/@tmp", "/@vexoea", "/b/@tmp"}) writeFile(root_ + hidden + "/inside", "x");
-    for (const char* bin : {"/#recycle", "/b/#recycle"}) writeFile(root_ + bin + "/thrown away", "x");
+        writeFile(below(below(photo_ + "/a", name), name), "x");
+    for (const char* hidden : {"/@tmp", "/@vexoea", "/b/@tmp"}) writeFile(photo_ + hidden + "/inside", "x");
+    for (const char* bin : {"/#recycle", "/b/#recycle"}) writeFile(photo_ + bin + "/thrown away", "x");
     for (const auto& [target, link] :
          Rows<const char*, const char*>{{"..", "/a/loop"}, {"/", "/a/out"}, {"nowhere", "/dangling"}})
-        ASSERT_EQ(symlink(target, (root_ + link).c_str()), 0);
-    ASSERT_EQ(mkfifo((root_ + "/b/pipe").c_str(), 0600), 0);
+        ASSERT_EQ(symlink(target, (photo_ + link).c_str()), 0);
+    ASSERT_EQ(mkfifo((photo_ + "/b/pipe").c_str(), 0600), 0);
 
     for (const Order order : kOrders) {
         SCOPED_TRACE(static_cast<int>(order));
         for (const bool skipRecycle : {false, true}) {
             vexo::gate::reset();
-            EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, root_, nullptr, skipRecycle));
+            EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, photo_, nullptr, skipRecycle));
             Lines all = expected(order);
             const auto inBin = [](const auto& line) { return line.find("show/#recycle") != std::string::npos; };
             if (skipRecycle) std::erase_if(all, inBin);
@@ -138,7 +132,7 @@ TEST_F(DirectoryWalkerTest, OrdersOnAHostileTree) {
     }
     lines_.clear();
     OrvDirectoryWalker walker(ENUM_IGNORE_NO_ERR, nullptr);
-    EXPECT_TRUE(walker.Walk("show", "the context", root_, nullptr, &after_, &Recorder::kExtra, false));
+    EXPECT_TRUE(walker.Walk("show", "the context", photo_, nullptr, &after_, &Recorder::kExtra, false));
     EXPECT_TRUE(!lines_.empty() && std::all_of(lines_.begin(), lines_.end(), isClosing)) << "either may be missing";
 }
 
@@ -148,12 +142,12 @@ TEST_F(DirectoryWalkerTest, StopsWhenACallbackSaysSo) {
         const Lines all = expected(order);
         for (size_t stop = 1; stop <= all.size(); ++stop) {
             before_.action = after_.action = [&](const auto&, const auto&) { return lines_.size() < stop; };
-            EXPECT_FALSE(walk(order, ENUM_IGNORE_ALL_ERR, root_));
+            EXPECT_FALSE(walk(order, ENUM_IGNORE_ALL_ERR, photo_));
             EXPECT_EQ(lines_, Lines(all.begin(), all.begin() + static_cast<std::ptrdiff_t>(stop)));
         }
     }
     before_.action = [](const auto&, const auto&) -> bool { throw std::runtime_error("from a callback"); };
-    EXPECT_FALSE(walk(Order::kTopDown, ENUM_IGNORE_ALL_ERR, root_)) << "no exception crosses";
+    EXPECT_FALSE(walk(Order::kTopDown, ENUM_IGNORE_ALL_ERR, photo_)) << "no exception crosses";
 }
 
 TEST_F(DirectoryWalkerTest, AbortFlagCancels) {
@@ -169,7 +163,7 @@ TEST_F(DirectoryWalkerTest, AbortFlagCancels) {
                     if (++seen == stop) flag = raised;
                     return true;
                 };
-                EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, root_, &flag));
+                EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, photo_, &flag));
                 EXPECT_EQ(std::erase_if(lines_, isClosing), order == Order::kWalk ? seen : 0)
                     << "the folders that a cancelled walk is in are closed";
                 EXPECT_EQ(lines_.size(), raised == 1 ? stop : all.size());
@@ -188,16 +182,16 @@ TEST_F(DirectoryWalkerTest, CancelledOnceIsCancelledForGood) {
         return true;
     };
     after_.action = [&](const auto&, const auto&) { return flag = 0, true; };
-    EXPECT_TRUE(walk(Order::kWalk, ENUM_IGNORE_NO_ERR, root_, &flag));
+    EXPECT_TRUE(walk(Order::kWalk, ENUM_IGNORE_NO_ERR, photo_, &flag));
     EXPECT_EQ(lines_.back(), "-show/" + chosen) << "nothing below it, nothing behind it";
 }
 
 TEST_F(DirectoryWalkerTest, LeavesTheProcessInTheLastFolderEntered) {
-    writeFile(root_ + "/z", "x");
-    makeFolder(root_ + "/a/deep");
+    writeFile(photo_ + "/z", "x");
+    makeFolder(photo_ + "/a/deep");
     for (const Order order : kOrders) {
-        EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, root_));
-        EXPECT_EQ(fs::current_path(), root_ + (order == Order::kFirstFolderOnly ? "" : "/a/deep"));
+        EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, photo_));
+        EXPECT_EQ(fs::current_path(), photo_ + (order == Order::kFirstFolderOnly ? "" : "/a/deep"));
     }
 }
 
@@ -214,7 +208,7 @@ class Failures : public DirectoryWalkerTest {
                 SCOPED_TRACE(log + " mode " + std::to_string(errors) + std::to_string(static_cast<int>(order)));
                 vexo::gate::reset();
                 cause();
-                EXPECT_EQ(walk(order, errors, root_ + start), ignored);
+                EXPECT_EQ(walk(order, errors, photo_ + start), ignored);
                 EXPECT_EQ(takeLogText(), ignored ? "" : "orveldir:# " + log);
                 if (!ignored) continue;
                 EXPECT_EQ(std::erase_if(lines_, isClosing), order == Order::kWalk ? entries.size() : 0);
@@ -226,54 +220,53 @@ class Failures : public DirectoryWalkerTest {
 };
 
 TEST_F(Failures, OfTheStartingFolderAndOfAStatus) {
-    writeFile(root_ + "/a/f", "x");
-    writeFile(root_ + "/file", "x");
+    writeFile(photo_ + "/a/f", "x");
+    writeFile(photo_ + "/file", "x");
     const std::string longPath = "/" + std::string(5000, 'p');
-    check("/no", false, "Failed to chdir " + root_ + "/no. [No such file or directory]");
-    check("/file", false, "Failed to chdir " + root_ + "/file. [Not a directory]");
-    check(longPath, false, "Failed to chdir " + root_ + longPath + ". [File name too long]");
-    for (const int error : {EIO, EACCES, EPERM}) {
-        check("/a", error != EIO, "VLIBCFileLStat: (" + root_ + "/a/f), " + strerror(error) + ", vexoerr=8100.", {},
+    check("/no", false, "Failed to chdir " + photo_ + "/no. [No such file or directory]");
+    check("/file", false, "Failed to chdir " + photo_ + "/file. [Not a directory]");
+    check(longPath, false, "Failed to chdir " + photo_ + longPath + ". [File name too long]");
+    for (const int error : {EIO, EACCES, EPERM})
+        check("/a", error != EIO, "VLIBCFileLStat: (" + photo_ + "/a/f), " + strerror(error) + ", vexoerr=8100.", {},
               [&] { vexo::gate::fail("VLIBCFileLStatAt", 0x8100, error, 1); });
-    }
 }
 
 // Opening is what fails then, at the start as below.
 TEST_F(Failures, OfAProcessWithoutDescriptors) {
-    writeFile(root_ + "/a/b/f", "x");
+    writeFile(photo_ + "/a/b/f", "x");
     inChild([&] {
         const int lowest = dup(0);
         close(lowest);
         for (const auto& [more, failing] : Rows<int, const char*>{{0, ""}, {2, "/a/b"}}) {
             const rlimit few{static_cast<rlim_t>(lowest + more), 1024};
             EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &few), 0);
-            EXPECT_FALSE(walk(Order::kTopDown, ENUM_IGNORE_NO_ERR, root_));
+            EXPECT_FALSE(walk(Order::kTopDown, ENUM_IGNORE_NO_ERR, photo_));
             const rlimit many{1024, 1024};
             EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &many), 0);
-            EXPECT_EQ(takeLogText(), "orveldir:# Failed to open " + root_ + failing + ", error Too many open files");
+            EXPECT_EQ(takeLogText(), "orveldir:# Failed to open " + photo_ + failing + ", error Too many open files");
         }
     });
 }
 
 TEST_F(Failures, OfReading) {
-    makeFolder(root_ + "/a/sub");
-    makeFolder(root_ + "/z");
+    makeFolder(photo_ + "/a/sub");
+    makeFolder(photo_ + "/z");
     for (const int nth : {1, 2}) {  // at once, and behind what the first reading brought
         std::optional<ReadingFault> fault;
         Lines entries{"show/a", "show/a/sub", "show/z"};
         if (nth == 1) entries.erase(entries.begin() + 1);
-        check("", false, "Failed to open " + root_ + "/a, error Input/output error", entries,
-              [&] { fault.emplace(root_ + "/a", EIO, nth); });
+        check("", false, "Failed to open " + photo_ + "/a, error Input/output error", entries,
+              [&] { fault.emplace(photo_ + "/a", EIO, nth); });
     }
-    ReadingFault gone(root_ + "/a", ENOENT);
-    EXPECT_TRUE(walk(Order::kTopDown, ENUM_IGNORE_NO_ERR, root_)) << "a folder removed meanwhile has no entries";
+    ReadingFault gone(photo_ + "/a", ENOENT);
+    EXPECT_TRUE(walk(Order::kTopDown, ENUM_IGNORE_NO_ERR, photo_)) << "a folder removed meanwhile has no entries";
 }
 
 TEST_F(Failures, OfPermissionsAsAnUnprivilegedUser) {
     SKIP_WITHOUT_ROOT();
-    const std::string closed = root_ + "/closed";
+    const std::string closed = photo_ + "/closed";
     writeFile(closed + "/f", "x");
-    writeFile(root_ + "/open/f", "x");
+    writeFile(photo_ + "/open/f", "x");
     ASSERT_EQ(chown(closed.c_str(), kBobUid, kUsersGid), 0);
     for (const mode_t mode : {0000, 0400, 0300}) {
         chmod(closed.c_str(), mode);
@@ -292,7 +285,7 @@ TEST_F(Failures, OfPermissionsAsAnUnprivilegedUser) {
 // A callback puts something else in the place of the folder that it was just called for. A link is not followed; which
 // folder it is must not matter, since some file systems number a folder anew each time that it is looked up.
 TEST_F(DirectoryWalkerTest, FolderReplacedDuringTheWalk) {
-    const std::string outside = addShare("outside", ""), victim = root_ + "/victim";
+    const std::string outside = addShare("outside", ""), victim = photo_ + "/victim";
     writeFile(outside + "/secret", "x");
     for (const bool byLink : {true, false}) {
         before_.action = [&](const std::string& path, const std::string& name) {
@@ -305,7 +298,7 @@ TEST_F(DirectoryWalkerTest, FolderReplacedDuringTheWalk) {
         for (const Order order : kDeepOrders) {
             for (const int errors : {ENUM_IGNORE_ALL_ERR, ENUM_IGNORE_NO_ERR}) {
                 writeFile(victim + "/f", "x");
-                EXPECT_EQ(walk(order, errors, root_), !byLink || errors == ENUM_IGNORE_ALL_ERR);
+                EXPECT_EQ(walk(order, errors, photo_), !byLink || errors == ENUM_IGNORE_ALL_ERR);
                 std::erase_if(lines_, isClosing);
                 EXPECT_EQ(lines_, byLink ? Lines{"show/victim"} : (Lines{"show/victim", "show/victim/new"}));
                 fs::remove_all(victim);
@@ -319,25 +312,25 @@ TEST_F(DirectoryWalkerTest, FolderReplacedDuringTheWalk) {
 // What the caller holds open is walked, wherever it lies by now, and called by where it was found.
 TEST_F(DirectoryWalkerTest, AnOpenFolder) {
     makeTree();
-    addMount(root_, "ext4");
-    writeFile(root_ + "/#recycle/thrown away", "x");
+    addMount(photo_, "ext4");
+    writeFile(photo_ + "/#recycle/thrown away", "x");
     for (const Order order : kOrders) {
-        const Descriptor opened(open(root_.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+        const Descriptor opened(open(photo_.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
         Lines all = expected(order), paths;
         std::erase_if(all, [](const auto& line) { return line.find("show/#recycle") != std::string::npos; });
         before_.action = [&](const std::string& path, const std::string&) { return paths.push_back(path), true; };
         EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, opened.path(), nullptr, true));
         EXPECT_EQ(lines_, all) << "the share's bin is known by its real path";
-        for (const std::string& path : paths) EXPECT_TRUE(path.starts_with(root_ + "/")) << path;
+        for (const std::string& path : paths) EXPECT_TRUE(path.starts_with(photo_ + "/")) << path;
 
-        const Descriptor inner(open((root_ + "/a").c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-        fs::rename(root_ + "/a", root_ + "/moved");
-        fs::create_symlink("b", root_ + "/a");
+        const Descriptor inner(open((photo_ + "/a").c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+        fs::rename(photo_ + "/a", photo_ + "/moved");
+        fs::create_symlink("b", photo_ + "/a");
         paths.clear();
         EXPECT_TRUE(walk(order, ENUM_IGNORE_NO_ERR, inner.path()));
-        EXPECT_TRUE(!paths.empty() && paths.front().starts_with(root_ + "/moved/"));
-        fs::remove(root_ + "/a");
-        fs::rename(root_ + "/moved", root_ + "/a");
+        EXPECT_TRUE(!paths.empty() && paths.front().starts_with(photo_ + "/moved/"));
+        fs::remove(photo_ + "/a");
+        fs::rename(photo_ + "/moved", photo_ + "/a");
     }
 }
 
@@ -363,7 +356,7 @@ TEST_F(DirectoryWalkerTest, FourThousandLevelsWithFewDescriptors) {
         close(open("f", O_CREAT | O_WRONLY | O_CLOEXEC, 0644));
         EXPECT_EQ(mkdir("d", 0755) + chdir("d"), 0);
     }
-    for (const Order order : {Order::kWalk, Order::kFirstFolder}) {
+    for (const Order order : {Order::kWalk, Order::kFirstFolder})
         inChild([&] {
             const rlimit few{256, 256}, smallStack{256 * 1024, 256 * 1024};
             EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &few) + setrlimit(RLIMIT_STACK, &smallStack), 0);
@@ -378,7 +371,6 @@ TEST_F(DirectoryWalkerTest, FourThousandLevelsWithFewDescriptors) {
             EXPECT_NE(std::find(lines_.begin(), lines_.end(), "show" + levels(kDepth)), lines_.end());
             return 0;
         });
-    }
     EXPECT_EQ(chdir(base.c_str()), 0);
     int depth = 0;
     while (chdir("d") == 0) ++depth;

@@ -107,9 +107,8 @@ TEST(FileInfo, TheTextIsTheObjects) {
     for (int byte = 0; byte < 256; ++byte) everyByte += static_cast<char>(byte);
     for (const std::string& name : {std::string(), everyByte, std::string(5000, '\1')}) {
         for (std::string* field :
-             {&info.name, &info.path, &info.realPath, &info.type, &info.owner, &info.group, &info.mountPointType}) {
+             {&info.name, &info.path, &info.realPath, &info.type, &info.owner, &info.group, &info.mountPointType})
             *field = name;
-        }
         expectSame(0xFF, info);
     }
     info = sample();

@@ -1,5 +1,4 @@
 #include <climits>
-#include <random>
 
 #include "enum/entry_order.h"
 #include "orvel/listing.h"

@@ -4,11 +4,9 @@
 
 #include <climits>
 
-#include "base/descriptor.h"
 #include "orvel/directory_walker.h"
 #include "orvel/privilege.h"
 #include "orvel/search_criteria.h"
-#include "support/refuse_calls.h"
 #include "support/system_faults.h"
 #include "support/testing.h"
 #include "vexo/acl.h"
@@ -30,7 +28,6 @@ class ListingTest : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
-        real_ = shareRoot("photo");
         addUser("owner", geteuid(), getegid());  // whoever runs the tests has a name
         addGroup("owners", getegid(), {});
     }
@@ -38,7 +35,7 @@ class ListingTest : public ApplianceTest {
     bool list(const char* sortBy = "name", int additional = 0, unsigned long offset = 0, unsigned long limit = 0,
               bool ascending = true, _tag_dir_entry_type_ type = DIR_ENTRY_TYPE_ALL) {
         entries_.clear();
-        return listing_.OrvLibDirEntryListEnum("/photo", real_.c_str(), sortBy, additional, offset, limit, ascending,
+        return listing_.OrvLibDirEntryListEnum("/photo", photo_.c_str(), sortBy, additional, offset, limit, ascending,
                                                type, criteria_, entries_, &total_);
     }
     Names listed(const char* sortBy = "name", int additional = 0, unsigned long offset = 0, unsigned long limit = 0,
@@ -46,8 +43,8 @@ class ListingTest : public ApplianceTest {
         EXPECT_TRUE(list(sortBy, additional, offset, limit, ascending, type)) << OrvLibGetErr();
         return namesOf(entries_);
     }
-    void file(const std::string& name, const std::string& text = "") { writeFile(real_ + "/" + name, text); }
-    void folder(const std::string& name) { makeFolder(real_ + "/" + name); }
+    void file(const std::string& name, const std::string& text = "") { writeFile(photo_ + "/" + name, text); }
+    void folder(const std::string& name) { makeFolder(photo_ + "/" + name); }
     // Two folders and four files that every column orders differently.
     void makeMixedFolder() {
         folder("beta");
@@ -58,13 +55,12 @@ class ListingTest : public ApplianceTest {
         for (const auto& [name, mode, time] :
              Rows<const char*, mode_t, time_t>{row("beta", 0755, 5), row("Alpha.zip", 0777, 4), row("c.txt", 0600, 300),
                                                row("B.jpg", 0644, 200), row("a", 0640, 100), row("d.TXT", 0400, 400)}) {
-            const std::string path = real_ + "/" + name;
+            const std::string path = photo_ + "/" + name;
             const timespec times[2] = {{1000 - time, 0}, {time, 0}};
             ASSERT_EQ(chmod(path.c_str(), mode) + utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
         }
     }
 
-    std::string real_;
     OrvEnum listing_;
     std::vector<FileSearch::FindComp*> criteria_;
     std::list<DIRENTRY_INFO> entries_;
@@ -73,14 +69,14 @@ class ListingTest : public ApplianceTest {
 
 TEST_F(ListingTest, FolderThatCannotBeListed) {
     file("plain");
-    addMount(real_ + "/dead", "nfs");
-    addMount(real_ + "/plain", "nfs");
-    const std::string tmp = "/tmp", longName = real_ + "/" + std::string(300, 'x');
+    addMount(photo_ + "/dead", "nfs");
+    addMount(photo_ + "/plain", "nfs");
+    const std::string tmp = "/tmp", longName = photo_ + "/" + std::string(300, 'x');
     for (const auto& [path, real, code, logged] : Rows<const char*, std::string, int, bool>{
              row("", tmp, 400, false), row("/photo", "", 400, false), row("/", "", 400, false),
-             row("/", tmp, 407, false), row("/photo", real_ + "/none", ORV_ERR_MISSING, false),
-             row("/photo", real_ + "/dead", ORV_ERR_REMOTE, false),
-             row("/photo", real_ + "/plain", ORV_ERR_DIRECTORY, true),
+             row("/", tmp, 407, false), row("/photo", photo_ + "/none", ORV_ERR_MISSING, false),
+             row("/photo", photo_ + "/dead", ORV_ERR_REMOTE, false),
+             row("/photo", photo_ + "/plain", ORV_ERR_DIRECTORY, true),
              row("/photo", longName, ORV_ERR_DIRECTORY, true)}) {
         if (logged) announceLog("Failed to access " + real);
         total_ = 99;
@@ -96,8 +92,8 @@ TEST_F(ListingTest, FolderThatCannotBeListed) {
 
 // What the caller holds open is listed, wherever it lies by now; what goes by text gets the path where it was found.
 TEST_F(ListingTest, AnOpenFolder) {
-    const std::string listed = real_ + "/listed", moved = real_ + "/moved";
-    for (const char* name : {"/listed/disc", "/other/secret"}) makeFolder(real_ + name);
+    const std::string listed = photo_ + "/listed", moved = photo_ + "/moved";
+    for (const char* name : {"/listed/disc", "/other/secret"}) makeFolder(photo_ + name);
     file("listed/f");
     const orvel::Descriptor opened(open(listed.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
     fs::rename(listed, moved);
@@ -156,12 +152,12 @@ TEST_F(ListingTest, AnEntryDeeperThanAPath) {
 TEST_F(ListingTest, FolderOfAnotherUser) {
     SKIP_WITHOUT_ROOT();
     for (const mode_t mode : {0, 0444, 0111}) {  // neither entering nor opening alone is enough
-        ASSERT_EQ(chmod(real_.c_str(), mode), 0);
+        ASSERT_EQ(chmod(photo_.c_str(), mode), 0);
         asUser(kBobUid, kUsersGid, [&] {
             EXPECT_FALSE(list());
             EXPECT_EQ(OrvLibGetErr(), ORV_ERR_DENIED);
             std::vector<_tag_SUBDIR_ENTRY_INFO_> folders;
-            EXPECT_FALSE(OrvLibEnumSubDir(real_, folders));
+            EXPECT_FALSE(OrvLibEnumSubDir(photo_, folders));
             EXPECT_EQ(OrvLibGetErr(), ORV_ERR_DENIED);
         });
     }
@@ -171,8 +167,8 @@ TEST_F(ListingTest, KeepsFilesAndFoldersOnly) {
     for (const char* name : {"folder", "@tmp", "@vexoea", "@tmpx"}) folder(name);
     for (const char* name : {"file", ".hidden-by-dot", "\xC3\xA4.\xC3\xA4\xFF"}) file(name);
     for (const char* target : {"file", "folder", "nowhere"})
-        ASSERT_EQ(symlink(target, (real_ + "/link-" + target).c_str()), 0);
-    ASSERT_EQ(mkfifo((real_ + "/fifo").c_str(), 0666), 0);
+        ASSERT_EQ(symlink(target, (photo_ + "/link-" + target).c_str()), 0);
+    ASSERT_EQ(mkfifo((photo_ + "/fifo").c_str(), 0666), 0);
 
     const Names folders{"@tmpx", "folder"}, files{".hidden-by-dot", "file", "\xC3\xA4.\xC3\xA4\xFF"};
     Names all = folders;
@@ -191,15 +187,15 @@ TEST_F(ListingTest, RecordsEqualThoseOfFillFileInfo) {
     makeMixedFolder();
     folder("mounted");
     folder("image");
-    addMount(real_ + "/mounted", "cifs");
-    addMount(real_ + "/image", "udf");
+    addMount(photo_ + "/mounted", "cifs");
+    addMount(photo_ + "/image", "udf");
     const auto compare = [&] {
         for (int additional = 0; additional <= kEverything; ++additional) {
             EXPECT_TRUE(list("name", additional));
             EXPECT_EQ(entries_.size(), 8U);
             for (const auto& entry : entries_) {
                 DIRENTRY_INFO info;
-                EXPECT_EQ(listing_.FillFileInfo(("/photo/" + entry.name).c_str(), (real_ + "/" + entry.name).c_str(),
+                EXPECT_EQ(listing_.FillFileInfo(("/photo/" + entry.name).c_str(), (photo_ + "/" + entry.name).c_str(),
                                                 entry.name.c_str(), DIR_ENTRY_TYPE_ALL,
                                                 entry.isDirectory ? DT_DIR : DT_REG, additional, info),
                           0);
@@ -220,8 +216,8 @@ TEST_F(ListingTest, RecordsEqualThoseOfFillFileInfo) {
 TEST_F(ListingTest, Properties) {
     file("report.tar.gz", "12345");
     folder("disc.d");
-    addMount(real_ + "/disc.d", "iso9660");
-    const std::string path = real_ + "/report.tar.gz";
+    addMount(photo_ + "/disc.d", "iso9660");
+    const std::string path = photo_ + "/report.tar.gz";
     ASSERT_TRUE(geteuid() != 0 || chown(path.c_str(), kAliceUid, kUsersGid) == 0);
     const timespec times[2] = {{1000, 0}, {0x1'0000'0005, 0}};
     ASSERT_EQ(chmod(path.c_str(), 0640) + utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
@@ -248,7 +244,7 @@ TEST_F(ListingTest, Properties) {
 TEST_F(ListingTest, NothingIsAskedWithoutNeedOrTwice) {
     for (const char* name : {"a", "b", "c", "d"}) file(name);
     ASSERT_TRUE(list("name", ADDITIONAL_REAL_PATH));
-    EXPECT_EQ(entries_.back().realPath, real_ + "/d");
+    EXPECT_EQ(entries_.back().realPath, photo_ + "/d");
     EXPECT_EQ(vexo::gate::calls("VLIBCFileLStatAt"), 0);
     ASSERT_TRUE(list("name", kEverything));
     for (const auto& [operation, calls] :
@@ -284,10 +280,8 @@ TEST_F(ListingTest, EntriesThatTheCallerHadTakePart) {
     for (const char* name : {"a", "c", "e"}) file(name);
     for (const bool ascending : {true, false}) {
         entries_.clear();
-        for (const char* name : {"d", "b"}) {
-            entries_.emplace_back().name = name;
-        }
-        ASSERT_TRUE(listing_.OrvLibDirEntryListEnum("/photo", real_.c_str(), "name", 0, 1, 3, ascending,
+        for (const char* name : {"d", "b"}) entries_.emplace_back().name = name;
+        ASSERT_TRUE(listing_.OrvLibDirEntryListEnum("/photo", photo_.c_str(), "name", 0, 1, 3, ascending,
                                                     DIR_ENTRY_TYPE_ALL, {}, entries_, &total_));
         EXPECT_EQ(namesOf(entries_), (ascending ? Names{"b", "c", "d"} : Names{"d", "c", "b"}));
         EXPECT_EQ(total_, 5U);
@@ -317,8 +311,8 @@ TEST_F(ListingTest, AllCriteriaMustAcceptTheName) {
 }
 
 TEST_F(ListingTest, FailingStatusOfOneEntry) {
-    for (const char* name : {"/local/dir", "/server/dir"}) makeFolder(real_ + name);
-    addMount(real_ + "/server/dir", "nfs4");
+    for (const char* name : {"/local/dir", "/server/dir"}) makeFolder(photo_ + name);
+    addMount(photo_ + "/server/dir", "nfs4");
     constexpr int kShown = 1, kVanished = 0, kFatal = -1;  // how many entries, or the end
     for (const auto& [systemCode, place, result, code] : Rows<int, const char*, int, int>{
              row(ENOENT, "/local", kVanished, 0), row(EIO, "/local", kFatal, 0), row(EPERM, "/local", kFatal, 407),
@@ -326,7 +320,7 @@ TEST_F(ListingTest, FailingStatusOfOneEntry) {
              row(EHOSTDOWN, "/server", kShown, 0), row(EACCES, "/server", kFatal, 407),
              row(ESTALE, "/server", kFatal, 401)}) {
         SCOPED_TRACE(std::string(strerror(systemCode)) + place);
-        const std::string parent = real_ + place, child = parent + "/dir";
+        const std::string parent = photo_ + place, child = parent + "/dir";
         if (result == kFatal) announceLog("Failed to stat " + child + ". " + strerror(systemCode));
         OrvLibSetErr(0);
         vexo::gate::fail("VLIBCFileLStatAt", VEXO_ERR_GENERAL, systemCode, 1);
@@ -348,14 +342,14 @@ TEST_F(ListingTest, EntriesBeforeTheFailureStay) {
     const auto order = listed(nullptr);
     vexo::gate::fail("VLIBCFileLStatAt", VEXO_ERR_DENIED, EACCES, 3);
     vexo::gate::fail("VEXOUserGetByUID", VEXO_ERR_USER_MISSING, ENOENT);
-    announceLog("Failed to stat " + real_ + "/" + order[2]);
+    announceLog("Failed to stat " + photo_ + "/" + order[2]);
     EXPECT_FALSE(list("name", kEverything, 1, 1));
     EXPECT_EQ(OrvLibGetErr(), ORV_ERR_DENIED);
     EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_DENIED) << "what failed, not what was tried after";
     EXPECT_EQ(namesOf(entries_), Names(order.begin(), order.begin() + 2)) << "in reading order, not paged";
     EXPECT_EQ(total_, 0U);
-    const ReadingFault fault(real_, EIO, 2);
-    announceLog("Failed to access " + real_);
+    const ReadingFault fault(photo_, EIO, 2);
+    announceLog("Failed to access " + photo_);
     EXPECT_FALSE(list()) << "half a folder";
     EXPECT_EQ(OrvLibGetErr(), ORV_ERR_DIRECTORY);
 }
@@ -365,14 +359,14 @@ TEST_F(ListingTest, PermissionsThatCannotBeAsked) {
     vexo::gate::fail("VEXOACLFolderOpen", VEXO_ERR_GENERAL);
     vexo::gate::fail("VEXOACLIsSupport", VEXO_ERR_GENERAL);
     ASSERT_TRUE(list("name", ADDITIONAL_PERM));
-    EXPECT_EQ(entries_.front().aclPrivilege, GetACLPrivilege((real_ + "/a").c_str()));
+    EXPECT_EQ(entries_.front().aclPrivilege, GetACLPrivilege((photo_ + "/a").c_str()));
     EXPECT_EQ(entries_.front().isAclMode, 0);
 }
 
 TEST_F(ListingTest, FillFileInfoByTypeOfEntry) {
     file("f");
     folder("d");
-    ASSERT_EQ(mkfifo((real_ + "/p").c_str(), 0666), 0);
+    ASSERT_EQ(mkfifo((photo_ + "/p").c_str(), 0666), 0);
     constexpr auto kAll = DIR_ENTRY_TYPE_ALL;
     constexpr auto kDirs = DIR_ENTRY_TYPE_DIR;
     constexpr auto kFiles = DIR_ENTRY_TYPE_FILE;
@@ -389,7 +383,7 @@ TEST_F(ListingTest, FillFileInfoByTypeOfEntry) {
              {"d", DT_REG, kAll, 2, 0, 1}}) {
         vexo::gate::reset();
         DIRENTRY_INFO info;
-        const std::string real = real_ + "/" + name;
+        const std::string real = photo_ + "/" + name;
         EXPECT_EQ(listing_.FillFileInfo("/x", real.c_str(), "shown", filter, dType, additional, info), result) << name;
         EXPECT_EQ(vexo::gate::calls("VLIBCFileLStat"), statusCalls) << name << int{dType};
         EXPECT_EQ(info.name + info.path + info.realPath, "shown/x" + ((additional & 1) != 0 ? real : ""));

@@ -20,9 +20,8 @@ TEST_F(MountStatusTest, TypeOfTheMountAtExactlyThisFolder) {
     OrvelMountStatus mounts;
     for (const auto& [path, type] :
          Rows<const char*, int>{row("/volume1", 0), row("/volume1///", 0), row("/volume1/usb/deep", 3), row("/iso", 4),
-                                row("/volume1-b", 11), row("/volume1/a", 10), row("/", 10), row(nullptr, 10)}) {
+                                row("/volume1-b", 11), row("/volume1/a", 10), row("/", 10), row(nullptr, 10)})
         EXPECT_EQ(mounts.getFSTYPE(path), type) << (path == nullptr ? "null" : path);
-    }
 }
 
 TEST_F(MountStatusTest, ReadOnlyByTheDeepestMountThatHoldsThePath) {
@@ -30,9 +29,8 @@ TEST_F(MountStatusTest, ReadOnlyByTheDeepestMountThatHoldsThePath) {
     for (const auto& [path, readOnly] :
          Rows<const char*, bool>{row("/volume1", false), row("/volume1/usb/a", true), row("/volume1/usbx", false),
                                  row("/volume1/usb/deep/a", false), row("/volume1/usb/deeper", true),
-                                 row("/volume1-b/x", true), row("/iso/", true), row(nullptr, false)}) {
+                                 row("/volume1-b/x", true), row("/iso/", true), row(nullptr, false)})
         EXPECT_EQ(mounts.IsReadOnly(path), readOnly) << (path == nullptr ? "null" : path);
-    }
     writeRootFile("/proc/mounts", "/dev/root / ext4 ro 0 0\n");
     EXPECT_FALSE(OrvelMountStatus().IsReadOnly("/volume1")) << "the root holds only itself";
     EXPECT_TRUE(OrvelMountStatus().IsReadOnly("/"));

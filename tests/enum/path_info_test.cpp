@@ -1,7 +1,7 @@
 #include <json/value.h>
 
 #include "orvel/file_info.h"
-#include "support/table.h"
+#include "support/testing.h"
 
 namespace {
 

@@ -2,7 +2,6 @@
 #include "accounts/application_list.h"
 #include "platform/trust.h"
 #include "support/system_faults.h"
-#include "support/table.h"
 #include "vexo/user.h"
 
 namespace {
@@ -21,9 +20,8 @@ std::string asked(int (*get)(Key, PVEXOUSER*), Key key) {
     EXPECT_EQ(found, user != nullptr);
     if (user == nullptr) return error(VLIBCErrGet());
     std::string text = user->szName;
-    for (const long number : {long{user->uid}, long{user->gid}, long{user->authType}}) {
+    for (const long number : {long{user->uid}, long{user->gid}, long{user->authType}})
         text += ' ' + std::to_string(number);
-    }
     text += ' ' + std::string(user->szHome) + ' ' + std::to_string(user->expiry);
     VEXOUserFree(user);
     return text;
@@ -209,9 +207,8 @@ TEST_F(AccountTest, Applications) {
     announceLog("line 3 of /etc/vexo/applications has no \"identifier:\"");
     for (const auto& [user, application, answer] : Rows<const char*, const char*, int>{
              row("alice", "files", 1), row("carol", "files", 1), row("bob", "files", 0), row("bob", "FILES", 1),
-             row("alice", "nobodys", 0), row("bob", "forgotten", 0), row("", "other", 0)}) {
+             row("alice", "nobodys", 0), row("bob", "forgotten", 0), row("", "other", 0)})
         EXPECT_EQ(VLIBUserPrivilegeHas(user, application), answer) << user << application;
-    }
     writeRootFile("/etc/vexo/applications", "files: bob\n");
     EXPECT_EQ(VLIBUserPrivilegeHas("bob", "files"), 1);
     fs::remove(systemRoot() + "/etc/vexo/applications");

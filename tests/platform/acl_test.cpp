@@ -11,7 +11,6 @@
 #include "filesystem/acl_rules.h"
 #include "io/file_io.h"
 #include "platform/private_mounts.h"
-#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 namespace {
@@ -80,7 +79,6 @@ class AclTest : public ApplianceTest {
         VEXOACLFolderClose(permissions);
     }
     static std::vector<std::string> fill(const std::string& folder);
-    std::string root_ = shareRoot("photo");
 };
 
 // Files and folders of all the modes, owners and ACLs that tell different rules apart.
@@ -140,7 +138,7 @@ TEST_F(AclTest, FolderFormAgreesWithTheKernelAndWithTheDeed) {
                                                       {"unsearchable sticky group", 01771, kBobUid}};
     std::vector<std::string> names;
     for (const auto& [folder, mode, owner] : folders) {
-        const std::string path = root_ + "/" + folder;
+        const std::string path = photo_ + "/" + folder;
         makeFolder(path);
         names = fill(path);
         ASSERT_TRUE(chown(path.c_str(), owner, kUsersGid) == 0 && chmod(path.c_str(), mode) == 0);
@@ -149,7 +147,7 @@ TEST_F(AclTest, FolderFormAgreesWithTheKernelAndWithTheDeed) {
         SCOPED_TRACE(who.name);
         inChild([&] {
             if (!become(who)) return 97;
-            for (const auto& row : folders) compare(root_ + "/" + std::get<0>(row), names);
+            for (const auto& row : folders) compare(photo_ + "/" + std::get<0>(row), names);
             return 0;
         });
     }
@@ -160,20 +158,20 @@ TEST_F(AclTest, MountsJudgeToo) {
     EXPECT_WITH_PRIVATE_MOUNTS(inPrivateMounts([&] {
         std::vector<std::string> names;
         for (const char* name : {"read-only", "no-execute", "bound"}) {
-            const std::string folder = root_ + "/" + name;
+            const std::string folder = photo_ + "/" + name;
             makeFolder(folder, 0777);
             EXPECT_EQ(mount("none", folder.c_str(), "tmpfs", 0, "size=4m,mode=0777"), 0);
             names = fill(folder);
         }
-        EXPECT_EQ(mount("none", (root_ + "/read-only").c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
-        EXPECT_EQ(mount("none", (root_ + "/no-execute").c_str(), nullptr, MS_REMOUNT | MS_NOEXEC, nullptr), 0);
+        EXPECT_EQ(mount("none", (photo_ + "/read-only").c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
+        EXPECT_EQ(mount("none", (photo_ + "/no-execute").c_str(), nullptr, MS_REMOUNT | MS_NOEXEC, nullptr), 0);
         // A folder of the same device whose mount is read-only while the one around it is not.
-        const std::string inner = root_ + "/bound/inner";
+        const std::string inner = photo_ + "/bound/inner";
         makeFolder(inner, 0777);
         EXPECT_EQ(mount(inner.c_str(), inner.c_str(), nullptr, MS_BIND, nullptr), 0);
         EXPECT_EQ(mount("none", inner.c_str(), nullptr, MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
         EXPECT_EQ(byPath(inner) & VEXO_ACL_WRITE, 0U);
-        const orvel::Descriptor around = vexo::openFile(root_ + "/bound", O_PATH | O_DIRECTORY);
+        const orvel::Descriptor around = vexo::openFile(photo_ + "/bound", O_PATH | O_DIRECTORY);
         const PVEXOACLFOLDER permissions = VEXOACLFolderOpen(around.get());
         _tag_VEXOSTAT_ status;
         unsigned inFolder = 0;
@@ -181,9 +179,9 @@ TEST_F(AclTest, MountsJudgeToo) {
         EXPECT_EQ(VEXOACLFolderPermGet(permissions, "inner", &status, &inFolder), 0);
         EXPECT_EQ(inFolder, byPath(inner));
         VEXOACLFolderClose(permissions);
-        for (const char* name : {"read-only", "no-execute"}) compare(root_ + "/" + name, names);
+        for (const char* name : {"read-only", "no-execute"}) compare(photo_ + "/" + name, names);
         EXPECT_EQ(seteuid(kAliceUid), 0);
-        compare(root_ + "/read-only", names);
+        compare(photo_ + "/read-only", names);
         return 0;
     }));
 }
@@ -191,15 +189,15 @@ TEST_F(AclTest, MountsJudgeToo) {
 TEST_F(AclTest, ImmutableAndAppendOnly) {
     SKIP_WITHOUT_ROOT();
     const auto mark = [this](const char* name, int flags) {
-        return ioctl(vexo::openFile(root_ + name, O_RDONLY).get(), FS_IOC_SETFLAGS, &flags) == 0;
+        return ioctl(vexo::openFile(photo_ + name, O_RDONLY).get(), FS_IOC_SETFLAGS, &flags) == 0;
     };
-    for (const char* name : {"/plain", "/fixed", "/growing", "/log/plain"}) writeFile(root_ + name, "", 0666);
+    for (const char* name : {"/plain", "/fixed", "/growing", "/log/plain"}) writeFile(photo_ + name, "", 0666);
     if (!mark("/fixed", FS_IMMUTABLE_FL)) GTEST_SKIP() << "no immutable files here: " << strerror(errno);
     EXPECT_TRUE(mark("/growing", FS_APPEND_FL) && mark("/log", FS_APPEND_FL));
-    EXPECT_EQ(byPath(root_ + "/fixed"), unsigned{VEXO_ACL_READ});
-    EXPECT_EQ(byPath(root_ + "/growing") & VEXO_ACL_DELETE, 0U);
-    compare(root_, {"plain", "fixed", "growing"});
-    compare(root_ + "/log", {"plain"});
+    EXPECT_EQ(byPath(photo_ + "/fixed"), unsigned{VEXO_ACL_READ});
+    EXPECT_EQ(byPath(photo_ + "/growing") & VEXO_ACL_DELETE, 0U);
+    compare(photo_, {"plain", "fixed", "growing"});
+    compare(photo_ + "/log", {"plain"});
     for (const char* name : {"/fixed", "/growing", "/log"}) EXPECT_TRUE(mark(name, 0));
 }
 
@@ -220,29 +218,29 @@ TEST_F(AclTest, OnlyAProofSettles) {
 
 TEST_F(AclTest, FailuresAndOddPaths) {
     for (const auto& [target, link] : Rows<const char*, const char*>{{"gone", "/dangling"}, {"a", "/link"}})
-        fs::create_symlink(target, root_ + link);
-    writeFile(root_ + "/a", "", 0444);
+        fs::create_symlink(target, photo_ + link);
+    writeFile(photo_ + "/a", "", 0444);
     for (const auto& [path, systemCode, code] :
-         Rows<std::string, int, int>{{root_ + "/missing", ENOENT, VEXO_ERR_MISSING},
-                                     {root_ + "/a/below", ENOTDIR, VEXO_ERR_MISSING},
-                                     {root_ + "/dangling", ENOENT, VEXO_ERR_ACL_TARGET_MISSING},
+         Rows<std::string, int, int>{{photo_ + "/missing", ENOENT, VEXO_ERR_MISSING},
+                                     {photo_ + "/a/below", ENOTDIR, VEXO_ERR_MISSING},
+                                     {photo_ + "/dangling", ENOENT, VEXO_ERR_ACL_TARGET_MISSING},
                                      {std::string(5000, 'n'), ENAMETOOLONG, VEXO_ERR_GENERAL}}) {
         unsigned permission = 0;
         EXPECT_FAILS(VEXOACLPermGet(path.c_str(), &permission), systemCode, code);
     }
-    makeFolder(root_ + "/closed", 0700);  // denied is no failure
-    writeFile(root_ + "/closed/b", "", 0666);
+    makeFolder(photo_ + "/closed", 0700);  // denied is no failure
+    writeFile(photo_ + "/closed/b", "", 0666);
     if (geteuid() == 0) {
-        EXPECT_EQ(asUser(kAliceUid, kUsersGid, [&] { return int(byPath(root_ + "/closed/b")); }), 0);
+        EXPECT_EQ(asUser(kAliceUid, kUsersGid, [&] { return int(byPath(photo_ + "/closed/b")); }), 0);
     }
     errno = 0;
     for (const char* never : {"/", "/..", "."}) EXPECT_EQ(byPath(never) & VEXO_ACL_DELETE, 0U) << never;
-    EXPECT_NE(byPath(root_ + "//") & VEXO_ACL_DELETE, 0U);
-    ASSERT_EQ(chdir(root_.c_str()), 0);
+    EXPECT_NE(byPath(photo_ + "//") & VEXO_ACL_DELETE, 0U);
+    ASSERT_EQ(chdir(photo_.c_str()), 0);
     EXPECT_NE(byPath("link") & VEXO_ACL_DELETE, 0U);  // the link goes, not its target
     EXPECT_EQ(errno, 0);
     inChild([&] {
-        const vexo::Descriptor folder = vexo::openFile(root_, O_RDONLY | O_DIRECTORY);
+        const vexo::Descriptor folder = vexo::openFile(photo_, O_RDONLY | O_DIRECTORY);
         unsigned permission = 0;
         EXPECT_TRUE(refuseCalls({{SYS_statx, EIO}}));
         EXPECT_FAILS(VEXOACLPermGet("a", &permission), EIO,
@@ -252,13 +250,13 @@ TEST_F(AclTest, FailuresAndOddPaths) {
 }
 
 TEST_F(AclTest, SupportIsAskedOncePerDevice) {
-    writeFile(root_ + "/a", "");
-    const struct stat status = statusOf(root_ + "/a");
-    const bool kept = getxattr((root_ + "/a").c_str(), "system.posix_acl_access", nullptr, 0) >= 0 || errno == ENODATA;
-    EXPECT_EQ(VEXOACLIsSupport((root_ + "/a").c_str(), -1, 2) > 0, kept);
+    writeFile(photo_ + "/a", "");
+    const struct stat status = statusOf(photo_ + "/a");
+    const bool kept = getxattr((photo_ + "/a").c_str(), "system.posix_acl_access", nullptr, 0) >= 0 || errno == ENODATA;
+    EXPECT_EQ(VEXOACLIsSupport((photo_ + "/a").c_str(), -1, 2) > 0, kept);
     EXPECT_EQ(VEXOACLIsSupportOnDevice("/nowhere", status.st_dev) > 0, kept);  // known, so the path is not needed
     EXPECT_EQ(VEXOACLIsSupport("/proc/self/stat", -1, 2), 0);
-    EXPECT_FAILS(VEXOACLIsSupport((root_ + "/missing").c_str(), -1, 2), ENOENT, VEXO_ERR_MISSING);
+    EXPECT_FAILS(VEXOACLIsSupport((photo_ + "/missing").c_str(), -1, 2), ENOENT, VEXO_ERR_MISSING);
 }
 
 }  // namespace

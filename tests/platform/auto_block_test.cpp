@@ -4,7 +4,6 @@
 #include <sqlite3.h>
 
 #include "platform/trust.h"
-#include "support/race.h"
 #include "web/auto_block_rules.h"
 
 namespace {

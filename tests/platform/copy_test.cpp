@@ -3,9 +3,6 @@
 
 #include <sys/xattr.h>
 
-#include <random>
-
-#include "support/refuse_calls.h"
 #include "support/testing.h"
 #include "vexo/filesystem.h"
 
@@ -255,22 +252,19 @@ TEST_F(CopyTest, ACancelledCopyAndASourceThatShrinksLeaveNothing) {
 }
 
 TEST_F(CopyTest, FailuresOfTheFileSystem) {
-    for (const auto& [call, systemCode, code] : Rows<long, int, int>{{SYS_copy_file_range, EDQUOT, VEXO_ERR_QUOTA},
-                                                                     {SYS_copy_file_range, ENOSPC, VEXO_ERR_NO_SPACE},
-                                                                     {SYS_linkat, EINVAL, VEXO_ERR_FAT_NAME},
-                                                                     {SYS_linkat, EROFS, VEXO_ERR_READ_ONLY},
-                                                                     {SYS_ftruncate, EIO, VEXO_ERR_GENERAL}}) {
+    for (const auto& [call, systemCode, code] : Rows<long, int, int>{
+             row(SYS_copy_file_range, EDQUOT, VEXO_ERR_QUOTA), row(SYS_copy_file_range, ENOSPC, VEXO_ERR_NO_SPACE),
+             row(SYS_linkat, EINVAL, VEXO_ERR_FAT_NAME), row(SYS_linkat, EROFS, VEXO_ERR_READ_ONLY),
+             row(SYS_ftruncate, EIO, VEXO_ERR_GENERAL)})
         withRefusals({{call, systemCode}, kNoClone},
                      [code = code, systemCode = systemCode] { expectFailure(options(0), code, systemCode); });
-    }
     // Waiting for the disk, for what must be there.
-    for (const unsigned way : {0U, unsigned{VEXO_COPY_TAKE}}) {
+    for (const unsigned way : {0U, unsigned{VEXO_COPY_TAKE}})
         withRefusals({{SYS_fsync, EIO}}, [way] {
             expectFailure(options(way | VEXO_COPY_SYNC), VEXO_ERR_GENERAL, EIO);
             EXPECT_EQ(copy(options(way)), 0);
             fs::rename(kTarget, kSource);
         });
-    }
 }
 
 TEST_F(CopyTest, DeniedToTheUser) {

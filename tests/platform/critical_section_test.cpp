@@ -1,7 +1,6 @@
 // The critical section, fought for by real processes.
 #include "vexo/critical_section.h"
 
-#include "support/race.h"
 #include "support/testing.h"
 
 namespace {

@@ -86,19 +86,14 @@ TEST_F(DatabaseTest, OnlyReadingAndNotForEver) {
     const std::string before = readFile(file_);
     const std::string copy = systemRoot() + "/usr/copy.db";
     const std::string count = "WITH RECURSIVE c(x) AS (SELECT 1 UNION ALL SELECT x + 1 FROM c) SELECT ";
-    for (const auto& [sql, code] :
-         Rows<std::string, int>{{"INSERT INTO l VALUES('a', 2, 3)", VEXO_ERR_GENERAL},
-                                {"DROP TABLE l", VEXO_ERR_GENERAL},
-                                {"ATTACH '" + copy + "' AS c", VEXO_ERR_GENERAL},
-                                {"VACUUM INTO '" + copy + "'", VEXO_ERR_GENERAL},
-                                {"SELECT nothing FROM l", VEXO_ERR_GENERAL},
-                                {"SELECT a FROM v", VEXO_ERR_GENERAL},
-                                {count + "hex(zeroblob(1000000)) FROM c", VEXO_ERR_GENERAL},
-                                {"SELECT n FROM l; SELECT n FROM l", VEXO_ERR_PARAMETER},
-                                {"", VEXO_ERR_PARAMETER},
-                                {"SELECT n FROM l WHERE linkID = '" + std::string(4 << 20, '\'') + "'", 0}}) {
+    for (const auto& [sql, code] : Rows<std::string, int>{
+             row("INSERT INTO l VALUES('a', 2, 3)", VEXO_ERR_GENERAL), row("DROP TABLE l", VEXO_ERR_GENERAL),
+             row("ATTACH '" + copy + "' AS c", VEXO_ERR_GENERAL), row("VACUUM INTO '" + copy + "'", VEXO_ERR_GENERAL),
+             row("SELECT nothing FROM l", VEXO_ERR_GENERAL), row("SELECT a FROM v", VEXO_ERR_GENERAL),
+             row(count + "hex(zeroblob(1000000)) FROM c", VEXO_ERR_GENERAL),
+             row("SELECT n FROM l; SELECT n FROM l", VEXO_ERR_PARAMETER), row("", VEXO_ERR_PARAMETER),
+             row("SELECT n FROM l WHERE linkID = '" + std::string(4 << 20, '\'') + "'", 0)})
         EXPECT_EQ(ask(sql), code) << sql.substr(0, 80);
-    }
     EXPECT_EQ(ask(count + "count(*) FROM c"), VEXO_ERR_GENERAL) << "after its time";
     EXPECT_TRUE(readFile(file_) == before);
     EXPECT_FALSE(fs::exists(copy));

@@ -3,10 +3,8 @@
 #include "vexo/guess.h"
 
 #include <queue>
-#include <random>
 
 #include "platform/trust.h"
-#include "support/race.h"
 #include "web/guess_rules.h"
 #include "web/keyed_hash.h"
 
@@ -21,10 +19,6 @@ class GuessTest : public ApplianceTest {
     void SetUp() override {
         ApplianceTest::SetUp();
         setTime(1000000);
-    }
-    void TearDown() override {
-        unsetenv("VEXO_GATE_MILLISECONDS");
-        ApplianceTest::TearDown();
     }
     void setTime(Time time) {
         now_ = time;

@@ -1,5 +1,4 @@
 // The files of the index: what others put in their place, writers that die, and the central store.
-#include <random>
 
 #include "platform/index_fixture.h"
 #include "platform/private_mounts.h"
@@ -28,13 +27,10 @@ TEST_F(IndexFilesTest, WhatIsNoDatabaseOfOursIsRefused) {
         return good.substr(0, at) + bytes + good.substr(at + strlen(bytes));
     };
     for (const auto& [what, content] : Rows<const char*, std::string>{
-             {"empty", ""},
-             {"text", std::string(9000, 'x')},
-             {"cut in the header", good.substr(0, 50)},
-             {"cut behind the header", good.substr(0, 8192)},
-             {"a write-ahead log", patched(18, "\2\2")},
-             {"another application's", patched(68, "none")},
-             {"garbage pages", good.substr(0, 100) + std::string(good.size() - 100, '\xA5')}}) {
+             row("empty", ""), row("text", std::string(9000, 'x')), row("cut in the header", good.substr(0, 50)),
+             row("cut behind the header", good.substr(0, 8192)), row("a write-ahead log", patched(18, "\2\2")),
+             row("another application's", patched(68, "none")),
+             row("garbage pages", good.substr(0, 100) + std::string(good.size() - 100, '\xA5'))}) {
         SCOPED_TRACE(what);
         writeFile(db_, content, 0600);
         check(VEXO_ERR_GENERAL);

@@ -1,5 +1,4 @@
 // What the index finds, keeps and orders, held against the criteria and against plain sorting.
-#include <random>
 
 #include "index/index_name_order.h"
 #include "index/index_store.h"
@@ -13,26 +12,10 @@ using namespace index_tests;
 
 // What walks and indexes must agree on: names of every encoding, sizes, owners, times and kinds.
 std::vector<Record> manyRecords() {
-    const std::vector<std::string> names = {"Report.TXT",
-                                            "report",
-                                            "r\xC3\xA9sum\xC3\xA9.pdf",
-                                            "R\xC3\x89SUM\xC3\x89.PDF",
-                                            "a_b%c*d?.jpg",
-                                            "quote'\"\\.jpg",
-                                            "\xE9t\xE9.jpg",
-                                            "bad\xFF\xFEname",
-                                            "\xC0\xAAstar",
-                                            "ab",
-                                            ".jpg",
-                                            "IMG_0001.JPG",
-                                            "tail\\",
-                                            "nul\xC0\x80in",
-                                            "\xED\xA0\x80surrogate",
-                                            "*",
-                                            "?x?",
-                                            "end.\xED\xA0\x80",
-                                            "two.A.b",
-                                            "dot."};
+    const auto names = listOf<std::string>(
+        "Report.TXT", "report", "r\xC3\xA9sum\xC3\xA9.pdf", "R\xC3\x89SUM\xC3\x89.PDF", "a_b%c*d?.jpg",
+        "quote'\"\\.jpg", "\xE9t\xE9.jpg", "bad\xFF\xFEname", "\xC0\xAAstar", "ab", ".jpg", "IMG_0001.JPG", "tail\\",
+        "nul\xC0\x80in", "\xED\xA0\x80surrogate", "*", "?x?", "end.\xED\xA0\x80", "two.A.b", "dot.");
     std::vector<Record> records;
     unsigned i = 0;
     for (const char* folder : {"", "2012/", "2012/a/", "2012b/", "20_2/", "*/", "\xFF/"}) {
@@ -119,13 +102,11 @@ TEST_F(IndexTest, ConditionsSayWhatTheCriteriaSay) {
 BOOL keepLine(Data* data, void* line) {
     std::string& text = *static_cast<std::string*>(line);
     for (const char* field : {data->szShareRoot, data->szShare, data->szName, data->szPath, data->szParent,
-                              data->szExtension, data->szPermission, data->szOwner, data->szGroup}) {
+                              data->szExtension, data->szPermission, data->szOwner, data->szGroup})
         text += std::string(field) + "|";
-    }
     for (const int64_t number : {int64_t{data->isDir}, data->size, data->created, data->changed, data->accessed,
-                                 data->modified, int64_t{data->mode}, int64_t{data->uid}, int64_t{data->gid}}) {
+                                 data->modified, int64_t{data->mode}, int64_t{data->uid}, int64_t{data->gid}})
         text += std::to_string(number) + "|";
-    }
     return 1;
 }
 
@@ -358,9 +339,8 @@ TEST_F(IndexTest, NamesKeepTheirOrderWhateverChanges) {
             Addresses all, images;
             for (const auto& [name, record] : order) {
                 all.push_back(record->address());
-                if (name.size() >= 4 && strcasecmp(name.c_str() + name.size() - 4, ".jpg") == 0) {
+                if (name.size() >= 4 && strcasecmp(name.c_str() + name.size() - 4, ".jpg") == 0)
                     images.push_back(all.back());
-                }
             }
             EXPECT_EQ(inKeptOrder(&every, descending), all) << when << descending;
             EXPECT_EQ(inKeptOrder(&jpg, descending), images) << when << descending;

@@ -3,7 +3,6 @@
 
 #include "platform/private_mounts.h"
 #include "platform/trust.h"
-#include "support/race.h"
 #include "vexo/critical_section.h"
 
 namespace {
@@ -39,9 +38,8 @@ TEST_F(LineFile, AddedLinesAreWholeOrNotThere) {
     EXPECT_EQ(VLIBCFileAddLine(kFile, "12345678", 8), 0);
     umask(mask);
     EXPECT_EQ(statusOf(file_).st_mode & 0777, 0600U);
-    for (const char* refused : {"123456789", "a\nb", "a\r"}) {
+    for (const char* refused : {"123456789", "a\nb", "a\r"})
         EXPECT_FAILS(VLIBCFileAddLine(kFile, refused, 8), EINVAL, VEXO_ERR_PARAMETER);
-    }
     EXPECT_FAILS(VLIBCFileAddLine("/none/x", "a", 8), ENOENT, VEXO_ERR_FILE);
     writeFile(file_, "torn", 0600);
     EXPECT_EQ(VLIBCFileAddLine(kFile, "a", 8), 0);

@@ -4,8 +4,6 @@
 #include <sqlite3.h>
 
 #include "platform/trust.h"
-#include "support/race.h"
-#include "support/refuse_calls.h"
 
 namespace {
 

@@ -1,6 +1,4 @@
 // Folders made with their parents.
-#include "support/race.h"
-#include "support/refuse_calls.h"
 #include "support/testing.h"
 #include "vexo/filesystem.h"
 #include "vexo/user.h"
@@ -13,21 +11,20 @@ constexpr gid_t kKeepGroup = static_cast<gid_t>(-1);
 class MakeFolderTest : public ApplianceTest {
  protected:
     void expectFolder(const std::string& path, uid_t uid, mode_t mode) {
-        const struct stat status = statusOf(root_ + path);
+        const struct stat status = statusOf(photo_ + path);
         EXPECT_EQ(status.st_mode, mode_t{S_IFDIR | mode}) << path;
         EXPECT_EQ(status.st_uid, uid) << path;
         EXPECT_EQ(status.st_gid == kUsersGid, uid != 0) << path;
     }
     int make(const std::string& path, uid_t uid, mode_t mode, int recursive = 1) {
         const gid_t gid = uid == kKeepUser ? kKeepGroup : gid_t{kUsersGid};
-        return VEXOFSMkdirP((root_ + path).c_str(), nullptr, recursive, uid, gid, mode);
+        return VEXOFSMkdirP((photo_ + path).c_str(), nullptr, recursive, uid, gid, mode);
     }
-    std::string root_ = shareRoot("photo");
 };
 
 TEST_F(MakeFolderTest, OwnerAndModeGoToWhatItMadeAlone) {
     SKIP_WITHOUT_ROOT();
-    makeFolder(root_ + "/old", 0711);
+    makeFolder(photo_ + "/old", 0711);
     const mode_t before = umask(077);
     EXPECT_EQ(make("/old//new/deep/", kAliceUid, 0755), 0);
     umask(before);
@@ -36,38 +33,38 @@ TEST_F(MakeFolderTest, OwnerAndModeGoToWhatItMadeAlone) {
     EXPECT_EQ(errno, 0);
     for (const char* made : {"/old/new", "/old/new/deep"}) expectFolder(made, kAliceUid, 0755);
     expectFolder("/old", 0, 0711);
-    makeFolder(root_ + "/team", 02775);
+    makeFolder(photo_ + "/team", 02775);
     ASSERT_EQ(make("/team/new", kKeepUser, 0750, 0), 0);
     expectFolder("/team/new", 0, 02750);  // the set-group bit of its parent stays
     asUser(kAliceUid, kUsersGid, [&] {
         const char* stopAt = "";
-        const std::string path = root_ + "/mine";
+        const std::string path = photo_ + "/mine";
         EXPECT_FAILS(VEXOFSMkdirP(path.c_str(), &stopAt, 1, kBobUid, kUsersGid, 0755), EPERM, VEXO_ERR_DENIED);
         EXPECT_STREQ(stopAt, "mine");
-        EXPECT_EQ(std::distance(fs::directory_iterator(root_), {}), 2) << "what cannot be handed over is not left";
+        EXPECT_EQ(std::distance(fs::directory_iterator(photo_), {}), 2) << "what cannot be handed over is not left";
         return make("/mine", kAliceUid, 0700);
     });
     expectFolder("/mine", kAliceUid, 0700);
 }
 
 TEST_F(MakeFolderTest, RefusalsTellWhereTheyStopped) {
-    writeFile(root_ + "/file", "");
-    makeFolder(root_ + "/elsewhere");
-    fs::create_symlink(root_ + "/elsewhere/gone", root_ + "/dangling");
-    fs::create_symlink(root_ + "/elsewhere", root_ + "/link");
+    writeFile(photo_ + "/file", "");
+    makeFolder(photo_ + "/elsewhere");
+    fs::create_symlink(photo_ + "/elsewhere/gone", photo_ + "/dangling");
+    fs::create_symlink(photo_ + "/elsewhere", photo_ + "/link");
     const std::string longName(256, 'n');
     for (const auto& [name, recursive, systemCode, code] : Rows<std::string, int, int, int>{
              row("a/b/c", 0, ENOENT, VEXO_ERR_MISSING), row("file/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH),
              row("file", 1, ENOTDIR, VEXO_ERR_BAD_PATH), row("dangling/x", 1, ENOTDIR, VEXO_ERR_BAD_PATH),
              row(longName, 1, ENAMETOOLONG, VEXO_ERR_NAME_TOO_LONG)}) {
         const char* stopAt = "";
-        const std::string path = root_ + "/" + name;
+        const std::string path = photo_ + "/" + name;
         EXPECT_FAILS(VEXOFSMkdirP(path.c_str(), &stopAt, recursive, kKeepUser, kKeepGroup, 0755), systemCode, code);
         EXPECT_EQ(stopAt, name);
     }
-    EXPECT_TRUE(fs::is_empty(root_ + "/elsewhere"));
+    EXPECT_TRUE(fs::is_empty(photo_ + "/elsewhere"));
     EXPECT_EQ(make("/link/new", kKeepUser, 0755, 0), 0) << "an existing link to a folder counts as that folder";
-    EXPECT_TRUE(fs::is_directory(root_ + "/elsewhere/new"));
+    EXPECT_TRUE(fs::is_directory(photo_ + "/elsewhere/new"));
 }
 
 // What the file manager shows of a folder.
@@ -138,11 +135,11 @@ TEST_F(MakeFolderTest, FoldersAboveHomesAreTheSystems) {
         makeHome(domain + "/" + std::to_string(asks), asks);
         EXPECT_EQ(statusOf(domain).st_uid, owner);
     }
-    makeFolder(root_ + "/elsewhere");
-    ASSERT_EQ(chown((root_ + "/elsewhere").c_str(), kAliceUid, kUsersGid), 0);
-    fs::create_symlink(root_ + "/elsewhere", homes + "/@LINK");
+    makeFolder(photo_ + "/elsewhere");
+    ASSERT_EQ(chown((photo_ + "/elsewhere").c_str(), kAliceUid, kUsersGid), 0);
+    fs::create_symlink(photo_ + "/elsewhere", homes + "/@LINK");
     makeHome(homes + "/@LINK/eve", kAliceUid);
-    EXPECT_EQ(statusOf(root_ + "/elsewhere").st_uid, uid_t{kAliceUid});
+    EXPECT_EQ(statusOf(photo_ + "/elsewhere").st_uid, uid_t{kAliceUid});
     // What root keeps closed is nobody's home, under whatever name somebody moved it.
     const std::string part = homes + "/" VEXO_PART_PREFIX + std::to_string(kAliceUid) + "-closed";
     writeFile(part + "/secret", "");

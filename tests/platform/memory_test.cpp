@@ -71,10 +71,9 @@ int refuseEach(const std::function<int()>& operation) {
 }
 
 TEST_F(MemoryTest, OperationsFailWithoutAnException) {
-    const std::string root = shareRoot("photo");
-    const std::string source = root + "/a source with a long name";
-    const std::string target = root + "/a target with a long name";
-    const std::string made = root + "/a folder with a long name/and one below it";
+    const std::string source = photo_ + "/a source with a long name";
+    const std::string target = photo_ + "/a target with a long name";
+    const std::string made = photo_ + "/a folder with a long name/and one below it";
     writeFile(source, "new");
     writeFile(target, "old");
     writeRootFile("/etc/vexo/ddns.conf", "[provider]\nhostname=\"a.host.with.a.long.name\"\n");
@@ -85,7 +84,7 @@ TEST_F(MemoryTest, OperationsFailWithoutAnException) {
     const VEXOCOPYOPT overwrite{static_cast<uid_t>(-1), static_cast<gid_t>(-1), nullptr, VEXO_COPY_OVERWRITE};
     for (const auto& [name, run] : Rows<const char*, std::function<int()>>{
              {"acl", [&] { return VEXOACLPermGet(source.c_str(), &permission); }},
-             {"mounts", [&] { return VEXOGetFSType(root.c_str(), 0); }},
+             {"mounts", [&] { return VEXOGetFSType(photo_.c_str(), 0); }},
              {"folder", [&] { return VEXOFSMkdirP(made.c_str(), nullptr, 1, overwrite.uid, overwrite.gid, 0755); }},
              {"volume", [&] { return VolumePathParse("/a-volume-with-a-long-name/a", &volume); }},
              {"copy", [&] { return VEXOFileCopy(source.c_str(), target.c_str(), &overwrite); }},

@@ -13,9 +13,8 @@ TEST_F(MountTest, ParsesWhatTheKernelWrites) {
     for (const vexo::Mount& mount : vexo::parseMountTable(
              "/dev/root / ext4 rw 0 0\n# /dev/none /none ext4 rw 0 0\n\n"
              "/dev/sdb1\t/volume1/my\\040disk\\011x\\134y vfat rw 0 0\nserver:/export /volume1/remote/ nfs4 rw 0 0\n"
-             "torn /volume1/torn\nx /volume1/odd\\9 fuse.thing rw 0 0\nx /volume1/last\\04 vfat")) {
+             "torn /volume1/torn\nx /volume1/odd\\9 fuse.thing rw 0 0\nx /volume1/last\\04 vfat"))
         text += mount.folder + ' ' + mount.typeName + ' ' + std::to_string(mount.type) + '\n';
-    }
     EXPECT_EQ(text,
               "/ ext4 0\n/volume1/my disk\tx\\y vfat 1\n/volume1/remote nfs4 8\n/volume1/odd\\9 fuse.thing 11\n"
               "/volume1/last\\04 vfat 1\n");

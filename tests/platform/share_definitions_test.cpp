@@ -2,7 +2,7 @@
 #include "shares/share_definitions.h"
 
 #include "shares/share_options.h"
-#include "support/table.h"
+#include "support/testing.h"
 #include "vexo/share.h"
 
 namespace {

@@ -1,7 +1,7 @@
 // Shares on a running appliance: records, rights from the lists, files that change, homes.
 #include "vexo/share.h"
 
-#include "support/table.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -39,9 +39,8 @@ std::string textOf(const char* name) {
     std::string text = std::string(share->szName) + " no " + joined(share->naList) + " rw " + joined(share->rwList) +
                        " ro " + joined(share->roList);
     for (const auto number : {static_cast<int>(share->fStatus), static_cast<int>(share->mask), share->ftp, share->acl,
-                              share->synced, share->index}) {
+                              share->synced, share->index})
         text += ' ' + std::to_string(number);
-    }
     VEXOShareFree(share);
     return text;
 }
@@ -224,29 +223,21 @@ TEST_F(ShareTest, HomesThatAreInNoShare) {
         VEXOUserFree(user);
         return home;
     };
-    const std::string place = shareRoot("photo");
-    writeRootFile("/etc/passwd", "alice:x:20001:20100::" + place +
+    writeRootFile("/etc/passwd", "alice:x:20001:20100::" + photo_ +
                                      "/al:\nbob:x:20002:20100::/nonexistent:\n"
                                      "carol:x:20003:20100::/:\ndave:x:20004:20100::" +
-                                     place + "/d:\n");
-    for (const auto& [options, alice, dave] : Rows<const char*, std::string, std::string>{
-             {"read only = no\n", "/al", "/d"},
-             {"read only = no\nvalid users = %S\nbrowseable = no\n", "/al", "/d"},
-             {"writeable = yes\ninvalid users = dave\n", "/al", ""},
-             {"read only = no\nread list = alice\n", "", "/d"},
-             {"vexo:ignore = read only\n", "/al", "/d"},
-             {"read only = no\npath = %H/sub\n", "/al/sub", "/d/sub"},
-             {"available = no\nread only = no\n", "", ""}}) {
+                                     photo_ + "/d:\n");
+    for (const auto& [options, alice, dave] : rowsOf<const char*, std::string, std::string>("platform/homes")) {
         define(std::string("[homes]\n") + options);
-        const auto full = [&](const std::string& end) { return end.empty() ? end : place + end; };
+        const auto full = [&](const std::string& end) { return end.empty() ? end : photo_ + end; };
         EXPECT_EQ(homeOf("alice"), full(alice)) << options;
         EXPECT_EQ(homeOf("dave"), full(dave)) << options;
         EXPECT_EQ(homeOf("bob"), "") << "no home in the account";
         EXPECT_EQ(rootOf("homes") + allNames(), "");
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_SHARE_MISSING);
     }
-    define("[homes]\nread only = no\npath = " + place + "/%S\n");
-    EXPECT_EQ(homeOf("carol"), place + "/carol");
+    define("[homes]\nread only = no\npath = " + photo_ + "/%S\n");
+    EXPECT_EQ(homeOf("carol"), photo_ + "/carol");
     define("[homes]\nbrowseable = no\n");
     announceLog("share [homes] is closed: line 1: read only = yes (not stated): a user's home is always to read");
     EXPECT_EQ(homeOf("alice"), "") << "what is read only there is not open here";
@@ -265,9 +256,8 @@ TEST_F(ShareTest, WhatClosesAShare) {
         return begin == std::string::npos ? "" : closing.substr(begin + 11, closing.find(" = ", begin) - begin - 11);
     };
     for (const auto& [global, options, closing] :
-         rowsOf<std::string, std::string, std::string>("platform/closed_shares")) {
+         rowsOf<std::string, std::string, std::string>("platform/closed_shares"))
         EXPECT_EQ(stateOf(options, global), closing) << global << options;
-    }
     define(
         "[t]\npath = /srv/t\nforce user = x\n[s]\ncopy = t\npath = /srv/s\n[u]\ncopy = t\nforce user =\npath = "
         "/srv/u\n");
@@ -323,9 +313,8 @@ TEST_F(ShareTest, UsersDefineSharesOfTheirOwn) {
     define("[photo]\npath = " + shareRoot("photo") + "\n");
     EXPECT_EQ(rights("bob"), -1) << "no folder is stated, and this is not Samba's own file";
     define("[global]\nusershare path = /users\n");
-    for (const auto& [user, right] : Rows<const char*, int>{{"alice", 2}, {"bob", 2}, {"carol", 0}}) {
+    for (const auto& [user, right] : Rows<const char*, int>{{"alice", 2}, {"bob", 2}, {"carol", 0}})
         EXPECT_EQ(rights(user), right) << user << "; carol is an administrator";
-    }
     share("S-1-1-0:R");
     EXPECT_EQ(rights("bob"), 1);
     ASSERT_EQ(setegid(20100) + seteuid(20002), 0);

@@ -8,25 +8,24 @@ namespace {
 
 class StatTest : public ApplianceTest {
  protected:
-    std::string root_ = shareRoot("photo");
 };
 
 TEST_F(StatTest, RecordsWhatLstatTells) {
-    const std::string file = root_ + "/a";
+    const std::string file = photo_ + "/a";
     writeFile(file, "12345", 0640);
     const timespec times[] = {{1000000000, 0}, {1100000000, 999999999}};
     ASSERT_EQ(utimensat(AT_FDCWD, file.c_str(), times, 0), 0);
-    fs::create_symlink("a", root_ + "/link");
-    fs::create_hard_link(file, root_ + "/second");
-    const orvel::Descriptor folder = vexo::openFile(root_, O_RDONLY | O_DIRECTORY);
+    fs::create_symlink("a", photo_ + "/link");
+    fs::create_hard_link(file, photo_ + "/second");
+    const orvel::Descriptor folder = vexo::openFile(photo_, O_RDONLY | O_DIRECTORY);
     for (const char* name : {"a", "link"}) {
         SCOPED_TRACE(name);
-        const struct stat wanted = statusOf(root_ + "/" + name);
+        const struct stat wanted = statusOf(photo_ + "/" + name);
         _tag_VEXOSTAT_ got, basic;
         memset(&got, 0xAB, sizeof got);
         memset(&basic, 0xCD, sizeof basic);
         ASSERT_EQ(VLIBCFileLStatAt(folder.get(), name, 9, &got), 0);
-        ASSERT_EQ(VLIBCFileLStat((root_ + "/" + name).c_str(), VEXO_STAT_BASIC, &basic), 0);
+        ASSERT_EQ(VLIBCFileLStat((photo_ + "/" + name).c_str(), VEXO_STAT_BASIC, &basic), 0);
         EXPECT_EQ(
             std::tie(got.st_mode, got.st_uid, got.st_gid, got.st_device, got.st_inode, got.st_links, got.st_size,
                      got.st_access, got.st_modify, got.st_change),
@@ -41,7 +40,7 @@ TEST_F(StatTest, RecordsWhatLstatTells) {
 }
 
 TEST_F(StatTest, FailuresLeaveErrnoCodeAndAnEmptyRecord) {
-    makeFolder(root_ + "/closed", 0700);
+    makeFolder(photo_ + "/closed", 0700);
     const auto expectFailure = [](const std::string& path, int systemCode, int code) {
         SCOPED_TRACE(path);
         _tag_VEXOSTAT_ status;
@@ -51,11 +50,11 @@ TEST_F(StatTest, FailuresLeaveErrnoCodeAndAnEmptyRecord) {
         EXPECT_EQ(status.st_size | status.st_access | status.st_modify | status.st_change | status.st_create, 0);
         EXPECT_EQ(status.st_device | status.st_inode, 0U);
     };
-    expectFailure(root_ + "/missing", ENOENT, VEXO_ERR_MISSING);
+    expectFailure(photo_ + "/missing", ENOENT, VEXO_ERR_MISSING);
     expectFailure("/dev/null/below", ENOTDIR, VEXO_ERR_MISSING);
-    expectFailure(root_ + "/" + std::string(256, 'n'), ENAMETOOLONG, VEXO_ERR_GENERAL);
+    expectFailure(photo_ + "/" + std::string(256, 'n'), ENAMETOOLONG, VEXO_ERR_GENERAL);
     if (geteuid() != 0) return;
-    asUser(kAliceUid, kUsersGid, [&] { expectFailure(root_ + "/closed/a", EACCES, VEXO_ERR_DENIED); });
+    asUser(kAliceUid, kUsersGid, [&] { expectFailure(photo_ + "/closed/a", EACCES, VEXO_ERR_DENIED); });
 }
 
 }  // namespace

@@ -6,8 +6,6 @@
 #include <cmath>
 
 #include "platform/trust.h"
-#include "support/race.h"
-#include "support/refuse_calls.h"
 #include "tasks/task_document.h"
 #include "tasks/task_name.h"
 #include "tasks/task_worker.h"

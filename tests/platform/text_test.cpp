@@ -1,8 +1,6 @@
 // The order of names: a strict total preorder for any bytes, and keys that order the same.
 #include "vexo/text.h"
 
-#include <random>
-
 #include "support/testing.h"
 
 namespace {

@@ -3,7 +3,6 @@
 
 #include "platform/private_mounts.h"
 #include "platform/trust.h"
-#include "support/race.h"
 #include "transfer_entry.h"
 #include "vexo/xferlog.h"
 

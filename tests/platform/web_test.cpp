@@ -12,17 +12,15 @@ namespace {
 TEST(CgiText, FormsAndCookies) {
     for (const auto& [encoded, decoded] : Rows<const char*, const char*>{
              row("a+b%20c%2Bd", "a b c+d"), row("%2fphoto%2F%C3%A9", "/photo/\xC3\xA9"), row("%00", "%00"),
-             row("a%2", "a%2"), row("%", "%"), row("%zz%41", "%zzA"), row("%2541", "%41")}) {
+             row("a%2", "a%2"), row("%", "%"), row("%zz%41", "%zzA"), row("%2541", "%41")})
         EXPECT_EQ(vexo::decodeFormText(encoded), decoded) << encoded;
-    }
     vexo::FormFields fields;
     vexo::parseForm("a=1&&b=x%3Dy=z&c&=d&a=2", fields);
     const vexo::FormFields expected = {{"a", "1"}, {"b", "x=y=z"}, {"c", ""}, {"", "d"}, {"a", "2"}};
     EXPECT_EQ(fields, expected);
     for (const auto& [header, value] : Rows<const char*, const char*>{
-             row("x=0;  id = 1 ;id=2", "1"), row("id=a=b", "a=b"), row("id=", ""), row("id; id=1", "1")}) {
+             row("x=0;  id = 1 ;id=2", "1"), row("id=a=b", "a=b"), row("id=", ""), row("id; id=1", "1")})
         EXPECT_EQ(vexo::findCookie(header, "id"), value) << header;
-    }
     for (const char* header : {"", "id", "xid=1; ID=2", ";;=;"}) EXPECT_FALSE(vexo::findCookie(header, "id")) << header;
 }
 
@@ -60,7 +58,7 @@ TEST_F(WebRequest, FieldsOfQueryAndBody) {
         EXPECT_EQ(web.GetParam("b", "none"), "/photo");
         EXPECT_EQ(web.GetParam("c", "none"), "none");
     });
-    for (const char* type : {"multipart/form-data; boundary=x", "application/x-www-form-urlencodedx", ""}) {
+    for (const char* type : {"multipart/form-data; boundary=x", "application/x-www-form-urlencodedx", ""})
         post(type, std::to_string(form.size()), form, [] {
             const VEXO::WebCGI web;
             EXPECT_FALSE(web.BodyRefused());
@@ -68,7 +66,6 @@ TEST_F(WebRequest, FieldsOfQueryAndBody) {
             char next = 0;
             EXPECT_EQ(read(STDIN_FILENO, &next, 1), 1) << "another body is the program's to read";
         });
-    }
 }
 
 TEST_F(WebRequest, ABodyThatIsNotWholeOrTooLongIsRefused) {
@@ -78,14 +75,13 @@ TEST_F(WebRequest, ABodyThatIsNotWholeOrTooLongIsRefused) {
              row("", "", false), row("0", "", false), row(std::to_string(limit), longest, false),
              row(std::to_string(limit + 1), longest + "x", true), row("99999999999999999999", "b=1", true),
              row("-1", "b=1", true), row("3x", "b=1", true), row("4", "b=1", true),
-             row("4", std::string("b=\0x", 4), true)}) {
+             row("4", std::string("b=\0x", 4), true)})
         post("application/x-www-form-urlencoded", length, text, [refuse = refused, taken = !refused && !text.empty()] {
             const VEXO::WebCGI web;
             EXPECT_EQ(web.BodyRefused(), refuse);
             EXPECT_EQ(web.HasParam("b"), taken);
             EXPECT_EQ(web.GetParam("a", "none"), "query");
         });
-    }
 }
 
 TEST_F(WebRequest, HeaderWithCookies) {
@@ -94,9 +90,8 @@ TEST_F(WebRequest, HeaderWithCookies) {
         VEXO::WebCGI web;
         EXPECT_TRUE(web.AddCookieToHeader("/", "link-1", "a b"));
         EXPECT_TRUE(web.AddCookieToHeader("", "x", ""));
-        for (const char* name : {"", "a b", "a=b", "a\n", "\xC3\xA9"}) {
+        for (const char* name : {"", "a b", "a=b", "a\n", "\xC3\xA9"})
             EXPECT_FALSE(web.AddCookieToHeader("/", name, "v")) << name;
-        }
         for (const char* text : {"a\r\nSet-Cookie: x=y", "a;b", "a,b", "\x7F"}) {
             EXPECT_FALSE(web.AddCookieToHeader("/", "n", text)) << text;
             EXPECT_FALSE(web.AddCookieToHeader(text, "n", "v")) << text;

@@ -1,6 +1,6 @@
 #include "orvel/search_criteria.h"
 
-#include "support/table.h"
+#include "support/testing.h"
 
 using namespace FileSearch;
 
@@ -152,9 +152,8 @@ TEST_F(CriteriaTest, OwnersAndGroups) {
     ASSERT_TRUE(criteria.add(3, nullptr, "alice") && criteria.add(4, nullptr, "users"));
     EXPECT_EQ(textOf(criteria.list[1]->getFirstCond()), "16.0.20100|18.6.users");
     for (const auto& [uid, gid, matches] : Rows<unsigned, unsigned, bool>{
-             {kAliceUid, kUsersGid, true}, {kBobUid, kUsersGid, false}, {kAliceUid, kAdminGid, false}}) {
+             {kAliceUid, kUsersGid, true}, {kBobUid, kUsersGid, false}, {kAliceUid, kAdminGid, false}})
         EXPECT_EQ(criteria.match("a", statusOf(S_IFREG, 0, uid, gid)), matches) << uid << " " << gid;
-    }
     const _tag_VEXOSTAT_ unknown = statusOf(S_IFREG, 0, 0xFFFFFFFF, 0xFFFFFFFF);
     EXPECT_FALSE(FindUserComp("x", 0xFFFFFFFF)("a", unknown) || FindGroupComp(nullptr, 0xFFFFFFFF)("a", unknown));
 }

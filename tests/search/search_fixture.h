@@ -56,13 +56,11 @@ inline std::string keyOf(const __tag_FI_FILE_INFO_DATA& record) {
 inline BOOL addRow(__tag_FI_FILE_INFO_DATA* record, void* rows) {
     std::string text;
     for (const char* column : {record->szShareRoot, record->szName, record->szParent, record->szExtension,
-                               record->szPermission, record->szOwner, record->szGroup}) {
+                               record->szPermission, record->szOwner, record->szGroup})
         (text += column) += '|';
-    }
     for (const int64_t number : {int64_t{record->isDir}, record->size, record->created, record->changed,
-                                 record->modified, int64_t{record->mode}, int64_t{record->uid}, int64_t{record->gid}}) {
+                                 record->modified, int64_t{record->mode}, int64_t{record->uid}, int64_t{record->gid}})
         (text += std::to_string(number)) += '|';
-    }
     EXPECT_TRUE(static_cast<Found*>(rows)->emplace(keyOf(*record), text).second) << "twice: " << keyOf(*record);
     return 1;
 }
@@ -141,9 +139,8 @@ class SearchFixture : public ApplianceTest {
  protected:
     void SetUp() override {
         ApplianceTest::SetUp();
-        for (const char* share : {"photo", "docs", "homes"}) {
+        for (const char* share : {"photo", "docs", "homes"})
             addShare(share, "read only = no\nvalid users = alice, bob, carol\nread list = bob\nvexo:index = yes\n");
-        }
     }
     static void makeFile(const std::string& path, off_t size = 0, uid_t uid = 0, gid_t gid = 0, time_t modified = 0,
                          time_t accessed = 0) {

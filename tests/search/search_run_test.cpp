@@ -37,12 +37,9 @@ TEST_F(SearchRunTest, WhatInitRefuses) {
         const std::vector<FindComp*> all{&files}, none;
         addUser("eve", 20009, kUsersGid);
         for (const auto& [user, folder, criteria, error] : Rows<const char*, const char*, std::vector<FindComp*>, int>{
-                 {"alice", "/photo", none, VEXO_ERR_PARAMETER},
-                 {"nobody-here", "/home", all, VEXO_ERR_PATH},
-                 {"alice", "/photo/#recycle", all, VEXO_ERR_DENIED},
-                 {"eve", "/photo", all, VEXO_ERR_DENIED},
-                 {"alice", "/photo/none", all, VEXO_ERR_DENIED},
-             }) {
+                 row("alice", "/photo", none, VEXO_ERR_PARAMETER), row("nobody-here", "/home", all, VEXO_ERR_PATH),
+                 row("alice", "/photo/#recycle", all, VEXO_ERR_DENIED), row("eve", "/photo", all, VEXO_ERR_DENIED),
+                 row("alice", "/photo/none", all, VEXO_ERR_DENIED)}) {
             SCOPED_TRACE(std::string(user) + folder);
             OneSearch run(user, {folder}, criteria);
             EXPECT_FALSE(run.ready);

@@ -3,8 +3,6 @@
 
 #include <sys/resource.h>
 
-#include "support/race.h"
-#include "support/refuse_calls.h"
 #include "support/testing.h"
 
 using namespace FileSearch;

@@ -69,9 +69,8 @@ TEST_F(SearchUpdateTest, AfterEachOperationTheResultsAreThoseOfANewSearch) {
     const std::string photo = shareRoot("photo"), docs = shareRoot("docs"), home = shareRoot("homes") + "/alice";
     // Names that a pattern would take for each other.
     for (const char* name : {"d", "d_", "dx", "d%", "d*", "d?", "d\\", "d'", "d\"", "D", "d [1]", "\xFF"}) {
-        for (const char* below : {"/f.txt", "/f_.txt", "/f%.txt", "/sub/f'.txt"}) {
+        for (const char* below : {"/f.txt", "/f_.txt", "/f%.txt", "/sub/f'.txt"})
             makeFile(photo + "/" + name + below, 3, kBobUid, kUsersGid, 1000);
-        }
     }
     for (int i = 0; i < 1000; ++i) makeFile(photo + "/many/" + std::to_string(i % 10) + "/" + std::to_string(i));
     makeFile(home + "/below/mine.txt");
@@ -140,16 +139,14 @@ TEST_F(SearchUpdateTest, BadPathsAndFailingDatabases) {
         for (const Operation& operation : operations) {
             SCOPED_TRACE(operation.faults[0].second);
             vexo::gate::reset();
-            for (const auto& path : {std::string("/volume1"), std::string("/volume1/photo"), tooLong}) {
+            for (const auto& path : {std::string("/volume1"), std::string("/volume1/photo"), tooLong})
                 EXPECT_FALSE(operation.call(path));
-            }
             const auto log = takeLogTexts();
             ASSERT_EQ(log.size(), 3U);
             EXPECT_EQ(log[0].find("orvelsearch:# Fail to find the share name "), 0U) << log[0];
             EXPECT_EQ(log[1], "orvelsearch:# Fail to find the path name /volume1/photo");
-            for (const auto& [call, text] : operation.faults) {
+            for (const auto& [call, text] : operation.faults)
                 EXPECT_EQ(vexo::gate::calls(call), 0) << "the database is not touched";
-            }
             for (const auto& [call, text] : operation.faults) {
                 for (int nth = 1; nth == 1 || (nth == 2 && text[0] == 'd'); ++nth) {
                     vexo::gate::reset();
@@ -209,10 +206,9 @@ TEST_F(SearchUpdateTest, PagesInEveryOrder) {
             for (const bool ascending : {true, false}) {
                 SCOPED_TRACE(word + (ascending ? " ascending" : " descending"));
                 Page page{column, {}, {}};
-                for (const unsigned long offset : {0, 30, 60}) {
+                for (const unsigned long offset : {0, 30, 60})
                     EXPECT_TRUE(screen_->queryResult(offset, 30, word.c_str(), &ascending, nullptr, "", addToPage,
                                                      &page, &count));
-                }
                 auto sorted = page.columns;
                 std::sort(sorted.begin(), sorted.end());
                 if (!ascending) std::reverse(sorted.begin(), sorted.end());

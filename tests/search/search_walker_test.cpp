@@ -46,9 +46,8 @@ std::vector<Query> queries() {
     }
     // What no index holds, beside what it does.
     for (const char* folder :
-         {"/photo/link.d/deep", "/photo/#recycle/bin", "/docs/@tmp", "/docs//2012/", "/docs/2012/../ab"}) {
+         {"/photo/link.d/deep", "/photo/#recycle/bin", "/docs/@tmp", "/docs//2012/", "/docs/2012/../ab"})
         all.push_back({{"/photo/ab", folder}, names});
-    }
     return all;
 }
 
@@ -115,11 +114,10 @@ TEST_F(SearchWalkerTest, RowsSayWhatTheFilesAre) {
 
 TEST_F(SearchWalkerTest, NobodySeesMoreThanAWalkWouldShow) {
     SKIP_WITHOUT_ROOT();
-    const std::string root = shareRoot("photo");
     const auto folder = [&](const char* path, mode_t mode) {
-        makeFile(root + path + "/f.txt");
-        EXPECT_EQ(chown((root + path).c_str(), kAliceUid, kUsersGid), 0);
-        return std::make_pair(root + path, mode);
+        makeFile(photo_ + path + "/f.txt");
+        EXPECT_EQ(chown((photo_ + path).c_str(), kAliceUid, kUsersGid), 0);
+        return std::make_pair(photo_ + path, mode);
     };
     const std::pair<std::string, mode_t> folders[] = {
         folder("/open", 0755),           folder("/closed", 0700),           folder("/closed/below", 0777),
@@ -132,21 +130,12 @@ TEST_F(SearchWalkerTest, NobodySeesMoreThanAWalkWouldShow) {
     EXPECT_EQ(chown((shareRoot("homes") + "/bob").c_str(), kBobUid, kUsersGid), 0);
     inOwnProcess([&] { buildIndex({"photo", "homes"}); });
     for (const auto& [path, mode] : folders) chmod(path.c_str(), mode);
-    fs::rename(root + "/swapped", root + "/open/elsewhere");
-    ASSERT_EQ(symlink("open/elsewhere", (root + "/swapped").c_str()), 0);
+    fs::rename(photo_ + "/swapped", photo_ + "/open/elsewhere");
+    ASSERT_EQ(symlink("open/elsewhere", (photo_ + "/swapped").c_str()), 0);
 
     const std::vector<Ask> files = {{0, nullptr, "f.txt"}};
     using Texts = std::vector<std::string>;
-    const Rows<const char*, Texts, Texts> cases = {
-        {"bob", {"/photo"}, {"photo/open/f.txt"}},
-        {"bob", {"/photo", "/photo/unreadable/below"}, {"photo/open/f.txt", "photo/unreadable/below/f.txt"}},
-        {"bob", {"/photo/unreadable/below"}, {"photo/unreadable/below/f.txt"}},
-        {"bob", {"/home"}, {"homes/bob/f.txt"}},
-        {"bob", {"/homes"}, {"homes/bob/f.txt"}},
-        {"carol",
-         {"/photo/closed", "/photo/unsearchable"},
-         {"photo/closed/below/f.txt", "photo/closed/f.txt", "photo/unsearchable/b/f.txt", "photo/unsearchable/f.txt"}},
-    };
+    const Rows<const char*, Texts, Texts> cases = rowsOf<const char*, Texts, Texts>("search/visible_files");
     for (const bool indexed : {true, false}) {
         for (const auto& [user, chosen, visible] : cases) {
             SCOPED_TRACE(std::string(indexed ? "index " : "walk ") + user + chosen.back());

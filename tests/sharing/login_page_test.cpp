@@ -26,18 +26,16 @@ TEST(LinkWindowTest, BothFormsOfAnEndDateAndBothEnds) {
              {0, kMax - 7, kDay, true},
              {0, kMin, kDay, false},
              {0, -1, kDay, false},
-         }) {
+         })
         EXPECT_EQ(isWithin({available, expires}, now), within) << available << " " << expires << " " << now;
-    }
 }
 
 TEST(LoginPageTest, Titles) {
     const std::string longName(300, 'x');
     for (const auto& [path, title] : Rows<std::string, std::string>{
              row("/photo/2012", "2012"), row("/photo/2012/", "/photo/2012/"), row("photo", "photo"), row("/", "/"),
-             row("/photo/" + longName, longName.substr(0, 254)), row(longName + "/", longName.substr(0, 254))}) {
+             row("/photo/" + longName, longName.substr(0, 254)), row(longName + "/", longName.substr(0, 254))})
         EXPECT_EQ(pageTitle(path), title);
-    }
 }
 
 }  // namespace

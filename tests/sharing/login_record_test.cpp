@@ -56,9 +56,8 @@ TEST(LoginRecordTest, LinesAsTheyAreReadAndWrittenBack) {
 TEST(LoginRecordTest, NumbersAndFreshness) {
     for (const auto& [field, wanted] : Rows<const char*, long>{
              row("12", 12L), row(" \t+12x", 12L), row("-3", -3L), row("+-3", 0L), row("x", 0L), row("", 0L),
-             row("99999999999999999999", LONG_MAX), row("-99999999999999999999", LONG_MIN)}) {
+             row("99999999999999999999", LONG_MAX), row("-99999999999999999999", LONG_MIN)})
         EXPECT_EQ(numberOf(field), wanted) << field;
-    }
     for (const auto& [accessTime, now, fresh] : Rows<long, long, bool>{
              {1000, 1900, true},
              {1000, 1901, false},
@@ -67,9 +66,8 @@ TEST(LoginRecordTest, NumbersAndFreshness) {
              {1, 1 + (1L << 31), true},  // the difference has 32 bits and a sign
              {1 + (1L << 32), 902, false},
              {LONG_MAX, 100, true},
-         }) {
+         })
         EXPECT_EQ(isFresh(accessTime, now, 900), fresh) << accessTime << " at " << now;
-    }
 }
 
 }  // namespace

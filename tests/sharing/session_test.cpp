@@ -8,8 +8,6 @@
 #include "sharing/login_record.h"
 #include "sharing/visitor_fixture.h"
 #include "support/fault_sweep.h"
-#include "support/race.h"
-#include "support/table.h"
 
 extern "C" {
 int sysinfo(struct sysinfo* info) noexcept {
@@ -86,9 +84,8 @@ TEST_F(SessionTest, TheAddressOfTheClient) {
              row(kNone, "10.0.0.6", "10.0.0.7", "10.0.0.6"), row(kNone, kNone, "10.0.0.7", "10.0.0.7"),
              row(longText.c_str(), kNone, kNone, longText.substr(0, 45))}) {
         for (const auto& [name, value] :
-             {std::pair{"HTTP_X_FORWARDED_FOR", forwarded}, {"HTTP_CLIENT_IP", client}, {"REMOTE_ADDR", remote}}) {
+             {std::pair{"HTTP_X_FORWARDED_FOR", forwarded}, {"HTTP_CLIENT_IP", client}, {"REMOTE_ADDR", remote}})
             value == nullptr ? unsetenv(name) : setenv(name, value, 1);
-        }
         writeRecords(recorded + ",alice,s1,5,99999,1,0,L\n");
         EXPECT_EQ(check(), 1) << recorded;
     }
@@ -173,9 +170,8 @@ TEST_F(SessionTest, ManyAtOnceLoseNothing) {
     EXPECT_EQ(std::count(after.begin(), after.end(), '\n'), kSessions + kProcesses * kRounds);
     std::string whole;
     std::string_view rest = after;
-    for (orvel::LoginRecord record; orvel::nextLoginRecord(rest, orvel::kLongestCheckedLine, record);) {
+    for (orvel::LoginRecord record; orvel::nextLoginRecord(rest, orvel::kLongestCheckedLine, record);)
         orvel::appendLoginRecord(record, whole);
-    }
     EXPECT_EQ(whole, after) << "a line is torn";
 }
 

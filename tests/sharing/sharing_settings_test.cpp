@@ -1,7 +1,6 @@
 #include "orvel/sharing_settings.h"
 
-#include "support/refuse_calls.h"
-#include "support/table.h"
+#include "support/testing.h"
 
 using OrvelSharing::SharingManager;
 

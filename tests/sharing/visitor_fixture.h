@@ -21,13 +21,6 @@ class VisitorTest : public ApplianceTest {
         uptime = 100000;
         secondsSlept = 0;
     }
-    void TearDown() override {
-        for (const char* name : {"REMOTE_ADDR", "HTTP_X_FORWARDED_FOR", "HTTP_CLIENT_IP", "HTTP_COOKIE", "QUERY_STRING",
-                                 "HTTP_FOLDER_SHARING", "USERNAME"}) {
-            unsetenv(name);
-        }
-        ApplianceTest::TearDown();
-    }
     static std::string path(const char* name) { return systemRoot() + name; }
     static void writeRecords(const std::string& text) { writeFile(path(orvel::kRecordFile), text, 0600); }
     static std::string records() { return readFile(path(orvel::kRecordFile)); }

@@ -55,9 +55,10 @@ class SystemRootFolder {
         const std::string own = path_ + "-tmp";
         mkdir(own.c_str(), 01777);
         chmod(own.c_str(), 01777);
-        if (unshare(CLONE_NEWNS) == 0 && mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0) {
-            mount(own.c_str(), "/tmp", nullptr, MS_BIND, nullptr);
-        }
+        // What lies in the machine's /tmp could not be run any more.
+        private_ = !fs::read_symlink("/proc/self/exe").string().starts_with("/tmp/") && unshare(CLONE_NEWNS) == 0 &&
+                   mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0 &&
+                   mount(own.c_str(), "/tmp", nullptr, MS_BIND, nullptr) == 0;
         fs::create_directories(path_);
         fs::permissions(path_, fs::perms(0755));
         setenv("VEXO_ROOT", path_.c_str(), 1);
@@ -72,10 +73,12 @@ class SystemRootFolder {
         }
     }
     [[nodiscard]] const std::string& path() const { return path_; }
+    [[nodiscard]] bool isPrivate() const { return private_; }
 
  private:
     std::string path_;
     int machine_;  // its /tmp
+    bool private_ = false;
     pid_t owner_ = getpid();
 };
 
@@ -178,6 +181,10 @@ void ApplianceTest::SetUp() {
     announced.clear();
     OrvLibSetErr(0);
     errno = 0;
+    environment_.clear();
+    for (char** entry = environ; *entry != nullptr; ++entry) environment_.emplace_back(*entry);
+    mask_ = umask(0);
+    umask(mask_);
     descriptors_ = openDescriptors();
 }
 
@@ -198,9 +205,16 @@ void ApplianceTest::TearDown() {
     vexo::fileindex::closeDatabases();
     EXPECT_EQ(openDescriptors(), descriptors_) << "descriptors were left open";
     if (chdir("/") != 0) ADD_FAILURE() << "chdir: " << strerror(errno);
+    clearenv();
+    for (const std::string& entry : environment_) {
+        const size_t equals = entry.find('=');
+        setenv(entry.substr(0, equals).c_str(), entry.c_str() + equals + 1, 1);
+    }
+    umask(mask_);
     std::error_code ignored;
     for (const auto& share : shares_) fs::remove_all(shareRoot(share.name), ignored);
     for (const auto& entry : fs::directory_iterator(systemRoot(), ignored)) fs::remove_all(entry.path(), ignored);
+    if (root.isPrivate()) fs::remove_all("/tmp/@tmp", ignored);
 }
 
 std::string ApplianceTest::addShare(const std::string& name, const std::string& options) {
@@ -213,9 +227,8 @@ std::string ApplianceTest::addShare(const std::string& name, const std::string& 
 
 void ApplianceTest::writeShares() {
     std::string text;
-    for (const auto& share : shares_) {
+    for (const auto& share : shares_)
         text += "[" + share.name + "]\npath = " + shareRoot(share.name) + "\n" + share.options + "\n";
-    }
     writeRootFile("/etc/vexo/shares.conf", text);
 }
 

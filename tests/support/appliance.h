@@ -34,7 +34,9 @@ enum : unsigned { kAliceUid = 20001, kBobUid = 20002, kCarolUid = 20003, kUsersG
 class ApplianceTest : public ::testing::Test {
  protected:
     void SetUp() override;
-    void TearDown() override;  // fails on unannounced log lines, announced ones that never came, and leaked descriptors
+    // Fails on unannounced log lines, announced ones that never came, and leaked descriptors. The environment and the
+    // mask of new files are as they were.
+    void TearDown() override;
 
     // The folder that stands for "/" of the appliance (VEXO_ROOT is read once a process, so all tests of a program
     // share it; its files are written anew for each test).
@@ -45,6 +47,7 @@ class ApplianceTest : public ::testing::Test {
     std::string addShare(const std::string& name, const std::string& options);
     // The root that addShare gives a share of this name.
     static std::string shareRoot(const std::string& name);
+    const std::string photo_ = shareRoot("photo");
     // Adds a line to etc/passwd (groups by addGroup). Home folders come from the share "homes".
     void addUser(const std::string& name, unsigned uid, unsigned gid);
     void addGroup(const std::string& name, unsigned gid, const std::vector<std::string>& members);
@@ -62,6 +65,8 @@ class ApplianceTest : public ::testing::Test {
     };
     std::vector<Share> shares_;
     std::string passwd_, group_, settings_, defaults_, mounts_;
+    std::vector<std::string> environment_;
+    mode_t mask_ = 0;
     int descriptors_ = 0;
 };
 

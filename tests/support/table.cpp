@@ -1,4 +1,4 @@
-#include "support/table.h"
+#include "support/testing.h"
 
 #include <json/reader.h>
 

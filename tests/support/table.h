@@ -3,15 +3,31 @@
 #ifndef ORVEL_TESTS_SUPPORT_TABLE_H
 #define ORVEL_TESTS_SUPPORT_TABLE_H
 
+#include <gtest/gtest.h>
 #include <json/value.h>
 
 #include <string>
-#include <type_traits>
+#include <tuple>
+#include <utility>
 #include <vector>
 
-#include "support/testing.h"
-
 namespace support {
+
+// The rows of a table: for (const auto& [path, type] : Rows<const char*, int>{{"/", 0}, {"/volume1", 2}}) ...
+template <class... Fields>
+using Rows = std::vector<std::tuple<Fields...>>;
+
+// One row, where several short ones stand on a line: Rows<const char*, int>{row("/", 0), row("/volume1", 2)}.
+template <class... Fields>
+std::tuple<Fields...> row(Fields... fields) {
+    return {std::move(fields)...};
+}
+
+// A list of items that are short enough to share lines.
+template <class Item, class... Items>
+std::vector<Item> listOf(Items... items) {
+    return {Item(std::move(items))...};
+}
 
 // The rows of a table, which stay in memory. A table that is missing, malformed or empty fails the test.
 const Json::Value& tableOf(const std::string& name);
@@ -65,9 +81,8 @@ Rows<Fields...> rowsOf(const std::string& name) {
 template <class Record, class... Fields>
 std::vector<Record> recordsOf(const std::string& name) {
     std::vector<Record> records;
-    for (const auto& row : rowsOf<Fields...>(name)) {
+    for (const auto& row : rowsOf<Fields...>(name))
         records.push_back(std::apply([](const auto&... fields) { return Record{fields...}; }, row));
-    }
     return records;
 }
 

@@ -16,6 +16,7 @@
 #include <functional>
 #include <map>
 #include <memory>
+#include <random>
 #include <set>
 #include <sstream>
 #include <string>
@@ -23,25 +24,19 @@
 #include <utility>
 #include <vector>
 
+#include "base/descriptor.h"
 #include "fault_gate.h"
 #include "orvel/error_state.h"
 #include "support/appliance.h"
 #include "support/log_texts.h"
+#include "support/race.h"
+#include "support/refuse_calls.h"
+#include "support/table.h"
 #include "support/wait.h"
 #include "vexo/error.h"
 #include "vexo/list.h"
 
 namespace support {
-
-// The rows of a table: for (const auto& [path, type] : Rows<const char*, int>{{"/", 0}, {"/volume1", 2}}) ...
-template <class... Fields>
-using Rows = std::vector<std::tuple<Fields...>>;
-
-// One row, where several short ones stand on a line: Rows<const char*, int>{row("/", 0), row("/volume1", 2)}.
-template <class... Fields>
-std::tuple<Fields...> row(Fields... fields) {
-    return {std::move(fields)...};
-}
 
 // The status of what must be there, no link followed.
 inline struct stat statusOf(const std::string& path) {

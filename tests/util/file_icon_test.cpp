@@ -31,13 +31,7 @@ TEST_F(FileIcon, Folders) {
     for (const auto& [folder, type] : Rows<const char*, const char*>{
              {"/photo/iso", "udf"}, {"/photo/nas", "nfs4"}, {"/photo/disk", "ext4"}, {"/photo/#recycle", "cifs"}})
         addMount(folder, type);
-    for (const auto& [path, share, expected] : Rows<const char*, const char*, const char*>{
-             row("/photo/iso", "/photo", "isomountpoint.png"), row("/photo/nas", "", "remotemountpoint.png"),
-             row("/photo/disk", "/photo", "folder.png"), row("/photo/nas/below", "/photo", "folder.png"),
-             row("/photo/#recycle", "/photo", "remotemountpoint.png"),
-             row("/music/#recycle/", "music", "recycle_bin.png"), row("/music/#recycle", "/", "folder.png"),
-             row("/music/a/#recycle", "/music/a", "folder.png"), row("/music/#Recycle", "/music", "folder.png"),
-             row("", "/music", "folder.png")})
+    for (const auto& [path, share, expected] : rowsOf<const char*, const char*, const char*>("util/folder_icons"))
         EXPECT_EQ(icon("x", true, path, share), expected) << path << " " << share;
     EXPECT_EQ(icon(nullptr, true, "/photo/iso", "/photo"), "misc.png");
 }

@@ -1,5 +1,5 @@
 #include "orvel/text.h"
-#include "support/table.h"
+#include "support/testing.h"
 
 namespace {
 

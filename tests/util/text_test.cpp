@@ -28,13 +28,7 @@ void collect(std::string& piece, long argument) {
 
 TEST(Text, ExplodeGivesTheSamePiecesInAllForms) {
     for (const auto& [whole, delimiter, expected, joinedNames] :
-         Rows<const char*, const char*, Pieces, const char*>{{"", ",", {}, "kept"},
-                                                             {"/x/a", ",", {"/x/a"}, "a"},
-                                                             {",a,,b,", ",", {"a", "", "b", ""}, "a||b|"},
-                                                             {",", ",", {""}, ""},
-                                                             {"/x/a::b/::/c", "::", {"/x/a", "b/", "/c"}, "a||c"},
-                                                             {"a:::b", "::", {"a", ":b"}, "a|:b"},
-                                                             {"a/b", nullptr, {"a/b"}, "b"}}) {
+         rowsOf<const char*, const char*, Pieces, const char*>("util/explode")) {
         SCOPED_TRACE(whole);
         std::string text = whole;
         collected.clear();
@@ -60,12 +54,7 @@ TEST(Text, CommonParent) {
 }
 
 TEST(Text, FileExtension) {
-    for (const auto& [name, limit, at] : Rows<const char*, unsigned, int>{
-             row(nullptr, 0, -1), row("", 0, -1), row(".", 255, -1), row("ab", 0, -1), row(".profile", 255, -1),
-             row("a.", 255, -1), row("..b", 0, 2), row(".a.b", 0, 3), row("archive.tar.gz", 1, 12),
-             // A limit below the length is an index from the front.
-             row("archive.tar.gz", 11, 12), row("archive.tar.gz", 10, 8), row("archive.tar.gz", 6, -1),
-             row("archive.tar.gz", 14, 12), row("a.bcdef", 2, 2)}) {
+    for (const auto& [name, limit, at] : rowsOf<const char*, unsigned, int>("util/file_extensions")) {
         const char* found = ReturnFileExt(name, limit);
         EXPECT_EQ(found == nullptr ? -1 : found - name, at) << testing::PrintToString(name) << limit;
     }
