@@ -19,6 +19,7 @@ export async function visitStates(page, at) {
     ["F2", ".in-place", "rename"],
     ["Alt+n", ".dialog", "new folder"], // with what lies behind a dialog
     ["Alt+Enter", ".why li", "properties", ".dialog"],
+    ["Alt+p", ".permissions .rights", "permissions", ".dialog"],
     ["Control+k", ".dialog", "share a link", ".dialog"],
     ["?", ".dialog", "shortcuts", ".dialog"],
     [" ", ".preview .text-shown > .scrolls", "preview"],

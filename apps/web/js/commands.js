@@ -2,13 +2,15 @@
 
 import { mayDownload, mayModify, mayWriteIn } from "./access.js";
 import { browser, chosenItems, go, goTo, goUp, refresh, setMode, shareEntry } from "./browser.js";
+import { Choice } from "./choice.js";
 import { loaded } from "./dialogs.js";
 import { isInBin, isOffline, isReadOnlyShare, mayBeText } from "./entries.js";
 import { download } from "./download.js";
 import { copyPath, newFolder, newText, rename, showProperties, showSpaceOf } from "./operations.js";
-import { isDeleted, isSearch } from "./path.js";
+import { isDeleted, isSearch, parentOf } from "./path.js";
 import { editPath } from "./pathbar.js";
 import { preview } from "./preview.js";
+import { entryAt } from "./sources.js";
 import { t } from "./strings.js";
 import { chooseFiles } from "./uploads.js";
 
@@ -52,6 +54,7 @@ export function context() {
     search,
     count,
     canChange: count > 0 && home !== undefined && !isReadOnlyShare(home) && writable && mayModify(lies),
+    canPermit: home !== undefined && !isReadOnlyShare(home) && mayModify(lies), // as far as the share goes
     canDownload: count > 0 && mayDownload(lies),
     // What is chosen by name alone has its properties in its row.
     single: selection.single && selection.single.id === onRow?.id ? onRow : selection.single,
@@ -156,6 +159,18 @@ addCommand({
   group: "info",
   when: ({ single, count, folder, search }) => (single ? single.isFolder && !isOffline(single) : count === 0 && folder && !search),
   run: ({ single }) => showSpaceOf(single?.id ?? browser.id),
+});
+addCommand({
+  id: "permissions",
+  icon: "lock",
+  keys: ["Alt+p"],
+  group: "info",
+  when: ({ count, folder, search, inBin }) => folder && !inBin && (count > 0 || (!search && parentOf(browser.id) !== "/")),
+  run: async ({ count, canPermit }) => {
+    const choice = count > 0 ? await chosenItems() : new Choice([await entryAt(browser.id).catch(() => ({ id: browser.id }))]);
+    const form = await loaded(import("./permissions.js"));
+    await form?.showPermissions(choice, canPermit);
+  },
 });
 addCommand({
   id: "upload",

@@ -30,6 +30,7 @@ const ICONS = {
   empty: "trash",
   compress: "archive",
   extract: "extract",
+  permit: "lock",
   undo: "restore",
 };
 
@@ -55,8 +56,8 @@ export async function setupTasks() {
 }
 
 // Starts `action` on entries or a choice. `params` go with it. `affected`: folders whose content it changes; `target`: where
-// what comes of it can be seen. Whether it began.
-export async function startTask(action, what, { params = {}, affected = [], target = null, bin = false } = {}) {
+// what comes of it can be seen. `refused(failure)`: whether it saw to that itself. Whether it began.
+export async function startTask(action, what, { params = {}, affected = [], target = null, bin = false, refused } = {}) {
   const choice = Choice.of(what);
   const folders = [...new Set([...affected, ...choice.folders])];
   for (const { params: chosen, count, entries } of choice.portions()) {
@@ -68,6 +69,7 @@ export async function startTask(action, what, { params = {}, affected = [], targ
       show({ taskid, action, state: "running", items_done: 0, progress: 0 }, { choice: some, params, folders, target });
       tabs.postMessage(taskid);
     } catch (failure) {
+      if (await refused?.(failure)) return false;
       if (failure.data?.listing) toast({ text: t("chosen.lost"), kind: "failed" });
       else toastFailure(failure, some.single?.id ?? choice.folders[0]);
       return false;

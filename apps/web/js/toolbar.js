@@ -64,7 +64,7 @@ export function contextItems() {
       "-",
       ...items(["undo", "paste", "selectAll", "refresh"]),
       "-",
-      ...items(["favour", "unfavour", "emptyBin", "space", "properties"]),
+      ...items(["favour", "unfavour", "emptyBin", "space", "permissions", "properties"]),
     ];
   }
   return [
@@ -76,7 +76,7 @@ export function contextItems() {
     "-",
     ...items(["delete", "deleteForever"]),
     "-",
-    ...items(["favour", "unfavour", "copyPath", "space", "properties"]),
+    ...items(["favour", "unfavour", "copyPath", "space", "permissions", "properties"]),
   ];
 }
 
