@@ -13,7 +13,7 @@ export function setupAccess() {
     if (id !== "/" && !isSearch(id)) asked.set(id, null);
   });
   // It comes with the list of a folder.
-  on("asked-access", ({ id, answer }) => take(id, answer));
+  on("came-access", ({ id, answer }) => take(id, answer));
   on("opened", (id) => asked.get(id) === null && ask(id));
 }
 

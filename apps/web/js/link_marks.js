@@ -1,13 +1,11 @@
-// Which rows of the folder on screen the user has public links for: asked once a folder, after its first rows are drawn.
+// Which rows of the folder on screen the user has public links for: that comes with the list of the folder.
 
 import { get } from "./api.js";
 import { browser } from "./browser.js";
-import { arrived, on } from "./events.js";
+import { on } from "./events.js";
 import { idIn, isSearch } from "./path.js";
 
-let shown = null; // the folder that the marks are of
 let marked = new Set();
-let none = false; // the user has no link at all: nothing to ask until one is made
 
 export function hasLink(id) {
   return marked.has(id);
@@ -16,25 +14,23 @@ export function hasLink(id) {
 export function setupLinkMarks() {
   on("place", () => {
     marked = new Set();
-    shown = null;
   });
-  on("shown", () => shown !== browser.id && !none && ask());
-  on("links", () => {
-    none = false;
-    ask();
-  });
+  on("came-links", ({ id, answer }) => take(id, answer));
+  on("links", ask);
 }
 
+// One was made, changed or revoked.
 async function ask() {
   const folder = browser.id;
-  shown = folder;
   if (folder === "/" || isSearch(folder)) return;
-  await arrived;
   const answer = await get("link", { action: "list", folder_raw: folder }).catch(() => null);
-  if (!answer || shown !== folder) return; // rows without a mark
-  none = answer.total === 0;
+  if (answer) take(folder, answer); // else rows without a mark
+}
+
+function take(folder, { items }) {
+  if (folder !== browser.id) return;
   const before = marked;
-  marked = new Set(answer.items.map((link) => idIn(link)));
+  marked = new Set(items.map((link) => idIn(link)));
   const changed = [...marked, ...before].filter((id) => marked.has(id) !== before.has(id));
   if (changed.length > 0) browser.view.renew(new Set(changed));
 }

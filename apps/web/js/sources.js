@@ -45,9 +45,9 @@ export function folderListing(id, { sort, filter }, onChange) {
 function keptPages(listing, asked, unkept) {
   let keeping = null;
   const keep = async (page, signal) => {
-    const order = { keep: 1, natural: language, folders_first: 1, with: "access" };
+    const order = { keep: 1, natural: language, folders_first: 1, with: "access,links" };
     const reply = await get("list", { ...asked, ...order, ...page }, signal);
-    if (reply.with?.access) emit("asked-access", { id: asked.path_raw, answer: reply.with.access });
+    for (const [word, answer] of Object.entries(reply.with ?? {})) emit(`came-${word}`, { id: asked.path_raw, answer });
     if (!reply.listing) {
       await unkept();
       return listing.fetchPart(listing.parts[0].part, page);
