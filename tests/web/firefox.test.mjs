@@ -4,7 +4,6 @@ import { existsSync, readFileSync } from "node:fs";
 import { join } from "node:path";
 import { after, before, test } from "node:test";
 import { Firefox } from "./firefox.mjs";
-import { goAllWays } from "./log_ins.mjs";
 import { localFiles, ownFolder } from "./support.mjs";
 
 const SITE = process.env.ORVEL_TEST_URL.replace("127.0.0.1", "localhost"); // where the page asks for the password
@@ -75,15 +74,6 @@ test("in, upload, preview, rename, delete, link, out", async () => {
   await firefox.find(".single h1", "plan.pdf");
   assert.deepEqual(firefox.complaints, []);
 });
-
-test("locked, expired, a one-time code, too many failures", () =>
-  goAllWays({
-    open: () => firefox.open(SITE),
-    fill: (selector, text) => firefox.fill(selector, text),
-    enter: () => firefox.type("Enter"),
-    see: (selector, text) => firefox.find(selector, text),
-    leave,
-  }));
 
 test("a session that ends during an upload: asked for in place, and it arrives", async () => {
   const there = ownFolder("later in firefox", { "plan.pdf": "a plan" });

@@ -1,9 +1,9 @@
 // Logging in by the page: who gets in, what is asked, where one is logged in, a session that ends in the middle of work.
 import assert from "node:assert/strict";
+import { readFileSync, rmSync, writeFileSync } from "node:fs";
 import { join } from "node:path";
 import { test } from "node:test";
 import { findings, finish, go, newPage, PASSWORDS, rowsReady, screenshot, upload, URL_OF_PAGE, wentWell } from "./browser.mjs";
-import { goAllWays } from "./log_ins.mjs";
 import { localFiles } from "./support.mjs";
 
 // By this name the demo's web server asks nobody for a password.
@@ -28,6 +28,12 @@ async function logIn(page, user, password = PASSWORDS[user], path = "/") {
   await page.keyboard.press("Enter");
   await page.waitForSelector("body.started");
   await rowsReady(page);
+}
+
+async function logOut(page) {
+  await page.click("#account-button");
+  await page.click(".menu >> text=Log out");
+  await page.waitForSelector(".login [name=user]");
 }
 
 // As another window of the same browser would.
@@ -86,9 +92,7 @@ test("right, wrong, unknown, asked once more, out again", () =>
       await go(other, "/music");
       await other.waitForSelector(".login-again");
     });
-    await page.click("#account-button");
-    await page.click(".menu >> text=Log out");
-    await page.waitForSelector(".login");
+    await logOut(page);
     await page.goto("about:blank");
     await page.goBack(); // the browser has kept nothing of what was on screen
     await page.waitForSelector(".login");
@@ -96,20 +100,52 @@ test("right, wrong, unknown, asked once more, out again", () =>
     assert.equal((await context.request.get(`${SITE}cgi-bin/list?action=shares`)).status(), 401);
   }));
 
+// What a machine may ask and refuse, by a PAM service of the test's own.
+const { ORVEL_TEST_DEMO: demo, ORVEL_TEST_PAM_TOLD: told, VEXO_GATE_PAM: service } = process.env;
+const auth = (more = "") => `auth required ${told} ask=Password: want=word ${more}\n`;
+const account = (more = "") => `account required ${told} ${more}\n`;
+const code = auth("say=Sent. [show=One-time code: ] want=123456") + account();
+const toChange = auth() + account("must_change");
+const toBlock = 'autoblock_attempts="1"\n';
+
+// stack; what is asked and answered; the complaint at the end, "" for who is let in; settings meanwhile
+const WAYS = [
+  { stack: auth() + account("locked"), answers: [["Password", "word"]], said: "Your account is locked" },
+  { stack: toChange + `password required ${told} locked\n`, answers: [["Password", "word"]], said: "your password has and was not changed" },
+  { stack: code, answers: [["Password", "word"], ["One-time code", "000000"]], said: "do not fit together" },
+  { stack: code, answers: [["Password", "word"], ["One-time code", "123456"]], said: "" },
+  {
+    stack: `${toChange}password required ${told} [ask=Current password: ] want=word [ask=New password: ] want=fresh [ask=Retype new password: ] want=fresh\n`,
+    answers: [["Password", "word"], ["Present password", "word"], ["New password", "fresh"], ["New password once more", "fresh"]],
+    said: "",
+  },
+  { stack: auth() + account(), answers: [["Password", "wrong"]], said: "do not fit together", settings: toBlock },
+  { stack: auth() + account(), answers: [["Password", "word"]], said: "Too many attempts failed from this address. Try again in", settings: toBlock },
+];
+
 test("locked, expired, a one-time code, too many failures", () =>
-  withBrowser((page) =>
-    goAllWays({
-      open: () => page.goto(SITE),
-      fill: (selector, text) => page.fill(selector, text),
-      enter: () => page.keyboard.press("Enter"),
-      see: (selector, text) => page.waitForSelector(`${selector} >> text=${text}`),
-      leave: async () => {
-        await page.click("#account-button");
-        await page.click(".menu >> text=Log out");
-        await page.waitForSelector(".login [name=user]");
-      },
-    }),
-  ));
+  withBrowser(async (page) => {
+    const file = join(demo, "etc/vexoinfo.conf"), settings = readFileSync(file, "utf8");
+    try {
+      for (const way of WAYS) {
+        writeFileSync(join(service, "orvel"), way.stack);
+        writeFileSync(file, settings + (way.settings ?? ""));
+        await page.goto(SITE);
+        await page.fill(".login [name=user]", "alice");
+        for (const [asked, answer] of way.answers) {
+          await page.waitForSelector(`.login .field >> text=${asked}`);
+          await page.fill(asked === "Password" ? ".login [name=password]" : ".login [name=answer]", answer);
+          await page.keyboard.press("Enter");
+        }
+        if (way.said) await page.waitForSelector(`.login .complaint >> text=${way.said}`);
+        else await logOut(page);
+      }
+    } finally {
+      rmSync(join(service, "orvel"), { force: true });
+      writeFileSync(file, settings);
+      rmSync(join(demo, "var/lib/vexo/autoblock.db"), { force: true });
+    }
+  }));
 
 test("a session that ends during an upload: asked for in place, everything arrives once", () =>
   withBrowser(async (page, context) => {
