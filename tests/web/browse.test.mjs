@@ -4,7 +4,7 @@ import { readdirSync, readFileSync, readlinkSync } from "node:fs";
 import { test } from "node:test";
 import { KINDS, PICTURES } from "../../apps/web/js/icons.js";
 import { boxOf, choose, drawn, go, row, rowsReady, typeName, URL_OF_PAGE, withPage } from "./browser.mjs";
-import { ownFolder, until } from "./support.mjs";
+import { ownFolder } from "./support.mjs";
 
 const LARGE = 20_000; // files of the share "warehouse"
 
@@ -416,14 +416,13 @@ test("every module that a start needs is fetched at once", async () => {
   assert.deepEqual(listed.sort(), [...needed].sort());
 });
 
-test("a start asks for the shares and the folder, and then for the marks of links alone", () =>
+test("a start asks for the shares and the folder, and for nothing else", () =>
   withPage("bob", { path: "/photo" }, async (page) => {
     const asked = [];
     page.on("request", (one) => one.url().includes("/cgi-bin/") && asked.push(new URL(one.url())));
     await page.reload({ waitUntil: "networkidle" });
     await rowsReady(page);
-    await until("the marks", () => asked.length >= 3);
-    assert.deepEqual(asked.map((url) => `${url.pathname.slice(9)} ${url.searchParams.get("action")}`), ["list shares", "list folder", "link list"]);
+    assert.deepEqual(asked.map((url) => `${url.pathname.slice(9)} ${url.searchParams.get("action")}`), ["list shares", "list folder"]);
   }));
 
 test("every message key has its words, in both languages", async () => {

@@ -1,32 +1,24 @@
 // Permissions: seen, changed with all that lies inside, undone; and what shuts oneself out asked about.
 import assert from "node:assert/strict";
-import { chmodSync, chownSync, mkdirSync, rmSync, statSync, symlinkSync, writeFileSync } from "node:fs";
+import { chmodSync, chownSync, statSync, symlinkSync } from "node:fs";
 import { join } from "node:path";
-import { after, beforeEach, test } from "node:test";
+import { beforeEach, test } from "node:test";
 import { choose, findings, press, row, screenshot, withPage } from "./browser.mjs";
-import { until } from "./support.mjs";
+import { ownFolder, until } from "./support.mjs";
 
 const projects = process.env.ORVEL_TEST_PROJECTS;
 const folder = join(projects, "rights");
 const PATHS = ["", "in", "in/g.txt", "f.txt"];
 
-function clean() {
-  rmSync(folder, { recursive: true, force: true });
-}
-
 beforeEach(() => {
-  clean();
   const { uid, gid } = statSync(join(projects, "notes.md"));
-  mkdirSync(join(folder, "in"), { recursive: true });
-  writeFileSync(join(folder, "in/g.txt"), "g");
-  writeFileSync(join(folder, "f.txt"), "f");
+  ownFolder("rights", { "in/g.txt": "g", "f.txt": "f" });
   symlinkSync("../notes.md", join(folder, "link"));
   for (const path of PATHS) {
     chownSync(join(folder, path), uid, gid);
     chmodSync(join(folder, path), path.endsWith("txt") ? 0o640 : 0o750);
   }
 });
-after(clean);
 
 const modes = () => PATHS.map((path) => (statSync(join(folder, path)).mode & 0o777).toString(8)).join(" ");
 const modesAre = (wanted) => until(`modes ${wanted}`, () => modes() === wanted);
