@@ -101,6 +101,13 @@ int checkNewName(const Descriptor& folder, const std::string& name) {
     return OrvCheckFileName(realPathOf(folder).c_str(), name.c_str()) == 0 ? ORV_ERR_NONE : lastCode();
 }
 
+std::string folderIdentity(int folder) {
+    struct statx status {};
+    if (statx(folder, "", AT_EMPTY_PATH, STATX_INO | STATX_BTIME, &status) != 0) return "";
+    return std::to_string(status.stx_ino) + "." + std::to_string(status.stx_btime.tv_sec) + "." +
+           std::to_string(status.stx_btime.tv_nsec);
+}
+
 int makeFolder(const Descriptor& folder, const std::string& name, const std::string& user, Descriptor& made) {
     const int code = checkNewName(folder, name);
     if (code != ORV_ERR_NONE) return code;

@@ -46,6 +46,10 @@ void removeMadeFolders(Target& target);
 // OrvCheckFileName.
 int checkNewName(const Descriptor& folder, const std::string& name);
 
+// Which folder it is, also after a restart, when devices have other numbers: an inode number and the time of its birth.
+// "" with errno.
+std::string folderIdentity(int folder);
+
 // Makes the folder `name` in `folder`, owned as above, and opens it. EEXIST gives 414.
 int makeFolder(const Descriptor& folder, const std::string& name, const std::string& user, Descriptor& made);
 

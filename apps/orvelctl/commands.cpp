@@ -95,6 +95,8 @@ const std::vector<Command>& table() {
                      {"--propose", "", "draws a password and prints it", "create"},
                      {"--from", "DAY", "from when on, 2024-12-31 or seconds since 1970; needs --until", "create"},
                      {"--until", "DAY", "the last day", "create"},
+                     {"--receive", "NAME",
+                      "visitors send files into a new folder of this name in PATH, and see nothing", "create"},
                      {"--downloads", "COUNT", "how many downloads may be begun; any number without it", "create"}},
          .examples = {{"orvelctl link create /photo/2012 --user alice --propose --until 2031-12-31",
                        "a folder behind a new password, to the end of that day"},

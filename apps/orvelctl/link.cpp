@@ -35,8 +35,9 @@ std::int64_t countOf(const std::string& text) {
     return count;
 }
 
-// How many downloads were begun, and of how many.
+// How many downloads were begun, or files received, and of how many.
 std::string usesText(const cgi::Link& link) {
+    if (link.receives) return "<" + std::to_string(link.files) + "/" + std::to_string(link.mostFiles);
     return std::to_string(link.used) + (link.most == 0 ? "" : "/" + std::to_string(link.most));
 }
 
@@ -52,6 +53,7 @@ std::string dayText(std::int64_t seconds) {
 const char* stateOf(const cgi::Link& link) {
     const cgi::Owner owner = cgi::ownerOf(link);
     if (owner != cgi::Owner::kThere) return owner == cgi::Owner::kGone ? "owner gone" : "owner?";
+    if (link.receives && (link.files >= link.mostFiles || link.bytes >= link.mostBytes)) return "full";
     if (link.most > 0 && link.used >= link.most) return "used up";
     if (OrvelLogin::IsLinkOpen(link.available, link.expires, time(nullptr))) return "open";
     return link.available > time(nullptr) ? "not yet" : "expired";
@@ -72,6 +74,7 @@ int create(const std::vector<std::string>& words) {
     wish.terms.password = arguments.value("--password", proposed);
     wish.terms.available = dateOf(arguments.value("--from", ""));
     wish.terms.expires = dateOf(arguments.value("--until", ""));
+    wish.inbox = arguments.value("--receive", "");
     wish.terms.most = countOf(arguments.value("--downloads", "0"));
     cgi::Link link;
     const int code = cgi::makeLink(wish, link);

@@ -210,7 +210,7 @@ def checkRefusals():
             posted = action and item.get("get") and schema not in list(requestSchemas(program, "get"))
             if posted:
                 ask(program, "GET", usual, status=400, success=False, whole=False)
-        if program not in ("share", "sessions"):
+        if program not in ("send", "share", "sessions"):
             method = "PUT" if program == "upload" else "POST"
             ask(program, method, {}, status=403, success=False, whole=False, headers={"Origin": "http://elsewhere"})
 

@@ -1,6 +1,8 @@
 // The link database: whole before it has its name, trusted or not used.
 #include "vexo/link_store.h"
 
+#include "vexo/link_seat.h"
+
 #include <sqlite3.h>
 
 #include "platform/trust.h"
@@ -77,6 +79,41 @@ TEST_F(LinkStoreTest, ADatabaseOfLinksAloneIsAddedTo) {
     EXPECT_TRUE(VEXO::LinkStore().find(id, link) && link && link->used == 4);
     execute("PRAGMA user_version = 99");
     EXPECT_EQ(paths(), "failed") << "of a newer version";
+}
+
+TEST_F(LinkStoreTest, SeatsAreBoundedAndFreeAtTheEndOfTheirHolder) {
+    using VEXO::LinkSeat;
+    LinkSeat::Others others;
+    std::vector<std::unique_ptr<LinkSeat>> seats;
+    const auto take = [&](const std::string& link, const std::string& address) {
+        auto seat = std::make_unique<LinkSeat>();
+        if (seat->take(link, address, 10, others) != LinkSeat::Taking::kTaken) return false;
+        seats.push_back(std::move(seat));
+        return true;
+    };
+    for (int i = 0; i < VEXO::kSeatsOfAddress; ++i) EXPECT_TRUE(take("a", "1"));
+    EXPECT_FALSE(take("a", "1"));
+    EXPECT_FALSE(take("b", "1")) << "of an address, whatever the link";
+    for (int i = VEXO::kSeatsOfAddress; i < VEXO::kSeatsOfLink; ++i) EXPECT_TRUE(take("a", "2"));
+    EXPECT_TRUE(others.files == VEXO::kSeatsOfLink - 1 && others.bytes == 10 * others.files);
+    EXPECT_FALSE(take("a", "3"));
+    EXPECT_TRUE(take("b", "3"));
+    EXPECT_EQ(others.files, 0);
+    seats.erase(seats.begin());
+    expectKilled([&] {
+        if (take("a", "3")) raise(SIGKILL);
+    });
+    EXPECT_TRUE(take("a", "3")) << "the killed one's";
+    EXPECT_FALSE(take("a", "4"));
+    for (int link = 0; static_cast<int>(seats.size()) < VEXO::kSeats; ++link) {
+        const std::string name = "other " + std::to_string(link);
+        ASSERT_TRUE(take(name, name));
+    }
+    EXPECT_FALSE(take("z", "z")) << "all that there are";
+    seats.clear();
+    EXPECT_TRUE(take("z", "z"));
+    writeFile(systemRoot() + "/run/vexo/sending", "", 0622);
+    EXPECT_EQ(LinkSeat().take("a", "1", 1, others), LinkSeat::Taking::kFailed) << "others may write it";
 }
 
 TEST_F(LinkStoreTest, ManyMakeItAtOnce) {

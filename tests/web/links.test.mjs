@@ -1,5 +1,7 @@
 // Public links: made, opened by a visitor who has no account, revoked.
 import assert from "node:assert/strict";
+import { rmSync } from "node:fs";
+import { join } from "node:path";
 import { test } from "node:test";
 import { choose, findings, finish, newPage, press, row, screenshot, withPage } from "./browser.mjs";
 import { ownFolder } from "./support.mjs";
@@ -125,6 +127,64 @@ test("changed in place: downloads that end, a badge, a code", () => {
     await marked.waitFor({ state: "detached" });
   });
 });
+
+test("files received by a link, on a phone, seen by the owner alone", () =>
+  withPage("alice", { path: "/projects" }, async (page) => {
+    await row(page, "house").click({ button: "right" });
+    await page.click(".menu >> text=Receive files by a link");
+    await page.fill("[name=inbox]", "from the party");
+    await page.fill("[name=password]", "");
+    await page.fill("[name=most_files]", "2");
+    await screenshot(page, "link-receive");
+    assert.deepEqual(await findings(page), []);
+    await page.click(".dialog >> text=Create link");
+    const address = await page.inputValue(".address");
+    await page.keyboard.press("Escape");
+    const phone = { viewport: { width: 390, height: 780 }, isMobile: true, hasTouch: true };
+    const bytes = (text) => ({ mimeType: "image/jpeg", buffer: Buffer.from(text) });
+    await visit(
+      address,
+      async (visitor, status, wrong) => {
+        assert.equal(status, 200);
+        await visitor.waitForSelector("h1:has-text('from the party')");
+        await visitor.waitForSelector("text=2 more files can be sent");
+        await visitor.setInputFiles("#files", [
+          { name: "cake.jpg", ...bytes("cake") },
+          { name: "cake.jpg", ...bytes("more cake") },
+          { name: "too many.jpg", ...bytes("third") },
+        ]);
+        await visitor.locator(".sending .sent").nth(1).waitFor();
+        await visitor.waitForSelector(".sending .failed >> text=The link does not take this much.");
+        await visitor.waitForSelector("text=This link takes no more files.");
+        await screenshot(visitor, "visitor-sends");
+        assert.equal(await visitor.evaluate(() => document.documentElement.scrollWidth), 390);
+        assert.deepEqual(await findings(visitor), []);
+        assert.deepEqual(wrong.filter((text) => !text.includes("413")), []);
+      },
+      phone,
+    );
+    await visit(address, async (visitor, status) => {
+      await visitor.waitForSelector("text=This link takes no more files.");
+      assert.equal(await visitor.locator("text=cake").count(), 0, "nothing of what was sent");
+      await screenshot(visitor, "visitor-full");
+    }, { colorScheme: "dark" });
+    await page.click("#account-button");
+    await page.click(".menu >> text=My public links");
+    const link = page.locator(".link-list li:has(b[title$='/house/from the party'])");
+    await link.locator("text=2 of 2 files").waitFor();
+    await screenshot(page, "links-received");
+    await link.locator("[aria-label='What was sent']").click();
+    const sent = page.locator(".dialog:has(h2:has-text('What was sent'))");
+    await sent.locator("li:has-text('cake (2).jpg'):has-text('from 127.0.0.1')").waitFor();
+    await screenshot(page, "links-sent");
+    assert.deepEqual(await findings(page), []);
+    await page.keyboard.press("Escape");
+    await sent.waitFor({ state: "detached" });
+    await link.locator("[aria-label=Revoke]").click();
+    await page.click(".dialog .button.danger");
+    await link.waitFor({ state: "detached" });
+    rmSync(join(process.env.ORVEL_TEST_PROJECTS, "house/from the party"), { recursive: true });
+  }));
 
 test("names of markup reach a visitor as text", () =>
   withPage("alice", { path: "/worldwide" }, async (page) => {

@@ -1,7 +1,7 @@
 // CGI program "link": the public links of the logged-in user.
 //
 // Parameters, from the query or a form:
-//   action           "create", "list", "change" or "revoke"; what changes something must be posted
+//   action           "create", "list", "received", "change" or "revoke"; what changes something must be posted
 //   path, path_raw   what to publish (create); list: only the links of exactly that
 //   folder, folder_raw  list: only the links of what lies directly in it
 //   password         that a visitor must give; none without it, "" takes it away (create, change)
@@ -9,10 +9,14 @@
 //   expires          the first or the last second of the last day; 0: for ever (create, change)
 //   note             for the owner alone (create, change)
 //   downloads        how many may be begun; 0: any number (create, change)
-//   id               of the link (change, revoke); an administrator may revoke anybody's
+//   inbox, inbox_raw visitors send files into a new folder of this name below the path, and see nothing (create)
+//   most_files, most_bytes  that may be received (create with inbox, change)
+//   offset, limit    of what was received (received)
+//   id               of the link (received, change, revoke); an administrator may revoke anybody's
 // What "change" does not name stays as it is. "data" of the reply is the link, or {"items": [...], "total"} of them,
 // the latter of all that the user has: id, address, path, has_password, available, expires, created, owner, note,
-// downloads, used, last_use.
+// downloads, used, last_use, and received: {"files", "bytes", "most_files", "most_bytes"} of one with an inbox. Of
+// "received" it is {"items": [...]} of name, size, address, time.
 #include <json/value.h>
 
 #include <cstdint>
@@ -33,6 +37,8 @@
 namespace orvel::cgi {
 namespace {
 
+constexpr unsigned long kUsualSent = 200, kMostSent = 1000, kMostOffset = 1'000'000;
+
 Json::Value shown(const Link& link) {
     Json::Value item;
     item["id"] = link.id;
@@ -47,6 +53,13 @@ Json::Value shown(const Link& link) {
     item["downloads"] = Json::Int64(link.most);
     item["used"] = Json::Int64(link.used);
     item["last_use"] = Json::Int64(link.lastUse);
+    if (link.receives) {
+        Json::Value& received = item["received"];
+        received["files"] = Json::Int64(link.files);
+        received["bytes"] = Json::Int64(link.bytes);
+        received["most_files"] = Json::Int64(link.mostFiles);
+        received["most_bytes"] = Json::Int64(link.mostBytes);
+    }
     return item;
 }
 
@@ -62,16 +75,19 @@ bool readTerms(const VEXO::WebCGI& web, LinkTerms& terms) {
     if (web.HasParam("password")) terms.password = web.GetParam("password", "");
     if (web.HasParam("note")) terms.note = web.GetParam("note", "");
     return readNumber(web, "available", terms.available) && readNumber(web, "expires", terms.expires) &&
-           readNumber(web, "downloads", terms.most);
+           readNumber(web, "downloads", terms.most) && readNumber(web, "most_files", terms.mostFiles) &&
+           readNumber(web, "most_bytes", terms.mostBytes);
 }
 
 int create(const VEXO::WebCGI& web, const User& user, Json::Value& data, std::string& path) {
     const auto given = pathParam(web);
+    const auto inbox = bytesParam(web, "inbox");
     LinkTerms terms;
-    if (!isPosted() || !given || !readTerms(web, terms)) return ORV_ERR_PARAMETER;
+    if (!isPosted() || !given || !inbox || !readTerms(web, terms)) return ORV_ERR_PARAMETER;
     path = *given;
     Link link;
-    const int code = makeLink({.user = user.name, .sid = user.sid, .path = path, .terms = terms}, link);
+    const int code =
+        makeLink({.user = user.name, .sid = user.sid, .path = path, .terms = terms, .inbox = *inbox}, link);
     if (code == ORV_ERR_NONE) data = shown(link);
     return code;
 }
@@ -106,6 +122,28 @@ int list(const VEXO::WebCGI& web, const User& user, Json::Value& data) {
     return ORV_ERR_NONE;
 }
 
+// What visitors sent, the last first.
+int listReceived(const VEXO::WebCGI& web, const User& user, Json::Value& data) {
+    const auto offset = numberParam(web, "offset", 0), limit = numberParam(web, "limit", kUsualSent);
+    if (!offset || !limit || *limit > kMostSent || *offset > kMostOffset) return ORV_ERR_PARAMETER;
+    std::vector<VEXO::SentFile> files;
+    LinkStore store;
+    if (!store.listSent(web.GetParam("id", ""), user.name, static_cast<std::int64_t>(*offset),
+                        static_cast<std::int64_t>(*limit), files)) {
+        return ORV_ERR_GENERAL;
+    }
+    data["items"] = Json::Value(Json::arrayValue);
+    for (const VEXO::SentFile& file : files) {
+        Json::Value item;
+        putPath(item, "name", file.name);
+        item["address"] = readable(file.address);
+        item["size"] = Json::Int64(file.size);
+        item["time"] = Json::Int64(file.time);
+        data["items"].append(item);
+    }
+    return ORV_ERR_NONE;
+}
+
 int revoke(const VEXO::WebCGI& web, const User& user) {
     if (!isPosted()) return ORV_ERR_PARAMETER;
     const bool anybodys = VEXOGroupIsAdminGroupMem(user.name.c_str()) == 1;
@@ -127,6 +165,7 @@ void serveLinkProgram(Request& request, Output& out) {
     if (action == "create") code = create(web, user, data, path);
     if (action == "change") code = change(web, user, data);
     if (action == "list") code = list(web, user, data);
+    if (action == "received") code = listReceived(web, user, data);
     if (action == "revoke") code = revoke(web, user);
     reply(out, statusOf(code), user.cookie, code, path, data);
 }

@@ -32,6 +32,7 @@ constexpr Program kPrograms[] = {
     {"operation", kAsking, kForm, Caller::kUser, false, serveOperationProgram},
     {"preferences", kAsking, kPreferences, Caller::kUser, false, servePreferencesProgram},
     {"search", kAsking, kForm, Caller::kUser, false, serveSearchProgram},
+    {"send", "POST, PUT", kAnyLength, Caller::kAnybody, false, serveSendProgram},
     {"sessions", "GET, HEAD", kForm, Caller::kAnybody, true, serveSessionsProgram},
     {"share", kAsking, kForm, Caller::kAnybody, false, serveShareProgram},
     {"thumbnail", kAsking, kForm, Caller::kUser, true, serveThumbnailProgram},

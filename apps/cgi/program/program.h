@@ -47,6 +47,7 @@ void serveLinkProgram(Request& request, Output& out);
 void serveOperationProgram(Request& request, Output& out);
 void servePreferencesProgram(Request& request, Output& out);
 void serveSearchProgram(Request& request, Output& out);
+void serveSendProgram(Request& request, Output& out);
 void serveShareProgram(Request& request, Output& out);
 void serveThumbnailProgram(Request& request, Output& out);
 void serveTusProgram(Request& request, Output& out);

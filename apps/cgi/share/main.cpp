@@ -4,7 +4,8 @@
 //   FOLDER_SHARING   the link; the header Folder-Sharing comes before it
 //   action           none: the page, which asks for the rest
 //                    "state": {"logged_in", "password"}, the latter whether the link takes one; "downloads_left" where
-//                    they are limited
+//                    they are limited; "receives": {"name", "files_left", "bytes_left"} of a link by which visitors send
+//                    files (see the program "send"), which nothing else of this shows
 //                    "login" (posted): with `password`; sets the cookies of the link. 429 when it is not the visitor's
 //                    turn, with {"wait", "turn"}: `turn` goes with the next attempt, after `wait` milliseconds
 //                    "list": what the shared folder holds, or the shared file alone
@@ -171,6 +172,12 @@ void serveState(Output& out, Visit& visit) {
     state["password"] = !visit.link().passwordHash.empty();
     const Link& link = visit.link();
     if (link.most > 0) state["downloads_left"] = Json::Int64(std::max<std::int64_t>(link.most - link.used, 0));
+    if (link.receives) {
+        Json::Value& receives = state["receives"];
+        putPath(receives, "name", link.path.substr(link.path.rfind('/') + 1));
+        receives["files_left"] = Json::Int64(std::max<std::int64_t>(link.mostFiles - link.files, 0));
+        receives["bytes_left"] = Json::Int64(std::max<std::int64_t>(link.mostBytes - link.bytes, 0));
+    }
     reply(out, Status::kOk, visit.dropCookie(), ORV_ERR_NONE, "", state);
 }
 
@@ -280,16 +287,6 @@ void serveDownload(Output& out, Visit& visit, std::vector<std::string> wanted) {
     serveZip(out, owner, sources, sources.size() == 1 ? sources[0].name : "download", open);
 }
 
-Status statusOf(Availability availability) {
-    if (availability == Availability::kBlocked) return Status::kForbidden;
-    return availability == Availability::kNone ? Status::kNotFound : Status::kBroken;
-}
-
-int codeOf(Availability availability) {
-    if (availability == Availability::kBlocked) return ORV_ERR_DENIED;
-    return availability == Availability::kNone ? ORV_ERR_MISSING : ORV_ERR_GENERAL;
-}
-
 // What only a visitor who is logged in sees; from here on the process is the link's owner.
 void serveInside(Output& out, Visit& visit, const std::string& action) {
     Session session = Session::kUnknown;
@@ -316,10 +313,11 @@ void serveShareProgram(Request& request, Output& out) {
         return replyFailure(out, Status::kBadRequest, "", ORV_ERR_PARAMETER, "");
     }
     if (visit.availability() != Availability::kOpen) {
-        return replyFailure(out, statusOf(visit.availability()), "", codeOf(visit.availability()), "");
+        return refuse(out, visit.availability());
     }
     if (action == "state") return serveState(out, visit);
     if (action == "login") return serveLogin(out, visit);
+    if (visit.link().receives) return refuse(out, Availability::kNone);  // there is nothing to see
     serveInside(out, visit, action);
 }
 

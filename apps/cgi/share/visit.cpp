@@ -9,6 +9,8 @@
 #include <optional>
 #include <string_view>
 
+#include "orvel/error_state.h"
+#include "reply.h"
 #include "request.h"
 #include "vexo/auto_block.h"
 #include "vexo/error.h"
@@ -56,6 +58,12 @@ void sweepRecords(VEXO::WebCGI& web, const std::string& link) {
 
 }  // namespace
 
+void refuse(Output& out, Availability availability) {
+    const bool blocked = availability == Availability::kBlocked, none = availability == Availability::kNone;
+    const Status status = blocked ? Status::kForbidden : none ? Status::kNotFound : Status::kBroken;
+    replyFailure(out, status, "", blocked ? ORV_ERR_DENIED : none ? ORV_ERR_MISSING : ORV_ERR_GENERAL, "");
+}
+
 Visit::Visit(VEXO::WebCGI& web) : web_(web), availability_(find()) {}
 
 Availability Visit::find() {
@@ -72,7 +80,7 @@ Availability Visit::find() {
     const Owner owner = ownerOf(*found);
     if (owner != Owner::kThere) return owner == Owner::kGone ? Availability::kNone : Availability::kBroken;
     link_ = *found;
-    link_.path = manager_.GetSharingFolderPath(web_);
+    if (!link_.receives) link_.path = manager_.GetSharingFolderPath(web_);
     return link_.path.empty() ? Availability::kNone : Availability::kOpen;
 }
 
@@ -126,8 +134,10 @@ bool Visit::recordSession() {
            manager_.folderSharingLogin(web_, link_.id, link_.owner) && web_.AddCookieToHeader("/", sealName(), seal);
 }
 
+// Of a link that receives no more is said than the name that its owner gave it.
 void Visit::writePage() {
-    manager_.WriteWebPage(web_, "", harmless(link_.path));
+    const std::string shown = link_.receives ? link_.path.substr(link_.path.rfind('/')) : link_.path;
+    manager_.WriteWebPage(web_, "", harmless(shown));
 }
 
 }  // namespace orvel::cgi

@@ -5,6 +5,7 @@
 #include <string>
 
 #include "orvel/sharing_link.h"
+#include "output.h"
 #include "public_link.h"
 #include "vexo/guess.h"
 #include "vexo/web.h"
@@ -30,6 +31,9 @@ enum class LogIn {
     kWait,   // it is not this visitor's turn to have a password judged: waiting() says when
     kBroken  // no session could be made
 };
+
+// Answers a request for a link that is not open.
+void refuse(Output& out, Availability availability);
 
 class Visit {
  public:

@@ -38,14 +38,6 @@ void prepareVolume(std::string volumePath) {
     umask(022);  // that of every other file
 }
 
-// An inode number and the time of its birth: which folder it is, also after a restart, when devices have other numbers.
-std::string folderIdentity(int folder) {
-    struct statx status {};
-    if (statx(folder, "", AT_EMPTY_PATH, STATX_INO | STATX_BTIME, &status) != 0) return "";
-    return std::to_string(status.stx_ino) + "." + std::to_string(status.stx_btime.tv_sec) + "." +
-           std::to_string(status.stx_btime.tv_nsec);
-}
-
 // Waits for the target's name, and those of the folders that were made for it.
 bool isOnDisk(const Target& target) {
     return syncName(target.folder.get(), target.name) &&

@@ -4,10 +4,11 @@ import { get, post } from "./api.js";
 import { confirm, dialog, toast, toastFailure } from "./dialogs.js";
 import { h, icon, iconButton, keepFocus, nameNode, plainName } from "./dom.js";
 import { emit } from "./events.js";
-import { formatDay, formatTime } from "./format.js";
+import { formatDay, formatSize, formatTime } from "./format.js";
 import { iconOf } from "./icons.js";
 import { showCode } from "./link_code.js";
-import { linkForm, termFields } from "./link_form.js";
+import { field, linkForm, termFields } from "./link_form.js";
+import { showSent } from "./link_sent.js";
 import { copyText } from "./operations.js";
 import { decode, idIn, nameOf } from "./path.js";
 import { t } from "./strings.js";
@@ -31,11 +32,35 @@ export async function makeLink(entry) {
   showLink(link, password);
 }
 
+// Visitors send files into a new folder of this one, and see nothing.
+export async function receiveFiles(entry) {
+  let password = "";
+  const name = h("input.input", { name: "inbox", type: "text", required: true, maxlength: 100, autofocus: true, value: t("link.inbox.name") });
+  const fields = termFields(null, { receives: true });
+  fields.nodes.unshift(field(t("link.inbox"), name, t("link.inbox.hint", { folder: entry.name })));
+  const link = await linkForm({
+    title: t("command.receive"),
+    picture: iconOf(entry),
+    name: entry.name,
+    fields,
+    about: t("link.about.receives"),
+    action: t("link.create"),
+    submit: (terms) => {
+      ({ password } = terms);
+      return post("link", { action: "create", path_raw: entry.id, inbox: name.value.trim(), ...terms });
+    },
+  });
+  if (!link) return;
+  emit("links");
+  emit("folders-changed", { ids: [entry.id] });
+  showLink(link, password);
+}
+
 async function editLink(link) {
   let password;
   const changed = await linkForm({
     title: t("link.edit.title"),
-    picture: link.has_password ? "lock" : "link",
+    picture: link.received ? "upload" : link.has_password ? "lock" : "link",
     name: nameOf(idIn(link)),
     fields: termFields(link),
     action: t("link.save"),
@@ -137,11 +162,17 @@ function limitOf({ downloads }) {
   return downloads ? t("link.limit", { count: downloads }) : "";
 }
 
+function roomOf({ received, last_use: last }) {
+  const { files, bytes, most_files: mostFiles, most_bytes: mostBytes } = received;
+  const count = t("link.received", { files, count: mostFiles, size: formatSize(bytes), most: formatSize(mostBytes) });
+  return files ? `${count} · ${t("link.last", { time: formatTime(last) })}` : count;
+}
+
 function usesOf({ used, downloads, last_use: last }) {
   if (downloads && used >= downloads) return t("link.used_up", { count: downloads });
   if (!used) return downloads ? t("link.unused.of", { count: downloads }) : t("link.unused");
   const count = downloads ? t("link.used.of", { used, count: downloads }) : t("link.used", { count: used });
-  return `${count}, ${t("link.last", { time: formatTime(last) })}`;
+  return `${count} · ${t("link.last", { time: formatTime(last) })}`;
 }
 
 // Of one file or folder, or all.
@@ -199,11 +230,13 @@ function confirmRevoking() {
 }
 
 function linkRow(link, { edit, revoke }) {
-  const spent = Boolean(link.downloads) && link.used >= link.downloads;
+  const { received } = link;
+  const full = received && (received.files >= received.most_files || received.bytes >= received.most_bytes);
+  const spent = full || (Boolean(link.downloads) && link.used >= link.downloads);
   return h(
     "li",
     {},
-    h("span.card-icon", {}, icon(link.has_password ? "lock" : "link")),
+    h("span.card-icon", {}, icon(received ? "upload" : link.has_password ? "lock" : "link")),
     h(
       "div.grow",
       {},
@@ -216,7 +249,7 @@ function linkRow(link, { edit, revoke }) {
           .filter(Boolean)
           .join(" · "),
       ),
-      h(spent ? "span.soft.spent" : "span.soft", {}, usesOf(link)),
+      h(spent ? "span.soft.spent" : "span.soft", {}, full && `${t("link.full")}: `, received ? roomOf(link) : usesOf(link)),
     ),
     h(
       "div.link-actions",
@@ -232,6 +265,7 @@ function linkRow(link, { edit, revoke }) {
         },
         icon("eye"),
       ),
+      received && iconButton("list", t("link.sent"), () => showSent(link)),
       iconButton("copy", t("link.copy"), () => copyLink(link)),
       iconButton("code", t("link.code"), () => codeOf(link)),
       iconButton("rename", t("link.edit"), () => edit(link)),

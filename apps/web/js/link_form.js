@@ -6,6 +6,9 @@ import { sentenceOf } from "./errors.js";
 import { t } from "./strings.js";
 
 const MOST_DOWNLOADS = 1_000_000;
+const MOST_FILES = 10_000;
+const MEGABYTE = 1024 * 1024;
+const MOST_MEGABYTES = 1024 * 1024 * 1024;
 
 const secondsOf = (day) => (day ? Math.floor(new Date(`${day}T00:00:00`).getTime() / 1000) : 0);
 const dayOf = (seconds) => (seconds ? new Date(seconds * 1000).toLocaleDateString("sv") : ""); // year-month-day
@@ -22,7 +25,7 @@ export function field(label, node, hint) {
 }
 
 // The fields of a link, one of which there may be already. read() gives what differs from it, as the program takes it.
-export function termFields(link = null, { downloads = true } = {}) {
+export function termFields(link = null, { receives = link?.received !== undefined } = {}) {
   const [available, expires] = dayRange(
     { name: "available", value: dayOf(link?.available) },
     { name: "expires", value: dayOf(link?.expires), min: link ? undefined : dayOf(Date.now() / 1000) },
@@ -38,12 +41,14 @@ export function termFields(link = null, { downloads = true } = {}) {
     value: link?.downloads || "",
     placeholder: t("link.downloads.any"),
   });
+  const room = receives ? roomFields(link) : null;
   const note = h("input.input", { name: "note", type: "text", maxlength: 100, autocomplete: "off", value: link?.note ?? "" });
   const read = () => {
     const wanted = {
       available: secondsOf(available.value),
       expires: secondsOf(expires.value),
-      downloads: downloads ? Number(most.value) : undefined,
+      downloads: receives ? undefined : Number(most.value),
+      ...room?.read(),
       note: note.value.trim(),
       password: password.read(),
     };
@@ -55,14 +60,24 @@ export function termFields(link = null, { downloads = true } = {}) {
   const nodes = [
     ...password.nodes,
     h("div.pair", {}, field(t("link.available"), available), field(t("link.expires"), expires)),
-    h(
-      downloads ? "div.pair" : "div",
-      {},
-      downloads && field(t("link.downloads"), most),
-      field(t("link.note"), note),
-    ),
+    room?.nodes,
+    receives
+      ? field(t("link.note"), note)
+      : h("div.pair", {}, field(t("link.downloads"), most), field(t("link.note"), note)),
   ];
   return { nodes, read, isOneSided: () => Boolean(available.value && !expires.value) };
+}
+
+// How much visitors may send.
+function roomFields(link) {
+  const number = (name, max, value) =>
+    h("input.input", { name, type: "number", min: 1, max, step: 1, required: true, inputmode: "numeric", value });
+  const files = number("most_files", MOST_FILES, link?.received.most_files ?? 100);
+  const bytes = number("most_bytes", MOST_MEGABYTES, link ? Math.ceil(link.received.most_bytes / MEGABYTE) : 1024);
+  return {
+    nodes: [h("div.pair", {}, field(t("link.most_files"), files), field(t("link.most_bytes"), bytes))],
+    read: () => ({ most_files: Number(files.value), most_bytes: Number(bytes.value) * MEGABYTE }),
+  };
 }
 
 function passwordInput(attributes) {

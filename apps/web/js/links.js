@@ -15,6 +15,13 @@ addCommand({
   run: async ({ single }) => (await dialogs())?.makeLink(single),
 });
 addCommand({
+  id: "receive",
+  icon: "upload",
+  group: "info",
+  when: ({ single, inBin }) => Boolean(single?.isFolder && !inBin),
+  run: async ({ single }) => (await dialogs())?.receiveFiles(single),
+});
+addCommand({
   id: "itemLinks",
   icon: "link",
   group: "info",

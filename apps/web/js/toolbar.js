@@ -20,6 +20,7 @@ const ON_CHOSEN = [
   "showInFolder",
   "download",
   "share",
+  "receive",
   "itemLinks",
   "cut",
   "copy",

@@ -4,12 +4,18 @@ import { Folder, placeAddress } from "./folder.js";
 import { aboutText, drawing, make, nameNode, picture, texts } from "./parts.js";
 import { closePreview, openPreview } from "./preview.js";
 import { fileAddress, limits, logIn, pathField, state } from "./requests.js";
+import { SendView } from "./send.js";
 
 let view = null;
 let folder = null; // what is shown, a Folder
+let sending = null; // a SendView, where the link receives
 let asked = 0; // places asked for; the last one is shown
 
 function show(...children) {
+  if (sending && !children.includes(sending.node)) {
+    sending.end();
+    sending = null;
+  }
   view.replaceChildren(...children);
 }
 
@@ -80,6 +86,7 @@ async function open() {
     if (mine !== asked) return undefined;
     if (now.status !== 200) return noticeOf(now.status);
     if (!now.json.data.logged_in) return askPassword();
+    if (now.json.data.receives) return showReceiving(now.json.data.receives);
     const wanted = new Folder(path, noticeOf);
     if (!(await wanted.load()) || mine !== asked) return undefined;
     folder = wanted;
@@ -88,6 +95,12 @@ async function open() {
   }
   const item = place.look && folder.items.find((one) => sameText(one, place));
   return item ? look(item) : closePreview();
+}
+
+function showReceiving(receives) {
+  sending ??= new SendView(receives, noticeOf);
+  show(sending.node);
+  document.title = receives.name;
 }
 
 function look(item) {

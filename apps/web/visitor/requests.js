@@ -1,6 +1,6 @@
 // What is asked of the program.
 
-const { program, pageSize } = window.visitorDefinitions;
+const { program, receiver, pageSize } = window.visitorDefinitions;
 const link = new URLSearchParams(location.search).get("FOLDER_SHARING");
 
 export function address(fields) {
@@ -56,6 +56,30 @@ export async function logIn(password, tellWait) {
     turn = answer.json.data.turn;
     await wait(answer.json.data.wait, tellWait);
   }
+}
+
+// One file to whoever made the link. Resolves with what was answered, status 0 when nothing was.
+export function sendFile(file, signal, onProgress) {
+  return new Promise((resolve) => {
+    const request = new XMLHttpRequest();
+    const query = new URLSearchParams({ name: file.name.toWellFormed() });
+    if (link !== null) query.set("FOLDER_SHARING", link);
+    const done = () => {
+      let code = 0;
+      try {
+        code = JSON.parse(request.responseText).error?.code ?? 0;
+      } catch {
+        // The status alone says what happened.
+      }
+      resolve({ status: request.status, code });
+    };
+    for (const type of ["load", "error", "abort"]) request.addEventListener(type, done);
+    request.upload.addEventListener("progress", (event) => event.lengthComputable && onProgress(event.loaded / event.total));
+    signal.addEventListener("abort", () => request.abort());
+    request.open("POST", `${window.g_Tunnel}${receiver}?${query}`);
+    request.setRequestHeader("Content-Type", "application/octet-stream");
+    request.send(file);
+  });
 }
 
 async function wait(milliseconds, tell) {

@@ -31,7 +31,20 @@ struct Link {
     std::string note{};        // of its owner, for himself
     std::int64_t most = 0;     // downloads; 0: any number
     std::int64_t used = 0;     // downloads that were begun
-    std::int64_t lastUse = 0;  // when the last one was; 0: never
+    std::int64_t lastUse = 0;  // when the last one was, or a file was received; 0: never
+    // By a link that receives, visitors send files into `path` and see nothing. The library never meets one.
+    bool receives = false;
+    std::string folder{};  // which folder it is (see apps/cgi/target.h), whatever bears its name later
+    std::int64_t mostFiles = 0, mostBytes = 0;
+    std::int64_t files = 0, bytes = 0;  // received
+};
+
+// What a visitor sent by a link that receives.
+struct SentFile {
+    std::string name;  // that it has got
+    std::string address;
+    std::int64_t size = 0;
+    std::int64_t time = 0;
 };
 
 enum class LinkTaking {
@@ -65,6 +78,14 @@ class VEXO_API LinkStore {
     // `what` within the last hour counts as one.
     [[nodiscard]] bool take(const std::string& id, const std::string& who, const std::string& what, bool partly,
                             LinkTaking& taking);
+    // Begins to receive a file: `link` is what the link is now, empty when it is gone. From here to endReceiving() or
+    // the end of the object nobody changes or revokes it, so it must not take long.
+    [[nodiscard]] bool beginReceiving(const std::string& id, std::optional<Link>& link);
+    // The file has its name: it is counted and listed. Without this nothing has happened.
+    [[nodiscard]] bool endReceiving(const std::string& id, const SentFile& file);
+    // What was sent by a link of `owner`, the last first.
+    [[nodiscard]] bool listSent(const std::string& id, const std::string& owner, std::int64_t offset,
+                                std::int64_t limit, std::vector<SentFile>& files);
     // Removes a link; `owner` other than "" must be its own. `removed` says whether there was one.
     [[nodiscard]] bool remove(const std::string& id, const std::string& owner, bool& removed);
 

@@ -19,7 +19,7 @@ namespace {
 constexpr int kPatience = 4000;  // milliseconds for the locks of others
 
 // What stands beside the links has a version, SQLite's user_version; a database without it is of version 0.
-constexpr std::int64_t kVersion = 1;
+constexpr std::int64_t kVersion = 2;
 
 // The library reads the first seven columns by these names.
 constexpr const char* kTable =
@@ -31,7 +31,15 @@ constexpr const char* kBeside =
     "NOT NULL DEFAULT 0, used INTEGER NOT NULL DEFAULT 0, lastUse INTEGER NOT NULL DEFAULT 0);"
     "CREATE TABLE IF NOT EXISTS linkTaken(linkID TEXT NOT NULL, who TEXT NOT NULL, what TEXT NOT NULL, at INTEGER NOT "
     "NULL, PRIMARY KEY(linkID, who, what));"
-    "PRAGMA user_version = 1;";
+    // Of their own, so that nothing that reads links takes one for a link to read. `name` is bytes.
+    "CREATE TABLE IF NOT EXISTS uploadLinks(linkID TEXT PRIMARY KEY NOT NULL, uid TEXT NOT NULL, filepath TEXT NOT "
+    "NULL, password TEXT NOT NULL, AvailDate TEXT NOT NULL, ExpDate TEXT NOT NULL, owner TEXT NOT NULL, created TEXT "
+    "NOT NULL, folder TEXT NOT NULL, mostFiles INTEGER NOT NULL, mostBytes INTEGER NOT NULL, files INTEGER NOT NULL "
+    "DEFAULT 0, bytes INTEGER NOT NULL DEFAULT 0);"
+    "CREATE TABLE IF NOT EXISTS sentFiles(linkID TEXT NOT NULL, at INTEGER NOT NULL, address TEXT NOT NULL, name TEXT "
+    "NOT NULL, size INTEGER NOT NULL);"
+    "CREATE INDEX IF NOT EXISTS sentBy ON sentFiles(linkID);"
+    "PRAGMA user_version = 2;";
 
 // Whether something bears the name; what cannot be determined counts so, and fails when it is opened.
 bool isThere(const std::string& path) {

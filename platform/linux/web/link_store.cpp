@@ -1,7 +1,6 @@
 #include "vexo/link_store.h"
 
-#include <cerrno>
-#include <cstring>
+#include <array>
 #include <ctime>
 
 #include "base/raised_identity.h"
@@ -22,6 +21,25 @@ constexpr const char* kInsert =
 constexpr const char* kSelect =
     "SELECT s.linkID, owner, uid, filepath, password, AvailDate, ExpDate, created, note, most, used, lastUse "
     "FROM sharingLinks s LEFT JOIN linkMore m ON m.linkID = s.linkID ";
+constexpr const char* kInsertReceiving =
+    "INSERT INTO uploadLinks(linkID, owner, uid, filepath, password, AvailDate, ExpDate, created, folder, mostFiles, "
+    "mostBytes) VALUES(?,?,?,?,?,?,?,?,?,?,?)";
+constexpr const char* kSelectReceiving =
+    "SELECT s.linkID, owner, uid, filepath, password, AvailDate, ExpDate, created, note, most, used, lastUse, folder, "
+    "mostFiles, mostBytes, files, bytes FROM uploadLinks s LEFT JOIN linkMore m ON m.linkID = s.linkID ";
+constexpr const char* kUpdateReceiving =
+    "UPDATE uploadLinks SET password = ?2, AvailDate = ?3, ExpDate = ?4, mostFiles = ?5, mostBytes = ?6 WHERE linkID = "
+    "?1";
+constexpr const char* kDeleteReceiving = "DELETE FROM uploadLinks WHERE linkID = ?1 AND (?2 = '' OR owner = ?2)";
+constexpr const char* kReceived = "UPDATE uploadLinks SET files = files + 1, bytes = bytes + ?2 WHERE linkID = ?1";
+constexpr const char* kUsedNow = "UPDATE linkMore SET lastUse = ?2 WHERE linkID = ?1";
+constexpr const char* kNoteSent = "INSERT INTO sentFiles(linkID, at, address, name, size) VALUES(?,?,?,?,?)";
+constexpr const char* kSelectSent =
+    "SELECT name, address, size, at FROM sentFiles WHERE linkID = ?1 AND EXISTS(SELECT 1 FROM uploadLinks WHERE linkID "
+    "= ?1 AND owner = ?2) ORDER BY rowid DESC LIMIT ?4 OFFSET ?3";
+constexpr std::array<const char*, 3> kDeleteBeside = {"DELETE FROM linkMore WHERE linkID = ?",
+                                                      "DELETE FROM linkTaken WHERE linkID = ?",
+                                                      "DELETE FROM sentFiles WHERE linkID = ?"};
 constexpr const char* kUpdate = "UPDATE sharingLinks SET password = ?2, AvailDate = ?3, ExpDate = ?4 WHERE linkID = ?1";
 constexpr const char* kInsertMore = "INSERT OR IGNORE INTO linkMore(linkID) VALUES(?)";
 constexpr const char* kUpdateMore = "UPDATE linkMore SET note = ?2, most = ?3 WHERE linkID = ?1";
@@ -36,29 +54,60 @@ constexpr const char* kForget =
     "(SELECT rowid FROM linkTaken WHERE linkID = ?1 ORDER BY at DESC LIMIT ?3))";
 
 Link linkOf(const vexo::Statement& row) {
-    return {.id = vexo::textOf(row, 0),
-            .owner = vexo::textOf(row, 1),
-            .uid = static_cast<uid_t>(vexo::numberOf(row, 2)),
-            .path = vexo::textOf(row, 3),
-            .passwordHash = vexo::textOf(row, 4),
-            .available = vexo::numberOf(row, 5),
-            .expires = vexo::numberOf(row, 6),
-            .created = vexo::numberOf(row, 7),
-            .note = vexo::textOf(row, 8),
-            .most = vexo::numberOf(row, 9),
-            .used = vexo::numberOf(row, 10),
-            .lastUse = vexo::numberOf(row, 11)};
+    Link link = {.id = vexo::textOf(row, 0),
+                 .owner = vexo::textOf(row, 1),
+                 .uid = static_cast<uid_t>(vexo::numberOf(row, 2)),
+                 .path = vexo::textOf(row, 3),
+                 .passwordHash = vexo::textOf(row, 4),
+                 .available = vexo::numberOf(row, 5),
+                 .expires = vexo::numberOf(row, 6),
+                 .created = vexo::numberOf(row, 7),
+                 .note = vexo::textOf(row, 8),
+                 .most = vexo::numberOf(row, 9),
+                 .used = vexo::numberOf(row, 10),
+                 .lastUse = vexo::numberOf(row, 11)};
+    link.receives = sqlite3_column_count(row.get()) > 12;
+    if (!link.receives) return link;
+    link.folder = vexo::textOf(row, 12);
+    link.mostFiles = vexo::numberOf(row, 13);
+    link.mostBytes = vexo::numberOf(row, 14);
+    link.files = vexo::numberOf(row, 15);
+    link.bytes = vexo::numberOf(row, 16);
+    return link;
 }
 
 }  // namespace
 
 struct LinkStore::Impl {
     vexo::LinkDatabase database;
+    std::optional<vexo::LinkTransaction> receiving;
 
     bool run(const char* sql, const std::vector<std::string>& values) { return database.run(sql, values); }
     bool select(const std::string& where, const std::string& value, std::vector<Link>& links) {
-        return database.run((kSelect + where).c_str(), {value},
-                            [&links](const vexo::Statement& row) { links.push_back(linkOf(row)); });
+        const auto take = [&links](const vexo::Statement& row) { links.push_back(linkOf(row)); };
+        return database.run((kSelect + where).c_str(), {value}, take) &&
+               database.run((kSelectReceiving + where).c_str(), {value}, take);
+    }
+    bool insert(const Link& link) {
+        std::vector<std::string> values = {link.id, link.owner, std::to_string(link.uid), link.path};
+        if (!link.receives) values.push_back(link.path.substr(link.path.rfind('/') + 1));
+        for (const std::string& value : {link.passwordHash, std::to_string(link.available),
+                                         std::to_string(link.expires), std::to_string(link.created)}) {
+            values.push_back(value);
+        }
+        if (!link.receives) return run(kInsert, values);
+        for (const std::string& value : {link.folder, std::to_string(link.mostFiles), std::to_string(link.mostBytes)}) {
+            values.push_back(value);
+        }
+        return run(kInsertReceiving, values);
+    }
+    bool update(const Link& link) {
+        std::vector<std::string> values = {link.id, link.passwordHash, std::to_string(link.available),
+                                           std::to_string(link.expires)};
+        if (!link.receives) return run(kUpdate, values);
+        values.push_back(std::to_string(link.mostFiles));
+        values.push_back(std::to_string(link.mostBytes));
+        return run(kUpdateReceiving, values);
     }
     // What a link has beside its row.
     bool keepMore(const Link& link) {
@@ -84,6 +133,7 @@ LinkStore::LinkStore() : impl_(std::make_unique<Impl>()) {}
 
 LinkStore::~LinkStore() {
     const orvel::RaisedIdentity raised;
+    impl_->receiving.reset();
     impl_->database.close();
 }
 
@@ -99,12 +149,7 @@ bool LinkStore::add(Link& link) {
     link.created = time(nullptr);
     if (link.id.empty()) return impl_->database.fail();
     vexo::LinkTransaction transaction(impl_->database);
-    return transaction.begun() &&
-           impl_->run(kInsert,
-                      {link.id, link.owner, std::to_string(link.uid), link.path,
-                       link.path.substr(link.path.rfind('/') + 1), link.passwordHash, std::to_string(link.available),
-                       std::to_string(link.expires), std::to_string(link.created)}) &&
-           impl_->keepMore(link) && transaction.commit();
+    return transaction.begun() && impl_->insert(link) && impl_->keepMore(link) && transaction.commit();
 }
 
 bool LinkStore::find(const std::string& id, std::optional<Link>& link) {
@@ -144,9 +189,7 @@ bool LinkStore::change(const std::string& id, const std::string& owner, const st
         link = found;
         return true;
     }
-    if (!impl_->run(kUpdate,
-                    {id, found.passwordHash, std::to_string(found.available), std::to_string(found.expires)}) ||
-        !impl_->keepMore(found) || !transaction.commit()) {
+    if (!impl_->update(found) || !impl_->keepMore(found) || !transaction.commit()) {
         return false;
     }
     link = found;
@@ -176,6 +219,46 @@ bool LinkStore::take(const std::string& id, const std::string& who, const std::s
     return impl_->count(id, who, what, taking) && transaction.commit();
 }
 
+bool LinkStore::beginReceiving(const std::string& id, std::optional<Link>& link) {
+    VEXO_GATE("LinkStore::beginReceiving", impl_->database.fail());
+    const orvel::RaisedIdentity raised;
+    std::vector<Link> links;
+    bool there = false;
+    link.reset();
+    if (!impl_->database.open(there)) return false;
+    if (!there) return true;
+    impl_->receiving.emplace(impl_->database);
+    if (!impl_->receiving->begun() || !impl_->select("WHERE s.linkID = ?", id, links)) return false;
+    if (!links.empty() && links.front().receives) link = links.front();
+    return true;
+}
+
+bool LinkStore::endReceiving(const std::string& id, const SentFile& file) {
+    VEXO_GATE("LinkStore::endReceiving", impl_->database.fail());
+    const orvel::RaisedIdentity raised;
+    const std::string size = std::to_string(file.size), now = std::to_string(time(nullptr));
+    const bool noted = impl_->receiving && impl_->run(kReceived, {id, size}) && impl_->run(kInsertMore, {id}) &&
+                       impl_->run(kUsedNow, {id, now}) &&
+                       impl_->run(kNoteSent, {id, now, file.address, file.name, size}) && impl_->receiving->commit();
+    impl_->receiving.reset();
+    return noted;
+}
+
+bool LinkStore::listSent(const std::string& id, const std::string& owner, std::int64_t offset, std::int64_t limit,
+                         std::vector<SentFile>& files) {
+    VEXO_GATE("LinkStore::listSent", impl_->database.fail());
+    const orvel::RaisedIdentity raised;
+    bool there = false;
+    if (!impl_->database.open(there)) return false;
+    const auto take = [&files](const vexo::Statement& row) {
+        files.push_back({.name = vexo::textOf(row, 0),
+                         .address = vexo::textOf(row, 1),
+                         .size = vexo::numberOf(row, 2),
+                         .time = vexo::numberOf(row, 3)});
+    };
+    return !there || impl_->database.run(kSelectSent, {id, owner, std::to_string(offset), std::to_string(limit)}, take);
+}
+
 bool LinkStore::remove(const std::string& id, const std::string& owner, bool& removed) {
     removed = false;
     VEXO_GATE("LinkStore::remove", impl_->database.fail());
@@ -185,8 +268,11 @@ bool LinkStore::remove(const std::string& id, const std::string& owner, bool& re
     if (!there) return true;
     vexo::LinkTransaction transaction(impl_->database);
     if (!transaction.begun() || !impl_->run(kDelete, {id, owner})) return false;
-    if (impl_->database.changed() == 0) return true;
-    for (const char* beside : {"DELETE FROM linkMore WHERE linkID = ?", "DELETE FROM linkTaken WHERE linkID = ?"}) {
+    bool found = impl_->database.changed() > 0;
+    if (!impl_->run(kDeleteReceiving, {id, owner})) return false;
+    found = found || impl_->database.changed() > 0;
+    if (!found) return true;
+    for (const char* beside : kDeleteBeside) {
         if (!impl_->run(beside, {id})) return false;
     }
     removed = transaction.commit();
