@@ -121,7 +121,7 @@ void run(const Job& job, Progress& progress) {
     watch.ended();
     // Whoever sees "done" may remove what was packed.
     if (!zip.isWhole()) progress.markFailed();
-    if (zip.isEmpty()) return;
+    if (zip.isEmpty() && !zip.isWhole()) return;
     if (!zip.finish()) return progress.broken(job.info.path, codeOf(zip));
     std::string name;
     const int code = publish(job, file, name);
