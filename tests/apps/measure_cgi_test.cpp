@@ -103,9 +103,10 @@ TEST_F(MeasureCgi, SaysWhatIsLargestAndWhatItLacks) {
     std::sort(unreadable.begin(), unreadable.end());
     EXPECT_EQ(unreadable, (Names{"/photo/t/closed", "/photo/t/named/unseen"}));
     EXPECT_EQ(found["unreadable_first"][0]["code"], 407);
+    addShare("secret", "read only = no\nvalid users = bob\n");
     const Json::Value missing =
-        perform("alice", "action=measure" + about({"/photo/t/none", "/nosuch", "/photo/t/closed"}));
-    EXPECT_EQ(errors(missing), "/photo/t/none 408\n/nosuch 408\n/photo/t/closed 407\n");
+        perform("alice", "action=measure" + about({"/photo/t/none", "/nosuch", "/photo/t/closed", "/secret"}));
+    EXPECT_EQ(errors(missing), "/photo/t/none 408\n/nosuch 408\n/photo/t/closed 407\n/secret 407\n");
     EXPECT_EQ(sums(missing["measured"]), "0 0 0 0 ");
     for (int i = 0; i < 1002; ++i) lay("/many/" + std::to_string(i), static_cast<size_t>(i));
     const Json::Value many = measured({"/photo/many"});
@@ -158,6 +159,25 @@ TEST_F(MeasureCgi, EndsAtOnceWithWhatItHas) {
         const Json::Value all = get(PROGRAM_OPERATION, "alice", "action=status").json["data"]["tasks"];
         EXPECT_FALSE(all[0]["measured"].isMember("parts")) << "whoever asks for all tasks gets no lists";
         ask("alice", "action=clear&taskid=" + id);
+    }
+}
+
+TEST(SizeReportTest, FitsIntoARecordWhateverThePathsAre) {
+    for (const char byte : {'\x01', '\xff', '"', 'x'}) {
+        for (const size_t length : {1, 200, 4000}) {
+            orvel::cgi::SizeReport report;
+            for (int i = 0; i < 1100; ++i) {
+                const std::string path = "/" + std::string(length, byte) + std::to_string(i);
+                orvel::cgi::Amount amount;
+                amount.size = i + 1;
+                report.part({path, orvel::cgi::SizeKind::kFile, amount});
+                report.largest({path, orvel::cgi::SizeKind::kFile, amount});
+                report.unreadable(path, EACCES);
+            }
+            const Json::Value all = report.json(true);
+            EXPECT_LT(Json::writeString(Json::StreamWriterBuilder(), all).size(), size_t{640} * 1024);
+            EXPECT_EQ(all["parts"].size() + all["rest"]["count"].asUInt(), 1100U) << "what is not listed is summed";
+        }
     }
 }
 
