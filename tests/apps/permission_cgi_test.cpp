@@ -191,6 +191,29 @@ TEST_F(PermissionCgi, BelowItGoesOnByItselfAndNamesWhatItCouldNotChange) {
     EXPECT_EQ(listOf(photo_ + "/t/f"), "u::rw-,g::---,o::---");
 }
 
+TEST_F(PermissionCgi, AnUndoRecordIsNotBelieved) {
+    writeFiles(photo_, {"/other"});
+    const std::string id = perform("alice", "action=permit&path=/photo/t/f&mode=o%2Br")["taskid"].asString();
+    const std::string file = systemRoot() + "/var/lib/vexo/undo/" + std::to_string(kAliceUid) + "/" + id;
+    const std::string whole = readFile(file), before = all();
+    for (const auto& [was, is] : {std::pair("o=0", "o=9"),
+                                  {"o=0", "o=0,o=0,q"},
+                                  {"o=0", "U=7"},
+                                  {"20001 ", "-1 "},
+                                  {"20001 ", "99999999999 "},
+                                  {"\n", " "},
+                                  {"/photo/t/f", "/photo/other"},
+                                  {"/photo/t/f", "/photo/t/link"},
+                                  {"/photo/t/f", "/photo/t/way/victim"}}) {
+        SCOPED_TRACE(is);
+        std::string text = whole;
+        text.replace(text.find(was), strlen(was), is);
+        writeFile(file, text, 0600);
+        EXPECT_NE(errors(ended("alice", start("alice", "action=undo&taskid=" + id))), "");
+        EXPECT_EQ(all(), before);
+    }
+}
+
 // Held after each item, when its row in the results on screen is about to be brought up to date.
 TEST_F(PermissionCgi, AFolderSwappedForALinkLeadsNowhereAndResultsFollow) {
     const std::string found =
