@@ -2,6 +2,7 @@
 import assert from "node:assert/strict";
 import { chmodSync, mkdirSync, rmSync, writeFileSync } from "node:fs";
 import { dirname, join } from "node:path";
+import { after } from "node:test";
 import { setTimeout } from "node:timers/promises";
 
 // In milliseconds: what has not come by then does not come, on however slow a machine.
@@ -27,10 +28,15 @@ export function write(folder, files) {
   }
 }
 
-// An empty folder of the test's own in the share "projects"; its real path.
+// A folder of the test's own in the share "projects"; its real path. It goes with the file of tests: rows that others look
+// for there stay in sight.
+const own = new Set();
+after(() => own.forEach((folder) => rmSync(folder, { recursive: true, force: true, maxRetries: 5 })));
+
 export function ownFolder(name, files = {}) {
   const folder = join(projects, name);
-  rmSync(folder, { recursive: true, force: true });
+  rmSync(folder, { recursive: true, force: true, maxRetries: 5 });
+  own.add(join(projects, name.split("/")[0]));
   mkdirSync(folder, { recursive: true });
   chmodSync(folder, 0o777);
   write(folder, files);

@@ -237,7 +237,9 @@ test("undone by a key: a rename, a deletion; what stands in the way is named", (
 
 test("deleted files: one list of all bins, sorted, searched, restored, emptied", () => {
   // Without what only an administrator may remove.
-  ownFolder("#recycle", { "samba/": "", "samba/unknown.txt": "by Samba" });
+  const bin = `${process.env.ORVEL_TEST_PROJECTS}/#recycle`;
+  rmSync(bin, { recursive: true, force: true });
+  write(bin, { "/": "", "samba/": "", "samba/unknown.txt": "by Samba" });
   const own = ownFolder("deleted", { "gone.txt": "gone" });
   return withPage("alice", { path: "/projects/deleted" }, async (page) => {
     await choose(page, "gone.txt");
