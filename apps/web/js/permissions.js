@@ -101,7 +101,7 @@ class Table {
       box.addEventListener("change", () => this.touch(row, bit, box.checked));
       return h("td", {}, box);
     });
-    const some = this.many && entry.id !== undefined && entry.items < this.many && h("span.soft", {}, t("permissions.some", { count: entry.items }));
+    const some = this.many > 0 && entry.id !== undefined && entry.items < this.many && h("span.soft", {}, t("permissions.some", { count: entry.items }));
     const gone = () => {
       this.rows = this.rows.filter((one) => one !== row);
       if (!row.added) this.removed.push(entry);
@@ -329,6 +329,7 @@ class Form {
       try {
         const found = await post("operation", { action: "access", path_raw: this.single.id, [kind.value]: who });
         answer.replaceChildren(answerNode(kind.value, who, found));
+        answer.scrollIntoView({ block: "nearest" });
       } catch (failure) {
         answer.replaceChildren(h("p.complaint", {}, sentenceOf({ code: failure.code, key: failure.key, path: `/${who}` })));
       }
@@ -393,6 +394,7 @@ function answerNode(kind, name, { rights, masked, by, groups = [], closed, unkno
     closed.length > 0 && line(false, t("permissions.answer.closed", { path: closed[0] })),
     unknown.length > 0 && line(false, t("permissions.answer.unknown", { path: unknown[0] })),
     share && RULES.includes(share.rule) && line(share.privilege !== 0, t(`permissions.rule.${share.rule}`)),
+    !share && by !== "administrator" && h("li", {}, icon("info", "icon small"), h("span", {}, t("permissions.rule.unknown"))),
   ];
   return h("section.why", {}, h("ul", {}, lines.filter(Boolean)));
 }
