@@ -1,7 +1,5 @@
 // Public links: made, opened by a visitor who has no account, revoked.
 import assert from "node:assert/strict";
-import { rmSync } from "node:fs";
-import { join } from "node:path";
 import { test } from "node:test";
 import { choose, findings, finish, newPage, press, row, screenshot, withPage } from "./browser.mjs";
 import { ownFolder } from "./support.mjs";
@@ -128,9 +126,10 @@ test("changed in place: downloads that end, a badge, a code", () => {
   });
 });
 
-test("files received by a link, on a phone, seen by the owner alone", () =>
-  withPage("alice", { path: "/projects" }, async (page) => {
-    await row(page, "house").click({ button: "right" });
+test("files received by a link, on a phone, seen by the owner alone", () => {
+  ownFolder("receiving", { "house/": "" });
+  return withPage("alice", { path: "/projects/receiving" }, async (page) => {
+    await choose(page, "house", { button: "right" });
     await page.click(".menu >> text=Receive files by a link");
     await page.fill("[name=inbox]", "from the party");
     await page.fill("[name=password]", "");
@@ -183,8 +182,8 @@ test("files received by a link, on a phone, seen by the owner alone", () =>
     await link.locator("[aria-label=Revoke]").click();
     await page.click(".dialog .button.danger");
     await link.waitFor({ state: "detached" });
-    rmSync(join(process.env.ORVEL_TEST_PROJECTS, "house/from the party"), { recursive: true });
-  }));
+  });
+});
 
 test("names of markup reach a visitor as text", () =>
   withPage("alice", { path: "/worldwide" }, async (page) => {
