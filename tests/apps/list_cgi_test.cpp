@@ -52,14 +52,24 @@ TEST_F(ListCgi, WhatAPageNeedsBesideComesInTheSameReply) {
     };
     const Json::Value tasks = dataOf(PROGRAM_OPERATION, "action=status"), uploads = dataOf(PROGRAM_TUS, "");
     const Json::Value own = dataOf(PROGRAM_PREFERENCES, "action=get"), access = dataOf(PROGRAM_WHY, "path=/photo");
+    makeFolder(shareRoot("photo") + "/a/b");
+    Json::Value above;
+    for (const char* path : {"/photo", "/photo/a"}) {
+        Json::Value one = dataOf(PROGRAM_OPERATION, std::string("action=subfolders&path=") + path);
+        ASSERT_EQ(one["items"].size(), 1U) << path;
+        one["path"] = path;
+        above["folders"].append(one);
+    }
     const Json::Value links = dataOf(PROGRAM_LINK, "action=list&folder=/photo");
-    ASSERT_TRUE(links["items"].isArray() && tasks["tasks"].isArray() && uploads["items"].isArray() && own.isMember("values"));
+    ASSERT_TRUE(links["items"].isArray() && tasks["tasks"].isArray() && uploads["items"].isArray() &&
+                own.isMember("values"));
     ASSERT_EQ(access["rule"], "read_only");
     for (const auto& [query, expected] : Rows<const char*, std::map<std::string, Json::Value>>{
              {"action=shares&with=uploads,tasks,preferences,tasks,other,access",
               {{"tasks", tasks}, {"uploads", uploads}, {"preferences", own}}},
              {"action=folder&path=/photo&with=access", {{"access", access}}},
              {"action=folder&path=/photo&with=access,,links&keep=1", {{"access", access}, {"links", links}}},
+             {"action=folder&path=/photo/a/b&with=above", {{"above", above}}},
              {"action=folder&path=/photo&with=", {}},
          }) {
         const Json::Value with = ask("bob", query).json["data"]["with"];

@@ -417,11 +417,12 @@ test("every module that a start needs is fetched at once", async () => {
 });
 
 test("a start asks for the shares and the folder, and for nothing else", () =>
-  withPage("bob", { path: "/photo" }, async (page) => {
+  withPage("bob", { path: "/photo/Landscapes" }, async (page) => {
     const asked = [];
     page.on("request", (one) => one.url().includes("/cgi-bin/") && asked.push(new URL(one.url())));
     await page.reload({ waitUntil: "networkidle" });
     await rowsReady(page);
+    await page.waitForSelector("[role=treeitem].current[aria-label='Landscapes']");
     assert.deepEqual(asked.map((url) => `${url.pathname.slice(9)} ${url.searchParams.get("action")}`), ["list shares", "list folder"]);
   }));
 

@@ -5,6 +5,7 @@
 #include <sstream>
 
 #include "link/within.h"
+#include "operation/subfolders.h"
 #include "operation/task_reply.h"
 #include "orvel/error_state.h"
 #include "preferences/store.h"
@@ -19,6 +20,8 @@ bool fill(const std::string& word, const User& user, const std::string& path, Js
     if (word == "preferences") return readPreferences(user.name, data["values"]) == ORV_ERR_NONE;
     if (word == "tasks") return tasksReply(user.name, data);
     if (word == "access") return !path.empty() && explainAccess(path, user, data);
+    if (word == "above" && !path.empty()) data["folders"] = subfoldersAbove(user, path);
+    if (word == "above") return !path.empty();
     if (word == "links") return !path.empty() && linksWithin(user.name, path, data);
     if (word != "uploads") return false;
     data = unfinishedReply(user);

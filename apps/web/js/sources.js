@@ -9,9 +9,12 @@ import { encodeName, inBothForms, inForms, lastOf, parentOf, patternOf, splitExt
 import { language } from "./strings.js";
 
 const ADDITIONAL = "size,time,owner,perm,mount_point_type,icon";
+const BESIDE = "access,links"; // what else comes with a folder's list
 const BRIEF = { additional: undefined };
 const LONGEST_PAGE = 10_000; // of search results
 const SLICE = 2000; // entries that are made at once: the page stays free in between
+
+let beside = `${BESIDE},above`; // with the first one also what the tree shows
 
 async function entriesOf(items) {
   const entries = [];
@@ -45,8 +48,9 @@ export function folderListing(id, { sort, filter }, onChange) {
 function keptPages(listing, asked, unkept) {
   let keeping = null;
   const keep = async (page, signal) => {
-    const order = { keep: 1, natural: language, folders_first: 1, with: "access,links" };
+    const order = { keep: 1, natural: language, folders_first: 1, with: beside };
     const reply = await get("list", { ...asked, ...order, ...page }, signal);
+    beside = BESIDE;
     for (const [word, answer] of Object.entries(reply.with ?? {})) emit(`came-${word}`, { id: asked.path_raw, answer });
     if (!reply.listing) {
       await unkept();

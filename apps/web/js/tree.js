@@ -15,12 +15,16 @@ const MOST = 400;
 
 const root = document.getElementById("tree");
 const nodes = new Map(); // id -> {item, group, loaded}; `item` is the line that has the role
+let brought = new Map(); // sub-folders that came with the first list, each of use once
 let current = "/";
 
 export function setupTree() {
   on("shares", paintShares);
   on("place", follow);
   on("folders-changed", ({ ids }) => ids.forEach(reload));
+  on("came-above", ({ answer }) => {
+    brought = new Map(answer.folders.map((folder) => [idIn(folder), folder.items]));
+  });
   root.addEventListener("click", clicked);
   root.addEventListener("keydown", keydown);
 }
@@ -73,9 +77,10 @@ async function expand(id) {
 
 async function load(id, node) {
   node.loaded = true;
-  let items;
+  let items = brought.get(id);
+  brought.delete(id);
   try {
-    items = (await get("operation", { action: "subfolders", path_raw: id })).items;
+    items ??= (await get("operation", { action: "subfolders", path_raw: id })).items;
   } catch {
     // The list says why when somebody goes there.
     node.loaded = false;
