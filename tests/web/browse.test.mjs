@@ -4,7 +4,7 @@ import { readdirSync, readFileSync, readlinkSync } from "node:fs";
 import { test } from "node:test";
 import { KINDS, PICTURES } from "../../apps/web/js/icons.js";
 import { boxOf, choose, drawn, go, row, rowsReady, typeName, URL_OF_PAGE, withPage } from "./browser.mjs";
-import { ownFolder } from "./support.mjs";
+import { AGAIN, ownFolder } from "./support.mjs";
 
 const LARGE = 20_000; // files of the share "warehouse"
 
@@ -253,7 +253,7 @@ test("mounts, shares that do not answer, slow and broken servers", () =>
         page.route(
           (url) => url.pathname === "/cgi-bin/list" && match(url.searchParams),
           async (route) => {
-            const response = await route.fetch();
+            const response = await route.fetch(AGAIN);
             const reply = await response.json();
             edit(reply.data.items);
             await route.fulfill({ response, json: reply });

@@ -3,9 +3,8 @@ import { existsSync, readFileSync } from "node:fs";
 import assert from "node:assert/strict";
 import { basename, join } from "node:path";
 import { after } from "node:test";
-import { setTimeout } from "node:timers/promises";
 import { chromium } from "playwright-core";
-import { LONGEST, until } from "./support.mjs";
+import { AGAIN, LONGEST, until } from "./support.mjs";
 
 // The shell draws and computes the same with a third less work; it lacks what a user has around a page.
 const PROGRAM =
@@ -104,7 +103,7 @@ export async function openPage(user, { path = "/", ...options } = {}) {
   const page = await newPage({ httpCredentials: { username: user, password: PASSWORDS[user] }, ...options });
   // What tests before this one left would be shown.
   const headers = { Origin: new URL(URL_OF_PAGE).origin };
-  assert.ok((await page.context().request.post(`${URL_OF_PAGE}cgi-bin/operation`, { form: { action: "clear" }, headers })).ok());
+  assert.ok((await page.context().request.post(`${URL_OF_PAGE}cgi-bin/operation`, { form: { action: "clear" }, headers, ...AGAIN })).ok());
   await page.goto(`${URL_OF_PAGE}#${path}`);
   await page.waitForSelector("body.started");
   return page;
@@ -238,6 +237,6 @@ export const wentWell = (page, text) => press(page, ".activity-card.good", text,
 
 // A user's uploads that are not over.
 export async function unfinished(request) {
-  const { data } = await (await request.get(`${URL_OF_PAGE}cgi-bin/tus`)).json();
+  const { data } = await (await request.get(`${URL_OF_PAGE}cgi-bin/tus`, AGAIN)).json();
   return data.items;
 }

@@ -1,6 +1,6 @@
 // Files that come and go: uploads, conflicts, downloads, new folders, names, previews.
 import assert from "node:assert/strict";
-import { existsSync, readdirSync, readFileSync, statSync, writeFileSync } from "node:fs";
+import { existsSync, readdirSync, readFileSync, writeFileSync } from "node:fs";
 import { join } from "node:path";
 import { test } from "node:test";
 import { cardOf, choose, drawn, go, press, row, unfinished, upload, wentWell, withPage } from "./browser.mjs";

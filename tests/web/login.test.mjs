@@ -4,7 +4,7 @@ import { readFileSync, rmSync, writeFileSync } from "node:fs";
 import { join } from "node:path";
 import { test } from "node:test";
 import { findings, finish, go, newPage, PASSWORDS, rowsReady, screenshot, upload, URL_OF_PAGE, wentWell } from "./browser.mjs";
-import { localFiles } from "./support.mjs";
+import { AGAIN, localFiles } from "./support.mjs";
 
 // By this name the demo's web server asks nobody for a password.
 const SITE = URL_OF_PAGE.replace("127.0.0.1", "localhost");
@@ -38,10 +38,10 @@ async function logOut(page) {
 
 // As another window of the same browser would.
 const post = (context, program, form) =>
-  context.request.post(`${SITE}cgi-bin/${program}`, { form, headers: { Origin: new URL(SITE).origin } });
+  context.request.post(`${SITE}cgi-bin/${program}`, { form, headers: { Origin: new URL(SITE).origin }, ...AGAIN });
 
 async function inHome(context) {
-  const reply = await context.request.get(`${SITE}cgi-bin/list?action=folder&path=/home`);
+  const reply = await context.request.get(`${SITE}cgi-bin/list?action=folder&path=/home`, AGAIN);
   return (await reply.json()).data.items.map((item) => item.name).filter((name) => NAMES.includes(name));
 }
 
@@ -97,7 +97,7 @@ test("right, wrong, unknown, asked once more, out again", () =>
     await page.goBack(); // the browser has kept nothing of what was on screen
     await page.waitForSelector(".login");
     assert.equal(await page.locator("#view >> text=Landscapes").count(), 0);
-    assert.equal((await context.request.get(`${SITE}cgi-bin/list?action=shares`)).status(), 401);
+    assert.equal((await context.request.get(`${SITE}cgi-bin/list?action=shares`, AGAIN)).status(), 401);
   }));
 
 // What a machine may ask and refuse, by a PAM service of the test's own.

@@ -7,7 +7,7 @@ import { after, before, test } from "node:test";
 import * as tus from "tus-js-client";
 import { cardOf, PASSWORDS, unfinished, upload, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
 import { CuttingNetwork } from "./cutting.mjs";
-import { localFiles, ownFolder } from "./support.mjs";
+import { AGAIN, localFiles, ownFolder } from "./support.mjs";
 
 const MIB = 1024 * 1024;
 const SIZE = 32 * MIB; // more than all buffers on the way hold
@@ -75,7 +75,7 @@ async function begin(request, name, file, piece) {
   const modified = Math.floor(statSync(file).mtimeMs / 1000);
   const headers = { "Tus-Resumable": "1.0.0", "Content-Type": "application/offset+octet-stream" };
   const address = `${URL_OF_PAGE}cgi-bin/tus?path=/projects/resume/${name}&mtime=${modified}`;
-  const reply = await request.fetch(address, { method: "POST", headers: { ...headers, "Upload-Length": `${statSync(file).size}` }, data: piece });
+  const reply = await request.fetch(address, { method: "POST", headers: { ...headers, "Upload-Length": `${statSync(file).size}` }, data: piece, ...AGAIN });
   assert.equal(reply.status(), 201);
 }
 

@@ -7,6 +7,8 @@ import { setTimeout } from "node:timers/promises";
 
 // In milliseconds: what has not come by then does not come, on however slow a machine.
 export const LONGEST = 120_000;
+// For requests of a test's own: the web server may close a connection that stood idle just as it is used again.
+export const AGAIN = { maxRetries: 5 };
 const { ORVEL_TEST_PROJECTS: projects, ORVEL_TEST_WORK: work } = process.env;
 
 // Looks again and again; what it found.

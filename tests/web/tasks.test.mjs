@@ -2,9 +2,9 @@
 import assert from "node:assert/strict";
 import { existsSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
 import { test } from "node:test";
-import { cardOf, choose, go, press, row, rowsReady, wentWell, withPage } from "./browser.mjs";
+import { cardOf, choose, go, press, row, wentWell, withPage } from "./browser.mjs";
 import { Gate } from "./gate.mjs";
-import { ownFolder, write } from "./support.mjs";
+import { AGAIN, ownFolder, write } from "./support.mjs";
 
 const MANY = 50;
 
@@ -56,12 +56,13 @@ test("a search: live, sorted, filtered, true after operations", () => {
   });
 });
 
-test("how old the index is that a search was answered from", () =>
-  withPage("alice", { path: "/projects" }, async (page) => {
+test("how old the index is that a search was answered from", () => {
+  ownFolder("aged", { "needle.txt": "" });
+  return withPage("alice", { path: "/projects/aged" }, async (page) => {
     const asOf = { updated: Math.floor(Date.now() / 1000), live: false };
     let state = { finished: false };
     await page.route("**/cgi-bin/search*", async (route) => {
-      const response = await route.fetch();
+      const response = await route.fetch(AGAIN);
       const reply = await response.json();
       const fake = { shares: { projects: "index" }, indexes: { projects: asOf }, ...state };
       for (const part of [reply.data, reply.data?.first]) if (part?.items) Object.assign(part, fake);
@@ -75,7 +76,8 @@ test("how old the index is that a search was answered from", () =>
     asOf.live = true;
     await page.keyboard.press("Alt+r");
     await page.waitForSelector("#status >> text=kept up to date");
-  }));
+  });
+});
 
 test("a search with every kind of criterion, stopped, closed", () => {
   ownFolder("many", parts);

@@ -4,7 +4,7 @@ import { existsSync, readdirSync, readFileSync, statSync, utimesSync } from "nod
 import { join } from "node:path";
 import { test } from "node:test";
 import { choose, drawn, go, row, upload, URL_OF_PAGE, wentWell, withPage } from "./browser.mjs";
-import { localFiles, ownFolder, write } from "./support.mjs";
+import { AGAIN, localFiles, ownFolder, write } from "./support.mjs";
 
 const FILES = 30;
 const files = localFiles("trouble", { thing: "a file" });
@@ -27,6 +27,7 @@ test("a connection that breaks: the queue waits and goes on, the list stays", ()
         if (route.request().url().includes("/upload") && ++sent === 1) {
           for (const name of readdirSync(join(files, "trip/a")).filter((one) => one !== "b"))
             await page.context().request.fetch(`${URL_OF_PAGE}cgi-bin/upload`, {
+              ...AGAIN,
               method: "PUT",
               params: { path: `/projects/broken off/trip/a/${name}` },
               data: readFileSync(join(files, "trip/a", name)),
