@@ -6,6 +6,7 @@
 #include <poll.h>
 #include <spawn.h>
 #include <sys/mman.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -58,14 +59,15 @@ std::vector<std::string> environmentWith(std::map<std::string, std::string> vari
     return list;
 }
 
-// One for all tests of this process, which share their system root; a process that went into a mount namespace of its
-// own, where an orveld from outside sees nothing, has another.
+// One for all tests of this process and for what it forks, which share their system root; a process with a limit or a
+// mount namespace of its own, of which an orveld from outside knows nothing, has another.
 const Orveld& orveldOfThisProcess() {
     static auto& all = *new std::map<std::string, std::unique_ptr<Orveld>>;
     std::error_code error;
-    const std::string here =
-        std::to_string(getpid()) + " " + std::filesystem::read_symlink("/proc/self/ns/mnt", error).string();
-    auto& orveld = all[here];
+    rlimit files = {};
+    getrlimit(RLIMIT_FSIZE, &files);
+    const std::string here = std::filesystem::read_symlink("/proc/self/ns/mnt", error).string();
+    auto& orveld = all[here + " " + std::to_string(files.rlim_cur)];
     if (orveld == nullptr) orveld = std::make_unique<Orveld>();
     return *orveld;
 }
