@@ -328,6 +328,10 @@ TEST_F(WatchedIndex, WhateverChangesIsFound) {
 TEST_F(WatchedIndex, WithoutEventsItIsUpdatedNowAndThen) {
     file("/f");
     watch({{SYS_fanotify_init, EPERM}});
+    EXPECT_TRUE(waitUntil("an index", [] {
+        FIINDEXSTATUS status = {};
+        return FILEIDXIndexStatus("photo", &status) == 0;
+    }));
     for (const char* name : {"/g", "/h/i"}) {
         file(name);
         expectTruthSoon(name);

@@ -205,12 +205,12 @@ TEST_F(ShareCgi, WhatCannotBePublished) {
 }
 
 TEST_F(ShareCgi, DownloadsAreCountedAndLimited) {
-    const auto made = [this](const char* terms) {
+    const auto made = [](const char* terms) {
         return post(PROGRAM_LINK, "alice", std::string("action=create&path=/photo/shared") + terms)
             .json["data"]["id"]
             .asString();
     };
-    const auto shown = [this](const std::string& id) {
+    const auto shown = [](const std::string& id) {
         const Json::Value items = get(PROGRAM_LINK, "alice", "action=list").json["data"]["items"];
         for (const Json::Value& link : items)
             if (link["id"] == id) return link;

@@ -93,7 +93,9 @@ test("counting ends when it is told to, or with its dialog", () =>
     };
     try {
       await open();
+      const told = page.waitForResponse((response) => response.request().postData()?.includes("action=cancel"));
       await page.click(".size-running button");
+      await told;
       gate.open();
       await page.waitForSelector(".sizes >> text=Cancelled: not everything was counted");
       assert.equal(await page.locator(".activity-card", { hasText: "measure" }).count(), 0);

@@ -211,27 +211,32 @@ class Watch {
     Clock::time_point noted_;
 };
 
-void buildMissing(const SDK::Share& share, int& stop) {
+// False when it was told to end.
+bool buildMissing(const SDK::Share& share, int& stop) {
     FIINDEXSTATUS status = {};
-    if (FILEIDXIndexStatus(share.GetName(), &status) == 0) return;
+    if (FILEIDXIndexStatus(share.GetName(), &status) == 0) return true;
     say(share.GetName(), "builds its index");
     const ShareFiles files = filesOf(share, &stop);
     IndexWork work(share, true);
     IndexRows rows(files.root(), share.GetName(), work.database());
     try {
         Indexer indexer(files, rows, &stop);
-        if (!indexer.build()) refuse(share.GetName(), "broken off");
+        if (!indexer.build()) {
+            say(share.GetName(), "broken off");
+            return false;
+        }
     } catch (const Unreadable& error) {
         refuse(share.GetName(), error.what());
     }
     work.done();
+    return true;
 }
 
 }  // namespace
 
 int watchIndex(const SDK::Share& share, unsigned long pause, int& stop, int& full) {
     useIdleDisk();
-    buildMissing(share, stop);
+    if (!buildMissing(share, stop)) return 0;
     Watch watch(share, stop, full);
     try {
         watch.follow();
