@@ -50,6 +50,11 @@ TEST_F(ListCgi, WhatAPageNeedsBesideComesInTheSameReply) {
     const auto dataOf = [](const char* program, const std::string& query) {
         return CgiReply(runCgi(program, "bob", "GET", query)).json["data"];
     };
+    const std::string choice = "action=set&values=" + percentEncode(R"({"mode":"tiles"})");
+    ASSERT_EQ(CgiReply(runCgi(PROGRAM_PREFERENCES, "bob", "POST", "", choice,
+                              {{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}))
+                  .json["data"]["values"]["mode"],
+              "tiles");
     const Json::Value tasks = dataOf(PROGRAM_OPERATION, "action=status"), uploads = dataOf(PROGRAM_TUS, "");
     const Json::Value own = dataOf(PROGRAM_PREFERENCES, "action=get"), access = dataOf(PROGRAM_WHY, "path=/photo");
     makeFolder(shareRoot("photo") + "/a/b");

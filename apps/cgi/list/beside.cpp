@@ -4,6 +4,7 @@
 
 #include <sstream>
 
+#include "base/raised_identity.h"
 #include "link/within.h"
 #include "operation/subfolders.h"
 #include "operation/task_reply.h"
@@ -16,8 +17,14 @@
 namespace orvel::cgi {
 namespace {
 
+// The file is root's, as the program that keeps it.
+bool putPreferences(const User& user, Json::Value& data) {
+    const RaisedIdentity root;
+    return readPreferences(user.name, data["values"]) == ORV_ERR_NONE;
+}
+
 bool fill(const std::string& word, const User& user, const std::string& path, Json::Value& data) {
-    if (word == "preferences") return readPreferences(user.name, data["values"]) == ORV_ERR_NONE;
+    if (word == "preferences") return putPreferences(user, data);
     if (word == "tasks") return tasksReply(user.name, data);
     if (word == "access") return !path.empty() && explainAccess(path, user, data);
     if (word == "above" && !path.empty()) data["folders"] = subfoldersAbove(user, path);
