@@ -1,7 +1,10 @@
 // orvelctl index: what an update makes of an index, and what breaks one off.
 #include <spawn.h>
 
+#include <array>
+#include <chrono>
 #include <fstream>
+#include <thread>
 
 #include "apps/program.h"
 #include "index/folder_state.h"
@@ -340,19 +343,22 @@ TEST_F(WatchedIndex, WithoutEventsItIsUpdatedNowAndThen) {
     EXPECT_EQ(end(SIGTERM), 0);
 }
 
-void changeAtRandom(const std::string& root, unsigned seed, int steps) {
+// Changes below one of the folders, and moves between them: `steps`, or for so many seconds.
+void changeAtRandom(const std::array<std::string, 2>& roots, unsigned seed, int steps, std::chrono::seconds time) {
     std::mt19937 random(seed);
     const auto path = [&] {
-        std::string made = root;
+        std::string made = roots[random() % 8 == 0 ? 1 : 0];
         for (unsigned depth = random() % 4;; --depth) {
             made += "/" + std::string(1, static_cast<char>('a' + random() % 4));
             if (depth == 0) return made;
         }
     };
     std::error_code ignored;
-    for (int i = 0; i < steps; ++i) {
+    const auto end = std::chrono::steady_clock::now() + time;
+    for (int i = 0; i < steps || std::chrono::steady_clock::now() < end; ++i) {
+        if (time.count() > 0 && i % 128 == 0) std::this_thread::sleep_for(std::chrono::milliseconds(random() % 500));
         const std::string one = path(), other = path();
-        switch (random() % 8) {
+        switch (random() % 10) {
             case 0:
             case 1:
                 fs::create_directories(one, ignored);
@@ -370,30 +376,41 @@ void changeAtRandom(const std::string& root, unsigned seed, int steps) {
             case 6:
                 fs::remove(one, ignored);
                 break;
+            case 7:
+                std::ofstream(one, std::ios::in | std::ios::app) << std::string(random() % 50, 'y');
+                break;
+            case 8:
+                static_cast<void>(!lchown(one.c_str(), kAliceUid + random() % 2, kUsersGid));
+                break;
             default:
                 fs::permissions(one, static_cast<fs::perms>(0700 + random() % 0100), ignored);
         }
     }
 }
 
+// In the long mode each of twenty seeds takes a minute.
 TEST_F(WatchedIndex, ManyAtOnceChangeAtRandom) {
     const bool isLong = getenv("ORVEL_TEST_LONG") != nullptr;
+    const std::string other = systemRoot() + "/other-share";
+    fs::create_directory(other);
     for (unsigned seed = 1; seed <= (isLong ? 20 : 2); ++seed) {
         watchUntilLive();
         std::vector<pid_t> children;
         for (unsigned i = 0; i < 8; ++i) {
             children.push_back(fork());
             if (children.back() == 0) {
-                changeAtRandom(photo_, seed * 100 + i, isLong ? 5000 : 100);
+                changeAtRandom({photo_, other}, seed * 100 + i, 100, std::chrono::seconds(isLong ? 60 : 0));
                 _exit(0);
             }
         }
-        if (seed % 2 == 0) {
+        const bool isKilled = seed % 2 == 0;
+        for (int kills = 0; isKilled && kills < (isLong ? 5 : 1); ++kills) {
+            if (kills > 0) std::this_thread::sleep_for(std::chrono::seconds(5));
             end(SIGKILL);
-            watchUntilLive();
+            watch();
         }
         for (const pid_t child : children) EXPECT_EQ(waitForEnd(child, "changes at random"), 0);
-        if (seed % 2 == 0) {  // what changed within files meanwhile does not show on their folders
+        if (isKilled) {  // what changed within files meanwhile does not show on their folders
             end(SIGTERM);
             update("--full");
             watchUntilLive();

@@ -14,10 +14,30 @@ bool isAscii(std::string_view text) {
     return bits < 0x80;
 }
 
+// What is ASCII: each byte is a character, and no other one than a letter folds to another.
+void appendLower(std::string_view text, std::string& out) {
+    for (const char c : text) out += static_cast<char>(c >= 'A' && c <= 'Z' ? c + ('a' - 'A') : c);
+}
+
 }  // namespace
+
+std::optional<std::string_view> extensionOf(std::string_view name, std::string& buffer) {
+    buffer.clear();
+    if (isAscii(name)) {
+        const size_t dot = name.rfind('.');
+        if (dot == std::string_view::npos) return {};
+        appendLower(name.substr(dot + 1), buffer);
+        return buffer;
+    }
+    orvel::appendComparable(name, buffer);
+    const size_t dot = buffer.rfind('.');
+    if (dot == std::string::npos) return {};
+    return std::string_view(buffer).substr(dot + 1);
+}
 
 void Endings::add(std::string_view ending) {
     endings_.add(ending);
+    extensions_.add(ending.substr(ending.rfind('.') + 1));  // of npos + 1: all of it
     longest_ = std::max(longest_, ending.size());
 }
 
@@ -25,9 +45,7 @@ bool Endings::match(std::string_view name) const {
     thread_local std::string text;
     text.clear();
     if (isAscii(name)) {
-        // Each byte is a character, and no other one than a letter folds to another.
-        text = name.substr(name.size() - std::min(name.size(), longest_ + 1));
-        for (char& c : text) c = static_cast<char>(c >= 'A' && c <= 'Z' ? c + ('a' - 'A') : c);
+        appendLower(name.substr(name.size() - std::min(name.size(), longest_ + 1)), text);
     } else {
         orvel::appendComparable(name, text);
     }

@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <functional>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <unordered_set>
@@ -24,15 +25,21 @@ class TextSet {
     std::unordered_set<std::string, Hash, std::equal_to<>> texts_;
 };
 
+// What stands behind the last dot of a name, in the form of orvel::appendComparable and valid until `buffer` changes;
+// none where there is no dot.
+[[nodiscard]] std::optional<std::string_view> extensionOf(std::string_view name, std::string& buffer);
+
 // Patterns "*.xyz" without another wildcard.
 class Endings {
  public:
     // What stands behind the ".", in the form of orvel::appendComparable.
     void add(std::string_view ending);
     [[nodiscard]] bool match(std::string_view name) const;
+    // Whether names of this extension, as extensionOf gives it, may match.
+    [[nodiscard]] bool mayMatch(std::string_view extension) const { return extensions_.has(extension); }
 
  private:
-    TextSet endings_;
+    TextSet endings_, extensions_;
     size_t longest_ = 0;
 };
 

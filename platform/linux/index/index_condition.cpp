@@ -274,6 +274,9 @@ class Reader {
         if (isName) out.names = {{Value(Pattern(pattern))}};
         if (isName && reading_.ofCriteria) out.trigrams = trigramsOf(*pattern);
         if (auto ending = isName ? endingOf(text, *pattern) : std::nullopt) {
+            const auto endings = std::make_shared<Endings>();
+            endings->add(*ending);
+            out.names = {{Value(EndingList(endings))}};
             out.plain = {PlainTest::Kind::kEnding, std::move(*ending)};
         }
         return out;
@@ -324,6 +327,23 @@ bool fitsNames(const Condition& condition, std::string_view name) {
     return std::all_of(condition.names.begin(), condition.names.end(), [name](const std::vector<Value>& alternatives) {
         return std::any_of(alternatives.begin(), alternatives.end(),
                            [name](const Value& test) { return fits(test, name); });
+    });
+}
+
+bool mayHaveExtension(const Condition& condition, std::string_view extension) {
+    const auto allows = [extension](const Value& test) {
+        const auto* endings = std::get_if<EndingList>(&test);
+        return endings == nullptr || (*endings)->mayMatch(extension);
+    };
+    return std::all_of(condition.names.begin(), condition.names.end(), [&](const std::vector<Value>& alternatives) {
+        return std::any_of(alternatives.begin(), alternatives.end(), allows);
+    });
+}
+
+bool asksForExtension(const Condition& condition) {
+    const auto isEndings = [](const Value& test) { return std::holds_alternative<EndingList>(test); };
+    return std::any_of(condition.names.begin(), condition.names.end(), [&](const std::vector<Value>& alternatives) {
+        return std::all_of(alternatives.begin(), alternatives.end(), isEndings);
     });
 }
 

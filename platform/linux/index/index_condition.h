@@ -49,6 +49,9 @@ struct Condition {
 
 // Whether a record of this name may satisfy the condition, as far as names tell.
 [[nodiscard]] bool fitsNames(const Condition& condition, std::string_view name);
+// The same by what extensionOf gives for the name, and whether names without an extension never satisfy it.
+[[nodiscard]] bool mayHaveExtension(const Condition& condition, std::string_view extension);
+[[nodiscard]] bool asksForExtension(const Condition& condition);
 
 // Null `tree` holds for every record. Nothing, with the slot filled (0x0D00), for columns and comparisons that do not
 // exist or do not go together, and for a tree that is too deep or large or a cycle.

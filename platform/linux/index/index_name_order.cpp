@@ -15,6 +15,18 @@ int comparePaths(const OwnedRecord& a, const OwnedRecord& b) {
     return std::string_view(a.view().szPath).compare(b.view().szPath);
 }
 
+// Which numbers of extensions the records may have; none where that is not known.
+std::vector<bool> wantedExtensions(const Condition& condition, const Names& names) {
+    if (!asksForExtension(condition)) return {};
+    std::vector<bool> wanted(size_t{kNoExtension} + 1, false);
+    wanted[kOtherExtension] = true;
+    size_t number = kOtherExtension;
+    names.eachExtension([&](std::string_view extension) {
+        if (++number < kNoExtension) wanted[number] = mayHaveExtension(condition, extension);
+    });
+    return wanted;
+}
+
 }  // namespace
 
 NameOrder::NameOrder(Database& index, const Condition& condition, std::unique_ptr<const Names> names, bool descending,
@@ -24,7 +36,7 @@ NameOrder::NameOrder(Database& index, const Condition& condition, std::unique_pt
       names_(std::move(names)),
       descending_(descending),
       end_(end),
-      at_(*names_, descending) {}
+      at_(*names_, descending, wantedExtensions(condition, *names_)) {}
 
 // The clock is asked seldom: it costs as much as a look.
 bool NameOrder::isLate() {

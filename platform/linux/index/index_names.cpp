@@ -4,9 +4,9 @@
 
 #include <algorithm>
 #include <cstring>
+#include <utility>
 
 #include "failure.h"
-#include "index/index_names_format.h"
 #include "io/file_io.h"
 
 namespace vexo::fileindex {
@@ -35,58 +35,80 @@ Names::~Names() {
 bool Names::read(int64_t index) {
     NamesHead head;
     memcpy(&head, mapped_, sizeof head);
-    const uint64_t most = (size_ - sizeof head) / sizeof(uint32_t);
     if (memcmp(head.magic, kNamesMagic, sizeof head.magic) != 0 || index == 0 || head.index != index) return false;
-    if (head.count > most || head.textsAt < sizeof head + head.count * sizeof(uint32_t) || head.textsAt > size_ ||
-        head.textsSize != size_ - head.textsAt || (head.textsSize > 0 && mapped_[size_ - 1] != '\0')) {
+    const uint64_t blocks = (head.count + kNamesOfBlock - 1) / kNamesOfBlock;
+    uint64_t from = sizeof head;
+    // Whether so many things of that size lie behind those before them.
+    const auto holds = [&](uint64_t at, uint64_t count, uint64_t bytes) {
+        if (at < from || at > size_ || count > (size_ - at) / bytes) return false;
+        from = at + count * bytes;
+        return true;
+    };
+    const auto endsText = [&](uint64_t size) { return size == 0 || mapped_[from - 1] == '\0'; };
+    if (!holds(sizeof head, head.count, sizeof(uint32_t)) || !holds(head.extensionsAt, head.count, sizeof(uint16_t)) ||
+        !holds(head.blocksAt, blocks, sizeof(uint64_t)) || !holds(head.textsAt, head.textsSize, 1) ||
+        !endsText(head.textsSize) || !holds(head.listAt, head.listSize, 1) || !endsText(head.listSize) ||
+        from != size_) {
         return false;
     }
     count_ = head.count;
     highest_ = head.highest;
+    extensionsAt_ = head.extensionsAt;
+    blocksAt_ = head.blocksAt;
     texts_ = std::string_view(mapped_ + head.textsAt, head.textsSize);
+    list_ = std::string_view(mapped_ + head.listAt, head.listSize);
     return true;
 }
 
-int64_t Names::id(size_t position) const {
-    uint32_t id = 0;
-    memcpy(&id, mapped_ + sizeof(NamesHead) + position * sizeof id, sizeof id);
-    return id;
+std::string_view Names::textsOfBlock(size_t block) const {
+    const auto at = numberAt<uint64_t>(blocksAt_, block);
+    return texts_.substr(std::min<uint64_t>(at, texts_.size()));
 }
 
-NamesCursor::NamesCursor(const Names& names, bool descending)
+NamesCursor::NamesCursor(const Names& names, bool descending, std::vector<bool> wanted)
     : names_(&names),
       descending_(descending),
-      left_(names.texts()),
+      wanted_(std::move(wanted)),
       at_(descending ? names.count() : static_cast<size_t>(-1)),
       end_(at_ + 1),
-      first_(at_) {}
+      first_(at_),
+      block_(static_cast<size_t>(-1)) {}
 
 bool NamesCursor::next() {
     return descending_ ? nextDescending() : nextAscending();
 }
 
 bool NamesCursor::nextAscending() {
-    if (left_.empty() || ++at_ >= names_->count()) return false;
-    name_ = left_.substr(0, left_.find('\0'));
-    left_.remove_prefix(name_.size() + 1);
+    do {
+        if (++at_ >= names_->count()) return false;
+    } while (!isWanted(at_));
     return true;
 }
 
+// Equal names have the same extension.
 bool NamesCursor::nextDescending() {
     if (++at_ < end_ && at_ < names_->count()) return true;
-    const auto last = [this] {
-        const std::string_view texts = left_.substr(0, left_.size() - 1);
-        return texts.substr(texts.rfind('\0') + 1);  // of npos + 1: from the beginning
-    };
-    if (left_.empty() || first_ == 0) return false;
-    end_ = first_;
-    name_ = last();
     do {
-        left_.remove_suffix(name_.size() + 1);
+        if (first_ == 0) return false;
         --first_;
-    } while (!left_.empty() && first_ > 0 && last() == name_);
+    } while (!isWanted(first_));
+    end_ = first_ + 1;
+    const std::string_view name = nameAt(first_);
+    while (first_ > 0 && nameAt(first_ - 1) == name) --first_;
     at_ = first_;
     return true;
+}
+
+std::string_view NamesCursor::nameAt(size_t at) {
+    if (at / kNamesOfBlock != block_) {
+        block_ = at / kNamesOfBlock;
+        std::string_view left = names_->textsOfBlock(block_);
+        for (std::string_view& text : texts_) {
+            text = left.substr(0, left.find('\0'));
+            left.remove_prefix(std::min(text.size() + 1, left.size()));
+        }
+    }
+    return texts_[at % kNamesOfBlock];
 }
 
 }  // namespace vexo::fileindex

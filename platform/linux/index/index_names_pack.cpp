@@ -4,13 +4,17 @@
 #include <algorithm>
 #include <cstdlib>
 #include <cstring>
+#include <functional>
 #include <limits>
+#include <map>
+#include <optional>
 #include <string>
 #include <tuple>
 #include <vector>
 
 #include "base/new_file.h"
 #include "failure.h"
+#include "index/index_alternatives.h"
 #include "index/index_names.h"
 #include "index/index_names_format.h"
 #include "index/index_sort.h"
@@ -39,33 +43,49 @@ bool markIndex(Database& index, int64_t& mark) {
     return readMark(index, mark) && mark != 0;
 }
 
-// A file at two ends at once: ids from the front, and texts from where as many ids as there may be end.
+// A file at several places at once: each of its parts but the last ones begins where the one before it ends when there
+// are as many names as there may be.
 class Packing {
  public:
-    Packing(int fd, int64_t mostIds)
+    Packing(int fd, int64_t mostNames)
         : ids_(fd, sizeof(NamesHead)),
-          texts_(fd, sizeof(NamesHead) + static_cast<uint64_t>(mostIds) * sizeof(uint32_t)),
+          extensions_(fd, ids_.end() + static_cast<uint64_t>(mostNames) * sizeof(uint32_t)),
+          blocks_(fd, extensions_.end() + static_cast<uint64_t>(mostNames) * sizeof(uint16_t)),
+          texts_(fd, blocks_.end() + (static_cast<uint64_t>(mostNames) / kNamesOfBlock + 1) * sizeof(uint64_t)),
+          extensionsAt_(extensions_.end()),
+          blocksAt_(blocks_.end()),
           textsAt_(texts_.end()),
-          most_(mostIds) {}
+          most_(mostNames) {}
 
     void add(int64_t id, std::string_view name) {
         if (count_ == most_) {
             overfull_ = true;
             return;
         }
+        if (count_ % static_cast<int64_t>(kNamesOfBlock) == 0) addNumber(blocks_, texts_.end() - textsAt_);
         ++count_;
-        const auto number = static_cast<uint32_t>(id);
-        ids_.add({reinterpret_cast<const char*>(&number), sizeof number});
+        addNumber(ids_, static_cast<uint32_t>(id));
+        addNumber(extensions_, numberOf(name));
         texts_.add(name);
-        texts_.add(std::string_view("\0", 1));
+        texts_.add(kNul);
     }
     // False with errno.
     [[nodiscard]] bool finish(int fd, int64_t mark, int64_t highest) {
-        NamesHead head{{}, mark, highest, static_cast<uint64_t>(count_), textsAt_, texts_.end() - textsAt_};
+        NamesHead head{{},
+                       mark,
+                       highest,
+                       static_cast<uint64_t>(count_),
+                       extensionsAt_,
+                       blocksAt_,
+                       textsAt_,
+                       texts_.end() - textsAt_,
+                       texts_.end(),
+                       list_.size()};
         memcpy(head.magic, kNamesMagic, sizeof head.magic);
+        texts_.add(list_);
         if (overfull_) errno = EAGAIN;
-        return !overfull_ && ids_.flush() && texts_.flush() && ftruncate(fd, static_cast<off_t>(texts_.end())) == 0 &&
-               pwrite(fd, &head, sizeof head, 0) == sizeof head;
+        return !overfull_ && ids_.flush() && extensions_.flush() && blocks_.flush() && texts_.flush() &&
+               ftruncate(fd, static_cast<off_t>(texts_.end())) == 0 && pwrite(fd, &head, sizeof head, 0) == sizeof head;
     }
 
  private:
@@ -99,10 +119,34 @@ class Packing {
         int reason_ = 0;
     };
 
-    Stretch ids_, texts_;
-    uint64_t textsAt_;
+    static constexpr std::string_view kNul{"\0", 1};
+    static constexpr size_t kLongest = 32;  // of extensions; what is longer hardly comes twice
+
+    template <class Number>
+    static void addNumber(Stretch& stretch, Number number) {
+        stretch.add({reinterpret_cast<const char*>(&number), sizeof number});
+    }
+
+    uint16_t numberOf(std::string_view name) {
+        const std::optional<std::string_view> extension = extensionOf(name, buffer_);
+        if (!extension) return kNoExtension;
+        const auto known = numbers_.find(*extension);
+        if (known != numbers_.end()) return known->second;
+        if (extension->size() > kLongest || numbers_.size() == kMostExtensions) return kOtherExtension;
+        list_ += *extension;
+        list_ += kNul;
+        const auto number = static_cast<uint16_t>(numbers_.size() + 1);
+        numbers_.emplace(*extension, number);
+        return number;
+    }
+
+    Stretch ids_, extensions_, blocks_, texts_;
+    uint64_t extensionsAt_, blocksAt_, textsAt_;
     int64_t most_, count_ = 0;
     bool overfull_ = false;
+    std::map<std::string, uint16_t, std::less<>> numbers_;
+    std::string list_;  // of extensions, in the order of their numbers
+    std::string buffer_;
 };
 
 // SQLite sorts in a file of its own what does not fit its cache.
@@ -160,16 +204,16 @@ bool packMerged(Database& index, const Names& old, Packing& packing) {
     auto next = names.begin();
     std::string key;
     // Whether the next new name stands before a packed one.
-    const auto isBefore = [&](const NamesCursor& at, bool& before) {
+    const auto isBefore = [&](int64_t id, bool& before) {
         const int difference = next->key.compare(key);
         before = difference < 0;
         if (difference != 0) return true;
-        if (!pathOf.bind(1, at.id()) || pathOf.step() != Statement::kRow) return false;
+        if (!pathOf.bind(1, id) || pathOf.step() != Statement::kRow) return false;
         before = next->path < pathOf.text(0);
         pathOf.reset();
         return true;
     };
-    for (NamesCursor at(old, false); at.next();) {
+    for (NamesCursor at(old, false, {}); at.next();) {
         const auto id = static_cast<size_t>(at.id());
         if (id >= present.size() || !present[id]) continue;
         if (next != names.end()) {
@@ -177,7 +221,7 @@ bool packMerged(Database& index, const Names& old, Packing& packing) {
             appendKey(at.name(), false, key);
         }
         for (bool before = true; next != names.end();) {
-            if (!isBefore(at, before)) return false;
+            if (!isBefore(at.id(), before)) return false;
             if (!before) break;
             packing.add(next->id, next->name);
             ++next;
