@@ -8,6 +8,7 @@
 
 #include "apps/program.h"
 #include "index/folder_state.h"
+#include "index/indexer.h"
 #include "index/share_files.h"
 #include "support/gate.h"
 #include "support/testing.h"
@@ -203,6 +204,26 @@ TEST_F(Index, OnlyWhatIsGoneIsPassedOver) {
         }
         vexo::gate::reset();
     }
+}
+
+// A folder that is gone when its name is looked at, and there again when its files are.
+TEST_F(Index, NothingIsAddedToAFolderThatWasTakenOut) {
+    file("/in/f");
+    EXPECT_EQ(orvelctl({"index", "build", "photo"}).status, 0);
+    char path[4096];
+    ASSERT_EQ(FILEIDXIndexBegin("photo", FI_INDEX_UPDATE, path, sizeof path), 0);
+    IndexRows rows(photo_, "photo", path);
+    int stop = 0;
+    const ShareFiles files(photo_, &stop);
+    Indexer indexer(files, rows, &stop);
+    file("/in/new");
+    vexo::gate::fail("VLIBCFileLStatAt", VEXO_ERR_GENERAL, ENOENT, 1);
+    indexer.follow({{"", {{"in", true}}}, {"in", {{"new", false}}}});
+    vexo::gate::reset();
+    for (const char* gone : {"in", "in/f", "in/new"}) EXPECT_FALSE(rows.at(gone)) << gone;
+    indexer.follow({{"", {{"in", true}}}});
+    for (const char* there : {"in", "in/f", "in/new"}) EXPECT_TRUE(rows.at(there)) << there;
+    EXPECT_EQ(FILEIDXIndexEnd("photo", 1), 0);
 }
 
 TEST_F(Index, WorkThatIsBrokenOffLosesNothing) {

@@ -23,6 +23,11 @@ std::string nameOf(const std::string& path) {
     return path.substr(path.rfind('/') + 1);
 }
 
+std::string parentOf(const std::string& path) {
+    const size_t slash = path.rfind('/');
+    return slash == std::string::npos ? "" : path.substr(0, slash);
+}
+
 // Whether the path or a folder above it is among `paths`.
 bool isWithin(std::string path, const std::set<std::string>& paths) {
     for (;;) {
@@ -86,12 +91,14 @@ bool Indexer::lookAtOwn(const std::string& folder) {
 }
 
 void Indexer::take(Look& look) {
+    // What was seen in a folder that has come or gone since is not believed: it was read anew, or has events to come.
+    if (isWithin(parentOf(look.path), renewed_)) return;
     const bool wasFolder = look.before && look.before->isFolder;
     if (!look.now || (wasFolder && look.now->isFolder() && look.replaced)) {
         if (look.before) removeTree(look.path, wasFolder);
         look.before.reset();
-        if (wasFolder) renewed_.insert(look.path);
     }
+    if (wasFolder && !(look.now && look.before && look.now->isFolder())) renewed_.insert(look.path);
     if (!look.now) return;
     if (wasFolder && look.before && look.now->isFolder()) {
         // What is new in it has events of its own.

@@ -190,6 +190,8 @@ void Indexer::settle() {
             Entry own = {folder.substr(folder.rfind('/') + 1), folder, {}};
             const int64_t seen = kernelClock();
             if (stopped() || files_.status(folder, own.status) != Presence::kThere || !own.isFolder()) continue;
+            // One of its name may have come after it was taken out.
+            if (!rows_.at(folder)) continue;
             if (compare(folder)) compared_.emplace_back(std::move(own), seen);
         }
         writeOwnRows();
