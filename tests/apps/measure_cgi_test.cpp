@@ -53,40 +53,15 @@ class MeasureCgi : public TaskCgi {
 };
 
 TEST_F(MeasureCgi, CountsWhatTheUserSees) {
-    const struct {
-        const char* what;
-        std::vector<std::string> paths;
-        const char *sums, *parts;
-    } cases[] = {
-        {"a folder",
-         {"/photo/t"},
-         "1707 5 5 2 unreadable 2 linked 1 ",
-         "/photo/t/sub 1707, /photo/t/a.bin 0, /photo/t/closed 0, /photo/t/named 0, /photo/t/out 0, "},
-        {"the whole share", {"/photo/"}, "1707 5 6 2 unreadable 2 linked 1 ", "/photo/t 1707, "},
-        {"a file", {"/photo/t/a.bin"}, "1000 1 0 0 ", "/photo/t/a.bin 1000, "},
-        {"a link", {"/photo/t/out"}, "0 0 0 1 ", "/photo/t/out 0, "},
-        {"what no text names",
-         {"/photo/t/sub"},
-         "1707 4 2 1 ",
-         "/photo/t/sub/again 1000, /photo/t/sub/b.bin 500, /photo/t/sub/deep 200, /photo/t/sub/%FF 7, "
-         "/photo/t/sub/up 0, "},
-        {"several",
-         {"/photo/t/sub/deep", "/photo/t/a.bin"},
-         "1200 2 1 0 ",
-         "/photo/t/a.bin 1000, /photo/t/sub/deep 200, "},
-        {"several that lie in each other",
-         {"/photo/t/sub/deep/c.bin", "/photo/t/sub/deep/", "/photo/t/sub/deep"},
-         "200 1 1 0 ",
-         "/photo/t/sub/deep 200, "},
-    };
-    for (const auto& one : cases) {
-        SCOPED_TRACE(one.what);
-        const Json::Value found = measured(one.paths);
-        EXPECT_EQ(sums(found), one.sums);
+    for (const auto& [what, paths, sum, listed] :
+         rowsOf<const char*, std::vector<std::string>, std::string, std::string>("apps/measured")) {
+        SCOPED_TRACE(what);
+        const Json::Value found = measured(paths);
+        EXPECT_EQ(sums(found), sum);
         // Which name of a file is met first is the file system's affair.
         const std::string parts = sizes(found["parts"]);
         const bool other = parts.starts_with("/photo/t/a.bin 1000, /photo/t/sub 707, ");
-        EXPECT_TRUE(parts == one.parts || other) << parts;
+        EXPECT_TRUE(parts == listed || other) << parts;
         EXPECT_EQ(found["rest"]["count"], 0);
     }
 }

@@ -130,45 +130,21 @@ TEST_F(SearchCgi, RequestsAreTakenStrictly) {
     writeFile(shareRoot("photo") + "/file", "x");
     fs::create_symlink("/etc", shareRoot("photo") + "/outside");
     makeFolder(shareRoot("photo") + "/#recycle/folder");
-    const std::string longPattern(491, 'a');
-    std::string manyPatterns = "a", manyFolders;
+    std::string manyPatterns = "a", manyFolders = "action=start&name=a";
     for (int i = 0; i < 100; ++i) manyPatterns += ",a";
     for (int i = 0; i < 501; ++i) manyFolders += "&path=/photo";
-    const std::string start = "action=start&path=/photo&", named = "action=start&name=a";
-    for (const auto& [parameter, forms] : Rows<std::string, Names>{
-             {"",
-              {"", "action=burn", "action=start&path=/photo", start + "name=&type=all", named, named + manyFolders,
-               named + "&path_raw=/photo/%25zz", start + "name=a&recursive=maybe",
-               named + "&path=", "action=list&taskid=../alice", "action=list&taskid=", "action=stop&taskid=5a1f",
-               "action=clean&taskid=../../../../etc/passwd", "action=clean&taskid=" + std::string(17, 'A')}},
-             {"name",
-              {start + "name=%20,%20", start + "name=" + longPattern, start + "name=" + std::string(10000, '*'),
-               start + "name=" + manyPatterns}},
-             {"type", {start + "type=link"}},
-             {"extension", {start + "extension=,"}},
-             {"mtime_from", {start + "mtime_from=yesterday"}},
-             {"crtime_to", {start + "crtime_to=-1"}},
-             {"atime_to", {start + "atime_to=1e9"}},
-             {"size_less", {start + "size_less=10%20MB"}},
-             {"size_equal", {start + "size_equal=99999999999999999999"}}}) {
-        for (const std::string& form : forms) {
-            const CgiReply reply = ask("alice", form);
-            EXPECT_TRUE(reply.status == 400 && code(reply) == 400) << form;
-            EXPECT_EQ(reply.json["data"]["parameter"], parameter.empty() ? Json::Value() : parameter) << form;
-        }
+    auto rows = rowsOf<std::string, std::string>("apps/search_malformed");
+    rows.emplace_back("", manyFolders);
+    for (const std::string& pattern : {std::string(491, 'a'), std::string(10000, '*'), manyPatterns})
+        rows.emplace_back("name", "action=start&path=/photo&name=" + pattern);
+    for (const auto& [parameter, form] : rows) {
+        const CgiReply reply = ask("alice", form);
+        EXPECT_TRUE(reply.status == 400 && code(reply) == 400) << form;
+        EXPECT_EQ(reply.json["data"]["parameter"], parameter.empty() ? Json::Value() : parameter) << form;
     }
-    for (const auto& [refusal, forms] : Rows<int, Names>{
-             {401, {named + "&path=/"}},
-             {403, {start + "owner=nobody%20here"}},
-             {404, {start + "group=*"}},
-             {407, {named + "&path=/photo/outside", named + "&path=/photo/%23recycle", named + "&path=/photo/../.."}},
-             {408,
-              {named + "&path=/nowhere", named + "&path=/photo&path=/photo/missing", named + "&path=/photo/file",
-               "action=list&taskid=5A1F", "action=stop&taskid=5A1F", "action=clean&taskid=5A1F"}}}) {
-        for (const std::string& form : forms) {
-            const CgiReply reply = ask("alice", form);
-            EXPECT_TRUE(reply.status == 200 && code(reply) == refusal) << form << code(reply);
-        }
+    for (const auto& [refusal, form] : rowsOf<int, std::string>("apps/search_refusals")) {
+        const CgiReply reply = ask("alice", form);
+        EXPECT_TRUE(reply.status == 200 && code(reply) == refusal) << form << code(reply);
     }
     EXPECT_EQ(ask("", "action=list&taskid=5A1F").status, 401);
     for (const std::string action : {"start", "stop", "clean"}) {

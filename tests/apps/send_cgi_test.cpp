@@ -1,12 +1,11 @@
 // The program send: strangers' files into the folder of a link, and nothing else.
-#include <sqlite3.h>
-
 #include <future>
 
 #include "apps/cgi_test.h"
 #include "send/pace.h"
 #include "support/gate.h"
 #include "support/race.h"
+#include "support/sqlite.h"
 #include "vexo/link_store.h"
 
 namespace {
@@ -44,7 +43,6 @@ class SendCgi : public CgiTest {
     [[nodiscard]] std::string inbox(const std::string& name = "from guests") const {
         return shareRoot("photo") + "/party/" + name;
     }
-    std::string kept_ = "kept";
 };
 
 TEST_F(SendCgi, StrangersSendAndTheOwnerSees) {
@@ -74,14 +72,8 @@ TEST_F(SendCgi, StrangersSendAndTheOwnerSees) {
     const Json::Value state = look(link, "state").json["data"]["receives"];
     EXPECT_EQ(state["name"], "from guests");
     EXPECT_EQ(state["files_left"], 95);
-    sqlite3* database = nullptr;
-    ASSERT_EQ(sqlite3_open((systemRoot() + VEXO::kLinkDatabase).c_str(), &database), SQLITE_OK);
-    const auto row = [](void* kept, int, char** values, char**) {
-        return *static_cast<std::string*>(kept) = values[0], 0;
-    };
-    EXPECT_EQ(sqlite3_exec(database, "SELECT count(*) FROM sharingLinks", row, &kept_, nullptr), SQLITE_OK);
-    sqlite3_close(database);
-    EXPECT_EQ(kept_, "0") << "what reads links finds none to read";
+    EXPECT_EQ(support::sql(systemRoot() + VEXO::kLinkDatabase, "SELECT count(*) FROM sharingLinks"), "0")
+        << "what reads links finds none to read";
 
     EXPECT_EQ(post(PROGRAM_LINK, "alice", "action=revoke&id=" + link).status, 200);
     EXPECT_EQ(send(link, "late", "x").status, 404);
@@ -94,30 +86,14 @@ TEST_F(SendCgi, WhatStrangersTry) {
     const std::string reading =
         post(PROGRAM_LINK, "alice", "action=create&path=/photo/party").json["data"]["id"].asString();
     const std::string longest(255, 'n');
-    for (const auto& [to, name, more, expected] : Rows<std::string, std::string, Variables, int>{
-             row(link, "", Variables{}, 400),
-             row(link, ".", Variables{}, 400),
-             row(link, "..", Variables{}, 400),
-             row(link, "..%2Fx", Variables{}, 400),
-             row(link, "%2Fetc%2Fx", Variables{}, 400),
-             row(link, "sub%2Fx", Variables{}, 400),
-             row(link, "a%0Ab", Variables{}, 400),
-             row(link, longest + "n", Variables{}, 400),
-             row(link, "a:b", Variables{}, 400),
-             row(link, "x", Variables{{"CONTENT_TYPE", "multipart/form-data; boundary=b"}}, 415),
-             row(link, "x", Variables{{"CONTENT_TYPE", "application/x-www-form-urlencoded"}}, 415),
-             row(link, "x", Variables{{"CONTENT_TYPE", ""}}, 415),
-             row(link, "x", Variables{{"CONTENT_LENGTH", ""}}, 400),
-             row(link, "x", Variables{{"CONTENT_LENGTH", "-1"}}, 400),
-             row(link, "x", Variables{{"CONTENT_LENGTH", "9223372036854775807"}}, 413),
-             row(link, "x", Variables{{"CONTENT_LENGTH", "10"}}, 413),
-             row(link, "x", Variables{{"CONTENT_LENGTH", "9"}}, 400),  // it ends before
-             row(guarded, "x", Variables{}, 401),
-             row(reading, "x", Variables{}, 404),
-             row(std::string("none"), "x", Variables{}, 404)}) {
-        EXPECT_EQ(send(to, name, "12345", more).status, expected)
-            << name << " " << (more.empty() ? "" : more.begin()->second);
+    const std::map<std::string, std::string> links = {{"box", link}, {"guarded", guarded}, {"reading", reading}};
+    for (const auto& [to, name, variable, value, expected] :
+         rowsOf<std::string, std::string, std::string, std::string, int>("apps/strangers")) {
+        const Variables more = variable.empty() ? Variables() : Variables{{variable, value}};
+        EXPECT_EQ(send(links.contains(to) ? links.at(to) : to, name, "12345", more).status, expected)
+            << to << " " << name << " " << value;
     }
+    EXPECT_EQ(send(link, longest + "n", "12345").status, 400);
     EXPECT_EQ(namesIn(shareRoot("photo") + "/party"), (Names{"from guests", "from guests (2)"}));
     EXPECT_EQ(namesIn(inbox()), Names{});
     EXPECT_EQ(send(link, longest, "12345").status, 200);

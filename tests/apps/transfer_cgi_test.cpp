@@ -36,16 +36,9 @@ TEST_F(TaskCgi, CopiesKeepWhatFilesAre) {
 }
 
 TEST_F(TaskCgi, ConflictsAreSolvedAsAsked) {
-    struct {
-        const char *policy, *errors, *tree;  // names and contents in the target
-        int done, skipped;
-    } const cases[] = {
-        {"error", "/photo/a.txt 414\n/photo/d 414\n/photo/m 414\n", "a.txt=old d/x=old m/f=old", 0, 0},
-        {"skip", "", "a.txt=old d/x=old d/y=new m/f=old", 2, 3},
-        {"overwrite", "/photo/m 414\n", "a.txt=new d/x=new d/y=new m/f=old", 4, 0},
-        {"keep_both", "", "a (2).txt=new a.txt=old d (2)/x=new d (2)/y=new d/x=old m (2)=new m/f=old", 5, 0}};
     for (const char* action : {"copy", "move"}) {
-        for (const auto& [policy, refused, tree, done, skipped] : cases) {
+        for (const auto& [policy, refused, tree, done, skipped] :
+             rowsOf<std::string, std::string, std::string, int, int>("apps/conflicts")) {
             SCOPED_TRACE(std::string(action) + " " + policy);
             for (const std::string& root : {photo_, video_}) fs::remove_all(root), openFolder(root);
             writeFiles(photo_, {"/a.txt", "/d/x", "/d/y", "/m"}, "new");
@@ -60,7 +53,7 @@ TEST_F(TaskCgi, ConflictsAreSolvedAsAsked) {
                 EXPECT_EQ(task["items_skipped"], skipped);
                 EXPECT_EQ(readFile(photo_ + "/d/x"), "new") << "the source stays";
             } else {
-                const bool moved = std::string(policy) == "overwrite" || std::string(policy) == "keep_both";
+                const bool moved = policy == "overwrite" || policy == "keep_both";
                 EXPECT_EQ(fs::exists(photo_ + "/a.txt"), !moved);
                 EXPECT_EQ(fs::exists(photo_ + "/d"), !moved) << "with what stayed in it";
             }

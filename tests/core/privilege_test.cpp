@@ -43,20 +43,12 @@ TEST_F(PrivilegeTest, ListsAndMasks) {
 }
 
 TEST_F(PrivilegeTest, RefusedLookups) {
-    const std::string askAdministrator = "orveldir:# VEXOGroupIsAdminGroupMem";  // comes first
-    for (const auto& [path, user, code, log] : Rows<const char*, const char*, int, std::string>{
-             {nullptr, "alice", 401, "orveldir(#): bad parameter!"},
-             {"photo", "alice", 401, "orveldir(#): bad path name=photo\norveldir(#): OrvLibGetTokOfPath photo fail"},
-             {"/", "alice", 401, "orveldir(#) error path\norveldir(#): OrvLibGetTokOfPath / fail"},
-             {"/no\nne/x", "alice", 408, "orveldir(#): VEXOShareGet no\\x0Ane fail"},
-             {"/home", "alice", 408, "orveldir(#): VEXOShareGet home fail"},
-             {nullptr, nullptr, 401, askAdministrator + "((null)) failed. [0x0D00 "},
-             {nullptr, "nobody-here", 401, askAdministrator + "(nobody-here) failed. [0x1D00 "}}) {
+    for (const auto& [path, user, code, log] :
+         rowsOf<const char*, const char*, int, std::string>("core/refused_lookups")) {
         OrvLibSetErr(0);
         const Answer out = ask(path, user);
         EXPECT_EQ(std::tie(out.result, out.privilege, out.mask), std::make_tuple(-1, -1, 99));
         EXPECT_EQ(OrvLibGetErr(), code);
-        // Behind an error number stands where it was set.
         EXPECT_EQ(takeLogText().substr(0, log.ends_with(' ') ? log.size() : std::string::npos), log);
     }
     int mask = 99;

@@ -32,16 +32,7 @@ DIRENTRY_INFO sample() {
 }
 
 TEST(FileInfo, EachBitGivesItsMember) {
-    for (const auto& [bits, additional] : Rows<int, const char*>{
-             row(0, nullptr), row(0x100, nullptr), row(0x01, R"({"real_path":"/volume1/photo/a.jpg"})"),
-             row(0x02, R"({"size":12.0})"),
-             row(0x04, R"({"owner":{"gid":4294967295,"group":"users","uid":20001,"user":"alice"}})"),
-             row(0x08, R"({"time":{"atime":4294967295,"crtime":3,"ctime":2,"mtime":1}})"),
-             row(0x10, R"({"perm":{"acl":{"append":true,"del":true,"exec":true,"read":true,"write":true},)"
-                       R"("is_acl_mode":true,"posix":644}})"),
-             row(0x20, R"({"type":"JPG"})"), row(0x40, R"({"mount_point_type":"iso"})"),
-             row(0x80,
-                 R"({"volume_status":{"freespace":4096.0,"readonly":true,"totalspace":1.8446744073709552e+19}})")}) {
+    for (const auto& [bits, additional] : rowsOf<int, const char*>("enum/members_of_bits")) {
         Json::Value out;
         DumpFileInfo(bits, sample(), out);
         const std::string rest = R"("isdir":false,"name":"a.jpg","path":"/photo/a.jpg"})";

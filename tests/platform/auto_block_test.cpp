@@ -1,9 +1,8 @@
 // The auto-block service: its rules, its store, its neighbours.
 #include "vexo/auto_block.h"
 
-#include <sqlite3.h>
-
 #include "platform/trust.h"
+#include "support/sqlite.h"
 #include "web/auto_block_rules.h"
 
 namespace {
@@ -38,17 +37,7 @@ class AutoBlockTest : public ApplianceTest {
     static void failTimes(const char* address, int times, const char* tag = kTag) {
         for (int i = 0; i < times; ++i) EXPECT_EQ(AutoBlockFailLoginSet(address, tag), 0) << VLIBCErrGet();
     }
-    // Runs SQL on the store; the first value of its rows, -1 without any.
-    long long store(const std::string& sql) {
-        sqlite3* db = nullptr;
-        sqlite3_stmt* statement = nullptr;
-        EXPECT_EQ(sqlite3_open(file_.c_str(), &db), SQLITE_OK);
-        EXPECT_EQ(sqlite3_prepare_v2(db, sql.c_str(), -1, &statement, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
-        const long long value = sqlite3_step(statement) == SQLITE_ROW ? sqlite3_column_int64(statement, 0) : -1;
-        sqlite3_finalize(statement);
-        sqlite3_close(db);
-        return value;
-    }
+    std::string store(const std::string& statements) { return sql(file_, statements); }
     std::string file_ = systemRoot() + "/var/lib/vexo/autoblock.db";
 };
 
@@ -76,7 +65,7 @@ TEST_F(AutoBlockTest, FailuresWithinTheWindowDeny) {
     setSetting("autoblock_enable", "no");
     EXPECT_EQ(VexoCgiIsDeniedIP(kAddress), 0);
     failTimes("192.0.2.9", 1);
-    EXPECT_EQ(store("SELECT count(*) FROM failures WHERE address = '192.0.2.9'"), 0);
+    EXPECT_EQ(store("SELECT count(*) FROM failures WHERE address = '192.0.2.9'"), "0");
     setSetting("autoblock_enable", "yes");
     EXPECT_EQ(VEXOAutoBlockResetByIP("::ffff:192.0.2.7"), 0);
     EXPECT_EQ(VexoCgiIsDeniedIP(kAddress), 0);
@@ -90,9 +79,9 @@ TEST_F(AutoBlockTest, TheStoreIsBoundedAndTrustedOrAnError) {
         "WITH RECURSIVE c(x) AS (SELECT 1 UNION ALL SELECT x + 1 FROM c LIMIT 12000) INSERT INTO failures"
         " SELECT 'a' || x, 't', 1, strftime('%s') - 100, 0 FROM c");
     failTimes("192.0.2.8", 1);
-    EXPECT_EQ(store("SELECT count(*) FROM failures"), 10000);
+    EXPECT_EQ(store("SELECT count(*) FROM failures"), "10000");
     EXPECT_EQ(VexoCgiIsDeniedIP(kAddress), 1) << "counts go before denials";
-    EXPECT_EQ(store("SELECT count FROM failures WHERE address = '192.0.2.8'"), 1);
+    EXPECT_EQ(store("SELECT count FROM failures WHERE address = '192.0.2.8'"), "1");
     plantEach(file_, [] {
         EXPECT_REFUSED(VexoCgiIsDeniedIP(kAddress));
         EXPECT_REFUSED(AutoBlockFailLoginSet(kAddress, kTag));

@@ -1,9 +1,8 @@
 // Reading a database that a program writes and that anybody may have broken.
 #include "vexo/database.h"
 
-#include <sqlite3.h>
-
 #include "platform/trust.h"
+#include "support/sqlite.h"
 
 namespace {
 
@@ -14,24 +13,17 @@ class DatabaseTest : public ApplianceTest {
     void SetUp() override {
         ApplianceTest::SetUp();
         makeFolder(systemRoot() + "/usr");
-        run("CREATE TABLE l(linkID TEXT, n INTEGER, b BLOB);"
+        sql(file_,
+            "CREATE TABLE l(linkID TEXT, n INTEGER, b BLOB);"
             "INSERT INTO l VALUES('it''s', 42, NULL), ('', -1, x'4100')");
     }
-    // What a writer does, by a connection of its own; the connection.
-    sqlite3* run(const char* sql, bool close = true) {
-        sqlite3* db = nullptr;
-        EXPECT_EQ(sqlite3_open(file_.c_str(), &db), SQLITE_OK);
-        EXPECT_EQ(sqlite3_exec(db, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
-        if (close) sqlite3_close(db);
-        return db;
-    }
     // The code of a failed question, 0 for one whose first field is "expected".
-    static int ask(const std::string& sql, const char* expected = nullptr) {
+    static int ask(const std::string& question, const char* expected = nullptr) {
         PVEXODB db = VEXODBConnect(kFile);
         PVEXODBRESULT result = nullptr;
-        const bool done = db != nullptr && VEXODBExecute(db, sql.c_str(), &result) == 0;
+        const bool done = db != nullptr && VEXODBExecute(db, question.c_str(), &result) == 0;
         EXPECT_EQ(result != nullptr, done);
-        EXPECT_TRUE(db == nullptr || (*VEXODBErrorGet(db) == '\0') == done) << sql.substr(0, 80);
+        EXPECT_TRUE(db == nullptr || (*VEXODBErrorGet(db) == '\0') == done) << question.substr(0, 80);
         VEXODBClose(db);
         if (!done) return VLIBCErrGet();
         int row = 0;
@@ -40,12 +32,12 @@ class DatabaseTest : public ApplianceTest {
         VEXODBFreeResult(result);
         return 0;
     }
-    // A child that runs `sql` and is killed after `during`.
-    void whileWriting(const char* sql, const std::function<void()>& during) {
+    // A child that executes this and is killed after `during`.
+    void whileWriting(const char* statements, const std::function<void()>& during) {
         const std::string flag = systemRoot() + "/usr/ready";
         const pid_t child = fork();
         if (child == 0) {
-            run(sql, false);
+            sql(file_, statements, true);
             writeFile(flag, "");
             pause();
         }
@@ -82,18 +74,18 @@ TEST_F(DatabaseTest, RowsOutliveTheConnection) {
 }
 
 TEST_F(DatabaseTest, OnlyReadingAndNotForEver) {
-    run("CREATE VIEW v AS SELECT load_extension('x') AS a");
+    sql(file_, "CREATE VIEW v AS SELECT load_extension('x') AS a");
     const std::string before = readFile(file_);
     const std::string copy = systemRoot() + "/usr/copy.db";
     const std::string count = "WITH RECURSIVE c(x) AS (SELECT 1 UNION ALL SELECT x + 1 FROM c) SELECT ";
-    for (const auto& [sql, code] : Rows<std::string, int>{
+    for (const auto& [question, code] : Rows<std::string, int>{
              row("INSERT INTO l VALUES('a', 2, 3)", VEXO_ERR_GENERAL), row("DROP TABLE l", VEXO_ERR_GENERAL),
              row("ATTACH '" + copy + "' AS c", VEXO_ERR_GENERAL), row("VACUUM INTO '" + copy + "'", VEXO_ERR_GENERAL),
              row("SELECT nothing FROM l", VEXO_ERR_GENERAL), row("SELECT a FROM v", VEXO_ERR_GENERAL),
              row(count + "hex(zeroblob(1000000)) FROM c", VEXO_ERR_GENERAL),
              row("SELECT n FROM l; SELECT n FROM l", VEXO_ERR_PARAMETER), row("", VEXO_ERR_PARAMETER),
              row("SELECT n FROM l WHERE linkID = '" + std::string(4 << 20, '\'') + "'", 0)})
-        EXPECT_EQ(ask(sql), code) << sql.substr(0, 80);
+        EXPECT_EQ(ask(question), code) << question.substr(0, 80);
     EXPECT_EQ(ask(count + "count(*) FROM c"), VEXO_ERR_GENERAL) << "after its time";
     EXPECT_TRUE(readFile(file_) == before);
     EXPECT_FALSE(fs::exists(copy));
@@ -110,7 +102,8 @@ TEST_F(DatabaseTest, MissingBrokenAndPlantedFiles) {
 }
 
 TEST_F(DatabaseTest, AWriterThatHoldsItAndOneThatDied) {
-    run("WITH RECURSIVE c(x) AS (SELECT 1 UNION ALL SELECT x + 1 FROM c LIMIT 5000)"
+    sql(file_,
+        "WITH RECURSIVE c(x) AS (SELECT 1 UNION ALL SELECT x + 1 FROM c LIMIT 5000)"
         "INSERT INTO l SELECT hex(randomblob(100)), x, NULL FROM c");
     whileWriting("BEGIN EXCLUSIVE", [&] { EXPECT_EQ(ask("SELECT n FROM l"), VEXO_ERR_GENERAL) << "after its time"; });
     // A tiny cache makes the change spill into the file; the killed writer's journal stays behind.

@@ -22,11 +22,8 @@ class LineFile : public ApplianceTest {
 TEST_F(LineFile, AKeyIsAWholeFieldOfALine) {
     using namespace std::string_literals;
     writeFile(file_, "10.0.0.1,alice,AB,1\nnul\0,CD\n\n,,AB2\r\n10.0.0.2,bob,AB\r\nlast;EF"s, 0600);
-    for (const auto& [key, separators, size, expected, text] : Rows<const char*, const char*, int, int, const char*>{
-             row("AB", ",", 64, 1, "10.0.0.1,alice,AB,1"), row("AB2", ",", 64, 1, ",,AB2"),
-             row("bob", ",", 5, 1, "10.0"), row("A", ",", 64, 0, ""), row("EF", ",;", 64, 1, "last;EF"),
-             row("last;EF", "", 64, 1, "last;EF"), row("CD", ",", 64, 0, ""), row("10.0.0.1,alice,AB", ",", 64, 0, ""),
-             row("", ",", 64, -1, "?")}) {
+    for (const auto& [key, separators, size, expected, text] :
+         rowsOf<const char*, const char*, int, int, const char*>("platform/found_lines")) {
         char line[64] = "?";
         EXPECT_EQ(VLIBCFileGetLine(kFile, key, line, size, separators), expected) << key;
         EXPECT_STREQ(line, text) << key;

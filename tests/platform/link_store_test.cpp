@@ -1,11 +1,9 @@
 // The link database: whole before it has its name, trusted or not used.
 #include "vexo/link_store.h"
 
-#include "vexo/link_seat.h"
-
-#include <sqlite3.h>
-
 #include "platform/trust.h"
+#include "support/sqlite.h"
+#include "vexo/link_seat.h"
 
 namespace {
 
@@ -66,18 +64,12 @@ TEST_F(LinkStoreTest, AFirstLinkThatFailsLeavesNothingBroken) {
 
 TEST_F(LinkStoreTest, ADatabaseOfLinksAloneIsAddedTo) {
     const std::string id = add("/photo");
-    const auto execute = [this](const char* sql) {
-        sqlite3* database = nullptr;
-        EXPECT_EQ(sqlite3_open(file_.c_str(), &database), SQLITE_OK);
-        EXPECT_EQ(sqlite3_exec(database, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sql;
-        sqlite3_close(database);
-    };
-    execute("DROP TABLE linkMore; DROP TABLE linkTaken; PRAGMA user_version = 0");
+    sql(file_, "DROP TABLE linkMore; DROP TABLE linkTaken; PRAGMA user_version = 0");
     LinkTaking taking = LinkTaking::kGone;
     EXPECT_EQ(countAtOnce(4, [&] { return VEXO::LinkStore().take(id, "a", "b", false, taking); }), 4);
     std::optional<VEXO::Link> link;
     EXPECT_TRUE(VEXO::LinkStore().find(id, link) && link && link->used == 4);
-    execute("PRAGMA user_version = 99");
+    sql(file_, "PRAGMA user_version = 99");
     EXPECT_EQ(paths(), "failed") << "of a newer version";
 }
 

@@ -109,10 +109,7 @@ TEST_F(MountTest, VolumesAndTheirKinds) {
 }
 
 TEST_F(MountTest, HiddenNamesAndSmallTexts) {
-    for (const auto& [name, file, folder] :
-         Rows<const char*, int, int>{row(".", 1, 0), row("..", 1, 0), row("@tmp", 1, 0), row("@vexoea", 1, 1),
-                                     row("@vexoea2", 0, 0), row("@Tmp", 0, 0), row("...", 0, 0), row(".x", 0, 0),
-                                     row("", 0, 0), row(".vexo-part-", 1, 0), row(".vexo-part", 0, 0)}) {
+    for (const auto& [name, file, folder] : rowsOf<const char*, int, int>("platform/hidden_names")) {
         EXPECT_EQ(VEXOEAIsHiddenFile(name), file) << name;
         EXPECT_EQ(VEXOEAIsHiddenDir(name), folder) << name;
     }

@@ -5,9 +5,7 @@
 
 namespace {
 
-class ProcessTest : public ApplianceTest {
- protected:
-};
+using ProcessTest = ApplianceTest;
 
 TEST_F(ProcessTest, TheProgramSeesItsArgumentsAndNothingOfThisProcess) {
     const std::string report = photo_ + "/report";

@@ -8,13 +8,7 @@
 namespace {
 
 TEST(SettingsFormat, Lines) {
-    using namespace std::string_view_literals;
-    for (const auto& [line, key, value] : Rows<std::string_view, std::string_view, std::string_view>{
-             row("a=b"sv, "a"sv, "b"sv), row(" a\t= \"b c\" \r"sv, "a"sv, "b c"sv), row("a= b c "sv, "a"sv, "b c"sv),
-             row("a="sv, "a"sv, ""sv), row("a=\" b \""sv, "a"sv, " b "sv), row("a=\"b\" # why"sv, "a"sv, "b"sv),
-             row("a=\"say \"hi\"\""sv, "a"sv, "say \"hi\""sv), row("a=\"torn"sv, "a"sv, "\"torn"sv),
-             row("a=\""sv, "a"sv, "\""sv), row("a b=c=d"sv, "a b"sv, "c=d"sv), row("just text"sv, ""sv, ""sv),
-             row("=b"sv, ""sv, ""sv), row("# a=b"sv, ""sv, ""sv), row("a=b\0c"sv, ""sv, ""sv)}) {
+    for (const auto& [line, key, value] : rowsOf<std::string, std::string, std::string>("platform/setting_lines")) {
         const auto setting = vexo::parseSettingLine(line, "=");
         EXPECT_EQ(setting.has_value(), !key.empty()) << line;
         EXPECT_TRUE(!setting || (setting->key == key && setting->value == value)) << line;

@@ -107,19 +107,9 @@ TEST_F(ShareTest, RightsFromLists) {
     // More pairs of entries than are written out.
     std::string longLists = "valid users = bob @Editors\nwrite list = bob";
     for (int i = 0; i < 2100; ++i) longLists += " nobody" + std::to_string(i);
-    longLists += "\n";
-    for (const auto& [options, alice, bob, erin] : Rows<const char*, int, int, int>{
-             row("", 1, 1, 1), row("read only = no\n", 2, 2, 2),
-             row("valid users = ALICE, @Editors\nwrite list = bob, erin\n", 1, 0, 2),
-             row("valid users = +Editors bob\nread list = alice @Editors\nread only = no\n", 0, 2, 1),
-             row("valid users = @users\nread list = @users\nwrite list = @Editors\nread only = no\n", 1, 1, 2),
-             row("read list = @Editors alice\nread only = no\nwrite list = alice\n", 2, 2, 1),
-             row("valid users = &Editors\ninvalid users = alice\n", 0, 0, 0),
-             row("invalid users = bob @none\nwrite list = bob @Editors\nread only = yes\n", 1, 0, 2),
-             row("valid users = \"\"\nread only = no\n", 0, 0, 0), row("valid users = bob %S\n", 0, 1, 0),
-             row("valid users = @editors *\n", 0, 0, 0), row(longLists.c_str(), 0, 2, 1),
-             row("write list = erin\nread list = erin alice\nvalid users = @users\ninvalid users = @\"no such\"\n", 1,
-                 1, 2)}) {
+    auto rows = rowsOf<std::string, int, int, int>("platform/share_rights");
+    rows.emplace_back(longLists + "\n", 0, 2, 1);
+    for (const auto& [options, alice, bob, erin] : rows) {
         addShare("music", options);
         SDK::Share* share = SDK::Share::LoadShare("music");
         ASSERT_NE(share, nullptr);

@@ -6,9 +6,7 @@
 
 namespace {
 
-class StatTest : public ApplianceTest {
- protected:
-};
+using StatTest = ApplianceTest;
 
 TEST_F(StatTest, RecordsWhatLstatTells) {
     const std::string file = photo_ + "/a";

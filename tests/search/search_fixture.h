@@ -130,11 +130,7 @@ class Indexer : public OrvDirectoryWalkerCallBack {
     FileSearch::FileRecord record_;
 };
 
-// The platform keeps databases open for the process, so what uses them runs in one of its own.
-inline void inOwnProcess(const std::function<void()>& body) {
-    inChild([&] { body(); });
-}
-
+// The platform keeps databases open for the process: what uses them runs in one of its own (inChild).
 class SearchFixture : public ApplianceTest {
  protected:
     void SetUp() override {

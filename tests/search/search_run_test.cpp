@@ -32,7 +32,7 @@ class Probe : public FindComp {
 TEST_F(SearchRunTest, WhatInitRefuses) {
     makeFolder(shareRoot("photo") + "/#recycle");
     makeFolder(shareRoot("homes") + "/alice/sub");
-    inOwnProcess([&] {
+    inChild([&] {
         FindTypeComp files(false);
         const std::vector<FindComp*> all{&files}, none;
         addUser("eve", 20009, kUsersGid);
@@ -104,7 +104,7 @@ TEST_F(SearchRunTest, WhatAWalkMeets) {
          }) {
         SCOPED_TRACE(error);
         makeFolder(folder, 0755);
-        inOwnProcess([&, expected = error, change = change] {
+        inChild([&, expected = error, change = change] {
             EXPECT_EQ(OrvLibUGIDSet(nullptr, "bob"), 0);
             OneSearch run("bob", {"/photo/up/chosen"}, all);
             EXPECT_TRUE(run.ready && seteuid(0) == 0);
@@ -122,7 +122,7 @@ TEST_F(SearchRunTest, WhatAWalkMeets) {
 
     // Without a flag the walk ends, as failed, with its first entry; a failing index fails the search.
     for (const char* name : {"/a", "/b"}) writeFile(shareRoot("photo") + name, "");
-    inOwnProcess([&] {
+    inChild([&] {
         OneSearch run("alice", {"/photo"}, all, false);
         EXPECT_FALSE(run.walker.Walk({}));
         EXPECT_EQ(VLIBCErrGet(), VEXO_ERR_PATH);
@@ -142,7 +142,7 @@ TEST_F(SearchRunTest, ManyFoldersTakeFewDescriptors) {
         folders.push_back("/photo/" + std::to_string(i));
         writeFile(shareRoot("photo") + "/" + std::to_string(i) + "/f", "");
     }
-    inOwnProcess([&] {
+    inChild([&] {
         const int before = openDescriptors();
         int most = 0;
         Probe probe([&](int) { most = std::max(most, openDescriptors()); });
@@ -157,7 +157,7 @@ TEST_F(SearchRunTest, CancelLeavesTheResultsSoFar) {
     for (const char* name : {"/a", "/b/c", "/d"}) writeFile(shareRoot("photo") + name, "");
     for (const char* name : {"/a", "/b"}) writeFile(shareRoot("docs") + name, "");
     // 1 ends the walk at once; any other value ends the search behind the folder that is being walked.
-    inOwnProcess([&] {
+    inChild([&] {
         for (const auto& [raisedAt, value, seen] : Rows<int, int, int>{
                  row(0, 1, 0), row(0, 7, 0), row(1, 1, 1), row(1, 2, 2), row(3, 2, 3), row(4, 1, 4), row(4, 2, 7)}) {
             SCOPED_TRACE(std::to_string(raisedAt) + ":" + std::to_string(value));
@@ -179,7 +179,7 @@ TEST_F(SearchRunTest, CancelLeavesTheResultsSoFar) {
 
 TEST_F(SearchRunTest, LostRecordsAreToldAtTheEnd) {
     for (const char* name : {"/a", "/b", "/c"}) writeFile(shareRoot("photo") + name, "");
-    inOwnProcess([&] {
+    inChild([&] {
         Probe probe([](int) { VLIBCErrSetEx(VEXO_ERR_MISSING, "", 0); });  // as what vanishes during a walk
         for (const auto& [call, code, left] :
              Rows<const char*, int, size_t>{{"FILEIDXOutputDBInsert", VEXO_ERR_NO_SPACE, 2},
@@ -206,7 +206,7 @@ TEST_F(SearchRunTest, EveryFaultOfThePlatform) {
     SKIP_WITHOUT_ROOT();
     for (const char* name : {"/a", "/b/c", "/d"}) writeFile(shareRoot("photo") + name, "");
     writeFile(shareRoot("docs") + "/e", "");
-    inOwnProcess([&] {
+    inChild([&] {
         buildIndex({"docs"});
         const Query query{{"/photo", "/docs", "/home"}, {{0, nullptr, "*"}, {8, "less", "100"}, {7, "since", "1"}}};
         const Found all = search("alice", query);

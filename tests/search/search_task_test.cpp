@@ -19,18 +19,9 @@ class SearchTaskTest : public ApplianceTest {
 
 TEST_F(SearchTaskTest, NamesThatLeadElsewhereNameNothing) {
     const std::string longName(256, 'n'), longVolume = "/" + std::string(4000, 'v');
-    const char* const cases[][4] = {
-        {"/v", "DOM\\bob", "...", "/v/@tmp/orvel/PXSearch/DOM\\bob/..."},
-        {"/v", "bob", "", ""},
-        {"/v", "bob", "..", ""},
-        {"/v", "bob", "../eve/1", ""},
-        {"/v", "bob", nullptr, ""},
-        {"/v", ".", "1", ""},
-        {"-p", "bob", "1", ""},
-        {nullptr, "bob", "1", ""},
-        {longVolume.c_str(), "bob", longName.c_str(), ""},
-    };
-    for (const auto& [volume, owner, id, path] : cases) {
+    auto rows = rowsOf<const char*, const char*, const char*, const char*>("search/task_names");
+    rows.emplace_back(longVolume.c_str(), "bob", longName.c_str(), "");
+    for (const auto& [volume, owner, id, path] : rows) {
         EXPECT_EQ(OrvSearchDBTask::getDBTaskFilePath(volume, owner, id), path);
         EXPECT_FALSE(OrvSearchDBTask::checkDBTaskExists(volume, owner, id)) << path;
     }

@@ -51,7 +51,7 @@ class SearchUpdateTest : public SearchFixture {
     }
     // A search whose results stay on screen.
     void onScreen(const std::function<void()>& body) {
-        inOwnProcess([&] {
+        inChild([&] {
             const Criteria criteria(kEverything.asks);
             OneSearch run("alice", kEverything.folders, criteria.all);
             EXPECT_TRUE(run.walker.Walk({}));

@@ -53,7 +53,7 @@ std::vector<Query> queries() {
 
 TEST_F(SearchWalkerTest, WalkAndIndexAgree) {
     SKIP_WITHOUT_ROOT();
-    inOwnProcess([&] {
+    inChild([&] {
         makeTree();
         const std::vector<Query> all = queries();
         std::vector<Found> walked;
@@ -94,7 +94,7 @@ TEST_F(SearchWalkerTest, WalkAndIndexAgree) {
 
 TEST_F(SearchWalkerTest, RowsSayWhatTheFilesAre) {
     SKIP_WITHOUT_ROOT();
-    inOwnProcess([&] {
+    inChild([&] {
         const std::string root = shareRoot("photo");
         makeFile(root + "/2012/.a.b.tar", 7, kAliceUid, kAdminGid, 1234567890);
         makeFile(root + "/noext", 5, 0, 54321);
@@ -128,7 +128,7 @@ TEST_F(SearchWalkerTest, NobodySeesMoreThanAWalkWouldShow) {
     makeFile(shareRoot("homes") + "/bob/f.txt");
     chmod((shareRoot("homes") + "/alice").c_str(), 0700);
     EXPECT_EQ(chown((shareRoot("homes") + "/bob").c_str(), kBobUid, kUsersGid), 0);
-    inOwnProcess([&] { buildIndex({"photo", "homes"}); });
+    inChild([&] { buildIndex({"photo", "homes"}); });
     for (const auto& [path, mode] : folders) chmod(path.c_str(), mode);
     fs::rename(photo_ + "/swapped", photo_ + "/open/elsewhere");
     ASSERT_EQ(symlink("open/elsewhere", (photo_ + "/swapped").c_str()), 0);
@@ -139,7 +139,8 @@ TEST_F(SearchWalkerTest, NobodySeesMoreThanAWalkWouldShow) {
     for (const bool indexed : {true, false}) {
         for (const auto& [user, chosen, visible] : cases) {
             SCOPED_TRACE(std::string(indexed ? "index " : "walk ") + user + chosen.back());
-            inOwnProcess([&, user = user, folders = chosen, seen = visible]() mutable {
+            inChild([&, user = user, folders = chosen, visible = visible] {
+                Texts seen = visible;
                 // As a request of this user: real ids root's, effective ones the user's.
                 EXPECT_EQ(OrvLibUGIDSet(nullptr, user), 0);
                 // What the index does not know: a folder that came after it was built.
@@ -149,7 +150,7 @@ TEST_F(SearchWalkerTest, NobodySeesMoreThanAWalkWouldShow) {
                 EXPECT_EQ(geteuid() == 0, user == std::string("carol"));
             });
         }
-        inOwnProcess([&] {
+        inChild([&] {
             EXPECT_EQ(OrvLibUGIDSet(nullptr, "bob"), 0);
             EXPECT_FALSE(search("carol", {{"/photo"}, files}).contains("photo/closed/f.txt"))
                 << "an administrator's name opens nothing";

@@ -1,10 +1,9 @@
 // A visitor's way: the link's row, the log-in, the cookie, the page.
 #include "orvel/sharing_link.h"
 
-#include <sqlite3.h>
-
 #include "sharing/link_lookup.h"
 #include "sharing/visitor_fixture.h"
+#include "support/sqlite.h"
 #include "vexo/auto_block.h"
 
 using OrvelLogin::FolderSharingLoginManager;
@@ -18,15 +17,9 @@ class SharingLinkTest : public VisitorTest {
     void SetUp() override {
         VisitorTest::SetUp();
         makeFolder(systemRoot() + "/var/lib/vexo");
+        makeFolder(fs::path(database()).parent_path());
     }
     static std::string database() { return systemRoot() + "/usr/vexo/etc/pexlander/pxsharing.db"; }
-    static void sql(const std::string& text) {
-        makeFolder(fs::path(database()).parent_path());
-        sqlite3* db = nullptr;
-        ASSERT_EQ(sqlite3_open(database().c_str(), &db), SQLITE_OK);
-        EXPECT_EQ(sqlite3_exec(db, text.c_str(), nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
-        sqlite3_close(db);
-    }
     static std::string pathOf(const std::string& link) {
         setenv("HTTP_FOLDER_SHARING", link.c_str(), 1);
         VEXO::WebCGI cgi;
@@ -46,27 +39,19 @@ TEST_F(SharingLinkTest, TheRowOfALink) {
     const auto insert = [](const std::string& id, const std::string& values) {
         return "INSERT INTO sharingLinks VALUES('" + id + "'," + values + ");";
     };
-    sql("CREATE TABLE sharingLinks(linkID TEXT, uid TEXT, filepath TEXT, filename TEXT, password TEXT, AvailDate TEXT, "
+    sql(database(),
+        "CREATE TABLE sharingLinks(linkID TEXT, uid TEXT, filepath TEXT, filename TEXT, password TEXT, AvailDate TEXT, "
         "ExpDate TEXT);" +
-        insert("open", "'alice','/photo','f','p','0','0'") + insert("it''s \"", "'alice','/quoted','f','p','0','0'") +
-        insert("future", "'alice','/photo','f','p','" + std::to_string(now + 1000) + "','99999999999'") +
-        insert("noUser", "NULL,'/photo','f','p','0','0'") + insert("noPath", "'alice',NULL,'f','p','0','0'") +
-        insert("noBegin", "'alice','/photo','f','p',NULL,'0'") + insert("noEnd", "'alice','/photo','f','p','0',NULL") +
-        insert("nothing", "'alice','/photo','f','p',NULL,'10'"));
-    const std::string end = "orvellogin:# Sharing download DBquery failed";
-    const std::string outside = "orvellogin:# sharing link out of valid duration";
-    for (const auto& [link, path, log] : Rows<std::string, std::string, Texts>{
-             {"open", "/photo", {}},
-             {"it's \"", "/quoted", {}},
-             {"future", "/photo", {outside, end}},  // returned all the same
-             {"noUser", "", {"orvellogin:# faild to fetch uid", end}},
-             {"noPath", "", {}},
-             {"noBegin", "/photo", {"orvellogin:# faild to fetch AvailDate", end}},  // an end of 0 does not mend it
-             {"noEnd", "/photo", {"orvellogin:# ExpDate", end}},
-             {"nothing", "/photo", {"orvellogin:# faild to fetch AvailDate", outside, end}},
-             {"' OR 1 --", "", {"orvellogin:# faild to fetch query result", end}},
-         }) {
+            insert("open", "'alice','/photo','f','p','0','0'") +
+            insert("it''s \"", "'alice','/quoted','f','p','0','0'") +
+            insert("future", "'alice','/photo','f','p','" + std::to_string(now + 1000) + "','99999999999'") +
+            insert("noUser", "NULL,'/photo','f','p','0','0'") + insert("noPath", "'alice',NULL,'f','p','0','0'") +
+            insert("noBegin", "'alice','/photo','f','p',NULL,'0'") +
+            insert("noEnd", "'alice','/photo','f','p','0',NULL") +
+            insert("nothing", "'alice','/photo','f','p',NULL,'10'"));
+    for (auto [link, path, log] : rowsOf<std::string, std::string, Texts>("sharing/rows_of_links")) {
         EXPECT_EQ(pathOf(link), path) << link;
+        for (std::string& text : log) text.insert(0, "orvellogin:# ");
         EXPECT_EQ(takeLogTexts(), log) << link;
     }
 
@@ -97,7 +82,7 @@ TEST_F(SharingLinkTest, DatabasesThatCannotBeAsked) {
                "not a database)",
                unconnected[1], unconnected[2]}));
     fs::remove(database());
-    sql("CREATE TABLE sharingLinks(linkID TEXT)");
+    sql(database(), "CREATE TABLE sharingLinks(linkID TEXT)");
     EXPECT_EQ(orvel::sharedPathOf(std::string(2 << 20, '\'')), "");
     EXPECT_EQ(takeLogTexts(), (Texts{"orvellogin:# faild to fetch query result", unconnected[2]}));
 }

@@ -17,12 +17,10 @@ class ExternalHost : public ApplianceTest {};
 
 TEST(HostHeader, Table) {
     const std::string longest(4095, 'h');
-    for (const auto& [text, host, port] : Rows<std::string, std::string, std::string>{
-             row("box", "box", ""), row("box:5000/x:1", "box", "5000"), row("box/x:1", "box", ""),
-             row("box:", "box", ""), row("box:1:2", "box", "1:2"), row(":80", "", "80"),
-             row("[fe80::1]:5000", "[fe80::1]", "5000"), row("[fe80::1]x:80", "[fe80::1]", ""),
-             row("[a/b]:80/", "[a/b]", "80"), row("[fe80::1", "[fe80::1", ""),
-             row(longest + "xx:" + longest + "yy", longest, longest)}) {
+    Rows<std::string, std::string, std::string> rows =
+        rowsOf<std::string, std::string, std::string>("util/host_headers");
+    rows.emplace_back(longest + "xx:" + longest + "yy", longest, longest);
+    for (const auto& [text, host, port] : rows) {
         const auto split = orvel::splitHostHeader(text.c_str());
         EXPECT_EQ(split.host, host) << text;
         EXPECT_EQ(split.port, port) << text;
@@ -49,20 +47,10 @@ TEST_F(ExternalHost, TheConfiguredHostAndPortOrTheRequests) {
 
 TEST_F(ExternalHost, TheDynamicNameIsUsedWhereAllOfItIsOn) {
     writeRootFile("/etc/vexo/ddns.conf", "[acme]\nhostname=\"me.acme.example\"\n");
-    const std::string supported = "supportddns=\"yes\"\n", on = "ddns_update=\"YES\"\n",
-                      select = "ddns_select=\"acme\"\n";
-    for (const auto& [defaults, settings, host] : Rows<std::string, std::string, const char*>{
-             {supported, on + select, "me.acme.example"},
-             {supported, on + select + "external_host_ip=\"nas.example.org\"\n", "nas.example.org"},
-             {"", on + select, "box"},
-             {"supportddns=\"Yes\"\n", on + select, "box"},  // this one is compared exactly
-             {supported, "ddns_update=\"yesyesyes\"\n" + select, "box"},
-             {supported, select, "box"},
-             {supported, on, "box"},
-             {supported, on + "ddns_select=\"\"\n", "box"}}) {
+    for (const auto& [defaults, settings, host] : rowsOf<std::string, std::string, std::string>("util/dynamic_names")) {
         writeRootFile("/etc.defaults/vexoinfo.conf", defaults);
         writeRootFile("/etc/vexoinfo.conf", settings);
-        EXPECT_EQ(address("box:5000"), "http://" + std::string(host) + ":5000") << defaults << settings;
+        EXPECT_EQ(address("box:5000"), "http://" + host + ":5000") << defaults << settings;
     }
 }
 

@@ -25,12 +25,8 @@ std::string replaceTwo(const char* source, const char* s1, const char* r1, const
 }
 
 TEST_F(TextReplace, One) {
-    // At each occurrence the whole text, the replacement and what follows are written, as far as the result's length.
-    for (const auto& [source, search, replacement, expected] : Rows<const char*, const char*, const char*, const char*>{
-             row("abc", "x", "y", "0 abc"), row("abc", "b", "xy", "1 abcx"), row("a%s%n", "%s", "%d%d", "1 a%s%n%d"),
-             row("abab", "ab", "b", "1 abab"), row("aaa", "a", "ba", "1 aaabaa"), row("aba", "ab", "aab", "1 abaa"),
-             row("bbbb", "bb", "b", "1 bbbb"), row("aab", "a", "aaa", "1 aabaaaa"),
-             row("a%b%", "%", "ab%", "1 a%b%ab%b"), row("aaab", "ab", "aaaab", "1 aaabaaa")})
+    for (const auto& [source, search, replacement, expected] :
+         rowsOf<const char*, const char*, const char*, const char*>("util/one_replaced"))
         EXPECT_EQ(replaceOne(source, search, replacement), expected);
     for (const char* none : {"", static_cast<const char*>(nullptr)}) {
         EXPECT_EQ(replaceOne(none, "a", "b"), "-1 (null)");
