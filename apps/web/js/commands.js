@@ -6,7 +6,7 @@ import { Choice } from "./choice.js";
 import { loaded } from "./dialogs.js";
 import { isInBin, isOffline, isReadOnlyShare, mayBeText } from "./entries.js";
 import { download } from "./download.js";
-import { copyPath, newFolder, newText, rename, showProperties, showSpaceOf } from "./operations.js";
+import { copyPath, newFolder, newText, rename, showSpaceOf } from "./operations.js";
 import { isDeleted, isSearch, parentOf } from "./path.js";
 import { editPath } from "./pathbar.js";
 import { preview } from "./preview.js";
@@ -147,7 +147,7 @@ addCommand({
   group: "info",
   when: ({ count, folder, search }) => count > 0 || (folder && !search),
   run: async ({ single, count }) => {
-    if (single || count === 0) return showProperties(single ?? browser.id);
+    if (single || count === 0) return (await loaded(import("./properties.js")))?.showProperties(single ?? browser.id);
     const sizes = await loaded(import("./sizes.js"));
     return sizes?.showMany(await chosenItems());
   },

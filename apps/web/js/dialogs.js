@@ -124,13 +124,8 @@ export function confirm({ title, text, action, kind = "primary" }) {
   });
 }
 
-let onWhy = () => {};
-export function setWhy(handler) {
-  onWhy = handler;
-}
-
-export function showWhyOf(id) {
-  onWhy(id);
+export async function showWhyOf(id) {
+  (await loaded(import("./why.js")))?.showWhy(id);
 }
 
 const rack = document.getElementById("toasts");
@@ -190,6 +185,6 @@ export function loaded(module) {
 // `id` is what the failure was about, for asking why.
 export function toastFailure(failure, id = null) {
   const { title, hint, why } = describe(failure);
-  const actions = why && id ? [{ label: t("why.ask"), run: () => onWhy(id) }] : [];
+  const actions = why && id ? [{ label: t("why.ask"), run: () => showWhyOf(id) }] : [];
   toast({ text: title, hint, kind: "failed", actions });
 }

@@ -21,7 +21,7 @@ import {
 } from "./browser.js";
 import { applyDensity } from "./columns.js";
 import { context, runCommand } from "./commands.js";
-import { setWhy } from "./dialogs.js";
+import { showWhyOf } from "./dialogs.js";
 import { $, h, keepFocus, loadIcons } from "./dom.js";
 import { setupDragAndDrop } from "./dragdrop.js";
 import { arrived, emit, on } from "./events.js";
@@ -58,7 +58,6 @@ import { setupToolbar } from "./toolbar.js";
 import { setupTree } from "./tree.js";
 import { chooseFiles, uploadsRunning } from "./uploads.js";
 import { View } from "./view.js";
-import { showWhy } from "./why.js";
 
 const ASK_EACH = 100;
 const LOOK_AHEAD = 400; // milliseconds of movement
@@ -127,7 +126,7 @@ function stateOf(listing) {
     if (isDeleted(id)) return failedState(listing.error, "", { retry: () => open(id), back: goUp });
     if (isSearch(id)) return failedState(listing.error, "", { retry: searchAgain, back: goUp });
     const back = parentOf(id) === "/" ? null : goUp;
-    return failedState(listing.error, undefined, { retry: () => open(id), back, why: () => showWhy(id) });
+    return failedState(listing.error, undefined, { retry: () => open(id), back, why: () => showWhyOf(id) });
   }
   if (!listing.ready || listing.total > 0) return null;
   if (isDeleted(browser.id) && browser.filter === "") return emptyBin();
@@ -257,7 +256,6 @@ async function start() {
   await Promise.all([loadStrings(), loadIcons()]);
   fillTexts();
   browser.view = new View($("view"), { onScrolled: scrolled });
-  setWhy(showWhy);
   on("shown", showPlace);
   on("listing", paintListing);
   on("selection", () => browser.listing && browser.view.listing === browser.listing && browser.view.paintSelection());

@@ -1,18 +1,12 @@
-// What is done to files at once: new folder, rename, properties.
+// What is done to files at once: new folder, new text, rename.
 
 import { post } from "./api.js";
-import { browser, refresh, shareEntry } from "./browser.js";
-import { askText, dialog, loaded, toast, toastFailure } from "./dialogs.js";
-import { h, icon, nameNode, plainName } from "./dom.js";
-import { isOffline, typeOf } from "./entries.js";
+import { browser, refresh } from "./browser.js";
+import { askText, loaded, toast } from "./dialogs.js";
 import { emit } from "./events.js";
-import { formatFullTime, formatMode, formatSize } from "./format.js";
-import { iconOf } from "./icons.js";
 import { askInPlace } from "./in_place.js";
-import { childOf, decode, encodeName, isDeleted, isSearch, nameOf, parentOf, splitExtension, taskOf } from "./path.js";
-import { entryAt } from "./sources.js";
+import { childOf, decode, encodeName, isDeleted, isSearch, nameOf, splitExtension, taskOf } from "./path.js";
 import { t } from "./strings.js";
-import { whyNode } from "./why.js";
 
 export function checkName(text) {
   if (text === "") return t("name.empty");
@@ -128,68 +122,4 @@ export async function copyText(text, said) {
 
 export async function showSpaceOf(id) {
   return (await loaded(import("./space.js")))?.showSpace(id);
-}
-
-// What a folder holds, counted while its properties are shown.
-function contentNode({ id }) {
-  const more = h("button.button.outlined", { type: "button", onclick: () => showSpaceOf(id) }, icon("space"), t("command.space"));
-  const node = h("div", {});
-  loaded(import("./sizes.js")).then((sizes) => sizes && node.replaceWith(sizes.sizesNode([{ id }], { without: 1, more: [h("p.size-actions", {}, more)] })));
-  return node;
-}
-
-// Of an entry, or of the folder with an id.
-export async function showProperties(what) {
-  let entry = what;
-  try {
-    if (typeof what === "string") entry = parentOf(what) === "/" ? shareEntry(what) : await entryAt(what);
-  } catch (failure) {
-    return toastFailure(failure, what);
-  }
-  if (!entry) return undefined;
-  const line = (key, value) => value && [h("dt", {}, t(`properties.${key}`)), h("dd", {}, value)];
-  return dialog({
-    title: t("command.properties"),
-    className: "properties",
-    fill: () => [
-      h(
-        "div.hero",
-        {},
-        icon(iconOf(entry), "file-icon"),
-        h(
-          "div.grow",
-          {},
-          h("b", {}, nameNode(entry.name)),
-          h("span.soft", {}, typeOf(entry)),
-        ),
-      ),
-      h(
-        "dl",
-        {},
-        line("path", h("code", {}, plainName(decode(entry.id)))),
-        line("size", entry.size !== null && `${formatSize(entry.size)} (${t("size.bytes", { count: entry.size })})`),
-        line("modified", formatFullTime(entry.mtime)),
-        line("created", formatFullTime(entry.time?.crtime)),
-        line("owner", entry.owner && `${entry.owner} · ${entry.group}`),
-        line("mode", entry.perm?.posix !== undefined && h("code", {}, `${formatMode(entry.perm.posix)}`)),
-        line(
-          "volume",
-          entry.volume &&
-            t("volume.free", { free: formatSize(entry.volume.freespace), total: formatSize(entry.volume.totalspace) }),
-        ),
-      ),
-      entry.isFolder && !isOffline(entry) ? contentNode(entry) : "",
-      whyNode(entry.id),
-      h(
-        "footer",
-        {},
-        h(
-          "button.button.outlined",
-          { type: "button", onclick: () => copyPath(entry.id) },
-          icon("copy"),
-          t("command.copyPath"),
-        ),
-      ),
-    ],
-  });
 }

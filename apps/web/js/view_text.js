@@ -4,6 +4,7 @@
 import { readReply, send, urlOf } from "./api.js";
 import { h, loadStyle } from "./dom.js";
 import { formatSize } from "./format.js";
+import "./later_texts.js";
 import { splitExtension } from "./path.js";
 import { t } from "./strings.js";
 import { detect, ENCODINGS } from "./text_codec.js";
