@@ -57,38 +57,21 @@ class PermissionCgi : public TaskCgi {
 };
 
 TEST_F(PermissionCgi, ChangesReachWhatTheyShallAndAreUndone) {
-    const struct {
-        const char *what, *form, *entries, *defaults;
-        const char *folder, *handsDown, *file, *program, *below;  // then
-    } rows[] = {
-        {"the folder alone", "&mode=g%2Bw,o=rX", "", "", "u::rwx,g::rwx,o::r-x", "", "u::rw-,g::r--,o::---",
-         "u::rwx,g::r-x,o::---", "u::rw-,g::r--,o::---"},
-        {"below, run where it makes sense", "&below=true&mode=g%2Bw,o=rX", "", "", "u::rwx,g::rwx,o::r-x", "",
-         "u::rw-,g::rw-,o::r--", "u::rwx,g::rwx,o::r-x", "u::rw-,g::rw-,o::r--"},
-        {"files by a rule of their own", "&below=true&mode=go=rx&file_mode=a-x,g%2Bw", "", "", "u::rwx,g::r-x,o::r-x",
-         "", "u::rw-,g::rw-,o::---", "u::rw-,g::rw-,o::---", "u::rw-,g::rw-,o::---"},
-        {"a folder that closes behind its content", "&below=true&confirm=true&mode=u-rwx,g%2Bw", "", "",
-         "u::---,g::rwx,o::---", "", "u::---,g::rw-,o::---", "u::---,g::rwx,o::---", "u::---,g::rw-,o::---"},
-        {"an entry and its mask", "&below=true", "user:bob:rwX", "", "u::rwx,u:20002:rwx,g::r-x,m::rwx,o::---", "",
-         "u::rw-,u:20002:rw-,g::r--,m::rw-,o::---", "u::rwx,u:20002:rwx,g::r-x,m::rwx,o::---",
-         "u::rw-,u:20002:rw-,g::r--,m::rw-,o::---"},
-        {"what is handed down", "", "", "user:bob:rx\nother::", "u::rwx,g::r-x,o::---",
-         "u::rwx,u:20002:r-x,g::r-x,m::r-x,o::---", "u::rw-,g::r--,o::---", "u::rwx,g::r-x,o::---",
-         "u::rw-,g::r--,o::---"},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.what);
+    for (const auto& [what, form, entries, defaults, folder, handsDown, file, program, below] :
+         rowsOf<const char*, const char*, const char*, const char*, std::string, std::string, std::string, std::string,
+                std::string>("apps/permissions_changed")) {
+        SCOPED_TRACE(what);
         lay();
         const std::string before = all();
         const Json::Value task =
-            perform("alice", permit(row.form) + encoded("entries", row.entries) + encoded("defaults", row.defaults));
+            perform("alice", permit(form) + encoded("entries", entries) + encoded("defaults", defaults));
         EXPECT_EQ(errors(task), "");
         EXPECT_EQ(task["items_done"].asInt() + task["items_skipped"].asInt(), task["items_total"].asInt());
-        EXPECT_EQ(listOf(photo_ + "/t"), row.folder);
-        EXPECT_EQ(listOf(photo_ + "/t", ACL_TYPE_DEFAULT), row.handsDown);
-        EXPECT_EQ(listOf(photo_ + "/t/f"), row.file);
-        EXPECT_EQ(listOf(photo_ + "/t/run"), row.program);
-        EXPECT_EQ(listOf(photo_ + "/t/in/g"), row.below);
+        EXPECT_EQ(listOf(photo_ + "/t"), folder);
+        EXPECT_EQ(listOf(photo_ + "/t", ACL_TYPE_DEFAULT), handsDown);
+        EXPECT_EQ(listOf(photo_ + "/t/f"), file);
+        EXPECT_EQ(listOf(photo_ + "/t/run"), program);
+        EXPECT_EQ(listOf(photo_ + "/t/in/g"), below);
         EXPECT_EQ(listOf(outside() + "/victim"), "u::rw-,g::rw-,o::rw-") << "behind a link";
         EXPECT_EQ(errors(ended("alice", start("alice", "action=undo&taskid=" + task["taskid"].asString()))), "");
         EXPECT_EQ(all(), before);
@@ -98,20 +81,12 @@ TEST_F(PermissionCgi, ChangesReachWhatTheyShallAndAreUndone) {
 TEST_F(PermissionCgi, AMaskWithholdsWhatItWithheldBefore) {
     const std::string file = photo_ + "/t/f";
     const char* masked = "u::rw-,u:20002:rwx,u:20003:r--,g::rw-,m::r--,o::---";
-    const struct {
-        const char *form, *entries, *then;
-    } rows[] = {{"", "group:administrators:rw", "u::rw-,u:20002:r--,u:20003:r--,g::r--,g:20101:rw-,m::rw-,o::---"},
-                {"&mode=g%2Bw", "", "u::rw-,u:20002:r--,u:20003:r--,g::rw-,m::rw-,o::---"},
-                {"&mode=u%2Bx,o=r", "", "u::rwx,u:20002:rwx,u:20003:r--,g::rw-,m::r--,o::r--"},
-                {"", "user:carol:", "u::rw-,u:20002:r--,u:20003:---,g::r--,m::r--,o::---"},
-                {"", "user:bob\nuser:#20003", "u::rw-,g::r--,o::---"}};
-    for (const auto& row : rows) {
-        SCOPED_TRACE(std::string(row.form) + row.entries);
+    for (const auto& [form, entries, then] : rowsOf<std::string, std::string, std::string>("apps/permission_masks")) {
+        SCOPED_TRACE(form + entries);
         setList(file, masked);
-        const Json::Value task =
-            perform("alice", "action=permit&path=/photo/t/f" + std::string(row.form) + encoded("entries", row.entries));
+        const Json::Value task = perform("alice", "action=permit&path=/photo/t/f" + form + encoded("entries", entries));
         EXPECT_EQ(errors(task), "");
-        EXPECT_EQ(listOf(file), row.then);
+        EXPECT_EQ(listOf(file), then);
     }
 }
 
@@ -122,48 +97,18 @@ TEST_F(PermissionCgi, WhatIsWrongOrForbiddenChangesNothing) {
     EXPECT_EQ(chown((photo_ + "/t/run").c_str(), kAliceUid, kAdminGid), 0);
     EXPECT_EQ(chmod((photo_ + "/t/in").c_str(), 02750), 0);
     const std::string before = all();
-    const struct {
-        const char *user, *form;
-        int code;              // of the reply,
-        const char* failures;  // or of the task
-        const char* warning = "";
-    } rows[] = {
-        {"alice", "&path=/photo/t", 400, ""},
-        {"alice", "&path=/photo/t&mode=u%2Bq", 400, ""},
-        {"alice", "&path=/photo/t&mode=755", 400, ""},
-        {"alice", "&path=/photo/t&entries=user:bob:rq", 400, ""},
-        {"alice", "&path=/photo/t&entries=mask::r", 400, ""},
-        {"alice", "&path=/photo/t&entries=user::r", 400, ""},
-        {"alice", "&path=/photo/t&entries=user:nobody-here:r", 403, ""},
-        {"alice", "&path=/photo/t&entries=group:%234294967295:r", 404, ""},
-        {"alice", "&path=/photo/t&owner=nobody-here", 403, ""},
-        {"alice", "&path=/photo/t/f&mode=u-r", 2201, "", "access"},
-        {"alice", "&path=/photo/t/f&path=/photo/t/in&mode=u-x", 2201, "", "access set_gid"},
-        {"alice", "&path=/photo/t&below=true&mode=o%2Br&file_mode=u=w", 2201, "", "access"},
-        {"alice", "&path=/photo/t/run&group=users", 2201, "", "group"},
-        {"alice", "&path=/photo/t/f&owner=bob", 2201, "", "owner"},
-        {"carol", "&path=/photo/t/f&owner=bob", 2201, "", "owner"},
-        {"alice", "&path=/photo/t/f&owner=bob&confirm=true", 0, "/photo/t/f 407\n"},
-        {"alice", "&path=/photo/t/f&group=administrators", 0, "/photo/t/f 407\n"},
-        {"alice", "&path=/photo/t/bobs&mode=o=", 0, "/photo/t/bobs 407\n"},
-        {"alice", "&path=/photo/t/bobs&entries=user:alice:rw", 0, "/photo/t/bobs 407\n"},
-        {"alice", "&path=/photo/t/link&mode=o=", 0, "/photo/t/link 2202\n"},
-        {"alice", "&path=/photo/t/way/victim&mode=o=", 0, "/photo/t/way/victim 407\n"},
-        {"alice", "&path=/photo/t/none&mode=o=", 0, "/photo/t/none 408\n"},
-        {"alice", "&path=/photo&mode=o=", 0, "/photo 400\n"},
-        {"bob", "&path=/photo/t/bobs&mode=o=", 0, "/photo/t/bobs 407\n"},  // he may only read in the share
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(std::string(row.user) + row.form);
-        const CgiReply reply = ask(row.user, std::string("action=permit") + row.form);
-        EXPECT_EQ(code(reply), row.code);
+    for (const auto& [user, form, refusal, failures, warning] :
+         rowsOf<std::string, std::string, int, std::string, std::string>("apps/permissions_refused")) {
+        SCOPED_TRACE(user + form);
+        const CgiReply reply = ask(user, "action=permit" + form);
+        EXPECT_EQ(code(reply), refusal);
         std::string warnings;
         for (const Json::Value& word : reply.json["data"]["warnings"]) {
             warnings += (warnings.empty() ? "" : " ") + word.asString();
         }
-        EXPECT_EQ(warnings, row.warning);
-        if (row.code == 0) {
-            EXPECT_EQ(errors(ended(row.user, reply.json["data"]["taskid"].asString())), row.failures);
+        EXPECT_EQ(warnings, warning);
+        if (refusal == 0) {
+            EXPECT_EQ(errors(ended(user, reply.json["data"]["taskid"].asString())), failures);
         }
         EXPECT_EQ(all(), before);
     }
@@ -303,24 +248,6 @@ TEST_F(PermissionCgi, WhoMayWhatAndWhy) {
     writeFile(photo_ + "/t/secret", "", 0600);
     give(photo_ + "/t/secret", kBobUid);
     EXPECT_EQ(chmod((photo_ + "/t/in").c_str(), 0700), 0);
-    const struct {
-        const char *asking, *path, *about;
-        int code;
-        const char* answer;  // rights, by, masked, closed
-    } rows[] = {
-        {"alice", "/photo/t/f", "user=alice", 0, "read write | owner | | "},
-        {"alice", "/photo/t/f", "user=bob", 0, "read | user | write | "},
-        {"alice", "/photo/t/f", "group=users", 0, "read | group | write | "},
-        {"alice", "/photo/t/f", "group=administrators", 0, "read | group | write enter | /photo/t"},
-        {"alice", "/photo/t/f", "user=carol", 0, "read write enter | administrator | | "},
-        {"alice", "/photo/t/in/g", "user=bob", 0, "read | group | | /photo/t/in"},
-        {"carol", "/photo/t/in/g", "user=bob", 0, "read | group | | /photo/t/in | read_only"},
-        {"alice", "/photo/t/secret", "user=bob", 407, ""},
-        {"bob", "/photo/t/in/g", "user=alice", 407, ""},
-        {"alice", "/photo/t/f", "user=nobody-here", 403, ""},
-        {"alice", "/photo/t/f", "group=nobody-here", 404, ""},
-        {"alice", "/photo/t/f", "user=bob&group=users", 400, ""},
-    };
     const auto joined = [](const Json::Value& list) {
         std::string text;
         for (const Json::Value& one : list) {
@@ -328,18 +255,18 @@ TEST_F(PermissionCgi, WhoMayWhatAndWhy) {
         }
         return text;
     };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(std::string(row.asking) + " " + row.path + " " + row.about);
-        const CgiReply reply =
-            get(PROGRAM_OPERATION, row.asking, std::string("action=access&path=") + row.path + "&" + row.about);
-        EXPECT_EQ(code(reply), row.code);
-        if (row.code != 0) continue;
+    for (const auto& [asking, path, whom, refusal, answer] :
+         rowsOf<std::string, std::string, std::string, int, std::string>("apps/rights")) {
+        SCOPED_TRACE(asking + " " + path + " " + whom);
+        const CgiReply reply = get(PROGRAM_OPERATION, asking, "action=access&path=" + path + "&" + whom);
+        EXPECT_EQ(code(reply), refusal);
+        if (refusal != 0) continue;
         const Json::Value& data = reply.json["data"];
         std::string closed = joined(data["closed"]);
         if (!closed.empty()) closed.pop_back();
         EXPECT_EQ(joined(data["rights"]) + "| " + data["by"].asString() + " | " + joined(data["masked"]) + "| " +
                       closed + (data.isMember("share") ? " | " + data["share"]["rule"].asString() : ""),
-                  row.answer);
+                  answer);
     }
 }
 

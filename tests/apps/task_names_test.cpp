@@ -47,14 +47,8 @@ TEST(OperationNames, OfArchivesLeadDownOnly) {
         EXPECT_FALSE(orvel::cgi::memberComponents(name)) << name;
     EXPECT_EQ(*orvel::cgi::memberComponents("./a//b/."), (std::vector<std::string>{"a", "b"}));
     EXPECT_EQ(*orvel::cgi::memberComponents("...\\..\\x"), (std::vector<std::string>{"...\\..\\x"}));
-    struct {
-        const char* text;
-        size_t depth;
-        bool inside;
-    } const links[] = {{"a", 0, true},        {"../a", 1, true},       {"../a", 0, false},
-                       {"../../a", 1, false}, {"", 1, false},          {"/etc", 3, false},
-                       {"a/..", 1, false},    {"../a/../b", 2, false}, {"./../b", 1, true}};
-    for (const auto& [text, depth, inside] : links) EXPECT_EQ(orvel::cgi::staysInside(text, depth), inside) << text;
+    for (const auto& [text, depth, inside] : rowsOf<const char*, size_t, bool>("apps/links_inside"))
+        EXPECT_EQ(orvel::cgi::staysInside(text, depth), inside) << text;
 }
 
 }  // namespace

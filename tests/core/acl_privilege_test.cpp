@@ -6,11 +6,8 @@ namespace {
 class AclPrivilegeTest : public ApplianceTest {};
 
 TEST_F(AclPrivilegeTest, FailuresOfThePlatform) {
-    const Rows<int, int, int, bool, bool> rows = {{0x8400, -1, 411, false, true}, {0x0600, -1, 408, false, false},
-                                                  {0xA000, -1, 408, false, true}, {0xD700, -1, 408, false, false},
-                                                  {0x0300, 0, 7, false, false},   {0xD800, 0, 7, false, false},
-                                                  {0x8100, -1, 7, true, true},    {0x1400, -1, 7, true, true}};
-    for (const auto& [platform, result, code, accessLogs, getLogs] : rows) {
+    for (const auto& [platform, result, code, accessLogs, getLogs] :
+         rowsOf<int, int, int, bool, bool>("core/acl_failures")) {
         char reason[8];
         snprintf(reason, sizeof reason, "%X", static_cast<unsigned>(platform));
         vexo::gate::reset();

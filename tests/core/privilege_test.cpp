@@ -90,11 +90,8 @@ TEST_F(PrivilegeTest, HasPrivilegeIsExact) {
 }
 
 TEST_F(PrivilegeTest, ListingAndDownloading) {
-    for (const auto& [path, user, list, download] : Rows<const char*, const char*, bool, bool>{
-             row("/photo/x", "alice", true, true), row("/photo", "bob", true, true),
-             row("/photo", "carol", false, false), row("/quiet", "bob", false, false),
-             row("/quiet", "carol", true, true), row("/view", "bob", true, false),
-             row("/mixed", "bob", false, false)}) {
+    for (const auto& [path, user, list, download] :
+         rowsOf<const char*, const char*, bool, bool>("core/listing_rights")) {
         const std::string line = std::string("orveldir:# No privilege in path ") + path;
         OrvLibSetErr(7);
         EXPECT_EQ(CheckShareListPrivilege(user, nullptr, path), list) << path << user;

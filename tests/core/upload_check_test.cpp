@@ -15,11 +15,7 @@ TEST(UploadErrors, Table) {
 }
 
 TEST_F(UploadCheckTest, CopyFailuresHaveCodesOfTheirOwn) {
-    const Rows<int, int> rows = {row(0x0300, 407), row(0x0600, 408),  row(0x0700, 408),  row(0x0800, 414),
-                                 row(0x2400, 415), row(0x2900, 416),  row(0x8400, 411),  row(0xA000, 414),
-                                 row(0xA200, 414), row(0xA300, 1805), row(0xA400, 1804), row(0xA500, 419),
-                                 row(0xC300, 412), row(0x8100, 401)};
-    for (const auto& [platformError, code] : rows) {
+    for (const auto& [platformError, code] : rowsOf<int, int>("core/copy_failures")) {
         vexo::gate::fail("VEXOFileCopy", platformError);
         announceLog("Failed to copy /a to /b, reason=[");
         EXPECT_FALSE(MoveFile("alice", "/a", "/b", nullptr));

@@ -255,15 +255,9 @@ TEST_F(ListingTest, NothingIsAskedWithoutNeedOrTwice) {
 
 TEST_F(ListingTest, ColumnsAndPages) {
     makeMixedFolder();
-    for (const auto& [key, order] : Rows<const char*, Names>{
-             {nullptr, listed(nullptr)},
-             {"name", {"Alpha.zip", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
-             {"size", {"Alpha.zip", "beta", "B.jpg", "d.TXT", "c.txt", "a"}},
-             {"mtime", {"Alpha.zip", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
-             {"atime", {"beta", "Alpha.zip", "d.TXT", "c.txt", "B.jpg", "a"}},
-             {"posix", {"beta", "Alpha.zip", "d.TXT", "c.txt", "a", "B.jpg"}},
-             {"type", {"Alpha.zip", "beta", "a", "B.jpg", "c.txt", "d.TXT"}},
-         }) {
+    auto rows = rowsOf<const char*, Names>("enum/columns");
+    rows.emplace_back(nullptr, listed(nullptr));
+    for (const auto& [key, order] : rows) {
         SCOPED_TRACE(testing::PrintToString(key));
         const Names reversed(order.rbegin(), order.rend());
         EXPECT_EQ(listed(key), order);

@@ -173,10 +173,7 @@ TEST_F(AccountTest, ExpiryIsReadAsRootAfterTheSwitch) {
 TEST_F(AccountTest, Administrators) {
     addGroup("Managers", 20180, {"bob"});
     addUser("primary", 20014, kAdminGid);
-    for (const auto& [user, group, answer] : Rows<const char*, const char*, int>{
-             row("alice", nullptr, 0), row("carol", nullptr, 1), row("primary", nullptr, 1),
-             row("nobody known", nullptr, -1), row("bob", "Managers", 1), row("carol", "Managers", 0),
-             row("carol", "no such", 0)}) {
+    for (const auto& [user, group, answer] : rowsOf<const char*, const char*, int>("platform/administrators")) {
         if (group != nullptr) setSetting("admin_group", group);
         EXPECT_EQ(VEXOGroupIsAdminGroupMem(user), answer) << user;
         EXPECT_TRUE(answer >= 0 || VLIBCErrGet() == VEXO_ERR_USER_MISSING);

@@ -157,10 +157,7 @@ TEST_F(ShareTest, RootsWithVariablesFollowTheUser) {
     addUser("..", 20032, kUsersGid);
     define("[own]\npath = /v/%U\n[all]\npath = /v/%S.%g.%u\n[dom]\npath = /%D/%U\n");
     for (const auto& [user, own, all, dom, names] :
-         Rows<const char*, const char*, const char*, const char*, const char*>{
-             row("alice", "/v/alice", "/v/all.users.alice", "", "own|all|"),
-             row("DOM\\dora", "/v/dora", "/v/all.users.DOM\\dora", "/DOM/dora", "own|all|dom|"),
-             row("..", "", "/v/all.users...", "", "all|"), row("nobody known", "", "", "", "")}) {
+         rowsOf<const char*, const char*, const char*, const char*, const char*>("platform/roots_of_users")) {
         setenv("REMOTE_USER", user, 1);
         EXPECT_EQ(rootOf("own"), own) << user;
         EXPECT_EQ(rootOf("all"), all) << user;

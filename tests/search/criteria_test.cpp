@@ -1,6 +1,6 @@
 #include "orvel/search_criteria.h"
 
-#include "support/testing.h"
+#include "search/search_fixture.h"
 
 using namespace FileSearch;
 
@@ -15,22 +15,13 @@ _tag_VEXOSTAT_ statusOf(mode_t mode, int64_t size = 0, uid_t uid = 0, gid_t gid 
     return st;
 }
 
-// The criteria that one or more fields give, deleted at the end.
-class Criteria {
- public:
-    ~Criteria() {
-        for (FindComp* one : list) delete one;
-    }
-    bool add(int field, const char* op, const char* value) {
-        return FindFactory::createFindOp(static_cast<_tag_FIND_FIELD_>(field), op, value, list);
-    }
-    bool match(const char* path, const _tag_VEXOSTAT_& st) {
-        return std::all_of(list.begin(), list.end(), [&](FindComp* one) { return (*one)(path, st); });
-    }
-    bool matchName(const char* path) { return match(path, statusOf(S_IFREG)); }
+bool match(const Criteria& criteria, const char* path, const _tag_VEXOSTAT_& st) {
+    return std::all_of(criteria.all.begin(), criteria.all.end(), [&](FindComp* one) { return (*one)(path, st); });
+}
 
-    std::vector<FindComp*> list;
-};
+bool matchName(const Criteria& criteria, const char* path) {
+    return match(criteria, path, statusOf(S_IFREG));
+}
 
 // "type.op.value", and-links in brackets behind a node, or-links behind "|".
 std::string textOf(const __tag_FI_SQL_COND* node) {
@@ -53,7 +44,7 @@ TEST_F(CriteriaTest, ArgumentsAndResultsOfEachField) {
         OrvLibSetErr(0);
         EXPECT_EQ(criteria.add(field, op, value), result);
         EXPECT_EQ(OrvLibGetErr(), code);
-        EXPECT_EQ(criteria.list.size(), added);
+        EXPECT_EQ(criteria.all.size(), added);
     }
 }
 
@@ -65,26 +56,26 @@ TEST_F(CriteriaTest, PatternsOfNames) {
         SCOPED_TRACE(value);
         Criteria criteria;
         ASSERT_TRUE(criteria.add(0, nullptr, value.c_str()));
-        EXPECT_EQ(textOf(criteria.list[0]->getFirstCond()), condition);
-        EXPECT_TRUE(criteria.matchName(matching.c_str()));
-        EXPECT_FALSE(criteria.matchName(other.c_str()));
+        EXPECT_EQ(textOf(criteria.all[0]->getFirstCond()), condition);
+        EXPECT_TRUE(matchName(criteria, matching.c_str()));
+        EXPECT_FALSE(matchName(criteria, other.c_str()));
     }
 }
 
 TEST_F(CriteriaTest, ListsAreAlternatives) {
     Criteria names;
     ASSERT_TRUE(names.add(0, nullptr, "one, \"two,three\" ,*.c"));  // a comma inside quotes splits, too
-    EXPECT_EQ(textOf(names.list[0]->getFirstCond()), "0.6.*.c|0.6.*three\"*|0.6.*\"two*|0.6.*one*");
-    EXPECT_TRUE(names.matchName("xONEx") && names.matchName("a\"two") && names.matchName("main.c"));
-    EXPECT_FALSE(names.matchName("two") || names.matchName("three"));
+    EXPECT_EQ(textOf(names.all[0]->getFirstCond()), "0.6.*.c|0.6.*three\"*|0.6.*\"two*|0.6.*one*");
+    EXPECT_TRUE(matchName(names, "xONEx") && matchName(names, "a\"two") && matchName(names, "main.c"));
+    EXPECT_FALSE(matchName(names, "two") || matchName(names, "three"));
 
     Criteria extensions;
     ASSERT_TRUE(extensions.add(2, nullptr, "jpg,png"));
-    ASSERT_EQ(extensions.list.size(), 2U);
-    EXPECT_EQ(textOf(extensions.list[0]->getFirstCond()), "6.0.0");
-    EXPECT_EQ(textOf(extensions.list[1]->getFirstCond()), "0.6.*.png|0.6.*.jpg");
-    EXPECT_TRUE(extensions.matchName("a.PNG") && extensions.matchName("a.jpg"));
-    EXPECT_FALSE(extensions.matchName("a.jpgx") || extensions.match("a.jpg", statusOf(S_IFDIR)));
+    ASSERT_EQ(extensions.all.size(), 2U);
+    EXPECT_EQ(textOf(extensions.all[0]->getFirstCond()), "6.0.0");
+    EXPECT_EQ(textOf(extensions.all[1]->getFirstCond()), "0.6.*.png|0.6.*.jpg");
+    EXPECT_TRUE(matchName(extensions, "a.PNG") && matchName(extensions, "a.jpg"));
+    EXPECT_FALSE(matchName(extensions, "a.jpgx") || match(extensions, "a.jpg", statusOf(S_IFDIR)));
 }
 
 TEST_F(CriteriaTest, ComparesTheLastComponent) {
@@ -104,9 +95,9 @@ TEST_F(CriteriaTest, SizesAndTypes) {
         SCOPED_TRACE(std::string(op) + " " + value);
         Criteria criteria;
         ASSERT_TRUE(criteria.add(8, op, value));
-        EXPECT_EQ(textOf(criteria.list[0]->getFirstCond()), condition);
-        for (const int64_t size : matching) EXPECT_TRUE(criteria.match("a", statusOf(S_IFREG, size))) << size;
-        for (const int64_t size : others) EXPECT_FALSE(criteria.match("a", statusOf(S_IFREG, size))) << size;
+        EXPECT_EQ(textOf(criteria.all[0]->getFirstCond()), condition);
+        for (const int64_t size : matching) EXPECT_TRUE(match(criteria, "a", statusOf(S_IFREG, size))) << size;
+        for (const int64_t size : others) EXPECT_FALSE(match(criteria, "a", statusOf(S_IFREG, size))) << size;
     }
     FindSizeComp small("less", 10);
     EXPECT_TRUE(small("folder", statusOf(S_IFDIR, 4096))) << "a folder counts as 0 bytes";
@@ -125,12 +116,12 @@ TEST_F(CriteriaTest, Times) {
         for (const bool before : {false, true}) {
             Criteria criteria;
             ASSERT_TRUE(criteria.add(field, before ? "Before" : "after", "1000"));
-            EXPECT_EQ(textOf(criteria.list[0]->getFirstCond()),
+            EXPECT_EQ(textOf(criteria.all[0]->getFirstCond()),
                       std::to_string(column) + (before ? ".2.1000" : ".5.1000"));
             for (const int64_t time : {999, 1000, 1001}) {
                 _tag_VEXOSTAT_ st{};
                 st.*member = time;
-                EXPECT_EQ(criteria.match("a", st), (time < 1000) == before) << field << " " << time;
+                EXPECT_EQ(match(criteria, "a", st), (time < 1000) == before) << field << " " << time;
             }
         }
     }
@@ -139,10 +130,10 @@ TEST_F(CriteriaTest, Times) {
 TEST_F(CriteriaTest, OwnersAndGroups) {
     Criteria criteria;
     ASSERT_TRUE(criteria.add(3, nullptr, "alice") && criteria.add(4, nullptr, "users"));
-    EXPECT_EQ(textOf(criteria.list[1]->getFirstCond()), "16.0.20100|18.6.users");
+    EXPECT_EQ(textOf(criteria.all[1]->getFirstCond()), "16.0.20100|18.6.users");
     for (const auto& [uid, gid, matches] : Rows<unsigned, unsigned, bool>{
              {kAliceUid, kUsersGid, true}, {kBobUid, kUsersGid, false}, {kAliceUid, kAdminGid, false}})
-        EXPECT_EQ(criteria.match("a", statusOf(S_IFREG, 0, uid, gid)), matches) << uid << " " << gid;
+        EXPECT_EQ(match(criteria, "a", statusOf(S_IFREG, 0, uid, gid)), matches) << uid << " " << gid;
     const _tag_VEXOSTAT_ unknown = statusOf(S_IFREG, 0, 0xFFFFFFFF, 0xFFFFFFFF);
     EXPECT_FALSE(FindUserComp("x", 0xFFFFFFFF)("a", unknown) || FindGroupComp(nullptr, 0xFFFFFFFF)("a", unknown));
 }
@@ -152,8 +143,8 @@ TEST_F(CriteriaTest, ChainsIntoOneTree) {
     Criteria criteria;
     EXPECT_TRUE(criteria.add(0, nullptr, "a,b") && criteria.add(3, nullptr, "alice"));
     EXPECT_TRUE(criteria.add(8, "equal", "100") && criteria.add(1, "file", nullptr));
-    for (size_t i = 0; i + 1 < criteria.list.size(); ++i) (*criteria.list[i])(criteria.list[i + 1]);
-    EXPECT_EQ(textOf(criteria.list[0]->getFirstCond()),
+    for (size_t i = 0; i + 1 < criteria.all.size(); ++i) (*criteria.all[i])(criteria.all[i + 1]);
+    EXPECT_EQ(textOf(criteria.all[0]->getFirstCond()),
               "0.6.*b*(15.0.20001|17.6.alice(7.2.105(7.5.95(6.0.0))))|0.6.*a*");
 }
 

@@ -27,11 +27,8 @@ struct Query {
 // The criteria of a query, deleted at the end.
 class Criteria {
  public:
-    explicit Criteria(const std::vector<Ask>& asks) {
-        for (const Ask& ask : asks) {
-            const auto field = static_cast<FileSearch::_tag_FIND_FIELD_>(ask.field);
-            EXPECT_TRUE(FileSearch::FindFactory::createFindOp(field, ask.op, ask.value, all));
-        }
+    explicit Criteria(const std::vector<Ask>& asks = {}) {
+        for (const Ask& ask : asks) EXPECT_TRUE(add(ask.field, ask.op, ask.value));
         for (FileSearch::FindComp* one : all) {
             if (auto* time = dynamic_cast<FileSearch::FindATimeComp*>(one)) accessTimes.push_back(time);
         }
@@ -41,6 +38,10 @@ class Criteria {
     }
     Criteria(const Criteria&) = delete;
     Criteria& operator=(const Criteria&) = delete;
+
+    bool add(int field, const char* op, const char* value) {
+        return FileSearch::FindFactory::createFindOp(static_cast<FileSearch::_tag_FIND_FIELD_>(field), op, value, all);
+    }
 
     std::vector<FileSearch::FindComp*> all;
     std::vector<FileSearch::FindATimeComp*> accessTimes;

@@ -1,7 +1,5 @@
 #include "sharing/login_record.h"
 
-#include <climits>
-
 #include "support/testing.h"
 
 using namespace orvel;
@@ -54,19 +52,9 @@ TEST(LoginRecordTest, LinesAsTheyAreReadAndWrittenBack) {
 }
 
 TEST(LoginRecordTest, NumbersAndFreshness) {
-    for (const auto& [field, wanted] : Rows<const char*, long>{
-             row("12", 12L), row(" \t+12x", 12L), row("-3", -3L), row("+-3", 0L), row("x", 0L), row("", 0L),
-             row("99999999999999999999", LONG_MAX), row("-99999999999999999999", LONG_MIN)})
+    for (const auto& [field, wanted] : rowsOf<const char*, long>("sharing/numbers"))
         EXPECT_EQ(numberOf(field), wanted) << field;
-    for (const auto& [accessTime, now, fresh] : Rows<long, long, bool>{
-             {1000, 1900, true},
-             {1000, 1901, false},
-             {0, 10, false},
-             {5000, 100, true},          // written before the machine was restarted
-             {1, 1 + (1L << 31), true},  // the difference has 32 bits and a sign
-             {1 + (1L << 32), 902, false},
-             {LONG_MAX, 100, true},
-         })
+    for (const auto& [accessTime, now, fresh] : rowsOf<long, long, bool>("sharing/fresh"))
         EXPECT_EQ(isFresh(accessTime, now, 900), fresh) << accessTime << " at " << now;
 }
 
