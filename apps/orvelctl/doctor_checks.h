@@ -40,6 +40,7 @@ void checkCertificate(Findings& findings);
 void checkOrveld(Findings& findings);
 void checkIndexes(Findings& findings);
 void checkSweep(Findings& findings);
+void checkPictures(Findings& findings);
 
 struct Check {
     const char* name;
@@ -48,9 +49,9 @@ struct Check {
 
 // A further check is a further row. The names are also the words of the command line.
 constexpr Check kChecks[] = {
-    {"kernel", checkKernel},   {"shares", checkShares}, {"mounts", checkMounts}, {"volumes", checkVolumes},
-    {"files", checkFiles},     {"log-in", checkLogIn},  {"orveld", checkOrveld}, {"certificate", checkCertificate},
-    {"indexes", checkIndexes}, {"sweep", checkSweep},
+    {"kernel", checkKernel},   {"shares", checkShares}, {"mounts", checkMounts},     {"volumes", checkVolumes},
+    {"files", checkFiles},     {"log-in", checkLogIn},  {"orveld", checkOrveld},     {"certificate", checkCertificate},
+    {"indexes", checkIndexes}, {"sweep", checkSweep},   {"pictures", checkPictures},
 };
 
 }  // namespace orvel::ctl

@@ -1,5 +1,6 @@
 // Files that come and go: uploads, conflicts, downloads, new folders, names, previews.
 import assert from "node:assert/strict";
+import { execFileSync } from "node:child_process";
 import { existsSync, readdirSync, readFileSync, writeFileSync } from "node:fs";
 import { join } from "node:path";
 import { test } from "node:test";
@@ -100,7 +101,8 @@ test("uploads: files, a folder, a conflict asked about once, cancel", () => {
 
 test("previews, thumbnails, rename, downloads", () => {
   const texts = { "latin.txt": Buffer.from("Café", "latin1"), "wide.txt": Buffer.from("\uFEFFCafé", "utf16le") };
-  ownFolder("looked “at”", { ...trip, ...texts });
+  const there = ownFolder("looked “at”", { ...trip, ...texts });
+  execFileSync("vips", ["black", join(there, "scanned.tif"), "300", "200"]); // no browser shows it
   return withPage("alice", { path: "/projects/looked%20%E2%80%9Cat%E2%80%9D" }, async (page) => {
     await row(page, "list & more").dblclick();
     await page.waitForSelector(".preview.paper .markdown li >> text=<b>bread</b>");
@@ -109,6 +111,8 @@ test("previews, thumbnails, rename, downloads", () => {
       await page.waitForSelector(`.preview-title >> text=${name}`);
       await page.waitForSelector(".preview pre >> text=/^.?Café$/");
     }
+    await go(page, "/projects/looked%20%E2%80%9Cat%E2%80%9D!scanned.tif");
+    await page.waitForFunction(() => document.querySelector(".preview img")?.naturalWidth === 300);
     await page.keyboard.press("Escape");
     await row(page, "day 1").dblclick();
     await page.click(".view-switch button >> nth=1");

@@ -34,7 +34,7 @@ constexpr unsigned kShelves = 256;
 constexpr unsigned kPutsBetweenLooks = 16;  // at a shelf, on average
 constexpr std::int64_t kDefaultMiB = 1024;
 constexpr std::int64_t kMostMiB = 1 << 20;
-constexpr off_t kLargestKept = 8 << 20;
+constexpr off_t kLargestKept = 16 << 20;
 constexpr time_t kDay = 86400;
 constexpr unsigned kMostSeats = 16;
 

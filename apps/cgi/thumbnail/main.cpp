@@ -1,18 +1,20 @@
-// CGI program "thumbnail": a small picture of an image or of a PDF document's first page.
+// CGI program "thumbnail": a small picture of an image, a film, a camera's RAW file or a PDF document's first page.
 //
 // Parameters:
 //   path_raw, path   the file (see pathParams)
-//   size             the longest edge in pixels, 1 to 1024 (256): 128, 256, 512 or 1024, whichever is next
+//   size             the longest edge in pixels, 1 to 2048 (256): 128, 256, 512, 1024 or 2048, whichever is next
 // Answers image/webp or image/png, upright, without what cameras write into pictures. Asks for the same privilege as a
 // download. Failures are JSON replies: 415 for what is no picture, 503 while too many are being made.
 #include <fcntl.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
+#include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <cstdlib>
+#include <filesystem>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -25,46 +27,41 @@
 #include "reply.h"
 #include "request.h"
 #include "thumbnail/cache.h"
+#include "thumbnail/kind.h"
 #include "thumbnail/sandbox.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
 namespace {
 
-constexpr unsigned kEdges[] = {128, 256, 512, 1024};
+constexpr unsigned kEdges[] = {128, 256, 512, 1024, 2048};
 constexpr unsigned long kDefaultEdge = 256;
 constexpr int kPatience = 3000;  // milliseconds for a seat
-constexpr SandboxLimits kLimits = {.memory = std::uint64_t{2} << 30,
-                                   .output = std::uint64_t{8} << 20,
-                                   .processor = 10,
-                                   .time = std::chrono::seconds(20)};
+constexpr std::uint64_t kMiB = 1 << 20;
+constexpr SandboxLimits kLimits = {
+    .memory = 2048 * kMiB, .output = 16 * kMiB, .processor = 10, .time = std::chrono::seconds(20)};
+constexpr std::uint64_t kMostWithin = 64 * kMiB;  // of the preview in a camera's file
 
-enum class Kind { kNone, kPicture, kDocument };
-
-// By the first bytes: what a name says is not believed.
-Kind kindOf(int source) {
-    char begin[16] = {};
-    const ssize_t got = pread(source, begin, sizeof begin, 0);
-    const std::string_view bytes(begin, static_cast<size_t>(std::max<ssize_t>(got, 0)));
-    if (bytes.starts_with("%PDF-")) return Kind::kDocument;
-    const bool isWebp =
-        bytes.starts_with("RIFF") && bytes.substr(std::min<size_t>(8, bytes.size())).starts_with("WEBP");
-    const std::string_view brand = bytes.size() >= 12 && bytes.substr(4, 4) == "ftyp" ? bytes.substr(8, 4) : "";
-    const std::string_view brands[] = {"avif", "avis", "heic", "heix", "heim", "heis", "hevc", "hevx", "mif1", "msf1"};
-    const bool isHeif = std::find(std::begin(brands), std::end(brands), brand) != std::end(brands);
-    const bool isPicture = isWebp || isHeif || bytes.starts_with("\xFF\xD8\xFF") || bytes.starts_with("\x89PNG\r\n") ||
-                           bytes.starts_with("GIF8") || bytes.starts_with(std::string_view("II*\0", 4)) ||
-                           bytes.starts_with(std::string_view("MM\0*", 4));
-    return isPicture ? Kind::kPicture : Kind::kNone;
+// One of ours, which lie beside the folder that this program was started from.
+std::string ownProgram(const char* name) {
+    std::error_code error;
+    const auto self = std::filesystem::read_symlink("/proc/self/exe", error);
+    return self.parent_path().parent_path() / "decoders" / name;
 }
 
+std::string pictureWord(unsigned edge) {
+    return std::to_string(edge) + "x" + std::to_string(edge) + ">";
+}
+
+// What draws it, or takes the picture to be drawn out of it.
 std::vector<std::string> wordsFor(Kind kind, unsigned edge) {
-    const std::string pixels = std::to_string(edge);
+    if (kind == Kind::kFilm) return {ownProgram("film-picture"), std::to_string(edge)};
+    if (kind == Kind::kRaw || kind == Kind::kPictureOrRaw) return {ownProgram("raw-picture")};
     if (kind == Kind::kDocument) {
-        return {"/usr/bin/pdftoppm", "-png", "-singlefile", "-scale-to", pixels, "-"};
+        return {"/usr/bin/pdftoppm", "-png", "-singlefile", "-scale-to", std::to_string(edge), "-"};
     }
     // Smaller ones keep their size.
-    return {"/usr/bin/vipsthumbnail", "stdin", "--size",           pixels + "x" + pixels + ">",
+    return {"/usr/bin/vipsthumbnail", "stdin", "--size",           pictureWord(edge),
             "--eprofile=srgb",        "-o",    ".webp[Q=75,strip]"};
 }
 
@@ -83,7 +80,36 @@ std::string pictureIn(int file) {
     return picture;
 }
 
-enum class Making { kMade, kImpossible, kBusy, kBroken };
+enum class Making { kMade, kImpossible, kNoDecoder, kBusy, kBroken };
+
+// Runs what `wordsFor` says on a file, and leaves what it makes in `made`.
+SandboxEnd decode(Kind kind, unsigned edge, int source, std::uint64_t most, Descriptor& made) {
+    made = Descriptor(memfd_create("thumbnail", MFD_CLOEXEC));
+    if (!made || lseek(source, 0, SEEK_SET) != 0) return SandboxEnd::kFailed;
+    SandboxLimits limits = kLimits;
+    limits.output = most;
+    return runInSandbox(wordsFor(kind, edge), source, made.get(), limits);
+}
+
+Making draw(Kind kind, unsigned edge, int source, std::string& picture) {
+    Descriptor made;
+    if (kind != Kind::kPicture && kind != Kind::kDocument) {
+        const SandboxEnd end = decode(kind, edge, source, kMostWithin, made);
+        if (end == SandboxEnd::kDone) return draw(Kind::kPicture, edge, made.get(), picture);
+        if (end == SandboxEnd::kFailed) return Making::kBroken;
+        if (end == SandboxEnd::kTimeOut) return Making::kBusy;
+        if (kind != Kind::kPictureOrRaw) {
+            return end == SandboxEnd::kMissing ? Making::kNoDecoder : Making::kImpossible;
+        }
+        kind = Kind::kPicture;
+    }
+    const SandboxEnd end = decode(kind, edge, source, kLimits.output, made);
+    if (end == SandboxEnd::kMissing) syslog(LOG_ERR, "%s could not be started", wordsFor(kind, edge)[0].c_str());
+    if (end == SandboxEnd::kFailed || end == SandboxEnd::kMissing) return Making::kBroken;
+    if (end == SandboxEnd::kTimeOut) return Making::kBusy;
+    if (end == SandboxEnd::kDone) picture = pictureIn(made.get());
+    return picture.empty() ? Making::kImpossible : Making::kMade;
+}
 
 // Makes the small picture and keeps it; that there is none is kept as well.
 Making make(const Source& source, Kind kind, unsigned edge, const std::string& key, const ThumbnailCache& cache,
@@ -94,15 +120,12 @@ Making make(const Source& source, Kind kind, unsigned edge, const std::string& k
         picture = *kept;
         return picture.empty() ? Making::kImpossible : Making::kMade;
     }
-    const Descriptor made(memfd_create("thumbnail", MFD_CLOEXEC));
-    if (!made || lseek(source.opened.get(), 0, SEEK_SET) != 0) return Making::kBroken;
-    const SandboxEnd end = runInSandbox(wordsFor(kind, edge), source.opened.get(), made.get(), kLimits);
-    if (end == SandboxEnd::kFailed) return Making::kBroken;
-    if (end == SandboxEnd::kTimeOut) return Making::kBusy;
-    if (end == SandboxEnd::kDone) picture = pictureIn(made.get());
+    const Making made = draw(kind, edge, source.opened.get(), picture);
     // A file that was written to meanwhile has another name in the cache by now.
-    if (thumbnailKey(source.opened.get(), edge) == key) cache.put(key, picture);
-    return picture.empty() ? Making::kImpossible : Making::kMade;
+    if ((made == Making::kMade || made == Making::kImpossible) && thumbnailKey(source.opened.get(), edge) == key) {
+        cache.put(key, picture);
+    }
+    return made;
 }
 
 std::string variable(const char* name) {
@@ -128,7 +151,7 @@ void serveThumbnailProgram(Request& request, Output& out) {
     const User& user = request.user;
     const auto path = pathParam(request.web);
     const auto size = numberParam(request.web, "size", kDefaultEdge);
-    if (!path || path->empty() || !size || *size < 1 || *size > kEdges[3]) {
+    if (!path || path->empty() || !size || *size < 1 || *size > *std::rbegin(kEdges)) {
         return refuse(out, user, Status::kBadRequest, ORV_ERR_PARAMETER, request.web.GetParam("path", ""));
     }
     const unsigned edge = *std::lower_bound(std::begin(kEdges), std::end(kEdges), *size);
@@ -137,7 +160,9 @@ void serveThumbnailProgram(Request& request, Output& out) {
     int code = actAs(user.sid.c_str(), user.name, IsDirUserHome(*path, nullptr));
     if (code == ORV_ERR_NONE) code = openToSend(user, source);
     if (code != ORV_ERR_NONE) return refuse(out, user, httpStatusOf(code), code, *path);
-    const Kind kind = S_ISREG(source.status.st_mode) ? kindOf(source.opened.get()) : Kind::kNone;
+    char begin[kKindBytes];
+    const ssize_t got = S_ISREG(source.status.st_mode) ? pread(source.opened.get(), begin, sizeof begin, 0) : 0;
+    const Kind kind = kindOf({begin, static_cast<size_t>(std::max<ssize_t>(got, 0))});
     const std::string key = kind == Kind::kNone ? "" : thumbnailKey(source.opened.get(), edge);
     if (key.empty()) return refuse(out, user, Status::kUnsupportedType, ORV_ERR_PARAMETER, *path);
     const std::string tag = '"' + key + '"';
@@ -158,7 +183,7 @@ void serveThumbnailProgram(Request& request, Output& out) {
     }
     if (made == Making::kBusy) return refuse(out, user, Status::kBusy, ORV_ERR_BUSY, *path);
     if (made == Making::kBroken) return refuse(out, user, Status::kBroken, ORV_ERR_GENERAL, *path);
-    if (made == Making::kImpossible) return refuse(out, user, Status::kUnsupportedType, ORV_ERR_PARAMETER, *path);
+    if (made != Making::kMade) return refuse(out, user, Status::kUnsupportedType, ORV_ERR_PARAMETER, *path);
     putHeaders(out, user, "200 OK", tag);
     out.text() +=
         "Content-Type: " + typeOf(picture) + "\r\nContent-Length: " + std::to_string(picture.size()) + "\r\n\r\n";

@@ -18,13 +18,15 @@
 #include <csignal>
 
 #include "base/descriptor.h"
+#include "base/raised_identity.h"
 
 namespace orvel::cgi {
 namespace {
 
 constexpr int kNotConfined = 126;
-constexpr int kNotStarted = 127;
+constexpr int kNotStarted = 127;  // the loader's word for a missing library, too
 constexpr uid_t kNobody = 65534;
+constexpr int kProgram = 3;  // where what is to be run is open
 
 // libseccomp, loaded in the process that needs it: no other request pays for it.
 struct SeccompLibrary {
@@ -61,6 +63,7 @@ constexpr const char* kAllowed[] = {"access",
                                     "dup3",
                                     "eventfd2",
                                     "execve",
+                                    "execveat",
                                     "exit",
                                     "exit_group",
                                     "faccessat",
@@ -147,16 +150,19 @@ bool confineCalls() {
            seccomp.add(filter, SCMP_ACT_ERRNO(ENOSYS), SCMP_SYS(clone3), 0, nullptr) == 0 && seccomp.load(filter) == 0;
 }
 
-bool allowBelow(int rules, const char* path, std::uint64_t access) {
-    const Descriptor place(open(path, O_PATH | O_CLOEXEC));
-    if (!place) return errno == ENOENT;
+bool allowBelow(int rules, int place, std::uint64_t access) {
     landlock_path_beneath_attr beneath = {};
     beneath.allowed_access = access;
-    beneath.parent_fd = place.get();
+    beneath.parent_fd = place;
     return syscall(SYS_landlock_add_rule, rules, LANDLOCK_RULE_PATH_BENEATH, &beneath, 0) == 0;
 }
 
-// No file but what is installed, where the kernel can see to that. False when it can and did not.
+bool allowBelow(int rules, const char* path, std::uint64_t access) {
+    const Descriptor place(open(path, O_PATH | O_CLOEXEC));
+    return place ? allowBelow(rules, place.get(), access) : errno == ENOENT;
+}
+
+// No file but the program and what is installed, where the kernel can see to that. False when it can and did not.
 bool confineFiles() {
     const long version = syscall(SYS_landlock_create_ruleset, nullptr, 0, LANDLOCK_CREATE_RULESET_VERSION);
     if (version < 1) return true;
@@ -165,7 +171,8 @@ bool confineFiles() {
     landlock_ruleset_attr attributes = {};
     attributes.handled_access_fs = kEvery;
     const Descriptor rules(static_cast<int>(syscall(SYS_landlock_create_ruleset, &attributes, sizeof attributes, 0)));
-    return rules && allowBelow(rules.get(), "/usr", kReadable | LANDLOCK_ACCESS_FS_EXECUTE) &&
+    return rules && allowBelow(rules.get(), kProgram, LANDLOCK_ACCESS_FS_READ_FILE | LANDLOCK_ACCESS_FS_EXECUTE) &&
+           allowBelow(rules.get(), "/usr", kReadable | LANDLOCK_ACCESS_FS_EXECUTE) &&
            allowBelow(rules.get(), "/lib", kReadable | LANDLOCK_ACCESS_FS_EXECUTE) &&
            allowBelow(rules.get(), "/lib64", kReadable | LANDLOCK_ACCESS_FS_EXECUTE) &&
            allowBelow(rules.get(), "/etc/fonts", kReadable) &&
@@ -195,13 +202,16 @@ bool setLimits(const SandboxLimits& limits) {
            limitTo(RLIMIT_CPU, limits.processor) && limitTo(RLIMIT_NOFILE, 64) && limitTo(RLIMIT_CORE, 0);
 }
 
-bool setDescriptors(int input, int output) {
+bool setDescriptors(int program, int input, int output) {
     const int null = open("/dev/null", O_RDWR | O_CLOEXEC);
     return null >= 0 && dup2(input, STDIN_FILENO) == STDIN_FILENO && dup2(output, STDOUT_FILENO) == STDOUT_FILENO &&
-           dup2(null, STDERR_FILENO) == STDERR_FILENO && syscall(SYS_close_range, 3, ~0U, 0) == 0;
+           dup2(null, STDERR_FILENO) == STDERR_FILENO &&
+           (program == kProgram || dup3(program, kProgram, O_CLOEXEC) == kProgram) &&
+           syscall(SYS_close_range, kProgram + 1, ~0U, 0) == 0;
 }
 
-[[noreturn]] void become(const std::vector<char*>& words, int input, int output, const SandboxLimits& limits) {
+[[noreturn]] void become(int program, const std::vector<char*>& words, int input, int output,
+                         const SandboxLimits& limits) {
     char blocked[] = "VIPS_BLOCK_UNTRUSTED=1", threads[] = "VIPS_CONCURRENCY=1", arenas[] = "MALLOC_ARENA_MAX=1",
          locale[] = "LC_ALL=C.UTF-8", home[] = "HOME=/nonexistent";
     char* environment[] = {blocked, threads, arenas, locale, home, nullptr};
@@ -209,12 +219,12 @@ bool setDescriptors(int input, int output) {
     sigemptyset(&none);
     const bool confined = prctl(PR_SET_PDEATHSIG, SIGKILL) == 0 && sigprocmask(SIG_SETMASK, &none, nullptr) == 0 &&
                           std::signal(SIGPIPE, SIG_DFL) != SIG_ERR && chdir("/") == 0 &&
-                          setDescriptors(input, output) && giveUpIdentity() &&
+                          setDescriptors(program, input, output) && giveUpIdentity() &&
                           prctl(PR_SET_PDEATHSIG, SIGKILL) == 0 &&  // a change of identity took it away
                           prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0 && confineFiles() && confineCalls() &&
                           setLimits(limits);  // last: this process may have more memory already
     if (!confined) _exit(kNotConfined);
-    execve(words[0], words.data(), environment);
+    execveat(kProgram, "", words.data(), environment, AT_EMPTY_PATH);
     _exit(kNotStarted);
 }
 
@@ -230,6 +240,12 @@ bool waitFor(pid_t child, std::chrono::milliseconds time) {
     }
 }
 
+// Nobody may be barred from the folders above it.
+Descriptor openProgram(const std::string& path) {
+    const RaisedIdentity root;
+    return Descriptor(open(path.c_str(), O_PATH | O_CLOEXEC));
+}
+
 }  // namespace
 
 SandboxEnd runInSandbox(const std::vector<std::string>& words, int input, int output, const SandboxLimits& limits) {
@@ -237,20 +253,22 @@ SandboxEnd runInSandbox(const std::vector<std::string>& words, int input, int ou
     pointers.reserve(words.size() + 1);
     for (const std::string& word : words) pointers.push_back(const_cast<char*>(word.c_str()));
     pointers.push_back(nullptr);
+    const Descriptor program = openProgram(words[0]);
+    if (!program) return SandboxEnd::kMissing;
     const pid_t child = fork();
     if (child < 0) return SandboxEnd::kFailed;
-    if (child == 0) become(pointers, input, output, limits);
+    if (child == 0) become(program.get(), pointers, input, output, limits);
     const bool ended = waitFor(child, limits.time);
     if (!ended) kill(child, SIGKILL);
     int status = 0;
     while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
     }
     if (!ended) return SandboxEnd::kTimeOut;
-    if (WIFEXITED(status) && (WEXITSTATUS(status) == kNotConfined || WEXITSTATUS(status) == kNotStarted)) {
-        syslog(LOG_ERR, "%s could not be %s", words[0].c_str(),
-               WEXITSTATUS(status) == kNotConfined ? "confined" : "started");
+    if (WIFEXITED(status) && WEXITSTATUS(status) == kNotConfined) {
+        syslog(LOG_ERR, "%s could not be confined", words[0].c_str());
         return SandboxEnd::kFailed;
     }
+    if (WIFEXITED(status) && WEXITSTATUS(status) == kNotStarted) return SandboxEnd::kMissing;
     return WIFEXITED(status) && WEXITSTATUS(status) == 0 ? SandboxEnd::kDone : SandboxEnd::kRefused;
 }
 

@@ -21,13 +21,14 @@ enum class SandboxEnd {
     kDone,
     kRefused,  // it ended by itself, or at a limit that the same bytes meet again: memory, output, processor time
     kTimeOut,  // it was stopped: how busy the machine is counts, too
-    kFailed    // it was not run: it is missing, or could not be confined
+    kMissing,  // it is not installed, or a library of its own is not
+    kFailed    // it could not be confined
 };
 
 // Runs `words` (an absolute path and its arguments) with `input` and `output` as its standard input and output. Where
 // the caller was root it is nobody: real, effective and saved, without a group. It cannot get more rights, make
 // processes or sockets, or signal others, and where the kernel has Landlock it can read what is installed (/usr, fonts)
-// and no other file. Both descriptors stay the caller's.
+// and no other file but the program itself. Both descriptors stay the caller's.
 SandboxEnd runInSandbox(const std::vector<std::string>& words, int input, int output, const SandboxLimits& limits);
 
 }  // namespace orvel::cgi

@@ -11,8 +11,10 @@ import { formatSize, formatTime } from "./format.js";
 import { canShowImage, iconOf } from "./icons.js";
 import { download } from "./download.js";
 import { t } from "./strings.js";
+import { isDrawn, smallPicture } from "./thumbnails.js";
 
 const LARGEST_IMAGE = 64 * 1024 * 1024;
+const SMALLER = 2048; // pixels
 const LARGEST_AHEAD = 16 * 1024 * 1024;
 
 let shown = null;
@@ -150,7 +152,9 @@ function fetchBeside() {
 
 async function contentOf(entry, signal) {
   if (entry.size === 0) return message(entry, t("preview.empty"));
-  if (canShowImage(entry.name) && entry.size <= LARGEST_IMAGE) return imageOf(entry);
+  if (canShowImage(entry.name) && entry.size <= LARGEST_IMAGE) return imageOf(entry, source(entry), "preview.broken");
+  // What browsers do not show, and what is too large to be fetched for it.
+  if ((entry.kind === "image" || entry.kind === "raw") && isDrawn(entry.name)) return imageOf(entry, smallPicture(entry, SMALLER), "preview.none");
   if (entry.kind === "audio" || entry.kind === "video") return mediaOf(entry, signal);
   if (entry.kind === "pdf") return pdfOf(entry, signal);
   if (mayBeText(entry)) return textOf(entry, signal);
@@ -170,12 +174,12 @@ function source(entry) {
   return urlOf("download", { path_raw: entry.id });
 }
 
-function imageOf(entry) {
+function imageOf(entry, address, failure) {
   return new Promise((resolve) => {
     const image = h("img", { alt: plainName(entry.name), draggable: "false" });
     image.addEventListener("load", () => resolve(image));
-    image.addEventListener("error", () => resolve(message(entry, t("preview.broken"))));
-    image.src = source(entry);
+    image.addEventListener("error", () => resolve(message(entry, t(failure))));
+    image.src = address;
   });
 }
 

@@ -2,22 +2,27 @@
 
 import { urlOf } from "./api.js";
 import { h } from "./dom.js";
-import { canShowImage } from "./icons.js";
+import { canShowImage, KINDS } from "./icons.js";
 import { splitExtension } from "./path.js";
 
 // What the appliance draws small.
-const DRAWN = new Set(["jpg", "jpeg", "png", "webp", "gif", "tif", "tiff", "heic", "heif", "avif", "pdf"]);
+const DRAWN = new Set(`jpg jpeg png webp gif tif tiff heic heif avif pdf ${KINDS.raw} ${KINDS.video}`.split(" "));
 const EDGE = 256;
 // Of all else that a browser shows the whole file is fetched: larger ones keep their icon.
 const LARGEST = 4 * 1024 * 1024;
 
+export function isDrawn(name) {
+  return DRAWN.has(splitExtension(name)[1].slice(1).toLowerCase());
+}
+
+// The version makes another address of a file that has changed: what the browser keeps is not shown for it.
+export function smallPicture(entry, size) {
+  return urlOf("thumbnail", { path_raw: entry.id, size, version: `${entry.size}-${entry.mtime}` });
+}
+
 function sourcesOf(entry) {
   const sources = [];
-  if (DRAWN.has(splitExtension(entry.name)[1].slice(1).toLowerCase())) {
-    const size = window.devicePixelRatio > 1 ? 2 * EDGE : EDGE;
-    // The version makes another address of a file that has changed: what the browser keeps is not shown for it.
-    sources.push(urlOf("thumbnail", { path_raw: entry.id, size, version: `${entry.size}-${entry.mtime}` }));
-  }
+  if (isDrawn(entry.name)) sources.push(smallPicture(entry, window.devicePixelRatio > 1 ? 2 * EDGE : EDGE));
   if (canShowImage(entry.name) && entry.size <= LARGEST) sources.push(urlOf("download", { path_raw: entry.id }));
   return sources;
 }
