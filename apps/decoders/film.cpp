@@ -213,7 +213,7 @@ bool writeJpeg(const AVFrame& frame, char orientation) {
 
 int main(int count, char** words) {
     av_log_set_level(AV_LOG_QUIET);
-    const int edge = count == 2 ? atoi(words[1]) : 0;
+    const int edge = count == 2 ? static_cast<int>(strtol(words[1], nullptr, 10)) : 0;
     Film film;
     if (edge < 1 || edge > 4096 || !film.open()) return 1;
     Owned<AVFrame> best;
