@@ -93,12 +93,7 @@ TEST_F(ShareListingTest, Properties) {
 
 TEST_F(ShareListingTest, OrderAndPage) {
     for (const auto& [sortBy, ascending, offset, limit, page] :
-         Rows<const char*, bool, unsigned long, unsigned long, Names>{
-             {nullptr, false, 0, 0, {"docs", "video", "homes", "photo"}},
-             {"name", true, 1, 2, {"homes", "photo"}},
-             {"name", false, 3, 2, {"docs"}},
-             {"name", true, 9, 0, {"docs", "homes", "photo", "video"}},
-         }) {
+         rowsOf<const char*, bool, unsigned long, unsigned long, Names>("enum/share_pages")) {
         ASSERT_TRUE(list("alice", 0, sortBy, ascending, offset, limit));
         EXPECT_EQ(names(), page);
         EXPECT_EQ(total_, 4U);

@@ -129,13 +129,7 @@ TEST_F(AclTest, FolderFormAgreesWithTheKernelAndWithTheDeed) {
         {"a stranger who overrides", 29999, 29999, {}, 1U << CAP_DAC_OVERRIDE},
         {"a stranger who owns all", 29999, 29999, {}, 1U << CAP_FOWNER},
     };
-    const Rows<const char*, mode_t, uid_t> folders = {{"open", 0777, 0},
-                                                      {"sticky", 01777, 0},
-                                                      {"alices sticky", 01777, kAliceUid},
-                                                      {"unwritable", 0755, 0},
-                                                      {"unreadable", 0733, 0},
-                                                      {"unsearchable", 0766, 0},
-                                                      {"unsearchable sticky group", 01771, kBobUid}};
+    const auto folders = rowsOf<const char*, mode_t, uid_t>("platform/acl_folders");
     std::vector<std::string> names;
     for (const auto& [folder, mode, owner] : folders) {
         const std::string path = photo_ + "/" + folder;

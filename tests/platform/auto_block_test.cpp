@@ -12,12 +12,7 @@ constexpr const char* kAddress = "192.0.2.7";
 
 TEST(AutoBlockRules, SettingsAndAddresses) {
     for (const auto& [enable, number, expected] :
-         Rows<const char*, const char*, std::vector<long long>>{{"", "", {1, 10, 300, 86400}},
-                                                                {"no", "3", {0, 3, 180, 180}},
-                                                                {"yes", "0", {1, 10, 300, 0}},
-                                                                {"x", "3x", {1, 10, 300, 86400}},
-                                                                {"yes", "-1", {1, 10, 300, 86400}},
-                                                                {"yes", "99999999", {1, 10, 300, 86400}}}) {
+         rowsOf<const char*, const char*, std::vector<long long>>("platform/block_rules")) {
         const auto rules = vexo::parseAutoBlockRules(enable, number, number, number);
         EXPECT_EQ((std::vector<long long>{rules.enabled, rules.attempts, rules.window, rules.duration}), expected);
     }
