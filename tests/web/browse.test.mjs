@@ -439,7 +439,7 @@ test("every message key has its words in both languages, where it is loaded", as
   for (const file of readdirSync(new URL("js", web))) {
     const text = readFileSync(new URL(`js/${file}`, web), "utf8");
     const named = Object.keys(later).filter((key) => text.includes(`"${key}"`));
-    assert.ok(named.length === 0 || text.includes('import "./later_texts.js";'), `${file} names ${named}`);
+    assert.ok(named.length === 0 || text.includes('import "./later.js";'), `${file} names ${named}`);
   }
 });
 

@@ -83,6 +83,7 @@ export async function newPage({ kept = false, ...options } = {}) {
   const page = await context.newPage();
   if (SCREENSHOTS && process.argv[1].endsWith(".test.mjs")) photograph(page);
   page.complaints = [];
+  page.refusals = []; // in the programs' own words
   page.on("console", (message) => {
     if (["error", "warning"].includes(message.type()) && !isNoPicture(message.location().url)) page.complaints.push(`console: ${message.text()}`);
   });
@@ -94,6 +95,7 @@ export async function newPage({ kept = false, ...options } = {}) {
   });
   page.on("response", (response) => {
     if (response.status() >= 400 && !([415, 503].includes(response.status()) && isNoPicture(response.url()))) page.complaints.push(`status ${response.status()}: ${response.url()}`);
+    if (response.status() >= 400 && response.url().includes("/cgi-bin/")) response.text().then((text) => page.refusals.push(text.slice(0, 200)), () => {});
   });
   return page;
 }
@@ -117,7 +119,7 @@ export async function finish(page, run) {
   } catch (failure) {
     await screenshot(page, `failed-${Date.now()}`);
     const shown = await page.evaluate(() => `${location.hash}\n${document.body.innerText}`).catch((reason) => reason.message);
-    failure.stack += `\nComplaints: ${page.complaints.join("\n")}\nShown: ${shown.slice(0, 2000)}`;
+    failure.stack += `\nComplaints: ${page.complaints.join("\n")}\nRefusals: ${page.refusals.join("\n")}\nShown: ${shown.slice(0, 2000)}`;
     throw failure;
   } finally {
     await page.unrouteAll({ behavior: "ignoreErrors" });

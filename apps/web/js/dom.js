@@ -31,10 +31,13 @@ export async function loadIcons() {
   document.body.prepend(document.adoptNode(sprite));
 }
 
-// The rules of what is not always there, before it shows.
+// The rules of what is not always there. What it returns is settled once they apply, or cannot be had.
 export function loadStyle(name) {
   const href = new URL(`../css/${name}.css`, import.meta.url).href;
-  if (!document.querySelector(`link[href="${href}"]`)) document.head.append(h("link", { rel: "stylesheet", href }));
+  if (document.querySelector(`link[href="${href}"]`)) return undefined;
+  const link = h("link", { rel: "stylesheet", href });
+  document.querySelector("link[href$='css/contrast.css']").before(link); // which has the last word
+  return new Promise((resolve) => (link.onload = link.onerror = resolve));
 }
 
 export function icon(name, className = "icon") {

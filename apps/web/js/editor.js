@@ -5,7 +5,7 @@ import { refresh } from "./browser.js";
 import { choose, toast, toastFailure } from "./dialogs.js";
 import { h, icon, iconButton, nameNode } from "./dom.js";
 import { iconOf } from "./icons.js";
-import "./later_texts.js";
+import "./later.js";
 import { childOf, decode as decodeName, encodeName, lastOf, splitExtension } from "./path.js";
 import { t } from "./strings.js";
 import { compareTexts } from "./text_compare.js";

@@ -2,7 +2,7 @@
 
 import { dialog } from "./dialogs.js";
 import { h, icon } from "./dom.js";
-import "./later_texts.js";
+import "./later.js";
 import { t } from "./strings.js";
 
 const SVG = "http://www.w3.org/2000/svg";

@@ -6,7 +6,7 @@ import { h, icon, iconButton, keepFocus, nameNode, plainName } from "./dom.js";
 import { emit } from "./events.js";
 import { formatDay, formatSize, formatTime } from "./format.js";
 import { iconOf } from "./icons.js";
-import "./later_texts.js";
+import "./later.js";
 import { showCode } from "./link_code.js";
 import { field, linkForm, termFields } from "./link_form.js";
 import { showSent } from "./link_sent.js";

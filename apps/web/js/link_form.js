@@ -3,7 +3,7 @@
 import { dialog } from "./dialogs.js";
 import { dayRange, h, icon, nameNode } from "./dom.js";
 import { sentenceOf } from "./errors.js";
-import "./later_texts.js";
+import "./later.js";
 import { t } from "./strings.js";
 
 const MOST_DOWNLOADS = 1_000_000;

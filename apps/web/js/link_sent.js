@@ -4,7 +4,7 @@ import { get } from "./api.js";
 import { dialog, toastFailure } from "./dialogs.js";
 import { h, icon, keepFocus, nameNode } from "./dom.js";
 import { formatFullTime, formatSize } from "./format.js";
-import "./later_texts.js";
+import "./later.js";
 import { decode, idIn } from "./path.js";
 import { t } from "./strings.js";
 

@@ -5,7 +5,7 @@ import { ApiError, PROGRAMS, encodeParams, readReply, sendOnce } from "./api.js"
 import { $, h, icon } from "./dom.js";
 import { describe } from "./errors.js";
 import { formatDuration } from "./format.js";
-import "./later_texts.js";
+import "./later.js";
 import { t } from "./strings.js";
 
 // What machines commonly ask, in the language of the page. Anything else is shown as it was asked.

@@ -3,6 +3,7 @@
 import { post } from "./api.js";
 import { browser, refresh } from "./browser.js";
 import { askText, loaded, toast } from "./dialogs.js";
+import { h } from "./dom.js";
 import { emit } from "./events.js";
 import { askInPlace } from "./in_place.js";
 import { childOf, decode, encodeName, isDeleted, isSearch, nameOf, splitExtension, taskOf } from "./path.js";

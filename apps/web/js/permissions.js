@@ -6,7 +6,7 @@ import { confirm, dialog, toastFailure } from "./dialogs.js";
 import { h, icon, iconButton, nameNode } from "./dom.js";
 import { sentenceOf } from "./errors.js";
 import { iconOf } from "./icons.js";
-import "./later_texts.js";
+import "./later.js";
 import { nameOf } from "./path.js";
 import { t } from "./strings.js";
 import { startTask } from "./tasks.js";

@@ -7,7 +7,7 @@ import { h, icon, iconButton, nameNode, set } from "./dom.js";
 import { describe } from "./errors.js";
 import { isReadOnlyShare } from "./entries.js";
 import { folderKindOf } from "./icons.js";
-import "./later_texts.js";
+import "./later.js";
 import { makeFolder } from "./operations.js";
 import { idIn, parentOf, shareOf } from "./path.js";
 import { labelOf } from "./pathbar.js";

@@ -6,7 +6,7 @@ import { h, icon, nameNode, plainName } from "./dom.js";
 import { isOffline, typeOf } from "./entries.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
-import "./later_texts.js";
+import "./later.js";
 import { copyPath, showSpaceOf } from "./operations.js";
 import { decode, parentOf } from "./path.js";
 import { sizesNode } from "./sizes.js";

@@ -6,7 +6,7 @@ import { dialog } from "./dialogs.js";
 import { h, icon, keepFocus, loadStyle, plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { formatSize } from "./format.js";
-import "./later_texts.js";
+import "./later.js";
 import { t } from "./strings.js";
 
 const FIRST_LOOK = 150;

@@ -7,7 +7,7 @@ import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { describe } from "./errors.js";
 import { formatSize } from "./format.js";
 import { folderKindOf, kindOfName } from "./icons.js";
-import "./later_texts.js";
+import "./later.js";
 import { ancestry, idIn, nameOf, parentOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { countsOf, measure, notesOf, runningNode } from "./sizes.js";

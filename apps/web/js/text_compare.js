@@ -2,7 +2,7 @@
 
 import { dialog } from "./dialogs.js";
 import { h } from "./dom.js";
-import "./later_texts.js";
+import "./later.js";
 import { t } from "./strings.js";
 import { lookOf, shadowBox } from "./text_view.js";
 

@@ -1,7 +1,7 @@
 // CodeMirror in this page: loaded when it is asked for, in a shadow tree, where its rules need no style element.
 
 import { h, loadStyle } from "./dom.js";
-import "./later_texts.js";
+import "./later.js";
 import { t } from "./strings.js";
 
 let loading = null;

@@ -4,7 +4,7 @@ import { Card } from "./activity.js";
 import { toast, toastFailure } from "./dialogs.js";
 import { h, plainName } from "./dom.js";
 import { formatFullTime, formatSize } from "./format.js";
-import "./later_texts.js";
+import "./later.js";
 import { nameOf, parentOf } from "./path.js";
 import { labelOf } from "./pathbar.js";
 import { t } from "./strings.js";

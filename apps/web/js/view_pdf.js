@@ -3,7 +3,7 @@
 import { headersOf, urlOf } from "./api.js";
 import { askText } from "./dialogs.js";
 import { h, iconButton, loadStyle } from "./dom.js";
-import "./later_texts.js";
+import "./later.js";
 import { t } from "./strings.js";
 
 const MOST_PIXELS = 16e6; // of one page

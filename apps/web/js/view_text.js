@@ -4,7 +4,7 @@
 import { readReply, send, urlOf } from "./api.js";
 import { h, loadStyle } from "./dom.js";
 import { formatSize } from "./format.js";
-import "./later_texts.js";
+import "./later.js";
 import { splitExtension } from "./path.js";
 import { t } from "./strings.js";
 import { detect, ENCODINGS } from "./text_codec.js";

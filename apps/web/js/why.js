@@ -4,7 +4,7 @@ import { get } from "./api.js";
 import { dialog } from "./dialogs.js";
 import { h, icon, plainName } from "./dom.js";
 import { describe } from "./errors.js";
-import "./later_texts.js";
+import "./later.js";
 import { decode } from "./path.js";
 import { t } from "./strings.js";
 
