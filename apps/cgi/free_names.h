@@ -11,6 +11,8 @@ namespace orvel::cgi {
 // "name (2).ext" for the number 2; a folder's name has no ending. What does not fit into 255 bytes is cut off before
 // the number, never within a character. Pure.
 std::string numberedName(const std::string& name, int number, bool isFolder);
+// The same with another mark, of which at most 128 bytes count.
+std::string markedName(const std::string& name, const std::string& mark, bool isFolder);
 
 // Gives each member of an archive a name of its own.
 class FreeNames {

@@ -13,6 +13,7 @@
 #include "orvel/error_state.h"
 #include "orvel/name_check.h"
 #include "reply.h"
+#include "snapshots.h"
 #include "vexo/filesystem.h"
 #include "vexo/share_files.h"
 #include "vexo/user.h"
@@ -97,6 +98,7 @@ int enter(const PathInfo& info, LinkPolicy policy, Way& way, Target& target) {
 int checkNewName(const Descriptor& folder, const std::string& name) {
     VEXOShareNamesOf(folder.get());
     if (VEXOEAIsHiddenFile(name.c_str()) != 0) return ORV_ERR_RESERVED_NAME;
+    if (isInSnapshot(folder, name)) return ORV_ERR_READ_ONLY;
     OrvLibSetErr(ORV_ERR_NONE);
     return OrvCheckFileName(realPathOf(folder).c_str(), name.c_str()) == 0 ? ORV_ERR_NONE : lastCode();
 }
@@ -120,6 +122,7 @@ int makeFolder(const Descriptor& folder, const std::string& name, const std::str
 int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user, Missing missing, Target& target) {
     Way way;
     int code = enter(info, policy, way, target);
+    if (code == ORV_ERR_NONE && isInSnapshot(target.folder, target.name)) code = ORV_ERR_READ_ONLY;
     if (code != ORV_ERR_NONE) return code;
     if (way.existing < way.folders.size() && missing == Missing::kRefuse) return ORV_ERR_MISSING;
     for (size_t i = way.existing; i < way.folders.size(); ++i) {
@@ -141,8 +144,10 @@ int openTarget(const PathInfo& info, LinkPolicy policy, const std::string& user,
     return ORV_ERR_NONE;
 }
 
-int openPresent(const PathInfo& info, const std::string& user, Target& target) {
-    const int code = openTarget(info, linkPolicyOf(info.shareName), user, Missing::kRefuse, target);
+int openPresent(const PathInfo& info, Target& target) {
+    Way way;
+    int code = enter(info, linkPolicyOf(info.shareName), way, target);
+    if (code == ORV_ERR_NONE && way.existing < way.folders.size()) code = ORV_ERR_MISSING;
     if (code == ORV_ERR_NONE) {
         VEXOShareNamesOf(target.folder.get());
         return VEXOEAIsHiddenFile(target.name.c_str()) == 0 ? ORV_ERR_NONE : ORV_ERR_MISSING;

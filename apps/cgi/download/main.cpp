@@ -4,6 +4,7 @@
 //   paths_raw, path_raw, path   what to fetch (see pathParams): several paths, or a folder, come as a zip
 //   listing, ranges, except     or rows of a kept listing (see chosen_rows.h)
 //   name                        of the zip, without ".zip"; default is that of the only folder, else "download"
+//   snapshot, snapshot_raw      one file as it was in that snapshot (see list/versions.h)
 // A file answers HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since. Failures are JSON replies.
 #include <json/value.h>
 #include <sys/stat.h>
@@ -20,6 +21,7 @@
 #include "program/program.h"
 #include "reply.h"
 #include "request.h"
+#include "versions/version.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
@@ -61,14 +63,18 @@ void serveDownloadProgram(Request& request, Output& out) {
     const VEXO::WebCGI& web = request.web;
     if (ChosenRows::isIn(web)) return serveRows(user, web, out);
     const auto paths = pathParams(web);
-    if (!paths || paths->empty()) {
+    const auto version = versionParam(web);
+    const bool fits = paths && (!namesVersion(web) || (version && paths->size() == 1));
+    if (!fits || paths->empty()) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
     const bool home =
         std::any_of(paths->begin(), paths->end(), [](const std::string& path) { return IsDirUserHome(path, nullptr); });
     std::string culprit = paths->front();
     std::vector<Source> sources;
-    const OpenSource open = [&user](Source& source) { return openToSend(user, source); };
+    const OpenSource open = [&](Source& source) {
+        return version ? openVersionToSend(user, *version, source) : openToSend(user, source);
+    };
     int code = actAs(user.sid.c_str(), user.name, home);
     if (code == ORV_ERR_NONE) code = findSources(*paths, open, sources, culprit);
     if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), user.cookie, code, culprit);

@@ -21,6 +21,7 @@
 #include "orvel/privilege.h"
 #include "orvel/share_path.h"
 #include "text.h"
+#include "versions/version.h"
 
 namespace orvel::cgi {
 namespace {
@@ -115,6 +116,17 @@ int openToSend(const User& user, Source& source) {
     source.path = info.path;
     source.name = nameOf(info, found);
     return openFound(found, info.realPath, source);
+}
+
+int openVersionToSend(const User& user, const std::string& name, Source& source) {
+    Version version;
+    int code = openVersion(user, source.asked, name, Need::kRead, version);
+    if (code == ORV_ERR_NONE) code = openFound(version.opened, version.present.info().realPath, source);
+    if (code == ORV_ERR_NONE && !S_ISREG(source.status.st_mode)) code = ORV_ERR_PARAMETER;
+    if (code != ORV_ERR_NONE) return code;
+    source.path = version.present.info().path;
+    source.name = versionName(lastComponent(version.present.realPath()), version.snapshot, false);
+    return ORV_ERR_NONE;
 }
 
 int openRow(const ChosenRows& rows, const KeptRow& row, Source& source) {

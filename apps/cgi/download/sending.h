@@ -41,6 +41,9 @@ int openFound(const Descriptor& found, const std::string& realPath, Source& sour
 // has taken on. 0 or a library code.
 int openToSend(const User& user, Source& source);
 
+// The same of the file as it was in the snapshot `version`; it is called so. 400 for a folder.
+int openVersionToSend(const User& user, const std::string& version, Source& source);
+
 // Opens a row of a kept listing, whose folder is open. 0 or a library code.
 int openRow(const ChosenRows& rows, const KeptRow& row, Source& source);
 

@@ -10,7 +10,7 @@
 //   pattern          comma-separated name patterns (folder only)
 //   filetype         "dir", "file" or "all" (default; folder only)
 //   with             see list/beside.h (shares, folder)
-// and those of kept listings: see list/kept.h.
+// and those of kept listings: see list/kept.h; "versions", and "snapshot" with a folder: see list/versions.h.
 // "data" of the reply is {"total","offset","items"}; beside that of the shares stands "user", who is logged in.
 #include <optional>
 #include <string>
@@ -19,6 +19,7 @@
 #include "list/beside.h"
 #include "list/deleted.h"
 #include "list/kept.h"
+#include "list/versions.h"
 #include "listing.h"
 #include "orvel/error_state.h"
 #include "orvel/share_path.h"
@@ -26,6 +27,7 @@
 #include "reply.h"
 #include "request.h"
 #include "text.h"
+#include "versions/version.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
@@ -58,11 +60,14 @@ void serveListProgram(Request& request, Output& out) {
     const VEXO::WebCGI& web = request.web;
     const std::string action = web.GetParam("action", "");
     const auto wanted = parse(web, user);
-    const bool known = action == "shares" || action == "folder" || action == "deleted" || isKeptAction(action);
+    const bool known =
+        action == "shares" || action == "folder" || action == "deleted" || action == "versions" || isKeptAction(action);
     if (!wanted || !known) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
 
+    if (action == "versions") return serveVersions(request, *wanted, out);
+    if (action == "folder" && namesVersion(web)) return serveEarlierFolder(request, *wanted, out);
     if (action == "deleted") return serveDeleted(request, *wanted, out);
     if (isKeptAction(action)) return serveKept(request, action, *wanted, out);
     if (action == "folder" && wantsToKeep(web)) return serveKeeping(request, *wanted, out);

@@ -42,7 +42,8 @@ int Choice::openRow(const User& user, size_t position, std::initializer_list<Nee
         code = judge(user, item.info.path, need);
         if (code != ORV_ERR_NONE) return code;
     }
-    code = rows_->look(row, item.status);
+    code = checkChangeable(needs, opened.folder, row.name);
+    if (code == ORV_ERR_NONE) code = rows_->look(row, item.status);
     if (code != ORV_ERR_NONE) return code;
     item.place.folder = Descriptor(fcntl(opened.folder.get(), F_DUPFD_CLOEXEC, 0));
     item.place.name = row.name;

@@ -3,11 +3,13 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 
 #include "background.h"
 #include "orvel/directory_walker.h"
 #include "orvel/error_state.h"
+#include "snapshots.h"
 #include "vexo/filesystem.h"
 #include "vexo/user.h"
 
@@ -26,6 +28,11 @@ struct Sum : OrvDirectoryWalkerCallBack {
 
 }  // namespace
 
+int checkChangeable(std::initializer_list<Need> needs, const Descriptor& folder, const std::string& name) {
+    const bool changes = std::find(needs.begin(), needs.end(), Need::kModify) != needs.end();
+    return changes && isInSnapshot(folder, name) ? ORV_ERR_READ_ONLY : ORV_ERR_NONE;
+}
+
 int openItem(const User& user, const std::string& path, std::initializer_list<Need> needs, Item& item) {
     OrvLibSetErr(ORV_ERR_NONE);
     if (!PathInfoFactory::create(user.name.c_str(), path, item.info)) return lastCode();
@@ -34,7 +41,9 @@ int openItem(const User& user, const std::string& path, std::initializer_list<Ne
         code = judge(user, item.info.path, need);
         if (code != ORV_ERR_NONE) return code;
     }
-    code = openPresent(item.info, user.name, item.place);
+    code = openPresent(item.info, item.place);
+    if (code != ORV_ERR_NONE) return code;
+    code = checkChangeable(needs, item.place.folder, item.place.name);
     if (code != ORV_ERR_NONE) return code;
     item.realFolder = realPathOf(item.place.folder);
     const bool there = !item.realFolder.empty() && fstatat(item.place.folder.get(), item.place.name.c_str(),

@@ -39,6 +39,9 @@ struct Item {
     [[nodiscard]] std::string realPath() const { return realFolder + "/" + place.name; }
 };
 
+// Whether what is needed may be done in that folder: 0, or 411 for a change in a snapshot.
+int checkChangeable(std::initializer_list<Need> needs, const Descriptor& folder, const std::string& name);
+
 // Resolves `path`, asks the share's rules (`needs` one after the other) and looks, as the user. 0 or a library code.
 int openItem(const User& user, const std::string& path, std::initializer_list<Need> needs, Item& item);
 

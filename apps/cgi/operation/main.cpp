@@ -37,6 +37,7 @@ constexpr Action kActions[] = {{"mkdir", Takes::kPath, true, Need::kCreate, make
                                {"move", Takes::kPaths, true, Need::kModify, moveOperation},
                                {"delete", Takes::kPaths, true, Need::kModify, deleteOperation},
                                {"restore", Takes::kPaths, true, Need::kModify, restoreOperation},
+                               {"recover", Takes::kPaths, true, Need::kModify, recoverOperation},
                                {"empty", Takes::kPaths, true, Need::kModify, emptyOperation},
                                {"compress", Takes::kPaths, true, Need::kRead, compressOperation},
                                {"extract", Takes::kPaths, true, Need::kRead, extractOperation},

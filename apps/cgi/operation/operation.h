@@ -47,6 +47,11 @@ int moveOperation(Operation& operation);
 int deleteOperation(Operation& operation);
 // Puts what lies in a recycle bin back where it was; "conflict" as above.
 int restoreOperation(Operation& operation);
+// Restores what lies at the paths from the snapshot "snapshot" or "snapshot_raw" (see list/versions.h): over what is
+// there
+// ("conflict" as above; what is replaced goes into the recycle bin where the share has one), or with "beside" = "true"
+// under a name with the date. What may not be read now is left out.
+int recoverOperation(Operation& operation);
 // Empties the recycle bin of the share that the path lies in.
 int emptyOperation(Operation& operation);
 // "target" or "target_raw": the zip to make; "conflict" as above.

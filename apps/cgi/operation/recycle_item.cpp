@@ -12,17 +12,14 @@
 #include "orvel/error_state.h"
 
 namespace orvel::cgi {
-namespace {
 
-void note(const RecycleBin& bin, const Entry& place, const User& user) {
+void noteInBin(const RecycleBin& bin, const Entry& place, const User& user) {
     struct stat status {};
     if (fstatat(place.folder, place.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) return;
     const std::string path = place.path.substr(bin.sharePath().size() + 1);
     if (noteDeletion(bin.recorded(), path, status.st_ino, user.name)) return;
     syslog(LOG_WARNING, "a deletion is not recorded: %s", strerror(errno));
 }
-
-}  // namespace
 
 bool recycleItem(const RecycleBin& bin, const Item& item, const User& user, Progress& progress) {
     Target folder;
@@ -38,7 +35,7 @@ bool recycleItem(const RecycleBin& bin, const Item& item, const User& user, Prog
         {.conflict = Conflict::kKeepBoth, .move = true, .owner = owner, .onFat = false, .nextName = nextBinName});
     const bool gone = transfer.run(item, place);
     if (gone) {
-        note(bin, place, user);
+        noteInBin(bin, place, user);
     } else {
         removeMadeFolders(folder);  // as far as nothing arrived
     }

@@ -4,6 +4,7 @@
 #include <cerrno>
 
 #include "base/new_file.h"
+#include "operation/item.h"
 #include "operation/operation.h"
 #include "operation/task_start.h"
 #include "operation/undo_record.h"
@@ -20,13 +21,14 @@ int renameOperation(Operation& operation) {
     const auto name = bytesParam(operation.web, "name");
     if (!name) return ORV_ERR_PARAMETER;
     Target target;
-    int code = openPresent(info, operation.user.name, target);
+    int code = openPresent(info, target);
     if (code != ORV_ERR_NONE) return code;
     struct stat status {};
     const bool isFolder =
         fstatat(target.folder.get(), target.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISDIR(status.st_mode);
     const std::string renamed = info.path.substr(0, info.path.rfind('/') + 1) + *name;
-    code = checkNewName(target.folder, *name);
+    code = checkChangeable({Need::kModify}, target.folder, target.name);
+    if (code == ORV_ERR_NONE) code = checkNewName(target.folder, *name);
     if (code == ORV_ERR_NONE && !renameNew(target.folder.get(), target.name, target.folder.get(), *name)) {
         code = OrvParseErrnoToError(errno, info.shareName.c_str(), info.realPath.c_str());
     }

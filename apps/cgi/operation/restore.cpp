@@ -10,19 +10,6 @@
 namespace orvel::cgi {
 namespace {
 
-// The folders above `path` that were made for it, the topmost first.
-void noteMade(const Target& place, std::string path, UndoRecord& undo) {
-    std::vector<std::string> paths;
-    for (size_t i = 0; i < place.made.size(); ++i) {
-        path.resize(path.rfind('/'));
-        paths.push_back(path);
-    }
-    for (const MadeFolder& made : place.made) {
-        undo.made(made.parent.get(), made.name, paths.back());
-        paths.pop_back();
-    }
-}
-
 void restoreOne(Operation& operation, size_t position, Conflict conflict, ChangeNotices& notices, Progress& progress) {
     const User& user = operation.user;
     Item item;

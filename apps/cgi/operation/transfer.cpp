@@ -82,9 +82,10 @@ void Transfer::noteMoved(const Entry& from, const struct stat& status, const Ent
 }
 
 void Transfer::noteCopied(const Entry& from, const struct stat& status, const Entry& to, bool replace) {
-    if (replace) {
+    if (replace && rules_.replacing == nullptr) {
         progress_.undo().leaveOut();
     } else {
+        if (replace) rules_.replacing->replaced(progress_.undo());
         progress_.undo().copied(to.folder, to.name, to.path, from.path, status);
     }
 }
@@ -125,7 +126,16 @@ Transfer::Result Transfer::resolve(const Entry& from, const struct stat& status,
     }
     if (rules_.conflict == Conflict::kError || !sameKind) return failed(from, ORV_ERR_EXISTS);
     if (isSameFile(status, there)) return failed(from, ORV_ERR_SELECT_CONFLICT);
-    return make(from, status, to, true);
+    return merging || rules_.replacing == nullptr ? make(from, status, to, true) : replace(from, status, to, there);
+}
+
+Transfer::Result Transfer::replace(const Entry& from, const struct stat& status, const Entry& to,
+                                   const struct stat& there) {
+    const int code = rules_.replacing->keep(to, there);
+    if (code != ORV_ERR_NONE) return failed(to, code);
+    const Result result = make(from, status, to, true);
+    if (result != Result::kDone) rules_.replacing->giveBack();
+    return result;
 }
 
 Transfer::Result Transfer::keepBoth(const Entry& from, const struct stat& status, Entry& to) {
@@ -318,7 +328,11 @@ bool Transfer::fillFrom(const Entry& from, const Descriptor& source, const Entry
             all = false;
             continue;
         }
-        if (fstatat(child.folder, child.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+        const int refusal = rules_.judge ? rules_.judge(child.path) : static_cast<int>(ORV_ERR_NONE);
+        if (refusal != ORV_ERR_NONE) {
+            failed(child, refusal);
+            all = false;
+        } else if (fstatat(child.folder, child.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
             failedWith(child, errno);
             all = false;
         } else {

@@ -2,6 +2,7 @@
 #ifndef ORVEL_CGI_OPERATION_TRANSFER_H
 #define ORVEL_CGI_OPERATION_TRANSFER_H
 
+#include <functional>
 #include <optional>
 #include <set>
 #include <string>
@@ -14,6 +15,17 @@
 #include "operation/progress.h"
 
 namespace orvel::cgi {
+
+// Keeps what a copy is about to replace.
+class Replacing {
+ public:
+    virtual ~Replacing() = default;
+    // Before: what is there is also elsewhere from then on, or there alone. 0, or a code why it is not to be replaced.
+    virtual int keep(const Entry& there, const struct stat& status) = 0;
+    // It was replaced; `undo` learns where it is. Or it was not.
+    virtual void replaced(UndoRecord& undo) = 0;
+    virtual void giveBack() = 0;
+};
 
 // Files appear under their names whole or not at all, with the permissions and times of the source; a new folder gets
 // them once it is filled. Links are copied as they are. What fails is reported, each item for itself, and the rest goes
@@ -30,6 +42,8 @@ class Transfer {
         Owner owner;
         bool onFat;  // the target: names that differ only in case are one there
         std::string (*nextName)(const std::string& name, int number, bool isFolder) = numberedName;  // see kKeepBoth
+        Replacing* replacing = nullptr;                          // files and links, of a copy
+        std::function<int(const std::string& path)> judge = {};  // 0, or why what lies in a folder is not copied
     };
     Transfer(Progress& progress, const Rules& rules) : progress_(progress), rules_(rules) {}
 
@@ -55,6 +69,7 @@ class Transfer {
 
     Result place(const Entry& from, const struct stat& status, Entry& to, Names& taken);
     Result resolve(const Entry& from, const struct stat& status, Entry& to);
+    Result replace(const Entry& from, const struct stat& status, const Entry& to, const struct stat& there);
     Result keepBoth(const Entry& from, const struct stat& status, Entry& to);
     Result make(const Entry& from, const struct stat& status, const Entry& to, bool replace);
     Result rename(const Entry& from, const struct stat& status, const Entry& to, bool replace);

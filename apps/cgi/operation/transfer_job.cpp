@@ -109,6 +109,18 @@ int openOrigin(const User& user, const std::string& path, Missing missing, Confl
     return openTarget(info, linkPolicyOf(info.shareName), user.name, missing, place);
 }
 
+void noteMade(const Target& place, std::string path, UndoRecord& undo) {
+    std::vector<std::string> paths;
+    for (size_t i = 0; i < place.made.size(); ++i) {
+        path.resize(path.rfind('/'));
+        paths.push_back(path);
+    }
+    for (const MadeFolder& made : place.made) {
+        undo.made(made.parent.get(), made.name, paths.back());
+        paths.pop_back();
+    }
+}
+
 int startTransfer(Operation& operation, bool move) {
     const auto target = bytesParam(operation.web, "target");
     const auto conflict = conflictOf(operation.web.GetParam("conflict", "error"));

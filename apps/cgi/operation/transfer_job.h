@@ -20,6 +20,9 @@ int judgeTarget(const User& user, const PathInfo& info, Conflict& conflict);
 int openOrigin(const User& user, const std::string& path, Missing missing, Conflict& conflict, PathInfo& info,
                Target& place);
 
+// Records the folders above `path` that were made for it, the topmost first.
+void noteMade(const Target& place, std::string path, UndoRecord& undo);
+
 // Whether the file system of the open folder is one where case does not count.
 bool isOnFat(const Descriptor& folder);
 

@@ -34,6 +34,7 @@ class Undo {
           progress_(progress),
           notices_(operation, "search"),
           byMove_(operation.web.GetParam("taskid", "").find("_move_") != std::string::npos),
+          byRecovery_(operation.web.GetParam("taskid", "").find("_recover_") != std::string::npos),
           byRestore_(operation.web.GetParam("taskid", "").find("_restore_") != std::string::npos) {
         UndoItem item;
         for (size_t i = 0; i < file.size(); ++i) {
@@ -69,7 +70,7 @@ class Undo {
     }
     [[nodiscard]] bool isSourceThere(const UndoItem& item) const {
         Item source;
-        if (!S_ISREG(item.status.st_mode)) return true;
+        if (!S_ISREG(item.status.st_mode) || byRecovery_) return true;  // a snapshot is nobody's to look after
         return openItem(user_, item.other, {}, source) == ORV_ERR_NONE && S_ISREG(source.status.st_mode) &&
                source.status.st_size == item.status.st_size &&
                std::abs(source.status.st_mtim.tv_sec - item.status.st_mtim.tv_sec) <= 2;
@@ -91,7 +92,7 @@ class Undo {
     const User& user_;
     Progress& progress_;
     ChangeNotices notices_;
-    bool byMove_, byRestore_;
+    bool byMove_, byRecovery_, byRestore_;
     std::set<std::string> made_;  // folders that the operation made
     std::string failed_;          // the last one that stays
 };

@@ -3,6 +3,7 @@
 // Parameters:
 //   path_raw, path   the file (see pathParams)
 //   size             the longest edge in pixels, 1 to 2048 (256): 128, 256, 512, 1024 or 2048, whichever is next
+//   snapshot, snapshot_raw the file as it was in that snapshot (see list/versions.h)
 // Answers image/webp or image/png, upright, without what cameras write into pictures. Asks for the same privilege as a
 // download. Failures are JSON replies: 415 for what is no picture, 503 while too many are being made.
 #include <fcntl.h>
@@ -29,6 +30,7 @@
 #include "thumbnail/cache.h"
 #include "thumbnail/kind.h"
 #include "thumbnail/sandbox.h"
+#include "versions/version.h"
 #include "vexo/web.h"
 
 namespace orvel::cgi {
@@ -151,14 +153,16 @@ void serveThumbnailProgram(Request& request, Output& out) {
     const User& user = request.user;
     const auto path = pathParam(request.web);
     const auto size = numberParam(request.web, "size", kDefaultEdge);
-    if (!path || path->empty() || !size || *size < 1 || *size > *std::rbegin(kEdges)) {
+    const auto version = versionParam(request.web);
+    const bool fits = path && !path->empty() && (!namesVersion(request.web) || version);
+    if (!fits || !size || *size < 1 || *size > *std::rbegin(kEdges)) {
         return refuse(out, user, Status::kBadRequest, ORV_ERR_PARAMETER, request.web.GetParam("path", ""));
     }
     const unsigned edge = *std::lower_bound(std::begin(kEdges), std::end(kEdges), *size);
     Source source;
     source.asked = *path;
     int code = actAs(user.sid.c_str(), user.name, IsDirUserHome(*path, nullptr));
-    if (code == ORV_ERR_NONE) code = openToSend(user, source);
+    if (code == ORV_ERR_NONE) code = version ? openVersionToSend(user, *version, source) : openToSend(user, source);
     if (code != ORV_ERR_NONE) return refuse(out, user, httpStatusOf(code), code, *path);
     char begin[kKindBytes];
     const ssize_t got = S_ISREG(source.status.st_mode) ? pread(source.opened.get(), begin, sizeof begin, 0) : 0;

@@ -30,6 +30,28 @@ VEXO_API int VEXOShareGiveNew(int folder, int made, mode_t mode, unsigned switch
 // The path of the recycle bin within the share whose root is `root`: "#recycle", or where the share has Samba's module
 // of that name what recycle:repository says for the user of this request. 0, or -1 with errno and the slot.
 VEXO_API int VEXOShareRecyclePath(const char* root, char* path, int size);
+
+enum {
+    VEXO_SNAPSHOTS_STATED = 0x1,      // the share says where they are; else the members below are not to be used
+    VEXO_SNAPSHOTS_NONE = 0x2,        // it says that there are none, or where in a way that is not known here
+    VEXO_SNAPSHOTS_LOCAL_TIME = 0x4,  // their names are in the machine's time zone, not in UTC
+    VEXO_SNAPSHOTS_EVERYWHERE = 0x8   // `folder` may lie in any folder of the share, of which its snapshots then are
+};
+struct VEXOSNAPSHOTS {
+    unsigned flags;     // VEXO_SNAPSHOTS_...
+    char folder[4096];  // that holds them: absolute, or below the mount point
+    char format[256];   // of their names, as of strptime(3)
+    char base[4096];    // the folder that each is a snapshot of, "" for the mount point
+    char mount[4096];   // the mount point, "" where it is to be found
+    char inside[4096];  // the share's root in a snapshot, "" where it lies as below `base`
+};
+typedef VEXOSNAPSHOTS* PVEXOSNAPSHOTS;
+// Where the snapshots of the share whose root is `root` are, as the options of Samba's shadow_copy2 say (shadow:snapdir
+// and the like). 0, or -1 with errno and the slot.
+VEXO_API int VEXOShareSnapshots(const char* root, PVEXOSNAPSHOTS snapshots);
+// To this process's end, names in `folder` (a real path) and below are those of `realPath`: what a share keeps out of
+// that one is kept out of its snapshot. A further call replaces the one before.
+VEXO_API void VEXOShareStandsFor(const char* folder, const char* realPath);
 VEXO_END_C
 
 #endif

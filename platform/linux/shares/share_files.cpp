@@ -50,6 +50,29 @@ HiddenBin& hiddenBin() {
     return value;
 }
 
+// A snapshot, and the folder that it is of.
+struct StandIn {
+    std::string folder, realPath;
+};
+
+StandIn& standIn() {
+    static auto& value = *new StandIn;
+    return value;
+}
+
+std::string meantBy(const std::string& folder) {
+    const StandIn& stand = standIn();
+    const bool lies = !stand.folder.empty() && folder.starts_with(stand.folder) &&
+                      (folder.size() == stand.folder.size() || folder[stand.folder.size()] == '/');
+    return lies ? stand.realPath + folder.substr(stand.folder.size()) : folder;
+}
+
+bool put(const std::string& text, char* out, size_t size) {
+    if (text.size() >= size) return false;
+    out[text.copy(out, text.size())] = '\0';
+    return true;
+}
+
 // What the names that are asked about are compared with.
 struct Veto {
     std::shared_ptr<const ShareTable> table;  // that it was made from
@@ -63,8 +86,9 @@ Veto& veto() {
     return value;
 }
 
-void lookAt(const std::string& folder, std::shared_ptr<const ShareTable> table) {
+void lookAt(const std::string& asked, std::shared_ptr<const ShareTable> table) {
     Veto& now = veto();
+    const std::string folder = meantBy(asked);
     if (now.table == table && now.folder == folder) return;
     std::vector<std::string> texts;
     for (const ShareDefinition* share : table->holding(folder)) {
@@ -237,4 +261,32 @@ int VEXOShareRecyclePath(const char* root, char* path, int size) try {
     return 0;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+int VEXOShareSnapshots(const char* root, PVEXOSNAPSHOTS out) try {
+    VEXO_GATE("VEXOShareSnapshots", -1);
+    if (root == nullptr || out == nullptr) return vexo::fail(VEXO_ERR_PARAMETER, EINVAL);
+    const auto table = vexo::currentShares();
+    if (table == nullptr) return vexo::fail(VEXO_ERR_GENERAL);
+    const std::vector<const vexo::ShareDefinition*> shares = table->holding(root);
+    const vexo::Snapshots found = shares.empty() ? vexo::Snapshots() : shares.front()->snapshots;
+    out->flags = 0;
+    if (found.stated) out->flags |= VEXO_SNAPSHOTS_STATED;
+    if (!found.known) out->flags |= VEXO_SNAPSHOTS_NONE;
+    if (found.isLocalTime) out->flags |= VEXO_SNAPSHOTS_LOCAL_TIME;
+    if (found.isEverywhere) out->flags |= VEXO_SNAPSHOTS_EVERYWHERE;
+    const bool fits = vexo::put(found.folder, out->folder, sizeof out->folder) &&
+                      vexo::put(found.format, out->format, sizeof out->format) &&
+                      vexo::put(found.base, out->base, sizeof out->base) &&
+                      vexo::put(found.mount, out->mount, sizeof out->mount) &&
+                      vexo::put(found.inside, out->inside, sizeof out->inside);
+    return fits ? 0 : vexo::fail(VEXO_ERR_GENERAL, ENAMETOOLONG);
+} catch (const std::exception&) {
+    return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
+}
+
+void VEXOShareStandsFor(const char* folder, const char* realPath) try {
+    if (folder != nullptr && realPath != nullptr) vexo::standIn() = {folder, realPath};
+} catch (const std::exception&) {
+    abort();  // memory is out: what is to be hidden must not show
 }

@@ -286,6 +286,40 @@ std::string recycleOf(const DefinitionSection& section) {
     return path ? path->substr(1) : std::string();
 }
 
+Snapshots snapshotsOf(const DefinitionSection& section) {
+    Snapshots snapshots;
+    // Nothing stated leaves `path` as it is; what is no path makes all of it unknown.
+    const auto takePath = [&](ShareOption option, std::string& path, bool relative) {
+        const OptionValue& value = section.value(option);
+        if (!value.stated) return;
+        snapshots.stated = true;
+        const bool isAbsolute = value.text.starts_with('/');
+        const auto found = normalRoot(isAbsolute ? value.text : "/" + value.text);
+        if (!found || (!isAbsolute && !relative) || hasVariables(value.text)) snapshots.known = false;
+        if (found) path = isAbsolute ? *found : found->substr(1);
+    };
+    const auto isOn = [&](ShareOption option) {
+        const OptionValue& value = section.value(option);
+        return value.stated && parseBoolean(value.text).value_or(false);
+    };
+    takePath(ShareOption::shadowFolder, snapshots.folder, true);
+    takePath(ShareOption::shadowBase, snapshots.base, false);
+    takePath(ShareOption::shadowMount, snapshots.mount, false);
+    takePath(ShareOption::shadowInside, snapshots.inside, true);
+    if (snapshots.inside.starts_with('/')) snapshots.inside.erase(0, 1);
+    const OptionValue& format = section.value(ShareOption::shadowFormat);
+    if (format.stated) snapshots.format = format.text;
+    snapshots.isLocalTime = isOn(ShareOption::shadowLocal);
+    snapshots.isEverywhere = isOn(ShareOption::shadowEverywhere);
+    snapshots.stated = snapshots.stated || format.stated || snapshots.isEverywhere;
+    // Names by these are read otherwise than by the format alone.
+    for (const ShareOption option : {ShareOption::shadowPrefix, ShareOption::shadowDelimiter}) {
+        if (!section.value(option).text.empty()) snapshots.stated = true, snapshots.known = false;
+    }
+    if (isOn(ShareOption::shadowScan)) snapshots.stated = true, snapshots.known = false;
+    return snapshots;
+}
+
 std::string offReason(const DefinitionSection& section, Values& values) {
     const std::string key = foldedName(section.name);
     if (!values.boolean(ShareOption::available, true)) return "available = no";
@@ -306,6 +340,7 @@ ShareDefinition takeOptions(Values& values, const DefinitionSection& section) {
     share.acl = values.boolean(ShareOption::acl, false);
     share.newFiles = newFilesOf(values);
     share.recycle = recycleOf(section);
+    share.snapshots = snapshotsOf(section);
     share.synced = values.boolean(ShareOption::synced, false);
     // One index cannot be of as many folders as there are users.
     share.index = values.boolean(ShareOption::index, false) && !hasVariables(share.path) && !section.user;

@@ -21,6 +21,19 @@ struct NewFiles {
     std::string group;         // "" for none; behind "+" for its members alone
 };
 
+// Where the snapshots of a share lie, as the options of Samba's shadow_copy2 say.
+struct Snapshots {
+    bool stated = false;
+    bool known = true;  // false: it says none, or says it in a way that is not known here
+    bool isLocalTime = false;
+    bool isEverywhere = false;
+    std::string folder = ".snapshots";  // absolute, or below the mount point
+    std::string format = "@GMT-%Y.%m.%d-%H.%M.%S";
+    std::string base;    // which folder a snapshot is of; "" for the mount point
+    std::string mount;   // "" to find it
+    std::string inside;  // where the share lies in a snapshot; "" to find it
+};
+
 struct ShareDefinition {
     std::string name;
     std::string path;     // absolute, possibly with variables
@@ -37,6 +50,7 @@ struct ShareDefinition {
     NewFiles newFiles;
     std::vector<std::string> veto;  // patterns of names that it keeps out
     std::string recycle;            // where Samba's recycle bin lies in it, possibly with variables; "" without one
+    Snapshots snapshots;
 };
 
 struct ShareReading {
