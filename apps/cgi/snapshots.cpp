@@ -106,7 +106,7 @@ std::optional<time_t> dateInFileSystem(const Descriptor& snapshot) {
     if (fstat(snapshot.get(), &status) != 0 || status.st_ino != kSubvolume) return std::nullopt;
     const Descriptor opened(open(snapshot.path().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     btrfs_ioctl_get_subvol_info_args subvolume{};
-    if (!opened || ioctl(opened.get(), BTRFS_IOC_GET_SUBVOL_INFO, &subvolume) != 0) return std::nullopt;
+    if (!opened || ioctl(opened.get(), BTRFS_IOC_GET_SUBVOL_INFO, &subvolume) < 0) return std::nullopt;
     return subvolume.otime.sec != 0 ? std::optional(static_cast<time_t>(subvolume.otime.sec)) : std::nullopt;
 }
 

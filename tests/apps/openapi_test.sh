@@ -8,5 +8,9 @@ projects=$(root_of projects)
 mkdir "$projects"/$'not\xFFtext'
 chown --reference="$projects" "$projects"/$'not\xFFtext'
 mkdir -m 700 "$projects"/$'not\xFFtext'/closed
+for snapshot in @GMT-2026.11.01-12.00.00 $'2026-10-01\xFF'; do
+    mkdir -p "$projects/.snapshots/$snapshot"
+    cp "$projects/notes.md" "$projects/.snapshots/$snapshot/"
+done
 /usr/bin/python3 "$here/openapi.py" "$here/../.." "$build" "http://127.0.0.1:$port" || failures=$((failures + 1))
 finish

@@ -35,7 +35,8 @@ class VersionsCgi : public TaskCgi {
     // "SNAPSHOT SIZE xSAME" of each.
     static Names rows(const std::string& path) {
         Names all;
-        for (const Json::Value& row : versions(path).json["data"]["items"]) {
+        const CgiReply reply = versions(path);
+        for (const Json::Value& row : reply.json["data"]["items"]) {
             all.push_back(row["snapshot"].asString() + " " + row["size"].asString() + " x" + row["same"].asString() +
                           (row["current"].asBool() ? " now" : ""));
         }
@@ -45,9 +46,11 @@ class VersionsCgi : public TaskCgi {
         return "path_raw=" + percentEncode(percentEncode(path)) +
                "&snapshot_raw=" + percentEncode(percentEncode(snapshot));
     }
-    static CgiReply fetch(const std::string& path, const std::string& snapshot, const std::string& user = "alice",
-                          const Variables& more = {}) {
-        return get(PROGRAM_DOWNLOAD, user, of(path, snapshot), more);
+    static RawReply fetch(const std::string& path, const std::string& snapshot, const Variables& more = {}) {
+        return RawReply(runCgi(PROGRAM_DOWNLOAD, "alice", "GET", of(path, snapshot), "", more));
+    }
+    static int refusal(const std::string& path, const std::string& snapshot, const std::string& user = "alice") {
+        return code(get(PROGRAM_DOWNLOAD, user, of(path, snapshot)));
     }
     static Names folder(const std::string& path, const std::string& snapshot) {
         return each(get(PROGRAM_LIST, "alice", "action=folder&" + of(path, snapshot)).json["data"]["items"], "name");
@@ -70,7 +73,7 @@ TEST_F(VersionsCgi, AreListedSentAndRestored) {
     EXPECT_EQ(row["time"].asInt64(), kSecondTime);
     EXPECT_EQ(row["dated"], "name");
 
-    const CgiReply part = fetch("/photo/a/f.txt", kFirst, "alice", {{"HTTP_RANGE", "bytes=1-"}});
+    const RawReply part = fetch("/photo/a/f.txt", kFirst, {{"HTTP_RANGE", "bytes=1-"}});
     EXPECT_EQ(part.status, 206);
     EXPECT_EQ(part.body, "ld");
     EXPECT_NE(part.headers.at("Content-Disposition").find("f (2026-11-0"), std::string::npos);
@@ -141,8 +144,6 @@ TEST_F(VersionsCgi, AreShownToWhomTheFileIs) {
          .code = 407},
         {.what = "share", .change = [] {}, .user = "carol", .code = 407},
         {.what = "then", .change = [&] { chmod((snapshot + "/a/f.txt").c_str(), 0600); }, .code = 407},
-        {.what = "a folder that is a file now",
-         .change = [&] { fs::remove_all(photo_ + "/a"), writeFile(photo_ + "/a", "x"); }},
         {.what = "a snapshot that is a link",
          .change = [&] { fs::rename(snapshot, video_ + "/s"), fs::create_symlink(video_ + "/s", snapshot); }},
         {.what = "snapshots behind a link",
@@ -182,8 +183,7 @@ TEST_F(VersionsCgi, AreShownToWhomTheFileIs) {
         put("", "/a/f.txt", "new!", 3000);
         put(kFirst, "/a/f.txt", "old", 5);
         hostile.change();
-        const CgiReply reply = fetch(hostile.path, hostile.name, hostile.user);
-        EXPECT_EQ(code(reply), hostile.code) << reply.body;
+        EXPECT_EQ(refusal(hostile.path, hostile.name, hostile.user), hostile.code);
         const CgiReply listed = versions(hostile.path, hostile.user);
         EXPECT_EQ(listed.json["data"]["items"].size(),
                   0U + (hostile.name != kFirst || std::string_view(hostile.what) == "then" ? 1 : 0))
@@ -201,8 +201,6 @@ TEST_F(VersionsCgi, AreNeverWrittenTo) {
     EXPECT_EQ(errors(perform("alice", "action=delete" + about({file}))), file + " 411\n");
     EXPECT_EQ(errors(perform("alice", "action=copy" + about({"/photo/a/f.txt"}, place) + "&conflict=overwrite")),
               "/photo/a/f.txt 411\n");
-    EXPECT_EQ(errors(perform("alice", "action=copy" + about({file}, "/video"))), "/video/f.txt 407\n");
-    ASSERT_EQ(chmod(video_.c_str(), 0777), 0);
     EXPECT_EQ(errors(perform("alice", "action=copy" + about({file}, "/video"))), "") << "but read";
     EXPECT_EQ(readFile(photo_ + "/.snapshots/" + kFirst + "/a/f.txt"), "old");
 }
@@ -233,20 +231,18 @@ TEST_F(VersionsCgi, AreFoundWhereTheShareSays) {
         addShare("photo", "read only = no\nveto files = /hidden/\n" + stated.options);
         const Json::Value items = versions("/photo/a/f.txt").json["data"]["items"];
         EXPECT_EQ(each(items, "snapshot"), stated.snapshot.empty() ? Names{} : Names{stated.snapshot});
-        if (!stated.snapshot.empty()) EXPECT_EQ(fetch("/photo/a/f.txt", stated.snapshot).body, stated.text);
+        if (stated.snapshot.empty()) continue;
+        EXPECT_EQ(fetch("/photo/a/f.txt", stated.snapshot).body, stated.text);
     }
     addShare("photo", "read only = no\nveto files = /hidden/\n" + cases[0].options);
     writeFile(away + "/d1 2026_11_01/" + name + "/a/hidden", "x");
     EXPECT_EQ(folder("/photo/a", "d1 2026_11_01"), Names{"f.txt"}) << "what the share vetoes";
-    EXPECT_EQ(code(fetch("/photo/a/hidden", "d1 2026_11_01")), 408);
+    EXPECT_EQ(refusal("/photo/a/hidden", "d1 2026_11_01"), 408);
 }
 
 TEST_F(VersionsCgi, OfAThousandSnapshotsAreOneWhereNothingChanged) {
-    for (int i = 1000; i < 2000; ++i) put("daily-" + std::to_string(i) + "-01-01_00-00", "/a/f.txt", "old", 5);
-    EXPECT_EQ(rows("/photo/a/f.txt"), Names()) << "no year of these is one";
-    fs::remove_all(photo_ + "/.snapshots");
-    for (int i = 2000; i < 2999; ++i) put("daily-" + std::to_string(i) + "-01-01_00-00", "/a/f.txt", "old", 5);
-    EXPECT_EQ(rows("/photo/a/f.txt"), Names{"daily-2998-01-01_00-00 3 x999"});
+    for (int i = 1990; i < 2990; ++i) put("daily-" + std::to_string(i) + "-01-01_00-00", "/a/f.txt", "old", 5);
+    EXPECT_EQ(rows("/photo/a/f.txt"), Names{"daily-2989-01-01_00-00 3 x1000"});
 }
 
 TEST(SnapshotDate, IsReadFromNames) {
