@@ -161,6 +161,17 @@ addCommand({
   run: ({ single }) => showSpaceOf(single?.id ?? browser.id),
 });
 addCommand({
+  id: "versions",
+  icon: "restore",
+  keys: ["Alt+v"],
+  group: "info",
+  when: ({ single, count, folder, search, inBin }) => folder && !inBin && (single ? !isOffline(single) : count === 0 && !search),
+  run: async ({ single, canPermit }) => {
+    const module = await loaded(import("./versions.js"));
+    await module?.showVersions(single ?? { id: browser.id, isFolder: true }, canPermit);
+  },
+});
+addCommand({
   id: "permissions",
   icon: "lock",
   keys: ["Alt+p"],

@@ -1,9 +1,10 @@
 // What is known of an entry, in a dialog: its facts, what it holds, and why somebody may use it.
 
+import { mayModify } from "./access.js";
 import { shareEntry } from "./browser.js";
-import { dialog, toastFailure } from "./dialogs.js";
+import { dialog, loaded, toastFailure } from "./dialogs.js";
 import { h, icon, nameNode, plainName } from "./dom.js";
-import { isOffline, typeOf } from "./entries.js";
+import { isInBin, isOffline, isReadOnlyShare, typeOf } from "./entries.js";
 import { formatFullTime, formatMode, formatSize } from "./format.js";
 import { iconOf } from "./icons.js";
 import "./later.js";
@@ -18,6 +19,12 @@ import { whyNode } from "./why.js";
 function contentNode({ id }) {
   const more = h("button.button.outlined", { type: "button", onclick: () => showSpaceOf(id) }, icon("space"), t("command.space"));
   return sizesNode([{ id }], { without: 1, more: [h("p.size-actions", {}, more)] });
+}
+
+async function openVersions(entry) {
+  const module = await loaded(import("./versions.js"));
+  const share = shareEntry(entry.id);
+  await module?.showVersions(entry, share !== undefined && !isReadOnlyShare(share) && mayModify(entry.id));
 }
 
 // Of an entry, or of the folder with an id.
@@ -65,6 +72,9 @@ export async function showProperties(what) {
       h(
         "footer",
         {},
+        !isOffline(entry) &&
+          !isInBin(entry.id) &&
+          h("button.button.outlined", { type: "button", onclick: () => openVersions(entry) }, icon("restore"), t("command.versions")),
         h(
           "button.button.outlined",
           { type: "button", onclick: () => copyPath(entry.id) },

@@ -27,6 +27,7 @@ const ICONS = {
   move: "move",
   delete: "trash",
   restore: "restore",
+  recover: "restore",
   empty: "trash",
   compress: "archive",
   extract: "extract",

@@ -65,7 +65,7 @@ export function contextItems() {
       "-",
       ...items(["undo", "paste", "selectAll", "refresh"]),
       "-",
-      ...items(["favour", "unfavour", "emptyBin", "space", "permissions", "properties"]),
+      ...items(["favour", "unfavour", "emptyBin", "space", "versions", "permissions", "properties"]),
     ];
   }
   return [
@@ -77,7 +77,7 @@ export function contextItems() {
     "-",
     ...items(["delete", "deleteForever"]),
     "-",
-    ...items(["favour", "unfavour", "copyPath", "space", "permissions", "properties"]),
+    ...items(["favour", "unfavour", "copyPath", "space", "versions", "permissions", "properties"]),
   ];
 }
 

@@ -13,7 +13,7 @@ const PIECE = 256 * 1024;
 const LONGEST = 4; // bytes of a character
 const MOST_COLOURED = 150 * 1000; // characters
 
-// The node of a text; null for what is none.
+// The node of a text; null for what is none. `source`: what says to a program which file, where that is not by its id alone.
 export async function textNode(entry, signal) {
   loadStyle("documents");
   const reader = new Reader(entry, signal);
@@ -44,7 +44,7 @@ class Reader {
   // Whether it is a text.
   async read(offset) {
     const range = { Range: `bytes=${offset}-${offset + PIECE + LONGEST - 2}` };
-    const response = await send(urlOf("download", { path_raw: this.entry.id }), { headers: range, signal: this.signal });
+    const response = await send(urlOf("download", this.entry.source ?? { path_raw: this.entry.id }), { headers: range, signal: this.signal });
     if (!response.ok) readReply(response.status, await response.text());
     const bytes = new Uint8Array(await response.arrayBuffer());
     this.encoding ??= detect(bytes, this.entry.size > bytes.length);
