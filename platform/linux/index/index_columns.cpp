@@ -33,6 +33,8 @@ using Record = __tag_FI_FILE_INFO_DATA;
 constexpr std::array<const char * Record::*, 9> kTextFields = {
     &Record::szName,      &Record::szShare,      &Record::szPath,  &Record::szParent, &Record::szShareRoot,
     &Record::szExtension, &Record::szPermission, &Record::szOwner, &Record::szGroup};
+// Of these, what the index of a share does not store.
+constexpr std::array<bool, kTextFields.size()> kImplied = {false, true, true, false, true};
 constexpr std::array<int64_t Record::*, 5> kLongFields = {&Record::size, &Record::created, &Record::changed,
                                                           &Record::accessed, &Record::modified};
 constexpr std::array<uint32_t Record::*, 3> kShortFields = {&Record::mode, &Record::uid, &Record::gid};
@@ -42,17 +44,28 @@ constexpr std::array<uint32_t Record::*, 3> kShortFields = {&Record::mode, &Reco
 const char* const kRecordColumns =
     "name,share,path,parent,share_root,extension,permission,owner,group_name,"
     "is_dir,size,created,changed,accessed,modified,mode,uid,gid";
-const char* const kRecordMarks = "?,?,?,?,?,?,?,?,?,?,?,?,?,?,?,?,?,?";
 
 const Column* columnOf(int number) {
     const bool known = number >= 0 && static_cast<size_t>(number) < kColumns.size();
     return known ? &kColumns[static_cast<size_t>(number)] : nullptr;
 }
 
-bool bindRecord(Statement& statement, const Record& record) {
-    int at = 0;
-    for (const auto field : kTextFields) {
-        const char* text = record.*field;
+bool isStoredInShare(int column) {
+    return column != FI_COL_SHARE && column != FI_COL_PATH && column != FI_COL_SHARE_ROOT;
+}
+
+std::string insertionSql(bool ofShare) {
+    return ofShare
+               ? "INSERT OR IGNORE INTO record(name,parent,extension,permission,owner,group_name,is_dir,size,created,"
+                 "changed,accessed,modified,mode,uid,gid,id) VALUES(?,?,?,?,?,?,?,?,?,?,?,?,?,?,?,?)"
+               : std::string("INSERT OR IGNORE INTO record(") + kRecordColumns +
+                     ",id) VALUES(?,?,?,?,?,?,?,?,?,?,?,?,?,?,?,?,?,?,?)";
+}
+
+bool bindRecord(Statement& statement, const Record& record, bool ofShare, int& at) {
+    for (size_t i = 0; i < kTextFields.size(); ++i) {
+        if (ofShare && kImplied[i]) continue;
+        const char* text = record.*kTextFields[i];
         if (!statement.bindText(++at, text == nullptr ? "" : text)) return false;
     }
     if (!statement.bind(++at, static_cast<int64_t>(record.isDir != 0))) return false;

@@ -2,6 +2,7 @@
 #ifndef VEXO_LINUX_INDEX_COLUMNS_H
 #define VEXO_LINUX_INDEX_COLUMNS_H
 
+#include <string>
 #include <string_view>
 
 #include "index/index_statement.h"
@@ -17,13 +18,17 @@ struct Column {
 // Null for a number that is no column's.
 [[nodiscard]] const Column* columnOf(int number);
 
-// "share,path,..." in the order of bindRecord and readRecord, and as many "?".
+// "name,share,..." in the order of OwnedRecord.
 extern const char* const kRecordColumns;
-extern const char* const kRecordMarks;
 constexpr int kRecordWidth = 18;  // how many they are
 
-// Borrows the record's texts until the statement is reset.
-[[nodiscard]] bool bindRecord(Statement& statement, const __tag_FI_FILE_INFO_DATA& record);
+// Whether the index of a share stores the column: its path, share and root follow from others.
+[[nodiscard]] bool isStoredInShare(int column);
+
+// Adds a record unless one is there; the last value is its id. bindRecord gives the others, borrows the record's texts
+// until the statement is reset, and says in `at` how many they were.
+[[nodiscard]] std::string insertionSql(bool ofShare);
+[[nodiscard]] bool bindRecord(Statement& statement, const __tag_FI_FILE_INFO_DATA& record, bool ofShare, int& at);
 
 // A record with its texts.
 class OwnedRecord {

@@ -43,9 +43,9 @@ bool insertInto(const char* out, const std::vector<__tag_FI_FILE_INFO_DATA>& rec
            (!atOnce || lease->commit());
 }
 
-// The first rows are committed at once, since somebody waits for them. The share's root is what it is now: the rows may
-// be older than a move of the share's folder.
-bool copy(IndexSearch& search, const char* root, const char* out, const Tests& tests, const int* cancel) {
+// The first rows are committed at once, since somebody waits for them. The index knows neither the share's name
+// nor its root.
+bool copy(IndexSearch& search, const VEXOSHARE& share, const char* out, const Tests& tests, const int* cancel) {
     size_t most = search.isShort() ? kPart : kFirstPart;
     bool isFirst = true;
     size_t ordered = 0;
@@ -61,7 +61,8 @@ bool copy(IndexSearch& search, const char* root, const char* out, const Tests& t
         for (const OwnedRecord& record : part) {
             if (isCancelled(cancel)) break;
             __tag_FI_FILE_INFO_DATA view = record.view();
-            view.szShareRoot = root;
+            view.szShare = share.szName;
+            view.szShareRoot = share.szPath;
             if (holds(tests, view)) kept.push_back(view);
         }
         if (inOrder && (ordered += kept.size()) == kOrdered) search.endOrder();
@@ -114,7 +115,7 @@ int FILEIDXResultGetShown(const char* share, const __tag_FI_SQL_COND* paths, con
         if (!search->begin(byName ? openNames(share, *index) : nullptr, byName && shown->descending != 0)) return -1;
     }
     const Tests tests = {accessTest, accessArg, folderTest, folderArg};
-    return copy(*search, record->szPath, out, tests, cancel) ? 0 : -1;
+    return copy(*search, *record, out, tests, cancel) ? 0 : -1;
 } catch (const std::exception&) {
     return vexo::fail(VEXO_ERR_GENERAL, ENOMEM);
 }

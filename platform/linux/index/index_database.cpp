@@ -35,6 +35,17 @@ constexpr std::array<const char*, 4> kSchema = {
     "CREATE TABLE ranking(id INTEGER PRIMARY KEY,records BLOB)",
 };
 
+// The first of these in the index of a share: paths are made of what else a record has, the share is always the same.
+constexpr const char* kRecordOfShare =
+    "CREATE TABLE record(id INTEGER PRIMARY KEY,name TEXT,share TEXT AS (''),"
+    "path TEXT AS (CASE parent WHEN '' THEN name ELSE parent||'/'||name END),parent TEXT,share_root TEXT AS (''),"
+    "extension TEXT,permission TEXT,owner TEXT,group_name TEXT,is_dir INTEGER,size INTEGER,created INTEGER,"
+    "changed INTEGER,accessed INTEGER,modified INTEGER,mode INTEGER,uid INTEGER,gid INTEGER)";
+
+const char* schemaAt(size_t at, bool isIndex) {
+    return isIndex && at == 0 ? kRecordOfShare : kSchema[at];
+}
+
 std::string_view bytesOf(sqlite3_value* value) {
     const auto* text = static_cast<const char*>(sqlite3_value_blob(value));
     return text == nullptr ? std::string_view() : std::string_view(text, sqlite3_value_bytes(value));
@@ -109,7 +120,10 @@ void limit(sqlite3* db, bool ofShare) {
 
 }  // namespace
 
+// Filled in no order, the unique index takes twice the room of one that is made anew; what that frees is used by the
+// others.
 const char* const kShareSchema =
+    "REINDEX record_address;"
     "CREATE INDEX record_parent ON record(parent);"
     "CREATE VIRTUAL TABLE trigram USING fts5(name,content='',columnsize=0,detail=none,"
     "tokenize='trigram case_sensitive 1');"
@@ -143,12 +157,12 @@ std::unique_ptr<Database> Database::open(const std::string& path, OpenMode mode)
                       (mode.readOnly ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE);
     sqlite3* db = nullptr;
     const int result = sqlite3_open_v2(resolved.c_str(), &db, flags, trustedFileSystem());
-    std::unique_ptr<Database> database(new Database(path, db, mode.ofShare));
+    std::unique_ptr<Database> database(new Database(path, db, mode));
     if (result != SQLITE_OK) {
         failSql(db, result);
         return nullptr;
     }
-    if (database->configure(mode) && database->hasOurSchema(mode.ofShare)) return database;
+    if (database->configure(mode) && database->hasOurSchema()) return database;
     // What a killed writer began must be taken back before anybody reads, and only a writer can.
     const bool unfinished = sqlite3_extended_errcode(db) == SQLITE_READONLY_ROLLBACK;
     database.reset();
@@ -156,7 +170,7 @@ std::unique_ptr<Database> Database::open(const std::string& path, OpenMode mode)
     return open(path, mode);
 }
 
-bool Database::create(const std::string& path) {
+bool Database::create(const std::string& path, OpenMode mode) {
     const std::string resolved = resolveFolder(path);
     if (resolved.empty() || !openFile(resolved, O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW, 0600)) {
         const int code = errorOfErrno(errno);
@@ -168,9 +182,9 @@ bool Database::create(const std::string& path) {
     sqlite3* db = nullptr;
     constexpr int flags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_NOFOLLOW | SQLITE_OPEN_EXRESCODE;
     const int result = sqlite3_open_v2(resolved.c_str(), &db, flags, trustedFileSystem());
-    Database database(resolved, db, false);
+    Database database(resolved, db, mode);
     const bool opened = result == SQLITE_OK || failSql(db, result);
-    if (opened && database.configure({}) && database.makeSchema()) return true;
+    if (opened && database.configure(mode) && database.makeSchema()) return true;
     const KeepErrno keep;
     database.rollBack();
     unlink(resolved.c_str());
@@ -206,19 +220,19 @@ bool Database::makeSchema() {
         "PRAGMA page_size=" + std::to_string(kPageSize) +
         ";PRAGMA auto_vacuum=NONE;BEGIN;PRAGMA application_id=" + std::to_string(kApplicationId) + ";";
     if (!execute(db_, identity.c_str())) return false;
-    for (const char* sql : kSchema) {
-        if (!execute(db_, sql)) return false;
+    for (size_t i = 0; i < kSchema.size(); ++i) {
+        if (!execute(db_, schemaAt(i, isIndex_))) return false;
     }
     return execute(db_, "INSERT INTO state VALUES(0,0,0,0,0);COMMIT");
 }
 
-bool Database::hasOurSchema(bool ofShare) {
+bool Database::hasOurSchema() {
     Statement statement;
     if (!statement.prepare(db_, "SELECT coalesce(sql,'') FROM sqlite_schema ORDER BY rowid")) return false;
     size_t rows = 0;
     Statement::Step step = statement.step();
     for (; step == Statement::kRow; step = statement.step()) {
-        const bool known = rows < kSchema.size() ? statement.text(0) == kSchema[rows] : ofShare;
+        const bool known = rows < kSchema.size() ? statement.text(0) == schemaAt(rows, isIndex_) : ofShare_;
         ++rows;
         if (!known) break;
     }

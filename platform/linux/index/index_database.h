@@ -41,7 +41,7 @@ class Database {
     // Null with the slot filled: 0x0900 missing or not to be trusted, 0x0300 denied, 0x8100 no database of ours.
     [[nodiscard]] static std::unique_ptr<Database> open(const std::string& path, OpenMode mode);
     // A new file with no records; 0x0800 when `path` is there already. Nothing is left of one that failed.
-    [[nodiscard]] static bool create(const std::string& path);
+    [[nodiscard]] static bool create(const std::string& path, OpenMode mode = {});
 
     // Takes back what was not committed.
     ~Database();
@@ -70,9 +70,10 @@ class Database {
     [[nodiscard]] bool readHighest(int64_t& id);
 
  private:
-    Database(std::string path, sqlite3* db, bool ofShare) : path_(std::move(path)), db_(db), ofShare_(ofShare) {}
+    Database(std::string path, sqlite3* db, OpenMode mode)
+        : path_(std::move(path)), db_(db), ofShare_(mode.ofShare), isIndex_(mode.ofShare || mode.isNew) {}
     [[nodiscard]] bool configure(OpenMode mode);
-    [[nodiscard]] bool hasOurSchema(bool ofShare);
+    [[nodiscard]] bool hasOurSchema();
     [[nodiscard]] bool boundRoom();
     [[nodiscard]] bool makeSchema();
     [[nodiscard]] bool begin();
@@ -84,6 +85,7 @@ class Database {
     std::string path_;
     sqlite3* db_;
     bool ofShare_;
+    bool isIndex_;  // of a share, complete or not
     Statement insert_;
     std::optional<Clock::time_point> began_;
     bool isFirst_ = true;  // batch of this connection

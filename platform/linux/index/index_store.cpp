@@ -134,7 +134,7 @@ bool begin(const std::string& share, int mode) {
     Work work{mode, lockIndex(share), Descriptor(), vetoOf(share)};
     if (!work.lock) return false;
     if (mode == FI_INDEX_BUILD) {
-        if (!removeFile(newPath(share)) || !Database::create(newPath(share))) return false;
+        if (!removeFile(newPath(share)) || !Database::create(newPath(share), kNewIndex)) return false;
         admitDatabase(newPath(share), kNewIndex);
     } else {
         if (!indexExists(share)) {

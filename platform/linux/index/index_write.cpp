@@ -94,11 +94,10 @@ void Database::rollBack() {
 
 bool Database::insert(const __tag_FI_FILE_INFO_DATA& record) {
     if (!begin()) return false;
-    static const std::string sql =
-        std::string("INSERT OR IGNORE INTO record(") + kRecordColumns + ",id) VALUES(" + kRecordMarks + ",?)";
-    if (!insert_ && !insert_.prepare(db_, sql)) return written(false);
-    if (!bindRecord(insert_, record)) return written(false);
-    if (ofShare_ && !insert_.bind(kRecordWidth + 1, highest_ + 1)) return written(false);
+    if (!insert_ && !insert_.prepare(db_, insertionSql(isIndex_))) return written(false);
+    int at = 0;
+    if (!bindRecord(insert_, record, isIndex_, at)) return written(false);
+    if (ofShare_ && !insert_.bind(at + 1, highest_ + 1)) return written(false);
     const bool done = insert_.run();
     const int count = done ? sqlite3_changes(db_) : 0;
     added_ += count;
@@ -146,10 +145,15 @@ bool Database::update(const Node* set, const Node* where) {
     std::string sql = "UPDATE record SET ";
     std::vector<Value> values;
     for (const Node* node : nodes) {
+        if (isIndex_ && !isStoredInShare(node->type)) continue;
         if (!values.empty()) sql += ',';
         sql += columnOf(node->type)->name;
         sql += "=?";
         values.push_back(valueOf(*node));
+    }
+    if (values.empty()) {
+        fail(VEXO_ERR_PARAMETER, EINVAL);
+        return written(false);
     }
     append(values, condition->values);
     // Names that were packed may have changed.
