@@ -11,7 +11,7 @@ mib=${2:-2048}
 server=lighttpd
 serve
 keeper=${pids[0]}
-(cd "$source/tests/web" && [ -d node_modules/tus-js-client ] || npm ci --no-audit --no-fund --loglevel=error)
+[ -d "$source/tests/web/node_modules/tus-js-client" ] || (cd "$source/tests/web" && npm ci --no-audit --no-fund --loglevel=error)
 
 # A word on standard input, an answer when it is done.
 control() {
