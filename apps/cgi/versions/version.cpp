@@ -73,7 +73,7 @@ int Present::findFolderOfMissing() {
         const size_t slash = left.rfind('/');
         const std::string name = slash == std::string::npos ? left : left.substr(slash + 1);
         if (name == "." || name == "..") return ORV_ERR_MISSING;
-        if (!name.empty()) gone = gone.empty() ? name : name + "/" + gone;
+        if (!name.empty()) gone.insert(0, gone.empty() ? name : std::string(name).append("/"));
         left = parentOf(left);
         const int code = openShown(root_, root_, left, policy, O_PATH | O_DIRECTORY, info_.realPath, folder_);
         if (code == ORV_ERR_NONE) break;

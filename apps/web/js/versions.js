@@ -7,7 +7,7 @@ import { entryOf } from "./entries.js";
 import { describe } from "./errors.js";
 import { formatFullTime, formatSize } from "./format.js";
 import { canShowImage, iconOf } from "./icons.js";
-import "./later_texts.js";
+import "./later.js";
 import { isWithin, nameOf, parentOf } from "./path.js";
 import { t } from "./strings.js";
 import { startTask } from "./tasks.js";
