@@ -54,7 +54,7 @@ ask() { # from, to
 }
 drawn() { # from, to
     (cd "$folder" && find . -name 'photo*' | sort | sed -n "$(($1 + 1)),$2p" | tr '\n' '\0') | (cd "$folder" && VIPS_CONCURRENCY=1 xargs -0 -n 1 -P "$(nproc)" \
-        sh -c 'vipsthumbnail "$2" --size "256x256>" --eprofile=srgb -o "$1/%s.webp[Q=75,strip]"' - "$work/small")
+        sh -c 'vipsthumbnail "$2" --size "256x256>" --eprofile=srgb -o "$1/%s.webp[Q=75,strip]"' - "$work/small" 2>/dev/null)
     printf '%7d drawn\n' "$(find "$work/small" -type f | wc -l)"
 }
 # Seconds of the processors, of those that ended.
