@@ -35,7 +35,7 @@ class Archives : public ApplianceTest {
     }
 };
 
-struct Observer : orvel::cgi::ZipObserver {
+struct Observer : orvel::cgi::ArchiveObserver {
     bool begins(const std::string&) override { return true; }
     bool wrote(long long) override { return true; }
     void leftOut(const std::string&, int error) override { missing += error == EIO ? 1 : 100; }
@@ -52,7 +52,7 @@ TEST_F(Archives, SayWhatTheyLack) {
         const orvel::Descriptor out(memfd_create("zip", MFD_CLOEXEC));
         const orvel::Descriptor folder(open(root.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
         Observer observer;
-        orvel::cgi::ZipStream zip(out.get(), &observer);
+        orvel::cgi::ArchiveStream zip(out.get(), &observer);
         looks = 0;
         failingLook = nth;
         EXPECT_TRUE(zip.add(folder, "a"));

@@ -22,6 +22,9 @@ constexpr size_t kPiece = size_t{256} * 1024;
 constexpr int kDeepest = 256;           // descriptors stay open on the way down
 constexpr size_t kMostLeftOut = 10000;  // that are said by name
 
+constexpr ArchiveFormat kFormats[] = {
+    {"zip", true}, {"tar.gz", false}, {"tar.xz", false}, {"tar.zst", false}, {"7z", false}};
+
 }  // namespace
 
 // What is readable of a name that is no UTF-8 would not distinguish it from others.
@@ -34,38 +37,62 @@ const char* reasonOf(int code) {
     return code == ORV_ERR_MISSING ? "missing" : "could not be opened";
 }
 
-ZipStream::ZipStream(int fd, ZipObserver* observer)
-    : archive_(loadArchiveLibrary() ? libarchive.archive_write_new() : nullptr), observer_(observer) {
-    setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted from
-    if (archive_ == nullptr || libarchive.archive_write_set_format_zip(archive_) != ARCHIVE_OK ||
-        libarchive.archive_write_set_options(archive_, "zip:hdrcharset=UTF-8") < ARCHIVE_WARN ||
-        libarchive.archive_write_set_bytes_per_block(archive_, static_cast<int>(kPiece)) != ARCHIVE_OK ||
-        libarchive.archive_write_set_bytes_in_last_block(archive_, 1) != ARCHIVE_OK ||
-        libarchive.archive_write_open_fd(archive_, fd) != ARCHIVE_OK) {
-        broken_ = true;
-    }
+const ArchiveFormat* archiveFormatOf(std::string_view word) {
+    const auto* const found = std::find_if(std::begin(kFormats), std::end(kFormats),
+                                           [word](const ArchiveFormat& format) { return format.word == word; });
+    return found == std::end(kFormats) ? nullptr : found;
 }
 
-ZipStream::~ZipStream() {
+ArchiveStream::ArchiveStream(int fd, ArchiveObserver* observer, std::string_view format, const std::string& password)
+    : archive_(loadArchiveLibrary() ? libarchive.archive_write_new() : nullptr), observer_(observer) {
+    setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted from
+    broken_ = archive_ == nullptr || !setUp(fd, format, password);
+}
+
+bool ArchiveStream::setUp(int fd, std::string_view format, const std::string& password) {
+    int set = ARCHIVE_FATAL;
+    const char* options = nullptr;
+    if (format == "zip") {
+        set = libarchive.archive_write_set_format_zip(archive_);
+        options = password.empty() ? "zip:hdrcharset=UTF-8" : "zip:hdrcharset=UTF-8,zip:encryption=aes256";
+        if (!password.empty() && libarchive.archive_write_set_passphrase(archive_, password.c_str()) != ARCHIVE_OK)
+            return false;
+    } else if (format == "7z") {
+        set = libarchive.archive_write_set_format_7zip(archive_);
+    } else {
+        set = libarchive.archive_write_set_format_pax_restricted(archive_);
+        const auto filter = format == "tar.gz"   ? libarchive.archive_write_add_filter_gzip
+                            : format == "tar.xz" ? libarchive.archive_write_add_filter_xz
+                                                 : libarchive.archive_write_add_filter_zstd;
+        if (filter(archive_) != ARCHIVE_OK) return false;  // others than OK would run outside programs
+    }
+    return set == ARCHIVE_OK &&
+           (options == nullptr || libarchive.archive_write_set_options(archive_, options) >= ARCHIVE_WARN) &&
+           libarchive.archive_write_set_bytes_per_block(archive_, static_cast<int>(kPiece)) == ARCHIVE_OK &&
+           libarchive.archive_write_set_bytes_in_last_block(archive_, 1) == ARCHIVE_OK &&
+           libarchive.archive_write_open_fd(archive_, fd) == ARCHIVE_OK;
+}
+
+ArchiveStream::~ArchiveStream() {
     if (archive_ != nullptr) libarchive.archive_write_free(archive_);
 }
 
-bool ZipStream::recordFailure() {
+bool ArchiveStream::recordFailure() {
     error_ = libarchive.archive_errno(archive_);
     return recordStop();
 }
 
-bool ZipStream::recordStop() {
+bool ArchiveStream::recordStop() {
     broken_ = true;
     return false;
 }
 
-void ZipStream::miss(const std::string& name, int error, const char* reason) {
+void ArchiveStream::miss(const std::string& name, int error, const char* reason) {
     if (observer_ != nullptr) observer_->leftOut(name, error);
     leaveOut(name, reason != nullptr ? reason : strerror(error));
 }
 
-void ZipStream::leaveOut(const std::string& name, const std::string& reason) {
+void ArchiveStream::leaveOut(const std::string& name, const std::string& reason) {
     if (leftOut_.size() < kMostLeftOut) {
         leftOut_.push_back(name + ": " + reason);
     } else {
@@ -73,7 +100,7 @@ void ZipStream::leaveOut(const std::string& name, const std::string& reason) {
     }
 }
 
-bool ZipStream::begin(const std::string& name, const struct stat& status, long long size) {
+bool ArchiveStream::begin(const std::string& name, const struct stat& status, long long size) {
     const std::unique_ptr<archive_entry, decltype(libarchive.archive_entry_free)> entry(libarchive.archive_entry_new(),
                                                                                         libarchive.archive_entry_free);
     if (entry == nullptr) return recordFailure();
@@ -85,7 +112,7 @@ bool ZipStream::begin(const std::string& name, const struct stat& status, long l
     return libarchive.archive_write_header(archive_, entry.get()) >= ARCHIVE_WARN || recordFailure();
 }
 
-bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
+bool ArchiveStream::addFile(const Descriptor& file, const std::string& name) {
     struct stat status {};
     if (fstat(file.get(), &status) != 0) return miss(name, errno), true;
     if (!begin(name, status, status.st_size)) return false;
@@ -106,7 +133,7 @@ bool ZipStream::addFile(const Descriptor& file, const std::string& name) {
     return libarchive.archive_write_finish_entry(archive_) >= ARCHIVE_WARN || recordFailure();
 }
 
-bool ZipStream::addChild(const Descriptor& folder, const std::string& child, const std::string& name) {
+bool ArchiveStream::addChild(const Descriptor& folder, const std::string& child, const std::string& name) {
     struct stat status {};
     if (fstatat(folder.get(), child.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
         miss(name, errno);
@@ -120,7 +147,7 @@ bool ZipStream::addChild(const Descriptor& folder, const std::string& child, con
     return true;
 }
 
-bool ZipStream::addFolder(const Descriptor& folder, const std::string& name) {
+bool ArchiveStream::addFolder(const Descriptor& folder, const std::string& name) {
     struct stat status {};
     std::vector<std::string> names;
     if (fstat(folder.get(), &status) != 0) return miss(name, errno), true;
@@ -135,7 +162,7 @@ bool ZipStream::addFolder(const Descriptor& folder, const std::string& name) {
     return going;
 }
 
-bool ZipStream::add(const Descriptor& opened, const std::string& name) {
+bool ArchiveStream::add(const Descriptor& opened, const std::string& name) {
     if (broken_) return false;
     if (observer_ != nullptr && !observer_->begins(name)) return recordStop();
     struct stat status {};
@@ -145,7 +172,7 @@ bool ZipStream::add(const Descriptor& opened, const std::string& name) {
     return miss(name, EINVAL, "neither a file nor a folder"), true;
 }
 
-bool ZipStream::writeLeftOut() {
+bool ArchiveStream::writeLeftOut() {
     std::string text = "These could not be included:\n";
     for (const std::string& line : leftOut_) text += line + "\n";
     if (leftOutUnsaid_ > 0) text += "and " + std::to_string(leftOutUnsaid_) + " more\n";
@@ -156,7 +183,7 @@ bool ZipStream::writeLeftOut() {
     return libarchive.archive_write_data(archive_, text.data(), text.size()) >= 0 || recordFailure();
 }
 
-bool ZipStream::finish() {
+bool ArchiveStream::finish() {
     if (!leftOut_.empty() && !broken_) static_cast<void>(writeLeftOut());
     return !broken_ && (libarchive.archive_write_close(archive_) == ARCHIVE_OK || recordFailure());
 }

@@ -1,10 +1,11 @@
-// Several files and folders as one zip, written as it is made.
+// Several files and folders as one archive, written as it is made.
 #ifndef ORVEL_CGI_DOWNLOAD_ARCHIVE_H
 #define ORVEL_CGI_DOWNLOAD_ARCHIVE_H
 
 #include <sys/stat.h>
 
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "base/descriptor.h"
@@ -16,10 +17,10 @@ namespace orvel::cgi {
 // The name of a file or folder within an archive, which knows UTF-8 alone: itself, or percent-encoded.
 std::string memberName(const std::string& component);
 
-// Looks on while a zip is made.
-class ZipObserver {
+// Looks on while an archive is made.
+class ArchiveObserver {
  public:
-    virtual ~ZipObserver() = default;
+    virtual ~ArchiveObserver() = default;
     // A member begins, or `count` more of its bytes were written. False ends the making.
     virtual bool begins(const std::string& name) = 0;
     virtual bool wrote(long long count) = 0;
@@ -27,18 +28,28 @@ class ZipObserver {
     virtual void leftOut(const std::string& name, int error) = 0;
 };
 
-// What a zip says of a source that was refused with the library code.
+// What an archive says of a source that was refused with the library code.
 const char* reasonOf(int code);
 
-// A stream to a descriptor. What cannot be read is left out, reported to the observer, if there is one, and said in a
-// last member, "_not_included.txt". Members are deflated, times and permissions kept; symbolic links and anything else
-// but files and folders stay out.
-class ZipStream {
+struct ArchiveFormat {
+    const char* word;  // of a request
+    bool takesPassword;
+};
+// zip, tar.gz, tar.xz, tar.zst, 7z; null for any other word.
+const ArchiveFormat* archiveFormatOf(std::string_view word);
+
+// A stream to a descriptor; 7z needs the room twice while it is made, in the folder that TMPDIR names. What cannot be
+// read is left out, reported to the observer, if there is one, and said in a last member, "_not_included.txt". Members
+// are compressed, times and permissions kept; symbolic links and anything else but files and folders stay out.
+class ArchiveStream {
  public:
-    explicit ZipStream(int fd, ZipObserver* observer = nullptr);
-    ~ZipStream();
-    ZipStream(const ZipStream&) = delete;
-    ZipStream& operator=(const ZipStream&) = delete;
+    // A zip. With another word the format of that; a password encrypts what members hold (AES-256), and not their
+    // names.
+    explicit ArchiveStream(int fd, ArchiveObserver* observer = nullptr, std::string_view format = "zip",
+                           const std::string& password = "");
+    ~ArchiveStream();
+    ArchiveStream(const ArchiveStream&) = delete;
+    ArchiveStream& operator=(const ArchiveStream&) = delete;
 
     // Adds the open file or folder, with everything below it, under `name` (UTF-8). False when the reader is gone:
     // stop.
@@ -53,6 +64,7 @@ class ZipStream {
     [[nodiscard]] int error() const { return error_; }               // errno of what broke it, 0 when it was stopped
 
  private:
+    [[nodiscard]] bool setUp(int fd, std::string_view format, const std::string& password);
     bool addFile(const Descriptor& file, const std::string& name);
     bool addFolder(const Descriptor& folder, const std::string& name);
     bool addChild(const Descriptor& folder, const std::string& child, const std::string& name);
@@ -63,7 +75,7 @@ class ZipStream {
     void miss(const std::string& name, int error, const char* reason = nullptr);
 
     struct archive* archive_;
-    ZipObserver* observer_;
+    ArchiveObserver* observer_;
     int error_ = 0;
     std::vector<std::string> leftOut_;
     long long leftOutUnsaid_ = 0;  // beyond those

@@ -3,6 +3,7 @@
 // Parameters, from the query or a form:
 //   paths_raw, path_raw, path   what to fetch (see pathParams): several paths, or a folder, come as a zip
 //   listing, ranges, except     or rows of a kept listing (see chosen_rows.h)
+//   inside, inside_raw          one file in the archive at the path, with its "password" (posted), see download/member.h
 //   name                        of the zip, without ".zip"; default is that of the only folder, else "download"
 //   snapshot, snapshot_raw      one file as it was in that snapshot (see list/versions.h)
 // A file answers HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since. Failures are JSON replies.
@@ -14,6 +15,7 @@
 #include <vector>
 
 #include "chosen_rows.h"
+#include "download/member.h"
 #include "download/sending.h"
 #include "orvel/error_state.h"
 #include "orvel/privilege.h"
@@ -78,6 +80,7 @@ void serveDownloadProgram(Request& request, Output& out) {
     int code = actAs(user.sid.c_str(), user.name, home);
     if (code == ORV_ERR_NONE) code = findSources(*paths, open, sources, culprit);
     if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), user.cookie, code, culprit);
+    if (web.HasParam("inside") || web.HasParam("inside_raw")) return serveMember(out, user, web, sources);
     if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, user, sources[0]);
     const std::string only = sources.size() == 1 ? sources[0].name : "download";
     serveZip(out, user, sources, web.GetParam("name", only), open);

@@ -35,16 +35,6 @@ void putHeader(Output& out, const std::string& line) {
     out.text() += line + "\r\n";
 }
 
-// The headers that every download carries: no guessing of types, nothing shown in place.
-void putCommon(Output& out, const std::string& cookie, const std::string& name, const char* type) {
-    putHeader(out, std::string("Content-Type: ") + type);
-    putHeader(out, "X-Content-Type-Options: nosniff");
-    putHeader(out, "Content-Disposition: " + attachment(name));
-    putHeader(out, "Content-Security-Policy: sandbox; default-src 'none'");
-    putHeader(out, "Cache-Control: private, no-cache");
-    if (!cookie.empty()) putHeader(out, "Set-Cookie: " + cookie);
-}
-
 // A file written within the clock's current tick could be written once more and keep its time, and so its tag.
 struct stat settledStatus(const Source& source) {
     struct stat status = source.status;
@@ -72,7 +62,7 @@ std::int64_t sendBytes(int file, ByteRange range) {
 }
 
 // Opens what was looked at when the request came. False, and said in the zip, when it is not that any more.
-bool openAgain(Source& source, const std::string& name, const OpenSource& open, ZipStream& zip) {
+bool openAgain(Source& source, const std::string& name, const OpenSource& open, ArchiveStream& zip) {
     const struct stat before = source.status;
     const int code = open(source);
     const bool same = code == ORV_ERR_NONE && source.status.st_dev == before.st_dev &&
@@ -101,6 +91,15 @@ bool beginZip(Output& out, const User& user, const std::string& name) {
 }
 
 }  // namespace
+
+void putCommon(Output& out, const std::string& cookie, const std::string& name, const char* type) {
+    putHeader(out, std::string("Content-Type: ") + type);
+    putHeader(out, "X-Content-Type-Options: nosniff");
+    putHeader(out, "Content-Disposition: " + attachment(name));
+    putHeader(out, "Content-Security-Policy: sandbox; default-src 'none'");
+    putHeader(out, "Cache-Control: private, no-cache");
+    if (!cookie.empty()) putHeader(out, "Set-Cookie: " + cookie);
+}
 
 int openToSend(const User& user, Source& source) {
     PathInfo info;
@@ -214,7 +213,7 @@ void serveFile(Output& out, const User& user, const Source& source) {
 void serveZip(Output& out, const User& user, std::vector<Source>& sources, const std::string& name,
               const OpenSource& open) {
     if (!beginZip(out, user, name)) return;
-    ZipStream zip(STDOUT_FILENO);
+    ArchiveStream zip(STDOUT_FILENO);
     FreeNames names;
     for (Source& source : sources) {
         const long long before = zip.bytes();
@@ -231,7 +230,7 @@ void serveZip(Output& out, const User& user, std::vector<Source>& sources, const
 
 void serveZip(Output& out, const User& user, ChosenRows& rows, const std::string& name) {
     if (!beginZip(out, user, name)) return;
-    ZipStream zip(STDOUT_FILENO);
+    ArchiveStream zip(STDOUT_FILENO);
     FreeNames names;
     for (size_t i = 0; i < rows.size(); ++i) {
         KeptRow row;

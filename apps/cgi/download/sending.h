@@ -50,6 +50,9 @@ int openRow(const ChosenRows& rows, const KeptRow& row, Source& source);
 // A refusal must not be taken for the file: unlike in other programs it shows in the HTTP status.
 Status httpStatusOf(int code);
 
+// The headers that every download carries: no guessing of types, nothing shown in place.
+void putCommon(Output& out, const std::string& cookie, const std::string& name, const char* type);
+
 // Answer a request for one file (HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since), and for
 // anything else as a zip named `name` + ".zip"; both write the log entry of `user`. A source that is not open is opened
 // when its turn comes, and has to be what it was.

@@ -1,7 +1,8 @@
 // CGI program "list": what a folder holds, and which shares there are.
 //
 // Parameters, from the query or a form:
-//   action           "shares", "folder", "deleted" (see list/deleted.h), or one on a kept listing
+//   action           "shares", "folder", "deleted" (see list/deleted.h), "archive" (see list/inside.h), or one
+//                    on a kept listing
 //   path, path_raw   the folder (folder only)
 //   sort_by          as for OrvEnum; without it folders come by name, shares with the home folder first
 //   sort_direction   "asc" (default) or "desc"
@@ -18,6 +19,7 @@
 #include "base/json_text.h"
 #include "list/beside.h"
 #include "list/deleted.h"
+#include "list/inside.h"
 #include "list/kept.h"
 #include "list/versions.h"
 #include "listing.h"
@@ -60,8 +62,8 @@ void serveListProgram(Request& request, Output& out) {
     const VEXO::WebCGI& web = request.web;
     const std::string action = web.GetParam("action", "");
     const auto wanted = parse(web, user);
-    const bool known =
-        action == "shares" || action == "folder" || action == "deleted" || action == "versions" || isKeptAction(action);
+    const bool known = action == "shares" || action == "folder" || action == "deleted" || action == "versions" ||
+                       action == "archive" || isKeptAction(action);
     if (!wanted || !known) {
         return replyFailure(out, Status::kBadRequest, user.cookie, ORV_ERR_PARAMETER, web.GetParam("path", ""));
     }
@@ -69,6 +71,7 @@ void serveListProgram(Request& request, Output& out) {
     if (action == "versions") return serveVersions(request, *wanted, out);
     if (action == "folder" && namesVersion(web)) return serveEarlierFolder(request, *wanted, out);
     if (action == "deleted") return serveDeleted(request, *wanted, out);
+    if (action == "archive") return serveInside(request, *wanted, out);
     if (isKeptAction(action)) return serveKept(request, action, *wanted, out);
     if (action == "folder" && wantsToKeep(web)) return serveKeeping(request, *wanted, out);
 

@@ -1,7 +1,9 @@
 #include <fcntl.h>
 
 #include <cerrno>
+#include <cstdlib>
 
+#include "archive_reader.h"
 #include "base/new_file.h"
 #include "download/archive.h"
 #include "free_names.h"
@@ -22,10 +24,12 @@ struct Job {
     Conflict conflict;
     PathInfo info;  // of the archive
     Target place;
+    const ArchiveFormat* format;
+    std::string password;
 };
 
-// Tells the members of the zip as the items of the operation.
-class Watch : public ZipObserver {
+// Reports the members of the archive as the items of the operation.
+class Watch : public ArchiveObserver {
  public:
     explicit Watch(Progress& progress) : progress_(progress) {}
     // What follows lies in this share-relative folder.
@@ -55,7 +59,7 @@ class Watch : public ZipObserver {
     bool open_ = false;
 };
 
-void addAll(const Job& job, ZipStream& zip, Watch& watch, Progress& progress) {
+void addAll(const Job& job, ArchiveStream& archive, Watch& watch, Progress& progress) {
     FreeNames names;
     Choice& chosen = job.operation.chosen;
     for (size_t i = 0; i < chosen.size(); ++i) {
@@ -72,8 +76,8 @@ void addAll(const Job& job, ZipStream& zip, Watch& watch, Progress& progress) {
         watch.enter(item.info.path.substr(0, item.info.path.rfind('/')));
         if (code != ORV_ERR_NONE) {
             progress.failed(chosen.path(i), code);
-            zip.leaveOut(readable(chosen.path(i)), reasonOf(code));
-        } else if (!zip.add(opened, names.take(memberName(item.place.name), isFolder))) {
+            archive.leaveOut(readable(chosen.path(i)), reasonOf(code));
+        } else if (!archive.add(opened, names.take(memberName(item.place.name), isFolder))) {
             return;
         }
     }
@@ -95,8 +99,8 @@ int publish(const Job& job, NewFile& file, std::string& name) {
     return published ? ORV_ERR_NONE : OrvParseErrnoToError(errno, nullptr, nullptr);
 }
 
-int codeOf(const ZipStream& zip) {
-    const int code = zip.error() == 0 ? ORV_ERR_COMPRESS : OrvParseErrnoToError(zip.error(), nullptr, nullptr);
+int codeOf(const ArchiveStream& archive) {
+    const int code = archive.error() == 0 ? ORV_ERR_COMPRESS : OrvParseErrnoToError(archive.error(), nullptr, nullptr);
     return code == ORV_ERR_GENERAL ? ORV_ERR_COMPRESS : code;
 }
 
@@ -115,20 +119,22 @@ void run(const Job& job, Progress& progress) {
     if (!file.create(job.place.name, 0600))
         return progress.broken(job.info.path, OrvParseErrnoToError(errno, nullptr, nullptr));
     Watch watch(progress);
-    ZipStream zip(file.get(), &watch);
-    addAll(job, zip, watch, progress);
+    // Where the archive itself goes: what is in between counts there, too.
+    setenv("TMPDIR", job.place.folder.path().c_str(), 1);
+    ArchiveStream archive(file.get(), &watch, job.format->word, job.password);
+    addAll(job, archive, watch, progress);
     if (progress.stopped()) return;
     watch.ended();
     // Whoever sees "done" may remove what was packed.
-    if (!zip.isWhole()) progress.markFailed();
-    if (zip.isEmpty() && !zip.isWhole()) return;
-    if (!zip.finish()) return progress.broken(job.info.path, codeOf(zip));
+    if (!archive.isWhole()) progress.markFailed();
+    if (archive.isEmpty() && !archive.isWhole()) return;
+    if (!archive.finish()) return progress.broken(job.info.path, codeOf(archive));
     std::string name;
     const int code = publish(job, file, name);
     if (code != ORV_ERR_NONE) return progress.broken(job.info.path, code);
     // The log knows no kind of its own for it.
     const std::string made = job.info.path.substr(0, job.info.path.rfind('/') + 1) + name;
-    OrvLibDoLog(operation.user.name, made, zip.bytes(), ORVEL_ACTION_COPY, false);
+    OrvLibDoLog(operation.user.name, made, archive.bytes(), ORVEL_ACTION_COPY, false);
     ShownSearch(operation.user.name, operation.web.GetParam("taskid", "")).added({job.info, job.place.folder, name});
 }
 
@@ -155,9 +161,16 @@ int openArchive(Operation& operation, const std::string& path, Job& job) {
 int compressOperation(Operation& operation) {
     const auto target = bytesParam(operation.web, "target");
     const auto conflict = conflictOf(operation.web.GetParam("conflict", "error"));
-    if (!target || !conflict) return ORV_ERR_PARAMETER;
+    const ArchiveFormat* format = archiveFormatOf(operation.web.GetParam("format", "zip"));
+    if (!target || !conflict || format == nullptr) return ORV_ERR_PARAMETER;
     operation.culprit = *target;
-    Job job = {.operation = operation, .conflict = *conflict, .info = {}, .place = Target()};
+    Job job = {.operation = operation,
+               .conflict = *conflict,
+               .info = {},
+               .place = Target(),
+               .format = format,
+               .password = operation.web.GetParam("password", "")};
+    if (!isArchivePassword(job.password) || (!job.password.empty() && !format->takesPassword)) return ORV_ERR_PARAMETER;
     const int code = openArchive(operation, *target, job);
     if (code != ORV_ERR_NONE) return code;
     return startTask(operation, "compress", [&job](Progress& progress) { run(job, progress); });

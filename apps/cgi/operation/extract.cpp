@@ -2,17 +2,20 @@
 
 #include <cerrno>
 
+#include "archive_reader.h"
+#include "memory_limit.h"
+#include "operation/member_path.h"
 #include "operation/operation.h"
+#include "operation/own_folder.h"
 #include "operation/task_start.h"
 #include "operation/transfer_job.h"
 #include "operation/unpack.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
+#include "text.h"
 
 namespace orvel::cgi {
 namespace {
-
-constexpr size_t kLongestPassword = 1024;
 
 struct Job {
     Operation& operation;
@@ -20,6 +23,9 @@ struct Job {
     PathInfo info;  // the target folder
     Descriptor folder;
     std::string password;
+    bool ownFolder = false;
+    std::vector<std::string> inside;  // see Unpacker::Target
+    std::set<std::string> chosen;
 };
 
 int openArchive(const Job& job, size_t position, Item& item, Descriptor& file) {
@@ -37,27 +43,70 @@ void failed(const std::string& path, int code, Progress& progress) {
     progress.failed(path, code);
 }
 
+// What goes wrong with the archive, and not with a member.
+void failedWith(const std::string& path, int code, Progress& progress) {
+    for (const ArchiveRefusal& own : {kArchiveLocked, kArchiveDemanding}) {
+        if (code != own.code) continue;
+        progress.expect(1, 0);
+        return progress.failed(path, own.code, own.key);
+    }
+    failed(path, code, progress);
+}
+
+std::string joined(const std::vector<std::string>& components) {
+    std::string path;
+    for (const std::string& component : components) path += "/" + component;
+    return path;
+}
+
+// Unpacks the open archive into the folder. False when not all of it could be read.
+bool unpackInto(const Job& job, const Descriptor& folder, const std::string& path, const Item& item, int file,
+                Progress& progress, std::set<std::string>& names) {
+    Unpacker unpacker(progress, {.folder = folder,
+                                 .path = path,
+                                 .conflict = job.conflict,
+                                 .owner = ownerFor(job.operation.user.name),
+                                 .password = job.password,
+                                 .inside = job.inside,
+                                 .chosen = job.chosen});
+    const int code = unpacker.run(file, UnpackLimits::of(item.status.st_size));
+    if (code != ORV_ERR_NONE) failedWith(item.info.path, code, progress);
+    if (code == ORV_ERR_NONE && !progress.stopped()) {
+        for (const std::string& name : unpacker.missing())
+            failed(item.info.path + joined(job.inside) + "/" + name, ORV_ERR_MISSING, progress);
+    }
+    names = unpacker.names();
+    // The log knows no kind of its own for it.
+    if (!names.empty())
+        OrvLibDoLog(job.operation.user.name, item.info.path, unpacker.bytes(), ORVEL_ACTION_COPY, false);
+    return code == ORV_ERR_NONE;
+}
+
 void extractOne(const Job& job, size_t position, Progress& progress) {
     const User& user = job.operation.user;
     Item item;
     Descriptor file;
     int code = openArchive(job, position, item, file);
     if (code != ORV_ERR_NONE) return failed(job.operation.chosen.path(position), code, progress);
-    Unpacker unpacker(progress, {.folder = job.folder,
-                                 .path = job.info.path,
-                                 .conflict = job.conflict,
-                                 .owner = ownerFor(user.name),
-                                 .password = job.password});
-    code = unpacker.run(file.get(), UnpackLimits::of(item.status.st_size));
-    if (code != ORV_ERR_NONE) failed(item.info.path, code, progress);
-    if (unpacker.names().empty()) return;
-    // The log knows no kind of its own for it.
-    OrvLibDoLog(user.name, item.info.path, unpacker.bytes(), ORVEL_ACTION_COPY, false);
+    std::set<std::string> names;
+    if (job.ownFolder) {
+        OwnFolder own(job.folder);
+        code = own.make(folderNameOf(item.place.name), user.name);
+        if (code != ORV_ERR_NONE) return failed(item.info.path, code, progress);
+        const std::string path = job.info.path + "/" + own.name();
+        const bool whole = unpackInto(job, own.folder(), path, item, file.get(), progress, names);
+        own.settle(whole && !progress.stopped());
+        names = own.isThere() ? std::set<std::string>{own.name()} : std::set<std::string>();
+    } else {
+        unpackInto(job, job.folder, job.info.path, item, file.get(), progress, names);
+    }
+    if (names.empty()) return;
     ShownSearch search(user.name, job.operation.web.GetParam("taskid", ""));
-    for (const std::string& name : unpacker.names()) search.added({job.info, job.folder, name});
+    for (const std::string& name : names) search.added({job.info, job.folder, name});
 }
 
 void run(const Job& job, Progress& progress) {
+    boundMemory(kArchiveMemory);
     for (size_t i = 0; i < job.operation.chosen.size(); ++i) {
         Item item;
         Descriptor file;
@@ -66,6 +115,21 @@ void run(const Job& job, Progress& progress) {
     for (size_t i = 0; i < job.operation.chosen.size(); ++i) {
         if (!progress.stopped()) extractOne(job, i, progress);
     }
+}
+
+// What is wanted of the archive. False for what cannot be names in it.
+bool readChosen(const Operation& operation, Job& job) {
+    const auto folder = bytesParam(operation.web, "inside");
+    const auto inside = memberComponents(folder.value_or(""));
+    if (!folder || (!folder->empty() && !inside)) return false;
+    job.inside = inside.value_or(std::vector<std::string>());
+    for (const std::string& line : linesParam(operation.web, "members_raw")) {
+        const auto name = percentDecode(line);
+        const auto components = memberComponents(name.value_or(""));
+        if (!components || components->size() != 1) return false;
+        job.chosen.insert(components->front());
+    }
+    return (job.inside.empty() && job.chosen.empty()) || operation.chosen.size() == 1;
 }
 
 }  // namespace
@@ -79,8 +143,11 @@ int extractOperation(Operation& operation) {
                .conflict = *conflict,
                .info = {},
                .folder = Descriptor(),
-               .password = operation.web.GetParam("password", "")};
-    if (job.password.size() > kLongestPassword) return ORV_ERR_PARAMETER;
+               .password = operation.web.GetParam("password", ""),
+               .ownFolder = operation.web.GetParam("own_folder", "") == "true",
+               .inside = {},
+               .chosen = {}};
+    if (!isArchivePassword(job.password) || !readChosen(operation, job)) return ORV_ERR_PARAMETER;
     int code = openFolder(operation.user, *target, job.info, job.folder);
     if (code == ORV_ERR_NONE) code = judgeTarget(operation.user, job.info, job.conflict);
     if (code != ORV_ERR_NONE) return code;

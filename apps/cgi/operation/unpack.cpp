@@ -8,10 +8,9 @@
 #include <cerrno>
 #include <charconv>
 #include <climits>
-#include <clocale>
-#include <memory>
 
 #include "archive_library.h"
+#include "archive_reader.h"
 #include "base/new_file.h"
 #include "free_names.h"
 #include "operation/member_path.h"
@@ -23,16 +22,11 @@
 namespace orvel::cgi {
 namespace {
 
-constexpr size_t kBlock = size_t{256} * 1024;
 constexpr long long kMiB = 1024LL * 1024;
 constexpr long long kNeverMeasured = 64 * kMiB;
 constexpr int kMostNumbers = 9999;
 constexpr int kSkipped = -1;  // beside library codes
 constexpr int kStopped = -2;
-
-struct CloseArchive {
-    void operator()(archive* source) const { libarchive.archive_read_free(source); }
-};
 
 int codeOf(int error) {
     return OrvParseErrnoToError(error, nullptr, nullptr);
@@ -55,25 +49,6 @@ std::string joined(const std::vector<std::string>& components) {
     std::string path = ".";
     for (const std::string& component : components) path += "/" + component;
     return path;
-}
-
-std::unique_ptr<archive, CloseArchive> openArchive(int file, const std::string& password) {
-    setlocale(LC_CTYPE, "C.UTF-8");  // what names are converted to
-    if (!loadArchiveLibrary()) return nullptr;
-    std::unique_ptr<archive, CloseArchive> source(libarchive.archive_read_new());
-    if (source == nullptr) return nullptr;
-    libarchive.archive_read_support_format_zip(source.get());
-    libarchive.archive_read_support_format_tar(source.get());
-    // Not all there are: some would run outside programs.
-    for (const auto support :
-         {libarchive.archive_read_support_filter_gzip, libarchive.archive_read_support_filter_bzip2,
-          libarchive.archive_read_support_filter_compress, libarchive.archive_read_support_filter_lzip,
-          libarchive.archive_read_support_filter_lzma, libarchive.archive_read_support_filter_xz,
-          libarchive.archive_read_support_filter_zstd, libarchive.archive_read_support_filter_lz4}) {
-        support(source.get());
-    }
-    if (!password.empty()) libarchive.archive_read_add_passphrase(source.get(), password.c_str());
-    return libarchive.archive_read_open_fd(source.get(), file, kBlock) == ARCHIVE_OK ? std::move(source) : nullptr;
 }
 
 }  // namespace
@@ -109,9 +84,12 @@ UnpackLimits UnpackLimits::of(long long archiveSize) {
 int Unpacker::run(int file, const UnpackLimits& limits) {
     limits_ = limits;
     bytes_ = members_ = folders_ = consumed_ = 0;
+    skippedBytes_ = 0;
     exceeded_ = torn_ = locked_ = false;
-    const auto source = openArchive(file, target_.password);
-    const int code = source == nullptr ? static_cast<int>(ORV_ERR_ARCHIVE) : readAll(source.get());
+    missing_ = target_.chosen;
+    int code = ORV_ERR_NONE;
+    const auto source = openArchive(file, target_.password, code);
+    if (source != nullptr) code = readAll(source.get());
     finishFolders();
     return code;
 }
@@ -123,14 +101,21 @@ int Unpacker::readAll(archive* source) {
         const int result = libarchive.archive_read_next_header(source, &entry);
         if (result == ARCHIVE_EOF) return ORV_ERR_NONE;
         if (result == ARCHIVE_RETRY) continue;
-        if (result < ARCHIVE_WARN) return members_ == 0 ? ORV_ERR_ARCHIVE : ORV_ERR_ARCHIVE_DATA;
+        if (result < ARCHIVE_WARN) return codeOfEnd(source);
         if (++members_ > limits_.members) return ORV_ERR_FILE_TOO_BIG;
         take(source, entry);
         if (exceeded_) return ORV_ERR_FILE_TOO_BIG;
-        if (locked_) return ORV_ERR_ARCHIVE_PASSWORD;
-        if (torn_) return ORV_ERR_ARCHIVE_DATA;
+        if (locked_) return takesPassword(source) ? static_cast<int>(ORV_ERR_ARCHIVE_PASSWORD) : kArchiveLocked.code;
+        if (torn_) return codeOfEnd(source);
         tellConsumed(source);
     }
+}
+
+// Why the archive could not be read to its end.
+int Unpacker::codeOfEnd(archive* source) const {
+    if (wantsTooMuchMemory(source)) return kArchiveDemanding.code;
+    if (members_ == 0 && hidesNames(source)) return kArchiveLocked.code;
+    return members_ == 0 ? ORV_ERR_ARCHIVE : ORV_ERR_ARCHIVE_DATA;
 }
 
 // How much of the archive was read.
@@ -141,20 +126,58 @@ void Unpacker::tellConsumed(archive* source) {
 }
 
 void Unpacker::take(archive* source, archive_entry* entry) {
-    progress_.expect(1, 0);
-    const char* name = libarchive.archive_entry_pathname(entry);
-    const std::string shown = target_.path + "/" + (name == nullptr ? "" : name);
-    progress_.begin(shown);
-    auto components = memberComponents(name == nullptr ? "" : name);
-    // The top itself, as archives of "." have it.
-    if (!components && name != nullptr && libarchive.archive_entry_filetype(entry) == AE_IFDIR &&
-        std::string_view(name).find_first_not_of("./") == std::string_view::npos && *name != '/' &&
-        std::string_view(name).find("..") == std::string_view::npos) {
-        return progress_.done();
+    const std::string name = nameOfMember(source, entry);
+    auto components = memberComponents(name);
+    if (!target_.inside.empty() || !target_.chosen.empty()) {
+        if (!components || !isChosen(*components)) return skip(source);
+        const std::string path = target_.path + joined(*components).substr(1);
+        return give(source, entry, path, std::move(*components));
     }
-    if (!components) return progress_.failed(shown, ORV_ERR_ILLEGAL_NAME);
+    const std::string shown = target_.path + "/" + name;
+    if (components) return give(source, entry, shown, std::move(*components));
+    // The top itself, as archives of "." have it, is no failure.
+    const bool top = libarchive.archive_entry_filetype(entry) == AE_IFDIR && !name.empty() && name.front() != '/' &&
+                     name.find_first_not_of("./") == std::string::npos && name.find("..") == std::string::npos;
+    progress_.expect(1, 0);
+    progress_.begin(shown);
+    if (top) return progress_.done();
+    progress_.failed(shown, ORV_ERR_ILLEGAL_NAME);
+}
+
+// Whether the member of these components was chosen; they are then those below the folder that it was chosen in.
+bool Unpacker::isChosen(std::vector<std::string>& components) {
+    const std::vector<std::string>& inside = target_.inside;
+    if (components.size() <= inside.size() || !std::equal(inside.begin(), inside.end(), components.begin()))
+        return false;
+    components.erase(components.begin(), components.begin() + static_cast<std::ptrdiff_t>(inside.size()));
+    if (target_.chosen.count(components.front()) == 0) return target_.chosen.empty();
+    missing_.erase(components.front());
+    return true;
+}
+
+// What has to be read to reach the next member is read in pieces, so that it can be stopped, and ends as what is
+// unpacked does.
+void Unpacker::skip(archive* source) {
+    while (readsThrough(source) && !progress_.stopped()) {
+        const void* block = nullptr;
+        size_t size = 0;
+        la_int64_t offset = 0;
+        const int result = libarchive.archive_read_data_block(source, &block, &size, &offset);
+        if (result == ARCHIVE_RETRY) continue;
+        if (result == ARCHIVE_EOF || result < ARCHIVE_WARN) return;  // the next member says what is wrong
+        skippedBytes_ += static_cast<long long>(size);
+        exceeded_ = skippedBytes_ > limits_.bytes;
+        if (exceeded_) return;
+        tellConsumed(source);
+    }
+}
+
+void Unpacker::give(archive* source, archive_entry* entry, const std::string& shown,
+                    std::vector<std::string> components) {
+    progress_.expect(1, 0);
+    progress_.begin(shown);
     Member member = {
-        .entry = entry, .folders = std::move(*components), .name = {}, .path = shown, .folder = Descriptor()};
+        .entry = entry, .folders = std::move(components), .name = {}, .path = shown, .folder = Descriptor()};
     member.name = std::move(member.folders.back());
     member.folders.pop_back();
     const int code = place(source, member);
@@ -177,7 +200,7 @@ int Unpacker::place(archive* source, Member& member) {
     if (code == ORV_ERR_NONE) code = checkNewName(member.folder, member.name);
     if (code != ORV_ERR_NONE) return code;
     if (libarchive.archive_entry_hardlink(member.entry) != nullptr) return makeHardLink(member);
-    if (member.isEncrypted() && target_.password.empty()) return ORV_ERR_ARCHIVE_PASSWORD;
+    if (member.isEncrypted() && (target_.password.empty() || !takesPassword(source))) return ORV_ERR_ARCHIVE_PASSWORD;
     switch (libarchive.archive_entry_filetype(member.entry)) {
         case AE_IFREG:
             return makeFile(source, member);
@@ -355,8 +378,9 @@ bool Unpacker::findUnpacked(std::vector<std::string> components, Descriptor& fol
 
 // One more name of a member that was unpacked before.
 int Unpacker::makeHardLink(Member& member) {
-    const auto other = memberComponents(libarchive.archive_entry_hardlink(member.entry));
+    auto other = memberComponents(libarchive.archive_entry_hardlink(member.entry));
     if (!other) return ORV_ERR_ILLEGAL_NAME;
+    if (!isChosen(*other)) return ORV_ERR_MISSING;
     struct stat there {};
     if (member.isThere(there) && target_.conflict == Conflict::kSkip) return kSkipped;
     Descriptor from;

@@ -27,11 +27,11 @@ struct UnpackLimits {
     static UnpackLimits of(long long archiveSize);
 };
 
-// Unpacks zip and tar, these also compressed as a whole, into one folder. Nothing of a member's name or of links in the
+// Unpacks what openArchive() reads into one folder. Nothing of a member's name or of links in the
 // folder leads out of it; a member appears under its name whole or not at all. What cannot be unpacked is reported,
 // each member for itself, and the rest goes on: names that lead out or may not be used, links that lead out, hard links
 // to what was not unpacked, devices. At the first member that the password does not open it ends: who asks for the
-// right one then wants the archive once. Names are the bytes that the archive has.
+// right one then wants the archive once.
 class Unpacker {
  public:
     struct Target {
@@ -40,15 +40,21 @@ class Unpacker {
         Conflict conflict;
         Owner owner;
         std::string password;  // of encrypted members, as bytes; "" for none
+        // What is chosen: names in a folder of the archive, without which all that lies in it is. Folders above are
+        // not made.
+        std::vector<std::string> inside;  // the components of its path
+        std::set<std::string> chosen;
     };
     Unpacker(Progress& progress, const Target& target) : progress_(progress), target_(target) {}
 
     // Unpacks the open file. 0, or the library code of why not all could be read: 1401 no archive, 1402 broken, 1403
-    // an encrypted member without its password, 1007 beyond the limits.
+    // an encrypted member without its password, 1007 beyond the limits, or one of an ArchiveRefusal.
     int run(int file, const UnpackLimits& limits);
     // The names that were given in the folder.
     [[nodiscard]] const std::set<std::string>& names() const { return names_; }
     [[nodiscard]] long long bytes() const { return bytes_; }
+    // Those of the chosen names that no member met.
+    [[nodiscard]] const std::set<std::string>& missing() const { return missing_; }
 
  private:
     struct Member;
@@ -64,7 +70,11 @@ class Unpacker {
     };
 
     int readAll(archive* source);
+    int codeOfEnd(archive* source) const;
     void take(archive* source, archive_entry* entry);
+    bool isChosen(std::vector<std::string>& components);
+    void skip(archive* source);
+    void give(archive* source, archive_entry* entry, const std::string& shown, std::vector<std::string> components);
     int place(archive* source, Member& member);
     int enter(const std::vector<std::string>& folders, Descriptor& folder);
     int makeFolder(const Member& member);
@@ -88,6 +98,8 @@ class Unpacker {
     long long bytes_ = 0, members_ = 0, folders_ = 0, consumed_ = 0;
     bool exceeded_ = false, torn_ = false;
     bool locked_ = false;  // the password of a member is not known
+    std::set<std::string> missing_;
+    long long skippedBytes_ = 0;
 };
 
 }  // namespace orvel::cgi

@@ -19,6 +19,7 @@
 
 #include "base/descriptor.h"
 #include "base/raised_identity.h"
+#include "memory_limit.h"
 
 namespace orvel::cgi {
 namespace {
@@ -163,7 +164,7 @@ bool allowBelow(int rules, const char* path, std::uint64_t access) {
 }
 
 // No file but the program and what is installed, where the kernel can see to that. False when it can and did not.
-bool confineFiles() {
+bool confineFiles(bool withProgram) {
     const long version = syscall(SYS_landlock_create_ruleset, nullptr, 0, LANDLOCK_CREATE_RULESET_VERSION);
     if (version < 1) return true;
     constexpr std::uint64_t kEvery = (LANDLOCK_ACCESS_FS_MAKE_SYM << 1) - 1;  // all of the first version
@@ -171,7 +172,9 @@ bool confineFiles() {
     landlock_ruleset_attr attributes = {};
     attributes.handled_access_fs = kEvery;
     const Descriptor rules(static_cast<int>(syscall(SYS_landlock_create_ruleset, &attributes, sizeof attributes, 0)));
-    return rules && allowBelow(rules.get(), kProgram, LANDLOCK_ACCESS_FS_READ_FILE | LANDLOCK_ACCESS_FS_EXECUTE) &&
+    return rules &&
+           (!withProgram ||
+            allowBelow(rules.get(), kProgram, LANDLOCK_ACCESS_FS_READ_FILE | LANDLOCK_ACCESS_FS_EXECUTE)) &&
            allowBelow(rules.get(), "/usr", kReadable | LANDLOCK_ACCESS_FS_EXECUTE) &&
            allowBelow(rules.get(), "/lib", kReadable | LANDLOCK_ACCESS_FS_EXECUTE) &&
            allowBelow(rules.get(), "/lib64", kReadable | LANDLOCK_ACCESS_FS_EXECUTE) &&
@@ -206,26 +209,30 @@ bool setDescriptors(int program, int input, int output) {
     const int null = open("/dev/null", O_RDWR | O_CLOEXEC);
     return null >= 0 && dup2(input, STDIN_FILENO) == STDIN_FILENO && dup2(output, STDOUT_FILENO) == STDOUT_FILENO &&
            dup2(null, STDERR_FILENO) == STDERR_FILENO &&
-           (program == kProgram || dup3(program, kProgram, O_CLOEXEC) == kProgram) &&
-           syscall(SYS_close_range, kProgram + 1, ~0U, 0) == 0;
+           (program < 0 || program == kProgram || dup3(program, kProgram, O_CLOEXEC) == kProgram) &&
+           syscall(SYS_close_range, program < 0 ? kProgram : kProgram + 1, ~0U, 0) == 0;
 }
 
-[[noreturn]] void become(int program, const std::vector<char*>& words, int input, int output,
+// Goes on with `work` where it can do nothing but that; `program` is a file that it keeps, or none (-1).
+[[noreturn]] void become(const std::function<int()>& work, int program, int input, int output,
                          const SandboxLimits& limits) {
-    char blocked[] = "VIPS_BLOCK_UNTRUSTED=1", threads[] = "VIPS_CONCURRENCY=1", arenas[] = "MALLOC_ARENA_MAX=1",
-         locale[] = "LC_ALL=C.UTF-8", home[] = "HOME=/nonexistent";
-    char* environment[] = {blocked, threads, arenas, locale, home, nullptr};
     sigset_t none;
     sigemptyset(&none);
     const bool confined = prctl(PR_SET_PDEATHSIG, SIGKILL) == 0 && sigprocmask(SIG_SETMASK, &none, nullptr) == 0 &&
                           std::signal(SIGPIPE, SIG_DFL) != SIG_ERR && chdir("/") == 0 &&
                           setDescriptors(program, input, output) && giveUpIdentity() &&
                           prctl(PR_SET_PDEATHSIG, SIGKILL) == 0 &&  // a change of identity took it away
-                          prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0 && confineFiles() && confineCalls() &&
+                          prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0 && confineFiles(program >= 0) && confineCalls() &&
                           setLimits(limits);  // last: this process may have more memory already
-    if (!confined) _exit(kNotConfined);
+    _exit(confined ? work() : kNotConfined);
+}
+
+int start(const std::vector<char*>& words) {
+    char blocked[] = "VIPS_BLOCK_UNTRUSTED=1", threads[] = "VIPS_CONCURRENCY=1", arenas[] = "MALLOC_ARENA_MAX=1",
+         locale[] = "LC_ALL=C.UTF-8", home[] = "HOME=/nonexistent";
+    char* environment[] = {blocked, threads, arenas, locale, home, nullptr};
     execveat(kProgram, "", words.data(), environment, AT_EMPTY_PATH);
-    _exit(kNotStarted);
+    return kNotStarted;
 }
 
 bool waitFor(pid_t child, std::chrono::milliseconds time) {
@@ -246,6 +253,25 @@ Descriptor openProgram(const std::string& path) {
     return Descriptor(open(path.c_str(), O_PATH | O_CLOEXEC));
 }
 
+SandboxEnd runConfined(const std::function<int()>& work, int program, int input, int output,
+                       const SandboxLimits& limits, const char* what) {
+    const pid_t child = fork();
+    if (child < 0) return SandboxEnd::kFailed;
+    if (child == 0) become(work, program, input, output, limits);
+    const bool ended = waitFor(child, limits.time);
+    if (!ended) kill(child, SIGKILL);
+    int status = 0;
+    while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
+    }
+    if (!ended) return SandboxEnd::kTimeOut;
+    if (WIFEXITED(status) && WEXITSTATUS(status) == kNotConfined) {
+        syslog(LOG_ERR, "%s could not be confined", what);
+        return SandboxEnd::kFailed;
+    }
+    if (WIFEXITED(status) && WEXITSTATUS(status) == kNotStarted) return SandboxEnd::kMissing;
+    return WIFEXITED(status) && WEXITSTATUS(status) == 0 ? SandboxEnd::kDone : SandboxEnd::kRefused;
+}
+
 }  // namespace
 
 SandboxEnd runInSandbox(const std::vector<std::string>& words, int input, int output, const SandboxLimits& limits) {
@@ -255,21 +281,20 @@ SandboxEnd runInSandbox(const std::vector<std::string>& words, int input, int ou
     pointers.push_back(nullptr);
     const Descriptor program = openProgram(words[0]);
     if (!program) return SandboxEnd::kMissing;
-    const pid_t child = fork();
-    if (child < 0) return SandboxEnd::kFailed;
-    if (child == 0) become(program.get(), pointers, input, output, limits);
-    const bool ended = waitFor(child, limits.time);
-    if (!ended) kill(child, SIGKILL);
-    int status = 0;
-    while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
-    }
-    if (!ended) return SandboxEnd::kTimeOut;
-    if (WIFEXITED(status) && WEXITSTATUS(status) == kNotConfined) {
-        syslog(LOG_ERR, "%s could not be confined", words[0].c_str());
-        return SandboxEnd::kFailed;
-    }
-    if (WIFEXITED(status) && WEXITSTATUS(status) == kNotStarted) return SandboxEnd::kMissing;
-    return WIFEXITED(status) && WEXITSTATUS(status) == 0 ? SandboxEnd::kDone : SandboxEnd::kRefused;
+    return runConfined([&pointers] { return start(pointers); }, program.get(), input, output, limits, words[0].c_str());
+}
+
+SandboxEnd runInSandbox(const std::function<int()>& work, int input, int output, const SandboxLimits& limits) {
+    SandboxLimits all = limits;
+    all.memory += addressSpace();
+    const auto guarded = [&work] {
+        try {
+            return work();
+        } catch (...) {
+            return 1;  // memory is out
+        }
+    };
+    return runConfined(guarded, -1, input, output, all, "work on a file");
 }
 
 }  // namespace orvel::cgi

@@ -5,6 +5,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -30,6 +31,10 @@ enum class SandboxEnd {
 // processes or sockets, or signal others, and where the kernel has Landlock it can read what is installed (/usr, fonts)
 // and no other file but the program itself. Both descriptors stay the caller's.
 SandboxEnd runInSandbox(const std::vector<std::string>& words, int input, int output, const SandboxLimits& limits);
+
+// The same for a piece of this program, which says with 0 that it is done; `memory` is what it may have beside what
+// there is. No descriptor but the two is left to it.
+SandboxEnd runInSandbox(const std::function<int()>& work, int input, int output, const SandboxLimits& limits);
 
 }  // namespace orvel::cgi
 
