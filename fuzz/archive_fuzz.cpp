@@ -40,7 +40,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
                                                  "/photo/target",
                                                  orvel::cgi::Conflict::kKeepBoth,
                                                  {static_cast<uid_t>(-1), static_cast<gid_t>(-1)},
-                                                 ""});
+                                                 "",
+                                                 {},
+                                                 {}});
         const orvel::Descriptor file(fileOf(data, size));
         static_cast<void>(unpacker.run(file.get(), {.bytes = 1 << 20, .members = 100}));
     }

@@ -183,7 +183,7 @@ test("packed, extracted", () => {
   return withPage("alice", { path: "/projects/packed" }, async (page) => {
     await choose(page, "notes.md");
     await page.click("[aria-label='More actions']");
-    await page.click(".menu >> text=Pack as zip");
+    await page.click(".menu >> text=Pack");
     await page.waitForSelector(".dialog input:focus"); // it opens once the chosen entries are known
     await page.keyboard.press("Enter");
     await wentWell(page, "notes.md");

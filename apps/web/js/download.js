@@ -15,22 +15,27 @@ export function download(what) {
   if (choice.count === 0) return undefined;
   const [first, more] = choice.portions();
   if (more) return toastFailure(new ApiError({ key: "page:too_many" }));
+  const name = choice.count > 1 && (plainName(nameOf(choice.folders[0])) || "download");
+  submit({ ...first.params, ...(name && { name }) }, choice.single?.id ?? choice.folders[0]);
+  if (!choice.single || choice.single.isFolder) toast({ text: t("download.zip", { count: choice.count }) });
+  return undefined;
+}
+
+// Asks for a download; `id` is what a failure is about.
+export function submit(params, id) {
   const frame = h("iframe", { name: `download-${Date.now()}`, hidden: true, title: "" });
   const field = (name, value) => h("input", { type: "hidden", name, value });
   const form = h(
     "form",
     { method: "post", action: `${PROGRAMS}download`, target: frame.name, hidden: true },
     // The value of a hidden field keeps its line breaks, an attribute as it stands.
-    Object.entries(first.params).map(([name, value]) => field(name, value)),
-    choice.count > 1 && field("name", plainName(nameOf(choice.folders[0])) || "download"),
+    Object.entries(params).map(([name, value]) => field(name, value)),
   );
   document.body.append(frame, form);
-  frame.addEventListener("load", () => readFrame(frame, choice.single?.id ?? choice.folders[0]));
+  frame.addEventListener("load", () => readFrame(frame, id));
   form.submit();
   form.remove();
   setTimeout(() => frame.remove(), LIFE);
-  if (!choice.single || choice.single.isFolder) toast({ text: t("download.zip", { count: choice.count }) });
-  return undefined;
 }
 
 function readFrame(frame, id) {

@@ -53,6 +53,13 @@ export function mayBeText(entry) {
   return !entry.isFolder && TEXT_KINDS.has(entry.kind);
 }
 
+const ARCHIVE = /\.(zip|7z|rar|iso|tar|tar\.(gz|bz2|xz|zst|lz|lz4|lzma|z)|tgz|tbz2?|txz|tzst)$/i;
+
+// What the server can look into, as far as the name says.
+export function isArchive(entry) {
+  return !entry.isFolder && ARCHIVE.test(entry.name);
+}
+
 // The recycle bin of a share has a name that says so.
 export function shownName(entry) {
   return entry.kind === "recycle" ? t("place.recycle") : entry.name;

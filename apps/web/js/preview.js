@@ -6,7 +6,7 @@ import { browser } from "./browser.js";
 import { command, context, runCommand } from "./commands.js";
 import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { describe } from "./errors.js";
-import { mayBeText } from "./entries.js";
+import { isArchive, mayBeText } from "./entries.js";
 import { formatSize, formatTime } from "./format.js";
 import { canShowImage, iconOf } from "./icons.js";
 import { download } from "./download.js";
@@ -157,6 +157,7 @@ async function contentOf(entry, signal) {
   if ((entry.kind === "image" || entry.kind === "raw") && isDrawn(entry.name)) return imageOf(entry, smallPicture(entry, SMALLER), "preview.none");
   if (entry.kind === "audio" || entry.kind === "video") return mediaOf(entry, signal);
   if (entry.kind === "pdf") return pdfOf(entry, signal);
+  if (isArchive(entry)) return (await import("./view_archive.js")).archiveNode(entry, signal);
   if (mayBeText(entry)) return textOf(entry, signal);
   return message(entry, t("preview.none"));
 }

@@ -29,6 +29,7 @@ const ON_CHOSEN = [
   "rename",
   "compress",
   "extract",
+  "extractOwn",
   "restore",
   "delete",
 ];
@@ -73,7 +74,7 @@ export function contextItems() {
     "-",
     ...items(ON_CHOSEN.slice(5, 9)),
     "-",
-    ...items(["rename", "compress", "extract", "restore"]),
+    ...items(["rename", "compress", "extract", "extractOwn", "restore"]),
     "-",
     ...items(["delete", "deleteForever"]),
     "-",

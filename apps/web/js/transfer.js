@@ -5,15 +5,14 @@ import { Choice } from "./choice.js";
 import { heldItems, hold, letGo } from "./clipboard.js";
 import { addCommand } from "./commands.js";
 import { askConflict, takenOf } from "./conflicts.js";
-import { askText, confirm, dismissToasts, loaded, toast, toastFailure } from "./dialogs.js";
-import { isInBin, isReadOnlyShare, isRecycleBin } from "./entries.js";
+import { confirm, dismissToasts, loaded, toast, toastFailure } from "./dialogs.js";
+import { isArchive, isInBin, isReadOnlyShare, isRecycleBin } from "./entries.js";
 import { checkName } from "./operations.js";
 import { childOf, encodeName, isDeleted, isWithin, lastOf, nameOf, parentOf, shareOf, splitExtension } from "./path.js";
 import { get } from "./api.js";
 import { startTask } from "./tasks.js";
 import { t } from "./strings.js";
 
-const ARCHIVE = /\.(zip|tar|tar\.gz|tgz|tar\.bz2|tbz2?|tar\.xz|txz)$/i;
 const EXISTS = { skip: "skip", overwrite: "overwrite", both: "keep_both" };
 
 // Copies or moves entries into a folder; what stands in the way is asked about before anything happens. Whether it began.
@@ -157,25 +156,22 @@ async function compress() {
   if (choice.count === 0) return;
   const [folder] = choice.folders;
   const stem = choice.single ? splitExtension(nameOf(choice.single.id))[0] : nameOf(folder);
-  const name = await askText({
-    title: t("compress.title", { count: choice.count }),
-    label: t("name.label"),
-    value: `${stem}.zip`,
-    selectTo: stem.length,
-    action: t("command.compress"),
-    check: checkName,
-    submit: async (text) => (/\.zip$/i.test(text) ? text : `${text}.zip`),
-  });
-  if (!name) return;
-  const target = childOf(folder, encodeName(name));
+  const asked = await loaded(import("./pack_dialog.js"));
+  const pack = await asked?.askPack({ count: choice.count, stem, check: checkName });
+  if (!pack) return;
+  const target = childOf(folder, encodeName(pack.name));
   const conflict = await conflictFor(folder, new Choice([{ id: target, isFolder: false }]));
-  if (conflict) await startTask("compress", choice, { params: { target_raw: target, conflict }, affected: [folder] });
+  const params = { target_raw: target, conflict, format: pack.format, password: pack.password };
+  if (conflict) await startTask("compress", choice, { params, affected: [folder] });
 }
 
 async function extract({ single }) {
   const target = await pickFolder({ title: t("extract.title"), action: t("extract.action"), start: single.parent });
-  if (!target) return;
-  const params = { target_raw: target, conflict: "keep_both" };
+  if (target) await extractTo(single, target);
+}
+
+async function extractTo(single, target, own_folder) {
+  const params = { target_raw: target, conflict: "keep_both", own_folder };
   await startTask("extract", [single], { params, affected: [target], target });
 }
 
@@ -204,8 +200,15 @@ addCommand({
   id: "extract",
   icon: "extract",
   group: "change",
-  when: ({ single, inBin }) => single && !inBin && !single.isFolder && ARCHIVE.test(single.name),
+  when: ({ single, inBin }) => single && !inBin && isArchive(single),
   run: extract,
+});
+addCommand({
+  id: "extractOwn",
+  icon: "extract",
+  group: "change",
+  when: ({ single, inBin, canWrite, search }) => single && !inBin && !search && canWrite && isArchive(single),
+  run: ({ single }) => extractTo(single, single.parent, "true"),
 });
 addCommand({
   id: "restore",
