@@ -145,25 +145,23 @@ TEST_F(VersionsCgi, AreShownToWhomTheFileIs) {
         {.what = "share", .change = [] {}, .user = "carol", .code = 407},
         {.what = "then", .change = [&] { chmod((snapshot + "/a/f.txt").c_str(), 0600); }, .code = 407},
         {.what = "a snapshot that is a link",
-         .change = [&] { fs::rename(snapshot, video_ + "/s"), fs::create_symlink(video_ + "/s", snapshot); }},
+         .change = [&] { fs::rename(snapshot, photo_ + "/.snapshots/s"), fs::create_symlink("s", snapshot); }},
         {.what = "snapshots behind a link",
          .change =
              [&] {
-                 fs::rename(photo_ + "/.snapshots", video_ + "/s");
-                 fs::create_symlink(video_ + "/s", photo_ + "/.snapshots");
+                 fs::rename(photo_ + "/.snapshots", photo_ + "/a/s");
+                 fs::create_symlink("a/s", photo_ + "/.snapshots");
              }},
         {.what = "a folder in it that is a link",
-         .change =
-             [&] {
-                 fs::remove_all(snapshot + "/a");
-                 fs::create_symlink(video_, snapshot + "/a");
-             },
+         .change = [&] { fs::rename(snapshot + "/a", snapshot + "/b"), fs::create_symlink("b", snapshot + "/a"); }},
+        {.what = "a folder in it that leads out",
+         .change = [&] { fs::remove_all(snapshot + "/a"), fs::create_symlink(video_, snapshot + "/a"); },
          .path = "/photo/a/secret"},
         {.what = "a file that is a link",
          .change =
              [&] {
-                 fs::remove(snapshot + "/a/f.txt");
-                 fs::create_symlink(elsewhere, snapshot + "/a/f.txt");
+                 fs::rename(snapshot + "/a/f.txt", snapshot + "/a/g");
+                 fs::create_symlink("g", snapshot + "/a/f.txt");
              }},
         {.what = "out of it", .change = [] {}, .path = "/photo/a/../../video/secret", .code = 407},
         {.what = "a name that leads out", .change = [] {}, .name = "..", .code = 408},
@@ -177,7 +175,6 @@ TEST_F(VersionsCgi, AreShownToWhomTheFileIs) {
     for (const auto& hostile : cases) {
         SCOPED_TRACE(hostile.what);
         for (const char* name : {"/a", "/.snapshots"}) fs::remove_all(photo_ + name);
-        fs::remove_all(video_ + "/s");
         addShare("photo", hostile.user == "carol" ? "read only = no\ninvalid users = carol\n" : "read only = no\n");
         openFolder(photo_ + "/a");
         put("", "/a/f.txt", "new!", 3000);

@@ -16,7 +16,7 @@ import { textNode } from "./view_text.js";
 const PAGE = 200;
 const EDGE = 1024;
 
-loadStyle("versions");
+await loadStyle("versions");
 
 const snapshotOf = (version) => version.snapshot_raw ?? encodeURIComponent(version.snapshot);
 const dateOf = (version) => (version.time === undefined ? version.snapshot : formatFullTime(version.time));
