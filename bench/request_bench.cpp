@@ -3,7 +3,8 @@
 //
 //   request_bench BUILD [ROUNDS [SECONDS]]
 //
-// Four connections ask at a time. Contestants take turns; ratios are of rates within a round.
+// Four connections ask at a time. Contestants take turns; ratios are of rates within a round. "cpu us" is the processor
+// time of a server and its children for one request.
 #include <fcntl.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -21,6 +22,8 @@
 #include <fstream>
 #include <functional>
 #include <iostream>
+#include <iterator>
+#include <sstream>
 #include <string>
 #include <thread>
 #include <vector>
@@ -32,6 +35,7 @@ namespace {
 using Clock = std::chrono::steady_clock;
 using Texts = std::vector<std::string>;
 constexpr int kConnections = 4;
+constexpr const char* kFollow = "100 rows, nothing changed";
 
 std::string quoted(const std::string& text) {
     return "'" + text + "'";
@@ -136,8 +140,22 @@ struct Contestant {
     std::string name;
     std::function<std::string()> ask;
     std::string wanted;  // what each reply must hold
-    std::vector<double> rates, ratios, latencies;
+    pid_t server = 0;    // 0 for none
+    std::vector<double> rates = {}, ratios = {}, latencies = {}, costs = {};
 };
+
+// Of a process and the children it has waited for, in microseconds.
+double processorTime(pid_t process) {
+    std::ifstream file("/proc/" + std::to_string(process) + "/stat");
+    const std::string text(std::istreambuf_iterator<char>(file), {});
+    double ticks = 0;
+    std::istringstream fields(text.substr(std::min(text.rfind(')') + 2, text.size())));
+    std::string word;
+    for (int i = 3; fields >> word; ++i) {
+        if (i >= 14 && i <= 17) ticks += atof(word.c_str());
+    }
+    return ticks * 1e6 / static_cast<double>(sysconf(_SC_CLK_TCK));
+}
 
 // Milliseconds of each request.
 std::vector<double> measure(const Contestant& contestant, std::chrono::milliseconds length) {
@@ -174,20 +192,22 @@ void compete(std::vector<Contestant>& contestants, int rounds, std::chrono::mill
     for (int round = -1; round < rounds; ++round) {
         double floor = 0;
         for (Contestant& contestant : contestants) {
+            const double before = processorTime(contestant.server);
             const auto times = measure(contestant, round < 0 ? length / 4 : length);
             const double rate = static_cast<double>(times.size()) / std::chrono::duration<double>(length).count();
             if (&contestant == &contestants.front()) floor = rate;
             if (round < 0) continue;
             contestant.rates.push_back(rate);
+            contestant.costs.push_back((processorTime(contestant.server) - before) / static_cast<double>(times.size()));
             contestant.ratios.push_back(rate / floor);
             contestant.latencies.insert(contestant.latencies.end(), times.begin(), times.end());
         }
     }
-    std::printf("%-40s %9s %8s %8s %8s\n", "", "per s", "ratio", "p50 ms", "p99 ms");
+    std::printf("%-40s %9s %8s %8s %8s %8s\n", "", "per s", "ratio", "p50 ms", "p99 ms", "cpu us");
     for (Contestant& contestant : contestants) {
-        std::printf("%-40s %9.0f %8.3f %8.2f %8.2f\n", contestant.name.c_str(), bench::median(contestant.rates),
+        std::printf("%-40s %9.0f %8.3f %8.2f %8.2f %8.0f\n", contestant.name.c_str(), bench::median(contestant.rates),
                     bench::median(contestant.ratios), quantile(contestant.latencies, 0.5),
-                    quantile(contestant.latencies, 0.99));
+                    quantile(contestant.latencies, 0.99), bench::median(contestant.costs));
     }
 }
 
@@ -203,14 +223,13 @@ Texts variablesOf(const std::string& user, const std::string& query, const std::
     return variables;
 }
 
-void addRequest(std::vector<Contestant>& contestants, const Place& place, const std::string& what,
+void addRequest(std::vector<Contestant>& contestants, const Place& place, pid_t server, const std::string& what,
                 const Texts& variables, const std::string& wanted) {
     const std::string request = scgi(variables);
-    contestants.push_back({"orveld, " + what, [=] { return exchange(place.orveld, request); }, wanted, {}, {}, {}});
+    contestants.push_back({"orveld, " + what, [=] { return exchange(place.orveld, request); }, wanted, server});
     Texts environment = variables;
     environment.push_back("VEXO_ROOT=" + place.root);
-    contestants.push_back(
-        {"CGI, " + what, [=] { return runCgi(place.build + "/cgi/list", environment); }, wanted, {}, {}, {}});
+    contestants.push_back({"CGI, " + what, [=] { return runCgi(place.build + "/cgi/list", environment); }, wanted, 0});
 }
 
 void makeAppliance(const Place& place) {
@@ -225,6 +244,32 @@ void makeAppliance(const Place& place) {
     const std::string folder = shares.substr(at, end - at) + "/hundred";
     mkdir(folder.c_str(), 0755);
     for (int i = 0; i < 100; ++i) std::ofstream(folder + "/file " + std::to_string(i) + ".txt") << i;
+}
+
+// The text of a member of a reply.
+std::string valueIn(const std::string& reply, const std::string& member) {
+    const std::string key = "\"" + member + "\":\"";
+    const size_t at = reply.find(key);
+    return at == std::string::npos ? ""
+                                   : reply.substr(at + key.size(), reply.find('"', at + key.size()) - at - key.size());
+}
+
+// What a thousand open tabs come to. A page asks 1.5 s after the last answer while somebody is at it, each 10 s when
+// nobody has been for long, each 30 s in a hidden tab.
+void tellTabs(const std::vector<Contestant>& contestants) {
+    struct Mix {
+        double active, seen, hidden;
+    };
+    for (const Contestant& contestant : contestants) {
+        const bool floor = &contestant == &contestants.front();
+        if (!floor && contestant.name != std::string("orveld, ") + kFollow) continue;
+        for (const Mix& mix : {Mix{1000, 0, 0}, Mix{100, 200, 700}, Mix{50, 100, 850}, Mix{0, 0, 1000}}) {
+            const double rate = mix.active / 1.5 + mix.seen / 10 + mix.hidden / 30;
+            std::printf("%-40s %4.0f active %4.0f seen %4.0f hidden: %4.0f a second, %5.1f %% of a processor\n",
+                        contestant.name.c_str(), mix.active, mix.seen, mix.hidden, rate,
+                        rate * bench::median(contestant.costs) / 1e4);
+        }
+    }
 }
 
 }  // namespace
@@ -261,15 +306,26 @@ int main(int count, char** words) {
     const std::string page = "action=folder&path=%2Fphoto%2Fhundred&limit=100&additional=size,time,owner,perm";
     std::vector<Contestant> contestants;
     contestants.push_back(
-        {"floor: SCGI, fork, 100 bytes", [&] { return exchange(place.floor, hello); }, "890123", {}, {}, {}});
+        {"floor: SCGI, fork, 100 bytes", [&] { return exchange(place.floor, hello); }, "890123", servers[0]});
     contestants.push_back(
-        {"the same, mapping what orveld maps", [&] { return exchange(place.linked, hello); }, "890123", {}, {}, {}});
+        {"the same, mapping what orveld maps", [&] { return exchange(place.linked, hello); }, "890123", servers[1]});
     contestants.push_back(
-        {"resident FastCGI, 100 bytes", [&] { return exchange(place.resident, fastCgi()); }, "890123", {}, {}, {}});
-    addRequest(contestants, place, "shares", variablesOf("alice", "action=shares", cookie), "\"success\":true");
-    addRequest(contestants, place, "page of 100 rows", variablesOf("alice", page, cookie), "\"success\":true");
-    addRequest(contestants, place, "refusal", variablesOf("", "action=shares", ""), "401");
+        {"resident FastCGI, 100 bytes", [&] { return exchange(place.resident, fastCgi()); }, "890123", 0});
+    addRequest(contestants, place, servers[3], "shares", variablesOf("alice", "action=shares", cookie),
+               "\"success\":true");
+    addRequest(contestants, place, servers[3], "page of 100 rows", variablesOf("alice", page, cookie),
+               "\"success\":true");
+    addRequest(contestants, place, servers[3], "refusal", variablesOf("", "action=shares", ""), "401");
+    const auto ask = [&](const std::string& query) {
+        return exchange(place.orveld, scgi(variablesOf("alice", query, cookie)));
+    };
+    const std::string id = valueIn(ask("action=folder&keep=1&limit=1&path=%2Fphoto%2Fhundred"), "listing");
+    const std::string follow = "action=changes&limit=100&listing=" + id + "&state=";
+    const std::string state = valueIn(ask(follow), "state");
+    addRequest(contestants, place, servers[3], kFollow, variablesOf("alice", follow + state, cookie),
+               "\"changed\":false}}");
     compete(contestants, rounds, length);
+    tellTabs(contestants);
 
     for (const pid_t server : servers) {
         kill(server, SIGTERM);

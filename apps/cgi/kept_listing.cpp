@@ -1,11 +1,13 @@
 #include "kept_listing.h"
 
 #include <dirent.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <ctime>
+#include <functional>
 #include <list>
 #include <unordered_map>
 
@@ -221,6 +223,31 @@ int KeptListing::page(const ListRequest& request, const OpenedFolder& opened, st
         return code == ORV_ERR_NONE;
     });
     return whole ? code : damaged();
+}
+
+int KeptListing::stateOfRows(uint32_t first, uint32_t end, const OpenedFolder& opened, std::string& state) {
+    std::vector<int64_t> facts;
+    bool isSettled = true;
+    const bool whole = file_.each(first, end, [&](uint32_t /*number*/, const KeptRow& kept) {
+        struct statx now {};
+        // Asked of no other machine: what it has told the kernel already has to do.
+        const int flags = AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT | AT_STATX_DONT_SYNC;
+        if (statx(opened.folder.get(), kept.name.c_str(), flags, STATX_BASIC_STATS, &now) != 0) now = {};
+        const statx_timestamp& modified = now.stx_mtime;
+        const statx_timestamp& changed = now.stx_ctime;
+        for (const uint64_t fact : {uint64_t{now.stx_dev_major}, uint64_t{now.stx_dev_minor}, uint64_t{now.stx_ino},
+                                    uint64_t{now.stx_mode}, uint64_t{now.stx_uid}, uint64_t{now.stx_gid},
+                                    uint64_t{now.stx_size}, uint64_t{modified.tv_nsec}, uint64_t{changed.tv_nsec}})
+            facts.push_back(static_cast<int64_t>(fact));
+        facts.insert(facts.end(), {modified.tv_sec, changed.tv_sec});
+        const long long age = ageOf(changed.tv_sec, changed.tv_nsec);
+        isSettled = isSettled && (age < 0 || age >= kTick);
+        return true;
+    });
+    if (!whole) return damaged();
+    const std::string_view bytes(reinterpret_cast<const char*>(facts.data()), facts.size() * sizeof facts[0]);
+    state = isSettled ? std::to_string(std::hash<std::string_view>()(bytes)) : "";
+    return ORV_ERR_NONE;
 }
 
 int KeptListing::findBeginning(const std::string& text, uint32_t from, std::optional<uint32_t>& row) {

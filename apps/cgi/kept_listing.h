@@ -59,6 +59,10 @@ class KeptListing {
     // The page that `request` asks for. 0 or a library code.
     int page(const ListRequest& request, const OpenedFolder& opened, std::vector<KeptPageRow>& rows);
 
+    // What the rows before `end` are like: another text as soon as one of them is changed; "" for what may still change
+    // without leaving another time. 0 or 401.
+    int stateOfRows(uint32_t first, uint32_t end, const OpenedFolder& opened, std::string& state);
+
     // The first row from `from` on, and round, whose name begins so; nothing in `row` when there is none. 0 or 401.
     int findBeginning(const std::string& text, uint32_t from, std::optional<uint32_t>& row);
     // The rows of the names, -1 for those that it lacks. 0 or 401.

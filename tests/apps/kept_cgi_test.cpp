@@ -53,6 +53,38 @@ TEST_F(KeptCgi, PagesAreOfTheOrderThatWasShown) {
     EXPECT_EQ(after["items"][1]["gone"], true);
 }
 
+TEST_F(KeptCgi, WhoShowsAFolderHearsOfEachChange) {
+    const std::string many = photo_ + "/many", asked = "action=changes&listing=" + keep();
+    Json::Value data;
+    const auto changes = [&] {
+        data =
+            list("alice", asked + "&limit=2&offset=1&additional=size,perm&state=" + data["state"].asString())["data"];
+        EXPECT_EQ(data["changed"], false);
+        return data.isMember("items") ? each(data["items"], "name") : Names();
+    };
+    const Names rows = {"file 1", "file 2"};
+    // What was changed a moment ago has no state yet.
+    const auto settled = [&] { return !data["state"].asString().empty() || (changes(), false); };
+    EXPECT_EQ(changes(), rows);
+    EXPECT_TRUE(support::waitUntil("a state", settled));
+    EXPECT_EQ(changes(), Names()) << "nothing was changed";
+    writeFile(many + "/file 10", "out of sight", 0666);
+    EXPECT_EQ(changes(), Names());
+    writeFile(many + "/file 2", "longer than before", 0666);
+    EXPECT_EQ(changes(), rows);
+    EXPECT_EQ(data["items"][1]["additional"]["size"].asInt(), 18);
+    EXPECT_TRUE(support::waitUntil("a state", settled));
+    EXPECT_EQ(chmod((many + "/file 1").c_str(), 0600), 0);
+    EXPECT_EQ(changes(), rows);
+    EXPECT_EQ(data["items"][0]["additional"]["perm"]["posix"].asInt(), 600);
+    fs::rename(many + "/file 10", many + "/another");
+    EXPECT_EQ(list("alice", asked + "&limit=2&state=" + data["state"].asString())["data"]["changed"], true);
+    for (const char* limit : {"0", "101"})
+        EXPECT_EQ(get(PROGRAM_LIST, "alice", asked + "&limit=" + limit).status, 400) << limit;
+    fs::remove_all(many);
+    EXPECT_EQ(list("alice", asked + "&limit=2")["error"]["code"], 408);
+}
+
 TEST_F(KeptCgi, RowsAreFoundByNameByBeginningAndInAnotherOrder) {
     const std::string id = keep();
     for (const auto& [query, row] : Rows<const char*, int>{

@@ -104,6 +104,10 @@ TEST_F(Session, EndsAfterIdlenessAndNotesUsesOnceAMinute) {
     };
     EXPECT_TRUE(keptAfter(30));
     EXPECT_FALSE(isNoted(sid));
+    setenv("HTTP_ORVEL_IDLE", "1", 1);
+    EXPECT_TRUE(keptAfter(14 * 60L));
+    EXPECT_FALSE(isNoted(sid)) << "nobody is at the page";
+    unsetenv("HTTP_ORVEL_IDLE");
     EXPECT_TRUE(keptAfter(14 * 60L)) << "15 minutes where nothing is set";
     EXPECT_TRUE(isNoted(sid));
     EXPECT_TRUE(keptAfter(-3600));

@@ -43,14 +43,16 @@ after(() => browser.close());
 const isNoPicture = (url) => new URL(url, URL_OF_PAGE).pathname === "/cgi-bin/thumbnail";
 
 // Counts what is being changed on the server: a test is over when this is. What users choose in a page is not `kept`, and
-// reaches no other one: even a page that is being closed would send it.
-function standBetween(kept) {
+// reaches no other one: even a page that is being closed would send it. What others do in a folder shows at once where the
+// page `follows`, else when it lists the folder again for another reason.
+function standBetween({ kept, follows }) {
   const { fetch } = globalThis, { open, send } = XMLHttpRequest.prototype;
   globalThis.changing = 0;
   const done = () => --globalThis.changing;
   globalThis.fetch = (url, options, ...more) => {
     const ofChoices = !kept && typeof url === "string" && url.startsWith("/cgi-bin/");
     if (ofChoices && url.startsWith("/cgi-bin/preferences")) return Promise.resolve(Response.json({ success: true, data: { values: {} } }));
+    if (!follows && typeof url === "string" && url.includes("action=changes")) return new Promise(() => {});
     const reply = fetch(ofChoices ? url.replace("with=preferences%2C", "with=") : url, options, ...more);
     if ((options?.method ?? "GET") === "GET") return reply;
     ++globalThis.changing;
@@ -70,7 +72,7 @@ function standBetween(kept) {
 
 // A page of a browser of its own. `complaints` is what must be empty at the end: errors on the console or of scripts,
 // failed requests.
-export async function newPage({ kept = false, ...options } = {}) {
+export async function newPage({ kept = false, follows = false, ...options } = {}) {
   const context = await browser.newContext({
     viewport: { width: 1280, height: 800 },
     locale: "en-GB",
@@ -79,7 +81,7 @@ export async function newPage({ kept = false, ...options } = {}) {
     ...options,
   });
   context.setDefaultTimeout(LONGEST);
-  await context.addInitScript(standBetween, kept);
+  await context.addInitScript(standBetween, { kept, follows });
   const page = await context.newPage();
   if (SCREENSHOTS && process.argv[1].endsWith(".test.mjs")) photograph(page);
   page.complaints = [];

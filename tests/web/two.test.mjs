@@ -105,7 +105,7 @@ function check(isChosen, shown, chosen) {
 
 test("two people in one folder", () => {
   for (let i = 0; i < FILES; ++i) add(nameOf(i));
-  return withPage("admin", { path: "/projects/two" }, async (page) => {
+  return withPage("admin", { follows: true, path: "/projects/two" }, async (page) => {
     const end = Date.now() + 60_000;
     let rounds = 0;
     const others = setInterval(otherStep, 30);

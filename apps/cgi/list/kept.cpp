@@ -17,6 +17,7 @@ namespace orvel::cgi {
 namespace {
 
 constexpr size_t kMostLeftNames = 10;
+constexpr unsigned long kMostFollowed = 100;
 
 struct Answer {
     int code = ORV_ERR_NONE;
@@ -77,6 +78,32 @@ void servePage(const User& user, ListRequest wanted, KeptListing& listing, const
     out.text() += "}}";
 }
 
+// Asked again and again by every page that shows a folder: mostly that nothing has changed.
+void serveChanges(const User& user, const std::string& known, ListRequest wanted, KeptListing& listing, Output& out) {
+    wanted.path = listing.file().about().path;
+    OpenedFolder opened;
+    std::string state;
+    std::vector<KeptPageRow> rows;
+    int code = listing.openFolder(wanted, opened);
+    const bool changed = opened.state != listing.file().about().folder;
+    const auto first = static_cast<uint32_t>(std::min<unsigned long>(wanted.offset, listing.file().rows()));
+    const auto end = static_cast<uint32_t>(std::min(first + wanted.limit, ulong{listing.file().rows()}));
+    if (code == ORV_ERR_NONE && !changed) code = listing.stateOfRows(first, end, opened, state);
+    const bool others = code == ORV_ERR_NONE && !changed && (state.empty() || state != known);
+    if (others) code = listing.page(wanted, opened, rows);
+    if (code != ORV_ERR_NONE) return fail(user, code, wanted.path, listing.why(), out);
+    beginReply(out, Status::kOk, user.cookie);
+    out.text() += "{\"success\":true,\"data\":{";
+    appendMember("state", state, out);
+    appendMember("changed", changed, out);
+    if (others) {
+        appendRows(rows, wanted.additional, out);
+    } else {
+        out.text().pop_back();
+    }
+    out.text() += "}}";
+}
+
 Answer renew(const User& user, const VEXO::WebCGI& web) {
     Answer answer;
     answer.data["listings"] = Json::Value(Json::arrayValue);
@@ -91,7 +118,8 @@ Answer renew(const User& user, const VEXO::WebCGI& web) {
 }
 
 // Whether the request says what to look for.
-bool isWhole(const VEXO::WebCGI& web, const std::string& action) {
+bool isWhole(const VEXO::WebCGI& web, const std::string& action, const ListRequest& wanted) {
+    if (action == "changes") return wanted.limit >= 1 && wanted.limit <= kMostFollowed;
     if (action != "find") return true;
     const auto text = bytesParam(web, "prefix");
     return text && !text->empty() && numberParam(web, "from", 0);
@@ -196,14 +224,15 @@ void serveKeeping(Request& request, const ListRequest& wanted, Output& out) {
 }
 
 bool isKeptAction(const std::string& action) {
-    return action == "page" || action == "renew" || action == "find" || action == "rows" || action == "carry";
+    return action == "page" || action == "changes" || action == "renew" || action == "find" || action == "rows" ||
+           action == "carry";
 }
 
 void serveKept(Request& request, const std::string& action, ListRequest wanted, Output& out) {
     const User& user = request.user;
     const VEXO::WebCGI& web = request.web;
     KeptListing listing;
-    int code = isWhole(web, action) ? ORV_ERR_NONE : ORV_ERR_PARAMETER;
+    int code = isWhole(web, action, wanted) ? ORV_ERR_NONE : ORV_ERR_PARAMETER;
     if (code == ORV_ERR_NONE) code = actAs(user.sid.c_str(), user.name, false);
     if (code != ORV_ERR_NONE) return fail(user, code, "", "", out);
     Answer answer;
@@ -214,6 +243,7 @@ void serveKept(Request& request, const std::string& action, ListRequest wanted, 
         code = listing.find(user.name, id);
         if (code != ORV_ERR_NONE) return fail(user, code, "", listing.why(), out);
         if (action == "page") return servePage(user, std::move(wanted), listing, id, out);
+        if (action == "changes") return serveChanges(user, web.GetParam("state", ""), std::move(wanted), listing, out);
         answer = action == "find" ? findRow(listing, web) : rowsOfNames(listing, web);
         if (!listing.why().empty()) answer.data["listing"] = listing.why();
     }

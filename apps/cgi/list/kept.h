@@ -15,6 +15,8 @@ void serveKeeping(Request& request, const ListRequest& wanted, Output& out);
 
 // Whether `action` is one of these on the listing "listing":
 //   page    as the action "folder", of the kept order: data also has "listing", "path", "changed"; an item may be "gone"
+//   changes "state", of the same rows ("offset", "limit" of 1 to 100) when they were asked about before: data: {"changed",
+//           "state","items"}: the rows where they are not as they were and the folder has the same names
 //   renew   "listing" may be several, separated by commas: data: {"listings":[those that are there]}
 //   find    "prefix", "prefix_raw", "from": data: {"row"}, -1 for none
 //   rows    "names_raw": data: {"rows":[...]}, -1 for a name that it lacks

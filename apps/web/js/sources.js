@@ -8,7 +8,7 @@ import { Listing, PAGE } from "./listing.js";
 import { encodeName, inBothForms, inForms, lastOf, parentOf, patternOf, splitExtension } from "./path.js";
 import { language } from "./strings.js";
 
-const ADDITIONAL = "size,time,owner,perm,mount_point_type,icon";
+export const ADDITIONAL = "size,time,owner,perm,mount_point_type,icon";
 const BESIDE = "access,links"; // what else comes with a folder's list
 const BRIEF = { additional: undefined };
 const LONGEST_PAGE = 10_000; // of search results

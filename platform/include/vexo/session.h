@@ -37,7 +37,8 @@ struct WebSession {
 
 // The session of one request. The constructor reads the CGI environment: the cookie "id" (by HTTPS "__Host-id") names
 // the session; REMOTE_USER names the user that the web server let in, and counts where the setting "trusted_log_in" is
-// "yes". A session is a file of the store (/run/vexo/sessions/<sid>) that belongs to root, see formats/session.md.
+// "yes"; with a header Orvel-Idle the request is no use of the session. A session is a file of the store
+// (/run/vexo/sessions/<sid>) that belongs to root, see formats/session.md.
 class VEXO_API WebMan {
  public:
     WebMan();

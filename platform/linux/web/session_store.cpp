@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <charconv>
+#include <cstdlib>
 #include <memory>
 
 #include "base/owner.h"
@@ -80,9 +81,10 @@ std::optional<SessionRecord> readRecord(int fd, struct stat& status) {
     return parseSessionRecord(text);
 }
 
-// Notes the use, but writes seldom: a listing page asks for many things within a second.
+// Notes the use, but writes seldom: a listing page asks for many things within a second. What a page asks by itself
+// while nobody is at it is no use.
 void noteUse(int fd, time_t lastUse, time_t now) {
-    if (lastUse <= now && now - lastUse < kNoteInterval) return;
+    if ((lastUse <= now && now - lastUse < kNoteInterval) || getenv("HTTP_ORVEL_IDLE") != nullptr) return;
     const KeepErrno keep;
     const timespec times[] = {{0, UTIME_OMIT}, {0, UTIME_NOW}};
     static_cast<void>(futimens(fd, times));
