@@ -18,7 +18,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const std::string tag = orvel::cgi::entityTag(7, 8, 9, 10);
     static_cast<void>(orvel::cgi::isCurrent(input, input, tag, 9));
     static_cast<void>(orvel::cgi::rangeCounts(input, tag, 9));
-    const std::string header = orvel::cgi::attachment(input);
+    const std::string header = orvel::cgi::disposition("attachment", input);
     fuzz::require(std::all_of(header.begin(), header.end(), [](char c) { return c >= ' ' && c < 127; }));
     return 0;
 }

@@ -53,6 +53,28 @@ class DownloadCgi : public CgiTest {
     }
 };
 
+TEST_F(DownloadCgi, WhatABrowserMayShowIsAShortList) {
+    for (const auto& [name, type] : Rows<const char*, const char*>{{"a.PNG", "image/png"},
+                                                                   {"a.jpeg", "image/jpeg"},
+                                                                   {"a.txt", "text/plain; charset=utf-8"},
+                                                                   {"a.html", ""},
+                                                                   {"a.svg", ""},
+                                                                   {"a.xml", ""},
+                                                                   {"a.xhtml", ""},
+                                                                   {"a.pdf", ""},
+                                                                   {"a.png.html", ""},
+                                                                   {"png", ""}}) {
+        writeFile(shareRoot("photo") + "/" + name, "<script>", 0644);
+        const bool shown = *type != '\0';
+        auto shownAs = RawReply(ask("alice", "inline=1&path=/photo/" + std::string(name))).headers;
+        EXPECT_EQ(shownAs["Content-Type"], shown ? type : "application/octet-stream") << name;
+        EXPECT_TRUE(shownAs["Content-Disposition"].starts_with(shown ? "inline; " : "attachment; ")) << name;
+        EXPECT_TRUE(shownAs["Content-Security-Policy"].starts_with("sandbox; default-src 'none'")) << name;
+        EXPECT_EQ(shownAs["X-Content-Type-Options"], "nosniff");
+        EXPECT_EQ(fetch("/photo/" + std::string(name)).headers.at("Content-Type"), "application/octet-stream");
+    }
+}
+
 TEST_F(DownloadCgi, AFileComesWholeOrInPart) {
     const std::string data("0123456789\0\r\n\xFF", 14);
     writeFile(shareRoot("photo") + "/f.html", data, 0644);

@@ -34,11 +34,12 @@ TEST(Range, ConditionsAreComparedWithTheFile) {
 }
 
 TEST(Range, NamesOfAnyScriptAndBytesStayInTheirHeader) {
-    EXPECT_EQ(attachment("a b.txt"), "attachment; filename=\"a b.txt\"; filename*=UTF-8''a%20b.txt");
-    EXPECT_EQ(attachment("日本.txt"), "attachment; filename=\"______.txt\"; filename*=UTF-8''%E6%97%A5%E6%9C%AC.txt");
-    EXPECT_EQ(attachment("a\"\\%41;\r\nX: y"),
+    EXPECT_EQ(disposition("attachment", "a b.txt"), "attachment; filename=\"a b.txt\"; filename*=UTF-8''a%20b.txt");
+    EXPECT_EQ(disposition("attachment", "日本.txt"),
+              "attachment; filename=\"______.txt\"; filename*=UTF-8''%E6%97%A5%E6%9C%AC.txt");
+    EXPECT_EQ(disposition("attachment", "a\"\\%41;\r\nX: y"),
               "attachment; filename=\"a___41;__X: y\"; filename*=UTF-8''a%22%5C%2541%3B%0D%0AX%3A%20y");
-    EXPECT_EQ(attachment("\xE9"), "attachment; filename=\"___\"; filename*=UTF-8''%EF%BF%BD");
+    EXPECT_EQ(disposition("attachment", "\xE9"), "attachment; filename=\"___\"; filename*=UTF-8''%EF%BF%BD");
 }
 
 }  // namespace

@@ -169,6 +169,69 @@ test("pictures closer and turned, by keys, wheel and touch", async () => {
   });
 });
 
+test("pictures one after the other, by themselves", async () => {
+  ownFolder("slides", { "1.png": picture, "2.txt": "no picture", "3.png": picture });
+  await withPage("alice", { path: "/projects/slides" }, async (page) => {
+    const shows = (name) => page.locator(`.preview:has(.preview-tools) .preview-title b`, { hasText: name }).waitFor();
+    await page.clock.install();
+    await look(page, "1.png");
+    await shows("1.png");
+    await page.keyboard.press("s");
+    await page.selectOption(".preview .slides", "10");
+    await page.clock.fastForward(9000);
+    await shows("1.png");
+    for (const name of ["3.png", "1.png"]) {
+      await page.clock.fastForward(10_000);
+      await shows(name);
+    }
+    await screenshot(page, "documents slideshow");
+    assert.deepEqual(await findings(page, ".preview"), []);
+    await page.click(".preview [aria-label='Stop the slideshow']");
+    await page.clock.fastForward(20_000);
+    await page.locator(".preview [aria-label='Slideshow']").waitFor();
+    await shows("1.png");
+    await leave(page);
+  });
+});
+
+test("in a tab of its own only what cannot harm is shown, and nothing in it runs", async () => {
+  const attack = `<svg xmlns="http://www.w3.org/2000/svg"><script>globalThis.hacked = 1; fetch("/cgi-bin/list?action=shares")</script></svg>`;
+  for (const name of ["tab.svg", "tab.html", "tab.xml", "tab.pdf", "tab.txt", "tab.png"]) write(name, attack);
+  await withPage("alice", here, async (page) => {
+    await look(page, "picture.png");
+    const link = page.locator(".preview [aria-label='Show in a tab of its own']");
+    const url = new URL(await link.getAttribute("href"), page.url());
+    const [tab] = await Promise.all([page.context().waitForEvent("page"), link.click()]);
+    await tab.waitForFunction(() => document.images[0]?.naturalWidth > 0);
+    assert.equal(await tab.evaluate(() => globalThis.opener), null);
+    await leave(page);
+    const urlOf = (name) => url.href.replace("picture.png", name);
+    const ran = () => tab.evaluate(() => globalThis.hacked);
+    for (const name of ["tab.svg", "tab.html", "tab.xml", "tab.pdf"]) {
+      const saved = tab.waitForEvent("download");
+      await tab.goto(urlOf(name)).catch(() => {}); // it is no document
+      await (await saved).cancel();
+    }
+    await tab.goto(urlOf("tab.txt"));
+    await tab.locator("text=globalThis.hacked").waitFor();
+    assert.equal(await ran(), undefined);
+    await tab.goto(urlOf("tab.png"));
+    assert.equal(await ran(), undefined);
+    // Even if a browser took it for a document that can run something; without the policy this one would.
+    for (const policy of [true, false]) {
+      await tab.route("**/*inline=1*", async (route) => {
+        const response = await route.fetch();
+        const { "content-security-policy": given, ...headers } = response.headers();
+        await route.fulfill({ response, headers: { ...headers, ...(policy && { "content-security-policy": given }), "content-type": "image/svg+xml" } });
+      });
+      await tab.goto(urlOf("tab.txt"));
+      assert.equal(await ran(), policy ? undefined : 1);
+      await tab.unrouteAll({ behavior: "wait" });
+    }
+    await tab.close();
+  });
+});
+
 // Silence of so many seconds.
 function wave(seconds) {
   const data = Buffer.alloc(seconds * 8000, 128);

@@ -4,6 +4,7 @@
 //   paths_raw, path_raw, path   what to fetch (see pathParams): several paths, or a folder, come as a zip
 //   listing, ranges, except     or rows of a kept listing (see chosen_rows.h)
 //   inside, inside_raw          one file in the archive at the path, with its "password" (posted), see download/member.h
+//   inline                      "1": one file of a kind that a browser may show is shown (see shown_types.h)
 //   name                        of the zip, without ".zip"; default is that of the only folder, else "download"
 //   snapshot, snapshot_raw      one file as it was in that snapshot (see list/versions.h)
 // A file answers HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since. Failures are JSON replies.
@@ -33,6 +34,10 @@ std::string lastComponent(const std::string& path) {
     return path.substr(path.rfind('/') + 1);
 }
 
+bool wantsInline(const VEXO::WebCGI& web) {
+    return web.GetParam("inline", "") == "1";
+}
+
 void serveRows(const User& user, const VEXO::WebCGI& web, Output& out) {
     ChosenRows rows;
     Json::Value data;
@@ -54,7 +59,7 @@ void serveRows(const User& user, const VEXO::WebCGI& web, Output& out) {
         rows.explain(data);
         return reply(out, httpStatusOf(code), user.cookie, code, culprit, data);
     }
-    if (rows.size() == 1 && !row.isFolder) return serveFile(out, user, only);
+    if (rows.size() == 1 && !row.isFolder) return serveFile(out, user, only, wantsInline(web));
     serveZip(out, user, rows, web.GetParam("name", rows.size() == 1 ? row.name : lastComponent(culprit)));
 }
 
@@ -81,7 +86,8 @@ void serveDownloadProgram(Request& request, Output& out) {
     if (code == ORV_ERR_NONE) code = findSources(*paths, open, sources, culprit);
     if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), user.cookie, code, culprit);
     if (web.HasParam("inside") || web.HasParam("inside_raw")) return serveMember(out, user, web, sources);
-    if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, user, sources[0]);
+    if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode))
+        return serveFile(out, user, sources[0], wantsInline(web));
     const std::string only = sources.size() == 1 ? sources[0].name : "download";
     serveZip(out, user, sources, web.GetParam("name", only), open);
 }

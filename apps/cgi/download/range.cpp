@@ -110,14 +110,14 @@ std::int64_t parseHttpDate(std::string_view text) {
     return -1;
 }
 
-std::string attachment(std::string_view name) {
+std::string disposition(const char* how, std::string_view name) {
     const std::string exact = readable(name);
     std::string plain;
     for (const char c : exact) {
         const auto byte = static_cast<unsigned char>(c);
         plain += byte < 0x20 || byte >= 0x7F || c == '"' || c == '\\' || c == '/' || c == '%' ? '_' : c;
     }
-    return "attachment; filename=\"" + plain + "\"; filename*=UTF-8''" + percentEncode(exact);
+    return std::string(how) + "; filename=\"" + plain + "\"; filename*=UTF-8''" + percentEncode(exact);
 }
 
 }  // namespace orvel::cgi

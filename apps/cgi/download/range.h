@@ -39,7 +39,7 @@ std::string httpDate(std::int64_t seconds);
 std::int64_t parseHttpDate(std::string_view text);
 
 // The value of Content-Disposition for a file name of any bytes: a plain form for old clients and the exact one.
-std::string attachment(std::string_view name);
+std::string disposition(const char* how, std::string_view name);
 
 }  // namespace orvel::cgi
 

@@ -15,6 +15,7 @@
 #include "confined.h"
 #include "download/archive.h"
 #include "download/range.h"
+#include "download/shown_types.h"
 #include "free_names.h"
 #include "orvel/activity_log.h"
 #include "orvel/error_state.h"
@@ -34,6 +35,11 @@ std::string variable(const char* name) {
 void putHeader(Output& out, const std::string& line) {
     out.text() += line + "\r\n";
 }
+
+// A document of its own runs nothing, is nobody's origin, fetches nothing but itself and stands in no frame. Browsers
+// dress pictures and texts with styles of their own.
+constexpr const char* kShownPolicy =
+    "sandbox; default-src 'none'; img-src 'self'; style-src 'unsafe-inline'; frame-ancestors 'none'";
 
 // A file written within the clock's current tick could be written once more and keep its time, and so its tag.
 struct stat settledStatus(const Source& source) {
@@ -92,11 +98,11 @@ bool beginZip(Output& out, const User& user, const std::string& name) {
 
 }  // namespace
 
-void putCommon(Output& out, const std::string& cookie, const std::string& name, const char* type) {
+void putCommon(Output& out, const std::string& cookie, const std::string& name, const char* type, bool shown) {
     putHeader(out, std::string("Content-Type: ") + type);
     putHeader(out, "X-Content-Type-Options: nosniff");
-    putHeader(out, "Content-Disposition: " + attachment(name));
-    putHeader(out, "Content-Security-Policy: sandbox; default-src 'none'");
+    putHeader(out, "Content-Disposition: " + disposition(shown ? "inline" : "attachment", name));
+    putHeader(out, std::string("Content-Security-Policy: ") + (shown ? kShownPolicy : "sandbox; default-src 'none'"));
     putHeader(out, "Cache-Control: private, no-cache");
     if (!cookie.empty()) putHeader(out, "Set-Cookie: " + cookie);
 }
@@ -175,7 +181,7 @@ Status httpStatusOf(int code) {
     }
 }
 
-void serveFile(Output& out, const User& user, const Source& source) {
+void serveFile(Output& out, const User& user, const Source& source, bool show) {
     const struct stat status = settledStatus(source);
     const std::int64_t modified = status.st_mtim.tv_sec;
     const std::string tag = entityTag(status.st_ino, status.st_size, modified, status.st_mtim.tv_nsec);
@@ -193,7 +199,8 @@ void serveFile(Output& out, const User& user, const Source& source) {
                    : answer == RangeAnswer::kPart          ? "Status: 206 Partial Content"
                    : answer == RangeAnswer::kUnsatisfiable ? "Status: 416 Range Not Satisfiable"
                                                            : "Status: 200 OK");
-    putCommon(out, user.cookie, source.name, "application/octet-stream");
+    const char* shown = show ? shownType(source.name) : nullptr;
+    putCommon(out, user.cookie, source.name, shown != nullptr ? shown : "application/octet-stream", shown != nullptr);
     putHeader(out, "Accept-Ranges: bytes");
     putHeader(out, "ETag: " + tag);
     putHeader(out, "Last-Modified: " + httpDate(modified));

@@ -51,12 +51,12 @@ int openRow(const ChosenRows& rows, const KeptRow& row, Source& source);
 Status httpStatusOf(int code);
 
 // The headers that every download carries: no guessing of types, nothing shown in place.
-void putCommon(Output& out, const std::string& cookie, const std::string& name, const char* type);
+void putCommon(Output& out, const std::string& cookie, const std::string& name, const char* type, bool shown = false);
 
 // Answer a request for one file (HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since), and for
-// anything else as a zip named `name` + ".zip"; both write the log entry of `user`. A source that is not open is opened
-// when its turn comes, and has to be what it was.
-void serveFile(Output& out, const User& user, const Source& source);
+// anything else as a zip named `name` + ".zip"; both write the log entry of `user`. `show`: what a browser may show, it
+// shows. A source that is not open is opened when its turn comes, and has to be what it was.
+void serveFile(Output& out, const User& user, const Source& source, bool show);
 void serveZip(Output& out, const User& user, std::vector<Source>& sources, const std::string& name,
               const OpenSource& open);
 // The same of rows whose folder is open: one after the other is opened in it, and has to be what was listed.

@@ -283,7 +283,7 @@ void serveDownload(Output& out, Visit& visit, std::vector<std::string> wanted) {
     if (code != ORV_ERR_NONE) return replyFailure(out, httpStatusOf(code), "", code, culprit);
     if (!countDownload(out, visit, sources)) return;
     const User owner = {.name = visit.link().owner, .sid = "", .cookie = ""};
-    if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, owner, sources[0]);
+    if (sources.size() == 1 && S_ISREG(sources[0].status.st_mode)) return serveFile(out, owner, sources[0], false);
     serveZip(out, owner, sources, sources.size() == 1 ? sources[0].name : "download", open);
 }
 

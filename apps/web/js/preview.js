@@ -6,7 +6,7 @@ import { browser } from "./browser.js";
 import { command, context, runCommand } from "./commands.js";
 import { h, icon, iconButton, nameNode, plainName } from "./dom.js";
 import { describe } from "./errors.js";
-import { isArchive, mayBeText } from "./entries.js";
+import { extensionOf, isArchive, mayBeText } from "./entries.js";
 import { formatSize, formatTime } from "./format.js";
 import { canShowImage, iconOf } from "./icons.js";
 import { download } from "./download.js";
@@ -16,6 +16,9 @@ import { isDrawn, smallPicture } from "./thumbnails.js";
 const LARGEST_IMAGE = 64 * 1024 * 1024;
 const SMALLER = 2048; // pixels
 const LARGEST_AHEAD = 16 * 1024 * 1024;
+const MOST_PASSED = 2000; // files that are no pictures
+// What the server lets a browser show as a document of its own.
+const IN_TAB = new Set(["JPG", "JPEG", "PNG", "GIF", "WEBP", "AVIF", "TXT", "LOG", "MD", "CSV"]);
 
 let shown = null;
 
@@ -30,6 +33,7 @@ export function preview(entry, there = false) {
   const node = h("dialog.preview", { "aria-label": t("preview.title") });
   const title = h("div.preview-title");
   const stage = h("div.stage");
+  const tab = h("a.icon-button", { target: "_blank", rel: "noopener", "aria-label": t("preview.tab"), title: t("preview.tab") }, icon("tab"));
   node.append(
     h(
       "header",
@@ -38,6 +42,7 @@ export function preview(entry, there = false) {
       ...["edit", "share", "delete"].map((id) =>
         iconButton(command(id).icon, t(`command.${id}`), () => act(id), { "data-does": id }),
       ),
+      tab,
       iconButton("download", t("command.download"), () => download([shown.entry])),
       iconButton("close", t("dialog.close"), () => node.close()),
     ),
@@ -66,7 +71,7 @@ export function preview(entry, there = false) {
     event.preventDefault(); // or the same key would open it again
     node.close();
   });
-  shown = { node, title, stage, abort: new AbortController(), entry };
+  shown = { node, title, stage, tab, abort: new AbortController(), entry };
   fill(entry);
   document.body.append(node);
   node.showModal();
@@ -94,16 +99,33 @@ addEventListener("popstate", (event) => {
 
 // The next file of the list, or the next of a kind; the selection goes along. `play`: it begins by itself.
 function step(by, { kind = null, play = false } = {}) {
-  const { listing, selection, view } = browser;
+  const { listing, selection } = browser;
   for (let i = selection.cursor + by; i >= 0 && i < listing.total; i += by) {
     const entry = listing.item(i);
     if (!entry) break;
     if (entry.isFolder || (kind !== null && entry.kind !== kind)) continue;
-    selection.pick(i);
-    view.reveal(i);
-    fill(entry, play);
-    if (!leaving) history.replaceState(history.state, "", addressOf(browser.id, entry.id));
-    return;
+    return show(entry, i, play);
+  }
+  return undefined;
+}
+
+function show(entry, index, play = false) {
+  browser.selection.pick(index);
+  browser.view.reveal(index);
+  fill(entry, play);
+  if (!leaving) history.replaceState(history.state, "", addressOf(browser.id, entry.id));
+}
+
+// Behind the last picture the first one comes again.
+async function nextPicture() {
+  const { listing, selection } = browser;
+  const { entry: from } = shown;
+  const { cursor } = selection;
+  for (let by = 1; by <= Math.min(listing.total, MOST_PASSED); ++by) {
+    const i = (cursor + by) % listing.total;
+    const entry = listing.item(i) ?? (await listing.at(i));
+    if (shown?.entry !== from || listing !== browser.listing) return;
+    if (entry && !entry.isFolder && canShowImage(entry.name)) return void show(entry, i);
   }
 }
 
@@ -116,6 +138,10 @@ async function fill(entry, play = false) {
     icon(iconOf(entry), "file-icon"),
     h("div.grow", {}, h("b", {}, nameNode(entry.name)), h("span", {}, about)),
   );
+  shown.tab.hidden = !IN_TAB.has(extensionOf(entry));
+  shown.tab.href = urlOf("download", { path_raw: entry.id, inline: 1 });
+  const held = shown.stage.contains(document.activeElement) ? document.activeElement.getAttribute("aria-label") : null;
+  if (held !== null) shown.node.focus(); // keys are heard there
   shown.stage.replaceChildren(h("div.progress.unknown.slow", {}, h("i")));
   for (const button of shown.node.querySelectorAll("[data-does]"))
     button.hidden = browser.selection.single?.id !== entry.id || !command(button.dataset.does).when(context());
@@ -126,7 +152,10 @@ async function fill(entry, play = false) {
     fetchBeside();
     const { pictureTools } = await import("./view_picture.js");
     if (abort.signal.aborted) return;
-    shown.stage.append(pictureTools(shown.stage, content, abort.signal, step));
+    shown.stage.append(pictureTools(shown.stage, content, abort.signal, { step, next: nextPicture }));
+    if (held !== null) shown.stage.querySelector(`[aria-label="${CSS.escape(held)}"]`)?.focus();
+  } else if (canShowImage(entry.name)) {
+    (await import("./slideshow.js")).arm(nextPicture, abort.signal);
   }
   if (play) content.play?.().catch(() => {}); // where the browser lets nothing begin by itself
   // Pictures and films lie on a dark ground, what is read on that of the page.

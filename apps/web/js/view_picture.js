@@ -1,6 +1,7 @@
-// Pictures closer, and turned: by wheel, two fingers, keys and buttons. A swipe leads to the next one.
+// Pictures closer, and turned: by wheel, two fingers, keys and buttons. A swipe leads to the next one, and so does time.
 
 import { h, iconButton } from "./dom.js";
+import { slideTools } from "./slideshow.js";
 import { t } from "./strings.js";
 
 const STEP = 1.5;
@@ -8,8 +9,8 @@ const MOST = 16;
 const SWIPE = 60; // CSS pixels
 
 // Buttons for the image, which they and the stage's own events change as long as `signal` lives. `step(by)` is the way
-// to the next one.
-export function pictureTools(stage, image, signal, step) {
+// to the next one, `next()` that to the next picture.
+export function pictureTools(stage, image, signal, { step, next }) {
   const state = { zoom: 1, x: 0, y: 0, turn: 0 };
   const points = new Map();
   let before = null;
@@ -32,6 +33,7 @@ export function pictureTools(stage, image, signal, step) {
     state.zoom = to;
     apply();
   };
+  const slides = slideTools(stage.parentElement, next, signal);
   const turn = () => {
     state.turn += 90;
     apply();
@@ -80,7 +82,7 @@ export function pictureTools(stage, image, signal, step) {
     "keydown",
     (event) => {
       if (event.ctrlKey || event.metaKey || event.altKey) return;
-      const does = { "+": () => zoomTo(state.zoom * STEP), "=": () => zoomTo(state.zoom * STEP), "-": () => zoomTo(state.zoom / STEP), 0: () => zoomTo(1), r: turn };
+      const does = { "+": () => zoomTo(state.zoom * STEP), "=": () => zoomTo(state.zoom * STEP), "-": () => zoomTo(state.zoom / STEP), 0: () => zoomTo(1), r: turn, s: slides.toggle };
       if (!does[event.key]) return;
       event.preventDefault();
       does[event.key]();
@@ -93,6 +95,7 @@ export function pictureTools(stage, image, signal, step) {
     iconButton("zoom-out", t("view.zoom_out"), () => zoomTo(state.zoom / STEP)),
     iconButton("zoom-in", t("view.zoom_in"), () => zoomTo(state.zoom * STEP)),
     iconButton("turn", t("view.turn"), turn),
+    slides.box,
   );
 }
 
