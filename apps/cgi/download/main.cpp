@@ -68,7 +68,7 @@ void serveRows(const User& user, const VEXO::WebCGI& web, Output& out) {
 void serveDownloadProgram(Request& request, Output& out) {
     const User& user = request.user;
     const VEXO::WebCGI& web = request.web;
-    if (ChosenRows::isIn(web)) return serveRows(user, web, out);
+    if (ChosenRows::isIn(web) && !namesVersion(web)) return serveRows(user, web, out);
     const auto paths = pathParams(web);
     const auto version = versionParam(web);
     const bool fits = paths && (!namesVersion(web) || (version && paths->size() == 1));
