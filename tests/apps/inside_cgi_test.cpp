@@ -32,6 +32,10 @@ const std::string kRar = "UmFyIRoHAQDFGjMyAwEAAEttjcsaAgIBBgGkgwIAypo7t+/cgwABB2
 
 class InsideCgi : public TaskCgi {
  protected:
+    void SetUp() override {
+        TaskCgi::SetUp();
+        if (!IsSkipped()) setSetting("archive_look_seconds", "600");
+    }
     static CgiReply look(const std::string& archive, const std::string& more = "") {
         return post(PROGRAM_LIST, "alice", "action=archive&path=" + percentEncode(archive) + more);
     }
@@ -131,7 +135,7 @@ TEST_F(InsideCgi, HostileArchivesAreSeenAndExtractedWithinTheirBounds) {
         {"thousands of folders", tar({file((nested + "/x").c_str())}), "n/", "| /" + nested + "/x 1007 !1007"},
         {"too many members", tar(std::vector<Packed>(45, file("same"))), "same=1 members", "same=x | !1007"},
         {"more than its room", zip({file("big", std::string(2 << 20, '\0'))}), "big=2097152", "| /big 1007 !1007"},
-        {"endless", endless(), "big=8589934591 seconds", "| /big 1007 !1007"},
+        {"endless", endless(), "seconds", "| /big 1007 !1007"},
         {"a dictionary of 4 GiB",
          [&] {
              pack(video_ + "/h.xz", "ustar", "xz", {file("a")});
@@ -147,7 +151,10 @@ TEST_F(InsideCgi, HostileArchivesAreSeenAndExtractedWithinTheirBounds) {
         SCOPED_TRACE(what);
         writeFile(video_ + "/a.bin", bytes);
         setSetting("archive_look_seconds", shown.ends_with("seconds") ? "1" : "600");
-        EXPECT_EQ(seen(look("/video/a.bin")), shown);
+        std::string now = seen(look("/video/a.bin"));
+        if (shown == "seconds")
+            now = now.substr(now.rfind(' ') + 1);  // what was found by then is not the same each time
+        EXPECT_EQ(now, shown);
         const Json::Value task =
             perform("alice", "action=extract&conflict=skip&own_folder=true" + about({"/video/a.bin"}, "/photo/t"));
         std::string ended = fs::exists(photo_ + "/t/a") ? filesOf(photo_ + "/t/a") + " |" : "|";

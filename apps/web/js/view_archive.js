@@ -6,7 +6,7 @@ import { mayWriteIn } from "./access.js";
 import { askText, loaded } from "./dialogs.js";
 import { h, icon, loadStyle, nameNode, plainName, set } from "./dom.js";
 import { submit } from "./download.js";
-import { isReadOnlyShare } from "./entries.js";
+import { isInBin, isReadOnlyShare } from "./entries.js";
 import { describe } from "./errors.js";
 import { formatSize, formatTime } from "./format.js";
 import { kindOfName } from "./icons.js";
@@ -37,7 +37,7 @@ class ArchiveView {
     const button = (kind, label, run) => h(`button.button${kind}`, { type: "button", onclick: run }, t(label));
     const here = shareEntry(entry.id);
     this.here = [button(".outlined", "archive.here", () => this.extract(entry.parent, false)), button(".outlined", "archive.own", () => this.extract(entry.parent, true))];
-    for (const one of this.here) one.hidden = !here || isReadOnlyShare(here) || (entry.parent === browser.id && !mayWriteIn(entry.parent));
+    for (const one of this.here) one.hidden = !here || isReadOnlyShare(here) || isInBin(entry.id) || (entry.parent === browser.id && !mayWriteIn(entry.parent));
     this.node = h(
       "section.archive.scrolls",
       { "aria-label": entry.name },
