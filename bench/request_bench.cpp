@@ -254,7 +254,7 @@ std::string valueIn(const std::string& reply, const std::string& member) {
                                    : reply.substr(at + key.size(), reply.find('"', at + key.size()) - at - key.size());
 }
 
-// What a thousand open tabs come to. A page asks 1.5 s after the last answer while somebody is at it, each 10 s when
+// What a thousand open tabs come to. A page asks 1.2 s after the last answer while somebody is at it, each 10 s when
 // nobody has been for long, each 30 s in a hidden tab.
 void tellTabs(const std::vector<Contestant>& contestants) {
     struct Mix {
@@ -264,7 +264,7 @@ void tellTabs(const std::vector<Contestant>& contestants) {
         const bool floor = &contestant == &contestants.front();
         if (!floor && contestant.name != std::string("orveld, ") + kFollow) continue;
         for (const Mix& mix : {Mix{1000, 0, 0}, Mix{100, 200, 700}, Mix{50, 100, 850}, Mix{0, 0, 1000}}) {
-            const double rate = mix.active / 1.5 + mix.seen / 10 + mix.hidden / 30;
+            const double rate = mix.active / 1.2 + mix.seen / 10 + mix.hidden / 30;
             std::printf("%-40s %4.0f active %4.0f seen %4.0f hidden: %4.0f a second, %5.1f %% of a processor\n",
                         contestant.name.c_str(), mix.active, mix.seen, mix.hidden, rate,
                         rate * bench::median(contestant.costs) / 1e4);

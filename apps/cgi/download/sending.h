@@ -50,7 +50,7 @@ int openRow(const ChosenRows& rows, const KeptRow& row, Source& source);
 // A refusal must not be taken for the file: unlike in other programs it shows in the HTTP status.
 Status httpStatusOf(int code);
 
-// The headers that every download carries: no guessing of types, nothing shown in place.
+// The headers that every download carries: no guessing of types, nothing shown in place unless it is `shown`.
 void putCommon(Output& out, const std::string& cookie, const std::string& name, const char* type, bool shown = false);
 
 // Answer a request for one file (HEAD and GET with Range, If-Range, If-None-Match and If-Modified-Since), and for

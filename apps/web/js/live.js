@@ -12,13 +12,13 @@ import { ADDITIONAL } from "./sources.js";
 
 const PRESENT = 120_000; // milliseconds since somebody was at the page
 const PAUSES = [
-  [PRESENT, 1500],
+  [PRESENT, 1200],
   [600_000, 5000],
   [Infinity, 10_000],
 ];
 const HIDDEN = 30_000;
 const LONGEST = 120_000;
-const REST = 9; // times as long as the answer took
+const REST = 4; // times as long as the answer took
 const MOST_ROWS = 100;
 const HELD = 400; // after a press nothing moves: the second click of two is meant for the same row
 const LOOK_AGAIN = 250;
