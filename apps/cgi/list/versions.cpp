@@ -54,7 +54,7 @@ Json::Value rowOf(const Version& version) {
 // Those in one shelf. A snapshot without the path parts what lies before it from what lies behind it.
 void look(const Shelf& shelf, Version& version, Rows& rows) {
     std::vector<Snapshot> snapshots;
-    rows.cut = !snapshotsIn(shelf, snapshots);
+    if (!snapshotsIn(shelf, snapshots)) rows.cut = true;
     struct stat before {};
     bool follows = false;
     for (Snapshot& snapshot : snapshots) {
