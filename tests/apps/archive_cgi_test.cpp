@@ -109,7 +109,8 @@ TEST_F(TaskCgi, ArchivesAreBoundedAndMayBeBroken) {
     EXPECT_NE(extract("cut.zip"), "");
     for (const char* name : {"/zeros", "/more", "/half", "/cut"})
         EXPECT_FALSE(fs::exists(video_ + "/t" + name)) << name;
-    EXPECT_EQ(readFile(video_ + "/t/\xC2\xA0z") + readFile(video_ + "/t/\xC3\xA9") + readFile(video_ + "/t/small"), "561");
+    EXPECT_EQ(readFile(video_ + "/t/\xC2\xA0z") + readFile(video_ + "/t/\xC3\xA9") + readFile(video_ + "/t/small"),
+              "561");
     EXPECT_FALSE(hasParts(video_));
 }
 

@@ -63,7 +63,7 @@ const ASK_EACH = 100;
 const LOOK_AHEAD = 400; // milliseconds of movement
 const FARTHEST = 400; // rows
 const TOO_FAST = 2; // rows in a millisecond
-const FOLLOW_AFTER = 1000; // what a start needs comes first
+const FOLLOW_AFTER = 1500; // what was just listed is fresh
 let stateNode = null;
 let homeShown = null;
 let scrollTimer = null;
@@ -310,7 +310,7 @@ async function start() {
   setupTasks();
   followAddress().finally(() => emit("arrived"));
   arrived.then(showLeft);
-  setTimeout(() => arrived.then(() => import("./live.js")).then(({ follow }) => follow(), () => {}), FOLLOW_AFTER);
+  arrived.then(() => setTimeout(() => import("./live.js").then(({ follow }) => follow(), () => {}), FOLLOW_AFTER));
 }
 
 // Only whoever left an upload unfinished needs what shows it.
