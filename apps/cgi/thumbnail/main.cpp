@@ -44,6 +44,13 @@ constexpr SandboxLimits kLimits = {
     .memory = 2048 * kMiB, .output = 16 * kMiB, .processor = 10, .time = std::chrono::seconds(20)};
 constexpr std::uint64_t kMostWithin = 64 * kMiB;  // of the preview in a camera's file
 
+unsigned edgeFor(unsigned long size) {
+    for (const unsigned edge : kEdges) {
+        if (edge >= size) return edge;
+    }
+    return *std::rbegin(kEdges);
+}
+
 // One of ours, which lie beside the folder that this program was started from.
 std::string ownProgram(const char* name) {
     std::error_code error;
@@ -158,7 +165,7 @@ void serveThumbnailProgram(Request& request, Output& out) {
     if (!fits || !size || *size < 1 || *size > *std::rbegin(kEdges)) {
         return refuse(out, user, Status::kBadRequest, ORV_ERR_PARAMETER, request.web.GetParam("path", ""));
     }
-    const unsigned edge = *std::lower_bound(std::begin(kEdges), std::end(kEdges), *size);
+    const unsigned edge = edgeFor(*size);
     Source source;
     source.asked = *path;
     int code = actAs(user.sid.c_str(), user.name, IsDirUserHome(*path, nullptr));

@@ -157,7 +157,7 @@ class Editor {
   paint() {
     const { changed } = this;
     this.state.textContent = t(this.readOnly ? "editor.read_only" : changed ? "editor.changed" : "editor.unchanged");
-    this.save.disabled = this.readOnly || !changed || this.storing === true;
+    this.save.disabled = this.readOnly || !changed || Boolean(this.storing);
     // Read in another encoding would be what is stored, not what was written here.
     this.encodings.disabled = changed;
   }
@@ -167,20 +167,26 @@ class Editor {
     this.view.focus();
   }
 
-  // Whether the text is stored.
-  async store() {
-    if (this.readOnly || !this.changed || this.storing) return !this.changed;
-    this.storing = true;
+  // Whether the text is stored. What was typed since another storing began follows it.
+  store() {
+    if (this.storing) return (this.following ??= this.storing.then(() => this.storeFollowing()));
+    if (this.readOnly || !this.changed) return Promise.resolve(!this.changed);
+    this.storing = this.put({ "If-Match": this.tag })
+      .catch((failure) => {
+        this.explain(failure);
+        return false;
+      })
+      .finally(() => {
+        this.storing = null;
+        this.paint();
+      });
     this.paint();
-    try {
-      return await this.put({ "If-Match": this.tag });
-    } catch (failure) {
-      this.explain(failure);
-      return false;
-    } finally {
-      this.storing = false;
-      this.paint();
-    }
+    return this.storing;
+  }
+
+  storeFollowing() {
+    this.following = null;
+    return this.store();
   }
 
   async put(condition) {
