@@ -13,7 +13,7 @@ const PIECE = 256 * 1024;
 const LONGEST = 4; // bytes of a character
 const MOST_COLOURED = 150 * 1000; // characters
 
-// The node of a text; null for what is none. `source`: what says to a program which file, where that is not by its id alone.
+// The node of a text; null for what is not one. `source`: what says to a program which file, where that is not by its id alone.
 export async function textNode(entry, signal) {
   loadStyle("documents");
   const reader = new Reader(entry, signal);
